@@ -1,0 +1,1 @@
+// empty.cpp - gives the shared object a source of its own; its contents come from the library's objects.

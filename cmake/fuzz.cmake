@@ -1,0 +1,10 @@
+# The fuzz targets, with clang and -DZUV_FUZZ=ON: one executable for each file of tests/fuzz.
+file(GLOB ZUV_FUZZ_TARGETS CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/tests/fuzz/*_fuzz.cpp)
+foreach(source ${ZUV_FUZZ_TARGETS})
+    get_filename_component(name ${source} NAME_WE)
+    add_executable(${name} ${source})
+    target_include_directories(${name} PRIVATE ${PROJECT_SOURCE_DIR}/tests ${PROJECT_SOURCE_DIR}/src
+        ${ZUV_GENERATED_DIR}/src)
+    target_link_libraries(${name} PRIVATE zuv_objects)
+    target_link_options(${name} PRIVATE -fsanitize=fuzzer)
+endforeach()

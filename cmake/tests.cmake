@@ -1,0 +1,28 @@
+# The test suite: one executable for each file of tests/unit, and the suites that bring their own list.
+find_package(GTest REQUIRED)
+file(GLOB ZUV_TEST_SUPPORT CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/tests/support/*.cpp)
+add_library(zuv_test_support OBJECT ${ZUV_TEST_SUPPORT})
+target_include_directories(zuv_test_support PUBLIC ${PROJECT_SOURCE_DIR}/tests ${PROJECT_SOURCE_DIR}/src
+    ${PROJECT_SOURCE_DIR}/include)
+target_link_libraries(zuv_test_support PUBLIC zuv_flags GTest::gtest Threads::Threads)
+
+# A GoogleTest executable, one CTest case.
+function(zuv_add_test name)
+    add_executable(${name} ${ARGN})
+    target_include_directories(${name} PRIVATE ${ZUV_GENERATED_DIR}/src)
+    target_link_libraries(${name} PRIVATE zuv_test_support zuv_objects GTest::gtest_main)
+    add_test(NAME ${name} COMMAND ${name})
+    set_tests_properties(${name} PROPERTIES TIMEOUT 300)
+endfunction()
+
+file(GLOB ZUV_UNIT_TESTS CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/tests/unit/*_test.cpp)
+foreach(source ${ZUV_UNIT_TESTS})
+    get_filename_component(name ${source} NAME_WE)
+    zuv_add_test(${name} ${source})
+endforeach()
+target_compile_definitions(zuv_test_support PUBLIC ZUV_GOLDEN_DIR="${PROJECT_SOURCE_DIR}/tests/golden"
+    ZUV_SCHEMA_DIR="${PROJECT_SOURCE_DIR}/schema")
+
+# Another parser beside the reader.
+find_package(LibXml2 REQUIRED)
+target_link_libraries(xml_reference_test PRIVATE LibXml2::LibXml2)

@@ -1,0 +1,499 @@
+// soap.h - the engine context: one flat record on which a message exchange works.
+//
+// Here: sizes, mode flags, the callback table, the record with every field's meaning, and its life
+// (construction, per-call reset, copying, end). Elsewhere: what works on the record, one header for
+// each mechanism (soap_memory.h, soap_io.h, soap_error.h, soap_log.h, soap_plugin.h, soap_tcp.h,
+// soap_tls.h, soap_http.h, soap_xml.h, soap_identity.h, soap_primitive.h, soap_attachment.h).
+//
+// Always: one context serves one thread and one exchange at a time; nothing here takes a lock.
+// Arguments are needed only during a call unless a function says otherwise; text fields marked
+// "borrowed" keep the pointer, so the caller's text must outlive its use. Operations return 0 or an
+// error code of soap_error.h, which also stands in `error`. Time limits: 0 none, positive seconds,
+// negative microseconds.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <cstdio>
+#include <iosfwd>
+
+#include <zuv_client_pro/soap_export.h>
+
+struct soap;
+struct SOAP_ENV__Header;
+struct SOAP_ENV__Fault;
+
+// Handles of OpenSSL and zlib: named here so that a host needs none of their headers.
+struct bio_st;
+struct ssl_st;
+struct ssl_ctx_st;
+struct ssl_session_st;
+struct x509_store_ctx_st;
+struct z_stream_s;
+
+// ---------------------------------------------------------------------------------------------
+// Fixed sizes. They are part of the design: limits on the wire follow from them.
+
+constexpr std::size_t SOAP_BUFFER_SIZE = 65536;      // bytes; send/receive buffer, compression buffer
+constexpr std::size_t SOAP_TEXT_SIZE = 1024;         // bytes; each scratch text, terminator included
+constexpr std::size_t SOAP_ID_HASH_SIZE = 1999;      // chains of the id table
+constexpr std::size_t SOAP_POINTER_HASH_SIZE = 4096; // chains of the pointer table at its start
+constexpr std::size_t SOAP_TRACK_HASH_SIZE = 4096;   // chains of the memory tracking table at its start
+constexpr std::size_t SOAP_POINTER_BLOCK_SIZE = 32;  // pointer records in one block
+constexpr std::size_t SOAP_POSITIONS_MAX = 16;       // array positions kept for SOAP-ENC:position
+constexpr std::size_t SOAP_LOG_CHANNELS = 3;         // received, sent, third
+constexpr std::uint32_t SOAP_MAX_DEPTH = 4096;       // default of soap::max_depth
+
+// ---------------------------------------------------------------------------------------------
+// Mode flags: the same values serve `mode`, `input_mode` and `output_mode`.
+
+constexpr std::uint32_t MODE_IO_MASK = 0x3;     // the two bits that choose how bytes leave
+constexpr std::uint32_t MODE_DIRECT = 0x0;      // no buffering: each write goes out
+constexpr std::uint32_t MODE_BUFFERED = 0x1;    // through `buffer`, Content-Length from a counting pass
+constexpr std::uint32_t MODE_STORE = 0x2;       // the whole message is stored, then sent
+constexpr std::uint32_t MODE_CHUNKED = 0x3;     // HTTP chunked framing
+constexpr std::uint32_t MODE_UDP = 0x4;         // datagrams
+constexpr std::uint32_t MODE_COUNTING = 0x8;    // counting pass: bytes are counted, not sent
+constexpr std::uint32_t MODE_KEEP_ALIVE = 0x10; // ask for a kept connection
+constexpr std::uint32_t MODE_LATIN1 = 0x20;     // received text is ISO-8859-1
+constexpr std::uint32_t MODE_BARE_XML = 0x40;   // no HTTP, plain XML on the stream
+constexpr std::uint32_t MODE_DIME = 0x80;       // DIME attachments
+constexpr std::uint32_t MODE_MIME = 0x100;      // MIME attachments
+constexpr std::uint32_t MODE_MTOM = 0x200;      // MTOM form of the attachments
+constexpr std::uint32_t MODE_DEFLATE = 0x400;   // compression in force
+constexpr std::uint32_t MODE_TLS = 0x800;       // set by a TLS connect, cleared by a plain one
+constexpr std::uint32_t MODE_STRICT = 0x1000;   // strict validation on reading
+constexpr std::uint32_t MODE_INDENT = 0x2000;   // indented output
+constexpr std::uint32_t MODE_IGNORE_NAMESPACES = 0x4000; // namespaces are not compared
+constexpr std::uint32_t MODE_DEFAULT_NAMESPACE = 0x8000; // xmlns on each element in place of prefixes
+constexpr std::uint32_t MODE_CANONICAL = 0x10000;        // canonical XML
+constexpr std::uint32_t SOAP_XML_TREE = 0x20000;         // no id and ref: the data is a tree
+constexpr std::uint32_t MODE_NIL = 0x40000;              // absent values are written as nil elements
+constexpr std::uint32_t MODE_NO_TYPE = 0x80000;          // no xsi:type
+constexpr std::uint32_t MODE_UTF_STRINGS = 0x2000000;    // strings are UTF-8 in memory
+constexpr std::uint32_t MODE_NULL_STRINGS = 0x8000000;   // an empty string is written as nil
+constexpr std::uint32_t SOAP_XML_GRAPH = 0x20000000;     // id and ref in literal messages too
+constexpr std::uint32_t MODE_MIME_AFTER = 0x40000000;    // the rest of the MIME parts is read after the call
+constexpr std::uint32_t MODE_WSU_ID = 0x80000000;        // wsu:Id on the Body of the next message sent
+
+// Stages of a message, kept in soap::message_part.
+constexpr std::int16_t PART_BEGIN = 0;
+constexpr std::int16_t PART_ENVELOPE = 2;
+constexpr std::int16_t PART_HEADER = 3;
+constexpr std::int16_t PART_AFTER_HEADER = 4;
+constexpr std::int16_t PART_EMPTY_BODY = 5;
+constexpr std::int16_t PART_BODY = 6;
+constexpr std::int16_t PART_AFTER_BODY = 7;
+constexpr std::int16_t PART_AFTER_ENVELOPE = 8;
+constexpr std::int16_t PART_OUTSIDE = 9;
+
+// ---------------------------------------------------------------------------------------------
+// Records that hang on the context. Owned by the context unless a field says otherwise.
+
+// One row of the namespace table; a table ends with a row whose prefix is null.
+struct soap_namespace {
+    const char *prefix;  // the prefix written on the wire and used in all tag comparisons
+    const char *uri;     // the namespace's own URI
+    const char *pattern; // further URIs accepted, under soap_tag_match; null for none
+    char *received;      // URI last received under the pattern; null for none. In local_namespaces a block of
+                         // SOAP_MALLOC (soap_memory.h) that goes with the table; in static tables always null
+};
+
+// Prefix stack (writer and reader); see soap_xml.h. Records are made and recycled by the prefix functions
+// alone.
+struct soap_prefix {
+    soap_prefix *next;
+    soap_prefix *chain;  // next older record of the same hash chain
+    const char *uri;     // held behind the prefix, in the record itself; null: none, or bound to a table row
+    std::uint32_t level; // element depth at which it was pushed
+    std::uint32_t capacity; // bytes that the record has for its texts
+    std::int16_t
+        index; // reader: row of the namespace table or -1; writer: 0 declared, 1 to declare, 2 declared here
+    std::uint16_t hash;          // its chain
+    std::uint16_t prefix_length; // bytes in `prefix`, terminator not included
+    char prefix[1];              // the prefix's text, in the record itself
+};
+struct soap_namespace_scope; // hash chains and spare records of the prefix stack, texts of the table; private
+                             // to namespaces
+
+// One remembered answer of the prefix look-up, private to the reader.
+struct soap_prefix_cache {
+    std::int16_t row;    // as soap::tag_row
+    std::uint8_t length; // bytes of `text`
+    char text[45];       // the prefix; longer ones are not remembered
+};
+
+// Attribute of the current element (writer and reader); records and value buffers are reused within a call.
+// Each record is one block of SOAP_MALLOC (soap_memory.h).
+struct soap_attribute {
+    soap_attribute *next;
+    std::int16_t escape;  // flag handed to soap_text_write for the value
+    char *value;          // owned buffer (another block of SOAP_MALLOC), or null
+    std::size_t size;     // capacity of `value`, bytes
+    const char *uri;      // namespace of the name, for canonical order; borrowed
+    std::int16_t visible; // 0 idle, 1 present without a value, 2 present with a value
+    char name[1];         // in the record itself
+};
+
+// Block stack: blocks in which a stored message or an array of unknown size gathers.
+struct soap_block {
+    soap_block *next;
+    std::size_t size; // bytes of data behind this header
+};
+struct soap_block_stack {
+    soap_block_stack *next_stack;
+    soap_block *first_block; // newest first until soap_block_stack_first reverses it
+    std::size_t total_size;  // bytes
+};
+
+// Record of a class instance made by the engine; see soap_memory.h.
+struct soap_instance {
+    soap_instance *next;
+    void *object;                                // the object, or the first of an array
+    std::int32_t type_id;                        // may name a class derived from the one asked for
+    std::int32_t array_size;                     // negative: a single object; otherwise the number of objects
+    int (*delete_hook)(soap_instance *instance); // destroys `object`; 0 if it did
+};
+
+struct soap_block_trailer;  // trailer of a managed block, private to memory
+struct soap_track_entry;    // one tracked allocation, private to memory
+struct soap_pointer_record; // see soap_identity.h
+struct soap_pointer_block;
+struct soap_id_record;
+struct soap_id_index;   // storage of the id records, and a look-up aid for very many ids; private to identity
+struct soap_attachment; // see soap_attachment.h
+struct soap_attachment_index; // private to attachments
+struct soap_plugin_record;    // see soap_plugin.h
+
+// A value that was read and waits for its attachment: the places to fill. Freed when it is answered, or with
+// the call's scratch; see soap_attachment.h.
+struct soap_attachment_ref {
+    soap_attachment_ref *next;
+    soap_attachment_ref *previous;
+    soap_attachment_ref *next_in_chain; // in mtom_index
+    std::uint64_t hash;                 // of the id
+    unsigned char **content;
+    int *size;
+    char **type;
+    char **options;
+    const char *id; // as in the message, "cid:" and all; managed
+};
+
+// DIME state of the message under way.
+struct soap_dime_state {
+    std::uint8_t flags;            // low bits MB 4, ME 2, CF 1; high four bits the type format
+    std::size_t size;              // data length of the current record, bytes
+    std::size_t chunk_size;        // bytes left in the current chunk of the SOAP record, when it is chunked
+    std::size_t buffer_length;     // bytes of `buffer` beyond the current chunk
+    std::uint64_t count;           // length of all DIME attachments as counted for Content-Length
+    char *id;                      // managed memory
+    char *type;                    // managed memory
+    char *options;                 // managed memory; first two bytes type, next two length, text
+    soap_attachment *list;         // received records, in order
+    soap_attachment *first, *last; // attachments to send; on input `last` is the newest received one
+};
+
+// MIME state of the message under way.
+struct soap_mime_state {
+    soap_attachment *list; // received parts, in order
+    soap_attachment *root; // the received part that holds the message, whose content the XML reader takes
+    soap_attachment *first, *last; // parts to send; on input `last` is the part being read
+    char *boundary;                // managed memory; null when none is known
+    char *start;                   // Content-ID of the SOAP part; managed memory; null for the first part
+};
+
+// ---------------------------------------------------------------------------------------------
+// The context.
+
+struct ZUV_CLASS soap {
+    std::int16_t state;         // 0 ended, 1 initialised, 2 copy of another context
+    std::int16_t soap_version;  // 0 not yet known, 1 SOAP 1.1, 2 SOAP 1.2
+    std::uint32_t mode;         // effective mode of the message now in progress
+    std::uint32_t input_mode;   // requested for input; a received head also changes it
+    std::uint32_t output_mode;  // requested for output
+    const char *float_format;   // borrowed; printf format of float values
+    const char *double_format;  // borrowed; printf format of double values
+    const char *dime_id_format; // borrowed; format of generated attachment ids
+    const char *http_version;   // borrowed; version in request lines
+    const char *http_content;   // received Content-Type (managed), or the host's override for a sent one
+    const char *encoding_style; // null: literal; "" : the encoding namespace of the table's second row
+    const char *actor;          // borrowed; actor or role to send, and the one this receiver plays
+    const char *language;       // borrowed; xml:lang of fault texts
+    int recv_timeout, send_timeout, connect_timeout, accept_timeout; // 0 none, > 0 s, < 0 us
+    int socket_flags;                                                // flags for send and recv
+    int connect_flags;                // SOL_SOCKET option to set on a client socket, or SO_LINGER; 0 none
+    int bind_flags, accept_flags;     // the same for a listening and an accepted socket
+    std::uint16_t linger_seconds;     // l_linger when the option above is SO_LINGER
+    const soap_namespace *namespaces; // borrowed; static table
+    soap_namespace *local_namespaces; // owned copy, made by the first message
+    soap_prefix *prefix_list;         // innermost first
+    soap_namespace_scope *namespace_scope; // owned; null until first use; kept from call to call
+    soap_block_stack *block_stack;
+    soap_instance *instance_list;        // newest first
+    soap_block_trailer *allocation_list; // newest first
+    soap_id_record *id_table[SOAP_ID_HASH_SIZE];
+    std::size_t id_count;    // records in id_table
+    soap_id_index *id_index; // storage of the id table; null until a message has an id
+    soap_pointer_record *pointer_table[SOAP_POINTER_HASH_SIZE];
+    soap_pointer_record *
+        *pointer_chains;                // the table in use: pointer_table, or a larger one for huge messages
+    std::size_t pointer_chain_mask;     // chains of the table in use, less one
+    std::size_t pointer_count;          // records in the table
+    soap_pointer_block *pointer_blocks; // newest first
+    std::uint16_t pointer_block_used;   // records used in the newest block
+    SOAP_ENV__Header *header;           // received or to be sent; managed
+    SOAP_ENV__Fault *fault;             // managed
+    std::uint32_t next_id;              // last number given to a marked object
+    void *user;                         // free for the application
+    soap_plugin_record *plugin_list;    // newest first
+    const char *auth_user, *auth_password; // HTTP Basic credentials; managed memory or the host's
+    const char *auth_realm;                // from a received challenge; managed
+
+    // Callbacks. All take the context first. A null entry is skipped.
+    int (*on_post)(soap *ctx, const char *endpoint, const char *host, int port, const char *path,
+                   const char *action, std::uint64_t count);
+    int (*on_get)(soap *ctx);
+    int (*on_put)(soap *ctx);
+    int (*on_delete)(soap *ctx);
+    int (*on_options)(soap *ctx);
+    int (*on_head)(soap *ctx);
+    int (*on_form)(soap *ctx);
+    int (*on_header_line)(soap *ctx, const char *key, const char *value);
+    int (*on_response)(soap *ctx, int status, std::uint64_t count);
+    int (*on_read_head)(soap *ctx);
+    int (*on_parse_header)(soap *ctx, const char *key, const char *value);
+    int (*on_soap_header)(soap *ctx);
+    int (*on_connect)(soap *ctx, const char *endpoint, const char *host, int port);
+    int (*on_disconnect)(soap *ctx);
+    int (*on_close_socket)(soap *ctx, int socket);
+    int (*on_shutdown_socket)(soap *ctx, int socket, int how);
+    int (*on_open)(soap *ctx, const char *endpoint, const char *host, int port);
+    int (*on_accept)(soap *ctx, int socket, void *address, int *length);
+    int (*on_close)(soap *ctx);
+    int (*on_send)(soap *ctx, const char *data, std::size_t length);
+    std::size_t (*on_recv)(soap *ctx, char *buffer, std::size_t length);
+    int (*on_poll)(soap *ctx);
+    void (*on_error_text)(soap *ctx, const char **code, const char **text);
+    void *(*on_find_plugin)(soap *ctx, const char *id);
+    void *(*on_malloc)(soap *ctx, std::size_t size);
+    int (*on_send_prepare_begin)(soap *ctx);
+    int (*on_recv_prepare_begin)(soap *ctx);
+    int (*on_send_prepare)(soap *ctx, const char *data, std::size_t length);
+    int (*on_recv_prepare)(soap *ctx, const char *data, std::size_t length);
+    int (*on_send_prepare_end)(soap *ctx);
+    int (*on_recv_prepare_end)(soap *ctx);
+    int (*on_send_filter)(soap *ctx, const char **data, std::size_t *length);
+    int (*on_recv_filter)(soap *ctx, char *buffer, std::size_t *length, std::size_t size);
+    void *(*dime_read_open)(soap *ctx, void *handle, const char *id, const char *type, const char *options);
+    void (*dime_read_close)(soap *ctx, void *handle);
+    std::size_t (*dime_read)(soap *ctx, void *handle, char *buffer, std::size_t length);
+    void *(*dime_write_open)(soap *ctx, const char *id, const char *type, const char *options);
+    void (*dime_write_close)(soap *ctx, void *handle);
+    int (*dime_write)(soap *ctx, void *handle, const char *data, std::size_t length);
+    void *(*mime_read_open)(soap *ctx, void *handle, const char *id, const char *type,
+                            const char *description);
+    void (*mime_read_close)(soap *ctx, void *handle);
+    std::size_t (*mime_read)(soap *ctx, void *handle, char *buffer, std::size_t length);
+    void *(*mime_write_open)(soap *ctx, void *handle, const char *id, const char *type,
+                             const char *description, int encoding);
+    void (*mime_write_close)(soap *ctx, void *handle);
+    int (*mime_write)(soap *ctx, void *handle, const char *data, std::size_t length);
+
+    int filter_stop;          // result of the read that a receive filter is holding back
+    int master_socket;        // listening socket; -1 none
+    int socket;               // connected socket; -1 none
+    bool socket_abandoned;    // soap_force_close closed `socket`: the number is neither used nor closed again
+    bool response_unfinished; // the last response was not read to its end: the connection carries no other
+                              // call
+    std::ostream *output_stream; // borrowed; in place of the socket
+    std::istream *input_stream;  // borrowed; in place of the socket
+    int send_fd;                 // used for output when there is no socket
+    int recv_fd;                 // used for input when there is no socket
+    std::size_t buffer_index;    // input: read position in `buffer`; output: its fill
+    std::size_t buffer_length;   // input: fill of `buffer`
+    std::int32_t look_ahead;     // one byte or token pushed back; 0 none; -1 end of input, which stays
+    std::int16_t in_cdata;       // reader: inside a CDATA section
+    std::int16_t
+        has_body; // reader: the held element has content; writer: text or children stood in the element
+    std::uint32_t nesting_level;         // open elements
+    std::uint32_t max_depth;             // most open elements, both ways; 0 no limit
+    std::uint64_t message_count;         // bytes counted on output, received on input
+    std::uint64_t content_length;        // received Content-Length
+    char *label_buffer;                  // growing text; owned; null until first use
+    std::size_t label_size, label_index; // capacity and fill, bytes
+    char buffer[SOAP_BUFFER_SIZE];       // the one send and receive buffer
+    char message_text[SOAP_TEXT_SIZE];   // text of the last error; start line of a received head
+    char scratch_text[SOAP_TEXT_SIZE];   // request line, header values, attributes, number texts
+    char tag[SOAP_TEXT_SIZE];            // name of the last start tag read, or of the last end tag
+    char element_id[SOAP_TEXT_SIZE];     // "#" and the id of the held element
+    char element_href[SOAP_TEXT_SIZE];   // its reference
+    char element_type[SOAP_TEXT_SIZE];   // its xsi:type
+    char array_type[SOAP_TEXT_SIZE];
+    char array_size[SOAP_TEXT_SIZE];
+    char array_offset[SOAP_TEXT_SIZE];
+    std::uint16_t tag_length; // bytes in `tag`
+    std::uint16_t tag_local;  // reader: offset of the local name in `tag`; valid with tag_resolved
+    std::int16_t tag_row; // reader: namespace row of `tag`, or a code of tag_view.h; valid with tag_resolved
+    bool tag_resolved;    // reader: the two fields above belong to the present `tag`
+    std::uint8_t prefix_cache_valid; // reader: bit n: prefix_cache[n] holds a prefix of the present stack
+    const soap_prefix *prefix_cache_list; // reader: prefix_list when the cache was filled
+    soap_prefix_cache prefix_cache[8];    // reader: rows of the prefixes last looked up
+    std::int16_t position_count;
+    std::int32_t positions[SOAP_POSITIONS_MAX];
+    soap_attribute *attribute_list;
+    std::int16_t encoding_flag;   // the next start tag carries SOAP-ENV:encodingStyle
+    std::int16_t must_understand; // the next start tag carries mustUnderstand; on input: the held tag had it
+    std::int16_t null_flag;       // xsi:nil was set; writer: an array element was left out
+    std::int16_t namespace_state; // writer: 0 before the first start tag of a message, 1 after it
+    std::int16_t attributes_set;  // writer: some attribute waits in attribute_list
+    std::int16_t peeked;          // a start tag is held and has not been consumed
+    std::int16_t other_flag;      // the held element is for another actor
+    std::int16_t root_flag;       // SOAP-ENC:root of the held element; -1 absent
+    std::int16_t allocated;       // the last soap_object_register made the object
+    std::int16_t wsu_id_flag;     // a wsu:Id attribute is waiting
+    std::int16_t message_part;    // PART_...
+    std::uint64_t chunk_size;     // input: bytes left in the chunk; output: total sent in chunks
+    std::size_t chunk_buffer_length; // bytes of `buffer` that the chunk parser owns
+    std::uint64_t body_received;     // input: raw bytes of the body received since the head
+    std::size_t raw_index;           // input: next raw byte in zlib_buffer while raw_aside is set
+    bool raw_aside;            // input: raw bytes lie in zlib_buffer, and `buffer` holds what is made of them
+    bool content_length_given; // input: the head held a Content-Length; set by the head reader
+    bool body_open;            // input: the head was read and its framing is in force
+    bool body_ended;           // input: the last chunk and what follows it were read, or framing broke
+    bool prepare_held;         // input: on_recv_prepare sees nothing yet, as the body has not been found
+    bool framing_doubtful;     // input: framing was broken or something stood behind the message
+    char endpoint[SOAP_TEXT_SIZE]; // URL of the exchange; after a redirect its target
+    char path[SOAP_TEXT_SIZE];
+    char host[SOAP_TEXT_SIZE];  // an IPv6 literal without its brackets
+    const char *action;         // SOAPAction of the exchange; managed
+    const char *xml_prolog;     // borrowed; overrides the XML declaration
+    std::uint64_t peer_address; // IPv4 address of an accepted client
+    int port;
+    std::int16_t keep_alive;      // 0 no, 1 keep, negative: asked by the peer and not yet confirmed
+    std::uint16_t tcp_keep_alive; // set SO_KEEPALIVE
+    unsigned tcp_keep_idle, tcp_keep_interval, tcp_keep_count; // 0 leaves the system's value
+    unsigned keep_alive_limit;      // kept and copied for hosts; the engine does not count requests
+    const char *proxy_http_version; // borrowed; kept and copied
+    const char *proxy_host;         // borrowed; HTTP proxy, null: direct
+    int proxy_port;
+    const char *proxy_user, *proxy_password; // borrowed
+    const char *forwarded_for;               // received X-Forwarded-For; managed
+    int status;                              // operation code of the message, or received HTTP status
+    int error;                               // 0 or the code of the last operation
+    int error_mode;                          // 0 system error, 1 TCP start-up, 2 name resolution
+    int errno_value;                         // saved system error
+    soap_dime_state dime;
+    soap_mime_state mime;
+    soap_attachment_ref *mtom_list; // references that wait for their attachment
+    soap_attachment_index
+        *mtom_index; // look-up aid for the former, managed; means nothing while mtom_list is null
+    char *log_paths[SOAP_LOG_CHANNELS]; // owned copies; null: no log
+    std::FILE *log_streams[SOAP_LOG_CHANNELS];
+    soap_track_entry *track_table[SOAP_TRACK_HASH_SIZE];
+    soap_track_entry **track_chains; // the table in use: track_table, or a larger one
+    std::size_t track_chain_mask;    // chains of the table in use, less one
+    struct soap_memory_pools *pools; // tracking entries and instance records, handed out from blocks
+    const char
+        *canonical_include; // borrowed; blank-separated prefixes declared on the root in canonical output
+    const char *canonical_exclude; // borrowed; blank-separated prefixes never declared in canonical output
+    unsigned ipv6_multicast_scope;
+    const char *ipv4_multicast_interface; // borrowed; four bytes, an in_addr
+    std::uint8_t ipv4_multicast_ttl;
+    alignas(8) char peer[128]; // socket address of the last UDP or accepted peer
+    std::size_t peer_length;
+    int (*tls_setup)(soap *ctx);
+    int (*tls_verify)(int result, x509_store_ctx_st *store);
+    bio_st *tls_bio;
+    ssl_st *tls_connection;
+    ssl_ctx_st *tls_context; // shared with copies; freed by the original
+    ssl_session_st *tls_session;
+    const char *tls_dh_file, *tls_random_file;                                     // borrowed
+    std::uint16_t tls_flags;                                                       // TLS_... of soap_tls.h
+    const char *tls_key_file, *tls_password, *tls_ca_file, *tls_ca_path, *tls_crl; // borrowed
+    char session_host[SOAP_TEXT_SIZE]; // where tls_session came from
+    int session_port;
+    z_stream_s *zlib_stream; // owned
+    unsigned long zlib_crc;
+    const char *zlib_dictionary; // borrowed; preset dictionary
+    unsigned zlib_dictionary_length;
+    std::int16_t zlib_state;        // 0 idle, 1 deflating, 2 inflating
+    std::int16_t zlib_in, zlib_out; // 0 none, 1 deflate, 2 gzip
+    char *zlib_buffer;              // owned; SOAP_BUFFER_SIZE bytes, allocated on first use
+    std::size_t zlib_buffer_length;
+    std::int16_t zlib_level;             // 1 to 9
+    float zlib_ratio_in, zlib_ratio_out; // compressed by plain size of the last message
+
+    soap();                            // both modes 0
+    explicit soap(std::uint32_t mode); // one mode for both ways
+    soap(std::uint32_t input_mode, std::uint32_t output_mode);
+    soap(const soap &other); // soap_context_copy
+    soap &operator=(const soap &) = delete;
+    virtual ~soap(); // discards all and ends the engine
+};
+
+// ---------------------------------------------------------------------------------------------
+// Life of a context.
+
+// Sets all fields to their defaults. The context must hold nothing: a new record or one that has ended.
+// Starting can't fail: without memory the trace is off, and compression ends with an error when it is asked
+// for. The first context of a process also starts OpenSSL, which is not guarded against racing threads.
+ZUV_API void soap_context_init(soap *ctx);
+
+// As soap_context_init, then stores the modes; `mode` takes the output mode.
+ZUV_API void soap_context_init_modes(soap *ctx, std::uint32_t input_mode, std::uint32_t output_mode);
+
+// A new context from plain memory, with both modes 0, one mode for both ways, or two; the caller ends it by
+// soap_context_free. Null if memory runs out.
+ZUV_API soap *soap_context_create();
+ZUV_API soap *soap_context_create(std::uint32_t mode);
+ZUV_API soap *soap_context_create(std::uint32_t input_mode, std::uint32_t output_mode);
+
+// Copies every field as it stands, scratch buffers and all; owned pointers are then shared. For
+// soap_context_copy, which mends that; the virtual table of the target stays.
+ZUV_API void soap_context_assign(soap *target, const soap *source);
+
+// Makes `target` (a record with no contents of its own to lose) an independent copy of `source`, with
+// state 2. All settings and callbacks come along, and scratch texts as they stand. Everything that is freed
+// with a call or a context starts anew: managed memory and the fields that live in it, received namespaces,
+// attachments, trace files (on the same paths), compression. Shared by bytes: `user`, the streams, the number
+// of the socket (who keeps using it sets it to -1 in the other one), data of plug-ins without a copy hook,
+// and the TLS context, which only the original frees: it must outlive its copies' TLS connections.
+//   target, also when both are the same
+//   null  an argument is null or `source` has ended: target is untouched
+//         a plug-in refuses (target->error is its answer) or memory runs out (20): what was built stays in
+//         target until its end
+ZUV_API soap *soap_context_copy(soap *target, const soap *source);
+
+// The same into a record from plain memory, which the caller ends by soap_context_free. Null on failure;
+// nothing is left behind. The copy constructor does the same in place: a failure shows as state 0 or as a
+// non-zero error.
+ZUV_API soap *soap_context_copy(const soap *source);
+
+// Clears the per-message state ahead of an exchange, the error too; managed objects, soap_version and a kept
+// connection with its unread bytes stay.
+ZUV_API void soap_reset_call(soap *ctx);
+
+// Frees what a message left in the working tables (prefixes, attributes, block stacks, namespaces,
+// pending references, pointer and id tables). Part of soap_reset_call and soap_discard_all.
+ZUV_API void soap_call_scratch_free(soap *ctx);
+
+// Frees all managed blocks and the instance records that remain, releases the connection by the keep-alive
+// rule and closes the trace files; the context stays usable. Run soap_discard_objects first: instances left
+// here are forgotten without being destroyed. Does nothing on a context that has ended.
+ZUV_API void soap_discard_all(soap *ctx);
+
+// Ends the context: connection, plug-ins, TLS, compression, logs, tracking. To be called by the thread that
+// used the context, whose OpenSSL error queue is emptied. Blocks still live, managed ones among them, are
+// named on standard error as leaks: run soap_discard_objects and soap_discard_all first, as the destructor
+// does. Callbacks go back to their defaults, `state` to 0; a second call does nothing.
+ZUV_API void soap_engine_done(soap *ctx);
+
+// soap_engine_done, then frees a record of soap_context_create. Null is allowed.
+ZUV_API void soap_context_free(soap *ctx);
+
+// The program's own namespace table, which every new context starts from.
+ZUV_API extern soap_namespace soap_program_namespaces[];
+
+// Installs the namespace table (borrowed: it must outlive the context) and drops the working copy, then makes
+// a new one. Returns 0 or 20.
+ZUV_API int soap_set_namespaces(soap *ctx, const soap_namespace *table);

@@ -1,0 +1,126 @@
+// soap_error.h - error codes, their texts, and faults made from them.
+//
+// Elsewhere: the fault record itself (soap_envelope.h), socket texts (soap_tcp.h).
+// Always: a code is sticky until the next call begins; a text is composed only when somebody asks.
+#pragma once
+
+#include <zuv_client_pro/soap.h>
+
+// Every engine code: name, value, text. This list is the one source of the texts. soap_fault_text_fill puts
+// an argument in the place of "%s", behind texts that end in a blank, and "Validation constraint violation: "
+// in front of those that tell what an element violates. A code with an empty text is told by its number, or
+// by another module.
+#define SOAP_ERRORS(X)                                                                                       \
+    X(SOAP_EOF, -1, "End of file or no input: ")                                                             \
+    X(SOAP_OK, 0, "")                                                                                        \
+    X(SOAP_CLIENT_FAULT, 1, "Client fault")                                                                  \
+    X(SOAP_SERVER_FAULT, 2, "Server fault")                                                                  \
+    X(SOAP_TAG_MISMATCH, 3, "tag name or namespace mismatch")                                                \
+    X(SOAP_TYPE_MISMATCH, 4, "data type mismatch ")                                                          \
+    X(SOAP_SYNTAX_ERROR, 5, "Well-formedness violation")                                                     \
+    X(SOAP_NO_TAG, 6, "No XML root element")                                                                 \
+    X(SOAP_ARRAY_INDEX, 7, "Array index out of bounds")                                                      \
+    X(SOAP_MUST_UNDERSTAND, 8, "The data in element '%s' must be understood but cannot be handled")          \
+    X(SOAP_NAMESPACE_ERROR, 9, "namespace error")                                                            \
+    X(SOAP_USER_ERROR, 10, "User data error")                                                                \
+    X(SOAP_FATAL_ERROR, 11, "Fatal error")                                                                   \
+    X(SOAP_FAULT, 12, "")                                                                                    \
+    X(SOAP_NO_METHOD, 13, "Method '%s' not implemented: method name or namespace not recognized")            \
+    X(SOAP_NO_DATA, 14, "Data required for operation")                                                       \
+    X(SOAP_GET_METHOD, 15, "HTTP GET method not implemented")                                                \
+    X(SOAP_PUT_METHOD, 16, "HTTP PUT method not implemented")                                                \
+    X(SOAP_HTTP_METHOD, 19, "HTTP method not implemented")                                                   \
+    X(SOAP_OUT_OF_MEMORY, 20, "Out of memory")                                                               \
+    X(SOAP_CORRUPTION, 21, "Memory overflow or memory corruption error")                                     \
+    X(SOAP_HEADER_LINE, 22, "Header line too long")                                                          \
+    X(SOAP_NIL, 23, "nil not allowed")                                                                       \
+    X(SOAP_DUPLICATE_ID, 24, "multiple definitions (use the SOAP_XML_TREE flag) of the same id ")            \
+    X(SOAP_MISSING_ID, 25, "missing id for ref ")                                                            \
+    X(SOAP_ID_CONFLICT, 26, "incompatible object type ref/id pair ")                                         \
+    X(SOAP_UDP_ERROR, 27, "Message too large for UDP packet")                                                \
+    X(SOAP_TCP_ERROR, 28, "")                                                                                \
+    X(SOAP_HTTP_ERROR, 29, "An HTTP processing error occurred")                                              \
+    X(SOAP_TLS_ERROR, 30, "SSL/TLS error")                                                                   \
+    X(SOAP_ZLIB_ERROR, 31, "Zlib/gzip error: '%s'")                                                          \
+    X(SOAP_DIME_ERROR, 32, "DIME format error")                                                              \
+    X(SOAP_DIME_HREF, 33, "DIME href to missing attachment")                                                 \
+    X(SOAP_DIME_VERSION, 34, "DIME version/transmission error")                                              \
+    X(SOAP_DIME_END, 35, "End of DIME error")                                                                \
+    X(SOAP_MIME_ERROR, 36, "MIME format error")                                                              \
+    X(SOAP_MIME_HREF, 37, "MIME href to missing attachment")                                                 \
+    X(SOAP_MIME_END, 38, "End of MIME error")                                                                \
+    X(SOAP_VERSION_MISMATCH, 39, "Invalid SOAP message or SOAP version mismatch")                            \
+    X(SOAP_PLUGIN_ERROR, 40, "Plugin registry error")                                                        \
+    X(SOAP_DATA_ENCODING, 41, "Unsupported SOAP data encoding")                                              \
+    X(SOAP_REQUIRED, 42, "missing required attribute")                                                       \
+    X(SOAP_PROHIBITED, 43, "prohibited attribute present")                                                   \
+    X(SOAP_OCCURS, 44, "occurrence violation")                                                               \
+    X(SOAP_LENGTH, 45, "content range or length violation")                                                  \
+    X(SOAP_FD_EXCEEDED, 46,                                                                                  \
+      "Maximum number of open connections was reached (no define HAVE_POLL): increase FD_SETSIZE")           \
+    X(SOAP_UTF_ERROR, 47, "UTF content encoding error")                                                      \
+    X(SOAP_NTLM_ERROR, 48, "An HTTP NTLM authentication error occurred")                                     \
+    X(SOAP_STOP, 1000, "Stopped: no response to be sent or received (informative)")                          \
+    X(SOAP_FORM, 1001, "")
+
+enum soap_error_code : int {
+#define SOAP_ERROR_ENUMERATOR(name, value, text) name = value,
+    SOAP_ERRORS(SOAP_ERROR_ENUMERATOR)
+#undef SOAP_ERROR_ENUMERATOR
+};
+
+// Fills the fault record's code and text from ctx->error. The host's on_error_text is asked first. What is
+// set stays; a missing code becomes that of the sender, and a missing text that of the error, with the code
+// and, in SOAP 1.2, the subcode that the error calls for. Error 12 (a fault that was received or set) gets no
+// text. A composed text stands in message_text and lasts until the next one.
+ZUV_API void soap_fault_text_fill(soap *ctx);
+
+// Store a fault in the context's record and its error in ctx->error, replacing what was there.
+//   code     a QName with a prefix of the namespace table, such as "SOAP-ENV:Client"
+//   subcode  null: none. Ignored unless the version is 1.2
+//   text     the fault's reason
+//   detail   raw XML; null or empty: the detail stays as it is
+// Texts are borrowed: they must live as long as the fault record is used. Lack of memory for the record
+// itself goes unnoticed here; a print form then shows what it can.
+//   `error`, always
+ZUV_API int soap_fault_set(soap *ctx, const char *code, const char *subcode, const char *text,
+                           const char *detail, int error);
+// soap_fault_set with the code of the sender (client) or the receiver (server) in the current SOAP version.
+ZUV_API int soap_fault_sender(soap *ctx, const char *text, const char *detail, int error);
+ZUV_API int soap_fault_receiver(soap *ctx, const char *text, const char *detail, int error);
+
+// The same with managed copies of the texts.
+//   SOAP_FAULT; SOAP_OUT_OF_MEMORY, with the fault left as it was
+ZUV_API int soap_fault_set_copied(soap *ctx, const char *code, const char *subcode, const char *text,
+                                  const char *detail);
+ZUV_API int soap_fault_sender_copied(soap *ctx, const char *subcode, const char *text, const char *detail);
+ZUV_API int soap_fault_receiver_copied(soap *ctx, const char *subcode, const char *text, const char *detail);
+
+// Print the context's error as
+//     SOAP 1.1 fault: SOAP-ENV:Client [no subcode]
+//     "text"
+//     Detail: [no detail]
+// filling the fault record first if it has no code. Without a SOAP version the line begins "Error " and the
+// error. Nothing is printed for error 0, not even a terminator. A null or ended context is said to be not
+// initialised.
+//   buffer  takes at most `length` bytes, terminator included; returned
+//   stream  returned
+ZUV_API char *soap_fault_print_text(soap *ctx, char *buffer, std::size_t length);
+ZUV_API std::ostream &soap_fault_print_stream(soap *ctx, std::ostream &stream);
+ZUV_API void soap_fault_print_file(soap *ctx, std::FILE *file);
+
+// Prints the input in ctx->buffer up to the place where reading stopped, a mark, and at most 1022 bytes from
+// there on. Nothing for error 0 or 1000, or when the buffer holds no input.
+ZUV_API void soap_fault_location_print(soap *ctx, std::FILE *file);
+
+// Composes "Validation constraint violation: " and text, argument (null: none) and the element in ctx->tag,
+// if there is one. The text, in message_text, cut to its size; neither argument may lie there.
+ZUV_API const char *soap_constraint_text(soap *ctx, const char *text, const char *argument);
+
+// Text of an end of input: that of ctx->errno_value, or of a timeout with the time limits that are set. In
+// message_text.
+ZUV_API const char *soap_eof_text(soap *ctx);
+
+// Takes a fault out of a response that did not read as expected, ends the message and releases the
+// connection; see soap_envelope.h for the record. `check` not 0: the absence of a fault is no error.
+ZUV_API int soap_fault_receive(soap *ctx, int check);

@@ -1,0 +1,269 @@
+// class_ops.cpp - the rules for a whole object: made, marked, written, read, referred to.
+//
+// Here: what all classes share. Elsewhere: their members (class_rules.h), leaves (member_read.cpp,
+// member_write.cpp), dispatch by id (registry.cpp).
+#include "binding/class_ops.h"
+
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_identity.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_registry.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include "binding/member_read.h"
+#include "binding/registry.h"
+#include "codec/tag_view.h"
+
+namespace binding {
+
+bool class_descends(const class_ops *derived, const class_ops *base)
+{
+    while (derived && derived != base)
+        derived = derived->base;
+    return derived != nullptr;
+}
+
+void *class_instantiate(soap *ctx, const class_ops &ops, int count, const char *xsi_type, std::size_t *size,
+                        const class_ops **made)
+{
+    const class_ops *actual = &ops;
+    if (xsi_type && *xsi_type) {
+        const class_ops *named = class_by_xsi_type(ctx, xsi_type);
+        if (named && class_descends(named, &ops))
+            actual = named;
+    }
+    soap_instance *entry = soap_instance_register(ctx, nullptr, actual->type_id, count, soap_delete_object);
+    if (!entry)
+        return nullptr;
+    entry->object = actual->create(ctx, count);
+    if (!entry->object) {
+        ctx->error = SOAP_OUT_OF_MEMORY;
+        return nullptr;
+    }
+    if (size)
+        *size = actual->size * static_cast<std::size_t>(count < 0 ? 1 : count);
+    if (made)
+        *made = actual;
+    return entry->object;
+}
+
+// --- writing ---
+
+int class_out(soap *ctx, const class_ops &ops, const void *object, const char *tag, int id, const char *type)
+{
+    if (ops.write_attributes && ops.write_attributes(ctx, object))
+        return ctx->error;
+    const int element_id = soap_element_id(ctx, id, object, ops.type_id);
+    if (soap_element_out_begin(ctx, tag, element_id, ops.base ? ops.xml_type : type))
+        return ctx->error;
+    if (ops.write_content(ctx, object, tag))
+        return ctx->error;
+    return soap_element_out_end(ctx, tag);
+}
+
+int class_put(soap *ctx, const class_ops &ops, const void *object, const char *tag, const char *type)
+{
+    const int id = soap_multiref_begin(ctx, object, nullptr, 0, tag, ops.type_id);
+    if (ops.out(object, ctx, tag ? tag : ops.xml_type, id, type))
+        return ctx->error;
+    return soap_put_finish(ctx);
+}
+
+int class_pointer_out(soap *ctx, const class_ops &ops, const char *tag, int id, const void *object,
+                      const char *type)
+{
+    id = soap_element_ref(ctx, tag, id, object, nullptr, 0, type, object ? ops.type_of(object) : ops.type_id);
+    return id < 0 ? ctx->error : ops.out(object, ctx, tag, id, type);
+}
+
+void class_pointer_mark(soap *ctx, const class_ops &ops, const void *object)
+{
+    // The object's own id, so that the element that defines it and the references to it agree.
+    if (object && soap_mark_pointer(ctx, object, ops.type_of(object)) == 0)
+        ops.mark(object, ctx);
+}
+
+// --- reading ---
+
+namespace {
+
+enum class step { consumed, unknown, failed };
+
+// Gives the held element to the member that it names. The members with its local name are tried in order.
+step take_member(soap *ctx, const member_table &members, void *object, std::uint64_t &spent)
+{
+    const tag_view tag = soap_held_tag(ctx);
+    std::uint32_t slot = tag_local_hash(tag.local, tag.local_length) & members.slot_mask;
+    for (; members.slots[slot] != 0; slot = (slot + 1) & members.slot_mask) {
+        std::size_t index = members.slots[slot] - 1U;
+        if (members.entries[index].local != std::string_view(tag.local, tag.local_length))
+            continue;
+        for (;;) {
+            const member_entry &entry = members.entries[index];
+            const std::uint64_t bit = std::uint64_t{1} << index;
+            if (!(spent & bit)) {
+                if (entry.read(ctx, entry.tag.data(), object)) {
+                    if (entry.single)
+                        spent |= bit;
+                    return step::consumed;
+                }
+                if (ctx->error != SOAP_TAG_MISMATCH)
+                    return step::failed;
+            }
+            if (members.next_same[index] == 0)
+                return step::unknown;
+            index = members.next_same[index] - 1U;
+        }
+    }
+    return step::unknown;
+}
+
+// Reads all elements up to the end of the parent, in any order. `spent` takes the single members that were
+// met.
+bool read_elements(soap *ctx, const member_table &members, void *object, std::uint64_t &spent)
+{
+    for (;;) {
+        if (soap_element_head_read(ctx)) {
+            if (ctx->error != SOAP_NO_TAG)
+                return false;
+            return true;
+        }
+        ctx->error = SOAP_TAG_MISMATCH;
+        const step taken = take_member(ctx, members, object, spent);
+        if (taken == step::failed)
+            return false;
+        if (taken == step::unknown && soap_element_skip(ctx)) {
+            if (ctx->error != SOAP_NO_TAG)
+                return false;
+            return true;
+        }
+    }
+}
+
+bool strict(const soap *ctx)
+{
+    return (ctx->mode & MODE_STRICT) != 0;
+}
+
+bool lacks(const class_ops &ops, const void *object, std::uint64_t spent)
+{
+    return (ops.members->required & ~spent) != 0 || (ops.enough && !ops.enough(object));
+}
+
+void *read_by_reference(soap *ctx, const class_ops &ops, const char *tag, void *object)
+{
+    const bool body = ctx->has_body != 0;
+    if (!soap_object_forward(ctx, ctx->element_href, object, 0, ops.type_id, 0, ops.size, 0, ops.copy_hook))
+        return nullptr;
+    if (body && soap_element_in_end(ctx, tag))
+        return nullptr;
+    if (strict(ctx) && (ops.members->required || ops.members->minima)) {
+        ctx->error = SOAP_OCCURS;
+        return nullptr;
+    }
+    return object;
+}
+
+// What comes ahead of the content in all forms: the object's identity and its attributes.
+bool read_preamble(soap *ctx, const class_ops &ops, void *object)
+{
+    if (ctx->element_id[0] && !soap_object_register(ctx, ctx->element_id, object, ops.type_id, ops.size, 0,
+                                                    nullptr, nullptr, nullptr))
+        return false;
+    return !ops.read_attributes || ops.read_attributes(ctx, object);
+}
+
+} // namespace
+
+void *read_simple_content(soap *ctx, const class_ops &ops, const char *tag, void *object)
+{
+    if (!read_preamble(ctx, ops, object))
+        return nullptr;
+    if (ctx->element_href[0])
+        return read_by_reference(ctx, ops, tag, object);
+    if (!ctx->has_body)
+        return object;
+    if (!read_text_content(ctx, *ops.text(object)) || soap_element_in_end(ctx, tag))
+        return nullptr;
+    return object;
+}
+
+void *read_members(soap *ctx, const class_ops &ops, const char *tag, void *object)
+{
+    if (!read_preamble(ctx, ops, object))
+        return nullptr;
+    if (!ctx->has_body || ctx->element_href[0])
+        return read_by_reference(ctx, ops, tag, object);
+    std::uint64_t spent = 0;
+    if (!read_elements(ctx, *ops.members, object, spent) || soap_element_in_end(ctx, tag))
+        return nullptr;
+    if (strict(ctx) && lacks(ops, object, spent)) {
+        ctx->error = SOAP_OCCURS;
+        return nullptr;
+    }
+    return object;
+}
+
+void *class_in(soap *ctx, const class_ops &ops, const char *tag, void *object)
+{
+    if (soap_element_in_begin(ctx, tag, ops.nillable, nullptr))
+        return nullptr;
+    const class_ops *actual = &ops;
+    if (!object)
+        object = class_instantiate(ctx, ops, -1, ctx->element_type, nullptr, &actual);
+    return object ? actual->read(ctx, *actual, tag, object) : nullptr;
+}
+
+bool independents_read(soap *ctx)
+{
+    if (soap_read_independents(ctx) == SOAP_TAG_MISMATCH)
+        ctx->error = 0;
+    return ctx->error == 0;
+}
+
+void *class_get(soap *ctx, const class_ops &ops, const char *tag, void *object)
+{
+    object = class_in(ctx, ops, tag, object);
+    return object && independents_read(ctx) ? object : nullptr;
+}
+
+bool class_new_in(soap *ctx, const class_ops &ops, const char *tag, void **place)
+{
+    const class_ops *actual = &ops;
+    void *object = class_instantiate(ctx, ops, -1, ctx->element_type, nullptr, &actual);
+    if (!object || !actual->read(ctx, *actual, tag, object))
+        return false;
+    *place = object;
+    return true;
+}
+
+bool class_pointer_in(soap *ctx, const class_ops &ops, const char *tag, void **place)
+{
+    if (soap_element_in_begin(ctx, tag, 1, nullptr))
+        return false;
+    *place = nullptr;
+    if (!ctx->null_flag && ctx->element_href[0] != '#')
+        return class_new_in(ctx, ops, tag, place);
+    const bool body = ctx->has_body != 0;
+    if (!soap_object_forward_ptr(ctx, ctx->element_href, place, ops.type_id, ops.size, 0))
+        return false;
+    return !body || soap_element_in_end(ctx, tag) == 0;
+}
+
+bool read_vector_item_object(soap *ctx, const class_ops &ops, const char *tag, void *vector,
+                             std::size_t index, int vector_type, void **object)
+{
+    if (soap_element_in_begin(ctx, tag, 1, nullptr))
+        return false;
+    *object = nullptr;
+    if (!ctx->null_flag && ctx->element_href[0] != '#')
+        return class_new_in(ctx, ops, tag, object);
+    const bool body = ctx->has_body != 0;
+    // Level 1: what the vector takes is the object's address, which is known before the object is complete.
+    if (!ctx->null_flag && !soap_object_forward(ctx, ctx->element_href, vector, index, ops.type_id,
+                                                vector_type, ops.size, 1, soap_insert_into_vector))
+        return false;
+    return !body || soap_element_in_end(ctx, tag) == 0;
+}
+
+} // namespace binding

@@ -1,0 +1,399 @@
+// class_rules.h - the rules of a data class, unrolled from its member list.
+//
+// Here: templates that turn law<T> into a class_ops record: defaulting, marking, writing, reading of each
+// member in order. Elsewhere: whole objects (class_ops.cpp), leaves (member_write.h, member_read.h).
+//
+// Always: inherited members come first and are handled by the base's own functions, so that a class that adds
+// nothing costs nothing.
+#pragma once
+
+#include <memory>
+#include <new>
+#include <utility>
+
+#include "binding/class_ops.h"
+#include "binding/law.h"
+#include "binding/member_read.h"
+#include "binding/member_write.h"
+#include "codec/tag_view.h"
+
+namespace binding {
+
+template <class T> inline constexpr std::size_t own_count = std::tuple_size_v<decltype(law<T>::elements)>;
+
+template <class T> constexpr std::size_t total_count()
+{
+    if constexpr (std::is_void_v<T>)
+        return 0;
+    else
+        return total_count<typename law<T>::base>() + own_count<T>;
+}
+
+// The nearest class of the chain that has members of its own: its functions serve for T.
+template <class T> constexpr auto bearer_tag()
+{
+    using base = typename law<T>::base;
+    if constexpr (own_count < T >> 0 || std::is_void_v<base>)
+        return static_cast<T *>(nullptr);
+    else
+        return bearer_tag<base>();
+}
+template <class T> using bearer = std::remove_pointer_t<decltype(bearer_tag<T>())>;
+
+// --- defaulting ---
+
+template <class T> void reset_members(T &object)
+{
+    if constexpr (!std::is_void_v<typename law<T>::base>)
+        reset_members<typename law<T>::base>(object);
+    std::apply([&](const auto &...row) { (reset_attribute(object.*row.member), ...); }, law<T>::attributes);
+    if constexpr (law<T>::text != nullptr)
+        (object.*law<T>::text).clear();
+    std::apply([&](const auto &...row) { (reset_value(object.*row.member, row.initial), ...); },
+               law<T>::elements);
+}
+
+// --- marking ---
+
+template <class T> void mark_members(soap *ctx, const T &object)
+{
+    if constexpr (!std::is_void_v<typename law<T>::base>)
+        mark_members<typename law<T>::base>(ctx, object);
+    std::apply([&](const auto &...row) { (mark_value(ctx, object.*row.member, row.item_type), ...); },
+               law<T>::elements);
+}
+
+// --- writing ---
+
+template <class T> int write_members(soap *ctx, const T &object)
+{
+    if constexpr (!std::is_void_v<typename law<T>::base>) {
+        if (write_members<bearer<typename law<T>::base>>(ctx, object))
+            return ctx->error;
+    }
+    const bool failed = std::apply(
+        [&](const auto &...row) {
+            return (... || (write_value(ctx, row.tag, object.*row.member, row.how, row.item_type) != 0));
+        },
+        law<T>::elements);
+    return failed ? ctx->error : 0;
+}
+
+template <class T> int write_content(soap *ctx, const void *object, const char *)
+{
+    return write_members<bearer<T>>(ctx, *static_cast<const T *>(object));
+}
+
+template <class T> int write_attributes(soap *ctx, const void *object)
+{
+    const T &self = *static_cast<const T *>(object);
+    if constexpr (!std::is_void_v<typename law<T>::base>) {
+        if (write_attributes<typename law<T>::base>(ctx, static_cast<const typename law<T>::base *>(&self)))
+            return ctx->error;
+    }
+    const bool failed = std::apply(
+        [&](const auto &...row) { return (... || (write_attribute(ctx, row.name, self.*row.member) != 0)); },
+        law<T>::attributes);
+    return failed ? ctx->error : 0;
+}
+
+// --- reading ---
+
+template <class T> bool read_attributes(soap *ctx, void *object)
+{
+    T &self = *static_cast<T *>(object);
+    if constexpr (!std::is_void_v<typename law<T>::base>) {
+        if (!read_attributes<typename law<T>::base>(ctx, static_cast<typename law<T>::base *>(&self)))
+            return false;
+    }
+    return std::apply(
+        [&](const auto &...row) {
+            return (... && read_attribute(ctx, row.name, self.*row.member, row.required));
+        },
+        law<T>::attributes);
+}
+
+template <class T, std::size_t I> bool read_member(soap *ctx, const char *tag, void *object)
+{
+    constexpr const auto &row = std::get<I>(law<T>::elements);
+    return read_value(ctx, tag, static_cast<T *>(object)->*row.member, row.item_type, row.vector_type);
+}
+
+template <class V> inline constexpr bool is_vector = false;
+template <class V> inline constexpr bool is_vector<std::vector<V>> = true;
+
+template <class T> bool enough_items(const void *object)
+{
+    const T &self = *static_cast<const T *>(object);
+    if constexpr (!std::is_void_v<typename law<T>::base>) {
+        if (!enough_items<typename law<T>::base>(static_cast<const typename law<T>::base *>(&self)))
+            return false;
+    }
+    return std::apply(
+        [&](const auto &...row) { return (... && holds_minimum(self.*row.member, row.minimum)); },
+        law<T>::elements);
+}
+
+// --- the table of members ---
+
+constexpr std::string_view local_part(std::string_view tag)
+{
+    const auto colon = tag.find(':');
+    return colon == std::string_view::npos ? tag : tag.substr(colon + 1);
+}
+
+template <class T, std::size_t N, std::size_t... I>
+constexpr void add_own_entries(std::array<member_entry, N> &entries, std::size_t first,
+                               std::index_sequence<I...>)
+{
+    ((entries[first + I] = {std::get<I>(law<T>::elements).tag, local_part(std::get<I>(law<T>::elements).tag),
+                            &read_member<T, I>, std::get<I>(law<T>::elements).how != occurs::many,
+                            std::get<I>(law<T>::elements).how == occurs::required}),
+     ...);
+}
+
+template <class T, std::size_t N> constexpr void add_entries(std::array<member_entry, N> &entries)
+{
+    if constexpr (!std::is_void_v<T>) {
+        add_entries<typename law<T>::base>(entries);
+        add_own_entries<T>(entries, total_count<typename law<T>::base>(),
+                           std::make_index_sequence<own_count<T>>{});
+    }
+}
+
+template <class T> constexpr bool has_minima()
+{
+    if constexpr (std::is_void_v<T>) {
+        return false;
+    } else {
+        return has_minima<typename law<T>::base>() ||
+               std::apply(
+                   [](const auto &...row) { return (... || (row.how == occurs::many && row.minimum > 0)); },
+                   law<T>::elements);
+    }
+}
+
+constexpr std::size_t slots_for(std::size_t members)
+{
+    std::size_t slots = 4;
+    while (slots < 2 * members + 1)
+        slots *= 2;
+    return slots;
+}
+
+template <std::size_t N> struct member_storage {
+    std::array<member_entry, N> entries{};
+    std::array<std::uint8_t, slots_for(N)> slots{};
+    std::array<std::uint8_t, N> next_same{};
+    std::uint64_t required = 0;
+};
+
+template <std::size_t N> constexpr void index_names(member_storage<N> &storage)
+{
+    for (std::size_t i = 0; i < N; ++i) {
+        const std::string_view local = storage.entries[i].local;
+        std::size_t slot = tag_local_hash(local.data(), local.size()) & (slots_for(N) - 1);
+        while (storage.slots[slot] != 0 && storage.entries[storage.slots[slot] - 1U].local != local)
+            slot = (slot + 1) & (slots_for(N) - 1);
+        if (storage.slots[slot] == 0) {
+            storage.slots[slot] = static_cast<std::uint8_t>(i + 1);
+        } else {
+            std::size_t last = storage.slots[slot] - 1U;
+            while (storage.next_same[last] != 0)
+                last = storage.next_same[last] - 1U;
+            storage.next_same[last] = static_cast<std::uint8_t>(i + 1);
+        }
+        if (storage.entries[i].single && storage.entries[i].required)
+            storage.required |= std::uint64_t{1} << i;
+    }
+}
+
+template <class T> constexpr auto make_members()
+{
+    constexpr std::size_t count = total_count<T>();
+    static_assert(count < MEMBERS_MAX, "more members than a mask has bits");
+    member_storage<count> storage;
+    add_entries<T>(storage.entries);
+    index_names(storage);
+    return storage;
+}
+
+template <class T> inline constexpr auto members_storage = make_members<T>();
+template <class T>
+inline constexpr member_table members_table = {members_storage<T>.entries.data(),
+                                               total_count<T>(),
+                                               members_storage<T>.slots.data(),
+                                               members_storage<T>.slots.size() - 1,
+                                               members_storage<T>.next_same.data(),
+                                               members_storage<T>.required,
+                                               has_minima<T>()};
+
+// --- the record ---
+
+template <class T> void *create(soap *owner, int count)
+{
+    try {
+        if (count < 0) {
+            T *object = new T;
+            object->soap = owner;
+            return object;
+        }
+        T *objects = new T[static_cast<std::size_t>(count)];
+        for (int i = 0; i < count; ++i)
+            objects[i].soap = owner;
+        return objects;
+    } catch (const std::bad_alloc &) {
+        return nullptr;
+    }
+}
+
+template <class T> void destroy(void *object, int count)
+{
+    if (count < 0)
+        delete static_cast<T *>(object);
+    else
+        delete[] static_cast<T *>(object);
+}
+
+template <class T> void assign(void *target, const void *source)
+{
+    *static_cast<T *>(target) = *static_cast<const T *>(source);
+}
+
+template <class T>
+void copy_hook(soap *ctx, int, int, void *place, std::size_t, const void *source, std::size_t)
+{
+    try {
+        assign<T>(place, source);
+    } catch (const std::bad_alloc &) {
+        ctx->error = 20;
+    }
+}
+
+template <class T> void reset_object(void *object, soap *owner)
+{
+    static_cast<T *>(object)->soap_default(owner);
+}
+
+template <class T> int type_of_object(const void *object)
+{
+    return static_cast<const T *>(object)->soap_type();
+}
+
+template <class T> void mark_object(const void *object, soap *ctx)
+{
+    static_cast<const T *>(object)->soap_serialize(ctx);
+}
+
+template <class T> int out_object(const void *object, soap *ctx, const char *tag, int id, const char *type)
+{
+    return static_cast<const T *>(object)->soap_out(ctx, tag, id, type);
+}
+
+template <class T> std::string *text_of(void *object)
+{
+    if constexpr (law<T>::text != nullptr)
+        return &(static_cast<T *>(object)->*law<T>::text);
+    else
+        return nullptr;
+}
+
+template <class T> int write_text_content(soap *ctx, const void *object, const char *)
+{
+    return write_text(ctx, static_cast<const T *>(object)->*law<T>::text);
+}
+
+template <class T> constexpr const class_ops *base_ops()
+{
+    if constexpr (std::is_void_v<typename law<T>::base>)
+        return nullptr;
+    else
+        return &ops_of<typename law<T>::base>;
+}
+
+template <class T> constexpr auto content_writer()
+{
+    if constexpr (law<T>::text != nullptr)
+        return &write_text_content<T>;
+    else
+        return &write_content<bearer<T>>;
+}
+
+template <class T> constexpr content_reader reader_of()
+{
+    return law<T>::text != nullptr ? &read_simple_content : &read_members;
+}
+
+template <class T> constexpr bool has_attributes()
+{
+    if constexpr (std::is_void_v<T>)
+        return false;
+    else
+        return std::tuple_size_v<decltype(law<T>::attributes)> > 0 || has_attributes<typename law<T>::base>();
+}
+
+template <class T> constexpr class_ops make_ops()
+{
+    return {law<T>::type_id,
+            law<T>::xml_type,
+            base_ops<T>(),
+            sizeof(T),
+            law<T>::global_element,
+            law<T>::text != nullptr,
+            &members_table<bearer<T>>,
+            &create<T>,
+            &destroy<T>,
+            &assign<T>,
+            &reset_object<T>,
+            &type_of_object<T>,
+            &mark_object<T>,
+            &out_object<T>,
+            content_writer<T>(),
+            has_attributes<T>() ? &write_attributes<T> : nullptr,
+            reader_of<T>(),
+            has_attributes<T>() ? &read_attributes<T> : nullptr,
+            has_minima<T>() ? &enough_items<T> : nullptr,
+            &text_of<T>,
+            &copy_hook<T>};
+}
+
+} // namespace binding
+
+// Defines everything that a generated class declares, from its law. The arguments' names can't be those of
+// members.
+#define BINDING_DEFINE_CLASS(T)                                                                              \
+    constinit const binding::class_ops binding::law<T>::ops = binding::make_ops<T>();                        \
+    T::T()                                                                                                   \
+    {                                                                                                        \
+        T::soap_default(nullptr);                                                                            \
+    }                                                                                                        \
+    T::~T() = default;                                                                                       \
+    int T::soap_type() const                                                                                 \
+    {                                                                                                        \
+        return binding::law<T>::type_id;                                                                     \
+    }                                                                                                        \
+    void T::soap_default(struct soap *ctx_)                                                                  \
+    {                                                                                                        \
+        this->soap = ctx_;                                                                                   \
+        binding::reset_members<T>(*this);                                                                    \
+    }                                                                                                        \
+    void T::soap_serialize(struct soap *ctx_) const                                                          \
+    {                                                                                                        \
+        binding::mark_members<binding::bearer<T>>(ctx_, *this);                                              \
+    }                                                                                                        \
+    int T::soap_put(struct soap *ctx_, const char *tag_, const char *type_) const                            \
+    {                                                                                                        \
+        return binding::class_put(ctx_, binding::ops_of<T>, this, tag_, type_);                              \
+    }                                                                                                        \
+    int T::soap_out(struct soap *ctx_, const char *tag_, int id_, const char *type_) const                   \
+    {                                                                                                        \
+        return binding::class_out(ctx_, binding::ops_of<T>, this, tag_, id_, type_);                         \
+    }                                                                                                        \
+    void *T::soap_get(struct soap *ctx_, const char *tag_, const char *)                                     \
+    {                                                                                                        \
+        return binding::class_get(ctx_, binding::ops_of<T>, tag_, this);                                     \
+    }                                                                                                        \
+    void *T::soap_in(struct soap *ctx_, const char *tag_, const char *)                                      \
+    {                                                                                                        \
+        return binding::class_in(ctx_, binding::ops_of<T>, tag_, this);                                      \
+    }

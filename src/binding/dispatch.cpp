@@ -1,0 +1,266 @@
+// dispatch.cpp - reading, writing and marking an object whose type only an id or a name tells.
+//
+// Elsewhere: making and destroying by id (registry.cpp), the classes' own rules (class_ops.cpp).
+#include <cstring>
+
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_identity.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_primitive.h>
+#include <zuv_client_pro/soap_registry.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include "binding/envelope.h"
+#include "binding/member_read.h"
+#include "binding/member_write.h"
+#include "binding/name_lookup.h"
+#include "binding/registry.h"
+
+namespace binding {
+
+namespace {
+
+constexpr int CHARS_ID = 4;
+constexpr int TEXT_ID = 8;
+
+const type_entry *dispatched(int type_id)
+{
+    return type_id <= DISPATCH_ID_MAX ? type_entry_of(type_id) : nullptr;
+}
+
+// --- reading ---
+
+void *read_chars(soap *ctx, const type_entry &entry, int type)
+{
+    char **place =
+        soap_string_element_in(ctx, nullptr, nullptr, entry.xml_name, type, type == CHARS_ID ? 1 : 2, -1, -1);
+    return place ? *place : nullptr;
+}
+
+void *read_held_pointer(soap *ctx, bool (*read)(soap *, const char *, void **))
+{
+    void *object = nullptr;
+    return read(ctx, nullptr, &object) ? object : nullptr;
+}
+
+void *read_vector(soap *ctx, const type_entry &entry, int type)
+{
+    void *vector = soap_instantiate(ctx, type, nullptr, nullptr, nullptr);
+    int item_type = entry.item;
+    void *item = vector ? read_by_type(ctx, item_type) : nullptr;
+    if (!item)
+        return nullptr;
+    if (!entry.vector->append(vector, item)) {
+        out_of_memory(ctx);
+        return nullptr;
+    }
+    return vector;
+}
+
+void *read_wrapper(soap *ctx, const type_entry &entry, int type)
+{
+    void *record = soap_instantiate(ctx, type, nullptr, nullptr, nullptr);
+    if (!record ||
+        !class_pointer_in(ctx, *type_entries[entry.item].ops, entry.element, static_cast<void **>(record)))
+        return nullptr;
+    return record;
+}
+
+void *read_pointer(soap *ctx, const type_entry &entry)
+{
+    auto **place = static_cast<void **>(soap_block_alloc(ctx, sizeof(void *)));
+    if (!place || !class_pointer_in(ctx, *type_entries[entry.item].ops, nullptr, place))
+        return nullptr;
+    return place;
+}
+
+void *read_code(soap *ctx, const type_entry &entry)
+{
+    void *code = nullptr;
+    return read_code_pointer(ctx, nullptr, &code, *entry.names) ? code : nullptr;
+}
+
+} // namespace
+
+void *read_by_type(soap *ctx, int type)
+{
+    const type_entry *entry = dispatched(type);
+    if (!entry)
+        return nullptr;
+    switch (entry->kind) {
+    case type_kind::chars:
+        return read_chars(ctx, *entry, type);
+    case type_kind::text:
+        return read_held_pointer(ctx, &read_text_pointer);
+    case type_kind::simple:
+        return entry->simple->in(ctx, nullptr, nullptr, entry->xml_name);
+    case type_kind::enumeration:
+        return read_code(ctx, *entry);
+    case type_kind::object:
+        return class_in(ctx, *entry->ops, nullptr, nullptr);
+    case type_kind::text_vector:
+    case type_kind::code_vector:
+    case type_kind::object_vector:
+        return read_vector(ctx, *entry, type);
+    case type_kind::envelope:
+        return envelope_in(ctx, type, nullptr, nullptr);
+    case type_kind::request:
+    case type_kind::response:
+        return read_wrapper(ctx, *entry, type);
+    case type_kind::pointer:
+        return read_pointer(ctx, *entry);
+    case type_kind::none:
+        break;
+    }
+    return nullptr;
+}
+
+namespace {
+
+int type_by_identity(soap *ctx)
+{
+    int type = ctx->element_id[0] ? soap_id_type(ctx, ctx->element_id) : 0;
+    return type ? type : soap_id_type(ctx, ctx->element_href);
+}
+
+int type_of_element(soap *ctx)
+{
+    const char *name = ctx->element_type[0] ? ctx->element_type : ctx->tag;
+    if (const int type = type_by_qname(ctx, type_index, name))
+        return type == TEXT_ID ? CHARS_ID : type; // a text that nobody asked for is read as plain characters
+    return type_by_qname(ctx, element_index, ctx->tag);
+}
+
+// --- writing ---
+
+int write_chars(soap *ctx, const type_entry &entry, const char *tag, int id, char *const *text, int type)
+{
+    return soap_string_element_out(ctx, tag, id, text, entry.xml_name, type);
+}
+
+int write_vector(soap *ctx, const type_entry &entry, const char *tag, int id, const void *vector)
+{
+    const std::size_t length = entry.vector->length(vector);
+    for (std::size_t i = 0; i < length; ++i) {
+        void *item = const_cast<void *>(entry.vector->item(vector, i));
+        if (item && soap_write_element(ctx, item, tag, id, entry.item))
+            return ctx->error;
+    }
+    return 0;
+}
+
+int write_wrapper(soap *ctx, const type_entry &entry, const void *record)
+{
+    const void *object = *static_cast<void *const *>(record);
+    return class_pointer_out(ctx, *type_entries[entry.item].ops, entry.element, -1, object, "");
+}
+
+int write_pointer(soap *ctx, const type_entry &entry, const char *tag, int id, const void *place)
+{
+    const void *object = *static_cast<void *const *>(place);
+    return class_pointer_out(ctx, *type_entries[entry.item].ops, tag, id, object, "");
+}
+
+} // namespace
+
+} // namespace binding
+
+using namespace binding;
+
+void *soap_read_element(soap *ctx, int *type)
+{
+    *type = 0;
+    if (soap_element_head_read(ctx))
+        return nullptr;
+    *type = type_by_identity(ctx);
+    if (*type < 1 || *type > DISPATCH_ID_MAX)
+        *type = type_of_element(ctx);
+    if (*type == 0) {
+        ctx->error = SOAP_TAG_MISMATCH;
+        return nullptr;
+    }
+    return read_by_type(ctx, *type);
+}
+
+int soap_write_element(soap *ctx, void *object, const char *tag, int id, int type)
+{
+    const type_entry *entry = dispatched(type);
+    if (!entry)
+        return 0;
+    const char *name = tag ? tag : entry->xml_name;
+    switch (entry->kind) {
+    case type_kind::chars:
+        return write_chars(ctx, *entry, name, id, reinterpret_cast<char *const *>(&object), type);
+    case type_kind::text:
+        return write_text_element(ctx, name, soap_element_id(ctx, id, object, type),
+                                  *static_cast<const std::string *>(object));
+    case type_kind::simple:
+        return entry->simple->out(ctx, name, id, object, entry->xml_name);
+    case type_kind::enumeration:
+        return write_code(ctx, name, soap_element_id(ctx, id, object, type),
+                          *static_cast<std::int32_t *>(object), *entry->names);
+    case type_kind::object:
+        return entry->ops->out(object, ctx, name, id, entry->xml_name);
+    case type_kind::text_vector:
+    case type_kind::code_vector:
+    case type_kind::object_vector:
+        return write_vector(ctx, *entry, name, id, object);
+    case type_kind::envelope:
+        return envelope_out(ctx, type, name, id, object);
+    case type_kind::request:
+    case type_kind::response:
+        return write_wrapper(ctx, *entry, object);
+    case type_kind::pointer:
+        return write_pointer(ctx, *entry, name, id, object);
+    case type_kind::none:
+        break;
+    }
+    return 0;
+}
+
+void soap_mark_object(soap *ctx, void *object, int type)
+{
+    const type_entry *entry = dispatched(type);
+    if (!entry || !object)
+        return;
+    switch (entry->kind) {
+    case type_kind::object:
+        return entry->ops->mark(object, ctx);
+    case type_kind::object_vector:
+        for (std::size_t i = 0; i < entry->vector->length(object); ++i)
+            class_pointer_mark(ctx, *type_entries[entry->item].ops, entry->vector->item(object, i));
+        return;
+    case type_kind::request:
+    case type_kind::response:
+    case type_kind::pointer:
+        return class_pointer_mark(ctx, *type_entries[entry->item].ops, *static_cast<void **>(object));
+    case type_kind::envelope:
+        return envelope_mark(ctx, type, object);
+    case type_kind::chars:
+    case type_kind::text:
+    case type_kind::simple:
+    case type_kind::enumeration:
+        mark_plain(ctx, object, type);
+        return;
+    case type_kind::text_vector:
+    case type_kind::code_vector:
+    case type_kind::none:
+        return;
+    }
+}
+
+int soap_read_independents(soap *ctx)
+{
+    if (ctx->soap_version == 1) {
+        for (;;) {
+            int type = 0;
+            if (soap_read_element(ctx, &type))
+                continue;
+            if (ctx->error || soap_element_skip(ctx))
+                break;
+        }
+    }
+    if (ctx->error == SOAP_NO_TAG || ctx->error < 0)
+        ctx->error = 0;
+    return ctx->error;
+}

@@ -1,0 +1,517 @@
+// envelope.cpp - header, fault and detail of the SOAP envelope: made, written, read, reached by version.
+//
+// Elsewhere: what becomes of a received fault (fault_receive.cpp), texts of errors (engine).
+#include "binding/envelope.h"
+
+#include <new>
+#include <type_traits>
+
+#include <zuv_client_pro/protocol.h>
+#include <zuv_client_pro/soap_envelope.h>
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_identity.h>
+#include <zuv_client_pro/soap_io.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_primitive.h>
+#include <zuv_client_pro/soap_registry.h>
+#include <zuv_client_pro/soap_xml.h>
+#include <zuv_client_pro/type_ids.h>
+
+#include "binding/member_read.h"
+#include "binding/member_write.h"
+#include "law_protocol.h"
+
+namespace binding {
+
+namespace {
+
+// Calls `use` with a null pointer of the record's type.
+template <class Use> auto with_record(int type_id, Use use)
+{
+    switch (type_id) {
+    case SOAP_TYPE_SOAP_ENV__Header:
+        return use(static_cast<SOAP_ENV__Header *>(nullptr));
+    case SOAP_TYPE_SOAP_ENV__Code:
+        return use(static_cast<SOAP_ENV__Code *>(nullptr));
+    case SOAP_TYPE_SOAP_ENV__Detail:
+        return use(static_cast<SOAP_ENV__Detail *>(nullptr));
+    case SOAP_TYPE_SOAP_ENV__Reason:
+        return use(static_cast<SOAP_ENV__Reason *>(nullptr));
+    default:
+        return use(static_cast<SOAP_ENV__Fault *>(nullptr));
+    }
+}
+
+template <class R> constexpr int id_of();
+template <> constexpr int id_of<SOAP_ENV__Header>()
+{
+    return SOAP_TYPE_SOAP_ENV__Header;
+}
+template <> constexpr int id_of<SOAP_ENV__Code>()
+{
+    return SOAP_TYPE_SOAP_ENV__Code;
+}
+template <> constexpr int id_of<SOAP_ENV__Detail>()
+{
+    return SOAP_TYPE_SOAP_ENV__Detail;
+}
+template <> constexpr int id_of<SOAP_ENV__Reason>()
+{
+    return SOAP_TYPE_SOAP_ENV__Reason;
+}
+template <> constexpr int id_of<SOAP_ENV__Fault>()
+{
+    return SOAP_TYPE_SOAP_ENV__Fault;
+}
+
+template <class R> R *make(soap *ctx)
+{
+    return static_cast<R *>(soap_instantiate(ctx, id_of<R>(), nullptr, nullptr, nullptr));
+}
+
+// --- reading: a loop over the members of a record, each taken once ---
+
+// The members of one record while it is read. `taken` remembers which were met.
+struct record_reader {
+    soap *ctx;
+    std::uint64_t taken = 0;
+    int next = 0;
+    bool hit = false;
+
+    template <class Read> void member(Read read)
+    {
+        const std::uint64_t bit = std::uint64_t{1} << next++;
+        if (hit || (taken & bit) || (ctx->error != SOAP_TAG_MISMATCH && ctx->error != SOAP_NO_TAG))
+            return;
+        if (read()) {
+            taken |= bit;
+            hit = true;
+        }
+    }
+};
+
+bool chars_in(soap *ctx, const char *tag, char **place, int form)
+{
+    return soap_string_element_in(ctx, tag, place, nullptr, SOAP_TYPE_chars_xsd__string, form, -1, -1) !=
+           nullptr;
+}
+
+template <class R> bool record_in(soap *ctx, const char *tag, R **place);
+
+void try_members(record_reader &r, SOAP_ENV__Header &header)
+{
+    r.member([&] {
+        return class_pointer_in(r.ctx, ops_of<protocol__Header>, "protocol:header",
+                                reinterpret_cast<void **>(&header.header));
+    });
+}
+
+void try_members(record_reader &r, SOAP_ENV__Code &code)
+{
+    r.member([&] { return chars_in(r.ctx, "SOAP-ENV:Value", &code.Value, 2); });
+    r.member([&] { return record_in(r.ctx, "SOAP-ENV:Subcode", &code.Subcode); });
+}
+
+void try_members(record_reader &r, SOAP_ENV__Reason &reason)
+{
+    r.member([&] { return chars_in(r.ctx, "SOAP-ENV:Text", &reason.Text, 1); });
+}
+
+void try_members(record_reader &r, SOAP_ENV__Detail &detail)
+{
+#define TRY_FAULT(name)                                                                                      \
+    r.member([&] {                                                                                           \
+        return class_pointer_in(r.ctx, ops_of<protocol__##name>, law<protocol__##name>::xml_type,            \
+                                reinterpret_cast<void **>(&detail.name));                                    \
+    });
+    SOAP_DETAIL_FAULTS(TRY_FAULT)
+#undef TRY_FAULT
+    r.member([&] {
+        if (r.ctx->error != SOAP_TAG_MISMATCH)
+            return false;
+        detail.fault = soap_read_element(r.ctx, &detail.__type);
+        return detail.fault != nullptr;
+    });
+    r.member([&] { return soap_raw_element_in(r.ctx, "-any", &detail.__any) != nullptr; });
+}
+
+void try_members(record_reader &r, SOAP_ENV__Fault &fault)
+{
+    r.member([&] { return chars_in(r.ctx, "faultcode", &fault.faultcode, 2); });
+    r.member([&] { return chars_in(r.ctx, "faultstring", &fault.faultstring, 1); });
+    r.member([&] { return chars_in(r.ctx, "faultactor", &fault.faultactor, 1); });
+    r.member([&] { return record_in(r.ctx, "detail", &fault.detail); });
+    r.member([&] { return record_in(r.ctx, "SOAP-ENV:Code", &fault.Code); });
+    r.member([&] { return record_in(r.ctx, "SOAP-ENV:Reason", &fault.Reason); });
+    r.member([&] { return chars_in(r.ctx, "SOAP-ENV:Node", &fault.Node, 1); });
+    r.member([&] { return chars_in(r.ctx, "SOAP-ENV:Role", &fault.Role, 1); });
+    r.member([&] { return record_in(r.ctx, "SOAP-ENV:Detail", &fault.Detail); });
+}
+
+template <class R> bool read_members_of(soap *ctx, R &record)
+{
+    record_reader reader{ctx};
+    for (;;) {
+        ctx->error = SOAP_TAG_MISMATCH;
+        reader.next = 0;
+        reader.hit = false;
+        try_members(reader, record);
+        if (reader.hit)
+            continue;
+        if (ctx->error == SOAP_TAG_MISMATCH)
+            ctx->error = soap_element_skip(ctx);
+        if (ctx->error == SOAP_NO_TAG)
+            return true;
+        if (ctx->error)
+            return false;
+    }
+}
+
+template <class R> R *record_content_in(soap *ctx, const char *tag, R *record)
+{
+    if (!ctx->has_body)
+        return record;
+    if (!read_members_of(ctx, *record) || soap_element_in_end(ctx, tag))
+        return nullptr;
+    return record;
+}
+
+template <class R> bool record_in(soap *ctx, const char *tag, R **place)
+{
+    if (soap_element_in_begin(ctx, tag, 1, nullptr))
+        return false;
+    R *record = make<R>(ctx);
+    *place = record;
+    return record && record_content_in(ctx, tag, record);
+}
+
+// --- writing ---
+
+int chars_out(soap *ctx, const char *tag, char *text)
+{
+    if (!text)
+        return 0;
+    if (soap_element_out_begin(ctx, tag, -1, "") || soap_text_write(ctx, text, 0))
+        return ctx->error;
+    return soap_element_out_end(ctx, tag);
+}
+
+int code_out(soap *ctx, const char *tag, const char *code)
+{
+    if (!code)
+        return 0;
+    const char *mapped = soap_qname_write_map(ctx, code);
+    if (soap_element_out_begin(ctx, tag, -1, "") || soap_text_write(ctx, mapped, 0))
+        return ctx->error;
+    return soap_element_out_end(ctx, tag);
+}
+
+template <class R> int record_out(soap *ctx, const char *tag, const R *record);
+
+int members_out(soap *ctx, const SOAP_ENV__Header &header)
+{
+    ctx->must_understand = 0;
+    return header.header
+               ? class_pointer_out(ctx, ops_of<protocol__Header>, "protocol:header", -1, header.header, "")
+               : write_absent(ctx, "protocol:header", occurs::optional);
+}
+
+int members_out(soap *ctx, const SOAP_ENV__Code &code)
+{
+    if (code_out(ctx, "SOAP-ENV:Value", code.Value))
+        return ctx->error;
+    return record_out(ctx, "SOAP-ENV:Subcode", code.Subcode);
+}
+
+int members_out(soap *ctx, const SOAP_ENV__Reason &reason)
+{
+    if (!reason.Text)
+        return 0;
+    if (ctx->soap_version == 2 && soap_attr_set(ctx, "xml:lang", ctx->language ? ctx->language : "en", 1))
+        return ctx->error;
+    return chars_out(ctx, "SOAP-ENV:Text", reason.Text);
+}
+
+int members_out(soap *ctx, const SOAP_ENV__Detail &detail)
+{
+    if (detail.__any && soap_send_text(ctx, detail.__any))
+        return ctx->error;
+#define PUT_FAULT(name)                                                                                      \
+    if (detail.name && class_pointer_out(ctx, ops_of<protocol__##name>, law<protocol__##name>::xml_type, -1, \
+                                         detail.name, ""))                                                   \
+        return ctx->error;
+    SOAP_DETAIL_FAULTS(PUT_FAULT)
+#undef PUT_FAULT
+    return detail.fault ? soap_write_element(ctx, detail.fault, nullptr, -1, detail.__type) : 0;
+}
+
+int members_out(soap *ctx, const SOAP_ENV__Fault &fault)
+{
+    if (code_out(ctx, "faultcode", fault.faultcode) || chars_out(ctx, "faultstring", fault.faultstring) ||
+        chars_out(ctx, "faultactor", fault.faultactor) || record_out(ctx, "detail", fault.detail) ||
+        record_out(ctx, "SOAP-ENV:Code", fault.Code) || record_out(ctx, "SOAP-ENV:Reason", fault.Reason) ||
+        chars_out(ctx, "SOAP-ENV:Node", fault.Node) || chars_out(ctx, "SOAP-ENV:Role", fault.Role))
+        return ctx->error;
+    return record_out(ctx, "SOAP-ENV:Detail", fault.Detail);
+}
+
+template <class R> int record_out(soap *ctx, const char *tag, const R *record)
+{
+    if (!record)
+        return 0;
+    if (soap_element_out_begin(ctx, tag, 0, "") || members_out(ctx, *record))
+        return ctx->error;
+    return soap_element_out_end(ctx, tag);
+}
+
+// --- marking ---
+
+void mark_detail(soap *ctx, const SOAP_ENV__Detail *detail)
+{
+    if (!detail)
+        return;
+#define MARK_FAULT(name) class_pointer_mark(ctx, ops_of<protocol__##name>, detail->name);
+    SOAP_DETAIL_FAULTS(MARK_FAULT)
+#undef MARK_FAULT
+    soap_mark_object(ctx, detail->fault, detail->__type);
+}
+
+void mark_record(soap *ctx, const SOAP_ENV__Header &header)
+{
+    class_pointer_mark(ctx, ops_of<protocol__Header>, header.header);
+}
+void mark_record(soap *, const SOAP_ENV__Code &) {}
+void mark_record(soap *, const SOAP_ENV__Reason &) {}
+void mark_record(soap *ctx, const SOAP_ENV__Detail &detail)
+{
+    mark_detail(ctx, &detail);
+}
+void mark_record(soap *ctx, const SOAP_ENV__Fault &fault)
+{
+    mark_detail(ctx, fault.detail);
+    mark_detail(ctx, fault.Detail);
+}
+
+} // namespace
+
+std::size_t envelope_size(int type_id)
+{
+    return with_record(type_id, [](auto *r) { return sizeof *r; });
+}
+
+void *envelope_create(int type_id, int count)
+{
+    return with_record(type_id, [count](auto *r) -> void * {
+        using R = std::remove_pointer_t<decltype(r)>;
+        if (count < 0)
+            return new (std::nothrow) R();
+        return new (std::nothrow) R[static_cast<std::size_t>(count)]();
+    });
+}
+
+void envelope_destroy(int type_id, void *record, int count)
+{
+    with_record(type_id, [=](auto *r) {
+        using R = std::remove_pointer_t<decltype(r)>;
+        if (count < 0)
+            delete static_cast<R *>(record);
+        else
+            delete[] static_cast<R *>(record);
+    });
+}
+
+void *envelope_in(soap *ctx, int type_id, const char *tag, void *record)
+{
+    return with_record(type_id, [=](auto *r) -> void * {
+        using R = std::remove_pointer_t<decltype(r)>;
+        R *made = static_cast<R *>(record);
+        if (!made) {
+            return record_in(ctx, tag, &made) ? made : nullptr;
+        }
+        return soap_element_in_begin(ctx, tag, 0, nullptr) ? nullptr : record_content_in(ctx, tag, made);
+    });
+}
+
+int envelope_out(soap *ctx, int type_id, const char *tag, int, const void *record)
+{
+    return with_record(type_id, [=](auto *r) {
+        using R = std::remove_pointer_t<decltype(r)>;
+        return record_out(ctx, tag, static_cast<const R *>(record));
+    });
+}
+
+void envelope_mark(soap *ctx, int type_id, const void *record)
+{
+    with_record(type_id, [=](auto *r) {
+        using R = std::remove_pointer_t<decltype(r)>;
+        mark_record(ctx, *static_cast<const R *>(record));
+    });
+}
+
+} // namespace binding
+
+using namespace binding;
+
+// --- the header's turn ---
+
+void soap_header_record(soap *ctx)
+{
+    if (!ctx->header)
+        ctx->header = make<SOAP_ENV__Header>(ctx);
+}
+
+void soap_mark_header(soap *ctx)
+{
+    if (ctx->header)
+        mark_record(ctx, *ctx->header);
+}
+
+int soap_header_put(soap *ctx)
+{
+    if (!ctx->header)
+        return 0;
+    ctx->message_part = PART_HEADER;
+    if (record_out(ctx, "SOAP-ENV:Header", ctx->header))
+        return ctx->error;
+    ctx->message_part = PART_AFTER_HEADER;
+    return 0;
+}
+
+int soap_header_get(soap *ctx)
+{
+    ctx->message_part = PART_HEADER;
+    SOAP_ENV__Header *header = nullptr;
+    if (!record_in(ctx, "SOAP-ENV:Header", &header)) {
+        header = nullptr;
+        if (ctx->error == SOAP_TAG_MISMATCH)
+            ctx->error = 0;
+    }
+    ctx->header = header;
+    ctx->message_part = PART_AFTER_HEADER;
+    if (ctx->error == 0 && ctx->on_soap_header)
+        ctx->error = ctx->on_soap_header(ctx);
+    return ctx->error;
+}
+
+// --- the fault's turn ---
+
+void soap_mark_fault(soap *ctx)
+{
+    if (ctx->fault)
+        mark_record(ctx, *ctx->fault);
+}
+
+int soap_fault_put(soap *ctx)
+{
+    soap_fault_record(ctx);
+    return ctx->fault ? record_out(ctx, "SOAP-ENV:Fault", ctx->fault) : ctx->error;
+}
+
+int soap_fault_get(soap *ctx)
+{
+    SOAP_ENV__Fault *fault = nullptr;
+    if (record_in(ctx, "SOAP-ENV:Fault", &fault))
+        ctx->error = 0;
+    else
+        fault = nullptr;
+    ctx->fault = fault;
+    return ctx->error;
+}
+
+// --- accessors ---
+
+void soap_fault_record(soap *ctx)
+{
+    if (!ctx->fault)
+        ctx->fault = make<SOAP_ENV__Fault>(ctx);
+    if (!ctx->fault || ctx->soap_version != 2)
+        return;
+    if (!ctx->fault->Code)
+        ctx->fault->Code = make<SOAP_ENV__Code>(ctx);
+    if (!ctx->fault->Reason)
+        ctx->fault->Reason = make<SOAP_ENV__Reason>(ctx);
+}
+
+namespace {
+
+// Stands in where memory ran out: written and never read.
+const char **thrown_away()
+{
+    thread_local const char *place;
+    place = nullptr;
+    return &place;
+}
+
+const char **place_of(char **text)
+{
+    return const_cast<const char **>(text);
+}
+
+SOAP_ENV__Detail *detail_record(soap *ctx)
+{
+    soap_fault_record(ctx);
+    if (!ctx->fault)
+        return nullptr;
+    SOAP_ENV__Detail *&detail = ctx->soap_version == 1 ? ctx->fault->detail : ctx->fault->Detail;
+    if (!detail)
+        detail = make<SOAP_ENV__Detail>(ctx);
+    return detail;
+}
+
+} // namespace
+
+const char **soap_fault_code_field(soap *ctx)
+{
+    soap_fault_record(ctx);
+    if (!ctx->fault)
+        return thrown_away();
+    if (ctx->soap_version != 2)
+        return place_of(&ctx->fault->faultcode);
+    return ctx->fault->Code ? place_of(&ctx->fault->Code->Value) : thrown_away();
+}
+
+const char **soap_fault_subcode_field(soap *ctx)
+{
+    soap_fault_record(ctx);
+    if (!ctx->fault)
+        return thrown_away();
+    if (ctx->soap_version != 2)
+        return place_of(&ctx->fault->faultcode);
+    if (!ctx->fault->Code)
+        return thrown_away();
+    if (!ctx->fault->Code->Subcode)
+        ctx->fault->Code->Subcode = make<SOAP_ENV__Code>(ctx);
+    return ctx->fault->Code->Subcode ? place_of(&ctx->fault->Code->Subcode->Value) : thrown_away();
+}
+
+const char **soap_fault_string_field(soap *ctx)
+{
+    soap_fault_record(ctx);
+    if (!ctx->fault)
+        return thrown_away();
+    if (ctx->soap_version != 2)
+        return place_of(&ctx->fault->faultstring);
+    return ctx->fault->Reason ? place_of(&ctx->fault->Reason->Text) : thrown_away();
+}
+
+const char **soap_fault_detail_field(soap *ctx)
+{
+    SOAP_ENV__Detail *detail = detail_record(ctx);
+    return detail ? place_of(&detail->__any) : thrown_away();
+}
+
+const char *soap_fault_subcode_value(soap *ctx)
+{
+    const SOAP_ENV__Fault *fault = ctx->fault;
+    if (ctx->soap_version != 2 || !fault || !fault->Code || !fault->Code->Subcode)
+        return nullptr;
+    return fault->Code->Subcode->Value;
+}
+
+const char *soap_fault_detail_value(soap *ctx)
+{
+    if (!ctx->fault)
+        return nullptr;
+    const SOAP_ENV__Detail *detail = ctx->soap_version == 1 ? ctx->fault->detail : ctx->fault->Detail;
+    return detail ? detail->__any : nullptr;
+}

@@ -1,0 +1,75 @@
+// fault_receive.cpp - the end of a call whose response did not read as expected: a fault, or no message at
+// all.
+#include <cstring>
+
+#include <zuv_client_pro/soap_envelope.h>
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_io.h>
+#include <zuv_client_pro/soap_tcp.h>
+#include <zuv_client_pro/soap_xml.h>
+
+namespace {
+
+struct code_row {
+    const char *code;
+    int error;
+};
+constexpr code_row CODES[] = {{"SOAP-ENV:Server", SOAP_SERVER_FAULT},
+                              {"SOAP-ENV:Receiver", SOAP_SERVER_FAULT},
+                              {"SOAP-ENV:Client", SOAP_CLIENT_FAULT},
+                              {"SOAP-ENV:Sender", SOAP_CLIENT_FAULT},
+                              {"SOAP-ENV:MustUnderstand", SOAP_MUST_UNDERSTAND},
+                              {"SOAP-ENV:VersionMismatch", SOAP_VERSION_MISMATCH}};
+
+// The reader has put the table's prefix in the place of the peer's, where it knew it.
+bool is_code(soap *ctx, const char *code, const char *asked)
+{
+    return std::strcmp(code, asked) == 0 || soap_tag_compare(ctx, code, asked) == 0;
+}
+
+int error_of_fault(soap *ctx)
+{
+    const char *code = *soap_fault_code_field(ctx);
+    for (const code_row &row : CODES) {
+        if (code && is_code(ctx, code, row.code))
+            return row.error;
+    }
+    return SOAP_FAULT;
+}
+
+bool may_be_fault(const soap *ctx)
+{
+    return ctx->error == SOAP_NO_TAG || (ctx->error == SOAP_TAG_MISMATCH && ctx->nesting_level == 2);
+}
+
+// No fault could be read: the error of the response stands, told as a fault of the sender.
+int keep_error(soap *ctx, int error)
+{
+    *soap_fault_code_field(ctx) = ctx->soap_version == 2 ? "SOAP-ENV:Sender" : "SOAP-ENV:Client";
+    ctx->error = error;
+    soap_fault_text_fill(ctx);
+    return error;
+}
+
+} // namespace
+
+int soap_fault_receive(soap *ctx, int check)
+{
+    int result = ctx->error;
+    if (!check && !may_be_fault(ctx))
+        return result;
+    ctx->error = 0;
+    if (soap_fault_get(ctx)) {
+        if (check && ctx->error == SOAP_TAG_MISMATCH && ctx->nesting_level == 2)
+            return ctx->error = 0;
+        result = keep_error(ctx, result);
+    } else {
+        result = error_of_fault(ctx);
+        ctx->error = 0;
+        if (soap_body_in_end(ctx) == 0)
+            soap_envelope_in_end(ctx);
+    }
+    soap_receive_finish(ctx);
+    ctx->error = result;
+    return soap_socket_release(ctx);
+}

@@ -1,0 +1,300 @@
+// member_read.cpp - leaf operations of reading: texts, enumerations, booleans, items of vectors.
+//
+// Elsewhere: numbers (codec), whole objects (class_ops.cpp).
+#include "binding/member_read.h"
+
+#include <cstring>
+
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_primitive.h>
+#include <zuv_client_pro/soap_registry.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include "binding/registry.h"
+#include "codec/xml_text.h"
+
+namespace binding {
+
+namespace {
+
+constexpr int TEXT_TYPE_ID = 8; // all texts held by pointer are of one type to the identity tables
+constexpr int BOOLEAN_TYPE_ID = 13;
+
+bool ends(soap *ctx, const char *tag, bool body)
+{
+    return !body || soap_element_in_end(ctx, tag) == 0;
+}
+
+bool is_reference(const soap *ctx)
+{
+    return ctx->element_href[0] == '#';
+}
+
+bool mismatch(soap *ctx)
+{
+    ctx->error = SOAP_TYPE_MISMATCH;
+    return false;
+}
+
+bool strict(const soap *ctx)
+{
+    return (ctx->mode & MODE_STRICT) != 0;
+}
+
+// A word of the enumeration, or a number. Numbers past the words are refused in strict mode.
+bool parse_code(soap *ctx, const char *text, const enum_table &names, std::int32_t *code)
+{
+    if (const soap_code_row *row = soap_name_to_row(names.codes, text)) {
+        *code = static_cast<std::int32_t>(row->code);
+        return true;
+    }
+    std::int64_t number = 0;
+    if (soap_long_parse(ctx, text, &number))
+        return false;
+    if (strict(ctx) && static_cast<std::uint64_t>(number) >= names.count)
+        return mismatch(ctx);
+    *code = static_cast<std::int32_t>(number);
+    return true;
+}
+
+bool parse_boolean(soap *ctx, const char *text, bool *value)
+{
+    if (std::strcmp(text, "true") == 0 || std::strcmp(text, "false") == 0) {
+        *value = text[0] == 't';
+        return true;
+    }
+    std::int64_t number = 0;
+    if (soap_long_parse(ctx, text, &number))
+        return false;
+    if (number != 0 && number != 1)
+        return mismatch(ctx);
+    *value = number == 1;
+    return true;
+}
+
+// Text of the simple element just begun, up to and with its end tag; null on failure. The text is in
+// scratch_text.
+template <class Parse> bool read_simple(soap *ctx, const char *tag, Parse parse)
+{
+    const bool body = ctx->has_body != 0;
+    const char *text = soap_simple_value_read(ctx);
+    return text && parse(text) && ends(ctx, tag, body);
+}
+
+bool begins(soap *ctx, const char *tag, const char *type)
+{
+    return soap_element_in_begin(ctx, tag, 0, type) == 0;
+}
+
+bool refers(soap *ctx, const char *tag, void *place, std::size_t size, int type_id, bool body)
+{
+    return soap_object_forward(ctx, ctx->element_href, place, 0, type_id, 0, size, 0, nullptr) &&
+           ends(ctx, tag, body);
+}
+
+bool registers(soap *ctx, void *object, int type_id, std::size_t size)
+{
+    return !ctx->element_id[0] || soap_object_register(ctx, ctx->element_id, object, type_id, size, 0,
+                                                       nullptr, nullptr, nullptr) != nullptr;
+}
+
+// The element just begun is nil or a reference: the place becomes null, or is filled when the object is
+// known.
+bool refers_pointer(soap *ctx, const char *tag, void **place, int type_id, std::size_t size)
+{
+    const bool body = ctx->has_body != 0;
+    return soap_object_forward_ptr(ctx, ctx->element_href, place, type_id, size, 0) && ends(ctx, tag, body);
+}
+
+bool refers_item(soap *ctx, const char *tag, void *vector, std::size_t index, int item_type, std::size_t size,
+                 int vector_type)
+{
+    const bool body = ctx->has_body != 0;
+    return soap_object_forward(ctx, ctx->element_href, vector, index, item_type, vector_type, size, 0,
+                               soap_insert_into_vector) &&
+           ends(ctx, tag, body);
+}
+
+} // namespace
+
+bool out_of_memory(soap *ctx)
+{
+    ctx->error = SOAP_OUT_OF_MEMORY;
+    return false;
+}
+
+// --- text ---
+
+bool read_text_content(soap *ctx, std::string &text)
+{
+    const char *bytes = nullptr;
+    std::size_t length = 0;
+    if (!xml_text_in_place(ctx, &bytes, &length)) {
+        bytes = soap_text_read(ctx, &length);
+        if (!bytes)
+            return false;
+    }
+    try {
+        text.assign(bytes, length);
+    } catch (const std::bad_alloc &) {
+        return out_of_memory(ctx);
+    }
+    return true;
+}
+
+bool read_text_pointer(soap *ctx, const char *tag, void **place)
+{
+    if (soap_element_in_begin(ctx, tag, 1, nullptr))
+        return false;
+    *place = nullptr;
+    if (ctx->null_flag || is_reference(ctx))
+        return refers_pointer(ctx, tag, place, TEXT_TYPE_ID, sizeof(std::string));
+    const bool body = ctx->has_body != 0;
+    auto *text = static_cast<std::string *>(soap_instantiate(ctx, TEXT_TYPE_ID, nullptr, nullptr, nullptr));
+    if (!text || !registers(ctx, text, TEXT_TYPE_ID, sizeof(std::string)))
+        return false;
+    if (body && !read_text_content(ctx, *text))
+        return false;
+    *place = text;
+    return ends(ctx, tag, body);
+}
+
+bool read_text_value(soap *ctx, const char *tag, std::string &value)
+{
+    if (soap_element_in_begin(ctx, tag, 1, nullptr))
+        return false;
+    value.clear();
+    const bool body = ctx->has_body != 0;
+    if (body && !ctx->null_flag && !read_text_content(ctx, value))
+        return false;
+    return ends(ctx, tag, body);
+}
+
+bool read_vector_item_text(soap *ctx, const char *tag, std::vector<std::string> &vector, int vector_type)
+{
+    if (soap_element_in_begin(ctx, tag, 1, nullptr))
+        return false;
+    if (!vector_append<std::string>(&vector, nullptr))
+        return out_of_memory(ctx);
+    if (is_reference(ctx))
+        return refers_item(ctx, tag, &vector, vector.size() - 1, TEXT_TYPE_ID, sizeof(std::string),
+                           vector_type);
+    const bool body = ctx->has_body != 0;
+    std::string *shared = nullptr; // an item with an id needs a place that stays: the vector moves its items
+    if (ctx->element_id[0]) {
+        shared = static_cast<std::string *>(soap_instantiate(ctx, TEXT_TYPE_ID, nullptr, nullptr, nullptr));
+        if (!shared || !registers(ctx, shared, TEXT_TYPE_ID, sizeof(std::string)))
+            return false;
+    }
+    if (body && !ctx->null_flag && !read_text_content(ctx, vector.back()))
+        return false;
+    if (shared && !copy_text(ctx, *shared, vector.back()))
+        return false;
+    return ends(ctx, tag, body);
+}
+
+bool copy_text(soap *ctx, std::string &target, const std::string &source)
+{
+    try {
+        target = source;
+    } catch (const std::bad_alloc &) {
+        return out_of_memory(ctx);
+    }
+    return true;
+}
+
+// --- enumerations ---
+
+bool read_code_value(soap *ctx, const char *tag, std::int32_t *place, const enum_table &names)
+{
+    if (!begins(ctx, tag, names.xml_type) || !registers(ctx, place, names.type_id, sizeof *place))
+        return false;
+    if (is_reference(ctx))
+        return refers(ctx, tag, place, sizeof *place, names.type_id, ctx->has_body != 0);
+    return read_simple(ctx, tag, [&](const char *text) { return parse_code(ctx, text, names, place); });
+}
+
+bool read_code_pointer(soap *ctx, const char *tag, void **place, const enum_table &names)
+{
+    if (soap_element_in_begin(ctx, tag, 1, names.xml_type))
+        return false;
+    *place = nullptr;
+    if (ctx->null_flag || is_reference(ctx))
+        return refers_pointer(ctx, tag, place, names.type_id, sizeof(std::int32_t));
+    auto *code = static_cast<std::int32_t *>(soap_block_alloc(ctx, sizeof(std::int32_t)));
+    if (!code || !registers(ctx, code, names.type_id, sizeof *code))
+        return false;
+    *code = 0;
+    if (!read_simple(ctx, tag, [&](const char *text) { return parse_code(ctx, text, names, code); }))
+        return false;
+    *place = code;
+    return true;
+}
+
+bool read_vector_item_code(soap *ctx, const char *tag, std::int32_t *code, const enum_table &names,
+                           void *vector, std::size_t index, int vector_type)
+{
+    if (!begins(ctx, tag, names.xml_type))
+        return false;
+    *code = 0;
+    if (is_reference(ctx))
+        return refers_item(ctx, tag, vector, index, names.type_id, sizeof *code, vector_type);
+    std::int32_t *shared = nullptr; // as for texts
+    if (ctx->element_id[0]) {
+        shared = static_cast<std::int32_t *>(soap_block_alloc(ctx, sizeof *shared));
+        if (!shared || !registers(ctx, shared, names.type_id, sizeof *shared))
+            return false;
+    }
+    if (!read_simple(ctx, tag, [&](const char *text) { return parse_code(ctx, text, names, code); }))
+        return false;
+    if (shared)
+        *shared = *code;
+    return true;
+}
+
+bool read_code_attribute(soap *ctx, const char *name, bool required, const enum_table &names,
+                         std::int32_t *code, bool *present)
+{
+    const char *text = soap_attr_get(ctx, name, required ? 1 : 0);
+    if (!text)
+        return ctx->error == 0;
+    *present = true;
+    return parse_code(ctx, text, names, code);
+}
+
+// --- booleans and numbers ---
+
+bool read_boolean_value(soap *ctx, const char *tag, bool *place)
+{
+    if (!begins(ctx, tag, "xsd:boolean") || !registers(ctx, place, BOOLEAN_TYPE_ID, sizeof *place))
+        return false;
+    if (is_reference(ctx)) {
+        const bool body = ctx->has_body != 0;
+        return soap_object_forward(ctx, ctx->element_href, place, 0, BOOLEAN_TYPE_ID, 0, sizeof *place, 0,
+                                   soap_copy_bytes) &&
+               ends(ctx, tag, body);
+    }
+    return read_simple(ctx, tag, [&](const char *text) { return parse_boolean(ctx, text, place); });
+}
+
+bool read_number_pointer(soap *ctx, const char *tag, void **place, int type_id)
+{
+    const simple_ops &ops = *type_entries[type_id].simple;
+    if (soap_element_in_begin(ctx, tag, 1, nullptr))
+        return false;
+    *place = nullptr;
+    if (ctx->null_flag || is_reference(ctx))
+        return refers_pointer(ctx, tag, place, type_id, ops.size);
+    soap_tag_unread(ctx);
+    *place = ops.in(ctx, tag, nullptr, ops.xml_type);
+    return *place != nullptr;
+}
+
+bool read_number_value(soap *ctx, const char *tag, void *place, int type_id)
+{
+    const simple_ops &ops = *type_entries[type_id].simple;
+    return ops.in(ctx, tag, place, ops.xml_type) != nullptr;
+}
+
+} // namespace binding

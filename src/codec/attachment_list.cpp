@@ -1,0 +1,76 @@
+// attachment_list.cpp - the attachments of a message: hosts add them, their total length is known ahead.
+//
+// Elsewhere: how they go out and come in (dime.cpp, mime.cpp), values that refer to one (attachment_refs.cpp,
+// attachment_value.cpp).
+#include <cstring>
+
+#include <zuv_client_pro/soap_attachment.h>
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_memory.h>
+
+#include "codec/dime.h"
+#include "codec/mime.h"
+
+soap_attachment *soap_attachment_add(soap *ctx, soap_attachment **first, soap_attachment **last,
+                                     char *content, std::size_t size)
+{
+    auto *record = static_cast<soap_attachment *>(soap_block_alloc(ctx, sizeof(soap_attachment)));
+    if (record == nullptr)
+        return nullptr;
+    *record = {};
+    record->content = content;
+    record->size = size;
+    if (*first == nullptr) // `last` may still name a record of another message then
+        *first = record;
+    else
+        (*last)->next = record;
+    *last = record;
+    return record;
+}
+
+int soap_dime_attach(soap *ctx, char *content, std::size_t size, const char *type, const char *id,
+                     unsigned short option_type, const char *option_text)
+{
+    char *options = nullptr;
+    if (option_text != nullptr) {
+        options = soap_dime_options_make(ctx, option_type, option_text);
+        if (options == nullptr)
+            return ctx->error;
+    }
+    soap_attachment *record = soap_attachment_add(ctx, &ctx->dime.first, &ctx->dime.last, content, size);
+    if (record == nullptr)
+        return ctx->error = SOAP_OUT_OF_MEMORY;
+    record->id = id;
+    record->type = type;
+    record->options = options;
+    return SOAP_OK;
+}
+
+int soap_mime_attach(soap *ctx, char *content, std::size_t size, int encoding, const char *type,
+                     const char *id, const char *location, const char *description)
+{
+    soap_attachment *record = soap_attachment_add(ctx, &ctx->mime.first, &ctx->mime.last, content, size);
+    if (record == nullptr)
+        return ctx->error = SOAP_OUT_OF_MEMORY;
+    record->encoding = encoding;
+    record->type = type;
+    record->id = id;
+    record->location = location;
+    record->description = description;
+    return SOAP_OK;
+}
+
+std::uint64_t soap_attachments_length(soap *ctx)
+{
+    std::uint64_t length = 0;
+    if (dime_is_written(ctx)) {
+        for (const soap_attachment *record = ctx->dime.first; record != nullptr; record = record->next)
+            length += dime_record_length(*record);
+    }
+    if (mime_is_written(ctx)) {
+        for (const soap_attachment *part = ctx->mime.first; part != nullptr; part = part->next)
+            length += mime_part_length(ctx, *part);
+        length += mime_end_length(ctx);
+    }
+    return length;
+}

@@ -1,0 +1,160 @@
+// attachment_value.cpp - a binary value that stands beside the message: its reference, out and in.
+//
+// Elsewhere: the value's class (binding), inline base64 (the primitives), how references find their
+// attachments (attachment_refs.cpp).
+#include <cstdio>
+#include <cstring>
+
+#include <zuv_client_pro/soap_attachment.h>
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_identity.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include "codec/attachment_refs.h"
+#include "codec/xml_input.h"
+
+namespace {
+
+constexpr int ALL_WRITTEN = -1;  // result: the element stands, or ctx->error tells why not
+constexpr int AS_ATTACHMENT = 3; // mark of a value that goes out as an attachment
+constexpr const char *XOP_TAG = "xop:Include";
+// One attribute carries both: the writer sends a name as it stands.
+constexpr const char *XOP_HREF = "xmlns:xop=\"http://www.w3.org/2004/08/xop/include\" href";
+
+// What a holder of bytes begins with.
+struct byte_holder {
+    unsigned char *content;
+    std::int32_t size;
+};
+
+soap_pointer_record *find_or_add(soap *ctx, const void *address, const void *holder, int dimensions,
+                                 int type_id)
+{
+    soap_pointer_record *record = nullptr;
+    if (soap_array_pointer_find(ctx, address, holder, dimensions, type_id, &record) == 0 &&
+        soap_pointer_add(ctx, address, holder, dimensions, type_id, &record) == 0)
+        return nullptr;
+    return record;
+}
+
+// The id given, or one made of the element's or the table's number.
+const char *reference_text(soap *ctx, const char *id_text, int id, const soap_pointer_record *record)
+{
+    if (id_text != nullptr)
+        return id_text;
+    char text[SOAP_TEXT_SIZE];
+    std::snprintf(text, sizeof text, ctx->dime_id_format, id > 0 ? id : record->id);
+    return soap_string_dup(ctx, text);
+}
+
+int write_reference(soap *ctx, const char *tag, const char *href, const char *type_text)
+{
+    if ((ctx->mode & MODE_MTOM) == 0 || std::strcmp(tag, XOP_TAG) == 0)
+        return soap_element_empty_attr(ctx, tag, 0, "href", href);
+    if (soap_element_out_begin(ctx, tag, 0, type_text) != SOAP_OK ||
+        soap_element_empty_attr(ctx, XOP_TAG, 0, XOP_HREF, href) != SOAP_OK)
+        return ctx->error;
+    return soap_element_out_end(ctx, tag);
+}
+
+// The id under which the attachment goes out: without the scheme, and in brackets for MIME.
+const char *attachment_id(soap *ctx, const char *href, bool bracketed)
+{
+    if (std::strncmp(href, "cid:", 4) != 0)
+        return href;
+    if (!bracketed)
+        return href + 4;
+    const std::size_t length = std::strlen(href + 4);
+    auto *id = static_cast<char *>(soap_block_alloc(ctx, length + 3));
+    if (id == nullptr)
+        return nullptr;
+    id[0] = '<';
+    std::memcpy(id + 1, href + 4, length);
+    std::strcpy(id + 1 + length, ">");
+    return id;
+}
+
+int add_attachment(soap *ctx, const byte_holder &bytes, const char *href, const char *type,
+                   const char *options)
+{
+    const bool mtom = (ctx->mode & MODE_MTOM) != 0;
+    const char *const id = attachment_id(ctx, href, mtom);
+    if (id == nullptr)
+        return ctx->error;
+    soap_attachment *const record = soap_attachment_add(
+        ctx, mtom ? &ctx->mime.first : &ctx->dime.first, mtom ? &ctx->mime.last : &ctx->dime.last,
+        reinterpret_cast<char *>(bytes.content), bytes.size > 0 ? static_cast<std::size_t>(bytes.size) : 0);
+    if (record == nullptr)
+        return ctx->error;
+    record->id = id;
+    record->type = type;
+    record->options = options;
+    record->encoding = MIME_BINARY;
+    return SOAP_OK;
+}
+
+} // namespace
+
+int soap_attachment_ref_out(soap *ctx, const char *tag, int id, const void *address, const void *holder,
+                            const char *id_text, const char *type, const char *options, int dimensions,
+                            const char *type_text, int type_id)
+{
+    const auto *bytes = static_cast<const byte_holder *>(holder);
+    if (address == nullptr || bytes == nullptr || bytes->content == nullptr ||
+        (id_text == nullptr && type == nullptr))
+        return soap_element_ref(ctx, tag, id, address, holder, dimensions, type_text, type_id);
+    soap_pointer_record *const record = find_or_add(ctx, address, holder, dimensions, type_id);
+    if (record == nullptr)
+        return ALL_WRITTEN;
+    const char *const href = reference_text(ctx, id_text, id, record);
+    if (href == nullptr || write_reference(ctx, tag, href, type_text) != SOAP_OK)
+        return ALL_WRITTEN;
+    if ((ctx->mode & MODE_COUNTING) == 0)
+        record->send_mark = AS_ATTACHMENT;
+    // A message that was not counted adds its attachments as it goes out.
+    if (record->count_mark != AS_ATTACHMENT) {
+        record->count_mark = AS_ATTACHMENT;
+        add_attachment(ctx, *bytes, href, type, options);
+    }
+    return ALL_WRITTEN;
+}
+
+int soap_attachment_ref_in(soap *ctx, unsigned char **content, int *size, char **id, char **type,
+                           char **options)
+{
+    *content = nullptr;
+    *size = 0;
+    *type = nullptr;
+    *options = nullptr;
+    *id = soap_string_dup(ctx, ctx->element_href);
+    if (*id == nullptr)
+        return ctx->error;
+    soap_attachment_ref wanted = {};
+    wanted.content = content;
+    wanted.size = size;
+    wanted.type = type;
+    wanted.options = options;
+    wanted.id = *id;
+    return attachment_ref_queue(ctx, wanted);
+}
+
+int soap_xop_include_in(soap *ctx, unsigned char **content, int *size, char **id, char **type, char **options)
+{
+    if (ctx->peeked == 0 && ctx->look_ahead == 0 && input_skip_blanks(ctx) != '<')
+        return SOAP_NO_TAG; // bytes stand in the element itself
+    // The prefix is bound by the element, in no row of the table; so only the local name is compared.
+    const int result = soap_element_in_begin(ctx, ":Include", 0, nullptr);
+    if (result == SOAP_NO_TAG || result == SOAP_TAG_MISMATCH) {
+        ctx->error = SOAP_OK;
+        return result;
+    }
+    if (result != SOAP_OK)
+        return result;
+    const bool has_body = ctx->has_body != 0;
+    if (ctx->element_href[0] == '\0')
+        return ctx->error = SOAP_MIME_HREF;
+    if (soap_attachment_ref_in(ctx, content, size, id, type, options) != SOAP_OK)
+        return ctx->error;
+    return has_body ? soap_element_in_end(ctx, ":Include") : SOAP_OK;
+}

@@ -1,0 +1,14 @@
+// dime.h - what the files of attachments share about DIME records.
+#pragma once
+
+#include <zuv_client_pro/soap_attachment.h>
+
+// True if the message under way sends its attachments as DIME records. In the counting pass of an MTOM
+// message the mode has both forms; MTOM wins.
+inline bool dime_is_written(const soap *ctx)
+{
+    return (ctx->mode & MODE_DIME) != 0 && (ctx->mode & MODE_MTOM) == 0;
+}
+
+// Length of a record on the wire, header and padding included, bytes.
+std::uint64_t dime_record_length(const soap_attachment &record);

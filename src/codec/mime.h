@@ -1,0 +1,16 @@
+// mime.h - what the files of attachments share about MIME parts.
+#pragma once
+
+#include <zuv_client_pro/soap_attachment.h>
+
+// True if the message under way is a MIME message.
+inline bool mime_is_written(const soap *ctx)
+{
+    return (ctx->mode & MODE_MIME) != 0 && ctx->mime.boundary != nullptr;
+}
+
+// Length of a part on the wire, its head and the delimiter ahead of it included, bytes.
+std::uint64_t mime_part_length(soap *ctx, const soap_attachment &part);
+
+// Length of the delimiter that ends the message, bytes.
+std::uint64_t mime_end_length(soap *ctx);

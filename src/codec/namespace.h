@@ -1,0 +1,54 @@
+// namespace.h - the namespace table in use and the prefixes in scope, as the codec sees them.
+//
+// Here: look-ups that the writer and the reader share. Elsewhere: the operations themselves (soap_xml.h).
+#pragma once
+
+#include <cstddef>
+#include <string_view>
+
+#include <zuv_client_pro/soap_xml.h>
+
+constexpr const char *XML_NAMESPACE_URI = "http://www.w3.org/XML/1998/namespace";
+
+// The innermost record of a prefix in scope, or null. Cost does not depend on how many are in scope.
+soap_prefix *xml_prefix_find(const soap *ctx, std::string_view prefix);
+
+// Keeps a copy of `uri` as the one received for a row of the working copy; "" of encoding_style is renewed
+// with it. An equal URI is not copied again. 0 or SOAP_OUT_OF_MEMORY.
+int xml_received_set(soap *ctx, soap_namespace &row, const char *uri);
+void xml_received_drop(soap *ctx, soap_namespace &row);
+
+// The URI that a row stands for in the message under way: the one received, else its own; may be null.
+inline const char *xml_row_uri(const soap_namespace &row)
+{
+    return row.received ? row.received : row.uri;
+}
+
+// The declarations of the table's first rows as one stretch of attributes, ready to send after a root
+// element's name.
+//   rows_max  rows to look at
+//   length    out, bytes
+//   Owned by the context, valid until the table changes. Null if they cannot be had as one stretch: no table,
+//   a URI was received in place of a row's own, a URI needs escapes, or memory ran out.
+const char *xml_root_declarations(soap *ctx, std::size_t rows_max, std::size_t *length);
+
+// Prefixes that wait to be declared by the element now being opened (records of index 1 with a URI).
+std::size_t xml_prefixes_waiting(const soap *ctx);
+// Marks a waiting record as declared by the current element, with whose end it goes out of scope.
+void xml_prefix_declared(soap *ctx, soap_prefix *record);
+
+// True if the blank-separated list names the prefix: by itself, or followed by a colon.
+bool xml_list_names(const char *list, std::string_view prefix);
+
+// Prefix of a QName, empty without a colon.
+inline std::string_view xml_prefix_of(std::string_view name)
+{
+    const auto colon = name.find(':');
+    return colon == std::string_view::npos ? std::string_view() : name.substr(0, colon);
+}
+
+constexpr std::string_view xml_local_part(std::string_view name)
+{
+    const auto colon = name.find(':');
+    return colon == std::string_view::npos ? name : name.substr(colon + 1);
+}

@@ -1,0 +1,8 @@
+// type_check.h - the check of a simple element's xsi:type, for the readers of simple_element.cpp.
+#pragma once
+
+#include <zuv_client_pro/soap.h>
+
+// 0 if the held xsi:type is absent, is `type` (null: any), or is one of the list `also` (null for none),
+// which ends with null. Otherwise the start tag is given back: -1, error 4.
+int type_accept(soap *ctx, const char *type, const char *const *also);

@@ -1,0 +1,313 @@
+// xml_read.cpp - elements on input: the held start tag, consuming it, its end, and dropping what nobody
+// knows.
+//
+// Here: the life of a start tag between questions. Elsewhere: attributes (xml_read_attributes.cpp), names and
+// namespaces (tag_compare.cpp), tokens (xml_token.cpp), text (xml_text.cpp).
+//
+// Always: a start tag is read once and held until it is consumed, skipped or taken as text; nesting_level
+// counts consumed elements that have content.
+#include "codec/xml_read.h"
+
+#include <cstring>
+
+namespace {
+
+int no_tag(soap *ctx, int error)
+{
+    ctx->tag[0] = '\0';
+    ctx->tag_length = 0;
+    ctx->has_body = 1; // whatever comes is content of the element around it
+    return ctx->error = error;
+}
+
+// A code left by a search that found nothing says nothing about the input; any other tells why it ended.
+int end_of_input(soap *ctx)
+{
+    const int error = ctx->error;
+    return error == 0 || error == SOAP_TAG_MISMATCH || error == SOAP_NO_TAG ? SOAP_EOF : error;
+}
+
+void forget_tag(soap *ctx)
+{
+    ctx->peeked = 1;
+    ctx->tag_resolved = false;
+    ctx->element_id[0] = '\0';
+    ctx->element_href[0] = '\0';
+    ctx->element_type[0] = '\0';
+    ctx->array_type[0] = '\0';
+    ctx->array_size[0] = '\0';
+    ctx->array_offset[0] = '\0';
+    ctx->other_flag = 0;
+    ctx->root_flag = -1;
+    ctx->position_count = 0;
+    ctx->null_flag = 0;
+    ctx->must_understand = 0;
+}
+
+// A byte-order mark may stand ahead of a tag. 0 when the next token can be read, 47 on UTF-16.
+int pass_byte_order_mark(soap *ctx)
+{
+    if (ctx->look_ahead < 0 || ctx->in_cdata != CDATA_OUTSIDE)
+        return 0;
+    const std::int32_t first = soap_recv_byte(ctx);
+    if (first < 0) { // the end of input
+        ctx->look_ahead = XML_EOF;
+        return 0;
+    }
+    if (first != 0xEF && first != 0xFE && first != 0xFF) {
+        ctx->look_ahead = first;
+        return 0;
+    }
+    const std::int32_t second = soap_recv_byte(ctx);
+    if ((first == 0xFE && second == 0xFF) || (first == 0xFF && second == 0xFE))
+        return SOAP_UTF_ERROR;
+    if (first == 0xEF && second == 0xBB) {
+        const std::int32_t third = soap_recv_byte(ctx);
+        if (third == 0xBF) {
+            ctx->mode &= ~MODE_LATIN1;
+            return 0;
+        }
+        // U+FEC0 and the following: pushed back as the one character that the three bytes are
+        if (third == XML_EOF)
+            ctx->look_ahead = XML_EOF;
+        else
+            ctx->look_ahead = static_cast<std::int32_t>(
+                (0xFEC0u | (static_cast<std::uint32_t>(third) & 0x3F)) | XML_REFERENCE);
+        return 0;
+    }
+    if (second != XML_EOF)
+        ctx->buffer_index--;
+    ctx->look_ahead = first;
+    return 0;
+}
+
+// Token by token: refills, marks, comments, pushed-back tokens.
+int find_start_tag_slow(soap *ctx)
+{
+    const int error = pass_byte_order_mark(ctx);
+    if (error != 0)
+        return no_tag(ctx, error);
+    std::int32_t token;
+    do
+        token = soap_char_next_utf8(ctx);
+    while (is_blank(token));
+    if (token == XML_START)
+        return 0;
+    if (token == XML_EOF)
+        return no_tag(ctx, end_of_input(ctx));
+    token_push_back(ctx, token);
+    return no_tag(ctx, SOAP_NO_TAG);
+}
+
+// Consumes up to and including the "<" of the next start tag; 0, or an error with no tag held.
+int find_start_tag(soap *ctx)
+{
+    if (ctx->look_ahead == 0 && ctx->in_cdata == CDATA_OUTSIDE) {
+        const char *p = input_here(ctx);
+        const char *end = input_end(ctx);
+        while (p != end && is_blank(static_cast<unsigned char>(*p)))
+            ++p;
+        if (end - p >= 2 && p[0] == '<') {
+            if (static_cast<unsigned char>(p[1]) > '?') { // none of the marks that lead to something else
+                input_consume(ctx, p + 1);
+                return 0;
+            }
+            if (p[1] == '/') {
+                input_consume(ctx, p + 2);
+                ctx->look_ahead = XML_END;
+                return no_tag(ctx, SOAP_NO_TAG);
+            }
+        }
+    }
+    return find_start_tag_slow(ctx);
+}
+
+int read_tag_name(soap *ctx)
+{
+    if (input_skip_blanks(ctx) == XML_EOF)
+        return no_tag(ctx, end_of_input(ctx));
+    ctx->tag_length = static_cast<std::uint16_t>(xml_name_read<tag_name_stop>(ctx, ctx->tag));
+    return ctx->tag_length == 0 ? no_tag(ctx, SOAP_SYNTAX_ERROR) : 0;
+}
+
+// Drops the declarations of elements that have ended.
+void pop_prefixes(soap *ctx)
+{
+    if (ctx->prefix_list == nullptr || ctx->prefix_list->level < ctx->nesting_level)
+        return;
+    soap_prefix_pop(ctx);
+}
+
+int read_tag_end(soap *ctx)
+{
+    const std::int32_t byte = input_skip_blanks(ctx);
+    if (byte == XML_EOF)
+        return no_tag(ctx, end_of_input(ctx));
+    ctx->buffer_index++;
+    ctx->has_body = byte != '/';
+    if (byte != '/')
+        return 0;
+    if (input_skip_blanks(ctx) == XML_EOF)
+        return no_tag(ctx, end_of_input(ctx));
+    ctx->buffer_index++; // the ">"
+    return 0;
+}
+
+int enter_element(soap *ctx)
+{
+    if (ctx->has_body == 0)
+        return 0;
+    if (ctx->max_depth != 0 && ctx->nesting_level >= ctx->max_depth)
+        return SOAP_LENGTH;
+    ctx->nesting_level++;
+    return 0;
+}
+
+// The name of an end tag and its ">". 0, 5 when something else stands there, or why the input ended.
+int read_end_tag_name(soap *ctx)
+{
+    ctx->tag_resolved = false;
+    ctx->tag_length = static_cast<std::uint16_t>(xml_name_read<end_name_stop>(ctx, ctx->tag));
+    const std::int32_t byte = input_skip_blanks(ctx);
+    if (byte == XML_EOF)
+        return end_of_input(ctx);
+    if (byte != '>')
+        return SOAP_SYNTAX_ERROR;
+    ctx->buffer_index++;
+    return 0;
+}
+
+// Drops content up to and including the "</" that ends the present element.
+int find_end_tag(soap *ctx, std::uint64_t depth)
+{
+    if (depth == 0 && ctx->look_ahead == XML_END) {
+        ctx->look_ahead = 0;
+        return 0;
+    }
+    if (depth == 0 && ctx->look_ahead == 0 && ctx->in_cdata == CDATA_OUTSIDE) {
+        const char *p = input_here(ctx);
+        if (input_end(ctx) - p >= 2 && p[0] == '<' && p[1] == '/') {
+            input_consume(ctx, p + 2);
+            return 0;
+        }
+    }
+    return xml_skip_content(ctx, depth);
+}
+
+} // namespace
+
+int soap_element_head_read(soap *ctx)
+{
+    if (ctx->peeked != 0)
+        return ctx->tag[0] != '\0' ? 0 : ctx->error = SOAP_NO_TAG;
+    forget_tag(ctx);
+    if (find_start_tag(ctx) != 0 || read_tag_name(ctx) != 0)
+        return ctx->error;
+    pop_prefixes(ctx);
+    if (ctx->attributes_set != 0)
+        xml_attributes_hide(ctx);
+    if (input_ready(ctx) && *input_here(ctx) == '>') {
+        ctx->buffer_index++;
+        ctx->has_body = 1;
+        return ctx->error = 0;
+    }
+    const int error = xml_attributes_read(ctx);
+    if (error != 0)
+        return no_tag(ctx, error == SOAP_EOF ? end_of_input(ctx) : error);
+    if (read_tag_end(ctx) != 0)
+        return ctx->error;
+    if (ctx->attributes_set != 0)
+        xml_attributes_apply(ctx);
+    return ctx->error = 0;
+}
+
+int soap_element_in_begin(soap *ctx, const char *tag, int nil_allowed, const char *type)
+{
+    const bool own_element = tag == nullptr || *tag != '-';
+    if (soap_element_head_read(ctx) != 0) {
+        if (ctx->error == SOAP_NO_TAG && !own_element)
+            ctx->error = 0;
+        return ctx->error;
+    }
+    if (ctx->other_flag != 0)
+        return ctx->error = SOAP_TAG_MISMATCH;
+    if (!own_element)
+        return ctx->error = 0;
+    ctx->error = soap_tag_compare(ctx, ctx->tag, tag);
+    if (ctx->error != 0)
+        return ctx->error;
+    ctx->peeked = 0;
+    if (type != nullptr && ctx->element_type[0] != '\0' &&
+        soap_tag_compare(ctx, ctx->element_type, type) != 0)
+        return ctx->error = SOAP_TYPE_MISMATCH;
+    if (nil_allowed == 0 && ctx->null_flag != 0 && (ctx->mode & MODE_STRICT) != 0)
+        return ctx->error = SOAP_NIL;
+    return ctx->error = enter_element(ctx);
+}
+
+int soap_element_in_end(soap *ctx, const char *tag)
+{
+    if (tag != nullptr && *tag == '-')
+        return 0;
+    if (ctx->error == SOAP_NO_TAG)
+        ctx->error = 0;
+    const bool inside_held = ctx->peeked != 0 && ctx->tag[0] != '\0' && ctx->has_body != 0;
+    ctx->peeked = 0;
+    if (find_end_tag(ctx, inside_held ? 1 : 0) != 0)
+        return ctx->error = end_of_input(ctx);
+    const int error = read_end_tag_name(ctx);
+    if (error != 0)
+        return ctx->error = error;
+    if (tag != nullptr && (ctx->mode & MODE_STRICT) != 0) {
+        pop_prefixes(ctx);
+        if (soap_tag_compare(ctx, ctx->tag, tag) != 0)
+            return ctx->error = SOAP_SYNTAX_ERROR;
+    }
+    if (ctx->nesting_level != 0)
+        ctx->nesting_level--;
+    return ctx->error = 0;
+}
+
+int soap_element_skip(soap *ctx)
+{
+    if (soap_element_head_read(ctx) != 0)
+        return ctx->error;
+    if (ctx->must_understand != 0 && ctx->other_flag == 0)
+        return ctx->error = SOAP_MUST_UNDERSTAND;
+    if ((ctx->mode & MODE_STRICT) != 0 && ctx->message_part != PART_HEADER)
+        return ctx->error = SOAP_TAG_MISMATCH;
+    ctx->peeked = 0;
+    ctx->error = 0;
+    if (ctx->has_body == 0)
+        return 0;
+    ctx->nesting_level++; // the end of the element takes it back
+    return soap_element_in_end(ctx, nullptr);
+}
+
+void soap_tag_unread(soap *ctx)
+{
+    if (ctx->peeked != 0)
+        return;
+    ctx->peeked = 1;
+    if (ctx->has_body != 0 && ctx->nesting_level != 0)
+        ctx->nesting_level--;
+}
+
+const char *soap_attr_get(soap *ctx, const char *name, int occurrence)
+{
+    const bool strict = (ctx->mode & MODE_STRICT) != 0;
+    if (*name == '-')
+        return "";
+    if (ctx->attributes_set != 0) {
+        for (const soap_attribute *p = ctx->attribute_list; p != nullptr; p = p->next) {
+            if (p->visible == 0 || soap_tag_compare(ctx, p->name, name) != 0)
+                continue;
+            ctx->error = strict && occurrence == 2 ? SOAP_PROHIBITED : 0;
+            if (ctx->error != 0)
+                return nullptr;
+            return p->visible == 2 && p->value != nullptr ? p->value : "";
+        }
+    }
+    ctx->error = strict && occurrence == 1 ? SOAP_REQUIRED : 0;
+    return nullptr;
+}

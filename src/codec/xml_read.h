@@ -1,0 +1,40 @@
+// xml_read.h - start tags, for the reader's own files.
+//
+// Elsewhere: elements as the public sees them (soap_xml.h), text (xml_text.h).
+#pragma once
+
+#include <zuv_client_pro/soap_error.h>
+
+#include "codec/xml_scan.h"
+#include "codec/xml_text.h"
+
+// Reads the attributes behind a tag's name up to the ">" or "/" that ends them, which stays unread: records
+// in the attribute table, declarations on the prefix stack. 0, -1, 5 or 20.
+int xml_attributes_read(soap *ctx);
+
+// Sets the context's fields from the attributes that the engine itself understands. Clears the error.
+void xml_attributes_apply(soap *ctx);
+
+// Makes all records of the attribute table idle.
+void xml_attributes_hide(soap *ctx);
+
+// Reads a name up to a byte of the class Stop, which stays unread. Keeps what fits `name` (SOAP_TEXT_SIZE
+// bytes), terminated; the rest is dropped. The kept length.
+template <class Stop> std::size_t xml_name_read(soap *ctx, char *name)
+{
+    std::size_t kept = 0;
+    while (input_ready(ctx)) {
+        const char *here = input_here(ctx);
+        const char *stop = Stop::find(here, input_end(ctx));
+        const auto found = static_cast<std::size_t>(stop - here);
+        const std::size_t room = SOAP_TEXT_SIZE - 1 - kept;
+        const std::size_t taken = found < room ? found : room;
+        std::memcpy(name + kept, here, taken);
+        kept += taken;
+        input_consume(ctx, stop);
+        if (stop != input_end(ctx))
+            break;
+    }
+    name[kept] = '\0';
+    return kept;
+}

@@ -1,0 +1,175 @@
+// context_copy.cpp - copies of a context: what they share with their source and what starts anew.
+//
+// Shared by bytes: settings, callbacks, scratch texts, the socket's number, the TLS context, streams.
+// Never shared: what the engine frees at the end of a call or of a context.
+#include <cstdlib>
+#include <cstring>
+#include <new>
+
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_log.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_plugin.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include "engine/context_fields.h"
+#include "engine/context_state.h"
+#include "engine/tracking.h"
+
+void soap_context_assign(soap *target, const soap *source)
+{
+    if (target == source)
+        return;
+    const char *base = reinterpret_cast<const char *>(source);
+    const auto start = static_cast<std::size_t>(reinterpret_cast<const char *>(&source->state) - base);
+    const auto end =
+        static_cast<std::size_t>(reinterpret_cast<const char *>(&source->zlib_ratio_out + 1) - base);
+    std::memcpy(reinterpret_cast<char *>(target) + start, base + start, end - start);
+    if (source->pointer_chains == source->pointer_table)
+        target->pointer_chains = target->pointer_table;
+    if (source->track_chains == source->track_table)
+        target->track_chains = target->track_table;
+}
+
+// A text of the encoding style may lie in the source's working table, which goes with the source's call.
+static bool style_is_received(const soap *source)
+{
+    if (source->local_namespaces == nullptr || source->encoding_style == nullptr)
+        return false;
+    for (const soap_namespace *row = source->local_namespaces; row->prefix != nullptr; ++row) {
+        if (row->received == source->encoding_style)
+            return true;
+    }
+    return false;
+}
+
+// Lists and managed texts of the message under way: they stay the source's.
+static void forget_message(soap *ctx)
+{
+    ctx->prefix_list = nullptr;
+    ctx->prefix_cache_list = nullptr;
+    ctx->prefix_cache_valid = 0;
+    ctx->tag_resolved = false;
+    ctx->block_stack = nullptr;
+    ctx->instance_list = nullptr;
+    ctx->allocation_list = nullptr;
+    ctx->attribute_list = nullptr;
+    ctx->label_buffer = nullptr;
+    ctx->label_size = 0;
+    ctx->label_index = 0;
+    ctx->mtom_list = nullptr;
+    ctx->mtom_index = nullptr;
+    ctx->dime = {};
+    ctx->mime = {};
+    ctx->header = nullptr;
+    ctx->fault = nullptr;
+    ctx->action = nullptr;
+    ctx->http_content = nullptr;
+    ctx->auth_user = nullptr;
+    ctx->auth_password = nullptr;
+    ctx->auth_realm = nullptr;
+    ctx->forwarded_for = nullptr;
+    context_tables_clear(ctx);
+}
+
+static void forget_resources(soap *ctx)
+{
+    ctx->plugin_list = nullptr;
+    ctx->namespace_scope = nullptr;
+    ctx->local_namespaces = nullptr;
+    ctx->namespaces = nullptr;
+    for (std::size_t channel = 0; channel < SOAP_LOG_CHANNELS; ++channel) {
+        ctx->log_paths[channel] = nullptr;
+        ctx->log_streams[channel] = nullptr;
+    }
+    ctx->tls_bio = nullptr;
+    ctx->tls_connection = nullptr;
+    ctx->tls_session = nullptr;
+    ctx->zlib_stream = nullptr;
+    ctx->zlib_state = 0;
+    ctx->zlib_buffer = nullptr;
+    ctx->zlib_buffer_length = 0;
+    ctx->raw_aside = false; // the raw bytes lay in zlib_buffer
+    ctx->raw_index = 0;
+    track_table_clear(ctx);
+}
+
+// The copy starts with the rows that the source has; the host's own table is what it falls back on later,
+// since the source's working table may go first.
+static int copy_namespaces(soap *target, const soap *source)
+{
+    const soap_namespace *rows =
+        source->local_namespaces != nullptr ? source->local_namespaces : source->namespaces;
+    if (rows != nullptr && soap_set_namespaces(target, rows) != SOAP_OK)
+        return target->error = SOAP_OUT_OF_MEMORY;
+    target->namespaces = source->namespaces;
+    return SOAP_OK;
+}
+
+static int copy_plugin(soap *target, soap_plugin_record *old)
+{
+    auto *record = static_cast<soap_plugin_record *>(SOAP_MALLOC(target, sizeof(soap_plugin_record)));
+    if (record == nullptr)
+        return SOAP_OUT_OF_MEMORY;
+    *record = *old;
+    const int refusal = record->copy_hook == nullptr ? 0 : record->copy_hook(target, record, old);
+    if (refusal != 0) {
+        SOAP_FREE(target, record);
+        return refusal;
+    }
+    record->next = target->plugin_list;
+    target->plugin_list = record;
+    return SOAP_OK;
+}
+
+static int copy_plugins(soap *target, const soap *source)
+{
+    for (soap_plugin_record *old = source->plugin_list; old != nullptr; old = old->next) {
+        const int result = copy_plugin(target, old);
+        if (result != SOAP_OK)
+            return target->error = result;
+    }
+    return SOAP_OK;
+}
+
+soap *soap_context_copy(soap *target, const soap *source)
+{
+    if (target == source)
+        return target;
+    if (target == nullptr || !context_is_alive(source))
+        return nullptr;
+    soap_context_assign(target, source);
+    target->state = 2;
+    if (style_is_received(source))
+        target->encoding_style = "";
+    forget_message(target);
+    forget_resources(target);
+    soap_log_set_received(target,
+                          source->log_paths[SOAP_LOG_RECEIVED]); // a copy without memory for it goes unlogged
+    soap_log_set_sent(target, source->log_paths[SOAP_LOG_SENT]);
+    context_zlib_make(target);
+    target->error = SOAP_OK;
+    if (copy_namespaces(target, source) != SOAP_OK || copy_plugins(target, source) != SOAP_OK)
+        return nullptr;
+    return target;
+}
+
+// A failed copy shows as state 0 or as an error in the new context.
+soap::soap(const soap &other)
+{
+    context_fields_clear(this);
+    soap_context_copy(this, &other);
+}
+
+soap *soap_context_copy(const soap *source)
+{
+    void *memory = context_is_alive(source) ? std::malloc(sizeof(soap)) : nullptr;
+    if (memory == nullptr)
+        return nullptr;
+    auto *target = new (memory) soap(*source);
+    if (target->error == SOAP_OK)
+        return target;
+    target->~soap();
+    std::free(memory);
+    return nullptr;
+}

@@ -1,0 +1,10 @@
+// context_state.h - the question that every release operation asks first.
+#pragma once
+
+#include <zuv_client_pro/soap.h>
+
+// True between the start of a context and its end. Null is allowed.
+inline bool context_is_alive(const soap *ctx)
+{
+    return ctx != nullptr && (ctx->state == 1 || ctx->state == 2);
+}

@@ -1,0 +1,75 @@
+// instances.cpp - objects of classes that a context owns, each with the function that destroys it.
+//
+// Elsewhere: blocks without a destructor, and taking objects out of management (managed_blocks.cpp).
+#include "engine/instances.h"
+
+#include <cstdio>
+
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_memory.h>
+
+#include "engine/context_state.h"
+#include "engine/tracking.h"
+
+soap_instance *soap_instance_register(soap *ctx, void *object, int type_id, int array_size,
+                                      int (*hook)(soap_instance *instance))
+{
+    soap_memory_pools *pools = memory_pools(ctx);
+    soap_instance *instance = pools == nullptr ? nullptr : pools->instances.take();
+    if (instance == nullptr) {
+        ctx->error = SOAP_OUT_OF_MEMORY;
+        return nullptr;
+    }
+    *instance = {ctx->instance_list, object, type_id, array_size, hook};
+    ctx->instance_list = instance;
+    return instance;
+}
+
+// The record must be out of the list: a destructor may come back to it.
+static void destroy_instance(soap *ctx, soap_instance *instance)
+{
+    if (instance->delete_hook != nullptr && instance->delete_hook(instance) != 0)
+        std::fprintf(stderr, "new(object type = %d) = %p not freed: deletion callback failed\n",
+                     instance->type_id, instance->object);
+    ctx->pools->instances.give(instance);
+}
+
+static void destroy_all(soap *ctx)
+{
+    while (ctx->instance_list != nullptr) {
+        soap_instance *instance = ctx->instance_list;
+        ctx->instance_list = instance->next;
+        destroy_instance(ctx, instance);
+    }
+    ctx->header = nullptr;
+    ctx->fault = nullptr;
+}
+
+void soap_discard_objects(soap *ctx, void *object)
+{
+    if (!context_is_alive(ctx))
+        return;
+    if (object == nullptr) {
+        destroy_all(ctx);
+        return;
+    }
+    for (soap_instance **link = &ctx->instance_list; *link != nullptr; link = &(*link)->next) {
+        soap_instance *instance = *link;
+        if (instance->object == object) {
+            *link = instance->next;
+            destroy_instance(ctx, instance);
+            return;
+        }
+    }
+    ctx->header = nullptr;
+    ctx->fault = nullptr;
+}
+
+void instance_records_release(soap *ctx)
+{
+    while (ctx->instance_list != nullptr) {
+        soap_instance *instance = ctx->instance_list;
+        ctx->instance_list = instance->next;
+        ctx->pools->instances.give(instance);
+    }
+}

@@ -1,0 +1,92 @@
+// parameter_list.cpp - items of lists such as `multipart/related; boundary="x"; start=y`, found by name.
+//
+// Elsewhere: the headers that hold such lists (transport's http_headers.cpp, codec's mime_read.cpp).
+//
+//   list  = item *( ("," / ";") item )
+//   item  = name [ "=" value ]
+//   value = '"' characters '"' / characters
+#include <cstddef>
+#include <cstring>
+
+#include <zuv_client_pro/soap_http.h>
+#include <zuv_client_pro/soap_xml.h>
+
+namespace {
+
+bool is_hex(char c)
+{
+    return (c >= '0' && c <= '9') || (c >= 'A' && c <= 'F') || (c >= 'a' && c <= 'f');
+}
+unsigned hex_value(char c)
+{
+    return c <= '9' ? static_cast<unsigned>(c - '0') : (c & 7U) + 9U;
+}
+
+const char *skip_blanks(const char *text)
+{
+    while (*text == ' ' || *text == '\t')
+        ++text;
+    return text;
+}
+
+// Copies into `target` (SOAP_TEXT_SIZE bytes), percent-decoding, up to one of the characters of `stops`;
+// blanks at the end are left out. Returns the place of the stop.
+const char *copy_plain(const char *text, const char *stops, char *target)
+{
+    std::size_t length = 0;
+    std::size_t kept = 0; // length without the blanks at the end
+    while (*text != '\0' && std::strchr(stops, *text) == nullptr) {
+        char c = *text++;
+        if (c == '%' && is_hex(text[0]) && is_hex(text[1])) {
+            c = static_cast<char>(hex_value(text[0]) << 4 | hex_value(text[1]));
+            text += 2;
+        }
+        if (length == SOAP_TEXT_SIZE - 1)
+            continue;
+        target[length++] = c;
+        if (c != ' ' && c != '\t')
+            kept = length;
+    }
+    target[kept] = '\0';
+    return text;
+}
+
+// As above, for what stands between double quotes; `text` is behind the first. A missing second quote is the
+// end.
+const char *copy_quoted(const char *text, char *target)
+{
+    const std::size_t length = std::strcspn(text, "\"");
+    const std::size_t copied = length < SOAP_TEXT_SIZE ? length : SOAP_TEXT_SIZE - 1;
+    std::memcpy(target, text, copied);
+    target[copied] = '\0';
+    return text + length + (text[length] == '"');
+}
+
+const char *copy_value(const char *text, char *target)
+{
+    text = skip_blanks(text);
+    if (*text == '"')
+        return copy_quoted(text + 1, target);
+    return copy_plain(text, ",;", target);
+}
+
+} // namespace
+
+const char *soap_attr_value(soap *ctx, const char *text, const char *key)
+{
+    char *const target = ctx->scratch_text;
+    if (text == nullptr)
+        return nullptr;
+    while (*text != '\0') {
+        text = copy_plain(skip_blanks(text), ",;=", target);
+        const bool found = soap_tag_match(target, key) == 0;
+        target[0] = '\0';
+        if (*text == '=')
+            text = copy_value(text + 1, target);
+        if (found)
+            return target;
+        text += std::strcspn(text, ",;");
+        text = *text == '\0' ? text : text + 1;
+    }
+    return nullptr;
+}

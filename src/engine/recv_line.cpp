@@ -1,0 +1,61 @@
+// recv_line.cpp - one header line of HTTP or MIME out of the input buffer, folded lines joined.
+//
+// Elsewhere: what the lines mean (transport's http_read.cpp, codec's mime_read.cpp), filling the buffer.
+// Always: what is stored is terminated and shorter than the size given, whatever arrives.
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_io.h>
+
+namespace {
+
+// A blank or a tab at the head of the next line folds it onto the one just read.
+bool next_line_is_folded(soap *ctx)
+{
+    if (ctx->look_ahead != 0)
+        return false;
+    if (ctx->buffer_index >= ctx->buffer_length && soap_recv_more(ctx) != 0)
+        return false;
+    const char next = ctx->buffer[ctx->buffer_index];
+    return next == ' ' || next == '\t';
+}
+
+int end_of_input(soap *ctx)
+{
+    if (ctx->error == SOAP_OK)
+        ctx->error = SOAP_EOF;
+    return ctx->error;
+}
+
+} // namespace
+
+int soap_recv_line(soap *ctx, char *text, std::size_t size)
+{
+    std::size_t left = size; // bytes that the line may still have, its CR included
+    char *end = text;
+    char *const limit = text + size - 1;
+    for (;;) {
+        std::int32_t byte = 0;
+        while (left > 0) {
+            byte = soap_recv_byte(ctx);
+            if (byte < 0)
+                return *end = '\0', end_of_input(ctx);
+            --left;
+            if (byte == '\r' || byte == '\n')
+                break;
+            if (end < limit)
+                *end++ = static_cast<char>(byte);
+        }
+        if (byte != '\n') {
+            byte = soap_recv_byte(ctx);
+            if (byte < 0)
+                return *end = '\0', end_of_input(ctx);
+        }
+        if (byte == '\n') {
+            *end = '\0';
+            if (end == text || !next_line_is_folded(ctx))
+                return SOAP_OK;
+        } else if (left == 0) {
+            *end = '\0';
+            return ctx->error = SOAP_HEADER_LINE;
+        }
+    }
+}

@@ -1,0 +1,48 @@
+// tag_match.cpp - the one pattern compare of the library: header names, URL schemes, certificate names,
+// namespaces.
+//
+// Elsewhere: comparing qualified XML names (the reader's soap_tag_compare).
+// Always: no recursion; the work is at most the product of the two lengths, whatever the pattern.
+#include <zuv_client_pro/soap_xml.h>
+
+namespace {
+
+// ASCII only: the outcome must not hang on the host's locale.
+char lower(char c)
+{
+    return c >= 'A' && c <= 'Z' ? static_cast<char>(c + ('a' - 'A')) : c;
+}
+
+bool at_end(const char *text)
+{
+    return *text == '\0' || *text == '"';
+}
+
+} // namespace
+
+int soap_tag_match(const char *text, const char *pattern)
+{
+    const char *behind_star = nullptr; // pattern behind the last "*" met
+    const char *run_end = nullptr;     // text that this "*" doesn't cover yet
+    if (text == nullptr || pattern == nullptr)
+        return 1;
+    while (!at_end(text)) {
+        if (*pattern == '*') {
+            behind_star = ++pattern;
+            run_end = text;
+            if (*pattern == '\0')
+                return 0;
+        } else if (*pattern == '-' || (*pattern != '\0' && lower(*text) == lower(*pattern))) {
+            ++text;
+            ++pattern;
+        } else if (behind_star != nullptr) {
+            pattern = behind_star;
+            text = ++run_end;
+        } else {
+            return 1;
+        }
+    }
+    while (*pattern == '*')
+        ++pattern;
+    return *pattern == '\0' ? 0 : 1;
+}

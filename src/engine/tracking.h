@@ -1,0 +1,52 @@
+// tracking.h - the table of tracked allocations, as the rest of memory sees it.
+//
+// Always: an address has at most one entry. A live entry is a block in use; a dead one remembers a freed
+// block, so that a second free of it can be named. A bounded number of dead entries is kept.
+#pragma once
+
+#include <zuv_client_pro/soap.h>
+
+#include "engine/record_pool.h"
+
+struct soap_track_entry {
+    soap_track_entry *next; // in its chain, or among the idle entries of the pool
+    void *address;
+    const char *source_file; // borrowed
+    std::int32_t source_line;
+    std::int32_t dead_slot; // place in soap_memory_pools::dead; TRACK_LIVE while the block is in use
+};
+
+constexpr std::int32_t TRACK_LIVE = -1;
+constexpr std::size_t TRACK_DEAD_MAX = 4096; // freed blocks that a context remembers
+
+// Made at the first allocation, gone with soap_engine_done.
+struct soap_memory_pools {
+    record_pool<soap_track_entry> entries;
+    record_pool<soap_instance> instances;
+    std::size_t entry_count = 0; // entries in the chains, live and dead
+    std::size_t dead_next = 0;   // the slot that the next freed block takes
+    soap_track_entry *dead[TRACK_DEAD_MAX] =
+        {}; // a ring in order of freeing; null where an address came back into use
+};
+
+// The context's pools, made now if need be; null if memory runs out.
+soap_memory_pools *memory_pools(soap *ctx);
+
+// Sets the table to the one inside the context, with no entries.
+void track_table_clear(soap *ctx);
+
+// Allocates and enters a block; null if memory runs out.
+soap_track_entry *track_alloc(soap *ctx, const char *source_file, int source_line, std::size_t size);
+
+// Ends an entry that the caller knows to be live: the block is freed, or with track_forget left to somebody
+// else.
+void track_free(soap *ctx, soap_track_entry *entry);
+void track_forget(soap *ctx, soap_track_entry *entry);
+
+// Moves a live entry to the table of another context, whose pool must have an idle entry; returns the new
+// one.
+soap_track_entry *track_move(soap *source, soap *target, soap_track_entry *entry);
+
+// Names each live entry on standard error, then frees all entries, the pools and the table. Blocks stay
+// allocated.
+void track_end(soap *ctx);

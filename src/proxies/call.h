@@ -1,0 +1,40 @@
+// call.h - the cycle of an operation, and what all proxies have in common.
+//
+// Here: declarations that the generated proxies and wrapper records are written against. Elsewhere: the
+// operations' names and types (generated from the contract), the engine below.
+#pragma once
+
+#include <iosfwd>
+
+#include <zuv_client_pro/soap.h>
+
+#include "binding/class_ops.h"
+
+class protocol__Header;
+
+namespace proxies {
+
+// What one operation puts on the wire and expects back.
+struct operation {
+    const char *request_element; // "protocolProfile:setRequest"
+    const binding::class_ops *request;
+    const char *response_element; // "protocolProfile:setResponse"
+    const binding::class_ops *response;
+    int response_id; // type id of the response record
+};
+
+// One call. `proxy_endpoint` is the proxy's own endpoint, set by the call when `endpoint` or the default
+// fills it. `request` may be null; `result` is the response record's pointer, null for a call that reads no
+// answer. 0, or the error that stands in the context.
+int call(soap *ctx, const char *&proxy_endpoint, const char *default_endpoint, const operation &op,
+         const char *endpoint, const char *action, const void *request, void **result);
+
+// Operations of all proxies other than calls. `init` replaces the modes and installs the port's namespaces: 0
+// or 20.
+int init(soap *ctx, int input_mode, int output_mode, const soap_namespace *namespaces);
+void destroy(soap *ctx);
+void set_header(soap *ctx, protocol__Header *header);
+const char *fault_string(soap *ctx);
+const char *fault_detail(soap *ctx);
+
+} // namespace proxies

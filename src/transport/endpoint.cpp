@@ -1,0 +1,198 @@
+// endpoint.cpp - from an endpoint's text to a connection with the head of a request on it.
+//
+// Elsewhere: the head's lines (http_write.cpp), sockets (on_open and its default tcp_connect), framing
+// (soap_io.h).
+//
+//   endpoint = [scheme "://"] authority [path]
+//   authority = ("[" IPv6 "]" / host) [":" port]
+#include <cstdlib>
+#include <cstring>
+
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_http.h>
+#include <zuv_client_pro/soap_io.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_tcp.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include "transport/tcp_socket.h"
+
+namespace {
+
+constexpr int HTTP_PORT = 80;
+constexpr int HTTPS_PORT = 443;
+
+// Copies `length` bytes of `source`, or what fits, into a field of SOAP_TEXT_SIZE bytes.
+void copy_field(char *field, const char *source, std::size_t length)
+{
+    const std::size_t copied = length < SOAP_TEXT_SIZE ? length : SOAP_TEXT_SIZE - 1;
+    std::memcpy(field, source, copied);
+    field[copied] = '\0';
+}
+
+// Copies the host into its field; returns what follows it.
+const char *take_host(soap *ctx, const char *authority)
+{
+    const bool bracketed = *authority == '[';
+    const char *start = bracketed ? authority + 1 : authority;
+    const std::size_t length = std::strcspn(start, bracketed ? "]" : "/:");
+    copy_field(ctx->host, start, length);
+    start += length;
+    return bracketed && *start == ']' ? start + 1 : start;
+}
+
+void split_url(soap *ctx, const char *url)
+{
+    if (soap_tag_match(url, "https:*") == 0)
+        ctx->port = HTTPS_PORT;
+    copy_field(ctx->endpoint, url, std::strlen(url));
+    const char *colon = std::strchr(url, ':');
+    const bool has_scheme = colon != nullptr && colon[1] == '/' && colon[2] == '/';
+    const char *rest = take_host(ctx, has_scheme ? colon + 3 : url);
+    if (*rest == ':')
+        ctx->port = static_cast<int>(std::strtol(rest + 1, nullptr, 10));
+    if (const char *path = std::strchr(rest, '/'))
+        copy_field(ctx->path, path, std::strlen(path));
+}
+
+// A connection must not be taken over by an endpoint of other security: an https call never rides on a plain
+// socket.
+bool same_security(const soap *ctx, const char *endpoint)
+{
+    return (soap_tag_match(endpoint, "https:*") == 0) == ((ctx->output_mode & MODE_TLS) != 0);
+}
+
+// Where the last exchange went, and how.
+struct previous_peer {
+    char host[SOAP_TEXT_SIZE];
+    int port;
+};
+
+bool connection_is_reusable(soap *ctx, const previous_peer &previous, const char *endpoint)
+{
+    return ctx->keep_alive != 0 && soap_socket_open(ctx) && !ctx->response_unfinished &&
+           ctx->port == previous.port && std::strcmp(ctx->host, previous.host) == 0 &&
+           same_security(ctx, endpoint) && ctx->on_poll != nullptr && ctx->on_poll(ctx) == 0;
+}
+
+int open_connection(soap *ctx, const char *endpoint)
+{
+    ctx->socket = ctx->on_open(ctx, endpoint, ctx->host, ctx->port);
+    ctx->socket_abandoned = false;
+    ctx->response_unfinished = false;
+    if (ctx->error != SOAP_OK)
+        return ctx->error;
+    ctx->keep_alive = (ctx->output_mode & MODE_KEEP_ALIVE) != 0 ? 1 : 0;
+    return SOAP_OK;
+}
+
+// Keeps the connection of the last exchange if it serves this endpoint too; otherwise closes it and opens a
+// new one.
+int provide_connection(soap *ctx, const previous_peer &previous, const char *endpoint)
+{
+    if (!connection_is_reusable(ctx, previous, endpoint)) {
+        ctx->error = SOAP_OK;
+        if (std::strncmp(endpoint, "soap.udp:", 9) == 0) {
+            ctx->output_mode |= MODE_UDP;
+        } else {
+            ctx->output_mode &= ~MODE_UDP;
+            ctx->keep_alive = 0;
+        }
+        if (soap_socket_release(ctx) != SOAP_OK)
+            return ctx->error;
+    }
+    if (ctx->keep_alive == 0 || !soap_socket_open(ctx))
+        return open_connection(ctx, endpoint);
+    return SOAP_OK;
+}
+
+// The head goes out as it is, neither chunked nor compressed; a stored message gets its head when its size is
+// known.
+int write_head(soap *ctx, const char *endpoint, const char *action, std::uint64_t count)
+{
+    const std::uint32_t mode = ctx->mode;
+    const std::uint32_t framing = mode & MODE_IO_MASK;
+    if (framing == MODE_STORE || (mode & MODE_BARE_XML) != 0 || endpoint == nullptr ||
+        ctx->on_post == nullptr)
+        return SOAP_OK;
+    ctx->mode &= ~(MODE_IO_MASK | MODE_DEFLATE);
+    if (framing != MODE_DIRECT)
+        ctx->mode |= MODE_BUFFERED;
+    ctx->error = ctx->on_post(ctx, endpoint, ctx->host, ctx->port, ctx->path, action, count);
+    if (ctx->error != SOAP_OK)
+        return ctx->error;
+    if (framing == MODE_CHUNKED && soap_send_flush(ctx) != SOAP_OK)
+        return ctx->error;
+    ctx->mode = mode;
+    return SOAP_OK;
+}
+
+} // namespace
+
+void soap_parse_endpoint(soap *ctx, const char *url)
+{
+    char own_copy[SOAP_TEXT_SIZE];
+    if (url == ctx->endpoint) { // the target of a redirect, about to be overwritten
+        copy_field(own_copy, url, std::strlen(url));
+        url = own_copy;
+    }
+    ctx->endpoint[0] = '\0';
+    ctx->host[0] = '\0';
+    copy_field(ctx->path, "/", 1);
+    ctx->port = HTTP_PORT;
+    if (url != nullptr && *url != '\0')
+        split_url(ctx, url);
+}
+
+int soap_connect_one(soap *ctx, int status, const char *endpoint, const char *action)
+{
+    previous_peer previous;
+    ctx->error = SOAP_OK;
+    copy_field(previous.host, ctx->host, std::strlen(ctx->host));
+    previous.port = ctx->port;
+    ctx->status = status;
+    soap_parse_endpoint(ctx, endpoint);
+    if (ctx->on_connect != nullptr) {
+        ctx->error = ctx->on_connect(ctx, endpoint, ctx->host, ctx->port);
+        if (ctx->error != SOAP_OK)
+            return ctx->error;
+    } else {
+        ctx->action = soap_string_dup(ctx, action);
+        if (action != nullptr && ctx->action == nullptr)
+            return ctx->error;
+    }
+    if (ctx->on_open != nullptr && ctx->host[0] != '\0' &&
+        provide_connection(ctx, previous, endpoint) != SOAP_OK)
+        return ctx->error;
+    const std::uint64_t count = soap_message_length(ctx);
+    if (soap_send_begin(ctx) != SOAP_OK)
+        return ctx->error;
+    if (status == STATUS_GET)
+        ctx->mode = (ctx->mode & ~MODE_IO_MASK) | MODE_BUFFERED;
+    if (write_head(ctx, endpoint, action, count) != SOAP_OK)
+        return ctx->error;
+    return status == STATUS_GET ? soap_send_finish(ctx) : SOAP_OK;
+}
+
+int soap_server_connect(soap *ctx, const char *endpoints, const char *action)
+{
+    if (endpoints == nullptr || std::strchr(endpoints, ' ') == nullptr)
+        return soap_connect_one(ctx, STATUS_POST, endpoints, action), ctx->error;
+    char *const list = static_cast<char *>(SOAP_MALLOC(ctx, std::strlen(endpoints) + 1));
+    if (list == nullptr)
+        return ctx->error = SOAP_OUT_OF_MEMORY;
+    std::strcpy(list, endpoints);
+    char *item = list + std::strspn(list, " ");
+    for (;;) {
+        char *end = item + std::strcspn(item, " ");
+        char *next = end + std::strspn(end, " ");
+        *end = '\0';
+        if (soap_connect_one(ctx, STATUS_POST, item, action) != SOAP_TCP_ERROR || *next == '\0')
+            break;
+        ctx->error = SOAP_OK;
+        ctx->fault = nullptr; // what the dead endpoint left must not explain a later failure
+        item = next;
+    }
+    SOAP_FREE(ctx, list);
+    return ctx->error;
+}

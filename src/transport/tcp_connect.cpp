@@ -1,0 +1,218 @@
+// tcp_connect.cpp - opens the connection of an exchange: resolve, walk the addresses, set options, connect in
+// time.
+//
+// Elsewhere: the tunnel through a proxy (tcp_tunnel.cpp), TLS (tls_handshake.cpp).
+#include <cerrno>
+#include <cstddef>
+#include <cstring>
+#include <netinet/in.h>
+#include <netinet/tcp.h>
+
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_tcp.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include "transport/tcp_socket.h"
+#include "transport/tcp_tunnel.h"
+#include "transport/tls_connection.h"
+
+namespace {
+
+constexpr int ADDRESS_IN_USE_TRIES = 16; // new sockets for one address after EADDRINUSE
+
+// The name to resolve: a proxy may be given as an IPv6 address in brackets, which are cut off into `space`.
+const char *target_host(const soap *ctx, const char *host, char (&space)[SOAP_TEXT_SIZE])
+{
+    if (!ctx->proxy_host)
+        return host;
+    const char *end = ctx->proxy_host[0] == '[' ? std::strchr(ctx->proxy_host, ']') : nullptr;
+    if (!end || end - ctx->proxy_host > static_cast<std::ptrdiff_t>(SOAP_TEXT_SIZE))
+        return ctx->proxy_host;
+    const auto length = static_cast<std::size_t>(end - ctx->proxy_host - 1);
+    std::memcpy(space, ctx->proxy_host + 1, length);
+    space[length] = '\0';
+    return space;
+}
+
+tcp_address_list resolve_target(soap *ctx, const char *host, int port)
+{
+    char space[SOAP_TEXT_SIZE];
+    return tcp_resolve(ctx, target_host(ctx, host, space), ctx->proxy_host ? ctx->proxy_port : port, 0,
+                       "getaddrinfo failed in tcp_connect()");
+}
+
+const char *set_stream_options(const soap *ctx, int socket)
+{
+    const int on = 1;
+    const int buffer = SOAP_BUFFER_SIZE;
+    const linger lingering{1, ctx->linger_seconds};
+    const bool linger_asked = ctx->connect_flags == SO_LINGER;
+    return tcp_set_options(
+        socket, {{linger_asked, SOL_SOCKET, SO_LINGER, &lingering, sizeof lingering,
+                  "setsockopt SO_LINGER failed in tcp_connect()"},
+                 {!linger_asked && ctx->connect_flags != 0, SOL_SOCKET, ctx->connect_flags, &on, sizeof on,
+                  "setsockopt failed in tcp_connect()"},
+                 {ctx->keep_alive != 0 || ctx->tcp_keep_alive != 0, SOL_SOCKET, SO_KEEPALIVE, &on, sizeof on,
+                  "setsockopt SO_KEEPALIVE failed in tcp_connect()"},
+                 {true, SOL_SOCKET, SO_SNDBUF, &buffer, sizeof buffer,
+                  "setsockopt SO_SNDBUF failed in tcp_connect()"},
+                 {true, SOL_SOCKET, SO_RCVBUF, &buffer, sizeof buffer,
+                  "setsockopt SO_RCVBUF failed in tcp_connect()"},
+                 {ctx->tcp_keep_idle != 0, IPPROTO_TCP, TCP_KEEPIDLE, &ctx->tcp_keep_idle,
+                  sizeof ctx->tcp_keep_idle, "setsockopt TCP_KEEPIDLE failed in tcp_connect()"},
+                 {ctx->tcp_keep_interval != 0, IPPROTO_TCP, TCP_KEEPINTVL, &ctx->tcp_keep_interval,
+                  sizeof ctx->tcp_keep_interval, "setsockopt TCP_KEEPINTVL failed in tcp_connect()"},
+                 {ctx->tcp_keep_count != 0, IPPROTO_TCP, TCP_KEEPCNT, &ctx->tcp_keep_count,
+                  sizeof ctx->tcp_keep_count, "setsockopt TCP_KEEPCNT failed in tcp_connect()"},
+                 {!tcp_is_udp(ctx), IPPROTO_TCP, TCP_NODELAY, &on, sizeof on,
+                  "setsockopt TCP_NODELAY failed in tcp_connect()"}});
+}
+
+const char *set_multicast_options(const soap *ctx, int socket, addrinfo *address)
+{
+    if (ctx->ipv6_multicast_scope != 0 && address->ai_family == AF_INET6)
+        reinterpret_cast<sockaddr_in6 *>(address->ai_addr)->sin6_scope_id = ctx->ipv6_multicast_scope;
+    return tcp_set_options(
+        socket, {{ctx->ipv4_multicast_ttl != 0, IPPROTO_IP, IP_MULTICAST_TTL, &ctx->ipv4_multicast_ttl,
+                  sizeof ctx->ipv4_multicast_ttl, "setsockopt IP_MULTICAST_TTL failed in tcp_connect()"},
+                 {ctx->ipv4_multicast_interface && ctx->ipv6_multicast_scope == 0, IPPROTO_IP,
+                  IP_MULTICAST_IF, ctx->ipv4_multicast_interface, sizeof(in_addr),
+                  "setsockopt IP_MULTICAST_IF failed in tcp_connect()"}});
+}
+
+// A socket for the address with all options set, or -1 with a fault; *made tells whether there was a socket
+// at all.
+int open_socket(soap *ctx, addrinfo *address, bool *made)
+{
+    const int mode = SOCK_CLOEXEC | (!tcp_is_udp(ctx) && ctx->connect_timeout != 0 ? SOCK_NONBLOCK : 0);
+    const int fresh = socket(address->ai_family, address->ai_socktype | mode, address->ai_protocol);
+    ctx->error_mode = 0;
+    *made = fresh >= 0;
+    if (fresh < 0) {
+        tcp_save_errno(ctx);
+        return -1;
+    }
+    if (tcp_refuse_large(ctx, fresh))
+        return -1;
+    const char *failure = set_stream_options(ctx, fresh);
+    if (!failure && tcp_is_udp(ctx))
+        failure = set_multicast_options(ctx, fresh, address);
+    if (!failure)
+        return fresh;
+    tcp_save_errno(ctx);
+    return tcp_fail(ctx, fresh, failure);
+}
+
+// Waits for a connection under way. 0, or -1 with a fault; closes the socket then.
+int await_connection(soap *ctx, int socket)
+{
+    int ready;
+    do
+        ready = tcp_wait(ctx, socket, WAIT_SEND, ctx->connect_timeout);
+    while (ready < 0 && ctx->errno_value == EINTR);
+    if (ready == 0)
+        return tcp_fail(ctx, socket, "connect failed in tcp_connect()", "Timeout");
+    if (ready < 0)
+        return tcp_fail(ctx, socket, "connect failed in tcp_connect()");
+    socklen_t size = sizeof ctx->errno_value;
+    if (getsockopt(socket, SOL_SOCKET, SO_ERROR, &ctx->errno_value, &size) == 0 && ctx->errno_value == 0)
+        return 0;
+    if (ctx->errno_value == 0)
+        tcp_save_errno(ctx);
+    return tcp_fail(ctx, socket, "connect failed in tcp_connect()");
+}
+
+enum class attempt { connected, pending, address_in_use, refused };
+
+attempt try_connect(const soap *ctx, int socket, const addrinfo *address)
+{
+    for (;;) {
+        errno = 0;
+        if (connect(socket, address->ai_addr, address->ai_addrlen) == 0)
+            return attempt::connected;
+        if (errno == EADDRINUSE)
+            return attempt::address_in_use;
+        if (ctx->connect_timeout != 0 && (errno == EINPROGRESS || errno == EAGAIN))
+            return attempt::pending;
+        if (address->ai_next || (errno != 0 && errno != EINTR))
+            return attempt::refused;
+    }
+}
+
+// Connects to the first address of the list that answers. The socket, or -1 with a fault.
+int connect_to_list(soap *ctx, addrinfo *address)
+{
+    int reuse_tries = ADDRESS_IN_USE_TRIES;
+    while (address) {
+        bool made;
+        const int socket = open_socket(ctx, address, &made);
+        if (!made) {
+            address = address->ai_next;
+            if (!address)
+                return tcp_fail(ctx, -1, "socket failed in tcp_connect()");
+            continue;
+        }
+        if (socket < 0)
+            return -1;
+        const attempt outcome = try_connect(ctx, socket, address);
+        tcp_save_errno(ctx);
+        if (outcome == attempt::connected)
+            return socket;
+        if (outcome == attempt::pending)
+            return await_connection(ctx, socket) == 0 ? socket : -1;
+        const bool same_again = outcome == attempt::address_in_use && --reuse_tries > 0;
+        if (!same_again && !address->ai_next)
+            return tcp_fail(ctx, socket, "connect failed in tcp_connect()");
+        tcp_close_through_hook(ctx, socket);
+        if (!same_again) {
+            address = address->ai_next;
+            reuse_tries = ADDRESS_IN_USE_TRIES;
+        }
+    }
+    return -1; // a list is never empty
+}
+
+int open_datagram_socket(soap *ctx, addrinfo *address)
+{
+    for (; address; address = address->ai_next) {
+        bool made;
+        const int socket = open_socket(ctx, address, &made);
+        if (made && socket < 0)
+            return -1;
+        if (made) {
+            tcp_keep_peer(ctx, address);
+            return socket;
+        }
+    }
+    return tcp_fail(ctx, -1, "socket failed in tcp_connect()");
+}
+
+} // namespace
+
+int tcp_connect(soap *ctx, const char *endpoint, const char *host, int port)
+{
+    tcp_drop_socket(ctx);
+    const tcp_address_list addresses = resolve_target(ctx, host, port);
+    if (!addresses)
+        return -1;
+    const bool udp = tcp_is_udp(ctx);
+    const int socket =
+        udp ? open_datagram_socket(ctx, addresses.get()) : connect_to_list(ctx, addresses.get());
+    if (socket < 0)
+        return -1;
+    tcp_store_socket(ctx, socket);
+    if (udp)
+        return socket;
+    ctx->peer_length = 0;
+    ctx->input_mode &= ~MODE_TLS;
+    ctx->output_mode &= ~MODE_TLS;
+    if (!endpoint || soap_tag_match(endpoint, "https:*") != 0) {
+        tls_discard(ctx);
+    } else if ((ctx->proxy_host && tcp_open_tunnel(ctx, endpoint, host, port) != 0) ||
+               tls_connect(ctx, host, port) != 0) {
+        tcp_drop_socket(ctx);
+        return -1;
+    }
+    tcp_settle_blocking(ctx, ctx->socket);
+    return ctx->socket;
+}

@@ -1,0 +1,57 @@
+// tls_connection.h - private: TLS on ctx->socket, as the socket files and the TLS files see each other.
+//
+// Elsewhere: what hosts may call (soap_tls.h).
+//
+// Always: TLS is in force on the socket exactly while ctx->tls_connection has a BIO. tls_connection itself
+// may outlive a failed attempt, to be cleared and used by the next. The BIO never closes the socket.
+#pragma once
+
+#include <cstddef>
+
+#include <openssl/types.h>
+
+#include <zuv_client_pro/soap.h>
+
+// True if bytes on ctx->socket go through TLS. The mode flags don't decide: a host may change them between
+// calls.
+bool tls_active(const soap *ctx);
+
+// --- tls_handshake.cpp ---
+// Client side on ctx->socket: handshake and check of the peer. 0, or -1 with error 28 or 30 and, save for a
+// lack of memory, a fault; the socket stays open then.
+int tls_connect(soap *ctx, const char *host, int port);
+
+// --- tls_session.cpp ---
+// Closes TLS in good order, if it is in force, and frees tls_connection. 0 or 30. May close the socket.
+int tls_close(soap *ctx);
+// Takes TLS off the socket without a word to the peer; tls_connection stays.
+void tls_detach(soap *ctx);
+// Frees tls_connection without a word to the peer.
+void tls_discard(soap *ctx);
+// Offers the kept session if it came from this host and port, and forgets it. Notes host and port for the
+// session that this connection will leave.
+void tls_session_offer(soap *ctx, const char *host, int port);
+
+// --- tls_bio.cpp ---
+// A BIO on ctx->socket, for its whole life, by send and recv with socket_flags and without SIGPIPE. Null if
+// memory runs out. It follows ctx->socket: with no open socket each transfer fails with EBADF.
+BIO *tls_bio_new(soap *ctx);
+// Never block from now on (or again as the socket's mode says).
+void tls_bio_set_nonblocking(BIO *bio, bool nonblocking);
+
+// --- tls_transfer.cpp ---
+// One SSL_write or SSL_read. Above 0: bytes. Otherwise *wait_for is the WAIT_ flag to wait for ahead of a
+// retry, or 0 if no retry helps; errno tells the system's reason, 0 for none.
+int tls_write(soap *ctx, const char *data, std::size_t length, int *wait_for);
+int tls_read(soap *ctx, char *buffer, std::size_t length, int *wait_for);
+// True if received bytes wait inside OpenSSL, where select doesn't see them.
+bool tls_has_pending(const soap *ctx);
+// Looks at what has arrived, without blocking: 0 if no byte of data and no end is there, else -1.
+int tls_peek(soap *ctx);
+// Text of the failure of an SSL call that has returned `result`, in message_text. Empties OpenSSL's error
+// queue.
+const char *tls_error_text(soap *ctx, int result);
+
+// --- tls_verify.cpp ---
+// Is the peer verified and the host asked for? By tls_flags. 0, or 30 with a fault.
+int tls_check_peer(soap *ctx, const char *host);

@@ -1,0 +1,44 @@
+// case_file.h - small contracts in text files, translated for the tests of the generator.
+//
+// A case file holds sections, each opened by a line "== kind argument":
+//   case NAME        in a file of several cases: opens one
+//   types            rows of type_ids.txt; those of BASE_TYPE_IDS follow them
+//   schema PREFIX    what stands inside xsd:schema in PREFIX.xsd, whose first line is the section's
+//   file NAME        any other input file, as it stands
+//   expect PATH      lines that stand together in this output; "model": in the dump of the model
+//   error            the message that refuses the contract
+// Lines ahead of the first section say what the case is about.
+#pragma once
+
+#include <filesystem>
+#include <string>
+#include <vector>
+
+#include "emit.h"
+#include "reader.h"
+
+struct case_section {
+    std::string kind, argument, text;
+    std::size_t line = 0; // in the case file
+};
+
+struct contract_case {
+    std::string name;
+    std::vector<case_section> sections;
+};
+
+// All cases of a file; a file without "== case" is one, of the file's name.
+std::vector<contract_case> read_cases(const std::filesystem::path &path);
+
+// What became of a contract.
+struct translation {
+    std::string error; // empty when it was translated
+    std::string model; // as dumped
+    std::vector<emitted_file> files;
+
+    // Text of an output, "model" included; empty for none.
+    std::string output(const std::string &path) const;
+};
+
+translation translate(const contract_case &contract);
+translation translate(const std::filesystem::path &directory);

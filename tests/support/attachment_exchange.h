@@ -1,0 +1,196 @@
+// attachment_exchange.h - small SOAP messages with binary values beside them, written and read without a
+// binding.
+//
+// A message is an Envelope whose Body holds elements "data". For tests of attachments.
+#pragma once
+
+#include <cstring>
+#include <deque>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+#include <zuv_client_pro/soap_attachment.h>
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_identity.h>
+#include <zuv_client_pro/soap_primitive.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include "support/memory_wire.h"
+
+namespace attachment_exchange {
+
+constexpr int VALUE_TYPE = 10; // type id of the values
+
+// Begins as every holder of bytes does.
+struct value {
+    unsigned char *content;
+    int size;
+    char *id, *type, *options;
+
+    std::string bytes() const
+    {
+        return content == nullptr
+                   ? "(null)"
+                   : std::string(reinterpret_cast<char *>(content), static_cast<std::size_t>(size));
+    }
+};
+
+inline std::string text(const char *text)
+{
+    return text == nullptr ? "(null)" : text;
+}
+
+// A value to send; the texts must live as long as it.
+inline value make_value(const std::string &bytes, const char *id, const char *type,
+                        const char *options = nullptr)
+{
+    return {reinterpret_cast<unsigned char *>(const_cast<char *>(bytes.data())),
+            static_cast<int>(bytes.size()), const_cast<char *>(id), const_cast<char *>(type),
+            const_cast<char *>(options)};
+}
+
+inline int write_value(soap *ctx, const value &v)
+{
+    const int id = soap_attachment_ref_out(ctx, "data", 0, v.content, &v, v.id, v.type, v.options, 1, nullptr,
+                                           VALUE_TYPE);
+    if (id < 0)
+        return ctx->error;
+    if (soap_element_out_begin(ctx, "data", id, nullptr) != 0 ||
+        soap_base64_write(ctx, v.content, static_cast<std::size_t>(v.size)) != 0)
+        return ctx->error;
+    return soap_element_out_end(ctx, "data");
+}
+
+inline int write_message(soap *ctx, const std::deque<value> &values)
+{
+    if (soap_envelope_out_begin(ctx) != 0 || soap_body_out_begin(ctx) != 0)
+        return ctx->error;
+    for (const value &v : values) {
+        if (write_value(ctx, v) != 0)
+            return ctx->error;
+    }
+    if (soap_body_out_end(ctx) != 0)
+        return ctx->error;
+    return soap_envelope_out_end(ctx);
+}
+
+// Both passes of a message without HTTP. Checks that the length counted ahead is the length sent.
+inline int send(memory_wire &wire, const std::deque<value> &values, bool length_is_known = true)
+{
+    wire.encoding_style = nullptr;
+    soap_reset_call(&wire);
+    for (const value &v : values) {
+        if (v.id != nullptr || v.type != nullptr)
+            wire.mode |= MODE_DIME; // as the mark pass does
+    }
+    if (soap_count_begin(&wire) != 0)
+        return wire.error;
+    const bool counts = (wire.mode & MODE_COUNTING) != 0;
+    if (counts && write_message(&wire, values) != 0)
+        return wire.error;
+    if (soap_count_end(&wire) != 0)
+        return wire.error;
+    const std::uint64_t length = soap_message_length(&wire);
+    if (soap_send_begin(&wire) != 0 || write_message(&wire, values) != 0 || soap_send_finish(&wire) != 0)
+        return wire.error;
+    if (counts && length_is_known) {
+        EXPECT_EQ(length, wire.sent().size());
+    }
+    return 0;
+}
+
+inline int read_value(soap *ctx, value &v)
+{
+    const bool has_body = ctx->has_body != 0;
+    v = {};
+    if (ctx->element_href[0] != '\0') {
+        if (soap_attachment_ref_in(ctx, &v.content, &v.size, &v.id, &v.type, &v.options) != 0)
+            return ctx->error;
+    } else if (has_body) {
+        const bool refers = (ctx->mode & MODE_MTOM) != 0 &&
+                            soap_xop_include_in(ctx, &v.content, &v.size, &v.id, &v.type, &v.options) == 0;
+        if (ctx->error != 0)
+            return ctx->error;
+        if (!refers)
+            v.content = soap_base64_inline_read(ctx, &v.size);
+    }
+    return has_body ? soap_element_in_end(ctx, "data") : 0;
+}
+
+inline int read_values(soap *ctx, std::deque<value> &values)
+{
+    while (soap_element_in_begin(ctx, "data", 1, nullptr) == 0) {
+        values.emplace_back();
+        if (read_value(ctx, values.back()) != 0)
+            return ctx->error;
+    }
+    return ctx->error == SOAP_NO_TAG ? ctx->error = 0 : ctx->error;
+}
+
+// One reception of a message. The values lie in a deque, as references keep their addresses.
+struct reception {
+    explicit reception(const std::string &bytes, std::uint32_t mode = 0, std::size_t first = 65536,
+                       std::size_t piece = 65536)
+    {
+        wire->input_mode = mode;
+        wire->receive(bytes);
+        wire->piece = [first, piece](std::size_t given) { return given == 0 ? first : piece; };
+    }
+    int run()
+    {
+        soap *const ctx = wire.get();
+        soap_reset_call(ctx);
+        if (soap_receive_begin(ctx) != 0 || soap_envelope_in_begin(ctx) != 0 ||
+            soap_body_in_begin(ctx) != 0 || read_values(ctx, values) != 0 || soap_body_in_end(ctx) != 0 ||
+            soap_envelope_in_end(ctx) != 0)
+            return ctx->error;
+        return soap_receive_finish(ctx);
+    }
+    // What was received, as one text; a failure as "!code".
+    std::string summary()
+    {
+        if (const int error = run())
+            return "!" + std::to_string(error);
+        std::string all;
+        for (const value &v : values)
+            all += "[" + text(v.id) + " " + text(v.type) + " " + v.bytes() + "]";
+        return all;
+    }
+
+    std::unique_ptr<memory_wire> wire = std::make_unique<memory_wire>();
+    std::deque<value> values;
+};
+
+inline void expect_same_at_every_split(const std::string &bytes, const std::string &expected,
+                                       std::uint32_t mode = 0)
+{
+    EXPECT_EQ(reception(bytes, mode).summary(), expected);
+    for (std::size_t split = 1; split < bytes.size(); ++split)
+        ASSERT_EQ(reception(bytes, mode, split).summary(), expected) << "split at " << split;
+    EXPECT_EQ(reception(bytes, mode, 1, 1).summary(), expected) << "byte by byte";
+}
+
+inline void expect_error_at_every_cut(const std::string &bytes, std::uint32_t mode = 0)
+{
+    for (std::size_t length = 0; length < bytes.size(); ++length)
+        ASSERT_EQ(reception(bytes.substr(0, length), mode).summary().substr(0, 1), "!")
+            << "cut at " << length;
+}
+
+// Any byte may become any other: the outcome is free, its kind is not.
+inline void expect_survival_of_every_change(const std::string &bytes, std::uint32_t mode = 0)
+{
+    for (std::size_t at = 0; at < bytes.size(); ++at) {
+        for (const int byte : {0x00, 0x01, 0x0D, 0x2D, 0x7F, 0x80, 0xFF, bytes[at] ^ 1, bytes[at] ^ 0x20}) {
+            std::string changed = bytes;
+            changed[at] = static_cast<char>(byte);
+            reception read(changed, mode);
+            EXPECT_EQ(read.run(), read.wire->error);
+        }
+    }
+}
+
+} // namespace attachment_exchange

@@ -1,0 +1,71 @@
+// call_wire.h - a proxy whose connection is memory: what calls send is kept, the answers are given in turn.
+//
+// No socket is opened and no trace is written. An answer ends where the peer would wait for the next request;
+// an empty list means that the peer closes.
+#pragma once
+
+#include <algorithm>
+#include <cstring>
+#include <deque>
+#include <string>
+
+#include <zuv_client_pro/soap_log.h>
+
+constexpr int CALL_WIRE_SOCKET = 900; // never opened, never closed
+
+struct call_wire {
+    std::string sent;
+    std::deque<std::string> answers;
+    std::size_t piece = SOAP_BUFFER_SIZE; // bytes that one receive gives at most
+    int opened = 0, closed = 0;
+    std::string opened_at; // endpoint of the last connection
+
+    // Takes the place of the proxy's connection; the wire must outlive it.
+    void carry(soap &ctx)
+    {
+        ctx.user = this;
+        ctx.on_open = [](soap *c, const char *endpoint, const char *, int) {
+            of(c).opened_at = endpoint;
+            ++of(c).opened;
+            return CALL_WIRE_SOCKET;
+        };
+        ctx.on_close = [](soap *c) {
+            of(c).closed += c->socket != -1;
+            c->socket = -1;
+            return 0;
+        };
+        ctx.on_poll = [](soap *) { return 0; };
+        ctx.on_send = [](soap *c, const char *data, std::size_t length) {
+            of(c).sent.append(data, length);
+            return 0;
+        };
+        ctx.on_recv = [](soap *c, char *buffer, std::size_t length) { return of(c).give(buffer, length); };
+        soap_log_set_received(&ctx, nullptr);
+        soap_log_set_sent(&ctx, nullptr);
+    }
+
+private:
+    static call_wire &of(soap *ctx) { return *static_cast<call_wire *>(ctx->user); }
+
+    std::size_t give(char *buffer, std::size_t length)
+    {
+        if (answers.empty())
+            return 0;
+        std::string &answer = answers.front();
+        const std::size_t part = std::min({length, piece, answer.size()});
+        std::memcpy(buffer, answer.data(), part);
+        answer.erase(0, part);
+        if (answer.empty())
+            answers.pop_front();
+        return part;
+    }
+};
+
+// An HTTP answer with a Content-Length.
+inline std::string http_answer(const std::string &body, const std::string &status = "200 OK",
+                               const std::string &more = "Connection: keep-alive\r\n")
+{
+    return "HTTP/1.1 " + status +
+           "\r\nContent-Type: text/xml; charset=utf-8\r\nContent-Length: " + std::to_string(body.size()) +
+           "\r\n" + more + "\r\n" + body;
+}

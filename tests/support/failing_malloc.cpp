@@ -1,0 +1,92 @@
+// failing_malloc.cpp - the replaced allocation functions and the counters that arm them.
+//
+// Underneath lies the C library's allocator, or the sanitizer's where there is one.
+#include "support/failing_malloc.h"
+
+#include <cerrno>
+
+extern "C" {
+void *__libc_malloc(std::size_t size);
+void *__libc_calloc(std::size_t count, std::size_t size);
+void *__libc_realloc(void *block, std::size_t size);
+__attribute__((weak)) void *__interceptor_malloc(std::size_t size);
+__attribute__((weak)) void *__interceptor_calloc(std::size_t count, std::size_t size);
+__attribute__((weak)) void *__interceptor_realloc(void *block, std::size_t size);
+}
+
+// A request beyond the address space is refused by a sanitizer's allocator too, in place of ending the test.
+extern "C" __attribute__((visibility("default"))) const char *__asan_default_options()
+{
+    return "allocator_may_return_null=1";
+}
+
+namespace {
+
+struct thread_state {
+    std::size_t asked = 0;
+    std::size_t refuse_from = 0; // number of the first allocation to refuse; 0 none
+    std::size_t refuse_to = 0;   // number of the last one
+    std::size_t refused = 0;
+};
+
+constinit thread_local thread_state state;
+
+bool refuse_this_one()
+{
+    ++state.asked;
+    if (state.refuse_from == 0 || state.asked < state.refuse_from || state.asked > state.refuse_to)
+        return false;
+    ++state.refused;
+    errno = ENOMEM;
+    return true;
+}
+
+} // namespace
+
+extern "C" __attribute__((visibility("default"))) void *malloc(std::size_t size)
+{
+    if (refuse_this_one())
+        return nullptr;
+    return __interceptor_malloc != nullptr ? __interceptor_malloc(size) : __libc_malloc(size);
+}
+
+extern "C" __attribute__((visibility("default"))) void *calloc(std::size_t count, std::size_t size)
+{
+    if (refuse_this_one())
+        return nullptr;
+    return __interceptor_calloc != nullptr ? __interceptor_calloc(count, size) : __libc_calloc(count, size);
+}
+
+extern "C" __attribute__((visibility("default"))) void *realloc(void *block, std::size_t size)
+{
+    if (refuse_this_one())
+        return nullptr;
+    return __interceptor_realloc != nullptr ? __interceptor_realloc(block, size)
+                                            : __libc_realloc(block, size);
+}
+
+namespace failing_malloc {
+
+scope::scope(std::size_t nth, refuse how)
+{
+    state.refused = 0;
+    state.refuse_from = state.asked + nth;
+    state.refuse_to = how == refuse::one ? state.refuse_from : static_cast<std::size_t>(-1);
+}
+
+scope::~scope()
+{
+    state.refuse_from = 0;
+}
+
+std::size_t scope::refused() const
+{
+    return state.refused;
+}
+
+std::size_t allocations()
+{
+    return state.asked;
+}
+
+} // namespace failing_malloc

@@ -1,0 +1,50 @@
+// failing_malloc.h - refuses chosen allocations, to see what a function does when memory runs out.
+//
+// Linking failing_malloc.cpp replaces malloc, calloc and realloc of the whole executable; they behave as
+// usual until a scope is armed. operator new goes through malloc and throws std::bad_alloc, except in builds
+// with AddressSanitizer, where new has an allocator of its own that is never refused.
+//
+// Only the thread that arms is concerned. Run nothing but the call under test while armed: GoogleTest's own
+// checks allocate too.
+#pragma once
+
+#include <cstddef>
+
+namespace failing_malloc {
+
+enum class refuse { one, all_from };
+
+// While it lives, allocation number `nth` (counted from 1) of this thread is refused, or every one from there
+// on.
+class scope {
+public:
+    explicit scope(std::size_t nth, refuse how = refuse::one);
+    ~scope();
+    scope(const scope &) = delete;
+    scope &operator=(const scope &) = delete;
+
+    std::size_t refused() const; // allocations refused so far
+};
+
+// Allocations asked for by this thread since its start.
+std::size_t allocations();
+
+// Runs `call` with allocation 1, 2, 3... refused, each followed by `check`, which may assert, until a run
+// needs no more allocations. `check` takes whether an allocation was refused. Returns the number of runs in
+// which one was refused.
+template <class Call, class Check> std::size_t at_each_allocation(refuse how, Call call, Check check)
+{
+    for (std::size_t nth = 1;; ++nth) {
+        bool refused = false;
+        {
+            const scope armed(nth, how);
+            call();
+            refused = armed.refused() > 0;
+        }
+        check(refused);
+        if (!refused)
+            return nth - 1;
+    }
+}
+
+} // namespace failing_malloc

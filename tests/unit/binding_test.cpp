@@ -1,0 +1,347 @@
+// binding_test.cpp - the rules of data classes, on documents read from memory and objects written to it.
+#include <gtest/gtest.h>
+
+#include <zuv_client_pro/ProfileSoapBindingProxy.h>
+#include <zuv_client_pro/protocol.h>
+#include <zuv_client_pro/protocolHTTP.h>
+#include <zuv_client_pro/protocolPRFilter.h>
+#include <zuv_client_pro/protocolProblemReport.h>
+#include <zuv_client_pro/protocolProfile.h>
+#include <zuv_client_pro/protocolUpdateOrder.h>
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_registry.h>
+#include <zuv_client_pro/soap_xml.h>
+#include <zuv_client_pro/type_ids.h>
+
+#include "support/memory_wire.h"
+
+namespace {
+
+// A context that reads documents whose prefixes are the service's own, and writes bare XML.
+class Binding : public testing::Test {
+protected:
+    Binding() : ctx(0, MODE_BARE_XML | MODE_BUFFERED)
+    {
+        soap_set_namespaces(&ctx, ProfileSoapBindingProxy().namespaces);
+    }
+
+    template <class T> T *read(const std::string &xml, std::uint32_t mode = 0)
+    {
+        ctx.input_mode = mode;
+        std::string declared = xml;
+        const std::string name = xml.substr(1, xml.find_first_of(" />") - 1);
+        std::string declarations = " xmlns:xsi=\"http://www.w3.org/2001/XMLSchema-instance\""
+                                   " xmlns:SOAP-ENV=\"http://schemas.xmlsoap.org/soap/envelope/\"";
+        for (const soap_namespace *row = ctx.namespaces; row->prefix; ++row) {
+            if (std::string(row->prefix).rfind("protocol", 0) == 0)
+                declarations += std::string(" xmlns:") + row->prefix + "=\"" + row->uri + "\"";
+        }
+        declared.insert(1 + name.size(), declarations);
+        ctx.receive(declared);
+        soap_reset_call(&ctx);
+        soap_receive_begin(&ctx);
+        ctx.soap_version = 1;
+        auto *object = static_cast<T *>(soap_instantiate(&ctx, T().soap_type(), nullptr, nullptr, nullptr));
+        if (!object->soap_in(&ctx, name.c_str(), nullptr))
+            return nullptr;
+        return soap_receive_finish(&ctx) ? nullptr : object;
+    }
+
+    template <class T> std::string write(const T &object, const char *tag, std::uint32_t mode = 0)
+    {
+        ctx.output_mode = MODE_BARE_XML | MODE_BUFFERED | mode;
+        ctx.sends.clear();
+        ctx.encoding_style = nullptr;
+        soap_reset_call(&ctx);
+        object.soap_serialize(&ctx);
+        soap_send_begin(&ctx);
+        ctx.namespace_state = 1; // the root's declarations are not what is looked at
+        EXPECT_EQ(0, object.soap_put(&ctx, tag, ""));
+        soap_send_finish(&ctx);
+        return ctx.sent();
+    }
+
+    memory_wire ctx;
+};
+
+TEST_F(Binding, reads_elements_in_any_order_and_skips_the_unknown)
+{
+    const auto *profile = read<protocolProfile__ProfileContent>(
+        "<protocolProfile:setRequest><protocolProfile:profile/><x><y/>z</x><protocolProfile:thisURI>b</"
+        "protocolProfile:thisURI>"
+        "<protocol:identity><protocol:name>n</protocol:name></protocol:identity><protocolProfile:state>2</"
+        "protocolProfile:state>"
+        "<protocolProfile:thisURI>a</protocolProfile:thisURI></protocolProfile:setRequest>");
+    ASSERT_NE(nullptr, profile) << ctx.error;
+    EXPECT_EQ((std::vector<std::string>{"b", "a"}), profile->thisURI);
+    EXPECT_EQ("n", *profile->identity->name);
+    EXPECT_EQ(protocolProfile__ProfileState::inactive_x002esuspended, *profile->state);
+    EXPECT_EQ(1u, profile->profile.size());
+    EXPECT_EQ(&ctx, profile->identity->soap);
+}
+
+TEST_F(Binding, takes_a_single_member_once)
+{
+    const std::string twice = "<protocol:MetaData><protocol:type>a</protocol:type><protocol:type>b</"
+                              "protocol:type></protocol:MetaData>";
+    EXPECT_EQ("a", *read<protocol__ProductMetaData>(twice)->type);
+    EXPECT_EQ(nullptr, read<protocol__ProductMetaData>(twice, MODE_STRICT));
+    EXPECT_EQ(SOAP_TAG_MISMATCH, ctx.error);
+}
+
+TEST_F(Binding, refuses_what_must_be_understood_and_is_unknown)
+{
+    EXPECT_EQ(nullptr, read<protocol__Contact>("<c><x SOAP-ENV:mustUnderstand=\"1\"/></c>"));
+    EXPECT_EQ(SOAP_MUST_UNDERSTAND, ctx.error);
+}
+
+TEST_F(Binding, xsi_type_makes_the_derived_class_and_an_unknown_one_the_base)
+{
+    const auto *query = read<protocolUpdateOrder__UpdateIdExpansionDetail>(
+        "<d><protocolUpdateOrder:metaData "
+        "xsi:type=\"protocolUpdateOrder:UpdateMetaData\"><protocolUpdateOrder:updateId>U1"
+        "</protocolUpdateOrder:updateId></protocolUpdateOrder:metaData>"
+        "<protocolUpdateOrder:metaData xsi:type=\"protocol:Unheard\"><protocolUpdateOrder:updateId>U2"
+        "</protocolUpdateOrder:updateId></protocolUpdateOrder:metaData>"
+        "<protocolUpdateOrder:metaData xsi:type=\"protocol:Contact\"/></d>");
+    ASSERT_NE(nullptr, query) << ctx.error;
+    ASSERT_EQ(3u, query->metaData.size());
+    ASSERT_EQ(SOAP_TYPE_protocolUpdateOrder__UpdateMetaData, query->metaData[0]->soap_type());
+    EXPECT_EQ("U1", *static_cast<protocolUpdateOrder__UpdateMetaData *>(query->metaData[0])->updateId);
+    EXPECT_EQ(SOAP_TYPE_protocol__MetaData, query->metaData[1]->soap_type());
+    EXPECT_EQ(SOAP_TYPE_protocol__MetaData, query->metaData[2]->soap_type()) << "a class outside the family";
+}
+
+TEST_F(Binding, enumerations_take_words_exactly_and_numbers_by_mode)
+{
+    static const struct {
+        const char *text;
+        int code, strict_error, error;
+    } cases[] = {{"physical", 1, 0, 0},
+                 {"99", 99, SOAP_TYPE_MISMATCH, 0},
+                 {"1", 1, 0, 0},
+                 {"-1", -1, SOAP_TYPE_MISMATCH, 0},
+                 {"Physical", 0, SOAP_TYPE_MISMATCH, SOAP_TYPE_MISMATCH},
+                 {"", 0, SOAP_TYPE_MISMATCH, SOAP_TYPE_MISMATCH},
+                 {"1x", 0, SOAP_TYPE_MISMATCH, SOAP_TYPE_MISMATCH}};
+    for (const auto &c : cases) {
+        const std::string xml = std::string("<d><protocol:medium>") + c.text + "</protocol:medium></d>";
+        const auto *supported = read<protocol__DeliverySupported>(xml);
+        EXPECT_EQ(c.error, ctx.error) << c.text;
+        if (supported) {
+            EXPECT_EQ(c.code, static_cast<int>(*supported->medium)) << c.text;
+        }
+        read<protocol__DeliverySupported>(xml, MODE_STRICT);
+        EXPECT_EQ(c.strict_error, ctx.error) << c.text;
+    }
+    protocol__DeliverySupported supported;
+    protocol__Medium medium = static_cast<protocol__Medium>(99);
+    supported.medium = &medium;
+    EXPECT_EQ("<d><protocol:medium>99</protocol:medium></d>", write(supported, "d"));
+}
+
+TEST_F(Binding, booleans_take_two_words_and_two_numbers)
+{
+    static const struct {
+        const char *text;
+        int value;
+    } cases[] = {{"true", 1}, {"false", 0}, {"1", 1},    {"0", 0},
+                 {"2", -1},   {"-1", -1},   {"yes", -1}, {"TRUE", -1}};
+    for (const auto &c : cases) {
+        const auto *compliance = read<protocol__ProductFullNameCompliance>(
+            std::string("<d><protocol:compliant>") + c.text + "</protocol:compliant></d>");
+        if (c.value < 0) {
+            EXPECT_EQ(SOAP_TYPE_MISMATCH, ctx.error) << c.text;
+        } else {
+            ASSERT_NE(nullptr, compliance) << c.text;
+            EXPECT_EQ(c.value == 1, *compliance->compliant) << c.text;
+        }
+    }
+}
+
+TEST_F(Binding, always_written_members_have_their_defaults)
+{
+    EXPECT_EQ(
+        "<o><protocolUpdateOrder:includeUpdateIdExpansionDetail>true</"
+        "protocolUpdateOrder:includeUpdateIdExpansionDetail>"
+        "<protocolUpdateOrder:includeData>true</protocolUpdateOrder:includeData>"
+        "<protocolUpdateOrder:includeMetaData>false</protocolUpdateOrder:includeMetaData>"
+        "<protocolUpdateOrder:includeOperatingPlatforms>false</protocolUpdateOrder:includeOperatingPlatforms>"
+        "<protocolUpdateOrder:includeRequisites>false</protocolUpdateOrder:includeRequisites>"
+        "<protocolUpdateOrder:includeSupersedes>false</protocolUpdateOrder:includeSupersedes></o>",
+        write(protocolUpdateOrder__UpdateOrderContent(), "o"));
+    const auto *order = read<protocolUpdateOrder__UpdateOrderContent>(
+        "<o><protocolUpdateOrder:includeRequisites>1</protocolUpdateOrder:includeRequisites></o>");
+    ASSERT_NE(nullptr, order);
+    EXPECT_TRUE(order->includeData && order->includeRequisites);
+    EXPECT_EQ(nullptr, order->includePatches);
+}
+
+TEST_F(Binding, required_members_are_nil_when_null_and_missed_in_strict_mode)
+{
+    protocolPRFilter__Not negation;
+    EXPECT_EQ("<f xsi:type=\"protocolPRFilter:Not\"><protocolPRFilter:operand xsi:nil=\"true\"/></f>",
+              write(negation, "f"));
+    protocol__Server_x002eRedirection redirection;
+    EXPECT_EQ("<f "
+              "xsi:type=\"protocol:Server.Redirection\"><protocol:uri></"
+              "protocol:uri><protocol:term>permanent</protocol:term></f>",
+              write(redirection, "f"));
+    static const struct {
+        const char *xml;
+        int strict_error;
+    } cases[] = {
+        {"<f><protocolPRFilter:operand/></f>", SOAP_OCCURS},
+        {"<f><protocolPRFilter:operand/><protocolPRFilter:operand/></f>", 0},
+        {"<f/>", SOAP_OCCURS},
+    };
+    for (const auto &c : cases) {
+        EXPECT_NE(nullptr, read<protocolPRFilter__And>(c.xml)) << c.xml;
+        read<protocolPRFilter__And>(c.xml, MODE_STRICT);
+        EXPECT_EQ(c.strict_error, ctx.error) << c.xml;
+    }
+}
+
+TEST_F(Binding, attributes_come_first_and_a_required_one_is_missed_in_strict_mode)
+{
+    std::string product = "P";
+    protocolPRFilter__ProductComparison comparison;
+    comparison.compareOp = protocolPRFilter__StringCompareOp::containsPhrase;
+    comparison.product = &product;
+    EXPECT_EQ("<f xsi:type=\"protocolPRFilter:ProductComparison\" compareOp=\"containsPhrase\">"
+              "<protocolPRFilter:product>P</protocolPRFilter:product></f>",
+              write(comparison, "f"));
+    const std::string bare = "<f><protocolPRFilter:product>P</protocolPRFilter:product></f>";
+    ASSERT_NE(nullptr, read<protocolPRFilter__ProductComparison>(bare));
+    EXPECT_EQ(nullptr, read<protocolPRFilter__ProductComparison>(bare, MODE_STRICT));
+    EXPECT_EQ(SOAP_REQUIRED, ctx.error);
+    const auto *data = read<protocol__Data>("<d encoding=\"UTF-8\">a &amp; b</d>");
+    ASSERT_NE(nullptr, data);
+    EXPECT_EQ("a & b", data->value);
+    EXPECT_EQ(protocol__Encoding::UTF_8, *data->encoding);
+    EXPECT_EQ(nullptr, read<protocol__Data>("<d/>")->encoding);
+}
+
+TEST_F(Binding, nil_is_a_null_pointer_and_nil_mode_writes_it_back)
+{
+    const auto *contact = read<protocol__Contact>(
+        "<c><protocol:name xsi:nil=\"true\"/><protocol:nameDetails xsi:nil=\"1\"/></c>");
+    ASSERT_NE(nullptr, contact);
+    EXPECT_TRUE(contact->name == nullptr && contact->nameDetails == nullptr);
+    EXPECT_EQ("<c></c>", write(*contact, "c"));
+    const std::string nil = write(protocol__Function(), "c", MODE_NIL);
+    EXPECT_EQ("<c><protocol:function xsi:nil=\"true\"/><protocol:functionName xsi:nil=\"true\"/>"
+              "<protocol:description xsi:nil=\"true\"/></c>",
+              nil);
+}
+
+TEST_F(Binding, references_forward_and_back_share_one_object)
+{
+    const auto *profile = read<protocolProfile__ProfileContent>(
+        "<p><protocol:contact href=\"#c\"/><protocol:contact id=\"c\"><protocol:name "
+        "id=\"n\">Ada</protocol:name>"
+        "<protocol:organization href=\"#n\"/></protocol:contact><protocol:contact href=\"#c\"/></p>");
+    ASSERT_NE(nullptr, profile) << ctx.error;
+    ASSERT_EQ(3u, profile->contact.size());
+    EXPECT_EQ(profile->contact[1], profile->contact[0]);
+    EXPECT_EQ(profile->contact[1], profile->contact[2]);
+    EXPECT_EQ(profile->contact[1]->name, profile->contact[1]->organization);
+    read<protocolProfile__ProfileContent>("<p><protocol:contact href=\"#nobody\"/></p>");
+    EXPECT_EQ(SOAP_MISSING_ID, ctx.error);
+    read<protocolProfile__ProfileContent>("<p><protocol:contact id=\"c\"/><protocol:contact id=\"c\"/></p>");
+    EXPECT_EQ(SOAP_DUPLICATE_ID, ctx.error);
+    read<protocolProfile__ProfileContent>(
+        "<p><protocol:contact id=\"c\"/><protocol:identity href=\"#c\"/></p>");
+    EXPECT_EQ(SOAP_ID_CONFLICT, ctx.error);
+}
+
+TEST_F(Binding, graph_mode_writes_shared_objects_once_and_literal_mode_each_time)
+{
+    std::string name = "Ada";
+    protocol__Contact contact;
+    contact.name = &name;
+    protocolProfile__ProfileContent profile;
+    profile.contact = {&contact, &contact};
+    const std::string one = "<protocol:contact><protocol:name>Ada</protocol:name></protocol:contact>";
+    EXPECT_EQ("<p>" + one + one + "</p>", write(profile, "p"));
+    EXPECT_EQ("<p><protocol:contact id=\"_1\"><protocol:name>Ada</protocol:name></protocol:contact>"
+              "<protocol:contact href=\"#_1\"/></p>",
+              write(profile, "p", SOAP_XML_GRAPH));
+}
+
+TEST_F(Binding, numbers_fail_with_a_type_mismatch)
+{
+    const auto *status = read<protocolHTTP__StatusCodeInformation>(
+        "<s><protocolHTTP:statusCode> 404 </protocolHTTP:statusCode></s>");
+    ASSERT_NE(nullptr, status);
+    EXPECT_EQ(404, *status->statusCode);
+    EXPECT_EQ(nullptr, read<protocolHTTP__StatusCodeInformation>(
+                           "<s><protocolHTTP:statusCode>abc</protocolHTTP:statusCode></s>"));
+    EXPECT_EQ(SOAP_TYPE_MISMATCH, ctx.error);
+}
+
+TEST_F(Binding, assignment_shares_what_pointers_name)
+{
+    std::string city = "Graz";
+    protocol__Address one, other;
+    one.city = &city;
+    one.soap = &ctx;
+    other = one;
+    EXPECT_EQ(&city, other.city);
+    EXPECT_EQ(&ctx, other.soap);
+    other.soap_default(nullptr);
+    EXPECT_EQ(&city, one.city);
+}
+
+TEST_F(Binding, the_registry_makes_finds_and_destroys_by_id)
+{
+    std::size_t size = 0;
+    auto *identity = static_cast<protocol__Identity *>(
+        soap_instantiate_array(&ctx, SOAP_TYPE_protocol__Identity, 3, nullptr, nullptr, &size));
+    ASSERT_NE(nullptr, identity);
+    EXPECT_EQ(3 * sizeof(protocol__Identity), size);
+    EXPECT_EQ(&ctx, identity[2].soap);
+    soap_discard_objects(&ctx, identity);
+    EXPECT_EQ(nullptr, ctx.instance_list);
+    EXPECT_EQ(nullptr, soap_instantiate(&ctx, 893, nullptr, nullptr, nullptr));
+    soap_instance strange{};
+    strange.array_size = -1;
+    for (const int id : {7, 893}) {
+        strange.type_id = id;
+        EXPECT_EQ(-1, soap_delete_object(&strange));
+    }
+    EXPECT_EQ(SOAP_TYPE_protocol__Address, soap_type_by_name("protocol:Address"));
+    EXPECT_EQ(0, soap_type_by_name("protocol:address"));
+    EXPECT_EQ(0, soap_write_element(&ctx, identity, "x", 0, 0));
+    EXPECT_EQ(0, soap_write_element(&ctx, identity, "x", 0, 878));
+}
+
+TEST_F(Binding, a_vector_named_by_a_reference_is_filled_through_its_id)
+{
+    auto *texts = static_cast<std::vector<std::string> *>(
+        soap_instantiate(&ctx, SOAP_TYPE_vector_of_xsd__string, nullptr, nullptr, nullptr));
+    texts->resize(2);
+    const std::string text = "late";
+    soap_insert_into_vector(&ctx, SOAP_TYPE_xsd__string, SOAP_TYPE_vector_of_xsd__string, texts, 1, &text,
+                            sizeof text);
+    EXPECT_EQ("late", texts->at(1));
+    const auto *read_back = read<protocolProfile__ProfileContent>(
+        "<p><protocolProfile:thisURI href=\"#t\"/><protocolProfile:thisURI "
+        "id=\"t\">urn:1</protocolProfile:thisURI></p>");
+    ASSERT_NE(nullptr, read_back) << ctx.error;
+    EXPECT_EQ((std::vector<std::string>{"urn:1", "urn:1"}), read_back->thisURI);
+}
+
+TEST_F(Binding, nesting_stops_at_the_limit_of_open_elements)
+{
+    std::string deep, end;
+    for (int i = 0; i < 5000; ++i) {
+        deep += "<protocolProfile:profile>";
+        end += "</protocolProfile:profile>";
+    }
+    EXPECT_EQ(nullptr, read<protocolProfile__ProfileContent>("<p>" + deep + end + "</p>"));
+    EXPECT_EQ(SOAP_LENGTH, ctx.error);
+}
+
+} // namespace

@@ -1,0 +1,663 @@
+// How a message comes in: its start recognised, chunks and compression undone, its end proven, hostile bytes
+// refused.
+#include <cstdio>
+#include <fstream>
+#include <iterator>
+#include <string>
+
+#include <gtest/gtest.h>
+#include <unistd.h>
+#include <zlib.h>
+
+#include <zuv_client_pro/soap_attachment.h>
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_http.h>
+#include <zuv_client_pro/soap_io.h>
+
+#include "engine/dime_chunks.h"
+#include "support/memory_wire.h"
+
+namespace {
+
+const std::string OK_HEAD = "HTTP/1.1 200 OK\r\nContent-Type: text/xml\r\n";
+const std::string CHUNKED_HEAD = OK_HEAD + "Transfer-Encoding: chunked\r\n\r\n";
+
+std::string with_length(const std::string &body, std::size_t length)
+{
+    return OK_HEAD + "Content-Length: " + std::to_string(length) + "\r\n\r\n" + body;
+}
+
+std::string chunk(const std::string &data)
+{
+    char size[32];
+    std::snprintf(size, sizeof size, "%zX\r\n", data.size());
+    return size + data + "\r\n";
+}
+
+std::string deflated(const std::string &text, int window_bits, const std::string &dictionary = {})
+{
+    z_stream stream{};
+    EXPECT_EQ(deflateInit2(&stream, 6, Z_DEFLATED, window_bits, 8, Z_DEFAULT_STRATEGY), Z_OK);
+    if (!dictionary.empty()) {
+        deflateSetDictionary(&stream, reinterpret_cast<const Bytef *>(dictionary.data()),
+                             static_cast<uInt>(dictionary.size()));
+    }
+    std::string out(deflateBound(&stream, text.size()) + 32, '\0');
+    stream.next_in = reinterpret_cast<Bytef *>(const_cast<char *>(text.data()));
+    stream.avail_in = static_cast<uInt>(text.size());
+    stream.next_out = reinterpret_cast<Bytef *>(out.data());
+    stream.avail_out = static_cast<uInt>(out.size());
+    EXPECT_EQ(deflate(&stream, Z_FINISH), Z_STREAM_END);
+    out.resize(stream.total_out);
+    deflateEnd(&stream);
+    return out;
+}
+
+std::string gzipped(const std::string &text)
+{
+    return deflated(text, 31);
+}
+
+struct outcome {
+    int begun = 0;
+    std::string body;
+    int finished = 0;
+    bool reusable = false;
+    bool operator==(const outcome &) const = default;
+};
+
+void PrintTo(const outcome &o, std::ostream *out)
+{
+    *out << "begin " << o.begun << ", body of " << o.body.size() << " \"" << o.body.substr(0, 60)
+         << "\", finish " << o.finished << (o.reusable ? ", reusable" : ", not reusable");
+}
+
+// One message, read as a reader does that takes all it gets; finish is asked only if no error was met before.
+outcome read_message(memory_wire &wire)
+{
+    outcome result;
+    result.begun = soap_receive_begin(&wire);
+    if (result.begun == 0) {
+        result.body = wire.read_all();
+        result.finished = wire.error != 0 ? wire.error : soap_receive_finish(&wire);
+    }
+    result.reusable = !wire.response_unfinished;
+    EXPECT_LE(wire.buffer_index, wire.buffer_length);
+    EXPECT_LE(wire.buffer_length, SOAP_BUFFER_SIZE);
+    return result;
+}
+
+struct reading_options {
+    std::string dictionary;
+    std::function<std::size_t(std::size_t)> piece;
+};
+
+outcome read_on_kept_connection(const std::string &bytes, const reading_options &options = {})
+{
+    memory_wire wire(MODE_KEEP_ALIVE);
+    wire.keep_alive = 1;
+    wire.piece = options.piece;
+    if (!options.dictionary.empty()) {
+        wire.zlib_dictionary = options.dictionary.data();
+        wire.zlib_dictionary_length = static_cast<unsigned>(options.dictionary.size());
+    }
+    wire.receive(bytes);
+    return read_message(wire);
+}
+
+// Whole, byte by byte, in two pieces at every place; and cut at every place, where it must neither hang nor
+// count as read to its end.
+void check_every_reading(const std::string &rule, const std::string &bytes, const outcome &expected,
+                         reading_options options = {})
+{
+    options.piece = nullptr;
+    EXPECT_EQ(read_on_kept_connection(bytes, options), expected) << rule << ", whole";
+    options.piece = [](std::size_t) { return 1; };
+    outcome bytewise = read_on_kept_connection(bytes, options);
+    EXPECT_EQ(bytewise, expected) << rule << ", byte by byte";
+    for (std::size_t split = 1; split < bytes.size(); ++split) {
+        options.piece = [split](std::size_t given) {
+            return given < split ? split - given : SOAP_BUFFER_SIZE;
+        };
+        EXPECT_EQ(read_on_kept_connection(bytes, options), expected) << rule << ", split at " << split;
+    }
+    options.piece = nullptr;
+    for (std::size_t cut = 0; cut < bytes.size() && expected.reusable; ++cut) {
+        const outcome result = read_on_kept_connection(bytes.substr(0, cut), options);
+        EXPECT_FALSE(result.reusable) << rule << ", cut at " << cut;
+        EXPECT_LE(result.body.size(), expected.body.size()) << rule << ", cut at " << cut;
+    }
+}
+
+std::string hook_saw;
+int hook(soap *, const char *data, std::size_t length)
+{
+    hook_saw.append(data, length);
+    return 0;
+}
+
+} // namespace
+
+TEST(buffered_in, the_first_bytes_decide_what_is_read)
+{
+    struct {
+        const char *rule;
+        std::string bytes;
+        int result;
+        std::uint32_t mode;
+        std::int32_t first; // byte that the reader gets
+    } rows[] = {
+        {"plain XML", "<a/>", 0, MODE_LATIN1, '<'},
+        {"blanks ahead", " \r\n\t<a/>", 0, MODE_LATIN1, '<'},
+        {"nothing", "", SOAP_EOF, MODE_LATIN1, -1},
+        {"blanks alone", "   ", SOAP_EOF, MODE_LATIN1, -1},
+        {"UTF-8 mark", "\xEF\xBB\xBF<a/>", 0, 0, '<'},
+        {"UTF-16, low byte first", "\xFF\xFE<", SOAP_UTF_ERROR, MODE_LATIN1, -1},
+        {"UTF-16, high byte first", "\xFE\xFF<", SOAP_UTF_ERROR, MODE_LATIN1, -1},
+        {"gzip", gzipped("\n<a/>"), 0, MODE_LATIN1 | MODE_DEFLATE, '<'},
+        {"gzip of nothing", gzipped(""), SOAP_EOF, MODE_LATIN1 | MODE_DEFLATE, -1},
+        {"gzip cut in its head", "\x1F\x8B\x08", SOAP_ZLIB_ERROR, MODE_LATIN1, -1},
+        {"gzip with a broken stream", "\x1F\x8B\x08zzzzzzz\xFF\xFF\xFF\xFF", SOAP_ZLIB_ERROR,
+         MODE_LATIN1 | MODE_DEFLATE, -1},
+        {"HTTP", with_length("x", 1), 0, MODE_LATIN1, 'x'},
+    };
+    for (const auto &row : rows) {
+        for (const bool bytewise : {false, true}) {
+            memory_wire wire(MODE_LATIN1);
+            wire.receive(row.bytes);
+            if (bytewise)
+                wire.piece = [](std::size_t) { return 1; };
+            EXPECT_EQ(soap_receive_begin(&wire), row.result) << row.rule;
+            EXPECT_EQ(wire.error, row.result) << row.rule;
+            EXPECT_EQ(wire.mode & (MODE_LATIN1 | MODE_DEFLATE | MODE_MIME | MODE_DIME), row.mode) << row.rule;
+            if (row.result == 0) {
+                EXPECT_EQ(soap_recv_byte(&wire), row.first) << row.rule;
+            } else {
+                EXPECT_EQ(wire.keep_alive, 0) << row.rule;
+            }
+        }
+    }
+}
+
+TEST(buffered_in, a_false_mark_keeps_its_last_byte)
+{
+    struct {
+        std::string bytes;
+        std::int32_t first;
+    } rows[] = {{"\xEF\xBBz", 0xFEC0 | 'z'}, {"\xEF<", 0xEF}};
+    for (const auto &row : rows) {
+        memory_wire wire;
+        static std::int32_t pushed;
+        pushed = 0;
+        wire.on_read_head = [](soap *ctx) { return pushed = ctx->look_ahead, 404; };
+        wire.receive(row.bytes);
+        EXPECT_EQ(soap_receive_begin(&wire), 404);
+        EXPECT_EQ(pushed, row.first);
+    }
+}
+
+TEST(buffered_in, a_body_without_bytes_is_the_status)
+{
+    const std::string typed = "Content-Type: text/xml\r\nContent-Length: 0\r\n\r\n";
+    struct {
+        std::string bytes;
+        int result;
+    } rows[] = {
+        {OK_HEAD + "\r\n", SOAP_NO_DATA},
+        {OK_HEAD + "Transfer-Encoding: chunked\r\n\r\n0\r\n\r\n", SOAP_NO_DATA},
+        {"HTTP/1.1 500 Oops\r\nTransfer-Encoding: chunked\r\n\r\n0\r\n\r\n", 500},
+        {"HTTP/1.1 500 Oops\r\nContent-Length: 5\r\n\r\n", 500},
+        {"POST / HTTP/1.1\r\n" + typed, SOAP_EOF},
+    };
+    for (const auto &row : rows)
+        EXPECT_EQ(read_on_kept_connection(row.bytes).begun, row.result) << row.bytes;
+}
+
+TEST(buffered_in, an_empty_body_on_a_kept_connection_is_not_waited_for)
+{
+    memory_wire wire(MODE_KEEP_ALIVE);
+    wire.keep_alive = 1;
+    wire.receive(OK_HEAD + "Content-Length: 0\r\n\r\n");
+    EXPECT_EQ(soap_receive_begin(&wire), SOAP_NO_DATA);
+    EXPECT_EQ(wire.receives, 1U);
+}
+
+TEST(buffered_in, chunked_bodies_read_the_same_at_every_split)
+{
+    struct {
+        const char *rule;
+        std::string body;
+        outcome expected;
+    } rows[] = {
+        {"two chunks", "3\r\n<a>\r\n4\r\n</a>\r\n0\r\n\r\n", {0, "<a></a>", 0, true}},
+        {"extensions", "4;x=1\r\n<a/>\r\n0;y\r\n\r\n", {0, "<a/>", 0, true}},
+        {"no carriage returns", "4\n<a/>\n0\n\n", {0, "<a/>", 0, true}},
+        {"either case",
+         "a\r\n0123456789\r\nB\r\n0123456789a\r\n0\r\n\r\n",
+         {0, "01234567890123456789a", 0, true}},
+        {"zeros ahead", "0000000000000004\r\n<a/>\r\n0\r\n\r\n", {0, "<a/>", 0, true}},
+        {"trailers", "4\r\n<a/>\r\n0\r\nA: b\r\nC: d\r\n\r\n", {0, "<a/>", 0, true}},
+        {"digits past the sixteenth", "00000000000000041\r\n<a/>\r\n0\r\n\r\n", {0, "<a/>", 0, false}},
+        {"junk between chunks", "2\r\n<a\r\n?!\r\n2\r\n/>\r\n0\r\n\r\n", {0, "<a/>", 0, false}},
+        {"no end", "4\r\n<a/>\r\n", {0, "<a/>", 0, false}},
+        {"no empty line at the end", "4\r\n<a/>\r\n0\r\n", {0, "<a/>", 0, false}},
+        {"a chunk cut short", "9\r\n<a/>", {0, "<a/>", 0, false}},
+        {"the largest size", "FFFFFFFFFFFFFFFF\r\n<a/>", {0, "<a/>", 0, false}},
+    };
+    for (const auto &row : rows)
+        check_every_reading(row.rule, CHUNKED_HEAD + row.body, row.expected);
+}
+
+TEST(buffered_in, bytes_behind_the_last_chunk_cost_the_connection)
+{
+    const outcome expected{0, "<a/>", 0, false};
+    EXPECT_EQ(read_on_kept_connection(CHUNKED_HEAD + "4\r\n<a/>\r\n0\r\n\r\nHTTP/1.1 200 OK\r\n\r\n"),
+              expected);
+}
+
+TEST(buffered_in, lines_between_chunks_are_bounded)
+{
+    const std::string endless(9000, 'z');
+    const std::string first = "4\r\n<a/>\r\n";
+    EXPECT_EQ(read_on_kept_connection(CHUNKED_HEAD + first + endless + "\r\n0\r\n\r\n"),
+              (outcome{0, "<a/>", SOAP_HEADER_LINE, false}));
+    EXPECT_EQ(read_on_kept_connection(CHUNKED_HEAD + first + "4;" + endless + "\r\n<a/>\r\n0\r\n\r\n"),
+              (outcome{0, "<a/>", SOAP_HEADER_LINE, false}));
+    EXPECT_EQ(read_on_kept_connection(CHUNKED_HEAD + first + "4;" + endless.substr(0, 8000) +
+                                      "\r\n<b/>\r\n0\r\n\r\n"),
+              (outcome{0, "<a/><b/>", 0, true}));
+    std::string trailers;
+    for (int i = 0; i < 100000; ++i)
+        trailers += "A: b\r\n";
+    memory_wire wire(MODE_KEEP_ALIVE);
+    wire.keep_alive = 1;
+    wire.piece = [](std::size_t) { return 1000; };
+    wire.receive(CHUNKED_HEAD + first + "0\r\n" + trailers);
+    EXPECT_EQ(read_message(wire), (outcome{0, "<a/>", 0, false}));
+    EXPECT_LT(wire.given, 20000U);
+}
+
+TEST(buffered_in, chunks_of_every_size_around_the_buffer)
+{
+    for (const std::size_t size : {1U, 65535U, 65536U, 65537U, 200000U}) {
+        std::string body(size, 'a');
+        for (std::size_t i = 0; i < size; i += 7)
+            body[i] = static_cast<char>('A' + i % 26);
+        for (const std::size_t step : {1U, 17U, 4096U, 65000U, 65530U, 65536U, 200000U}) {
+            if (size / step > 70000)
+                continue;
+            std::string wire = CHUNKED_HEAD;
+            for (std::size_t at = 0; at < size; at += step)
+                wire += chunk(body.substr(at, step));
+            const outcome result = read_on_kept_connection(wire + "0\r\n\r\n");
+            EXPECT_TRUE(result == (outcome{0, body, 0, true})) << size << " in " << step;
+        }
+    }
+}
+
+TEST(buffered_in, only_an_exact_content_length_keeps_the_connection)
+{
+    check_every_reading("exact", with_length("<a/>", 4), {0, "<a/>", 0, true});
+    EXPECT_EQ(read_on_kept_connection(with_length("<a/>", 3)), (outcome{0, "<a/>", 0, false}));
+    EXPECT_EQ(read_on_kept_connection(with_length("<a/>", 5)), (outcome{0, "<a/>", 0, false}));
+    EXPECT_EQ(read_on_kept_connection(OK_HEAD + "\r\n<a/>"), (outcome{0, "<a/>", 0, false}));
+    EXPECT_EQ(read_on_kept_connection("<a/>"), (outcome{0, "<a/>", 0, false}));
+}
+
+TEST(buffered_in, what_the_reader_left_of_a_body_is_dropped_up_to_a_bound)
+{
+    struct {
+        std::size_t body, announced, piece;
+        bool reusable;
+    } rows[] = {{5000, 5000, 1000, true},        {65540, 65540, 1000, true}, {200000, 200000, 1000, false},
+                {200000, 200000, 180000, false}, {5000, 5001, 1000, false},  {5000, 4999, 9000, false}};
+    for (const auto &row : rows) {
+        memory_wire wire(MODE_KEEP_ALIVE);
+        wire.keep_alive = 1;
+        wire.receive(with_length("<a/>" + std::string(row.body - 4, '\n'), row.announced));
+        wire.piece = [&row](std::size_t) { return row.piece; };
+        ASSERT_EQ(soap_receive_begin(&wire), 0);
+        EXPECT_TRUE(wire.response_unfinished);
+        ASSERT_EQ(soap_recv_skip(&wire, 4), 0);
+        EXPECT_EQ(soap_receive_finish(&wire), 0);
+        EXPECT_EQ(!wire.response_unfinished, row.reusable) << row.body << " of " << row.announced;
+        if (row.reusable) {
+            EXPECT_EQ(wire.buffer_index, wire.buffer_length);
+        }
+    }
+}
+
+TEST(buffered_in, the_end_of_a_kept_body_is_not_waited_for)
+{
+    memory_wire wire(MODE_KEEP_ALIVE);
+    wire.keep_alive = 1;
+    wire.receive(with_length("<a>", 3)); // an element that is never closed
+    ASSERT_EQ(soap_receive_begin(&wire), 0);
+    EXPECT_EQ(wire.read_all(), "<a>");
+    const std::size_t receives = wire.receives;
+    EXPECT_EQ(receives, 1U);
+    for (int i = 0; i < 3; ++i)
+        EXPECT_EQ(soap_recv_byte(&wire), -1);
+    EXPECT_EQ(wire.receives, receives);
+}
+
+TEST(buffered_in, the_end_of_input_stays_without_asking_the_peer_again)
+{
+    memory_wire wire;
+    wire.receive("<a/>");
+    ASSERT_EQ(soap_receive_begin(&wire), 0);
+    EXPECT_EQ(wire.read_all(), "<a/>");
+    const std::size_t receives = wire.receives;
+    EXPECT_EQ(soap_recv_byte(&wire), -1);
+    EXPECT_EQ(soap_recv_skip(&wire, 1), -1);
+    EXPECT_EQ(wire.receives, receives);
+}
+
+TEST(buffered_in, compressed_bodies_read_the_same_at_every_split)
+{
+    const std::string text = "<a>compressed compressed compressed</a>";
+    const std::string gzip = gzipped(text), deflate = deflated(text, 15);
+    const auto coded = [](const char *coding, const std::string &body) {
+        return OK_HEAD + "Content-Encoding: " + coding +
+               "\r\nContent-Length: " + std::to_string(body.size()) + "\r\n\r\n" + body;
+    };
+    const std::string coded_chunks = OK_HEAD + "Content-Encoding: gzip\r\nTransfer-Encoding: chunked\r\n\r\n";
+    check_every_reading("gzip", coded("gzip", gzip), {0, text, 0, true});
+    check_every_reading("deflate", coded("deflate", deflate), {0, text, 0, true});
+    check_every_reading("deflate sent as gzip", coded("gzip", deflate), {0, text, 0, true});
+    check_every_reading("gzip in two chunks",
+                        coded_chunks + chunk(gzip.substr(0, 20)) + chunk(gzip.substr(20)) + "0\r\n\r\n",
+                        {0, text, 0, true});
+    check_every_reading("gzip alone", gzip, {0, text, 0, false});
+    std::string small_chunks;
+    for (const char c : gzip)
+        small_chunks += chunk(std::string(1, c));
+    check_every_reading("gzip in chunks of one byte", coded_chunks + small_chunks + "0\r\n\r\n",
+                        {0, text, 0, true});
+    std::string with_flags = gzip;
+    with_flags[3] = 8; // a file name announced and not there: the flags are not looked at
+    check_every_reading("gzip flags", coded("gzip", with_flags), {0, text, 0, true});
+}
+
+TEST(buffered_in, preset_dictionaries_serve_both_codings)
+{
+    const std::string text = "<a>words of the dictionary words of the dictionary</a>";
+    const reading_options options{"words of the dictionary", nullptr};
+    const std::string raw = deflated(text, -15, options.dictionary);
+    std::string gzip("\x1F\x8B\xFF\0\0\0\0\0\0\xFF", 10);
+    gzip += raw;
+    const auto number = [&gzip](unsigned long value) {
+        for (int i = 0; i < 4; ++i)
+            gzip += static_cast<char>(value >> (8 * i) & 0xFF);
+    };
+    number(crc32(0, reinterpret_cast<const Bytef *>(text.data()), static_cast<uInt>(text.size())));
+    number(text.size());
+    check_every_reading("gzip", gzip, {0, text, 0, false}, options);
+    const std::string deflate = deflated(text, 15, options.dictionary);
+    const std::string message =
+        OK_HEAD + "Content-Encoding: deflate\r\nContent-Length: " + std::to_string(deflate.size()) +
+        "\r\n\r\n" + deflate;
+    check_every_reading("deflate", message, {0, text, 0, true}, options);
+    EXPECT_EQ(read_on_kept_connection(message).finished, SOAP_ZLIB_ERROR);
+    EXPECT_EQ(read_on_kept_connection(message, {"another dictionary", nullptr}).finished, SOAP_ZLIB_ERROR);
+}
+
+TEST(buffered_in, a_damaged_compressed_body_is_an_error_wherever_it_is_damaged)
+{
+    const std::string text = "<a>" + std::string(1000, 'x') + "compressed</a>";
+    const std::string good = gzipped(text);
+    const std::string head = OK_HEAD + "Content-Encoding: gzip\r\n\r\n";
+    ASSERT_EQ(read_on_kept_connection(head + good).finished, 0);
+    for (std::size_t at = 10; at < good.size(); ++at) {
+        std::string damaged = good;
+        damaged[at] = static_cast<char>(damaged[at] ^ 0x55);
+        const outcome result = read_on_kept_connection(head + damaged);
+        EXPECT_EQ(result.finished, SOAP_ZLIB_ERROR) << "byte " << at;
+        EXPECT_FALSE(result.reusable);
+    }
+    for (std::size_t cut = 10; cut < good.size(); ++cut)
+        EXPECT_EQ(read_on_kept_connection(head + good.substr(0, cut)).finished, SOAP_ZLIB_ERROR)
+            << "cut at " << cut;
+}
+
+TEST(buffered_in, a_bomb_streams_through_the_one_buffer)
+{
+    const std::string text(30U << 20, ' ');
+    memory_wire wire;
+    wire.receive(gzipped("<" + text));
+    ASSERT_EQ(soap_receive_begin(&wire), 0);
+    EXPECT_EQ(soap_recv_byte(&wire), '<');
+    EXPECT_EQ(soap_receive_finish(&wire), 0);
+    EXPECT_LT(wire.zlib_ratio_in, 0.01F);
+}
+
+TEST(buffered_in, the_prepare_hook_sees_the_plain_body_once)
+{
+    const std::string text = "<a>plain text, plain text</a>";
+    const std::string gzip = gzipped(text);
+    const std::string messages[] = {
+        text,
+        gzip,
+        with_length(text, text.size()),
+        CHUNKED_HEAD + chunk(text.substr(0, 5)) + chunk(text.substr(5)) + "0\r\n\r\n",
+        OK_HEAD + "Content-Encoding: gzip\r\n\r\n" + gzip,
+        OK_HEAD + "Content-Encoding: gzip\r\nTransfer-Encoding: chunked\r\n\r\n" + chunk(gzip) + "0\r\n\r\n",
+    };
+    for (const std::string &message : messages) {
+        for (std::size_t split = 1; split <= message.size(); ++split) {
+            memory_wire wire;
+            wire.on_recv_prepare = hook;
+            wire.receive(message);
+            wire.piece = [split](std::size_t given) {
+                return given < split ? split - given : SOAP_BUFFER_SIZE;
+            };
+            hook_saw.clear();
+            const outcome result = read_message(wire);
+            EXPECT_EQ(result.body, text);
+            EXPECT_EQ(hook_saw, text) << message.substr(0, 80) << " split at " << split;
+        }
+    }
+}
+
+namespace {
+
+// Each "a" becomes 1000 of them, each "b" goes, and "!" is added at the end of input.
+int growing_filter(soap *ctx, char *buffer, std::size_t *length, std::size_t size)
+{
+    std::string out;
+    for (std::size_t i = 0; i < *length; ++i)
+        out += buffer[i] == 'a' ? std::string(1000, 'a') : std::string(buffer[i] != 'b', buffer[i]);
+    if (*length == 0 && ctx->filter_stop == 0 && ctx->user == nullptr) {
+        out = "!";
+        ctx->user = ctx;
+    }
+    EXPECT_LE(out.size(), size);
+    std::copy(out.begin(), out.end(), buffer);
+    *length = out.size();
+    return 0;
+}
+
+// A head reader behind which the filter starts.
+int filtering_head(soap *ctx)
+{
+    const int result = http_read_head(ctx);
+    ctx->on_recv_filter = growing_filter;
+    return result;
+}
+
+} // namespace
+
+TEST(buffered_in, a_receive_filter_may_grow_shrink_and_hold_back)
+{
+    std::string chunks, expected;
+    for (int i = 0; i < 200; ++i) {
+        chunks += chunk("ca") + chunk("bb");
+        expected += "c" + std::string(1000, 'a');
+    }
+    memory_wire wire;
+    wire.on_read_head = filtering_head;
+    wire.receive(CHUNKED_HEAD + chunks + "0\r\n\r\n");
+    const outcome result = read_message(wire);
+    EXPECT_EQ(result.begun, 0);
+    EXPECT_TRUE(result.body == expected + "!") << result.body.size();
+    EXPECT_EQ(result.finished, 0);
+    EXPECT_EQ(wire.on_recv_filter, nullptr);
+
+    const std::string gzip = gzipped("<abc>");
+    wire.user = nullptr;
+    wire.receive(OK_HEAD + "Content-Encoding: gzip\r\nTransfer-Encoding: chunked\r\n\r\n" + chunk(gzip) +
+                 "0\r\n\r\n");
+    EXPECT_EQ(read_message(wire), (outcome{0, "<" + std::string(1000, 'a') + "c>!", 0, true}));
+}
+
+TEST(buffered_in, a_filter_that_claims_too_much_is_stopped)
+{
+    memory_wire wire;
+    wire.receive("<a/>");
+    wire.on_recv_filter = [](soap *, char *, std::size_t *length, std::size_t size) {
+        *length = size + 1;
+        return 0;
+    };
+    EXPECT_EQ(soap_receive_begin(&wire), SOAP_CORRUPTION);
+    EXPECT_LE(wire.buffer_index, wire.buffer_length);
+}
+
+TEST(buffered_in, blocks_hold_their_bytes_and_cost_no_more_than_what_came)
+{
+    memory_wire wire;
+    wire.receive("<abcde...<wxyz");
+    wire.piece = [](std::size_t) { return 3; };
+    ASSERT_EQ(soap_receive_begin(&wire), 0);
+    const char *block = soap_recv_bytes_block(&wire, 6);
+    ASSERT_NE(block, nullptr);
+    EXPECT_STREQ(block, "<abcde");
+    EXPECT_EQ(soap_recv_byte(&wire), '.'); // two bytes of padding are gone
+    EXPECT_STREQ(soap_recv_bytes_block(&wire, 0), "");
+    EXPECT_EQ(soap_recv_bytes_block(&wire, 0xFFFFFFFFU), nullptr);
+    EXPECT_EQ(wire.error, SOAP_EOF);
+    EXPECT_EQ(wire.block_stack, nullptr);
+
+    std::string large(300000, 'q');
+    large[0] = '<';
+    wire.receive(large);
+    wire.piece = nullptr;
+    ASSERT_EQ(soap_receive_begin(&wire), 0);
+    block = soap_recv_bytes_block(&wire, large.size());
+    ASSERT_NE(block, nullptr);
+    EXPECT_TRUE(large == block);
+}
+
+TEST(buffered_in, a_chunked_record_reads_as_one_text)
+{
+    const auto header = [](unsigned flags, std::size_t length) {
+        std::string bytes(12, '\0');
+        bytes[0] = static_cast<char>(0x08 | flags);
+        bytes[11] = static_cast<char>(length);
+        return bytes;
+    };
+    // The first header is taken as read: 5 bytes follow, padded, then two chunks and one without bytes.
+    const std::string tail = std::string("<abcd\0\0\0", 8) + header(1, 4) + "efgh" + header(1, 0) +
+                             header(0, 3) + std::string("ij>\0", 4) + "beyond";
+    for (std::size_t split = 1; split <= tail.size() + 1; ++split) {
+        memory_wire wire;
+        wire.receive(std::string(1, 'h') + tail);
+        wire.piece = [split](std::size_t given) { return given < split ? split - given : SOAP_BUFFER_SIZE; };
+        ASSERT_EQ(soap_recv_byte(&wire), 'h');
+        wire.mode = MODE_DIME;
+        wire.dime.flags = 1;
+        wire.dime.size = 5;
+        soap_dime_data_begin(&wire);
+        std::string text;
+        while (text.size() < 12)
+            text += static_cast<char>(soap_recv_byte(&wire));
+        EXPECT_EQ(text, "<abcdefghij>") << "split at " << split;
+        EXPECT_EQ(wire.dime.size, 3U);
+        EXPECT_EQ(wire.message_count - (wire.buffer_length - wire.buffer_index), 3U) << "split at " << split;
+    }
+    memory_wire wire;
+    wire.receive(std::string("h<abcd\0\0\0\x70", 10) + std::string(40, 'x'));
+    soap_recv_byte(&wire);
+    wire.mode = MODE_DIME;
+    wire.dime.flags = 1;
+    wire.dime.size = 5;
+    soap_dime_data_begin(&wire);
+    EXPECT_EQ(wire.read_all(), "<abcd");
+    EXPECT_EQ(wire.error, SOAP_DIME_VERSION);
+}
+
+TEST(buffered_in, the_message_is_found_among_its_attachments)
+{
+    const std::string parts = "ignored -- text\r\n--b\r\nContent-ID: <other>\r\n\r\nfirst\r\n"
+                              "--b\r\nContent-ID: <root>\r\n\r\n<a/>\r\n--b--\r\n";
+    const std::string head =
+        "HTTP/1.1 200 OK\r\nContent-Type: multipart/related; boundary=b; start=\"<root>\"\r\n"
+        "Content-Length: " +
+        std::to_string(parts.size()) + "\r\n\r\n";
+    // A record whose chunk flag is set, its second chunk, and an attachment.
+    const std::string records = std::string("\x0D\x20\0\0\0\0\0\0\0\0\0\x02<a\0\0", 16) +
+                                std::string("\x08\0\0\0\0\0\0\0\0\0\0\x02/>\0\0", 16) +
+                                std::string("\x0A\x10\0\0\0\2\0\0\0\0\0\x03id\0\0xyz\0", 20);
+    for (const std::string &message : {head + parts, records}) {
+        for (std::size_t split = 1; split <= message.size(); ++split) {
+            memory_wire wire(MODE_KEEP_ALIVE);
+            wire.keep_alive = 1;
+            wire.receive(message);
+            wire.piece = [split](std::size_t given) {
+                return given < split ? split - given : SOAP_BUFFER_SIZE;
+            };
+            ASSERT_EQ(soap_receive_begin(&wire), 0) << "split at " << split;
+            std::string text;
+            for (int i = 0; i < 4; ++i)
+                text += static_cast<char>(soap_recv_byte(&wire));
+            EXPECT_EQ(text, "<a/>") << "split at " << split;
+            EXPECT_EQ(soap_receive_finish(&wire), 0) << "split at " << split;
+            const bool mime = message[0] == 'H';
+            EXPECT_EQ(wire.response_unfinished, !mime);
+            const soap_attachment *attachment = mime ? wire.mime.list : wire.dime.list;
+            ASSERT_NE(attachment, nullptr);
+            EXPECT_EQ(std::string(attachment->content, attachment->size), mime ? "first" : "xyz");
+        }
+        for (std::size_t cut = 0; cut < message.size(); ++cut) {
+            memory_wire wire;
+            wire.receive(message.substr(0, cut));
+            const bool failed = soap_receive_begin(&wire) != 0 || soap_recv_skip(&wire, 4) != 0 ||
+                                soap_receive_finish(&wire) != 0;
+            EXPECT_TRUE(failed || wire.response_unfinished) << "cut at " << cut;
+        }
+    }
+}
+
+TEST(buffered_in, the_trace_holds_raw_and_plain_bytes)
+{
+    const std::string path = testing::TempDir() + "buffered_in_trace_" + std::to_string(getpid()) + ".log";
+    std::remove(path.c_str());
+    {
+        memory_wire wire;
+        ASSERT_EQ(soap_log_set_received(&wire, path.c_str()), 0);
+        const std::string gzip = gzipped("<plain/>");
+        wire.receive(gzip);
+        EXPECT_EQ(read_message(wire).finished, 0);
+        std::ifstream file(path, std::ios::binary);
+        const std::string trace{std::istreambuf_iterator<char>(file), std::istreambuf_iterator<char>()};
+        EXPECT_EQ(trace, gzip + "<plain/>");
+    }
+    std::remove(path.c_str());
+}
+
+TEST(buffered_in, a_reading_that_stops_midway_leaves_the_connection_unusable)
+{
+    memory_wire wire(MODE_KEEP_ALIVE, MODE_KEEP_ALIVE);
+    wire.keep_alive = 1;
+    wire.receive(with_length("<a/>", 4));
+    ASSERT_EQ(soap_receive_begin(&wire), 0);
+    EXPECT_TRUE(wire.response_unfinished);
+    wire.buffer_index = wire.buffer_length;
+    wire.receive(OK_HEAD + "Content-Encoding: gzip\r\n\r\n" + gzipped("<a/>"));
+    ASSERT_EQ(soap_receive_begin(&wire),
+              0); // the stream left running by the next line is ended by a new message
+    ASSERT_EQ(wire.zlib_state, 2);
+    wire.buffer_index = wire.buffer_length;
+    wire.receive(with_length("<b/>", 4));
+    EXPECT_EQ(read_message(wire).body, "<b/>");
+    EXPECT_EQ(wire.zlib_state, 0);
+}

@@ -1,0 +1,384 @@
+// How a message leaves: modes, stages, framing on the wire, hooks, failures.
+#include <cstdio>
+#include <fstream>
+#include <iterator>
+#include <string>
+
+#include <gtest/gtest.h>
+#include <unistd.h>
+#include <zlib.h>
+
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_http.h>
+#include <zuv_client_pro/soap_io.h>
+
+#include "support/memory_wire.h"
+
+namespace {
+
+constexpr std::uint32_t HOST_BITS = MODE_IO_MASK | MODE_COUNTING | MODE_BARE_XML | MODE_DEFLATE | MODE_DIME |
+                                    MODE_MIME | MODE_MTOM | MODE_UDP;
+
+std::string seen; // by hooks
+
+int see(soap *, const char *data, std::size_t length)
+{
+    seen.append(data, length);
+    return 0;
+}
+int see_begin(soap *)
+{
+    return seen += '[', 0;
+}
+int see_end(soap *)
+{
+    return seen += ']', 0;
+}
+
+int write_test_head(soap *ctx, std::uint64_t count)
+{
+    return soap_send_text(ctx, ("HEAD " + std::to_string(count) + "\n").c_str());
+}
+int test_response(soap *ctx, int, std::uint64_t count)
+{
+    return write_test_head(ctx, count);
+}
+int test_post(soap *ctx, const char *, const char *, int, const char *, const char *, std::uint64_t count)
+{
+    return write_test_head(ctx, count);
+}
+
+// The whole road of a body, without a head but that of a stored message.
+int send_message(memory_wire &wire, const std::string &body, std::size_t step = 7)
+{
+    const auto write = [&] {
+        for (std::size_t at = 0; at < body.size(); at += step) {
+            if (soap_send_bytes(&wire, body.data() + at, std::min(step, body.size() - at)) != 0)
+                return wire.error;
+        }
+        return 0;
+    };
+    if (soap_count_begin(&wire) != 0)
+        return wire.error;
+    if ((wire.mode & MODE_COUNTING) != 0 && write() != 0)
+        return wire.error;
+    if (soap_count_end(&wire) != 0 || soap_send_begin(&wire) != 0 || write() != 0)
+        return wire.error;
+    return soap_send_finish(&wire);
+}
+
+std::string text_of_size(std::size_t size)
+{
+    std::string text;
+    for (unsigned i = 1; text.size() < size; i = i * 1103515245U + 12345U)
+        text += std::to_string(i >> 8) + "<a/>";
+    text.resize(size);
+    return text;
+}
+
+// zlib's own reading of a stream: window bits 31 for gzip with head and trailer checked, 15 for deflate.
+std::string inflated(const std::string &bytes, int window_bits, const char *dictionary = nullptr)
+{
+    z_stream stream{};
+    EXPECT_EQ(inflateInit2(&stream, window_bits), Z_OK);
+    if (dictionary != nullptr && window_bits < 0) {
+        EXPECT_EQ(inflateSetDictionary(&stream, reinterpret_cast<const Bytef *>(dictionary),
+                                       static_cast<uInt>(std::strlen(dictionary))),
+                  Z_OK);
+    }
+    std::string out(4U << 20, '\0');
+    stream.next_in = reinterpret_cast<Bytef *>(const_cast<char *>(bytes.data()));
+    stream.avail_in = static_cast<uInt>(bytes.size());
+    stream.next_out = reinterpret_cast<Bytef *>(out.data());
+    stream.avail_out = static_cast<uInt>(out.size());
+    int result = inflate(&stream, Z_FINISH);
+    if (result == Z_NEED_DICT && dictionary != nullptr) {
+        inflateSetDictionary(&stream, reinterpret_cast<const Bytef *>(dictionary),
+                             static_cast<uInt>(std::strlen(dictionary)));
+        result = inflate(&stream, Z_FINISH);
+    }
+    EXPECT_EQ(result, Z_STREAM_END);
+    out.resize(stream.total_out);
+    inflateEnd(&stream);
+    return out;
+}
+
+unsigned long least_first(const std::string &bytes, std::size_t at)
+{
+    unsigned long value = 0;
+    for (std::size_t i = 4; i-- > 0;)
+        value = value << 8 | static_cast<unsigned char>(bytes[at + i]);
+    return value;
+}
+
+struct mode_row {
+    const char *rule;
+    std::uint32_t output_mode;
+    bool prepare_hook;
+    bool socket_open;
+    std::uint64_t counted;
+    std::uint32_t counting; // ctx->mode after soap_count_begin
+    std::uint32_t sending;  // ctx->mode after soap_send_begin
+};
+
+constexpr std::uint32_t B = MODE_BUFFERED, S = MODE_STORE, C = MODE_CHUNKED, N = MODE_COUNTING,
+                        X = MODE_BARE_XML, Z = MODE_DEFLATE, U = MODE_UDP, D = MODE_DIME, M = MODE_MIME,
+                        T = MODE_MTOM;
+const mode_row MODES[] = {
+    {"direct, no socket", 0, false, false, 9, N, 0},
+    {"direct to a socket, counted", 0, false, true, 9, N, B},
+    {"bare direct to a socket", X, false, true, 0, X, X | B},
+    {"buffered", B, false, true, 9, B | N, B},
+    {"buffered bare", B | X, false, true, 0, B | X, B | X},
+    {"buffered bare, hook", B | X, true, true, 9, B | X | N, B | X},
+    {"store", S, false, true, 0, S, S},
+    {"store, hook", S, true, true, 0, S, S},
+    {"chunked", C, false, true, 0, C, C},
+    {"chunked, hook", C, true, true, 9, C | N, C},
+    {"direct deflate", Z, false, true, 0, Z | S, Z | S},
+    {"direct deflate bare", Z | X, false, true, 0, Z | X | B, Z | X | B},
+    {"buffered deflate", Z | B, false, true, 0, Z | S, Z | S},
+    {"buffered deflate bare", Z | B | X, false, true, 0, Z | X | B, Z | X | B},
+    {"chunked deflate", Z | C, false, true, 0, Z | C, Z | C},
+    {"stored deflate", Z | S, false, true, 0, Z | S, Z | S},
+    {"datagram", U, false, true, 0, U | X, U | X | B},
+    {"datagram, hook", U | B, true, true, 9, U | X | B | N, U | X | B},
+    {"DIME", B | D, false, true, 9, B | D | N, B | D},
+    {"DIME stored", S | D, false, true, 9, S | D | N, S | D},
+    {"DIME deflate", Z | D, false, true, 9, Z | S | D | N, Z | S | D},
+    {"MTOM alone means nothing", B | T, false, true, 9, B | N, B},
+    {"MTOM in MIME", B | T | M, false, true, 9, B | T | M | N, B | T | M},
+    {"DIME and MTOM is MIME", B | D | T, false, true, 9, B | D | T | M | N, B | T | M},
+};
+
+} // namespace
+
+TEST(buffered_out, modes_are_settled_by_the_table)
+{
+    for (const mode_row &row : MODES) {
+        memory_wire wire(0, row.output_mode);
+        wire.on_send_prepare = row.prepare_hook ? see : nullptr;
+        ASSERT_EQ(soap_count_begin(&wire), 0) << row.rule;
+        EXPECT_EQ(wire.mode & HOST_BITS, row.counting) << row.rule;
+        wire.message_count = row.counted;
+        wire.socket = row.socket_open ? 77 : -1;
+        ASSERT_EQ(soap_send_begin(&wire), 0) << row.rule;
+        EXPECT_EQ(wire.mode & HOST_BITS, row.sending) << row.rule;
+        EXPECT_EQ(wire.message_part, PART_BEGIN);
+        wire.socket = -1;
+    }
+}
+
+TEST(buffered_out, an_uncounted_direct_message_to_a_socket_is_stored)
+{
+    memory_wire wire;
+    wire.mode = 0;
+    wire.socket = 77;
+    ASSERT_EQ(soap_send_begin(&wire), 0);
+    EXPECT_EQ(wire.mode & MODE_IO_MASK, MODE_STORE);
+    wire.socket = -1;
+}
+
+TEST(buffered_out, literal_messages_are_trees_unless_a_graph_is_asked_for)
+{
+    memory_wire wire(0, MODE_BUFFERED);
+    wire.encoding_style = nullptr;
+    soap_count_begin(&wire);
+    EXPECT_TRUE(wire.mode & SOAP_XML_TREE);
+    wire.output_mode |= SOAP_XML_GRAPH;
+    soap_count_begin(&wire);
+    EXPECT_FALSE(wire.mode & SOAP_XML_TREE);
+    soap_send_begin(&wire);
+    EXPECT_FALSE(wire.mode & SOAP_XML_TREE);
+}
+
+TEST(buffered_out, the_buffer_leaves_when_it_is_exactly_full)
+{
+    memory_wire wire(0, MODE_BUFFERED);
+    const std::string body = text_of_size(SOAP_BUFFER_SIZE);
+    ASSERT_EQ(soap_send_begin(&wire), 0);
+    soap_send_bytes(&wire, body.data(), SOAP_BUFFER_SIZE - 1);
+    EXPECT_EQ(wire.sends.size(), 0U);
+    soap_send_bytes(&wire, body.data() + SOAP_BUFFER_SIZE - 1, 1);
+    ASSERT_EQ(wire.sends.size(), 1U);
+    EXPECT_EQ(wire.sends[0], body);
+    EXPECT_EQ(wire.buffer_index, 0U);
+    ASSERT_EQ(soap_send_finish(&wire), 0);
+    EXPECT_EQ(wire.sends.size(), 1U);
+    EXPECT_EQ(wire.message_part, PART_OUTSIDE);
+}
+
+TEST(buffered_out, each_mode_has_its_form_on_the_wire)
+{
+    struct {
+        std::uint32_t mode;
+        int status;
+        const char *wire;
+    } rows[] = {
+        {MODE_DIRECT, 0, "hello world"},
+        {MODE_BUFFERED, 0, "hello world"},
+        {MODE_CHUNKED, 0, "B\r\nhello world\r\n0\r\n\r\n"},
+        {MODE_STORE, 0, "HEAD 11\nhello world"},
+        {MODE_STORE, STATUS_POST, "HEAD 11\nhello world"},
+        {MODE_STORE, STATUS_STOP, "hello world"},
+        {MODE_STORE | MODE_BARE_XML, 0, "hello world"},
+    };
+    for (const auto &row : rows) {
+        memory_wire wire(0, row.mode | MODE_WSU_ID);
+        wire.on_response = test_response;
+        wire.on_post = test_post;
+        wire.status = row.status;
+        ASSERT_EQ(send_message(wire, "hello world"), 0);
+        EXPECT_EQ(wire.sent(), row.wire) << std::hex << row.mode << ' ' << std::dec << row.status;
+        EXPECT_EQ(wire.output_mode, row.mode);
+        EXPECT_EQ(wire.message_count, 0U);
+        EXPECT_EQ(wire.block_stack, nullptr);
+        EXPECT_EQ(wire.response_unfinished, row.status >= STATUS_POST);
+    }
+}
+
+TEST(buffered_out, later_chunks_close_the_ones_before)
+{
+    memory_wire wire(0, MODE_CHUNKED);
+    const std::string body = text_of_size(SOAP_BUFFER_SIZE + 10);
+    ASSERT_EQ(send_message(wire, body, 999), 0);
+    EXPECT_EQ(wire.sent(), "10000\r\n" + body.substr(0, SOAP_BUFFER_SIZE) + "\r\nA\r\n" +
+                               body.substr(SOAP_BUFFER_SIZE) + "\r\n0\r\n\r\n");
+}
+
+TEST(buffered_out, compressed_streams_are_what_zlib_reads)
+{
+    static const char DICTIONARY[] = "<a/><a/>1234567890";
+    for (const char *dictionary : {static_cast<const char *>(nullptr), DICTIONARY}) {
+        for (const int encoding : {1, 2, 0}) {
+            for (const std::size_t size : {0U, 1U, 1000U, 65536U, 700000U}) {
+                memory_wire wire(0, MODE_BUFFERED | MODE_BARE_XML | MODE_DEFLATE);
+                wire.zlib_dictionary = dictionary;
+                wire.zlib_dictionary_length = dictionary != nullptr ? sizeof DICTIONARY - 1 : 0;
+                wire.zlib_out = static_cast<std::int16_t>(encoding);
+                const std::string body = text_of_size(size);
+                ASSERT_EQ(send_message(wire, body, 4096), 0);
+                const std::string stream = wire.sent();
+                if (encoding == 1) {
+                    EXPECT_EQ(inflated(stream, 15, dictionary), body);
+                } else if (dictionary == nullptr) {
+                    EXPECT_EQ(inflated(stream, 31), body); // checks the trailer too
+                    EXPECT_EQ(stream.substr(0, 10), std::string("\x1F\x8B\x08\0\0\0\0\0\0\xFF", 10));
+                } else {
+                    EXPECT_EQ(stream.substr(0, 10), std::string("\x1F\x8B\xFF\0\0\0\0\0\0\xFF", 10));
+                    EXPECT_EQ(inflated(stream.substr(10, stream.size() - 18), -15, dictionary), body);
+                    EXPECT_EQ(
+                        least_first(stream, stream.size() - 8),
+                        crc32(0, reinterpret_cast<const Bytef *>(body.data()), static_cast<uInt>(size)));
+                    EXPECT_EQ(least_first(stream, stream.size() - 4), size);
+                }
+                EXPECT_EQ(wire.zlib_state, 0);
+                if (size >= 65536U) {
+                    EXPECT_GT(wire.zlib_ratio_out, 0.0F);
+                    EXPECT_LT(wire.zlib_ratio_out, 1.0F);
+                }
+            }
+        }
+    }
+}
+
+TEST(buffered_out, the_prepare_hooks_see_each_byte_once_and_ahead_of_the_head)
+{
+    const std::string body = text_of_size(200000);
+    for (const std::uint32_t mode :
+         {MODE_DIRECT, MODE_BUFFERED, MODE_STORE, MODE_CHUNKED, MODE_BUFFERED | MODE_BARE_XML,
+          MODE_CHUNKED | MODE_DEFLATE, MODE_STORE | MODE_DEFLATE, MODE_DEFLATE,
+          MODE_BUFFERED | MODE_BARE_XML | MODE_DEFLATE, MODE_DEFLATE | MODE_BARE_XML}) {
+        memory_wire wire(0, mode);
+        wire.on_response = test_response;
+        wire.on_send_prepare_begin = see_begin;
+        wire.on_send_prepare = see;
+        wire.on_send_prepare_end = see_end;
+        seen.clear();
+        ASSERT_EQ(send_message(wire, body, 3001), 0);
+        EXPECT_TRUE(seen == '[' + body + ']') << std::hex << mode << ' ' << seen.size();
+    }
+}
+
+TEST(buffered_out, a_send_filter_changes_what_is_counted_and_sent)
+{
+    memory_wire wire(0, MODE_BUFFERED);
+    wire.on_send_filter = [](soap *, const char **data, std::size_t *length) {
+        if (**data == 'x')
+            *length = 0;
+        else
+            *data = "abc", *length = 3;
+        return 0;
+    };
+    soap_count_begin(&wire);
+    soap_send_text(&wire, "12345");
+    soap_send_text(&wire, "x");
+    EXPECT_EQ(soap_message_length(&wire), 3U);
+    soap_send_begin(&wire);
+    soap_send_text(&wire, "12345");
+    soap_send_text(&wire, "x");
+    ASSERT_EQ(soap_send_finish(&wire), 0);
+    EXPECT_EQ(wire.sent(), "abc");
+}
+
+TEST(buffered_out, a_datagram_is_one_send_or_an_error)
+{
+    memory_wire wire(0, MODE_UDP | MODE_BUFFERED);
+    ASSERT_EQ(send_message(wire, text_of_size(SOAP_BUFFER_SIZE), 1000), 0);
+    EXPECT_EQ(wire.sends.size(), 1U);
+    wire.sends.clear();
+    EXPECT_EQ(send_message(wire, text_of_size(SOAP_BUFFER_SIZE + 1), 1000), SOAP_UDP_ERROR);
+    EXPECT_EQ(wire.sends.size(), 0U);
+    wire.message_count = SOAP_BUFFER_SIZE + 1;
+    EXPECT_EQ(soap_send_begin(&wire), SOAP_UDP_ERROR);
+}
+
+TEST(buffered_out, padding_reaches_the_next_multiple_of_four)
+{
+    for (std::size_t length = 0; length < 9; ++length) {
+        memory_wire wire(0, MODE_BUFFERED);
+        soap_send_begin(&wire);
+        ASSERT_EQ(soap_send_padded(&wire, "12345678", length), 0);
+        soap_send_finish(&wire);
+        EXPECT_EQ(wire.sent(), std::string("12345678", length) + std::string((4 - length % 4) % 4, '\0'));
+    }
+}
+
+TEST(buffered_out, every_send_may_fail_and_leaves_nothing_behind)
+{
+    const std::string body = text_of_size(300000);
+    for (const std::uint32_t mode :
+         {MODE_BUFFERED, MODE_STORE, MODE_CHUNKED, MODE_CHUNKED | MODE_DEFLATE, MODE_STORE | MODE_DEFLATE,
+          MODE_BUFFERED | MODE_DEFLATE | MODE_BARE_XML}) {
+        memory_wire counter(0, mode);
+        counter.on_response = test_response;
+        ASSERT_EQ(send_message(counter, body, 5000), 0);
+        for (std::size_t limit = 0; limit < counter.sends.size(); ++limit) {
+            memory_wire wire(0, mode);
+            wire.on_response = test_response;
+            wire.send_limit = limit;
+            EXPECT_EQ(send_message(wire, body, 5000), SOAP_EOF)
+                << std::hex << mode << " at " << std::dec << limit;
+            EXPECT_LE(wire.buffer_index, SOAP_BUFFER_SIZE);
+            soap_send_finish(&wire);
+            EXPECT_EQ(wire.zlib_state, 0);
+            EXPECT_EQ(wire.block_stack, nullptr);
+        }
+    }
+}
+
+TEST(buffered_out, the_trace_holds_every_byte_sent)
+{
+    const std::string path = testing::TempDir() + "buffered_out_trace_" + std::to_string(getpid()) + ".log";
+    std::remove(path.c_str());
+    {
+        memory_wire wire(0, MODE_CHUNKED | MODE_DEFLATE);
+        ASSERT_EQ(soap_log_set_sent(&wire, path.c_str()), 0);
+        ASSERT_EQ(send_message(wire, text_of_size(500000), 5000), 0);
+        std::ifstream file(path, std::ios::binary);
+        const std::string trace{std::istreambuf_iterator<char>(file), std::istreambuf_iterator<char>()};
+        EXPECT_TRUE(trace == wire.sent());
+        EXPECT_FALSE(trace.empty());
+    }
+    std::remove(path.c_str());
+}

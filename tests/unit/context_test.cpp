@@ -1,0 +1,386 @@
+// context_test.cpp - life of a context: defaults, reset, discard, end, copies.
+#include <zuv_client_pro/soap.h>
+
+#include <cstring>
+#include <memory>
+#include <string>
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <openssl/ssl.h>
+#include <sys/socket.h>
+#include <unistd.h>
+#include <zlib.h>
+
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_http.h>
+#include <zuv_client_pro/soap_log.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_plugin.h>
+#include <zuv_client_pro/soap_tcp.h>
+#include <zuv_client_pro/soap_tls.h>
+
+#include "support/failing_malloc.h"
+
+namespace {
+
+using testing::internal::CaptureStderr;
+using testing::internal::GetCapturedStderr;
+
+// What a new context and an ended one have in common.
+void expect_default_callbacks(const soap &ctx)
+{
+    EXPECT_EQ(ctx.on_post, http_write_request);
+    EXPECT_EQ(ctx.on_get, http_get_default);
+    EXPECT_EQ(ctx.on_put, http_put_default);
+    EXPECT_EQ(ctx.on_delete, http_delete_default);
+    EXPECT_EQ(ctx.on_options, http_method_default);
+    EXPECT_EQ(ctx.on_head, http_method_default);
+    EXPECT_EQ(ctx.on_header_line, http_write_line);
+    EXPECT_EQ(ctx.on_response, http_write_response);
+    EXPECT_EQ(ctx.on_read_head, http_read_head);
+    EXPECT_EQ(ctx.on_parse_header, http_parse_header);
+    EXPECT_EQ(ctx.on_open, tcp_connect);
+    EXPECT_EQ(ctx.on_close, tcp_disconnect);
+    EXPECT_EQ(ctx.on_send, tcp_send);
+    EXPECT_EQ(ctx.on_recv, tcp_recv);
+    EXPECT_EQ(ctx.on_poll, tcp_peek);
+    EXPECT_EQ(ctx.on_find_plugin, soap_plugin_find);
+    EXPECT_NE(ctx.on_close_socket, nullptr);
+    EXPECT_NE(ctx.on_shutdown_socket, nullptr);
+    EXPECT_NE(ctx.on_accept, nullptr);
+    EXPECT_EQ(ctx.on_form, nullptr);
+    EXPECT_EQ(ctx.on_connect, nullptr);
+    EXPECT_EQ(ctx.on_malloc, nullptr);
+    EXPECT_EQ(ctx.on_recv_filter, nullptr);
+    EXPECT_EQ(ctx.mime_write, nullptr);
+}
+
+TEST(Context, StartsWithItsDefaults)
+{
+    soap ctx;
+    EXPECT_EQ(ctx.state, 1);
+    EXPECT_EQ(ctx.soap_version, 0);
+    EXPECT_STREQ(ctx.float_format, "%.9G");
+    EXPECT_STREQ(ctx.double_format, "%.17lG");
+    EXPECT_STREQ(ctx.dime_id_format, "cid:id%d");
+    EXPECT_STREQ(ctx.http_version, "1.1");
+    EXPECT_STREQ(ctx.encoding_style, "");
+    EXPECT_STREQ(ctx.language, "en");
+    EXPECT_EQ(ctx.namespaces, soap_program_namespaces);
+    EXPECT_EQ(ctx.local_namespaces, nullptr);
+    EXPECT_EQ(ctx.master_socket, -1);
+    EXPECT_EQ(ctx.socket, -1);
+    EXPECT_EQ(ctx.send_fd, 1);
+    EXPECT_EQ(ctx.recv_fd, 0);
+    EXPECT_EQ(ctx.max_depth, 4096u);
+    EXPECT_EQ(ctx.message_part, 9);
+    EXPECT_STREQ(ctx.path, "/");
+    EXPECT_STREQ(ctx.endpoint, "");
+    EXPECT_EQ(ctx.keep_alive_limit, 100u);
+    EXPECT_STREQ(ctx.proxy_http_version, "1.0");
+    EXPECT_EQ(ctx.proxy_port, 8080);
+    EXPECT_STREQ(ctx.log_paths[SOAP_LOG_RECEIVED], "wsTrace.log");
+    EXPECT_STREQ(ctx.log_paths[SOAP_LOG_SENT], "wsTrace.log");
+    EXPECT_NE(ctx.log_paths[SOAP_LOG_SENT], ctx.log_paths[SOAP_LOG_RECEIVED]);
+    EXPECT_EQ(ctx.log_paths[SOAP_LOG_THIRD], nullptr);
+    EXPECT_EQ(ctx.tls_flags, 1);
+    EXPECT_EQ(ctx.tls_setup, tls_context_setup);
+    EXPECT_EQ(ctx.tls_verify, tls_verify_plain);
+    EXPECT_EQ(ctx.tls_context, nullptr);
+    ASSERT_NE(ctx.zlib_stream, nullptr);
+    EXPECT_EQ(ctx.zlib_stream->zalloc, nullptr);
+    EXPECT_EQ(ctx.zlib_buffer, nullptr);
+    EXPECT_EQ(ctx.zlib_level, 6);
+    EXPECT_EQ(ctx.error, 0);
+    expect_default_callbacks(ctx);
+}
+
+TEST(Context, EachConstructorSetsItsModes)
+{
+    const soap one(MODE_STRICT), two(MODE_STRICT, MODE_CHUNKED);
+    EXPECT_EQ(one.input_mode, MODE_STRICT);
+    EXPECT_EQ(one.output_mode, MODE_STRICT);
+    EXPECT_EQ(two.input_mode, MODE_STRICT);
+    EXPECT_EQ(two.output_mode, MODE_CHUNKED);
+    EXPECT_EQ(two.mode, MODE_CHUNKED);
+    soap *made = soap_context_create(MODE_KEEP_ALIVE, MODE_STORE);
+    EXPECT_EQ(made->input_mode, MODE_KEEP_ALIVE);
+    EXPECT_EQ(made->mode, MODE_STORE);
+    soap_context_free(made);
+    soap_context_free(soap_context_create());
+    soap_context_free(nullptr);
+}
+
+TEST(Context, EndsQuietlyAndOnlyOnce)
+{
+    CaptureStderr();
+    {
+        soap ctx;
+        ctx.on_post = nullptr;
+        ctx.on_malloc = [](soap *, std::size_t) -> void * { return nullptr; };
+        soap_engine_done(&ctx);
+        EXPECT_EQ(ctx.state, 0);
+        expect_default_callbacks(ctx);
+        soap_engine_done(&ctx);
+        soap_discard_all(&ctx);
+        soap_discard_objects(&ctx, nullptr);
+        soap_block_free(&ctx, nullptr);
+        soap_context_init(&ctx);
+        EXPECT_EQ(ctx.state, 1) << "an ended record may start again";
+    }
+    EXPECT_EQ(GetCapturedStderr(), "");
+    EXPECT_NE(fcntl(0, F_GETFD), -1);
+    EXPECT_NE(fcntl(1, F_GETFD), -1);
+}
+
+TEST(Context, TheEndClosesWhatTheContextOpened)
+{
+    int pair[2];
+    ASSERT_EQ(socketpair(AF_UNIX, SOCK_STREAM, 0, pair), 0);
+    {
+        soap ctx;
+        ctx.master_socket = pair[0];
+        ctx.socket = pair[1];
+        ctx.output_mode = MODE_UDP;
+    }
+    EXPECT_EQ(fcntl(pair[0], F_GETFD), -1);
+    EXPECT_EQ(fcntl(pair[1], F_GETFD), -1) << "of a datagram context too";
+}
+
+// A class with members where the base's padding lies, deleted through the base.
+struct derived : soap {
+    derived() : soap(MODE_STRICT) {}
+    explicit derived(const soap &other) : soap(other) {}
+    ~derived() override { ++ended; }
+    static int ended;
+    char first_member = 'm';
+};
+int derived::ended = 0;
+
+TEST(Context, LeavesDerivedClassesAlone)
+{
+    auto made = std::make_unique<derived>();
+    made->first_member = 'k';
+    soap_engine_done(made.get());
+    const soap source(MODE_STORE);
+    soap_context_assign(made.get(), &source);
+    EXPECT_EQ(made->output_mode, MODE_STORE);
+    EXPECT_EQ(made->first_member, 'k');
+    soap_context_init(made.get()); // drops what the assignment shared
+    EXPECT_EQ(made->first_member, 'k');
+    std::unique_ptr<soap> base = std::move(made);
+    {
+        const derived copy(*base);
+        EXPECT_EQ(copy.first_member, 'm');
+        EXPECT_EQ(copy.state, 2);
+    }
+    base.reset();
+    EXPECT_EQ(derived::ended, 2);
+}
+
+TEST(Context, ResetClearsTheMessageAndKeepsTheRest)
+{
+    soap ctx(MODE_KEEP_ALIVE, 0);
+    ctx.buffer_index = 3;
+    ctx.buffer_length = 9;
+    ctx.keep_alive = 1;
+    ctx.soap_version = 2;
+    ctx.mode = MODE_CHUNKED;
+    ctx.message_part = PART_BODY;
+    ctx.message_count = ctx.content_length = 5;
+    ctx.look_ahead = -1;
+    ctx.nesting_level = 3;
+    ctx.error = 5;
+    ctx.next_id = 4;
+    ctx.peeked = ctx.null_flag = ctx.in_cdata = 1;
+    ctx.dime.chunk_size = ctx.dime.buffer_length = 8;
+    std::strcpy(ctx.endpoint, "http://x");
+    char *kept = soap_string_dup(&ctx, "managed");
+    soap_reset_call(&ctx);
+    EXPECT_EQ(ctx.buffer_index, 3u) << "bytes of a kept connection";
+    EXPECT_EQ(ctx.buffer_length, 9u);
+    EXPECT_EQ(ctx.keep_alive, 1);
+    EXPECT_EQ(ctx.soap_version, 2);
+    EXPECT_EQ(ctx.mode, 0u);
+    EXPECT_EQ(ctx.message_part, PART_OUTSIDE);
+    EXPECT_EQ(ctx.message_count + ctx.content_length, 0u);
+    EXPECT_EQ(ctx.look_ahead, 0);
+    EXPECT_EQ(ctx.nesting_level + ctx.next_id, 0u);
+    EXPECT_EQ(ctx.error, 0);
+    EXPECT_EQ(ctx.peeked + ctx.null_flag + ctx.in_cdata, 0);
+    EXPECT_EQ(ctx.dime.chunk_size + ctx.dime.buffer_length, 0u);
+    EXPECT_STREQ(ctx.endpoint, "");
+    EXPECT_STREQ(kept, "managed");
+    ctx.keep_alive = 0;
+    soap_reset_call(&ctx);
+    EXPECT_EQ(ctx.buffer_index + ctx.buffer_length, 0u);
+}
+
+TEST(Context, TheScratchOfACallIsFreedWhole)
+{
+    CaptureStderr();
+    {
+        soap ctx;
+        auto *attribute = static_cast<soap_attribute *>(SOAP_MALLOC(&ctx, sizeof(soap_attribute)));
+        *attribute = {};
+        attribute->value = static_cast<char *>(SOAP_MALLOC(&ctx, 8));
+        ctx.attribute_list = attribute;
+        auto *reference = static_cast<soap_attachment_ref *>(SOAP_MALLOC(&ctx, sizeof(soap_attachment_ref)));
+        *reference = {};
+        ctx.mtom_list = reference;
+        soap_text_buffer_put(&ctx, "x", 1);
+        soap_block_stack_push(&ctx);
+        soap_block_stack_grow(&ctx, nullptr, 8);
+        soap_block_stack_push(&ctx);
+        ASSERT_EQ(soap_set_namespaces(&ctx, soap_program_namespaces), 0);
+        ctx.local_namespaces[1].received = static_cast<char *>(SOAP_MALLOC(&ctx, 8));
+        ctx.encoding_style = ctx.local_namespaces[1].received;
+        soap_call_scratch_free(&ctx);
+        EXPECT_EQ(ctx.attribute_list, nullptr);
+        EXPECT_EQ(ctx.mtom_list, nullptr);
+        EXPECT_EQ(ctx.label_buffer, nullptr);
+        EXPECT_EQ(ctx.block_stack, nullptr);
+        EXPECT_EQ(ctx.local_namespaces, nullptr);
+        EXPECT_STREQ(ctx.encoding_style, "");
+    }
+    EXPECT_EQ(GetCapturedStderr(), "");
+}
+
+int count_hook(soap_instance *instance)
+{
+    ++*static_cast<int *>(instance->object);
+    return 0;
+}
+
+TEST(Context, DiscardForgetsInstancesThatTheDestructorDestroys)
+{
+    int destroyed = 0;
+    {
+        soap ctx;
+        soap_instance_register(&ctx, &destroyed, 1, -1, count_hook);
+        soap_discard_all(&ctx);
+        EXPECT_EQ(ctx.instance_list, nullptr);
+        EXPECT_EQ(destroyed, 0);
+        soap_instance_register(&ctx, &destroyed, 1, -1, count_hook);
+    }
+    EXPECT_EQ(destroyed, 1);
+}
+
+// ---------------------------------------------------------------------------------------------
+// Copies.
+
+TEST(ContextCopy, RefusesWhatIsNoContext)
+{
+    soap ended;
+    soap_engine_done(&ended);
+    soap target(MODE_STRICT);
+    EXPECT_EQ(soap_context_copy(&target, &ended), nullptr);
+    EXPECT_EQ(soap_context_copy(&target, nullptr), nullptr);
+    EXPECT_EQ(soap_context_copy(nullptr, &target), nullptr);
+    EXPECT_EQ(soap_context_copy(&ended), nullptr);
+    EXPECT_EQ(soap_context_copy(&target, &target), &target);
+    EXPECT_EQ(target.state, 1);
+    EXPECT_EQ(target.mode, MODE_STRICT) << "left as it was";
+    const soap of_ended(ended);
+    EXPECT_EQ(of_ended.state, 0);
+}
+
+TEST(ContextCopy, KeepsSettingsAndSharesNothingThatIsOwned)
+{
+    CaptureStderr();
+    {
+        soap source(MODE_STRICT, MODE_CHUNKED);
+        source.recv_timeout = 7;
+        source.proxy_host = "proxy";
+        source.error = 5;
+        source.auth_user = source.auth_password = source.action = source.http_content =
+            soap_string_dup(&source, "managed");
+        source.header = static_cast<SOAP_ENV__Header *>(soap_block_alloc(&source, 8));
+        soap_text_buffer_put(&source, "x", 1);
+        soap_block_stack_push(&source);
+        ASSERT_EQ(soap_set_namespaces(&source, soap_program_namespaces), 0);
+        soap_log_set_sent(&source, "sent.log");
+        source.zlib_buffer = static_cast<char *>(SOAP_MALLOC(&source, 16));
+        std::strcpy(source.tag, "scratch");
+
+        soap copy(source);
+        EXPECT_EQ(copy.state, 2);
+        EXPECT_EQ(copy.error, 0);
+        EXPECT_EQ(copy.input_mode, MODE_STRICT);
+        EXPECT_EQ(copy.recv_timeout, 7);
+        EXPECT_STREQ(copy.proxy_host, "proxy");
+        EXPECT_STREQ(copy.tag, "scratch");
+        EXPECT_STREQ(copy.log_paths[SOAP_LOG_SENT], "sent.log");
+        EXPECT_NE(copy.log_paths[SOAP_LOG_SENT], source.log_paths[SOAP_LOG_SENT]);
+        EXPECT_EQ(copy.namespaces, source.namespaces);
+        EXPECT_NE(copy.local_namespaces, nullptr);
+        EXPECT_NE(copy.local_namespaces, source.local_namespaces);
+        EXPECT_NE(copy.zlib_stream, source.zlib_stream);
+        EXPECT_EQ(copy.pointer_chains, copy.pointer_table);
+        for (const void *field :
+             {static_cast<const void *>(copy.auth_user), static_cast<const void *>(copy.auth_password),
+              static_cast<const void *>(copy.action), static_cast<const void *>(copy.http_content),
+              static_cast<const void *>(copy.header), static_cast<const void *>(copy.label_buffer),
+              static_cast<const void *>(copy.block_stack), static_cast<const void *>(copy.allocation_list),
+              static_cast<const void *>(copy.zlib_buffer)})
+            EXPECT_EQ(field, nullptr);
+        soap_text_buffer_put(&copy, "y", 1);
+        soap_string_dup(&copy, "its own");
+    }
+    EXPECT_EQ(GetCapturedStderr(), "");
+}
+
+TEST(ContextCopy, OutlivesItsSource)
+{
+    CaptureStderr();
+    auto source = std::make_unique<soap>();
+    soap_set_namespaces(source.get(), soap_program_namespaces);
+    soap *copy = soap_context_copy(source.get());
+    soap *second = soap_context_copy(copy);
+    source.reset();
+    EXPECT_STREQ(copy->local_namespaces[0].prefix, "SOAP-ENV");
+    soap_reset_call(copy);
+    soap_context_free(copy);
+    soap_context_free(second);
+    EXPECT_EQ(GetCapturedStderr(), "");
+}
+
+TEST(ContextCopy, LeavesTheTlsContextToItsSource)
+{
+    soap source;
+    source.tls_context = SSL_CTX_new(TLS_client_method());
+    {
+        soap copy(source);
+        EXPECT_EQ(copy.tls_context, source.tls_context);
+    }
+    SSL *connection = SSL_new(source.tls_context);
+    EXPECT_NE(connection, nullptr);
+    SSL_free(connection);
+}
+
+// ---------------------------------------------------------------------------------------------
+// Without memory.
+
+TEST(ContextExhausted, StartAndCopySurviveEveryRefusal)
+{
+    for (const auto how : {failing_malloc::refuse::one, failing_malloc::refuse::all_from}) {
+        CaptureStderr();
+        soap source;
+        soap_set_namespaces(&source, soap_program_namespaces);
+        soap *made = nullptr;
+        const auto end = [&](bool) {
+            soap_context_free(made);
+            made = nullptr;
+        };
+        EXPECT_GT(failing_malloc::at_each_allocation(
+                      how, [&] { made = soap_context_create(); }, end),
+                  3u);
+        EXPECT_GT(failing_malloc::at_each_allocation(
+                      how, [&] { made = soap_context_copy(&source); }, end),
+                  3u);
+        EXPECT_EQ(GetCapturedStderr(), "");
+    }
+}
+
+} // namespace

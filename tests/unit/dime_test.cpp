@@ -1,0 +1,354 @@
+// DIME records on the wire and back, streams, chunks, and lengths that lie.
+#include "support/attachment_exchange.h"
+
+#include <malloc.h>
+
+#include "support/failing_malloc.h"
+
+using namespace attachment_exchange;
+
+namespace {
+
+constexpr unsigned MB = 4, ME = 2, CF = 1;
+constexpr unsigned UNCHANGED = 0, MEDIA = 1, URI = 2;
+constexpr std::uint32_t SENDING = MODE_BUFFERED | MODE_BARE_XML;
+constexpr char ENVELOPE_URI[] = "http://schemas.xmlsoap.org/soap/envelope/";
+
+std::string number(std::size_t value, int bytes)
+{
+    std::string text;
+    for (int i = bytes; i-- > 0;)
+        text += static_cast<char>(value >> (8 * i) & 0xFF);
+    return text;
+}
+
+std::string padded(std::string bytes)
+{
+    bytes.append((4 - bytes.size() % 4) % 4, '\0');
+    return bytes;
+}
+
+std::string header(unsigned flags, unsigned format, std::size_t options, std::size_t id, std::size_t type,
+                   std::size_t size)
+{
+    return number(0x08 | flags, 1) + number(format << 4, 1) + number(options, 2) + number(id, 2) +
+           number(type, 2) + number(size, 4);
+}
+
+std::string record(unsigned flags, unsigned format, const std::string &id, const std::string &type,
+                   const std::string &data, const std::string &options = "")
+{
+    return header(flags, format, options.size(), id.size(), type.size(), data.size()) + padded(options) +
+           padded(id) + padded(type) + padded(data);
+}
+
+std::string envelope(const std::string &body)
+{
+    return std::string("<SOAP-ENV:Envelope xmlns:SOAP-ENV=\"") + ENVELOPE_URI + "\"><SOAP-ENV:Body>" + body +
+           "</SOAP-ENV:Body></SOAP-ENV:Envelope>\r\n";
+}
+
+std::string message_record(unsigned flags, const std::string &body)
+{
+    return record(MB | flags, URI, "cid:id0", ENVELOPE_URI, envelope(body));
+}
+
+TEST(dime_out, is_one_record_for_the_message_and_one_for_each_attachment)
+{
+    const std::string first = "first";
+    const std::string second = "second!!";
+    memory_wire wire(0, SENDING);
+    char *options = soap_dime_options_make(&wire, 7, "opt");
+    ASSERT_EQ(soap_dime_attach(&wire, const_cast<char *>("host's"), 6, nullptr, "own", 0, nullptr), 0);
+    ASSERT_EQ(
+        send(wire, {make_value(first, nullptr, "image/png"), make_value(second, "cid:two", nullptr, options),
+                    make_value(first, nullptr, nullptr)}),
+        0);
+    const std::string sent = wire.sent();
+    const std::size_t xml_at = 12 + 8 + 44;
+    ASSERT_GT(sent.size(), xml_at);
+    const std::size_t xml_size =
+        static_cast<unsigned char>(sent[10]) * 256U + static_cast<unsigned char>(sent[11]);
+    const std::string xml = sent.substr(xml_at, xml_size);
+    EXPECT_NE(xml.find("<data href=\"cid:id1\""), std::string::npos) << xml;
+    EXPECT_NE(xml.find("<data href=\"cid:two\""), std::string::npos) << xml;
+    EXPECT_NE(xml.find("<data>Zmlyc3Q=</data>"), std::string::npos) << xml; // neither id nor type: inline
+    EXPECT_EQ(xml.substr(xml.size() - 2), "\r\n");
+    EXPECT_EQ(sent, record(MB, URI, "cid:id0", ENVELOPE_URI, xml) + record(0, MEDIA, "own", "", "host's") +
+                        record(0, MEDIA, "id1", "image/png", first) +
+                        record(ME, MEDIA, "two", "", second, std::string("\0\7\0\3opt", 7)));
+    expect_same_at_every_split(sent,
+                               "[cid:id1 image/png first][cid:two (null) second!!][(null) (null) first]");
+}
+
+TEST(dime_out, of_a_message_alone_is_one_record)
+{
+    memory_wire wire(0, SENDING | MODE_DIME);
+    ASSERT_EQ(send(wire, {}), 0);
+    EXPECT_EQ(wire.sent().substr(0, 2), "\x0E\x20");
+    EXPECT_EQ(reception(wire.sent()).summary(), "");
+}
+
+TEST(dime_out, sends_a_value_met_twice_once)
+{
+    const std::string bytes = "shared";
+    memory_wire wire(0, SENDING);
+    const value v = make_value(bytes, "cid:x", "a/b");
+    ASSERT_EQ(send(wire, {v, v}), 0);
+    const std::string sent = wire.sent();
+    EXPECT_EQ(sent.find("shared"), sent.rfind("shared"));
+    EXPECT_EQ(reception(sent).summary(), "[cid:x a/b shared][cid:x a/b shared]");
+}
+
+TEST(dime_out, cuts_texts_and_refuses_data_that_no_header_can_tell)
+{
+    const std::string long_text(70000, 't');
+    memory_wire wire;
+    char *options = soap_dime_options_make(&wire, 0, long_text.c_str());
+    EXPECT_EQ(std::strlen(options + 4), 65531U);
+    wire.mode = MODE_BUFFERED | MODE_DIME;
+    wire.dime.id = const_cast<char *>(long_text.c_str());
+    wire.dime.options = options;
+    EXPECT_EQ(soap_dime_header_write(&wire), 0);
+    soap_send_flush(&wire);
+    EXPECT_EQ(wire.sent().size(), 12U + 65536U + 65536U);
+    EXPECT_EQ(wire.sent().substr(2, 4), "\xFF\xFF\xFF\xFF");
+    wire.dime.size = 0x100000000;
+    EXPECT_EQ(soap_dime_header_write(&wire), SOAP_DIME_ERROR);
+}
+
+// --- streams of the host ---
+
+struct stream {
+    std::string data;
+    std::size_t at = 0;
+    std::size_t step = 1000; // bytes that one call gives
+    int closed = 0;
+};
+
+void *open_stream(soap *, void *handle, const char *, const char *, const char *options)
+{
+    return options != nullptr && std::strcmp(options + 4, "memory") == 0 ? nullptr : handle;
+}
+std::size_t read_stream(soap *, void *handle, char *buffer, std::size_t length)
+{
+    auto &source = *static_cast<stream *>(handle);
+    const std::size_t part = std::min({length, source.step, source.data.size() - source.at});
+    std::memcpy(buffer, source.data.data() + source.at, part);
+    source.at += part;
+    return part;
+}
+void close_stream(soap *, void *handle)
+{
+    static_cast<stream *>(handle)->closed++;
+}
+
+void use_read_streams(soap &ctx)
+{
+    ctx.dime_read_open = open_stream;
+    ctx.dime_read = read_stream;
+    ctx.dime_read_close = close_stream;
+}
+
+TEST(dime_stream, of_known_length_goes_out_as_one_record)
+{
+    stream source = {std::string(5001, 's')};
+    memory_wire wire(0, SENDING | MODE_DIME);
+    use_read_streams(wire);
+    soap_dime_attach(&wire, reinterpret_cast<char *>(&source), source.data.size(), "a/b", "s", 0, nullptr);
+    soap_dime_attach(&wire, const_cast<char *>("m"), 1, "a/b", "m", 0, "memory");
+    ASSERT_EQ(send(wire, {}), 0);
+    const std::string tail = record(0, MEDIA, "s", "a/b", source.data) +
+                             record(ME, MEDIA, "m", "a/b", "m", std::string("\0\0\0\6memory", 10));
+    EXPECT_EQ(wire.sent().substr(wire.sent().size() - tail.size()), tail);
+    EXPECT_EQ(source.closed, 1);
+}
+
+TEST(dime_stream, that_ends_early_is_an_error)
+{
+    stream source = {"short"};
+    memory_wire wire(0, SENDING | MODE_DIME);
+    use_read_streams(wire);
+    soap_dime_attach(&wire, reinterpret_cast<char *>(&source), 9, "a/b", "s", 0, nullptr);
+    EXPECT_EQ(send(wire, {}), SOAP_EOF);
+    EXPECT_EQ(source.closed, 1);
+}
+
+TEST(dime_stream, of_unknown_length_goes_out_in_chunks)
+{
+    for (const std::size_t length : {0U, 1U, 1023U, 1024U, 2500U}) {
+        stream source = {std::string(length, 's')};
+        memory_wire wire(0, MODE_STORE | MODE_BARE_XML | MODE_DIME);
+        use_read_streams(wire);
+        soap_dime_attach(&wire, reinterpret_cast<char *>(&source), 0, "a/b", "s", 0, nullptr);
+        ASSERT_EQ(send(wire, {}, false), 0);
+        std::string tail;
+        std::size_t left = length;
+        for (bool first = true;; first = false) {
+            const std::size_t part = std::min<std::size_t>(left, 1024);
+            tail += record(part == 1024 ? CF : ME, first ? MEDIA : UNCHANGED, first ? "s" : "",
+                           first ? "a/b" : "", std::string(part, 's'));
+            left -= part;
+            if (part != 1024)
+                break;
+        }
+        const std::string sent = wire.sent();
+        EXPECT_EQ(sent.substr(sent.size() - tail.size()), tail) << length;
+        reception back(sent);
+        EXPECT_EQ(back.summary(), "");
+        ASSERT_NE(back.wire->dime.list, nullptr);
+        EXPECT_EQ(std::string(back.wire->dime.list->content, back.wire->dime.list->size), source.data);
+        EXPECT_EQ(back.wire->dime.list->content[length], '\0');
+        EXPECT_EQ(back.wire->dime.list->next, nullptr);
+    }
+}
+
+TEST(dime_stream, takes_received_data_over_all_chunks)
+{
+    const std::string message = message_record(0, "<data href=\"a\"/>") + record(CF, MEDIA, "a", "t", "one") +
+                                record(CF, UNCHANGED, "", "", "") + record(0, UNCHANGED, "", "", "two") +
+                                record(ME, MEDIA, "b", "", "memory");
+    static stream target;
+    target = {};
+    reception read(message, 0, 7, 5);
+    read.wire->dime_write_open = [](soap *, const char *id, const char *, const char *) -> void * {
+        return *id == 'a' ? &target : nullptr;
+    };
+    read.wire->dime_write = [](soap *, void *handle, const char *data, std::size_t length) {
+        static_cast<stream *>(handle)->data.append(data, length);
+        return 0;
+    };
+    read.wire->dime_write_close = close_stream;
+    EXPECT_EQ(read.run(), 0);
+    EXPECT_EQ(target.data, "onetwo");
+    EXPECT_EQ(target.closed, 1);
+    EXPECT_EQ(static_cast<void *>(read.values[0].content), &target);
+    EXPECT_EQ(read.values[0].size, 6);
+    EXPECT_STREQ(read.wire->dime.list->next->content, "memory");
+
+    reception failing(message);
+    failing.wire->dime_write_open = read.wire->dime_write_open;
+    failing.wire->dime_write = [](soap *, void *, const char *, std::size_t) { return 55; };
+    failing.wire->dime_write_close = close_stream;
+    EXPECT_EQ(failing.run(), 55);
+    EXPECT_EQ(target.closed, 2);
+}
+
+// --- received ---
+
+TEST(dime_in, joins_chunks_of_the_message_and_of_attachments)
+{
+    const std::string xml = envelope("<data href=\"cid:a\"/><data href=\"cid:b%2Fc\"/>");
+    std::string message;
+    const std::size_t step = 37;
+    for (std::size_t at = 0; at < xml.size(); at += step) {
+        const bool last = at + step >= xml.size();
+        message += record((at == 0 ? MB : 0) | (last ? 0 : CF), at == 0 ? URI : UNCHANGED, at == 0 ? "m" : "",
+                          "", xml.substr(at, step));
+    }
+    message += record(CF, MEDIA, "b/c", "t/b", "B1") + record(0, UNCHANGED, "", "", "B2") +
+               record(0, MEDIA, "", "", "?") + record(CF, MEDIA, "a", "t/a", "") +
+               record(ME, UNCHANGED, "", "", "A");
+    expect_same_at_every_split(message, "[cid:a t/a A][cid:b%2Fc t/b B1B2]");
+    expect_error_at_every_cut(message);
+}
+
+TEST(dime_in, keeps_options_and_refuses_those_that_lie)
+{
+    const auto with_options = [](const std::string &options) {
+        return message_record(0, "<data href=\"a\"/>") + record(ME, MEDIA, "a", "t", "x", options);
+    };
+    reception good(with_options(std::string("\1\2\0\3opt", 7)));
+    EXPECT_EQ(good.run(), 0);
+    EXPECT_EQ(std::string(good.values[0].options, 7), std::string("\1\2\0\3opt", 7));
+    for (const std::string &options :
+         {std::string("\1\2\0\4opt", 7), std::string("\1\2\xFF\xFFopt", 7), std::string("\1", 1)})
+        EXPECT_EQ(reception(with_options(options)).run(), SOAP_DIME_ERROR);
+}
+
+TEST(dime_in, reports_what_is_wrong_with_a_message)
+{
+    const std::string start = message_record(0, "<data href=\"a\"/>");
+    const std::string good = record(ME, MEDIA, "a", "t", "x");
+    std::string wrong_version = good;
+    wrong_version[0] = static_cast<char>(wrong_version[0] ^ 0x10);
+    struct wrong_case {
+        const char *rule;
+        std::string rest;
+        int error;
+    };
+    const wrong_case cases[] = {
+        {"good", good, 0},
+        {"version", wrong_version, SOAP_DIME_VERSION},
+        {"no end", record(0, MEDIA, "a", "t", "x"), SOAP_EOF},
+        {"no such attachment", record(ME, MEDIA, "b", "t", "x"), SOAP_DIME_HREF},
+        {"end within a record", record(ME | CF, MEDIA, "a", "t", "x") + good, SOAP_DIME_ERROR},
+        {"data cut", header(ME, MEDIA, 0, 0, 0, 0xFFFFFFFF) + "x", SOAP_EOF},
+        {"id cut", header(ME, MEDIA, 0, 0xFFFF, 0, 1) + "x", SOAP_EOF},
+        {"options cut", header(ME, MEDIA, 0xFFFF, 0, 0, 1) + "x", SOAP_EOF},
+    };
+    for (const wrong_case &c : cases)
+        EXPECT_EQ(reception(start + c.rest).run(), c.error) << c.rule;
+    std::string overrun = start + good; // the message's own record is shorter than the message
+    overrun[11] = 10;
+    EXPECT_NE(reception(overrun).run(), 0);
+    EXPECT_EQ(reception(message_record(ME, "<data href=\"a\"/>")).run(), SOAP_DIME_HREF);
+}
+
+TEST(dime_in, costs_no_memory_for_what_is_only_announced)
+{
+#if defined(__SANITIZE_ADDRESS__)
+    GTEST_SKIP() << "the allocator's statistics are those of the sanitizer";
+#else
+    const std::string start = message_record(0, "<data href=\"a\"/>");
+    for (const std::string &rest :
+         {header(ME, MEDIA, 0, 0, 0, 0xFFFFFFFF) + "x", header(CF, MEDIA, 0, 0, 0, 0xFFFFFFF0) + "x"}) {
+        reception read(start + rest);
+        const struct mallinfo2 before = mallinfo2();
+        const std::size_t used = before.uordblks + before.hblkhd;
+        EXPECT_EQ(read.run(), SOAP_EOF);
+        const struct mallinfo2 after = mallinfo2();
+        EXPECT_LT(after.uordblks + after.hblkhd, used + 1000000);
+    }
+#endif
+}
+
+TEST(dime_in, survives_any_change_of_a_byte)
+{
+    expect_survival_of_every_change(message_record(CF, "<data href=\"a\"/>") +
+                                    record(0, UNCHANGED, "", "", "") +
+                                    record(CF, MEDIA, "a", "t", "one", std::string("\1\2\0\1x", 5)) +
+                                    record(ME, UNCHANGED, "", "", "two"));
+}
+
+TEST(dime_in, survives_every_refused_allocation)
+{
+    const std::string message = message_record(0, "<data href=\"a\"/>") + record(CF, MEDIA, "a", "t", "one") +
+                                record(0, UNCHANGED, "", "", std::string(5000, 'x')) +
+                                record(ME, MEDIA, "b", "", "y");
+    int result = -2;
+    std::unique_ptr<reception> read;
+    const auto fresh = [&] { read = std::make_unique<reception>(message); };
+    fresh();
+    const std::size_t refusals = failing_malloc::at_each_allocation(
+        failing_malloc::refuse::one, [&] { result = read->run(); },
+        [&](bool refused) {
+            EXPECT_EQ(result, refused ? SOAP_OUT_OF_MEMORY : 0);
+            fresh();
+        });
+    EXPECT_GT(refusals, 10U);
+}
+
+TEST(dime, carries_megabytes_unchanged)
+{
+    std::string bytes(3000000, '\0');
+    for (std::size_t i = 0; i < bytes.size(); ++i)
+        bytes[i] = static_cast<char>(i * 2654435761U >> 13);
+    memory_wire wire(0, SENDING);
+    ASSERT_EQ(send(wire, {make_value(bytes, "cid:big", "a/b")}), 0);
+    reception read(wire.sent(), 0, 1000, 50000);
+    ASSERT_EQ(read.run(), 0);
+    EXPECT_TRUE(read.values[0].bytes() == bytes);
+}
+
+} // namespace

@@ -1,0 +1,305 @@
+// error_test.cpp - texts of error codes, faults made from them, and their printed forms.
+#include <zuv_client_pro/soap_envelope.h>
+#include <zuv_client_pro/soap_error.h>
+
+#include <cerrno>
+#include <climits>
+#include <cstdio>
+#include <cstring>
+#include <sstream>
+#include <string>
+
+#include <gtest/gtest.h>
+
+#include "support/failing_malloc.h"
+
+namespace {
+
+std::string printed_to_buffer(soap *ctx)
+{
+    char buffer[2048] = "";
+    soap_fault_print_text(ctx, buffer, sizeof buffer);
+    return buffer;
+}
+
+std::string printed_to_stream(soap *ctx)
+{
+    std::ostringstream stream;
+    EXPECT_EQ(&soap_fault_print_stream(ctx, stream), &stream);
+    return stream.str();
+}
+
+// What `print` writes to a file.
+template <class Print> std::string written(Print print)
+{
+    std::FILE *file = std::tmpfile();
+    print(file);
+    std::string text(static_cast<std::size_t>(std::ftell(file)), '\0');
+    std::rewind(file);
+    EXPECT_EQ(std::fread(text.data(), 1, text.size(), file), text.size());
+    std::fclose(file);
+    return text;
+}
+
+std::string printed_to_file(soap *ctx)
+{
+    return written([ctx](std::FILE *file) { soap_fault_print_file(ctx, file); });
+}
+
+std::string filled_text(int error)
+{
+    soap ctx;
+    std::strcpy(ctx.tag, "t:tag");
+    std::strcpy(ctx.element_type, "xsd:int");
+    std::strcpy(ctx.element_id, "#id7");
+    ctx.error = error;
+    soap_fault_text_fill(&ctx);
+    return *soap_fault_string_field(&ctx);
+}
+
+TEST(ErrorText, EveryCodeHasItsText)
+{
+    struct text_case {
+        int error;
+        const char *text;
+    };
+    static const text_case cases[] = {
+        {-1, "End of file or no input: Operation interrupted or timed out"},
+        {0, "Error 0"},
+        {1, "Client fault"},
+        {2, "Server fault"},
+        {3, "Validation constraint violation: tag name or namespace mismatch in element 't:tag'"},
+        {4, "Validation constraint violation: data type mismatch xsd:int in element 't:tag'"},
+        {5, "Well-formedness violation"},
+        {6, "No XML root element"},
+        {7, "Array index out of bounds"},
+        {8, "The data in element 't:tag' must be understood but cannot be handled"},
+        {9, "Validation constraint violation: namespace error in element 't:tag'"},
+        {10, "User data error"},
+        {11, "Fatal error"},
+        {13, "Method 't:tag' not implemented: method name or namespace not recognized"},
+        {14, "Data required for operation"},
+        {15, "HTTP GET method not implemented"},
+        {16, "HTTP PUT method not implemented"},
+        {17, "Error 17"},
+        {18, "Error 18"},
+        {19, "HTTP method not implemented"},
+        {20, "Out of memory"},
+        {21, "Memory overflow or memory corruption error"},
+        {22, "Header line too long"},
+        {23, "Validation constraint violation: nil not allowed in element 't:tag'"},
+        {24,
+         "Validation constraint violation: multiple definitions (use the SOAP_XML_TREE flag) of the same id "
+         "#id7 in element 't:tag'"},
+        {25, "Validation constraint violation: missing id for ref #id7 in element 't:tag'"},
+        {26, "Validation constraint violation: incompatible object type ref/id pair #id7 in element 't:tag'"},
+        {27, "Message too large for UDP packet"},
+        {29, "An HTTP processing error occurred"},
+        {30, "SSL/TLS error"},
+        {31, "Zlib/gzip error: ''"},
+        {32, "DIME format error"},
+        {33, "DIME href to missing attachment"},
+        {34, "DIME version/transmission error"},
+        {35, "End of DIME error"},
+        {36, "MIME format error"},
+        {37, "MIME href to missing attachment"},
+        {38, "End of MIME error"},
+        {39, "Invalid SOAP message or SOAP version mismatch"},
+        {40, "Plugin registry error"},
+        {41, "Unsupported SOAP data encoding"},
+        {42, "Validation constraint violation: missing required attribute in element 't:tag'"},
+        {43, "Validation constraint violation: prohibited attribute present in element 't:tag'"},
+        {44, "Validation constraint violation: occurrence violation in element 't:tag'"},
+        {45, "Validation constraint violation: content range or length violation in element 't:tag'"},
+        {46, "Maximum number of open connections was reached (no define HAVE_POLL): increase FD_SETSIZE"},
+        {47, "UTF content encoding error"},
+        {48, "An HTTP NTLM authentication error occurred"},
+        {200, "Error 200"},
+        {201, "HTTP Error: 201 Created"},
+        {404, "HTTP Error: 404 Not Found"},
+        {599, "HTTP Error: 599 "},
+        {600, "Error 600"},
+        {1000, "Stopped: no response to be sent or received (informative)"},
+        {1001, "Error 1001"},
+    };
+    for (const text_case &c : cases)
+        EXPECT_EQ(filled_text(c.error), c.text) << c.error;
+}
+
+TEST(ErrorText, ConstraintTextNamesTheElementIfThereIsOne)
+{
+    soap ctx;
+    EXPECT_STREQ(soap_constraint_text(&ctx, "wrong ", "value"),
+                 "Validation constraint violation: wrong value");
+    EXPECT_STREQ(soap_constraint_text(&ctx, "wrong", nullptr), "Validation constraint violation: wrong");
+    std::memset(ctx.tag, 'x', sizeof ctx.tag - 1);
+    EXPECT_EQ(std::strlen(soap_constraint_text(&ctx, "wrong", nullptr)), SOAP_TEXT_SIZE - 1)
+        << "cut to the buffer";
+}
+
+TEST(ErrorText, EndOfInputNamesTheCause)
+{
+    soap ctx;
+    ctx.recv_timeout = 5;
+    EXPECT_STREQ(soap_eof_text(&ctx), "Operation interrupted or timed out (5 s receive delay)");
+    ctx.recv_timeout = -500;
+    ctx.send_timeout = INT_MIN;
+    EXPECT_STREQ(soap_eof_text(&ctx),
+                 "Operation interrupted or timed out (500us receive delay) (2147483648us send delay)");
+    ctx.errno_value = ECONNRESET;
+    EXPECT_STREQ(soap_eof_text(&ctx), std::strerror(ECONNRESET));
+}
+
+TEST(Fault, TheCodeFollowsTheVersionUnlessTheErrorHasItsOwn)
+{
+    struct code_case {
+        int error;
+        std::int16_t version;
+        const char *code, *subcode;
+    };
+    static const code_case cases[] = {
+        {5, 0, "SOAP-ENV:Client", nullptr},
+        {5, 1, "SOAP-ENV:Client", nullptr},
+        {5, 2, "SOAP-ENV:Sender", nullptr},
+        {12, 1, "SOAP-ENV:Client", nullptr},
+        {8, 1, "SOAP-ENV:MustUnderstand", nullptr},
+        {39, 2, "SOAP-ENV:VersionMismatch", nullptr},
+        {41, 2, "SOAP-ENV:DataEncodingUnknown", nullptr},
+        {24, 2, "SOAP-ENV:Sender", "SOAP-ENC:DuplicateID"},
+        {25, 2, "SOAP-ENV:Sender", "SOAP-ENC:MissingID"},
+        {25, 1, "SOAP-ENV:Client", nullptr},
+    };
+    for (const code_case &c : cases) {
+        SCOPED_TRACE(c.error);
+        soap ctx;
+        ctx.soap_version = c.version;
+        ctx.error = c.error;
+        soap_fault_text_fill(&ctx);
+        EXPECT_STREQ(*soap_fault_code_field(&ctx), c.code);
+        EXPECT_STREQ(soap_fault_subcode_value(&ctx), c.subcode);
+    }
+}
+
+TEST(Fault, WhatIsSetStaysAndTheHookComesFirst)
+{
+    soap ctx;
+    EXPECT_EQ(soap_fault_receiver(&ctx, "own text", "own detail", 5), 5);
+    soap_fault_text_fill(&ctx);
+    EXPECT_STREQ(*soap_fault_code_field(&ctx), "SOAP-ENV:Server");
+    EXPECT_STREQ(*soap_fault_string_field(&ctx), "own text");
+    EXPECT_STREQ(soap_fault_detail_value(&ctx), "own detail");
+
+    soap hooked;
+    hooked.error = SOAP_MUST_UNDERSTAND;
+    hooked.on_error_text = [](soap *, const char **code, const char **text) {
+        *code = "x:Code";
+        *text = "from the hook";
+    };
+    soap_fault_text_fill(&hooked);
+    EXPECT_STREQ(*soap_fault_code_field(&hooked), "x:Code");
+    EXPECT_STREQ(*soap_fault_string_field(&hooked), "from the hook");
+}
+
+TEST(Fault, SettersStoreWhatIsGiven)
+{
+    soap ctx;
+    ctx.soap_version = 2;
+    std::string text = "text", detail = "<d/>", subcode = "x:sub";
+    EXPECT_EQ(soap_fault_sender_copied(&ctx, subcode.c_str(), text.c_str(), detail.c_str()), SOAP_FAULT);
+    text = detail = subcode = "gone";
+    EXPECT_EQ(printed_to_buffer(&ctx), "SOAP 1.2 fault: SOAP-ENV:Sender [x:sub]\n\"text\"\nDetail: <d/>\n");
+    EXPECT_EQ(soap_fault_sender(&ctx, "t", "", 29), 29);
+    EXPECT_EQ(soap_fault_receiver_copied(&ctx, nullptr, "last", nullptr), 12);
+    EXPECT_EQ(printed_to_buffer(&ctx), "SOAP 1.2 fault: SOAP-ENV:Receiver [x:sub]\n\"last\"\nDetail: <d/>\n");
+    EXPECT_EQ(ctx.error, SOAP_FAULT);
+}
+
+TEST(Fault, TheThreePrintFormsAgree)
+{
+    soap ctx;
+    EXPECT_EQ(printed_to_buffer(&ctx) + printed_to_stream(&ctx) + printed_to_file(&ctx), "") << "error 0";
+    EXPECT_EQ(ctx.fault, nullptr);
+    ctx.error = SOAP_SYNTAX_ERROR;
+    const std::string expected =
+        "Error 5 fault: SOAP-ENV:Client [no subcode]\n\"Well-formedness violation\"\nDetail: [no detail]\n";
+    EXPECT_EQ(printed_to_buffer(&ctx), expected);
+    EXPECT_EQ(printed_to_stream(&ctx), expected);
+    EXPECT_EQ(printed_to_file(&ctx), expected);
+
+    soap received;
+    received.soap_version = 1;
+    received.error = SOAP_FAULT;
+    EXPECT_EQ(printed_to_stream(&received),
+              "SOAP 1.1 fault: SOAP-ENV:Client [no subcode]\n\"[no reason]\"\nDetail: [no detail]\n");
+}
+
+TEST(Fault, TheBufferFormKeepsToItsLength)
+{
+    soap ctx;
+    ctx.error = SOAP_SYNTAX_ERROR;
+    const std::string whole = printed_to_buffer(&ctx);
+    for (std::size_t length = 0; length < 40; ++length) {
+        char buffer[48];
+        std::memset(buffer, '#', sizeof buffer);
+        EXPECT_EQ(soap_fault_print_text(&ctx, buffer, length), buffer);
+        if (length > 0) {
+            EXPECT_EQ(std::string(buffer), whole.substr(0, length - 1));
+        }
+        EXPECT_EQ(buffer[length], '#') << length;
+    }
+}
+
+TEST(Fault, AContextThatHasEndedSaysSo)
+{
+    soap ended;
+    soap_engine_done(&ended);
+    for (soap *ctx : {static_cast<soap *>(nullptr), &ended}) {
+        EXPECT_EQ(printed_to_buffer(ctx), "Error: soap struct not initialized");
+        EXPECT_EQ(printed_to_stream(ctx), "Error: soap struct state not initialized\n");
+        EXPECT_EQ(printed_to_file(ctx), "Error: soap struct state not initialized\n");
+    }
+}
+
+std::string location(soap *ctx, std::size_t position, const std::string &input)
+{
+    ctx->buffer_index = position;
+    ctx->buffer_length = input.size();
+    std::memcpy(ctx->buffer, input.data(), input.size());
+    const std::string printed = written([ctx](std::FILE *file) { soap_fault_location_print(ctx, file); });
+    EXPECT_EQ(std::string(ctx->buffer, input.size()), input) << "the input is as it was";
+    return printed;
+}
+
+TEST(FaultLocation, ShowsTheInputAroundThePlace)
+{
+    soap ctx;
+    EXPECT_EQ(location(&ctx, 3, "<a>bc"), "") << "error 0";
+    ctx.error = SOAP_STOP;
+    EXPECT_EQ(location(&ctx, 3, "<a>bc"), "");
+    ctx.error = SOAP_SYNTAX_ERROR;
+    EXPECT_EQ(location(&ctx, 3, "<a>bc"), "<a>\n<!-- ** HERE ** -->\nb\n") << "the last byte is cut";
+    EXPECT_EQ(location(&ctx, 5, "<a>bc"), "<a>bc\n<!-- ** HERE ** -->\n");
+    EXPECT_EQ(location(&ctx, 0, "<a>bc"), "<\n<!-- ** HERE ** -->\n<a>b\n");
+    EXPECT_EQ(location(&ctx, 1, "<"), "<\n<!-- ** HERE ** -->\n");
+    EXPECT_EQ(location(&ctx, 6, "<a>bc"), "");
+    EXPECT_EQ(location(&ctx, 0, ""), "");
+    const std::string full(SOAP_BUFFER_SIZE, 'x');
+    EXPECT_EQ(location(&ctx, 1, full), "x\n<!-- ** HERE ** -->\n" + std::string(1022, 'x') + "\n");
+    EXPECT_EQ(location(&ctx, SOAP_BUFFER_SIZE, full), full + "\n<!-- ** HERE ** -->\n");
+}
+
+TEST(Fault, WithoutMemoryAFaultIsStillPrinted)
+{
+    soap ctx;
+    ctx.error = SOAP_SYNTAX_ERROR;
+    char buffer[200];
+    {
+        const failing_malloc::scope armed(1, failing_malloc::refuse::all_from);
+        soap_fault_print_text(&ctx, buffer, sizeof buffer);
+        EXPECT_EQ(soap_fault_sender_copied(&ctx, "a", "b", "c"), SOAP_OUT_OF_MEMORY);
+    }
+    EXPECT_NE(std::string(buffer).find(" fault: SOAP-ENV:Client [no subcode]\n"), std::string::npos)
+        << buffer;
+}
+
+} // namespace

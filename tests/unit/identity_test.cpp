@@ -1,0 +1,749 @@
+// identity_test.cpp - the pointer table and the forms of writing, the id table and late resolution.
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_identity.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include <array>
+#include <cstring>
+#include <functional>
+#include <memory>
+#include <random>
+#include <string>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+#include "codec/identity.h"
+#include "support/failing_malloc.h"
+#include "support/memory_wire.h"
+
+namespace {
+
+// --- the pointer table ---
+
+TEST(PointerTable, FindsObjectsByAddressAndTypeAtEverySize)
+{
+    auto ctx = std::make_unique<soap>();
+    std::vector<std::array<char, 64>> objects(30000);
+    for (int message = 0; message < 2; message++) {
+        for (std::size_t i = 0; i < objects.size(); i++)
+            ASSERT_EQ(soap_pointer_add(ctx.get(), &objects[i], nullptr, 0, 20, nullptr),
+                      static_cast<int>(i) + 1);
+        for (std::size_t i = 0; i < objects.size(); i++)
+            ASSERT_EQ(soap_pointer_find(ctx.get(), &objects[i], 20, nullptr), static_cast<int>(i) + 1);
+        soap_pointer_record *record = nullptr;
+        EXPECT_EQ(soap_pointer_find(ctx.get(), &objects[7], 21, &record), 0);
+        EXPECT_EQ(record, nullptr);
+        soap_pointer_table_reset(ctx.get());
+        ctx->next_id = 0;
+        EXPECT_EQ(soap_pointer_find(ctx.get(), &objects[7], 20, nullptr), 0);
+    }
+    EXPECT_EQ(ctx->pointer_chains, ctx->pointer_table);
+    for (const soap_pointer_record *head : ctx->pointer_table)
+        ASSERT_EQ(head, nullptr);
+}
+
+TEST(PointerTable, FindsArraysByContentAndSizes)
+{
+    struct holder {
+        const char *content;
+        std::int32_t sizes[2];
+    };
+    auto ctx = std::make_unique<soap>();
+    const char *text = "content";
+    holder two_by_three = {text, {2, 3}}, alike = {text, {2, 3}}, other_size = {text, {2, 4}},
+           empty = {nullptr, {0, 0}};
+    EXPECT_EQ(soap_array_mark_pointer(ctx.get(), &two_by_three, &two_by_three, 2, 10), 0);
+    EXPECT_EQ(soap_array_mark_pointer(ctx.get(), &alike, &alike, 2, 10), 2);
+    EXPECT_EQ(soap_array_mark_pointer(ctx.get(), &other_size, &other_size, 2, 10), 0);
+    EXPECT_EQ(soap_array_mark_pointer(ctx.get(), &empty, &empty, 2, 10), 1);
+    EXPECT_EQ(soap_array_pointer_find(ctx.get(), &alike, &alike, 2, 10, nullptr), 1);
+    EXPECT_EQ(soap_array_pointer_find(ctx.get(), &other_size, &other_size, 2, 10, nullptr), 2);
+    // The holders may go ahead of the table: a reset must not look at them.
+    two_by_three.content = reinterpret_cast<const char *>(8);
+    soap_pointer_table_reset(ctx.get());
+    for (const soap_pointer_record *head : ctx->pointer_table)
+        ASSERT_EQ(head, nullptr);
+}
+
+TEST(MarkPass, EntersAnObjectOnceAndThenKnowsItIsShared)
+{
+    auto ctx = std::make_unique<soap>();
+    int shared = 0, single = 0;
+    EXPECT_EQ(soap_mark_pointer(ctx.get(), &shared, 30), 0);
+    EXPECT_EQ(soap_mark_pointer(ctx.get(), &single, 30), 0);
+    EXPECT_EQ(soap_mark_pointer(ctx.get(), &shared, 30), 2);
+    EXPECT_EQ(soap_mark_pointer(ctx.get(), &shared, 30), 2);
+    EXPECT_EQ(soap_mark_pointer(ctx.get(), &shared, 31), 0)
+        << "another type at the same address is another object";
+    EXPECT_EQ(soap_mark_pointer(ctx.get(), nullptr, 30), 1);
+    soap_pointer_record *record = nullptr;
+    EXPECT_EQ(soap_pointer_find(ctx.get(), &shared, 30, &record), 1);
+    EXPECT_EQ(record->count_mark, 2);
+    EXPECT_EQ(record->send_mark, 2);
+    ctx->mode = SOAP_XML_TREE;
+    int unseen = 0;
+    EXPECT_EQ(soap_mark_pointer(ctx.get(), &unseen, 30), 1);
+    EXPECT_EQ(soap_pointer_find(ctx.get(), &unseen, 30, nullptr), 0);
+}
+
+TEST(MarkPass, EndsWhereMemoryDoes)
+{
+    soap ctx;
+    int object = 0, second = 0;
+    soap_pointer_table_reset(&ctx);
+    int mark = 0;
+    {
+        const failing_malloc::scope armed(1);
+        mark = soap_mark_pointer(&ctx, &object, 20);
+    }
+    EXPECT_NE(mark, 0) << "a walk without a record would not end on a cycle";
+    EXPECT_EQ(ctx.error, SOAP_OUT_OF_MEMORY);
+    EXPECT_EQ(soap_mark_pointer(&ctx, &second, 20), 0);
+}
+
+// --- the form in which an object is written ---
+
+enum style { LITERAL, ENCODED };
+enum pass { COUNT, SEND };
+
+class Forms : public testing::Test {
+protected:
+    memory_wire ctx;
+    int object = 0;
+    soap_pointer_record *record = nullptr;
+
+    void begin(std::int16_t version, style form, std::uint32_t mode, std::int16_t part, pass phase,
+               std::int8_t mark)
+    {
+        soap_call_scratch_free(&ctx);
+        ctx.next_id = 0;
+        ctx.error = 0;
+        ctx.soap_version = version;
+        ctx.encoding_style = form == ENCODED ? "" : nullptr;
+        ctx.mode = mode | (phase == COUNT ? MODE_COUNTING : 0);
+        ctx.message_part = part;
+        ctx.namespace_state = 1;
+        ctx.encoding_flag = 0;
+        ctx.nesting_level = 0;
+        ctx.sends.clear();
+        soap_pointer_add(&ctx, &object, nullptr, 0, 20, &record);
+        record->count_mark = phase == COUNT ? mark : -1;
+        record->send_mark = phase == SEND ? mark : -1;
+    }
+    int mark(pass phase) const { return phase == COUNT ? record->count_mark : record->send_mark; }
+    void expect_other_mark_untouched(pass phase) const
+    {
+        EXPECT_EQ(phase == COUNT ? record->send_mark : record->count_mark, -1);
+    }
+};
+
+struct form_case {
+    const char *rule;
+    std::int16_t version;
+    style form;
+    std::uint32_t mode;
+    std::int16_t part;
+    std::int8_t mark;
+    int id;     // asked for
+    int result; // of soap_element_id
+    int mark_after;
+    int reference; // result of soap_element_ref; -1: a reference is written
+    int ref_mark_after;
+};
+
+const form_case FORMS[] = {
+    {"tree: the id as given", 1, ENCODED, SOAP_XML_TREE, PART_BODY, 2, -1, -1, 2, 0, 2},
+    {"tree: a positive id", 1, ENCODED, SOAP_XML_TREE, PART_BODY, 0, 5, 5, 0, 0, 0},
+    {"literal 1.1: none", 1, LITERAL, 0, PART_BODY, 2, -1, 0, 2, 0, 2},
+    {"literal 1.2: none", 2, LITERAL, 0, PART_BODY, 2, -1, 0, 2, 0, 2},
+    {"encoded 1.1, met once", 1, ENCODED, 0, PART_BODY, 0, -1, -1, 2, 0, 0},
+    {"encoded 1.1, shared: a reference from everywhere", 1, ENCODED, 0, PART_BODY, 2, -1, -1, 2, -1, 2},
+    {"encoded 1.1, the independent element", 1, ENCODED, 0, PART_BODY, 2, 1, 1, 2, 1, 2},
+    {"encoded 1.1, header: single", 1, ENCODED, 0, PART_HEADER, 2, -1, 1, 1, 0, 2},
+    {"encoded 1.1, header, written", 1, ENCODED, 0, PART_HEADER, 1, 0, 0, 1, -1, 1},
+    {"encoded 1.2, met once", 2, ENCODED, 0, PART_BODY, 0, 0, 0, 0, 0, 0},
+    {"encoded 1.2, shared: first in full", 2, ENCODED, 0, PART_BODY, 2, -1, 1, 1, 1, 1},
+    {"encoded 1.2, shared: then by reference", 2, ENCODED, 0, PART_BODY, 1, -1, 1, 1, -1, 1},
+    {"graph, met once", 1, LITERAL, SOAP_XML_GRAPH, PART_BODY, 0, 0, 0, 0, 0, 0},
+    {"graph, shared: first in full", 1, LITERAL, SOAP_XML_GRAPH, PART_BODY, 2, -1, 1, 1, 1, 1},
+    {"graph, shared: then by reference", 1, LITERAL, SOAP_XML_GRAPH, PART_BODY, 1, -1, 1, 1, -1, 1},
+    {"graph over encoded 1.1", 1, ENCODED, SOAP_XML_GRAPH, PART_BODY, 2, -1, 1, 1, 1, 1},
+    {"graph, a positive id", 1, LITERAL, SOAP_XML_GRAPH, PART_BODY, 2, 7, 7, 1, 7, 2},
+};
+
+TEST_F(Forms, FollowVersionStyleAndMode)
+{
+    for (const form_case &row : FORMS)
+        for (const pass phase : {COUNT, SEND}) {
+            SCOPED_TRACE(row.rule);
+            begin(row.version, row.form, row.mode, row.part, phase, row.mark);
+            EXPECT_EQ(soap_element_id(&ctx, row.id, &object, 20), row.result);
+            EXPECT_EQ(mark(phase), row.mark_after);
+            expect_other_mark_untouched(phase);
+
+            begin(row.version, row.form, row.mode, row.part, phase, row.mark);
+            const int asked = row.id > 0 ? row.id : -1;
+            const int expected = row.id > 0 && (row.mode & SOAP_XML_TREE) != 0 ? 0 : row.reference;
+            EXPECT_EQ(soap_element_ref(&ctx, "a:b", asked, &object, nullptr, 0, "", 20), expected);
+            EXPECT_EQ(ctx.error, 0);
+            EXPECT_EQ(mark(phase), row.ref_mark_after);
+            expect_other_mark_untouched(phase);
+        }
+}
+
+TEST_F(Forms, AReferenceIsAnEmptyElement)
+{
+    begin(2, ENCODED, 0, PART_BODY, SEND, 1);
+    EXPECT_EQ(soap_element_ref(&ctx, "a:b", -1, &object, nullptr, 0, "", 20), -1);
+    EXPECT_EQ(ctx.sent(), "<a:b SOAP-ENC:ref=\"_1\"/>");
+    begin(1, ENCODED, 0, PART_BODY, SEND, 2);
+    soap_element_ref(&ctx, "a:b", -1, &object, nullptr, 0, "", 20);
+    EXPECT_EQ(ctx.sent(), "<a:b href=\"#_1\"/>");
+}
+
+TEST_F(Forms, UnknownAndNullObjectsHaveNone)
+{
+    int stranger = 0;
+    begin(2, ENCODED, 0, PART_BODY, SEND, 2);
+    EXPECT_EQ(soap_element_id(&ctx, 4, &stranger, 20), 0);
+    EXPECT_EQ(soap_element_id(&ctx, -1, &stranger, 20), 0);
+    EXPECT_EQ(soap_element_ref(&ctx, "a:b", -1, &stranger, nullptr, 0, "", 20), 0);
+    EXPECT_EQ(soap_element_ref(&ctx, "a:b", -1, nullptr, nullptr, 0, "", 20), -1);
+    EXPECT_EQ(ctx.sent(), "") << "an absent value is left out";
+    EXPECT_EQ(soap_pointer_is_multi(&ctx, nullptr), 0);
+    EXPECT_EQ(soap_pointer_is_single(&ctx, nullptr), 0);
+}
+
+TEST_F(Forms, AnIndependentObjectIsBegunOnce)
+{
+    begin(2, ENCODED, 0, PART_BODY, SEND, 2);
+    EXPECT_EQ(soap_multiref_begin(&ctx, &object, nullptr, 0, "a:b", 20), 1);
+    EXPECT_EQ(ctx.encoding_flag, 1);
+    EXPECT_EQ(record->send_mark, 1);
+    EXPECT_EQ(soap_multiref_begin(&ctx, &object, nullptr, 0, "a:b", 20), 0);
+    soap_pointer_set_seen(&ctx, &object, 20);
+    EXPECT_EQ(record->count_mark, 1);
+    begin(1, LITERAL, 0, PART_BODY, SEND, 2);
+    EXPECT_EQ(soap_multiref_begin(&ctx, &object, nullptr, 0, "a:b", 20), 0);
+    EXPECT_EQ(ctx.encoding_flag, 0);
+}
+
+// --- the id table ---
+
+std::string id_of(std::size_t number)
+{
+    return "#" + std::to_string(number);
+}
+
+// Texts of one bucket, as a hostile sender makes them: the last byte adds its value to the hash.
+std::vector<std::string> texts_of_one_bucket(std::size_t count)
+{
+    std::vector<std::string> texts;
+    for (std::size_t i = 0; texts.size() < count; i++) {
+        std::string text = id_of(i) + ".!";
+        const std::size_t missing = SOAP_ID_HASH_SIZE - soap_id_hash(text.c_str());
+        if (missing > '~' - '!')
+            continue;
+        text.back() = static_cast<char>('!' + missing);
+        texts.push_back(text);
+    }
+    return texts;
+}
+
+TEST(IdTable, HashesAsDescribedWithSignedBytes)
+{
+    EXPECT_EQ(soap_id_hash(""), 0U);
+    EXPECT_EQ(soap_id_hash("a"), 97U);
+    EXPECT_EQ(soap_id_hash("ab"), (97ULL * 65599 + 98) % 1999);
+    EXPECT_EQ(soap_id_hash("\xff"), static_cast<std::uint64_t>(-1) % 1999);
+}
+
+TEST(IdTable, KeepsTextsApartThatHashAlike)
+{
+    auto ctx = std::make_unique<soap>();
+    const std::vector<std::string> texts = texts_of_one_bucket(400);
+    for (std::size_t i = 0; i < texts.size(); i++) {
+        ASSERT_EQ(soap_id_lookup(ctx.get(), texts[i].c_str()), nullptr);
+        soap_id_add(ctx.get(), texts[i].c_str())->type = static_cast<int>(i) + 20;
+    }
+    for (std::size_t i = 0; i < texts.size(); i++)
+        ASSERT_EQ(soap_id_type(ctx.get(), texts[i].c_str()), static_cast<int>(i) + 20);
+    EXPECT_EQ(soap_id_type(ctx.get(), "#none"), 0);
+    soap_id_table_reset(ctx.get());
+    EXPECT_EQ(soap_id_type(ctx.get(), texts[0].c_str()), 0);
+}
+
+TEST(IdTable, ManyIdsOfOneBucketStayCheap)
+{
+    constexpr std::size_t COUNT = 200000;
+    auto ctx = std::make_unique<soap>();
+    std::vector<std::string> texts = texts_of_one_bucket(COUNT / 2);
+    EXPECT_EQ(soap_id_hash(texts.front().c_str()), soap_id_hash(texts.back().c_str()));
+    while (texts.size() < COUNT)
+        texts.push_back(id_of(texts.size()));
+    std::vector<std::uint64_t> objects(COUNT);
+    for (std::size_t i = 0; i < COUNT; i++)
+        ASSERT_EQ(soap_object_register(ctx.get(), texts[i].c_str(), &objects[i], 20, 8, 0, nullptr, nullptr,
+                                       nullptr),
+                  &objects[i]);
+    for (std::size_t i = 0; i < COUNT; i++)
+        ASSERT_EQ(soap_id_lookup(ctx.get(), texts[i].c_str())->ptr, &objects[i]);
+    EXPECT_EQ(ctx->id_count, COUNT);
+    EXPECT_EQ(soap_forward_resolve(ctx.get()), 0);
+}
+
+// --- registering and references ---
+
+struct pair_value {
+    std::uint64_t one, two;
+};
+
+class Ids : public testing::Test {
+public:
+    soap ctx;
+
+    void *put(const char *id, void *object, int type = 20, std::size_t size = sizeof(pair_value),
+              unsigned level = 0)
+    {
+        return soap_object_register(&ctx, id, object, type, size, level, nullptr, nullptr, nullptr);
+    }
+    void *refer(const char *id, void *place, int type = 20, std::size_t size = sizeof(pair_value),
+                unsigned level = 0)
+    {
+        return soap_object_forward_ptr(&ctx, id, static_cast<void **>(place), type, size, level);
+    }
+    void *copy(const char *id, void *place, int type = 20, std::size_t size = sizeof(pair_value),
+               soap_copy_hook hook = nullptr, unsigned level = 0)
+    {
+        return soap_object_forward(&ctx, id, place, 0, type, type, size, level, hook);
+    }
+};
+
+TEST_F(Ids, RegisteringMakesTheObjectIfNoneIsGiven)
+{
+    void *made = put("#a", nullptr);
+    ASSERT_NE(made, nullptr);
+    EXPECT_EQ(ctx.allocated, 1);
+    pair_value own = {};
+    EXPECT_EQ(put("", &own), &own);
+    EXPECT_EQ(put(nullptr, &own), &own);
+    EXPECT_EQ(ctx.allocated, 0);
+    EXPECT_EQ(soap_id_type(&ctx, ""), 0) << "no id, no entry";
+    const auto instantiate = [](soap *c, int, const char *xsi, const char *, std::size_t *size) -> void * {
+        *size = 3;
+        return std::string(xsi) == "a:t" ? soap_block_alloc(c, 3) : nullptr;
+    };
+    EXPECT_NE(soap_object_register(&ctx, "#b", nullptr, 20, 99, 0, "a:t", "", instantiate), nullptr);
+    EXPECT_EQ(soap_id_lookup(&ctx, "#b")->size, 3U);
+}
+
+TEST_F(Ids, DisagreementAndRepetitionAreErrors)
+{
+    struct error_case {
+        const char *rule;
+        std::function<bool(Ids &, pair_value *, void **)> run; // true: it went through
+        int error;
+    };
+    const error_case cases[] = {
+        {"two objects", [](Ids &t, pair_value *v, void **) { return t.put("#i", v) && t.put("#i", v + 1); },
+         24},
+        {"copy of another type",
+         [](Ids &t, pair_value *v, void **) { return t.put("#i", v) && t.copy("#i", v + 1, 21); }, 26},
+        {"copy of another size",
+         [](Ids &t, pair_value *v, void **) { return t.put("#i", v) && t.copy("#i", v + 1, 20, 8); }, 26},
+        {"object of another type than a copy asked for",
+         [](Ids &t, pair_value *v, void **) { return t.copy("#i", v) && t.put("#i", v + 1, 21); }, 26},
+        {"object of another size than a hook asked for",
+         [](Ids &t, pair_value *v, void **) {
+             return t.copy("#i", v, 20, 16, soap_copy_bytes) && t.put("#i", v + 1, 20, 8);
+         },
+         26},
+        {"pointer to another type",
+         [](Ids &t, pair_value *v, void **p) { return t.put("#i", v) && t.refer("#i", p, 21); }, 26},
+        {"pointers to two types",
+         [](Ids &t, pair_value *, void **p) { return t.refer("#i", p) && t.refer("#i", p + 1, 21); }, 26},
+        {"object of another type than a pointer asked for",
+         [](Ids &t, pair_value *v, void **p) { return t.refer("#i", p) && t.put("#i", v, 21); }, 26},
+        {"object of another size than a pointer asked for: allowed",
+         [](Ids &t, pair_value *v, void **p) { return t.refer("#i", p) && t.put("#i", v, 20, 8); }, 0},
+    };
+    for (const error_case &row : cases) {
+        SCOPED_TRACE(row.rule);
+        soap_id_table_reset(&ctx);
+        ctx.error = 0;
+        ctx.element_id[0] = '\0';
+        pair_value values[2] = {};
+        void *places[2] = {};
+        EXPECT_EQ(row.run(*this, values, places), row.error == 0);
+        EXPECT_EQ(ctx.error, row.error);
+        EXPECT_STREQ(ctx.element_id, row.error != 0 ? "#i" : "");
+    }
+}
+
+TEST_F(Ids, PointersAreFilledThroughTheirIndirections)
+{
+    pair_value object = {1, 2};
+    void *before[3] = {}, *after[3] = {};
+    EXPECT_EQ(refer("#a", &before[1], 20, 16, 1) != &before[1], false)
+        << "the first reference sets the level";
+    EXPECT_NE(refer("#a", &before[2], 20, 16, 2), &before[2]);
+    EXPECT_EQ(refer("#a", &before[0], 20, 16, 0), &before[0]) << "now all others get a cell more";
+    EXPECT_EQ(put("#a", &object), &object);
+    for (unsigned level = 0; level < 3; level++)
+        ASSERT_NE(refer("#a", &after[level], 20, 16, level), nullptr);
+    ASSERT_EQ(soap_forward_resolve(&ctx), 0);
+    for (void **places : {before, after})
+        for (unsigned level = 0; level < 3; level++) {
+            void *target = places[level];
+            for (unsigned i = 0; i < level; i++)
+                target = *static_cast<void **>(target);
+            EXPECT_EQ(target, &object) << "level " << level;
+        }
+}
+
+TEST_F(Ids, AnObjectBelowTheLevelAskedForIsReachedThroughCells)
+{
+    pair_value object = {};
+    void *places[2] = {};
+    refer("#a", &places[0], 20, 16, 1);
+    refer("#a", &places[1], 20, 16, 1);
+    put("#a", &object);
+    ASSERT_EQ(soap_forward_resolve(&ctx), 0);
+    for (void *place : places)
+        EXPECT_EQ(*static_cast<void **>(place), &object);
+}
+
+TEST_F(Ids, AMissingIdIsAnErrorUnlessItLiesOutside)
+{
+    void *outside[2] = {&ctx, &ctx}, *missing = &ctx;
+    refer("cid:part", &outside[0]);
+    refer("cid:part", &outside[1]);
+    EXPECT_EQ(soap_forward_resolve(&ctx), 0);
+    EXPECT_EQ(outside[0], nullptr);
+    EXPECT_EQ(outside[1], nullptr);
+    refer("#gone", &missing);
+    EXPECT_EQ(soap_forward_resolve(&ctx), SOAP_MISSING_ID);
+    EXPECT_EQ(ctx.error, SOAP_MISSING_ID);
+    EXPECT_STREQ(ctx.element_id, "gone");
+    EXPECT_EQ(missing, nullptr);
+}
+
+// A vector stands for the containers of the binding; its hook stores the pointer at the index.
+using pointer_vector = std::vector<void *>;
+struct tree_node {
+    pointer_vector children;
+    std::uint64_t value;
+};
+
+void store_pointer(soap *, int, int, void *place, std::size_t index, const void *source, std::size_t)
+{
+    static_cast<pointer_vector *>(place)->at(index) = load_place(source);
+}
+
+void assign_node(soap *, int, int, void *place, std::size_t, const void *source, std::size_t)
+{
+    *static_cast<tree_node *>(place) = *static_cast<const tree_node *>(source);
+}
+
+TEST_F(Ids, ContainersThatHoldEachOtherAreFilledAndThenCopied)
+{
+    tree_node nodes[3] = {}, copied = {};
+    const auto child = [&](tree_node &node, const char *id) {
+        node.children.push_back(nullptr);
+        soap_object_forward(&ctx, id, &node.children, node.children.size() - 1, 30, 506, sizeof(void *), 1,
+                            store_pointer);
+    };
+    child(nodes[0], "#1");
+    child(nodes[0], "#0");
+    EXPECT_EQ(soap_object_forward(&ctx, "#0", &copied, 0, 30, 30, sizeof(tree_node), 0, assign_node),
+              &copied);
+    for (std::size_t i = 0; i < 3; i++) {
+        nodes[i].value = i + 100;
+        ASSERT_NE(put(id_of(i).c_str(), &nodes[i], 30, sizeof(tree_node)), nullptr);
+    }
+    child(nodes[1], "#0");
+    child(nodes[1], "#2");
+    ASSERT_EQ(soap_forward_resolve(&ctx), 0);
+    EXPECT_EQ(nodes[0].children, (pointer_vector{&nodes[1], &nodes[0]}));
+    EXPECT_EQ(nodes[1].children, (pointer_vector{&nodes[0], &nodes[2]}));
+    EXPECT_EQ(copied.children, nodes[0].children) << "an object is copied when its own members are filled";
+    EXPECT_EQ(copied.value, 100U);
+}
+
+TEST_F(Ids, SmallValuesAndHooksAreCopiedLate)
+{
+    std::int32_t source = 0, places[2] = {7, 7};
+    copy("#n", &places[0], 1, sizeof source);
+    put("#n", &source, 1, sizeof source);
+    copy("#n", &places[1], 1, sizeof source);
+    source = -5;
+    EXPECT_EQ(soap_forward_has_pending(&ctx, places, places + 1), -1);
+    EXPECT_EQ(soap_forward_has_pending(&ctx, places + 1, places + 2), -1);
+    EXPECT_EQ(soap_forward_has_pending(&ctx, &source, &source + 1), 0);
+    ASSERT_EQ(soap_forward_resolve(&ctx), 0);
+    EXPECT_EQ(places[0], -5);
+    EXPECT_EQ(places[1], -5);
+    EXPECT_EQ(soap_forward_has_pending(&ctx, places, places + 2), 0);
+}
+
+TEST_F(Ids, CyclesOfCopiesStayUnfilledWithoutAnError)
+{
+    pair_value values[3] = {{1, 1}, {2, 2}, {3, 3}}, outside = {4, 4};
+    put("#0", &values[0]);
+    put("#1", &values[1]);
+    put("#2", &values[2]);
+    copy("#1", &values[0]);
+    copy("#0", &values[1]);
+    copy("#2", &values[2]);
+    copy("#0", &outside);
+    EXPECT_EQ(soap_forward_resolve(&ctx), 0);
+    for (const pair_value &value : values)
+        EXPECT_EQ(value.one, 0U) << "no place keeps an address";
+    EXPECT_EQ(values[0].two, 1U);
+    EXPECT_EQ(outside.one, 0U);
+    EXPECT_EQ(outside.two, 4U);
+}
+
+TEST_F(Ids, CopiesAreDroppedWhenTheLevelOfAnIdFalls)
+{
+    pair_value object = {5, 6}, place = {7, 8};
+    void *far = nullptr, *near = nullptr;
+    refer("#a", &far, 20, sizeof object, 1);
+    copy("#a", &place);
+    refer("#a", &near);
+    put("#a", &object);
+    ASSERT_EQ(soap_forward_resolve(&ctx), 0);
+    EXPECT_EQ(place.one, 0U);
+    EXPECT_EQ(place.two, 8U);
+    EXPECT_EQ(near, &object);
+    EXPECT_EQ(*static_cast<void **>(far), &object);
+}
+
+TEST_F(Ids, LongChainsOfCopiesAreFilledInAnyOrder)
+{
+    constexpr std::size_t COUNT = 100000;
+    std::vector<pair_value> values(COUNT);
+    for (std::size_t i = 0; i < COUNT; i++) {
+        ASSERT_NE(put(id_of(i).c_str(), &values[i]), nullptr);
+        ASSERT_TRUE(i + 1 == COUNT || copy(id_of(i + 1).c_str(), &values[i]) != nullptr);
+    }
+    values[COUNT - 1] = {11, 12};
+    ASSERT_EQ(soap_forward_resolve(&ctx), 0);
+    for (const pair_value &value : values)
+        ASSERT_EQ(value.two, 12U);
+}
+
+TEST_F(Ids, WhatWaitsMovesWithItsBlock)
+{
+    constexpr std::size_t COUNT = 6; // elements
+    constexpr std::size_t WIDTH = 6; // words: pointer, two of a value, a small value, two of a value
+    pair_value object = {5, 6};
+    void *fixed[COUNT] = {};
+    soap_block_stack *stack = soap_block_stack_push(&ctx);
+    void **element = nullptr;
+    for (std::size_t i = 0; i < COUNT; i++) {
+        element = static_cast<void **>(soap_block_stack_grow(&ctx, stack, WIDTH * sizeof(void *)));
+        refer(i % 2 == 0 ? "#p" : "#q", element);
+        refer("#p", &fixed[i]); // the chain runs in and out of the blocks
+        copy("#p", element + 1);
+        copy("#n", element + 3, 1, 4);
+        copy("#p", element + 4);
+    }
+    put("#q", element + 1); // an object within a block moves too
+    EXPECT_EQ(soap_forward_has_pending(&ctx, element + 3, element + 4), -1);
+    void **array = static_cast<void **>(soap_block_stack_save(&ctx, stack, nullptr, 1));
+    ASSERT_NE(array, nullptr);
+    EXPECT_EQ(soap_forward_has_pending(&ctx, array, array + 1), -1);
+    std::int32_t number = 9;
+    put("#p", &object);
+    put("#n", &number, 1, sizeof number);
+    ASSERT_EQ(soap_forward_resolve(&ctx), 0);
+    for (std::size_t i = 0; i < COUNT; i++) {
+        void **moved = array + WIDTH * i;
+        void *q = array + WIDTH * (COUNT - 1) + 1;
+        EXPECT_EQ(moved[0], i % 2 == 0 ? static_cast<void *>(&object) : q) << i;
+        EXPECT_EQ(fixed[i], &object);
+        EXPECT_EQ(std::memcmp(&moved[1], &object, sizeof object), 0) << i;
+        EXPECT_EQ(std::memcmp(&moved[4], &object, sizeof object), 0) << i;
+        EXPECT_EQ(std::memcmp(&moved[3], &number, sizeof number), 0) << i;
+    }
+}
+
+// --- random graphs against a model ---
+
+// A message of values, each of its own or a copy of another, and of composites of two values that are copied
+// whole; pointers refer to all of them. The elements arrive in random order.
+struct composite {
+    pair_value left, right;
+};
+
+class graph {
+public:
+    graph(soap *context, unsigned seed) : ctx(context), random(seed)
+    {
+        composites.resize(pick(30) + 1);
+        copies.resize(pick(30));
+        values.resize(pick(60) + 1);
+        pointers.resize(pick(60));
+        plan();
+    }
+
+    bool read()
+    {
+        std::vector<std::function<bool()>> events;
+        for (std::size_t i = 0; i < values.size(); i++)
+            events.emplace_back(
+                [this, i] { return read_value(value_name(i), &values[i], value_source[i], i + 1); });
+        for (std::size_t i = 0; i < composites.size(); i++)
+            events.emplace_back([this, i] { return read_composite(i); });
+        for (std::size_t i = 0; i < copies.size(); i++)
+            events.emplace_back([this, i] {
+                return soap_object_forward(ctx, composite_name(copy_source[i]).c_str(), &copies[i], 0, 41, 41,
+                                           sizeof(composite), 0, nullptr) != nullptr;
+            });
+        for (std::size_t i = 0; i < pointers.size(); i++)
+            events.emplace_back([this, i] {
+                return soap_object_forward_ptr(ctx, value_name(pointer_target[i]).c_str(),
+                                               reinterpret_cast<void **>(&pointers[i]), 40,
+                                               sizeof(pair_value), 0) != nullptr;
+            });
+        std::shuffle(events.begin(), events.end(), random);
+        for (const auto &event : events)
+            if (!event())
+                return false;
+        return true;
+    }
+
+    void check() const
+    {
+        for (std::size_t i = 0; i < values.size(); i++)
+            ASSERT_EQ(values[i].two, expected(i)) << "value " << i;
+        for (std::size_t i = 0; i < composites.size(); i++) {
+            ASSERT_EQ(composites[i].left.two, expected(left_source[i])) << "composite " << i;
+            ASSERT_EQ(composites[i].right.two, expected(right_source[i])) << "composite " << i;
+        }
+        for (std::size_t i = 0; i < copies.size(); i++) {
+            const std::size_t source = copy_source[i];
+            const bool whole = !unfilled(left_source[source]) && !unfilled(right_source[source]);
+            ASSERT_EQ(copies[i].left.two, whole ? expected(left_source[source]) : 0) << "copy " << i;
+            ASSERT_EQ(copies[i].right.two, whole ? expected(right_source[source]) : 0) << "copy " << i;
+        }
+        for (std::size_t i = 0; i < pointers.size(); i++)
+            ASSERT_EQ(pointers[i], &values[pointer_target[i]]) << "pointer " << i;
+    }
+
+private:
+    static constexpr std::size_t OWN = SIZE_MAX; // no source: the value stands there
+
+    soap *ctx;
+    std::mt19937 random;
+    std::vector<pair_value> values;
+    std::vector<composite> composites, copies;
+    std::vector<pair_value *> pointers;
+    std::vector<std::size_t> value_source, left_source, right_source, copy_source, pointer_target;
+
+    std::size_t pick(std::size_t below) { return random() % below; }
+    static std::string value_name(std::size_t i) { return "#v" + std::to_string(i); }
+    static std::string composite_name(std::size_t i) { return "#c" + std::to_string(i); }
+
+    void plan()
+    {
+        for (std::size_t i = 0; i < values.size(); i++)
+            value_source.push_back(pick(3) == 0 ? OWN : pick(values.size()));
+        for (std::size_t i = 0; i < composites.size(); i++) {
+            left_source.push_back(pick(values.size()));
+            right_source.push_back(pick(values.size()));
+        }
+        for (std::size_t i = 0; i < copies.size(); i++)
+            copy_source.push_back(pick(composites.size()));
+        for (std::size_t i = 0; i < pointers.size(); i++)
+            pointer_target.push_back(pick(values.size()));
+    }
+
+    bool read_value(const std::string &id, pair_value *place, std::size_t source, std::size_t own)
+    {
+        if (!id.empty() && soap_object_register(ctx, id.c_str(), place, 40, sizeof *place, 0, nullptr,
+                                                nullptr, nullptr) == nullptr)
+            return false;
+        *place = {};
+        if (source == OWN)
+            *place = {own, own};
+        return source == OWN || soap_object_forward(ctx, value_name(source).c_str(), place, 0, 40, 40,
+                                                    sizeof *place, 0, nullptr) != nullptr;
+    }
+
+    bool read_composite(std::size_t i)
+    {
+        return soap_object_register(ctx, composite_name(i).c_str(), &composites[i], 41, sizeof(composite), 0,
+                                    nullptr, nullptr, nullptr) != nullptr &&
+               read_value("", &composites[i].left, left_source[i], 0) &&
+               read_value("", &composites[i].right, right_source[i], 0);
+    }
+
+    // The model: follow the copies to a value of its own; on a cycle there is none.
+    std::size_t origin(std::size_t i) const
+    {
+        for (std::size_t steps = 0; steps <= values.size(); steps++, i = value_source[i])
+            if (value_source[i] == OWN)
+                return i;
+        return OWN;
+    }
+    bool unfilled(std::size_t i) const { return origin(i) == OWN; }
+    std::uint64_t expected(std::size_t i) const { return unfilled(i) ? 0 : origin(i) + 1; }
+};
+
+TEST_F(Ids, RandomGraphsResolveAsAModelDoes)
+{
+    for (unsigned seed = 0; seed < 400; seed++) {
+        graph message(&ctx, seed);
+        ASSERT_TRUE(message.read()) << seed;
+        ASSERT_EQ(soap_forward_resolve(&ctx), 0) << seed;
+        message.check();
+        ASSERT_FALSE(HasFailure()) << "seed " << seed;
+        soap_discard_all(&ctx);
+    }
+}
+
+TEST_F(Ids, EveryAllocationMayFail)
+{
+    constexpr std::size_t COUNT = 3000; // enough for the index of many ids
+    std::vector<std::string> ids;
+    for (std::size_t i = 0; i < COUNT; i++)
+        ids.push_back(id_of(i));
+    std::vector<pair_value> values(COUNT);
+    std::vector<void *> places(COUNT);
+    int result = 0;
+    const auto message = [&] {
+        for (std::size_t i = 0; i < COUNT; i++) {
+            const char *next = ids[(i + 1) % COUNT].c_str();
+            const bool stands = i % 7 == 0; // the others are copies
+            if (!refer(next, &places[i], 20, 16, i % 3 == 0 ? 1 : 0) || !put(ids[i].c_str(), &values[i]) ||
+                (!stands && !copy(next, &values[i], 20, 16, i % 2 == 0 ? soap_copy_bytes : nullptr)))
+                return ctx.error;
+        }
+        return soap_forward_resolve(&ctx);
+    };
+    std::size_t refusals = 0;
+    // Each run starts anew, so a few hundred allocations are taken as a sample: all of the first, then wider
+    // apart.
+    for (std::size_t nth = 1;; nth += 1 + nth / 16) {
+        bool refused = false;
+        {
+            const failing_malloc::scope armed(nth);
+            result = message();
+            refused = armed.refused() > 0;
+        }
+        ASSERT_EQ(result, refused ? SOAP_OUT_OF_MEMORY : 0) << nth;
+        ASSERT_EQ(ctx.error, result);
+        soap_discard_all(&ctx);
+        ctx.error = 0;
+        if (!refused)
+            break;
+        refusals++;
+    }
+    EXPECT_GT(refusals, 50U);
+}
+
+} // namespace

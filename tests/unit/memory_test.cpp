@@ -1,0 +1,462 @@
+// memory_test.cpp - tracked allocation, managed blocks, instances, block stacks, growing text.
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_memory.h>
+
+#include <cstdlib>
+#include <cstring>
+#include <new>
+#include <string>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+#include "support/failing_malloc.h"
+
+namespace {
+
+using testing::internal::CaptureStderr;
+using testing::internal::GetCapturedStderr;
+
+std::string text_of(const void *address)
+{
+    char text[32];
+    std::snprintf(text, sizeof text, "%p", address);
+    return text;
+}
+
+const std::string CORRUPTION = "Data corruption in dynamic allocation (see logs)\n";
+
+// Order in which the hook below was called, by type id.
+std::vector<int> destroyed;
+
+int note_destruction(soap_instance *instance)
+{
+    destroyed.push_back(instance->type_id);
+    return instance->type_id < 0 ? 1 : 0; // negative: refuses
+}
+
+class Memory : public testing::Test {
+protected:
+    void SetUp() override { destroyed.clear(); }
+
+    soap ctx;
+};
+
+TEST_F(Memory, NamesFreesOfBlocksThatAreNotLive)
+{
+    char outside = 0;
+    void *block = tracked_malloc(&ctx, "from.cpp", 7, 40);
+    CaptureStderr();
+    tracked_free(&ctx, "to.cpp", 8, block);
+    tracked_free(&ctx, "to.cpp", 8, nullptr);
+    EXPECT_EQ(GetCapturedStderr(), "");
+    CaptureStderr();
+    tracked_free(&ctx, "to.cpp", 9, block);
+    tracked_free(&ctx, "to.cpp", 10, &outside);
+    EXPECT_EQ(GetCapturedStderr(), "to.cpp(9): free(" + text_of(block) +
+                                       ") double free of pointer malloced at from.cpp(7)\n"
+                                       "to.cpp(10): free(" +
+                                       text_of(&outside) + ") pointer not malloced\n");
+}
+
+TEST_F(Memory, NamesALeakAtTheEndWithItsOrigin)
+{
+    auto *other = new soap;
+    void *leaked = tracked_malloc(other, "origin.cpp", 123, 16);
+    tracked_free(other, "x", 1, tracked_malloc(other, "freed.cpp", 5, 16));
+    CaptureStderr();
+    delete other;
+    EXPECT_EQ(GetCapturedStderr(), "origin.cpp(123): malloc() = " + text_of(leaked) +
+                                       " not freed (memory leak or forgot to call soap_end()?)\n");
+    std::free(leaked);
+}
+
+TEST_F(Memory, RemembersABoundedNumberOfFreedBlocks)
+{
+    std::vector<void *> blocks;
+    for (int i = 0; i < 5000; ++i)
+        blocks.push_back(tracked_malloc(&ctx, "a", 1, 24));
+    for (void *block : blocks)
+        tracked_free(&ctx, "b", 2, block);
+    CaptureStderr();
+    tracked_free(&ctx, "c", 3, blocks.front());
+    tracked_free(&ctx, "c", 4, blocks.back());
+    EXPECT_EQ(GetCapturedStderr(), "c(3): free(" + text_of(blocks.front()) + ") pointer not malloced\n" +
+                                       "c(4): free(" + text_of(blocks.back()) +
+                                       ") double free of pointer malloced at a(1)\n");
+}
+
+TEST_F(Memory, TableGrowsWithItsLoadAndStaysCorrect)
+{
+    constexpr std::size_t COUNT = 100000;
+    std::vector<void *> blocks;
+    for (std::size_t i = 0; i < COUNT; ++i)
+        blocks.push_back(tracked_malloc(&ctx, "a", 1, 16));
+    EXPECT_GE(ctx.track_chain_mask + 1, COUNT);
+    CaptureStderr();
+    for (void *block : blocks)
+        tracked_free(&ctx, "b", 2, block);
+    EXPECT_EQ(GetCapturedStderr(), "");
+}
+
+TEST_F(Memory, CallsReuseWhatEarlierCallsNeeded)
+{
+    const auto call = [this] {
+        for (int i = 0; i < 1000; ++i) {
+            soap_block_alloc(&ctx, 20);
+            soap_instance_register(&ctx, &ctx, i, -1, note_destruction);
+        }
+        soap_discard_objects(&ctx, nullptr);
+        soap_discard_all(&ctx);
+    };
+    destroyed.reserve(30000); // so that only the context allocates below
+    for (int warm_up = 0; warm_up < 10; ++warm_up)
+        call();
+    const std::size_t before = failing_malloc::allocations();
+    for (int i = 0; i < 20; ++i)
+        call();
+    EXPECT_EQ(failing_malloc::allocations() - before, 20000u)
+        << "one for each block, none for the book-keeping";
+}
+
+TEST_F(Memory, ManagedBlocksKeepTheirSizeAlignmentAndCanary)
+{
+    for (std::size_t size = 1; size <= 70; ++size) {
+        auto *block = static_cast<char *>(soap_block_alloc(&ctx, size));
+        std::memset(block, 'x', size);
+        const std::size_t span = (size + 2 + 7) / 8 * 8;
+        std::uint16_t canary;
+        std::memcpy(&canary, block + span - 2, sizeof canary);
+        EXPECT_EQ(reinterpret_cast<std::uintptr_t>(block) % 8, 0u) << size;
+        EXPECT_EQ(reinterpret_cast<char *>(ctx.allocation_list), block + span) << size;
+        EXPECT_EQ(canary, 0xC0DE) << size;
+    }
+}
+
+TEST_F(Memory, AnEmptyBlockIsTheSharedEmptyText)
+{
+    ctx.allocated = 0;
+    auto *empty = static_cast<char *>(soap_block_alloc(&ctx, 0));
+    EXPECT_STREQ(empty, "");
+    EXPECT_EQ(soap_block_alloc(&ctx, 0), empty);
+    EXPECT_EQ(ctx.allocation_list, nullptr);
+    EXPECT_EQ(ctx.allocated, 0);
+    soap_block_alloc(&ctx, 1);
+    EXPECT_EQ(ctx.allocated, 1);
+    CaptureStderr();
+    soap_block_free(&ctx, empty);
+    EXPECT_EQ(GetCapturedStderr(), "");
+}
+
+TEST_F(Memory, TheHostsAllocatorTakesThePlaceOfManagedBlocks)
+{
+    static char area[16];
+    ctx.on_malloc = [](soap *, std::size_t size) -> void * { return size <= sizeof area ? area : nullptr; };
+    EXPECT_EQ(soap_block_alloc(&ctx, 16), area);
+    EXPECT_EQ(soap_block_alloc(&ctx, 17), nullptr);
+    EXPECT_EQ(ctx.allocation_list, nullptr);
+    void *plain = soap_block_alloc(nullptr, 8);
+    std::free(plain);
+}
+
+TEST_F(Memory, OneByteIntoThePaddingIsHarmlessOnePastItIsReported)
+{
+    auto *padded = static_cast<char *>(soap_block_alloc(&ctx, 3)); // spans 8: three bytes of padding
+    padded[5] = 'x';
+    CaptureStderr();
+    soap_block_free(&ctx, nullptr);
+    EXPECT_EQ(GetCapturedStderr(), "");
+    EXPECT_EQ(ctx.error, 0);
+
+    void *older = soap_block_alloc(&ctx, 8);
+    auto *damaged = static_cast<char *>(soap_block_alloc(&ctx, 6));
+    soap_block_alloc(&ctx, 8);
+    const char canary = damaged[6];
+    damaged[6] = 'x';
+    CaptureStderr();
+    soap_block_free(&ctx, older);
+    EXPECT_EQ(GetCapturedStderr(), CORRUPTION) << "a search passes the damaged block";
+    ctx.error = 0;
+    CaptureStderr();
+    soap_block_free(&ctx, nullptr);
+    EXPECT_EQ(GetCapturedStderr(), CORRUPTION);
+    EXPECT_EQ(ctx.error, SOAP_CORRUPTION);
+    EXPECT_NE(ctx.allocation_list, nullptr) << "the damaged block and the older ones stay";
+    damaged[6] = canary;
+}
+
+TEST_F(Memory, FreesOneBlockOrOneInstanceByAddress)
+{
+    void *first = soap_block_alloc(&ctx, 8);
+    void *second = soap_block_alloc(&ctx, 8);
+    int object = 0;
+    soap_instance_register(&ctx, &object, 4, -1, note_destruction);
+    soap_block_free(&ctx, first);
+    CaptureStderr();
+    tracked_free(&ctx, "c", 1, first);
+    EXPECT_NE(GetCapturedStderr().find("double free"), std::string::npos);
+    EXPECT_TRUE(destroyed.empty());
+    soap_block_free(&ctx, &object);
+    EXPECT_EQ(destroyed, std::vector<int>{4});
+    EXPECT_EQ(ctx.instance_list, nullptr);
+    std::memset(second, 0, 8);
+}
+
+TEST_F(Memory, FreeingAllForgetsTheFieldsThatLiveInBlocks)
+{
+    ctx.http_content = soap_string_dup(&ctx, "a/b");
+    ctx.action = ctx.auth_user = ctx.auth_password = ctx.auth_realm = ctx.http_content;
+    ctx.header = static_cast<SOAP_ENV__Header *>(soap_block_alloc(&ctx, 8));
+    ctx.fault = static_cast<SOAP_ENV__Fault *>(soap_block_alloc(&ctx, 8));
+    ctx.mime.boundary = soap_string_dup(&ctx, "b");
+    ctx.output_mode = MODE_MIME | MODE_CHUNKED;
+    soap_block_free(&ctx, nullptr);
+    for (const void *field :
+         {static_cast<const void *>(ctx.http_content), static_cast<const void *>(ctx.action),
+          static_cast<const void *>(ctx.auth_user), static_cast<const void *>(ctx.auth_password),
+          static_cast<const void *>(ctx.auth_realm), static_cast<const void *>(ctx.header),
+          static_cast<const void *>(ctx.fault), static_cast<const void *>(ctx.mime.boundary)})
+        EXPECT_EQ(field, nullptr);
+    EXPECT_EQ(ctx.output_mode, MODE_CHUNKED);
+    EXPECT_EQ(ctx.allocation_list, nullptr);
+}
+
+TEST_F(Memory, DestroysInstancesNewestFirstAndNamesRefusals)
+{
+    int objects[3];
+    soap_instance_register(&ctx, &objects[0], 1, -1, note_destruction);
+    soap_instance_register(&ctx, &objects[1], -2, -1, note_destruction);
+    soap_instance_register(&ctx, &objects[2], 3, 4, note_destruction);
+    EXPECT_EQ(ctx.instance_list->array_size, 4);
+    ctx.fault = static_cast<SOAP_ENV__Fault *>(soap_block_alloc(&ctx, 8));
+    CaptureStderr();
+    soap_discard_objects(&ctx, nullptr);
+    EXPECT_EQ(GetCapturedStderr(),
+              "new(object type = -2) = " + text_of(&objects[1]) + " not freed: deletion callback failed\n");
+    EXPECT_EQ(destroyed, (std::vector<int>{3, -2, 1}));
+    EXPECT_EQ(ctx.fault, nullptr);
+}
+
+TEST_F(Memory, WhatIsTakenOutOfManagementIsTheCallers)
+{
+    int object = 0;
+    char *text = soap_string_dup(&ctx, "kept");
+    soap_instance_register(&ctx, &object, 1, -1, note_destruction);
+    EXPECT_EQ(soap_block_unlink(&ctx, text), 0);
+    EXPECT_EQ(soap_block_unlink(&ctx, &object), 0);
+    EXPECT_EQ(soap_block_unlink(&ctx, text), -1);
+    EXPECT_EQ(soap_block_unlink(&ctx, nullptr), -1);
+    EXPECT_EQ(soap_block_unlink(nullptr, text), -1);
+    CaptureStderr();
+    soap_discard_objects(&ctx, nullptr);
+    soap_discard_all(&ctx);
+    soap_engine_done(&ctx);
+    EXPECT_EQ(GetCapturedStderr(), "");
+    EXPECT_TRUE(destroyed.empty());
+    EXPECT_STREQ(text, "kept");
+    std::free(text);
+}
+
+TEST_F(Memory, BlocksAndInstancesMoveToAnotherContext)
+{
+    auto *source = new soap;
+    char *own = soap_string_dup(&ctx, "own");
+    char *moved = soap_string_dup(source, "moved");
+    soap_instance_register(&ctx, own, 1, -1, note_destruction);
+    soap_instance_register(source, moved, 2, -1, note_destruction);
+    soap_blocks_move(source, &ctx);
+    CaptureStderr();
+    delete source;
+    EXPECT_STREQ(moved, "moved");
+    EXPECT_TRUE(destroyed.empty());
+    soap_discard_objects(&ctx, nullptr);
+    EXPECT_EQ(destroyed, (std::vector<int>{1, 2})) << "moved instances come behind the target's own";
+    soap_block_free(&ctx, moved);
+    soap_block_free(&ctx, own);
+    EXPECT_EQ(ctx.allocation_list, nullptr);
+    EXPECT_EQ(GetCapturedStderr(), "");
+}
+
+TEST_F(Memory, ADamagedBlockStopsTheMove)
+{
+    soap target;
+    char *block = soap_string_dup(&ctx, "12345"); // six bytes: the canary follows at once
+    const char canary = block[6];
+    block[6] = 'x';
+    CaptureStderr();
+    soap_blocks_move(&ctx, &target);
+    EXPECT_EQ(GetCapturedStderr(), CORRUPTION);
+    EXPECT_EQ(ctx.error, SOAP_CORRUPTION);
+    EXPECT_EQ(target.allocation_list, nullptr);
+    block[6] = canary;
+}
+
+TEST_F(Memory, CopiesTexts)
+{
+    EXPECT_EQ(soap_string_dup(&ctx, nullptr), nullptr);
+    EXPECT_EQ(soap_wide_string_dup(&ctx, nullptr), nullptr);
+    EXPECT_STREQ(soap_string_dup(&ctx, ""), "");
+    EXPECT_STREQ(soap_string_dup_n(&ctx, "abcdef", 3), "abc");
+    EXPECT_EQ(std::u32string(soap_wide_string_dup(&ctx, U"\U0001F600x")), U"\U0001F600x");
+    EXPECT_EQ(ctx.error, 0);
+}
+
+void append_block(soap *ctx, const char *text)
+{
+    std::memcpy(soap_block_stack_grow(ctx, nullptr, std::strlen(text)), text, std::strlen(text));
+}
+
+TEST_F(Memory, ABlockStackGathersInOrder)
+{
+    soap_block_stack *lower = soap_block_stack_push(&ctx);
+    append_block(&ctx, "below");
+    soap_block_stack_push(&ctx);
+    append_block(&ctx, "one");
+    append_block(&ctx, "fourteen");
+    EXPECT_EQ(soap_block_stack_size(&ctx, nullptr), 8u);
+    EXPECT_EQ(soap_block_stack_trim(&ctx, nullptr, 4), 7u);
+    auto *text = static_cast<char *>(soap_block_stack_save(&ctx, nullptr, nullptr, 0));
+    EXPECT_EQ(std::string(text, 7), "onefour");
+    EXPECT_EQ(ctx.block_stack, lower);
+
+    soap_block_stack_push(&ctx);
+    append_block(&ctx, "top");
+    char target[5];
+    EXPECT_EQ(soap_block_stack_save(&ctx, lower, target, 0), target);
+    EXPECT_EQ(std::string(target, 5), "below") << "a stack is saved wherever it stands";
+    EXPECT_EQ(ctx.block_stack->total_size, 3u);
+    soap_block_stack_drop(&ctx, nullptr);
+    EXPECT_EQ(ctx.block_stack, nullptr);
+}
+
+TEST_F(Memory, ABlockStackIsReadOldestFirst)
+{
+    soap_block_stack_push(&ctx);
+    append_block(&ctx, "first");
+    append_block(&ctx, "2nd");
+    EXPECT_EQ(std::string(soap_block_stack_first(&ctx, nullptr), 5), "first");
+    EXPECT_EQ(soap_block_stack_size(&ctx, nullptr), 5u);
+    EXPECT_EQ(std::string(soap_block_stack_next(&ctx, nullptr), 3), "2nd");
+    EXPECT_EQ(ctx.block_stack->total_size, 3u);
+    EXPECT_EQ(soap_block_stack_next(&ctx, nullptr), nullptr);
+    EXPECT_EQ(soap_block_stack_next(&ctx, nullptr), nullptr);
+}
+
+TEST_F(Memory, OperationsOnNoStackDoNothing)
+{
+    EXPECT_EQ(soap_block_stack_grow(&ctx, nullptr, 8), nullptr);
+    EXPECT_EQ(soap_block_stack_first(&ctx, nullptr), nullptr);
+    EXPECT_EQ(soap_block_stack_next(&ctx, nullptr), nullptr);
+    EXPECT_EQ(soap_block_stack_trim(&ctx, nullptr, 0), 0u);
+    soap_block_stack_drop(&ctx, nullptr);
+}
+
+TEST_F(Memory, GrowingTextDoublesFrom256)
+{
+    const std::string text(200, 'a'), more(1000, 'b');
+    EXPECT_EQ(soap_text_buffer_put(&ctx, text.data(), text.size()), 0);
+    EXPECT_EQ(ctx.label_size, 256u);
+    EXPECT_EQ(soap_text_buffer_put(&ctx, more.data(), more.size()), 0);
+    EXPECT_EQ(ctx.label_size, 2048u);
+    EXPECT_EQ(std::string(ctx.label_buffer, ctx.label_index), text + more);
+    EXPECT_EQ(soap_text_buffer_reset_put(&ctx, "c", 1), 0);
+    EXPECT_EQ(std::string(ctx.label_buffer, ctx.label_index), "c");
+    EXPECT_EQ(soap_text_buffer_reserve(&ctx, 2048), 0);
+    EXPECT_EQ(ctx.label_size, 4096u);
+    EXPECT_EQ(ctx.label_index, 1u);
+}
+
+TEST_F(Memory, SizesBeyondTheAddressSpaceAreOutOfMemory)
+{
+    const auto expect_refusal = [this] {
+        EXPECT_EQ(ctx.error, SOAP_OUT_OF_MEMORY);
+        ctx.error = 0;
+    };
+    for (const std::size_t less : {std::size_t{0}, std::size_t{1}, std::size_t{40}}) {
+        EXPECT_EQ(soap_block_alloc(&ctx, SIZE_MAX - less), nullptr);
+        expect_refusal();
+    }
+    EXPECT_EQ(soap_string_dup_n(&ctx, "", SIZE_MAX), nullptr);
+    expect_refusal();
+    soap_block_stack_push(&ctx);
+    append_block(&ctx, "x");
+    EXPECT_EQ(soap_block_stack_grow(&ctx, nullptr, SIZE_MAX - sizeof(soap_block)), nullptr);
+    expect_refusal();
+    soap_text_buffer_put(&ctx, "x", 1);
+    EXPECT_EQ(soap_text_buffer_reserve(&ctx, SIZE_MAX), SOAP_OUT_OF_MEMORY);
+    expect_refusal();
+}
+
+// Each row allocates in a context with empty pools; a refusal gives error 20 and leaves everything as it was.
+TEST(MemoryExhausted, EveryAllocationMayFail)
+{
+    struct failure_case {
+        const char *what;
+        bool (*run)(soap *ctx); // true: it says that it failed
+    };
+    static const failure_case cases[] = {
+        {"block", [](soap *ctx) { return soap_block_alloc(ctx, 10) == nullptr; }},
+        {"text", [](soap *ctx) { return soap_string_dup(ctx, "abc") == nullptr; }},
+        {"wide text", [](soap *ctx) { return soap_wide_string_dup(ctx, U"abc") == nullptr; }},
+        {"instance",
+         [](soap *ctx) { return soap_instance_register(ctx, ctx, 1, -1, note_destruction) == nullptr; }},
+        {"stack", [](soap *ctx) { return soap_block_stack_push(ctx) == nullptr; }},
+        {"growing text", [](soap *ctx) { return soap_text_buffer_put(ctx, "abc", 3) != 0; }},
+        {"gathering",
+         [](soap *ctx) {
+             return soap_block_stack_push(ctx) == nullptr ||
+                    soap_block_stack_grow(ctx, nullptr, 8) == nullptr ||
+                    soap_block_stack_save(ctx, nullptr, nullptr, 0) == nullptr;
+         }},
+    };
+    for (const failure_case &c : cases) {
+        SCOPED_TRACE(c.what);
+        const std::size_t runs_before = destroyed.size();
+        CaptureStderr();
+        alignas(soap) static unsigned char memory[sizeof(soap)];
+        soap *ctx = nullptr;
+        bool failed = false;
+        std::size_t refusals = failing_malloc::at_each_allocation(
+            failing_malloc::refuse::one,
+            [&] {
+                ctx = new (memory) soap;
+                soap_engine_done(ctx);
+                soap_context_init(ctx);
+                failed = c.run(ctx);
+            },
+            [&](bool) {
+                EXPECT_EQ(ctx->error, failed ? SOAP_OUT_OF_MEMORY : 0);
+                ctx->~soap();
+            });
+        EXPECT_EQ(GetCapturedStderr(), "") << "no leak, no wrong free";
+        EXPECT_GT(refusals, 0u);
+        destroyed.resize(runs_before);
+    }
+}
+
+TEST(MemoryExhausted, AMoveFailsWholeOrNotAtAll)
+{
+    std::size_t refusals = 0;
+    for (std::size_t nth = 1;; ++nth) {
+        soap source, target;
+        for (int i = 0; i < 600; ++i) {
+            soap_block_alloc(&source, 8);
+            soap_instance_register(&source, &source, i + 1, -1, note_destruction);
+        }
+        bool refused = false;
+        {
+            const failing_malloc::scope armed(nth);
+            soap_blocks_move(&source, &target);
+            refused = armed.refused() > 0;
+        }
+        if (!refused)
+            break;
+        ++refusals;
+        EXPECT_NE(source.allocation_list, nullptr);
+        EXPECT_EQ(target.allocation_list, nullptr);
+        EXPECT_EQ(source.error, SOAP_OUT_OF_MEMORY);
+    }
+    EXPECT_GT(refusals, 1u);
+}
+
+} // namespace

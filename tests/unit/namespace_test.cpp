@@ -1,0 +1,302 @@
+// The namespace table's working copy and the prefixes in scope.
+#include <chrono>
+#include <set>
+#include <string>
+
+#include <zuv_client_pro/soap_error.h>
+
+#include "codec/namespace.h"
+#include "support/failing_malloc.h"
+#include "support/writer_fixture.h"
+
+using writer_fixture::table;
+using writer_fixture::writer;
+
+namespace {
+
+constexpr const char *SOAP12_ENVELOPE = "http://www.w3.org/2003/05/soap-envelope";
+constexpr const char *SOAP12_ENCODING = "http://www.w3.org/2003/05/soap-encoding";
+
+int declare(soap *ctx, const char *prefix, const char *uri)
+{
+    const soap_prefix *record = soap_prefix_push_in(ctx, prefix, uri);
+    EXPECT_TRUE(record);
+    return record ? record->index : -2;
+}
+
+std::string uri_of(soap *ctx, const char *name)
+{
+    const char *uri = soap_namespace_of(ctx, name);
+    return uri ? uri : "(none)";
+}
+
+int state_of(const soap *ctx, const char *prefix)
+{
+    const soap_prefix *record = xml_prefix_find(ctx, prefix);
+    return record ? record->index : -2;
+}
+
+std::uint32_t depth(const soap *ctx)
+{
+    std::uint32_t records = 0;
+    for (const soap_prefix *record = ctx->prefix_list; record; record = record->next)
+        ++records;
+    return records;
+}
+
+} // namespace
+
+// ---------------------------------------------------------------------------------------------
+// The table.
+
+TEST(namespaces, the_copy_is_made_once_and_sets_the_version)
+{
+    static const soap_namespace soap12[] = {{"SOAP-ENV", SOAP12_ENVELOPE, nullptr, nullptr},
+                                            {nullptr, nullptr, nullptr, nullptr}};
+    static const soap_namespace empty[] = {{nullptr, nullptr, nullptr, nullptr}};
+    const auto ctx = std::make_unique<soap>();
+    ASSERT_EQ(soap_set_namespaces(ctx.get(), table()), 0);
+    EXPECT_EQ(ctx->soap_version, 1);
+    const soap_namespace *copy = ctx->local_namespaces;
+    EXPECT_NE(copy, table());
+    EXPECT_STREQ(copy[5].uri, "urn:b");
+    EXPECT_EQ(copy[6].prefix, nullptr);
+
+    ctx->soap_version = 0;
+    ASSERT_EQ(soap_namespace_table_copy(ctx.get()), 0);
+    EXPECT_EQ(ctx->local_namespaces, copy);
+    EXPECT_EQ(ctx->soap_version, 0);
+
+    ASSERT_EQ(soap_set_namespaces(ctx.get(), soap12), 0);
+    EXPECT_EQ(ctx->soap_version, 2);
+    EXPECT_EQ(ctx->namespaces, soap12);
+    ASSERT_EQ(soap_set_namespaces(ctx.get(), ctx->local_namespaces), 0);
+    EXPECT_EQ(ctx->namespaces, soap12);
+
+    ASSERT_EQ(soap_set_namespaces(ctx.get(), empty), 0);
+    EXPECT_EQ(ctx->soap_version, 2);
+    EXPECT_EQ(declare(ctx.get(), "p", "urn:p"), -1);
+    ASSERT_EQ(soap_set_namespaces(ctx.get(), nullptr), 0);
+    EXPECT_EQ(ctx->local_namespaces, nullptr);
+    EXPECT_EQ(declare(ctx.get(), "q", "urn:p"), -1);
+}
+
+TEST(namespaces, received_uris_go_along_to_another_copy)
+{
+    writer one;
+    writer other;
+    ASSERT_EQ(declare(one.ctx.get(), "e", SOAP12_ENVELOPE), 0);
+    ASSERT_EQ(soap_set_namespaces(other.ctx.get(), one.ctx->local_namespaces), 0);
+    soap_namespace_table_drop(one.ctx.get());
+    EXPECT_STREQ(other.ctx->local_namespaces[0].received, SOAP12_ENVELOPE);
+    other.ctx->namespaces = table();
+}
+
+TEST(namespaces, an_encoding_style_from_the_table_does_not_outlive_it)
+{
+    for (const bool received : {false, true}) {
+        writer w;
+        soap *ctx = w.ctx.get();
+        if (received) {
+            ASSERT_EQ(declare(ctx, "c", SOAP12_ENCODING), 1);
+        }
+        ctx->mode = MODE_COUNTING;
+        ctx->namespace_state = 1;
+        ctx->encoding_flag = 1;
+        ctx->encoding_style = "";
+        ASSERT_EQ(soap_element_out_begin(ctx, "e", 0, nullptr), 0);
+        EXPECT_STREQ(ctx->encoding_style, received ? SOAP12_ENCODING : table()[1].uri);
+        soap_namespace_table_drop(ctx);
+        EXPECT_STREQ(ctx->encoding_style, "");
+    }
+}
+
+// ---------------------------------------------------------------------------------------------
+// Reading.
+
+TEST(namespaces, a_declaration_is_bound_by_uri_pattern_or_what_was_received)
+{
+    static const struct {
+        const char *rule;
+        const char *uri;
+        int row;
+        const char *received; // by row 0 afterwards
+    } steps[] = {
+        {"own", "http://schemas.xmlsoap.org/soap/envelope/", 0, nullptr},
+        {"pattern", SOAP12_ENVELOPE, 0, SOAP12_ENVELOPE},
+        {"received again", SOAP12_ENVELOPE, 0, SOAP12_ENVELOPE},
+        {"another of the pattern", "http://www.w3.org/1/soap-envelope", -1, SOAP12_ENVELOPE},
+        {"own drops what was received", "http://schemas.xmlsoap.org/soap/envelope/", 0, nullptr},
+        {"another is now free", "http://www.w3.org/1/soap-envelope", 0, "http://www.w3.org/1/soap-envelope"},
+        {"no pattern", "urn:a", 4, "http://www.w3.org/1/soap-envelope"},
+        {"longer than a row", "urn:ab", -1, "http://www.w3.org/1/soap-envelope"},
+        {"empty", "", -1, "http://www.w3.org/1/soap-envelope"},
+    };
+    writer w;
+    soap *ctx = w.ctx.get();
+    for (const auto &step : steps) {
+        SCOPED_TRACE(step.rule);
+        EXPECT_EQ(declare(ctx, "p", step.uri), step.row);
+        EXPECT_EQ(uri_of(ctx, "p:x"), step.uri);
+        const char *received = ctx->local_namespaces[0].received;
+        EXPECT_EQ(received ? std::string(received) : "", step.received ? step.received : "");
+    }
+}
+
+TEST(namespaces, a_uri_received_over_and_over_is_kept_once)
+{
+    writer w;
+    soap *ctx = w.ctx.get();
+    ASSERT_EQ(declare(ctx, "e", SOAP12_ENVELOPE), 0);
+    const char *kept = ctx->local_namespaces[0].received;
+    const std::size_t allocations = failing_malloc::allocations();
+    std::set<const soap_prefix *> records;
+    for (int i = 0; i < 1000; ++i) {
+        ctx->nesting_level = 1;
+        ASSERT_EQ(declare(ctx, "e", SOAP12_ENVELOPE), 0);
+        ASSERT_EQ(declare(ctx, "other", "urn:other"), -1);
+        records.insert(ctx->prefix_list);
+        soap_prefix_pop(ctx);
+    }
+    EXPECT_EQ(ctx->local_namespaces[0].received, kept);
+    EXPECT_LE(records.size(), 2U);
+    EXPECT_LE(failing_malloc::allocations() - allocations, 10U + 2 * records.size());
+}
+
+TEST(namespaces, inner_declarations_hide_outer_ones_until_their_element_ends)
+{
+    writer w;
+    soap *ctx = w.ctx.get();
+    ctx->nesting_level = 1;
+    declare(ctx, "p", "urn:a");
+    declare(ctx, "", "urn:outer");
+    ctx->nesting_level = 2;
+    declare(ctx, "p", "urn:b");
+    ctx->nesting_level = 3;
+    declare(ctx, "p", "urn:unknown");
+    declare(ctx, "", "urn:inner");
+    EXPECT_EQ(uri_of(ctx, "p:x"), "urn:unknown");
+    EXPECT_EQ(uri_of(ctx, "x"), "urn:inner");
+    ctx->nesting_level = 2;
+    soap_prefix_pop(ctx);
+    EXPECT_EQ(uri_of(ctx, "p:x"), "urn:a");
+    EXPECT_EQ(uri_of(ctx, "x"), "urn:outer");
+    soap_prefix_stack_reset(ctx);
+    EXPECT_EQ(ctx->prefix_list, nullptr);
+    EXPECT_EQ(ctx->error, 0);
+    EXPECT_EQ(uri_of(ctx, "x"), "(none)");
+    EXPECT_EQ(ctx->error, 0);
+    EXPECT_EQ(uri_of(ctx, "xml:lang"), "http://www.w3.org/XML/1998/namespace");
+    EXPECT_EQ(uri_of(ctx, "p:x"), "(none)");
+    EXPECT_EQ(ctx->error, SOAP_NAMESPACE_ERROR);
+}
+
+TEST(namespaces, many_prefixes_in_scope_are_found_fast_and_bounded)
+{
+    writer w;
+    soap *ctx = w.ctx.get();
+    for (std::uint32_t i = 0; i < SOAP_PREFIXES_MAX; ++i)
+        ASSERT_EQ(declare(ctx, ("p" + std::to_string(i)).c_str(), ("urn:" + std::to_string(i)).c_str()), -1);
+    EXPECT_EQ(soap_prefix_push_in(ctx, "more", "urn:more"), nullptr);
+    EXPECT_EQ(ctx->error, SOAP_LENGTH);
+    const auto begin = std::chrono::steady_clock::now();
+    for (int i = 0; i < 100000; ++i)
+        ASSERT_TRUE(xml_prefix_find(ctx, "p0"));
+    // A walk over all of them would take a hundred times as long.
+    EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::seconds(2));
+    EXPECT_EQ(uri_of(ctx, "p777:x"), "urn:777");
+    soap_prefix_pop(ctx);
+    EXPECT_EQ(xml_prefix_find(ctx, "p777"), nullptr);
+}
+
+TEST(namespaces, texts_of_any_length_are_kept)
+{
+    writer w;
+    soap *ctx = w.ctx.get();
+    for (const std::size_t length : {1U, 100U, 60000U, 126U, 127U, 128U, 1U, 60000U}) {
+        ctx->nesting_level = 1;
+        const std::string prefix(length, 'p');
+        const std::string uri(3 * length, 'u');
+        ASSERT_EQ(declare(ctx, prefix.c_str(), uri.c_str()), -1);
+        EXPECT_EQ(uri_of(ctx, (prefix + ":x").c_str()), uri);
+        soap_prefix_pop(ctx);
+    }
+    EXPECT_EQ(soap_prefix_push_in(ctx, std::string(70000, 'p').c_str(), ""), nullptr);
+    EXPECT_EQ(ctx->error, SOAP_LENGTH);
+}
+
+TEST(namespaces, every_refused_allocation_is_error_20)
+{
+    std::size_t failures = 0;
+    bool was_refused = true;
+    for (std::size_t nth = 1; was_refused; ++nth) {
+        const auto ctx = std::make_unique<soap>();
+        bool made = false;
+        int result = 0;
+        {
+            const failing_malloc::scope armed(nth);
+            result = soap_set_namespaces(ctx.get(), table());
+            if (result == 0)
+                made = soap_prefix_push_in(ctx.get(), "e", SOAP12_ENVELOPE) != nullptr;
+            was_refused = armed.refused() > 0;
+        }
+        if (made)
+            continue;
+        ++failures;
+        EXPECT_EQ(ctx->error, SOAP_OUT_OF_MEMORY);
+        ASSERT_EQ(soap_set_namespaces(ctx.get(), table()), 0);
+        EXPECT_EQ(declare(ctx.get(), "e", SOAP12_ENVELOPE), 0);
+    }
+    EXPECT_GE(failures, 5U); // scope, description of the rows, copy, received URI, prefix
+}
+
+// ---------------------------------------------------------------------------------------------
+// Writing.
+
+TEST(namespaces, a_known_pair_is_not_pushed_again)
+{
+    writer w(MODE_CANONICAL);
+    soap *ctx = w.ctx.get();
+    ctx->mode = MODE_CANONICAL;
+    ctx->nesting_level = 1;
+    EXPECT_EQ(soap_prefix_push_out(ctx, "p", "urn:p", 0), 0);
+    ctx->nesting_level = 2;
+    EXPECT_EQ(soap_prefix_push_out(ctx, "p", "urn:p", 0), 0);
+    EXPECT_EQ(depth(ctx), 1U);
+    EXPECT_EQ(soap_prefix_use(ctx, "p:x"), 0);
+    EXPECT_EQ(state_of(ctx, "p"), 1);
+    EXPECT_EQ(soap_prefix_use(ctx, "p:x"), 0);
+    EXPECT_EQ(soap_prefix_push_out(ctx, "p", "urn:p", 0), 0);
+    EXPECT_EQ(depth(ctx), 2U);
+    EXPECT_EQ(soap_prefix_push_out(ctx, "p", "urn:new", 0), 0); // another meaning is declared here
+    EXPECT_EQ(state_of(ctx, "p"), 1);
+    EXPECT_EQ(depth(ctx), 3U);
+    soap_prefix_pop(ctx);
+    EXPECT_EQ(depth(ctx), 1U);
+    EXPECT_EQ(state_of(ctx, "p"), 0);
+}
+
+TEST(namespaces, a_prefix_used_ahead_of_its_meaning_is_declared_with_it)
+{
+    writer w;
+    soap *ctx = w.ctx.get();
+    ctx->mode = MODE_CANONICAL;
+    EXPECT_EQ(soap_prefix_use(ctx, "q:x"), 0);
+    EXPECT_EQ(soap_prefix_use(ctx, "xml:lang"), 0);
+    EXPECT_EQ(depth(ctx), 1U);
+    EXPECT_EQ(xml_prefixes_waiting(ctx), 0U);
+    EXPECT_EQ(soap_prefix_push_out(ctx, "q", "urn:q", 0), 0);
+    EXPECT_EQ(state_of(ctx, "q"), 1);
+    EXPECT_EQ(xml_prefixes_waiting(ctx), 1U);
+    soap_prefix_stack_reset(ctx);
+    EXPECT_EQ(xml_prefixes_waiting(ctx), 0U);
+}
+
+TEST(namespaces, a_list_names_whole_prefixes)
+{
+    EXPECT_TRUE(xml_list_names("a bc d", "bc"));
+    EXPECT_TRUE(xml_list_names(" a\tbc: ", "bc"));
+    EXPECT_FALSE(xml_list_names("abc bcd b", "bc"));
+    EXPECT_FALSE(xml_list_names("", "bc"));
+    EXPECT_FALSE(xml_list_names("  ", ""));
+}

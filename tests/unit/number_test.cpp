@@ -1,0 +1,209 @@
+// number_test.cpp - numbers: what the parsers accept and refuse, texts of values, independence of the locale.
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_primitive.h>
+
+#include <clocale>
+#include <cmath>
+#include <cstdio>
+#include <cstring>
+#include <limits>
+#include <memory>
+#include <random>
+#include <string>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+#include "support/python_batch.h"
+
+namespace {
+
+class Numbers : public testing::Test {
+protected:
+    std::unique_ptr<soap> ctx = std::make_unique<soap>();
+
+    // Result of a parser and the value that it left, as text: "4 -128".
+    template <class Value>
+    std::string parsed(int (*parse)(soap *, const char *, Value *), const char *text, std::uint32_t mode = 0)
+    {
+        Value value = 77;
+        ctx->error = 0;
+        ctx->mode = mode;
+        const int result = parse(ctx.get(), text, &value);
+        EXPECT_EQ(ctx->error, result);
+        return std::to_string(result) + " " + std::to_string(value);
+    }
+};
+
+TEST_F(Numbers, SignedTypesTakeTheWholeTextWithinTheirRange)
+{
+    EXPECT_EQ(parsed(soap_byte_parse, "-128"), "0 -128");
+    EXPECT_EQ(parsed(soap_byte_parse, "128"), "4 -128");
+    EXPECT_EQ(parsed(soap_byte_parse, ""), "4 0");
+    EXPECT_EQ(parsed(soap_short_parse, "32767"), "0 32767");
+    EXPECT_EQ(parsed(soap_short_parse, "-32769"), "4 32767");
+    EXPECT_EQ(parsed(soap_int_parse, " +2147483647"), "0 2147483647");
+    EXPECT_EQ(parsed(soap_int_parse, "-2147483648"), "0 -2147483648");
+    EXPECT_EQ(parsed(soap_int_parse, "2147483648"), "4 -2147483648");
+    EXPECT_EQ(parsed(soap_int_parse, "12 "), "4 12");
+    EXPECT_EQ(parsed(soap_int_parse, "0x10"), "4 0");
+    EXPECT_EQ(parsed(soap_int_parse, "- 1"), "4 0");
+    EXPECT_EQ(parsed(soap_int_parse, nullptr), "0 77");
+    EXPECT_EQ(parsed(soap_long_parse, "-9223372036854775808"), "0 -9223372036854775808");
+    EXPECT_EQ(parsed(soap_long_parse, "9223372036854775808"), "4 9223372036854775807");
+    EXPECT_EQ(parsed(soap_long_parse, std::string(5000, '9').c_str()), "4 9223372036854775807");
+    EXPECT_EQ(parsed(soap_long64_parse, "12abc"), "0 12");
+    EXPECT_EQ(parsed(soap_long64_parse, "-99999999999999999999"), "0 -9223372036854775808");
+    EXPECT_EQ(parsed(soap_long64_parse, "abc"), "4 77");
+}
+
+TEST_F(Numbers, UnsignedTypesWrapOrRefuseNegativeNumbers)
+{
+    EXPECT_EQ(parsed(soap_ubyte_parse, "255"), "0 255");
+    EXPECT_EQ(parsed(soap_ubyte_parse, "256"), "4 0");
+    EXPECT_EQ(parsed(soap_ubyte_parse, "-1"), "4 255");
+    EXPECT_EQ(parsed(soap_ushort_parse, "65536"), "4 0");
+    EXPECT_EQ(parsed(soap_ushort_parse, ""), "4 0");
+    EXPECT_EQ(parsed(soap_uint_parse, "4294967295"), "0 4294967295");
+    EXPECT_EQ(parsed(soap_uint_parse, "4294967296"), "4 0");
+    EXPECT_EQ(parsed(soap_uint_parse, "-1"), "0 4294967295");
+    EXPECT_EQ(parsed(soap_uint_parse, ""), "0 0");
+    EXPECT_EQ(parsed(soap_uint_parse, "", MODE_STRICT), "4 0");
+    EXPECT_EQ(parsed(soap_uint_parse, "7x"), "4 7");
+    EXPECT_EQ(parsed(soap_ulong_parse, "18446744073709551615"), "0 18446744073709551615");
+    EXPECT_EQ(parsed(soap_ulong_parse, "18446744073709551616"), "4 18446744073709551615");
+    EXPECT_EQ(parsed(soap_ulong_parse, "-18446744073709551616"), "4 18446744073709551615");
+    EXPECT_EQ(parsed(soap_ulong_parse, "-2"), "0 18446744073709551614");
+    EXPECT_EQ(parsed(soap_ulong64_parse, "5 6"), "0 5");
+    EXPECT_EQ(parsed(soap_ulong64_parse, ""), "4 77");
+}
+
+TEST_F(Numbers, AFailedLookUpStandsForAMissingAttribute)
+{
+    std::int32_t value = 3;
+    ctx->error = SOAP_REQUIRED;
+    EXPECT_EQ(soap_int_parse(ctx.get(), nullptr, &value), SOAP_REQUIRED);
+    EXPECT_EQ(value, 3);
+    EXPECT_EQ(soap_int_parse(ctx.get(), "4", &value), 0) << "an old error is not the parser's";
+}
+
+TEST_F(Numbers, SpecialFloatingValuesHaveTheirNamesInAnyCase)
+{
+    const auto value_of = [this](const char *text) {
+        double value = 77;
+        ctx->error = 0;
+        EXPECT_EQ(soap_double_parse(ctx.get(), text, &value), 0) << text;
+        return value;
+    };
+    const double infinity = std::numeric_limits<double>::infinity();
+    EXPECT_EQ(value_of("INF"), infinity);
+    EXPECT_EQ(value_of("+inf"), infinity);
+    EXPECT_EQ(value_of("-Inf"), -infinity);
+    EXPECT_EQ(value_of("xINF"), -infinity) << "a dash of the pattern stands for any character";
+    EXPECT_TRUE(std::isnan(value_of("nan")));
+    double bits = value_of("NaN");
+    const std::string ones(sizeof bits, '\xff');
+    EXPECT_EQ(std::memcmp(&bits, ones.data(), sizeof bits), 0);
+    float small = 0;
+    EXPECT_EQ(soap_float_parse(ctx.get(), "NaN", &small), 0);
+    EXPECT_EQ(std::memcmp(&small, ones.data(), sizeof small), 0);
+    EXPECT_EQ(soap_float_parse(ctx.get(), "1e39", &small), 0);
+    EXPECT_EQ(small, std::numeric_limits<float>::infinity());
+    EXPECT_STREQ(soap_double_text(ctx.get(), infinity), "INF");
+    EXPECT_STREQ(soap_float_text(ctx.get(), -std::numeric_limits<float>::infinity()), "-INF");
+    EXPECT_STREQ(soap_double_text(ctx.get(), bits), "NaN");
+}
+
+TEST_F(Numbers, FloatingTextIsWhatTheCLibraryTakes)
+{
+    struct float_case {
+        const char *text;
+        int error;
+        double value;
+    };
+    const float_case cases[] = {
+        {"1.5", 0, 1.5},
+        {" \t-2e3", 0, -2000},
+        {"+.5", 0, 0.5},
+        {"0x1p4", 0, 16},
+        {"12abc", 0, 12},
+        {"1.5.6", 0, 1.5},
+        {"1e400", 0, HUGE_VAL},
+        {"1e-400", 0, 0},
+        {"infinity", 0, HUGE_VAL},
+        {"-0", 0, -0.0},
+        {"", 4, 0},
+        {"abc", 4, 0},
+        {"0x", 4, 0},
+        {".", 4, 0},
+        {"-", 4, 0},
+        {"1,5", 0, 1},
+    };
+    for (const float_case &row : cases) {
+        double value = 77;
+        ctx->error = 0;
+        EXPECT_EQ(soap_double_parse(ctx.get(), row.text, &value), row.error) << row.text;
+        if (row.error == 0) {
+            EXPECT_EQ(value, row.value) << row.text;
+        }
+    }
+}
+
+TEST_F(Numbers, TheHostsLocaleDoesNotReachTheWire)
+{
+    const std::string before = std::setlocale(LC_ALL, nullptr);
+    const bool foreign = std::setlocale(LC_ALL, "de_DE.UTF-8") != nullptr;
+    double plain = 0, by_library = 0;
+    EXPECT_EQ(soap_double_parse(ctx.get(), "1.5", &plain), 0);
+    EXPECT_EQ(soap_double_parse(ctx.get(), "+1.5 ", &by_library), 0);
+    const std::string text = soap_double_text(ctx.get(), 1.5);
+    std::setlocale(LC_ALL, before.c_str());
+    EXPECT_EQ(plain, 1.5);
+    EXPECT_EQ(by_library, 1.5);
+    EXPECT_EQ(text, "1.5");
+    // Without that locale on the machine, a format with a comma stands for its printf.
+    ctx->double_format = "1,%.0f";
+    EXPECT_STREQ(soap_double_text(ctx.get(), 5), "1.5") << (foreign ? "" : "no German locale here");
+}
+
+TEST_F(Numbers, TextsGoThroughTheContextsFormats)
+{
+    EXPECT_STREQ(soap_long_text(ctx.get(), INT64_MIN), "-9223372036854775808");
+    EXPECT_STREQ(soap_ulong_text(ctx.get(), UINT64_MAX), "18446744073709551615");
+    EXPECT_STREQ(soap_float_text(ctx.get(), 0.1F), "0.100000001");
+    EXPECT_STREQ(soap_double_text(ctx.get(), 1e300), "1.0000000000000001E+300");
+    ctx->float_format = "%.3f";
+    EXPECT_STREQ(soap_float_text(ctx.get(), 2), "2.000");
+}
+
+// Python prints and reads the nearest value, as the engine must.
+TEST_F(Numbers, RandomValuesAgreeWithPython)
+{
+    std::mt19937_64 random(1);
+    std::vector<double> values;
+    std::vector<std::string> texts;
+    while (values.size() < 3000) {
+        const std::uint64_t bits = random();
+        double value = 0;
+        std::memcpy(&value, &bits, sizeof value);
+        if (!std::isfinite(value))
+            continue;
+        values.push_back(value);
+        texts.push_back(soap_double_text(ctx.get(), value));
+    }
+    const std::vector<std::string> answers = python_batch(
+        "import struct\nfor t in lines: print(struct.pack('>d', float(t)).hex(), repr(float(t)))\n", texts);
+    ASSERT_EQ(answers.size(), values.size());
+    for (std::size_t i = 0; i < values.size(); i++) {
+        std::uint64_t bits = 0;
+        std::memcpy(&bits, &values[i], sizeof bits);
+        char hex[17];
+        std::snprintf(hex, sizeof hex, "%016lx", bits);
+        ASSERT_EQ(answers[i].substr(0, 16), hex) << texts[i];
+        double back = 0;
+        ASSERT_EQ(soap_double_parse(ctx.get(), answers[i].c_str() + 17, &back), 0);
+        ASSERT_EQ(back, values[i]) << answers[i];
+    }
+}
+
+} // namespace

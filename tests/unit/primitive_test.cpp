@@ -1,0 +1,323 @@
+// primitive_test.cpp - simple elements, type checks, QNames, tables of names, numbers of arrays.
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_identity.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_primitive.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include <string>
+
+#include <gtest/gtest.h>
+
+#include "support/memory_wire.h"
+
+namespace {
+
+const soap_namespace TABLE[] = {
+    {"SOAP-ENV", "http://schemas.xmlsoap.org/soap/envelope/", "http://www.w3.org/*/soap-envelope", nullptr},
+    {"SOAP-ENC", "http://schemas.xmlsoap.org/soap/encoding/", "http://www.w3.org/*/soap-encoding", nullptr},
+    {"xsi", "http://www.w3.org/2001/XMLSchema-instance", nullptr, nullptr},
+    {"xsd", "http://www.w3.org/2001/XMLSchema", nullptr, nullptr},
+    {"a", "urn:a", "urn:a-*", nullptr},
+    {"b_", "urn:b", nullptr, nullptr},
+    {nullptr, nullptr, nullptr, nullptr}};
+
+const std::string DECLARED = " xmlns:xsi=\"http://www.w3.org/2001/XMLSchema-instance\""
+                             " xmlns:s=\"http://www.w3.org/2001/XMLSchema\"";
+
+class Elements : public testing::Test {
+protected:
+    memory_wire ctx;
+
+    void SetUp() override { soap_set_namespaces(&ctx, TABLE); }
+
+    void receive(const std::string &xml)
+    {
+        soap_reset_call(&ctx);
+        soap_set_namespaces(&ctx, TABLE);
+        ctx.soap_version = 1;
+        ctx.buffer_index = ctx.buffer_length = 0;
+        ctx.peeked = 0;
+        ctx.receive("<root" + DECLARED + ">" + xml + "<last/></root>");
+        EXPECT_EQ(soap_element_in_begin(&ctx, "root", 0, nullptr), 0);
+    }
+    bool at_last() { return soap_element_in_begin(&ctx, "last", 0, nullptr) == 0; }
+};
+
+// Each reader with the types that it takes besides its own, and one that it must refuse.
+TEST_F(Elements, AcceptTheTypesThatFitTheirReader)
+{
+    struct type_case {
+        const char *own;
+        const char *also; // blank-separated local names
+        const char *refused;
+        bool (*read)(soap *, const char *own);
+    };
+    const type_case cases[] = {
+        {"xsd:byte", "byte", "short",
+         [](soap *c, const char *t) { return soap_byte_in(c, "v", nullptr, t, 3) != nullptr; }},
+        {"xsd:short", "short byte", "int",
+         [](soap *c, const char *t) { return soap_short_in(c, "v", nullptr, t, 3) != nullptr; }},
+        {"xsd:int", "int", "long",
+         [](soap *c, const char *t) { return soap_int_in(c, "v", nullptr, t, 1) != nullptr; }},
+        {"xsd:long", "long int short byte", "integer",
+         [](soap *c, const char *t) { return soap_long_in(c, "v", nullptr, t, 3) != nullptr; }},
+        {"xsd:long",
+         "integer positiveInteger negativeInteger nonPositiveInteger nonNegativeInteger long int short byte",
+         "unsignedLong",
+         [](soap *c, const char *t) { return soap_long64_in(c, "v", nullptr, t, 3) != nullptr; }},
+        {"xsd:unsignedByte", "unsignedByte", "unsignedShort",
+         [](soap *c, const char *t) { return soap_ubyte_in(c, "v", nullptr, t, 3) != nullptr; }},
+        {"xsd:unsignedShort", "unsignedShort unsignedByte", "unsignedInt",
+         [](soap *c, const char *t) { return soap_ushort_in(c, "v", nullptr, t, 3) != nullptr; }},
+        {"xsd:unsignedInt", "unsignedInt", "int",
+         [](soap *c, const char *t) { return soap_uint_in(c, "v", nullptr, t, 3) != nullptr; }},
+        {"xsd:unsignedLong", "unsignedLong unsignedInt unsignedShort unsignedByte", "positiveInteger",
+         [](soap *c, const char *t) { return soap_ulong_in(c, "v", nullptr, t, 3) != nullptr; }},
+        {"xsd:unsignedLong",
+         "positiveInteger nonNegativeInteger unsignedLong unsignedInt unsignedShort unsignedByte", "integer",
+         [](soap *c, const char *t) { return soap_ulong64_in(c, "v", nullptr, t, 3) != nullptr; }},
+        {"xsd:float",
+         "float double decimal integer positiveInteger negativeInteger nonPositiveInteger nonNegativeInteger "
+         "long int "
+         "short byte unsignedLong unsignedInt unsignedShort unsignedByte",
+         "string", [](soap *c, const char *t) { return soap_float_in(c, "v", nullptr, t, 3) != nullptr; }},
+        {"xsd:double", "float double decimal unsignedByte", "boolean",
+         [](soap *c, const char *t) { return soap_double_in(c, "v", nullptr, t, 3) != nullptr; }},
+    };
+    for (const type_case &row : cases) {
+        std::string also = row.also;
+        for (std::size_t at = 0; at != std::string::npos;) {
+            const std::size_t end = also.find(' ', at);
+            const std::string name = also.substr(at, end - at);
+            at = end == std::string::npos ? end : end + 1;
+            receive("<v xsi:type=\"s:" + name + "\">12</v>");
+            EXPECT_TRUE(row.read(&ctx, row.own) && at_last()) << row.own << " from " << name;
+        }
+        receive("<v xsi:type=\"s:" + std::string(row.refused) + "\">12</v>");
+        EXPECT_FALSE(row.read(&ctx, row.own)) << row.own << " from " << row.refused;
+        EXPECT_EQ(ctx.error, SOAP_TYPE_MISMATCH);
+        EXPECT_TRUE(row.read(&ctx, nullptr) && at_last())
+            << "the element was given back, and no type accepts any";
+    }
+    receive("<v xsi:type=\"s:dateTime\">2009-02-13T23:31:30Z</v>");
+    const std::time_t *seconds = soap_datetime_in(&ctx, "v", nullptr, "a:when", 15);
+    ASSERT_NE(seconds, nullptr);
+    EXPECT_EQ(*seconds, 1234567890);
+}
+
+TEST_F(Elements, ValuesComeWithTheirEndTagAndErrorsWithout)
+{
+    receive("<v> 12 <x>dropped</x></v>");
+    std::int32_t value = 0;
+    EXPECT_EQ(soap_int_in(&ctx, "v", &value, "xsd:int", 1), &value);
+    EXPECT_EQ(value, 12);
+    EXPECT_TRUE(at_last());
+    receive("<v>twelve</v>");
+    EXPECT_EQ(soap_int_in(&ctx, "v", &value, "xsd:int", 1), nullptr);
+    EXPECT_EQ(ctx.error, SOAP_TYPE_MISMATCH);
+    receive("<v/>");
+    EXPECT_EQ(soap_int_in(&ctx, "v", &value, "xsd:int", 1), nullptr) << "an empty element is no number";
+    receive("<w>1</w>");
+    EXPECT_EQ(soap_int_in(&ctx, "v", &value, "xsd:int", 1), nullptr);
+    EXPECT_EQ(ctx.error, SOAP_TAG_MISMATCH);
+    ctx.error = SOAP_TAG_MISMATCH; // as a member loop leaves it
+    EXPECT_EQ(soap_int_in(&ctx, "w", &value, "xsd:int", 1), &value);
+}
+
+TEST_F(Elements, ReferencesAreFilledAtTheEnd)
+{
+    receive("<n href=\"#n\"/><d href=\"#d\"></d><n id=\"n\">7</n><d id=\"d\">2.5</d><n href=\"#d\"/>");
+    std::int32_t number = 0, other = 0;
+    double value = 0;
+    EXPECT_EQ(soap_int_in(&ctx, "n", &number, "xsd:int", 1), &number);
+    EXPECT_EQ(soap_double_in(&ctx, "d", &value, "xsd:double", 14), &value);
+    EXPECT_NE(soap_int_in(&ctx, "n", nullptr, "xsd:int", 1), nullptr);
+    EXPECT_NE(soap_double_in(&ctx, "d", nullptr, "xsd:double", 14), nullptr);
+    EXPECT_EQ(soap_int_in(&ctx, "n", &other, "xsd:int", 1), nullptr);
+    EXPECT_EQ(ctx.error, SOAP_ID_CONFLICT);
+    EXPECT_EQ(soap_forward_resolve(&ctx), 0);
+    EXPECT_EQ(number, 7);
+    EXPECT_EQ(value, 2.5);
+}
+
+TEST_F(Elements, AreWrittenWithTypeAndText)
+{
+    ctx.namespace_state = 1;
+    const std::int8_t byte = -1;
+    const std::uint64_t large = UINT64_MAX;
+    const double real = 0.5;
+    const std::time_t when = 1234567890;
+    EXPECT_EQ(soap_byte_out(&ctx, "a:v", -1, &byte, "xsd:byte", 3), 0);
+    EXPECT_EQ(soap_ulong_out(&ctx, "a:v", -1, &large, "", 3), 0);
+    EXPECT_EQ(soap_double_out(&ctx, "a:v", 0, &real, nullptr, 3), 0);
+    EXPECT_EQ(soap_datetime_out(&ctx, "a:v", 0, &when, "", 15), 0);
+    EXPECT_EQ(ctx.sent(), "<a:v xsi:type=\"xsd:byte\">-1</a:v><a:v>18446744073709551615</a:v><a:v>0.5</a:v>"
+                          "<a:v>2009-02-13T23:31:30Z</a:v>");
+    ctx.send_limit = ctx.sends.size();
+    EXPECT_NE(soap_byte_out(&ctx, "a:v", -1, &byte, "", 3), 0);
+}
+
+TEST_F(Elements, ArrayTypesMayBeAnyType)
+{
+    receive("");
+    for (const char *type : {"", "s:int", "s:anyType", "s:ur-type"}) {
+        std::snprintf(ctx.array_type, sizeof ctx.array_type, "%s", type);
+        EXPECT_EQ(soap_array_type_check(&ctx, "xsd:int"), 0) << type;
+    }
+    std::snprintf(ctx.array_type, sizeof ctx.array_type, "s:string");
+    EXPECT_EQ(soap_array_type_check(&ctx, "xsd:int"), SOAP_TAG_MISMATCH);
+}
+
+// --- QNames ---
+
+TEST_F(Elements, QNamesAreMappedToTheTable)
+{
+    struct qname_case {
+        const char *rule;
+        const char *text;
+        const char *mapped;
+    };
+    const qname_case cases[] = {
+        {"the table's prefix", "p:x", "a:x"},
+        {"a row for other names of a namespace", "q:x", "\"urn:b\":x"},
+        {"not in the table", "u:x", "\"urn:u\":x"},
+        {"no prefix and no default namespace, last", "x", "\"\":x"},
+        {"unknown prefixes: a word that others follow stays", "n:x n:y", "n:x \"\":y"},
+        {"the predefined prefix", "xml:lang", "xml:lang"},
+        {"a list, whatever parts it", " p:x\t\n u:y  p:z ", "a:x \"urn:u\":y a:z"},
+        {"nothing", " ", ""},
+    };
+    for (const qname_case &row : cases) {
+        receive("<e xmlns:p=\"urn:a\" xmlns:q=\"urn:b\" xmlns:u=\"urn:u\"></e>");
+        ASSERT_EQ(soap_element_in_begin(&ctx, "e", 0, nullptr), 0);
+        char *mapped = nullptr;
+        EXPECT_EQ(soap_qname_read_map(&ctx, row.text, &mapped, -1, -1), 0);
+        EXPECT_STREQ(mapped, row.mapped) << row.rule;
+    }
+    receive("<e xmlns=\"urn:a\"></e>");
+    ASSERT_EQ(soap_element_in_begin(&ctx, "e", 0, nullptr), 0);
+    char *mapped = nullptr;
+    EXPECT_EQ(soap_qname_read_map(&ctx, "x", &mapped, 1, 1), 0);
+    EXPECT_STREQ(mapped, "a:x");
+    EXPECT_EQ(soap_qname_read_map(&ctx, "x", &mapped, 2, -1), SOAP_LENGTH);
+    EXPECT_EQ(soap_qname_read_map(&ctx, "xy", &mapped, -1, 1), SOAP_LENGTH);
+    ctx.error = 0;
+    EXPECT_EQ(soap_qname_read_map(&ctx, nullptr, &mapped, 2, -1), 0);
+    soap_reset_call(&ctx);
+    EXPECT_EQ(soap_qname_read_map(&ctx, "p:x y", &mapped, -1, -1), 0);
+    EXPECT_STREQ(mapped, "p:x y") << "without declarations nothing is mapped";
+}
+
+TEST_F(Elements, QNamesGoOutUnderThePrefixesOfTheTable)
+{
+    receive("");
+    soap_attr_table_reset(&ctx);
+    ctx.namespace_state = 1;
+    EXPECT_STREQ(soap_qname_write_map(&ctx, "a:x plain"), "a:x plain");
+    EXPECT_STREQ(soap_qname_write_map(&ctx, "\"urn:a\":x  \"urn:a-2\":y \"broken"), "a:x a:y \"broken");
+    ctx.next_id = 8;
+    EXPECT_STREQ(soap_qname_write_map(&ctx, "\"urn:u\":x a:y \"urn:w\":z"), "_9:x a:y _10:z");
+    EXPECT_EQ(soap_element_out_begin(&ctx, "a:e", 0, ""), 0);
+    EXPECT_EQ(ctx.sent(), "<a:e xmlns:_10=\"urn:w\" xmlns:_9=\"urn:u\">");
+    EXPECT_EQ(soap_qname_write_map(&ctx, nullptr), nullptr);
+}
+
+// --- tables ---
+
+TEST_F(Elements, TablesOfNamesAreSearchedExactly)
+{
+    const soap_code_row table[] = {{1, "one"}, {2, "two"}, {4, "four"}, {6, "both"}, {0, nullptr}};
+    EXPECT_EQ(soap_name_to_code(table, "two", -1), 2);
+    EXPECT_EQ(soap_name_to_code(table, "Two", -1), -1);
+    EXPECT_EQ(soap_name_to_code(table, nullptr, -1), -1);
+    EXPECT_STREQ(soap_code_to_name(table, 4), "four");
+    EXPECT_EQ(soap_code_to_name(table, 5), nullptr);
+    EXPECT_EQ(soap_name_to_row(table, "one"), &table[0]);
+    EXPECT_EQ(soap_names_to_flags(table, " one\tfour "), 5);
+    EXPECT_EQ(soap_names_to_flags(table, "one three"), 0);
+    EXPECT_EQ(soap_names_to_flags(table, ""), 0);
+    EXPECT_STREQ(soap_flags_to_names(&ctx, table, 5), "one four");
+    EXPECT_STREQ(soap_flags_to_names(&ctx, table, 6), "two four both");
+    EXPECT_STREQ(soap_flags_to_names(&ctx, table, 0), "");
+    const std::string lengthy(600, 'n');
+    const soap_code_row wide[] = {{1, lengthy.c_str()}, {2, lengthy.c_str()}, {0, nullptr}};
+    EXPECT_EQ(soap_flags_to_names(&ctx, wide, 3), (lengthy + " " + lengthy).substr(0, SOAP_TEXT_SIZE - 1));
+}
+
+// --- arrays ---
+
+TEST_F(Elements, ArraySizesMultiplyWithinTheirBound)
+{
+    struct size_case {
+        const char *text;
+        int dimensions;
+        int product;
+        int first, second; // 99 where no size was stored
+    };
+    const size_case cases[] = {
+        {"[5]", 1, 5, 5, 99},
+        {"[2,3]", 2, 6, 2, 3},
+        {"2 3", 2, 6, 2, 3},
+        {"[7]", 2, 7, 99, 7},
+        {"[2,3]", 1, 3, 3, 99},
+        {"[]", 1, 0, 0, 99},
+        {"", 1, -1, 99, 99},
+        {"[-1]", 1, -1, 99, 99},
+        {"[1000000]", 1, 1000000, 1000000, 99},
+        {"[1000001]", 1, -1, 99, 99},
+        {"[1001,1000]", 2, -1, 99, 1000},
+        {"[99999999999999999999]", 1, -1, 99, 99},
+    };
+    for (const size_case &row : cases) {
+        int sizes[2] = {99, 99};
+        EXPECT_EQ(soap_array_dims_parse(row.text, sizes, row.dimensions), row.product) << row.text;
+        EXPECT_EQ(sizes[0], row.first) << row.text;
+        EXPECT_EQ(sizes[1], row.second) << row.text;
+    }
+}
+
+TEST_F(Elements, OffsetsCountFromTheStartOfTheArray)
+{
+    struct offset_case {
+        const char *text, *offset_text;
+        int rest, offset;
+    };
+    const offset_case cases[] = {
+        {"[5]", "", 5, 0},         {"[5]", "[2]", 3, 2},
+        {"[2,3]", "[1,1]", 2, 4},  {"2 3", "", 6, 0},
+        {"[5]", nullptr, 5, 0},    {"[x]", "", -1, 99},
+        {"[5]", "[-1]", -1, 99},   {"[2,]", "", -1, 99},
+        {"[1000001]", "", -1, 99}, {"[5]", "[99999999999]", -1, 99},
+    };
+    for (const offset_case &row : cases) {
+        int offset = 99;
+        EXPECT_EQ(soap_array_dims_offset_parse(row.text, row.offset_text, &offset), row.rest) << row.text;
+        EXPECT_EQ(offset, row.offset) << row.text;
+    }
+    const int sizes[] = {4, 5, 6};
+    int offsets[3] = {};
+    EXPECT_EQ(soap_array_offset_parse("[1,2,3]", sizes, offsets, 3), (1 * 5 + 2) * 6 + 3);
+    EXPECT_EQ(offsets[2], 3);
+    EXPECT_EQ(soap_array_offset_parse("", sizes, nullptr, 3), 0);
+    EXPECT_EQ(soap_array_offset_parse("[-1]", sizes, nullptr, 1), -1);
+    const int huge[] = {1000000, 1000000, 1000000};
+    EXPECT_EQ(soap_array_offset_parse("[999999,999999,999999]", huge, nullptr, 3), -1);
+}
+
+TEST_F(Elements, PositionsAreReadUpToTheirLimit)
+{
+    int numbers[SOAP_POSITIONS_MAX] = {};
+    EXPECT_EQ(soap_position_parse("[3,-4]", numbers), 2);
+    EXPECT_EQ(numbers[1], -4);
+    EXPECT_EQ(soap_position_parse("3", numbers), 0);
+    EXPECT_EQ(soap_position_parse("[]", numbers), 0);
+    EXPECT_EQ(soap_position_parse("[99999999999]", numbers), 0);
+    std::string many = "[0";
+    for (int i = 1; i < 40; i++)
+        many += "," + std::to_string(i);
+    EXPECT_EQ(soap_position_parse(many.c_str(), numbers), 16);
+    EXPECT_EQ(numbers[15], 15);
+}
+
+} // namespace

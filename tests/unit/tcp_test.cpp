@@ -1,0 +1,681 @@
+// tcp_test.cpp - sockets of a context against peers on the loopback.
+#include <cerrno>
+#include <fcntl.h>
+#include <netinet/tcp.h>
+#include <sstream>
+#include <vector>
+
+#include <gtest/gtest.h>
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_http.h>
+#include <zuv_client_pro/soap_tcp.h>
+
+#include "support/loopback.h"
+#include "support/socket_calls.h"
+#include "transport/tcp_socket.h"
+
+namespace {
+
+using loopback::bound_socket;
+using loopback::context;
+using loopback::peer;
+using loopback::write_text;
+
+class tcp : public loopback::descriptor_test {
+protected:
+    void TearDown() override
+    {
+        socket_calls::fail_connect = socket_calls::fail_sendto = socket_calls::fail_recv = {};
+        descriptor_test::TearDown();
+    }
+};
+
+int open_to(context &ctx, int port, const char *host = "127.0.0.1")
+{
+    return tcp_connect(ctx.get(), "http://peer/", host, port);
+}
+
+std::string receive(context &ctx)
+{
+    char buffer[256];
+    return std::string(buffer, tcp_recv(ctx.get(), buffer, sizeof buffer));
+}
+
+void wait_for_end(int socket)
+{
+    char byte;
+    while (read(socket, &byte, 1) > 0) {
+    }
+}
+
+int option_of(int socket, int level, int name)
+{
+    int value = -1;
+    socklen_t size = sizeof value;
+    getsockopt(socket, level, name, &value, &size);
+    return value;
+}
+
+void expect_failure(context &ctx, int error, const char *text, const char *detail)
+{
+    EXPECT_EQ(ctx->error, error);
+    EXPECT_EQ(ctx->socket, -1);
+    EXPECT_EQ(ctx.fault_text(), text);
+    EXPECT_EQ(ctx.fault_detail(), detail);
+}
+
+// --- connecting ---
+
+TEST_F(tcp, options_are_set_on_a_connected_socket)
+{
+    const peer server(wait_for_end);
+    context ctx;
+    ctx->keep_alive = 1;
+    ctx->connect_flags = SO_LINGER;
+    ctx->linger_seconds = 7;
+    ctx->tcp_keep_idle = 11;
+    ctx->tcp_keep_interval = 12;
+    ctx->tcp_keep_count = 13;
+    const int socket = open_to(ctx, server.port());
+    ASSERT_GE(socket, 0);
+    EXPECT_EQ(ctx->socket, socket);
+    linger lingering{};
+    socklen_t size = sizeof lingering;
+    getsockopt(socket, SOL_SOCKET, SO_LINGER, &lingering, &size);
+    EXPECT_EQ(lingering.l_onoff, 1);
+    EXPECT_EQ(lingering.l_linger, 7);
+    EXPECT_EQ(option_of(socket, SOL_SOCKET, SO_KEEPALIVE), 1);
+    EXPECT_EQ(option_of(socket, SOL_SOCKET, SO_SNDBUF), 2 * 65536); // the system reports twice what was set
+    EXPECT_EQ(option_of(socket, SOL_SOCKET, SO_RCVBUF), 2 * 65536);
+    EXPECT_EQ(option_of(socket, IPPROTO_TCP, TCP_KEEPIDLE), 11);
+    EXPECT_EQ(option_of(socket, IPPROTO_TCP, TCP_KEEPINTVL), 12);
+    EXPECT_EQ(option_of(socket, IPPROTO_TCP, TCP_KEEPCNT), 13);
+    EXPECT_EQ(option_of(socket, IPPROTO_TCP, TCP_NODELAY), 1);
+    EXPECT_NE(fcntl(socket, F_GETFD) & FD_CLOEXEC, 0);
+}
+
+TEST_F(tcp, sockets_block_unless_a_transfer_has_a_limit)
+{
+    static const struct {
+        int connect, send, recv;
+        bool blocking;
+    } cases[] = {{0, 0, 0, true}, {5, 0, 0, true}, {0, 5, 0, false}, {0, 0, -5, false}, {5, 5, 5, false}};
+    for (const auto &c : cases) {
+        const peer server(wait_for_end);
+        context ctx;
+        ctx->connect_timeout = c.connect;
+        ctx->send_timeout = c.send;
+        ctx->recv_timeout = c.recv;
+        ASSERT_GE(open_to(ctx, server.port()), 0);
+        EXPECT_EQ((fcntl(ctx->socket, F_GETFL) & O_NONBLOCK) == 0, c.blocking)
+            << c.connect << c.send << c.recv;
+    }
+}
+
+TEST_F(tcp, a_failed_attempt_names_its_step_and_leaves_no_socket)
+{
+    const peer server(wait_for_end);
+    int closed_port;
+    {
+        const bound_socket gone;
+        closed_port = gone.port();
+    }
+    const char *const host = "127.0.0.1";
+    {
+        context ctx;
+        EXPECT_EQ(tcp_connect(ctx.get(), "http://x/", "a..b", 80), -1);
+        expect_failure(ctx, 28, gai_strerror(EAI_NONAME), "getaddrinfo failed in tcp_connect()");
+        EXPECT_EQ(tcp_connect(ctx.get(), "http://x/", host, 65536 + server.port()), -1);
+        expect_failure(ctx, 28, gai_strerror(EAI_SERVICE), "getaddrinfo failed in tcp_connect()");
+        for (const int limit : {0, 5}) {
+            ctx->connect_timeout = limit;
+            EXPECT_EQ(tcp_connect(ctx.get(), "http://x/", host, closed_port), -1);
+            EXPECT_EQ(ctx->errno_value, ECONNREFUSED);
+            expect_failure(ctx, 28, "Connection refused", "connect failed in tcp_connect()");
+        }
+    }
+    context ctx;
+    ctx->connect_flags = 9999;
+    EXPECT_EQ(open_to(ctx, server.port()), -1);
+    expect_failure(ctx, 28, "Protocol not available", "setsockopt failed in tcp_connect()");
+    ctx->connect_flags = 0;
+    ctx->tcp_keep_idle = 1000000;
+    EXPECT_EQ(open_to(ctx, server.port()), -1);
+    expect_failure(ctx, 28, "Invalid argument", "setsockopt TCP_KEEPIDLE failed in tcp_connect()");
+    ctx->tcp_keep_idle = 0;
+    EXPECT_GE(open_to(ctx, server.port()), 0) << "the context serves on after failures";
+}
+
+TEST_F(tcp, the_next_address_is_tried_after_a_refusal_without_a_limit)
+{
+    const peer server(wait_for_end);
+    context ctx;
+    EXPECT_GE(open_to(ctx, server.port(), "two.test"), 0);
+    ctx->connect_timeout = 5; // the first address's wait decides
+    EXPECT_EQ(open_to(ctx, server.port(), "two.test"), -1);
+    expect_failure(ctx, 28, "Connection refused", "connect failed in tcp_connect()");
+}
+
+TEST_F(tcp, an_address_in_use_is_tried_again_a_bounded_number_of_times)
+{
+    const peer server(wait_for_end);
+    context ctx;
+    socket_calls::fail_connect = {3, EADDRINUSE};
+    EXPECT_GE(open_to(ctx, server.port()), 0);
+    socket_calls::fail_connect = {1000000, EADDRINUSE};
+    socket_calls::counts = {};
+    EXPECT_EQ(open_to(ctx, server.port()), -1);
+    EXPECT_EQ(socket_calls::counts.connect, 16);
+    expect_failure(ctx, 28, "Address already in use", "connect failed in tcp_connect()");
+}
+
+// A listener whose queue of clients is full: further ones are neither taken nor refused.
+class full_listener {
+public:
+    full_listener()
+    {
+        sockaddr_in address{};
+        address.sin_family = AF_INET;
+        address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+        address.sin_port = htons(static_cast<std::uint16_t>(listener_.port()));
+        for (int i = 0; i < 4; ++i) {
+            clients_.push_back(::socket(AF_INET, SOCK_STREAM | SOCK_NONBLOCK, 0));
+            connect(clients_.back(), reinterpret_cast<sockaddr *>(&address), sizeof address);
+        }
+    }
+    ~full_listener()
+    {
+        for (const int client : clients_)
+            close(client);
+    }
+    int port() const { return listener_.port(); }
+
+private:
+    bound_socket listener_{SOCK_STREAM, 0};
+    std::vector<int> clients_;
+};
+
+TEST_F(tcp, a_connection_that_does_not_come_about_times_out)
+{
+    const full_listener silent;
+    context ctx;
+    ctx->connect_timeout = -50000;
+    EXPECT_EQ(open_to(ctx, silent.port()), -1);
+    expect_failure(ctx, 28, "Timeout", "connect failed in tcp_connect()");
+}
+
+TEST_F(tcp, a_new_connection_closes_the_old_one_through_the_hook)
+{
+    static int closed;
+    const peer server(wait_for_end, 2);
+    context ctx;
+    ctx->on_close_socket = [](soap *, int socket) {
+        ++closed;
+        return close(socket);
+    };
+    closed = 0;
+    ASSERT_GE(open_to(ctx, server.port()), 0);
+    EXPECT_EQ(closed, 0);
+    ASSERT_GE(open_to(ctx, server.port()), 0);
+    EXPECT_EQ(closed, 1);
+    EXPECT_EQ(tcp_disconnect(ctx.get()), 0);
+    EXPECT_EQ(closed, 2);
+    EXPECT_EQ(ctx->socket, -1);
+    EXPECT_EQ(tcp_disconnect(ctx.get()), 0);
+    EXPECT_EQ(closed, 2);
+}
+
+// --- waiting ---
+
+TEST_F(tcp, wait_reports_what_is_ready_and_refuses_large_descriptors)
+{
+    int ends[2];
+    ASSERT_EQ(socketpair(AF_UNIX, SOCK_STREAM, 0, ends), 0);
+    {
+        context ctx;
+        EXPECT_EQ(tcp_wait(ctx.get(), ends[0], WAIT_ALL, 0), WAIT_SEND);
+        EXPECT_EQ(tcp_wait(ctx.get(), ends[0], WAIT_RECV | WAIT_ERROR, -1000), 0);
+        EXPECT_EQ(ctx->errno_value, 0);
+        write_text(ends[1], "x");
+        EXPECT_EQ(tcp_wait(ctx.get(), ends[0], WAIT_ALL, 5), WAIT_SEND | WAIT_RECV);
+        EXPECT_EQ(tcp_wait(ctx.get(), ends[0], WAIT_RECV, 5), WAIT_RECV);
+        EXPECT_LT(tcp_wait(ctx.get(), -1, WAIT_ALL, 0), 0);
+        EXPECT_EQ(ctx->errno_value, EBADF);
+        EXPECT_EQ(ctx->error, 0);
+        for (const int large : {1024, 100000}) {
+            ctx->error = 0;
+            EXPECT_EQ(tcp_wait(ctx.get(), large, WAIT_ALL, 0), -1);
+            EXPECT_EQ(ctx->error, SOAP_FD_EXCEEDED);
+            EXPECT_EQ(ctx->errno_value, 0);
+        }
+    }
+    close(ends[0]);
+    close(ends[1]);
+}
+
+TEST_F(tcp, descriptors_that_select_cannot_serve_are_refused)
+{
+    const peer server(wait_for_end);
+    context ctx;
+    ctx->send_timeout = 1;
+    ctx->socket = 1024;
+    EXPECT_EQ(tcp_send(ctx.get(), "x", 1), SOAP_FD_EXCEEDED);
+    EXPECT_EQ(tcp_peek(ctx.get()), SOAP_TCP_ERROR);
+    EXPECT_EQ(ctx.fault_detail(), "select failed in soap_poll()");
+    ctx->socket = -1;
+
+    std::vector<int> low; // so many open that the next one is large
+    while (low.empty() || low.back() < 1023)
+        if (low.emplace_back(open("/dev/null", O_RDONLY)) < 0)
+            break;
+    if (low.back() == 1023) {
+        EXPECT_EQ(open_to(ctx, server.port()), -1);
+        EXPECT_EQ(ctx->error, SOAP_FD_EXCEEDED);
+        EXPECT_EQ(ctx->socket, -1);
+    }
+    for (const int descriptor : low)
+        close(descriptor);
+}
+
+// --- bytes ---
+
+TEST_F(tcp, a_call_on_a_kept_connection_costs_three_system_calls)
+{
+    const peer server([](int client) {
+        for (int i = 0; i < 2; ++i) {
+            loopback::read_bytes(client, 7);
+            write_text(client, "answer");
+        }
+        wait_for_end(client);
+    });
+    context ctx;
+    ASSERT_GE(open_to(ctx, server.port()), 0);
+    for (int i = 0; i < 2; ++i) {
+        socket_calls::counts = {};
+        EXPECT_EQ(tcp_peek(ctx.get()), 0);
+        EXPECT_EQ(tcp_send(ctx.get(), "request", 7), 0);
+        EXPECT_EQ(receive(ctx), "answer");
+        EXPECT_EQ(socket_calls::counts.send, 1);
+        EXPECT_EQ(socket_calls::counts.recv, 1);
+        EXPECT_EQ(socket_calls::counts.all(), 3);
+    }
+}
+
+TEST_F(tcp, a_large_message_arrives_whole_in_both_modes)
+{
+    const std::string message(3 << 20, 'm');
+    for (const int limit : {0, 5}) {
+        std::string arrived;
+        {
+            const peer server([&](int client) { arrived = loopback::read_bytes(client, message.size()); });
+            context ctx;
+            ctx->send_timeout = limit;
+            ASSERT_GE(open_to(ctx, server.port()), 0);
+            EXPECT_EQ(tcp_send(ctx.get(), message.data(), message.size()), 0);
+            EXPECT_EQ(receive(ctx), "");
+            EXPECT_EQ(ctx->errno_value, 0) << "the peer's end is no failure";
+        }
+        EXPECT_TRUE(arrived == message);
+    }
+}
+
+TEST_F(tcp, transfers_end_when_time_is_up)
+{
+    const bound_socket listener; // never accepts, so never reads or writes
+    context ctx;
+    ctx->send_timeout = -20000;
+    ctx->recv_timeout = -20000;
+    ASSERT_GE(open_to(ctx, listener.port()), 0);
+    EXPECT_EQ(receive(ctx), "");
+    EXPECT_EQ(ctx->errno_value, 0);
+    const std::string message(1 << 24, 'm');
+    EXPECT_EQ(tcp_send(ctx.get(), message.data(), message.size()), -1);
+    EXPECT_EQ(ctx->errno_value, 0);
+    EXPECT_STREQ(tcp_error_text(ctx.get()),
+                 "Operation interrupted or timed out (20000us receive delay) (20000us send delay)");
+}
+
+TEST_F(tcp, a_peer_that_is_gone_gives_an_error_and_no_signal)
+{
+    const peer server([](int client) {
+        const linger reset{1, 0};
+        loopback::read_bytes(client, 1);
+        setsockopt(client, SOL_SOCKET, SO_LINGER, &reset, sizeof reset);
+    });
+    context ctx;
+    ASSERT_GE(open_to(ctx, server.port()), 0);
+    EXPECT_EQ(tcp_send(ctx.get(), "x", 1), 0);
+    EXPECT_EQ(receive(ctx), "");
+    EXPECT_EQ(ctx->errno_value, ECONNRESET);
+    EXPECT_EQ(tcp_send(ctx.get(), "x", 1), -1);
+    EXPECT_EQ(ctx->errno_value, EPIPE);
+}
+
+TEST_F(tcp, a_receive_gives_up_after_so_many_false_alarms)
+{
+    const peer server([](int client) {
+        write_text(client, "x");
+        wait_for_end(client);
+    });
+    context ctx;
+    ASSERT_GE(open_to(ctx, server.port()), 0);
+    socket_calls::counts = {};
+    socket_calls::fail_recv = {1000000, EAGAIN};
+    EXPECT_EQ(receive(ctx), "");
+    EXPECT_EQ(socket_calls::counts.recv, 101);
+    socket_calls::fail_recv = {5, EINTR};
+    EXPECT_EQ(receive(ctx), "x");
+}
+
+TEST_F(tcp, streams_and_descriptors_take_the_place_of_a_socket)
+{
+    int ends[2];
+    ASSERT_EQ(pipe(ends), 0);
+    {
+        context ctx;
+        ctx->send_fd = ends[1];
+        ctx->recv_fd = ends[0];
+        EXPECT_EQ(tcp_send(ctx.get(), "through a pipe", 14), 0);
+        EXPECT_EQ(receive(ctx), "through a pipe");
+        ctx->send_fd = ctx->recv_fd = -1;
+        EXPECT_EQ(tcp_send(ctx.get(), "x", 1), -1);
+        EXPECT_EQ(ctx->errno_value, EBADF);
+        EXPECT_EQ(receive(ctx), "");
+        EXPECT_EQ(ctx->errno_value, EBADF);
+
+        std::ostringstream out;
+        std::istringstream in("from a stream");
+        ctx->output_stream = &out;
+        ctx->input_stream = &in;
+        EXPECT_EQ(tcp_send(ctx.get(), "to a stream", 11), 0);
+        EXPECT_EQ(out.str(), "to a stream");
+        EXPECT_EQ(receive(ctx), "from a stream");
+        EXPECT_EQ(receive(ctx), "");
+    }
+    close(ends[0]);
+    close(ends[1]);
+}
+
+TEST_F(tcp, a_stream_that_fails_is_an_error_even_if_it_throws)
+{
+    class refusing : public std::streambuf {
+    } nowhere;
+    for (const bool throws : {false, true}) {
+        std::ostream out(&nowhere);
+        if (throws)
+            out.exceptions(std::ios::badbit | std::ios::failbit);
+        context ctx;
+        ctx->errno_value = 5;
+        ctx->output_stream = &out;
+        EXPECT_EQ(tcp_send(ctx.get(), "x", 1), -1);
+        EXPECT_EQ(ctx->errno_value, 0);
+    }
+}
+
+// --- datagrams ---
+
+TEST_F(tcp, datagrams_go_to_the_address_and_come_from_the_peer)
+{
+    const bound_socket service(SOCK_DGRAM);
+    context ctx(MODE_UDP);
+    ctx->ipv4_multicast_ttl = 3;
+    const unsigned char loopback_interface[] = {127, 0, 0, 1};
+    ctx->ipv4_multicast_interface = reinterpret_cast<const char *>(loopback_interface);
+    const int socket = tcp_connect(ctx.get(), "soap.udp://x/", "127.0.0.1", service.port());
+    ASSERT_GE(socket, 0);
+    EXPECT_EQ(option_of(socket, IPPROTO_IP, IP_MULTICAST_TTL), 3);
+    EXPECT_EQ(ctx->peer_length, sizeof(sockaddr_in));
+    EXPECT_EQ(tcp_send(ctx.get(), "ping", 4), 0);
+    sockaddr_in from{};
+    socklen_t size = sizeof from;
+    char buffer[16];
+    EXPECT_EQ(
+        recvfrom(service.socket(), buffer, sizeof buffer, 0, reinterpret_cast<sockaddr *>(&from), &size), 4);
+    sendto(service.socket(), "pong", 4, 0, reinterpret_cast<sockaddr *>(&from), size);
+    EXPECT_EQ(receive(ctx), "pong");
+    EXPECT_EQ(reinterpret_cast<sockaddr_in *>(ctx->peer)->sin_port,
+              htons(static_cast<std::uint16_t>(service.port())));
+    EXPECT_EQ(tcp_disconnect(ctx.get()), 0);
+    EXPECT_EQ(ctx->socket, socket) << "a datagram socket outlives the exchange";
+}
+
+TEST_F(tcp, a_refused_datagram_is_sent_once_or_twice_more)
+{
+    static const struct {
+        int flags, failures, result, sends;
+    } cases[] = {{0, 1, 0, 2}, {0, 9, -1, 2}, {SO_BROADCAST, 2, 0, 3}, {SO_BROADCAST, 9, -1, 3}};
+    const bound_socket service(SOCK_DGRAM);
+    for (const auto &c : cases) {
+        context ctx(MODE_UDP);
+        ctx->connect_flags = c.flags;
+        ASSERT_GE(tcp_connect(ctx.get(), "soap.udp://x/", "127.0.0.1", service.port()), 0);
+        socket_calls::counts = {};
+        socket_calls::fail_sendto = {c.failures, ENOBUFS};
+        EXPECT_EQ(tcp_send(ctx.get(), "ping", 4), c.result) << c.flags << ' ' << c.failures;
+        EXPECT_EQ(socket_calls::counts.sendto, c.sends) << c.flags << ' ' << c.failures;
+        EXPECT_EQ(ctx->errno_value, c.result == 0 ? 0 : ENOBUFS);
+    }
+}
+
+// --- the end ---
+
+TEST_F(tcp, a_kept_connection_serves_only_while_it_is_quiet)
+{
+    context lone;
+    EXPECT_EQ(tcp_peek(lone.get()), 0);
+    ASSERT_GE(soap_bind(lone.get(), "127.0.0.1", 0, 1), 0);
+    EXPECT_EQ(tcp_peek(lone.get()), -1);
+    for (const bool ends : {true, false}) {
+        const peer server([ends](int client) {
+            loopback::read_bytes(client, 1);
+            if (!ends)
+                write_text(client, "nobody asked");
+            shutdown(client, SHUT_WR);
+            wait_for_end(client);
+        });
+        context ctx;
+        ASSERT_GE(open_to(ctx, server.port()), 0);
+        EXPECT_EQ(tcp_peek(ctx.get()), 0);
+        EXPECT_EQ(tcp_send(ctx.get(), "x", 1), 0);
+        ASSERT_EQ(tcp_wait(ctx.get(), ctx->socket, WAIT_RECV, 10), WAIT_RECV);
+        EXPECT_EQ(tcp_peek(ctx.get()), -1);
+        EXPECT_EQ(ctx->error, 0);
+    }
+}
+
+TEST_F(tcp, release_keeps_or_closes_by_the_keep_alive_rule)
+{
+    static const struct {
+        int error;
+        std::int16_t keep_alive;
+        bool unfinished, kept;
+    } cases[] = {{0, 1, false, true},   {0, -1, false, true},  {0, 0, false, false},  {0, 1, true, false},
+                 {-1, 1, false, false}, {28, 1, false, false}, {30, 1, false, false}, {12, 1, false, true},
+                 {3, 1, false, true},   {3, 1, true, false}};
+    for (const auto &c : cases) {
+        const peer server(wait_for_end);
+        context ctx;
+        ASSERT_GE(open_to(ctx, server.port()), 0);
+        ctx->error = c.error;
+        ctx->keep_alive = c.keep_alive;
+        ctx->response_unfinished = c.unfinished;
+        EXPECT_EQ(soap_socket_release(ctx.get()), c.error);
+        EXPECT_EQ(ctx->error, c.error);
+        EXPECT_EQ(ctx->socket != -1, c.kept) << c.error << ' ' << c.keep_alive << ' ' << c.unfinished;
+        EXPECT_EQ(ctx->keep_alive, c.kept ? c.keep_alive : 0);
+        EXPECT_FALSE(ctx->response_unfinished);
+    }
+}
+
+TEST_F(tcp, hooks_may_refuse_the_release)
+{
+    const peer server(wait_for_end);
+    context ctx;
+    ASSERT_GE(open_to(ctx, server.port()), 0);
+    ctx->on_disconnect = [](soap *) { return 77; };
+    EXPECT_EQ(soap_socket_release(ctx.get()), 77);
+    EXPECT_NE(ctx->socket, -1);
+    ctx->on_disconnect = nullptr;
+    ctx->error = 0;
+    ctx->on_close = [](soap *c) { return tcp_disconnect(c) == 0 ? 78 : 0; };
+    EXPECT_EQ(soap_socket_release(ctx.get()), 78);
+    EXPECT_EQ(ctx->error, 78);
+    ctx->on_close = tcp_disconnect;
+}
+
+TEST_F(tcp, an_abandoned_socket_is_neither_used_nor_closed_again)
+{
+    // One server for each connection: a thread that waits in accept has a number reserved already.
+    const peer server(wait_for_end), next_server(wait_for_end);
+    {
+        context ctx;
+        EXPECT_EQ(soap_force_close(ctx.get()), 0);
+        const int number = open_to(ctx, server.port());
+        ASSERT_GE(number, 0);
+        int ends[2];
+        ASSERT_EQ(socketpair(AF_UNIX, SOCK_STREAM, 0, ends), 0);
+        ctx->keep_alive = 1;
+        EXPECT_EQ(soap_force_close(ctx.get()), 0);
+        EXPECT_EQ(ctx->socket, number);
+        EXPECT_EQ(ctx->keep_alive, 0);
+        EXPECT_FALSE(soap_socket_open(ctx.get()));
+        ASSERT_EQ(dup2(ends[0], number), number) << "the number now belongs to somebody else";
+        EXPECT_EQ(soap_force_close(ctx.get()), 0);
+        EXPECT_EQ(tcp_send(ctx.get(), "x", 1), -1);
+        EXPECT_EQ(ctx->errno_value, EBADF);
+        write_text(ends[1], "y");
+        EXPECT_EQ(receive(ctx), "");
+        EXPECT_EQ(tcp_peek(ctx.get()), 0);
+        EXPECT_EQ(soap_socket_release(ctx.get()), 0);
+        EXPECT_EQ(ctx->socket, -1);
+        EXPECT_GE(open_to(ctx, next_server.port()), 0);
+        EXPECT_TRUE(soap_socket_open(ctx.get()));
+        EXPECT_EQ(loopback::read_bytes(number, 1), "y");
+        for (const int descriptor : {number, ends[0], ends[1]})
+            EXPECT_EQ(close(descriptor), 0);
+    }
+}
+
+TEST_F(tcp, socket_errors_have_texts_by_their_mode)
+{
+    static const struct {
+        int mode, value, recv, send;
+        const char *text;
+    } cases[] = {
+        {1, 0, 0, 0, "WSAStartup failed"},
+        {2, 1, 0, 0, "Host not found"},
+        {2, 2, 0, 0, "Try Again"},
+        {2, 3, 0, 0, "No Recovery"},
+        {2, 4, 0, 0, "No Data"},
+        {2, 5, 0, 0, "TCP/UDP IP error 5"},
+        {2, 0, 0, 0, "TCP/UDP IP error 0"},
+        {0, ECONNREFUSED, 9, 9, "Connection refused"},
+        {0, 0, 0, 0, "Operation interrupted or timed out"},
+        {0, 0, 3, -7, "Operation interrupted or timed out (3 s receive delay) (7us send delay)"},
+    };
+    context ctx;
+    for (const auto &c : cases) {
+        ctx->error_mode = c.mode;
+        ctx->errno_value = c.value;
+        ctx->recv_timeout = c.recv;
+        ctx->send_timeout = c.send;
+        EXPECT_STREQ(tcp_error_text(ctx.get()), c.text);
+    }
+}
+
+// --- proxy ---
+
+TEST_F(tcp, a_proxy_that_refuses_ends_the_attempt_with_its_status)
+{
+    std::string head;
+    {
+        const peer proxy([&](int client) {
+            head = loopback::read_head(client);
+            write_text(client, "HTTP/1.1 407 Who are you\r\nContent-Length: 2\r\n\r\nno");
+            wait_for_end(client);
+        });
+        context ctx;
+        ctx->proxy_host = "[127.0.0.1]";
+        ctx->proxy_port = proxy.port();
+        ctx->proxy_user = "user";
+        ctx->proxy_password = "secret";
+        std::snprintf(ctx->host, sizeof ctx->host, "far.example");
+        ctx->port = 443;
+        const std::uint32_t output_mode = ctx->output_mode;
+        EXPECT_EQ(tcp_connect(ctx.get(), "https://far.example/x", "far.example", 443), -1);
+        EXPECT_EQ(ctx->error, 407);
+        EXPECT_EQ(ctx->socket, -1);
+        EXPECT_EQ(ctx->output_mode, output_mode);
+    }
+    EXPECT_TRUE(head.starts_with("CONNECT far.example:443 HTTP/1.1\r\n")) << head;
+    EXPECT_NE(head.find("Proxy-Authorization: Basic dXNlcjpzZWNyZXQ=\r\n"), std::string::npos) << head;
+}
+
+// --- accepting ---
+
+TEST_F(tcp, a_client_is_accepted_and_named)
+{
+    context service(MODE_KEEP_ALIVE), client;
+    service->bind_flags = SO_REUSEADDR;
+    ASSERT_GE(soap_bind(service.get(), "127.0.0.1", 0, 5), 0);
+    ASSERT_GE(open_to(client, loopback::port_of(service->master_socket)), 0);
+    for (const int limit : {0, 5}) {
+        service->accept_timeout = limit;
+        if (limit != 0) {
+            ASSERT_GE(open_to(client, loopback::port_of(service->master_socket)), 0);
+        }
+        ASSERT_GE(soap_accept(service.get()), 0);
+        EXPECT_STREQ(service->host, "127.0.0.1");
+        EXPECT_EQ(service->peer_address, 0x7F000001u);
+        EXPECT_EQ(service->port, loopback::port_of(client->socket));
+        EXPECT_EQ(service->keep_alive, 1);
+        EXPECT_EQ(option_of(service->socket, SOL_SOCKET, SO_KEEPALIVE), 1);
+        EXPECT_EQ(fcntl(service->socket, F_GETFL) & O_NONBLOCK, 0);
+        EXPECT_EQ(tcp_send(client.get(), "hello", 5), 0);
+        EXPECT_EQ(receive(service), "hello");
+        EXPECT_EQ(tcp_disconnect(service.get()), 0);
+    }
+}
+
+TEST_F(tcp, listening_and_accepting_name_what_failed)
+{
+    context ctx, other;
+    EXPECT_EQ(soap_accept(ctx.get()), -1);
+    EXPECT_EQ(ctx.fault_detail(), "no master socket in soap_accept()");
+    ctx->accept_timeout = -20000;
+    ASSERT_GE(soap_bind(ctx.get(), "127.0.0.1", 0, 1), 0);
+    EXPECT_EQ(soap_accept(ctx.get()), -1);
+    expect_failure(ctx, 28, "Timeout", "accept failed in soap_accept()");
+    EXPECT_EQ(soap_bind(other.get(), "127.0.0.1", loopback::port_of(ctx->master_socket), 1), -1);
+    EXPECT_EQ(other->master_socket, -1);
+    expect_failure(other, 28, "Address already in use", "bind failed in soap_bind()");
+    other->bind_flags = 9999;
+    EXPECT_EQ(soap_bind(other.get(), "127.0.0.1", 0, 1), -1);
+    expect_failure(other, 28, "Protocol not available", "setsockopt failed in soap_bind()");
+    EXPECT_EQ(soap_bind(other.get(), "a..b", 0, 1), -1);
+    expect_failure(other, 28, gai_strerror(EAI_NONAME), "getaddrinfo failed in soap_bind()");
+}
+
+TEST_F(tcp, a_datagram_service_has_one_socket_that_is_closed_once)
+{
+    static int closed;
+    context client(MODE_UDP);
+    closed = 0;
+    {
+        context service(MODE_UDP);
+        service->on_close_socket = [](soap *, int socket) {
+            ++closed;
+            return close(socket);
+        };
+        const int master = soap_bind(service.get(), "127.0.0.1", 0, 0);
+        ASSERT_GE(master, 0);
+        EXPECT_EQ(service->socket, master);
+        EXPECT_EQ(soap_accept(service.get()), master);
+        ASSERT_GE(tcp_connect(client.get(), "soap.udp://x/", "127.0.0.1", loopback::port_of(master)), 0);
+        EXPECT_EQ(tcp_send(client.get(), "ping", 4), 0);
+        EXPECT_EQ(receive(service), "ping");
+    }
+    EXPECT_EQ(closed, 1);
+}
+
+} // namespace

@@ -1,0 +1,162 @@
+// trace_log_test.cpp - the trace files of a context, and certificates taken out of message texts.
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_log.h>
+
+#include <cstring>
+#include <filesystem>
+#include <fstream>
+#include <memory>
+#include <sstream>
+#include <string>
+#include <unistd.h>
+
+#include <gtest/gtest.h>
+
+#include "support/failing_malloc.h"
+
+namespace {
+
+std::string content_of(const std::string &path)
+{
+    std::ifstream file(path, std::ios::binary);
+    std::ostringstream text;
+    text << file.rdbuf();
+    return text.str();
+}
+
+class TraceLog : public testing::Test {
+protected:
+    void SetUp() override
+    {
+        directory = testing::TempDir() + "trace_log_" + std::to_string(getpid());
+        std::filesystem::create_directories(directory);
+        set_default(path("default.log"));
+    }
+    void TearDown() override
+    {
+        std::filesystem::remove_all(directory);
+        set_default("wsTrace.log");
+    }
+    std::string path(const std::string &name) const { return directory + "/" + name; }
+    static void set_default(const std::string &name) { std::strcpy(g_TraceLogFile, name.c_str()); }
+    static void write(soap &ctx, int channel, const std::string &text)
+    {
+        soap_log_write(&ctx, channel, text.data(), text.size());
+    }
+
+    std::string directory;
+};
+
+TEST_F(TraceLog, BothDirectionsGoToTheDefaultFileAtTheirFirstByte)
+{
+    EXPECT_EQ(soapEnableDebug, 1);
+    soap ctx;
+    set_default(path("later.log"));
+    EXPECT_FALSE(std::filesystem::exists(path("default.log")));
+    write(ctx, SOAP_LOG_SENT, std::string("out\0put;", 8));
+    write(ctx, SOAP_LOG_RECEIVED, "input;");
+    write(ctx, SOAP_LOG_SENT, "more");
+    EXPECT_EQ(content_of(path("default.log")), std::string("out\0put;input;more", 18))
+        << "flushed at each write";
+    EXPECT_FALSE(std::filesystem::exists(path("later.log")));
+    soap_discard_all(&ctx);
+    EXPECT_EQ(ctx.log_streams[SOAP_LOG_SENT], nullptr);
+    write(ctx, SOAP_LOG_SENT, "!");
+    EXPECT_EQ(content_of(path("default.log")), std::string("out\0put;input;more!", 19))
+        << "appended after a discard";
+}
+
+TEST_F(TraceLog, AChannelFollowsItsOwnPath)
+{
+    soap ctx;
+    write(ctx, SOAP_LOG_SENT, "a");
+    EXPECT_EQ(soap_log_set_sent(&ctx, path("sent.log").c_str()), 0);
+    EXPECT_EQ(soap_log_set_received(&ctx, nullptr), 0);
+    EXPECT_EQ(soap_log_set(&ctx, SOAP_LOG_SENT, ctx.log_paths[SOAP_LOG_SENT]), 0) << "its own text";
+    write(ctx, SOAP_LOG_SENT, "b");
+    write(ctx, SOAP_LOG_RECEIVED, "lost");
+    EXPECT_EQ(content_of(path("default.log")), "a");
+    EXPECT_EQ(content_of(path("sent.log")), "b");
+    EXPECT_EQ(ctx.log_streams[SOAP_LOG_RECEIVED], nullptr);
+}
+
+TEST_F(TraceLog, AFileThatCannotBeOpenedIsTriedAgain)
+{
+    soap ctx;
+    soap_log_set_sent(&ctx, path("missing/sent.log").c_str());
+    write(ctx, SOAP_LOG_SENT, "lost");
+    EXPECT_EQ(ctx.error, 0);
+    std::filesystem::create_directories(path("missing"));
+    write(ctx, SOAP_LOG_SENT, "kept");
+    EXPECT_EQ(content_of(path("missing/sent.log")), "kept");
+}
+
+TEST_F(TraceLog, ADefaultWithoutTextOrTerminatorIsSafe)
+{
+    set_default("");
+    {
+        soap ctx;
+        EXPECT_EQ(ctx.log_paths[SOAP_LOG_SENT], nullptr);
+    }
+    std::memset(g_TraceLogFile, 'x', SOAP_LOG_PATH_SIZE);
+    soap ctx;
+    EXPECT_EQ(std::strlen(ctx.log_paths[SOAP_LOG_SENT]), SOAP_LOG_PATH_SIZE);
+}
+
+TEST_F(TraceLog, WithoutMemoryForAPathTheChannelIsOff)
+{
+    soap ctx;
+    {
+        const failing_malloc::scope armed(1);
+        EXPECT_EQ(soap_log_set_sent(&ctx, "some.log"), SOAP_OUT_OF_MEMORY);
+    }
+    EXPECT_EQ(ctx.log_paths[SOAP_LOG_SENT], nullptr);
+}
+
+std::string redacted(const std::string &message)
+{
+    const std::unique_ptr<char[]> copy(new char[message.size()]); // no terminator behind the message
+    std::memcpy(copy.get(), message.data(), message.size());
+    std::int32_t length = -1;
+    const std::unique_ptr<char[]> result(
+        soap_log_redact_certificates(copy.get(), static_cast<std::int32_t>(message.size()), &length));
+    return std::string(result.get(), static_cast<std::size_t>(length));
+}
+
+TEST(Redaction, BlanksCertificatesOfTheTwoPrefixes)
+{
+    struct redaction_case {
+        const char *rule, *message, *expected;
+    };
+    static const redaction_case cases[] = {
+        {"protocol", "<a><protocol:certificate>MIIC<b/></protocol:certificate></a>",
+         "<a><protocol:certificate>...</protocol:certificate></a>"},
+        {"p760", "<p760:certificate>MIIC</p760:certificate>x", "<p760:certificate>...</p760:certificate>x"},
+        {"either end tag ends", "<p760:certificate>MIIC</protocol:certificate>x",
+         "<p760:certificate>...</protocol:certificate>x"},
+        {"two certificates", "<p760:certificate>A</p760:certificate>-<p760:certificate>B</p760:certificate>",
+         "<p760:certificate>...</p760:certificate>-<p760:certificate>...</p760:certificate>"},
+        {"start tag at the end", "abc<protocol:certificate>", "abc<protocol:certificate>..."},
+        {"end tag alone", "a</p760:certificate>b", "a</p760:certificate>b"},
+        {"grows", "<p760:certificate></p760:certificate>", "<p760:certificate>...</p760:certificate>"},
+        {"only starts", "<p760:certificate><p760:certificate><p760:certificate>",
+         "<p760:certificate>...<p760:certificate>...<p760:certificate>..."},
+        {"never closed", "<p760:certificate>MIIC</p760:cert", "<p760:certificate>..."},
+        {"attributes and other prefixes stay", "<p760:certificate a=''>M</x:certificate>",
+         "<p760:certificate a=''>M</x:certificate>"},
+        {"cut tag", "<protocol:certificat", "<protocol:certificat"},
+        {"empty", "", ""},
+    };
+    for (const redaction_case &c : cases)
+        EXPECT_EQ(redacted(c.message), c.expected) << c.rule;
+}
+
+TEST(Redaction, ANegativeSizeIsAnEmptyMessage)
+{
+    std::int32_t length = -1;
+    const std::unique_ptr<char[]> result(soap_log_redact_certificates("x", -1, &length));
+    EXPECT_NE(result, nullptr);
+    EXPECT_EQ(length, 0);
+}
+
+} // namespace

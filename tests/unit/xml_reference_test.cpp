@@ -1,0 +1,266 @@
+// xml_reference_test.cpp - the reader beside another parser: both must see the same document.
+//
+// Documents come from a small random grammar with fixed seeds, and from the XML files that the system happens
+// to have. Texts, attribute values and the order of tags are compared. Left out of account: line ends and
+// white space in attributes, which the reader keeps as they stand, and entities that a document declares for
+// itself.
+#include <filesystem>
+#include <fstream>
+#include <random>
+#include <set>
+#include <sstream>
+
+#include <libxml/xmlreader.h>
+
+#include "support/reader_input.h"
+
+#include "codec/xml_text.h"
+
+using reader_input::reception;
+
+namespace {
+
+void put_attributes(std::string &events, const std::set<std::string> &attributes)
+{
+    for (const std::string &attribute : attributes)
+        events += " " + attribute;
+}
+
+std::string blanks_unified(std::string text)
+{
+    std::replace_if(
+        text.begin(), text.end(), [](char c) { return c == '\n' || c == '\t'; }, ' ');
+    return text;
+}
+
+// What libxml2 makes of a document; false if it takes it for malformed.
+bool reference_events(const std::string &document, std::string &events)
+{
+    xmlTextReaderPtr reader = xmlReaderForMemory(
+        document.data(), static_cast<int>(document.size()), nullptr, nullptr,
+        XML_PARSE_NONET | XML_PARSE_NOENT | XML_PARSE_HUGE | XML_PARSE_NOERROR | XML_PARSE_NOWARNING);
+    const auto text_of = [](const xmlChar *text) {
+        return std::string(text != nullptr ? reinterpret_cast<const char *>(text) : "");
+    };
+    int more;
+    while ((more = xmlTextReaderRead(reader)) == 1) {
+        const std::string name = text_of(xmlTextReaderConstName(reader));
+        switch (xmlTextReaderNodeType(reader)) {
+        case XML_READER_TYPE_ELEMENT: {
+            const bool empty = xmlTextReaderIsEmptyElement(reader) == 1;
+            std::set<std::string> attributes;
+            while (xmlTextReaderMoveToNextAttribute(reader) == 1)
+                attributes.insert(text_of(xmlTextReaderConstName(reader)) + "=" +
+                                  blanks_unified(text_of(xmlTextReaderConstValue(reader))));
+            events += "<" + name;
+            put_attributes(events, attributes);
+            events += empty ? "/>" : ">";
+            break;
+        }
+        case XML_READER_TYPE_END_ELEMENT:
+            events += "</" + name + ">";
+            break;
+        case XML_READER_TYPE_TEXT:
+        case XML_READER_TYPE_CDATA:
+        case XML_READER_TYPE_SIGNIFICANT_WHITESPACE:
+        case XML_READER_TYPE_WHITESPACE:
+            events += text_of(xmlTextReaderConstValue(reader));
+            break;
+        default:
+            break;
+        }
+    }
+    xmlFreeTextReader(reader);
+    return more == 0;
+}
+
+void put_code(std::string &events, std::int32_t token)
+{
+    char bytes[6];
+    events.append(bytes, utf8_encode(token_code(token), bytes));
+}
+
+bool put_start(soap *ctx, std::string &events)
+{
+    ctx->look_ahead = XML_START;
+    if (soap_element_in_begin(ctx, nullptr, 1, nullptr) != 0)
+        return false;
+    events += "<" + std::string(ctx->tag);
+    std::set<std::string> attributes;
+    for (const soap_attribute *p = ctx->attribute_list; p != nullptr; p = p->next) {
+        if (p->visible == 2)
+            attributes.insert(std::string(p->name) + "=" + blanks_unified(p->value));
+    }
+    put_attributes(events, attributes);
+    events += ctx->has_body != 0 ? ">" : "/>";
+    const char *text;
+    std::size_t length;
+    if (ctx->has_body != 0 && xml_text_in_place(ctx, &text, &length))
+        events.append(text, length);
+    return true;
+}
+
+// The same events from the reader. White space outside the root isn't content.
+bool reader_events(soap *ctx, std::string &events)
+{
+    ctx->max_depth = 0;
+    for (;;) {
+        const std::int32_t token = soap_char_next_utf8(ctx);
+        if (token == XML_EOF)
+            return ctx->nesting_level == 0;
+        if (token == XML_START) {
+            if (!put_start(ctx, events))
+                return false;
+        } else if (token == XML_END) {
+            ctx->look_ahead = token;
+            if (soap_element_in_end(ctx, nullptr) != 0)
+                return false;
+            events += "</" + std::string(ctx->tag) + ">";
+        } else if (ctx->nesting_level != 0) {
+            put_code(events, token);
+        }
+    }
+}
+
+// Compares a document's two readings; long texts are cut to where they part.
+void compare(const std::string &document, const std::string &expected, std::size_t first, std::size_t piece)
+{
+    reception in(document, first, piece, MODE_UTF_STRINGS);
+    std::string events;
+    EXPECT_TRUE(reader_events(in.context(), events));
+    if (events == expected)
+        return;
+    const auto parted = std::mismatch(events.begin(), events.end(), expected.begin(), expected.end());
+    const auto from =
+        static_cast<std::size_t>(std::max<std::ptrdiff_t>(parted.first - events.begin() - 60, 0));
+    ADD_FAILURE() << "reader:    " << events.substr(from, 120)
+                  << "\nreference: " << expected.substr(from, 120) << "\nfirst " << first << " piece "
+                  << piece;
+}
+
+// ------------------------------------------------------------------------------------------ random documents
+
+class grammar {
+public:
+    explicit grammar(unsigned seed) : random_(seed) {}
+
+    std::string document()
+    {
+        std::string text =
+            one_of({"", "<?xml version='1.0'?>", "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n"});
+        text += misc() + element(0) + misc();
+        return text;
+    }
+
+private:
+    unsigned below(unsigned bound) { return static_cast<unsigned>(random_() % bound); }
+
+    std::string one_of(std::initializer_list<const char *> choices)
+    {
+        return *(choices.begin() + below(static_cast<unsigned>(choices.size())));
+    }
+
+    std::string name()
+    {
+        return one_of({"a", "b", "item", "x:item", "x:a-rather-long.name_1", "y:b", "\xC3\xA9l"});
+    }
+    std::string blank() { return one_of({"", "", " ", "\n  ", "\t"}); }
+    std::string misc()
+    {
+        return one_of({"", "\n", "<!-- c -->", "<?p q?>", "<!-- <a> & -->\n<?p <a ?b?\?>"});
+    }
+
+    std::string characters(bool attribute)
+    {
+        std::string text;
+        for (unsigned i = below(6); i != 0; --i) {
+            text += one_of({"text", "a longer run of words without anything special in it", "\xC3\xA9",
+                            "\xE2\x82\xAC", "\xF0\x9F\x98\x80", "&lt;", "&amp;", "&#233;", "&#x20AC;",
+                            "&quot;", "&gt;", "/", "-", "?", "]]-", " "});
+            if (!attribute)
+                text += one_of({"", "", "\"", "'", ">", "/>", "\n", "<![CDATA[<x>&y;]]>", "<![CDATA[]]]]>",
+                                "<!--t-->", "<?i <j> ?>"});
+        }
+        return text;
+    }
+
+    std::string attributes()
+    {
+        static const char *const names[] = {"id", "x:type", "y:nil", "long-attribute-name", "n\xC3\xB6"};
+        std::string text;
+        for (const char *attribute : names) {
+            if (below(4) != 0)
+                continue;
+            const std::string quote = one_of({"\"", "'"});
+            text += " " + blank() + attribute + blank() + "=" + blank() + quote + characters(true) + quote;
+        }
+        return text;
+    }
+
+    std::string element(int depth)
+    {
+        const std::string tag = name();
+        const std::string scope = depth == 0 ? " xmlns:x='urn:one' xmlns:y=\"urn:two\"" : "";
+        std::string text = "<" + tag + scope + attributes() + blank();
+        if (below(5) == 0)
+            return text + "/>";
+        text += ">";
+        for (unsigned i = depth < 6 ? below(5) : 0; i != 0; --i)
+            text += characters(false) + element(depth + 1);
+        return text + characters(false) + "</" + tag + blank() + ">";
+    }
+
+    std::mt19937 random_;
+};
+
+TEST(XmlReference, random_documents_read_the_same)
+{
+    int compared = 0;
+    for (unsigned seed = 1; seed <= 400; ++seed) {
+        const std::string document = grammar(seed).document();
+        std::string expected;
+        ASSERT_TRUE(reference_events(document, expected)) << seed << ": " << document;
+        SCOPED_TRACE(seed);
+        compare(document, expected, SOAP_BUFFER_SIZE, SOAP_BUFFER_SIZE);
+        compare(document, expected, 1, 1);
+        compare(document, expected, seed % 97 + 1, seed % 13 + 2);
+        ++compared;
+    }
+    EXPECT_EQ(compared, 400);
+}
+
+// ------------------------------------------------------------------------------------------ files
+
+bool comparable(const std::string &document)
+{
+    return document.find("<!ENTITY") == std::string::npos && document.find('\r') == std::string::npos &&
+           document.find("encoding=\"UTF-16") == std::string::npos && document.size() < 5000000;
+}
+
+TEST(XmlReference, files_of_the_system_read_the_same)
+{
+    int compared = 0;
+    for (const char *place : {"/usr/share/xml", "/usr/share/mime/packages", "/usr/share/metainfo"}) {
+        std::error_code none;
+        for (const auto &entry : std::filesystem::recursive_directory_iterator(place, none)) {
+            if (entry.path().extension() != ".xml" || !entry.is_regular_file(none))
+                continue;
+            std::ostringstream content;
+            content << std::ifstream(entry.path(), std::ios::binary).rdbuf();
+            const std::string document = content.str();
+            std::string expected;
+            if (!comparable(document) || !reference_events(document, expected))
+                continue;
+            SCOPED_TRACE(entry.path());
+            compare(document, expected, SOAP_BUFFER_SIZE, SOAP_BUFFER_SIZE);
+            compare(document, expected, 1000, 1447);
+            ++compared;
+        }
+    }
+    if (compared == 0)
+        GTEST_SKIP() << "no XML files found";
+    RecordProperty("files", compared);
+    std::printf("%d files compared\n", compared);
+}
+
+} // namespace

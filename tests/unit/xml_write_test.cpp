@@ -1,0 +1,869 @@
+// Start tags, text, arrays and the envelope as they stand on the wire, in every output mode.
+#include <cstdlib>
+#include <random>
+#include <vector>
+
+#include <unistd.h>
+
+#include <zuv_client_pro/soap_error.h>
+
+#include "codec/xml_write_fast.h"
+#include "support/failing_malloc.h"
+#include "support/writer_fixture.h"
+
+using namespace writer_fixture;
+
+namespace {
+
+std::string inside(writer &w, const calls &write)
+{
+    return written(w, start::inside, write);
+}
+
+std::string inside(std::uint32_t mode, const calls &write, std::int16_t version = 1)
+{
+    writer w(mode, version);
+    return inside(w, write);
+}
+
+std::string document(std::uint32_t mode, const calls &write, std::int16_t version = 1)
+{
+    writer w(mode, version);
+    return written(w, start::document, write);
+}
+
+void element(soap *ctx, const char *tag, const calls &content = {})
+{
+    EXPECT_EQ(soap_element_out_begin(ctx, tag, 0, nullptr), 0);
+    if (content)
+        content(ctx);
+    EXPECT_EQ(soap_element_out_end(ctx, tag), 0);
+}
+
+// What `xmllint` makes of a document; empty if it finds fault with it.
+std::string canonical_form(const std::string &text, const char *form)
+{
+    const std::string path = ::testing::TempDir() + "xml_write_" + std::to_string(::getpid()) + ".xml";
+    std::FILE *file = std::fopen(path.c_str(), "wb");
+    if (!file)
+        return "";
+    std::fwrite(text.data(), 1, text.size(), file);
+    std::fclose(file);
+    std::string result;
+    if (std::FILE *pipe = ::popen(("xmllint " + std::string(form) + " " + path).c_str(), "r")) {
+        char bytes[4096];
+        while (const std::size_t got = std::fread(bytes, 1, sizeof bytes, pipe))
+            result.append(bytes, got);
+        if (::pclose(pipe) != 0)
+            result.clear();
+    }
+    std::remove(path.c_str());
+    return result;
+}
+
+bool has_xmllint()
+{
+    return std::system("xmllint --version >/dev/null 2>&1") == 0;
+}
+
+} // namespace
+
+// ---------------------------------------------------------------------------------------------
+// Text.
+
+// The table of escapes once more, a byte at a time.
+static std::string escaped(const std::string &text, int flag, std::uint32_t mode)
+{
+    std::string result;
+    for (const char c : text) {
+        const auto byte = static_cast<unsigned char>(c);
+        if (c == '\r')
+            result += "&#xD;";
+        else if (c == '&')
+            result += "&amp;";
+        else if (c == '<')
+            result += "&lt;";
+        else if (c == '>' && flag == 0)
+            result += "&gt;";
+        else if (c == '"' && flag != 0)
+            result += "&quot;";
+        else if (c == '\t' && flag != 0)
+            result += "&#x9;";
+        else if (c == '\n' && (flag != 0 || !(mode & MODE_CANONICAL)))
+            result += "&#xA;";
+        else if (byte >= 128 && flag != 2 && !(mode & MODE_UTF_STRINGS))
+            result += {static_cast<char>(0xC0 | byte >> 6), static_cast<char>(0x80 | (byte & 0x3F))};
+        else
+            result += c;
+    }
+    return result;
+}
+
+TEST(xml_write, escapes_follow_place_and_mode)
+{
+    static const struct {
+        const char *rule;
+        std::uint32_t mode;
+        int flag;
+        const char *text;
+        const char *bytes;
+    } cases[] = {
+        {"element text", 0, 0, "\t\n\r\"&'<>\x01", "\t&#xA;&#xD;\"&amp;'&lt;&gt;\x01"},
+        {"canonical text", MODE_CANONICAL, 0, "\t\n\r\"&'<>", "\t\n&#xD;\"&amp;'&lt;&gt;"},
+        {"attribute", 0, 1, "\t\n\r\"&'<>", "&#x9;&#xA;&#xD;&quot;&amp;'&lt;>"},
+        {"canonical attribute", MODE_CANONICAL, 1, "\n>", "&#xA;>"},
+        {"latin-1 text", 0, 0, "\x80\xE9\xFF", "\xC2\x80\xC3\xA9\xC3\xBF"},
+        {"latin-1 attribute", 0, 1, "\xE9", "\xC3\xA9"},
+        {"raw attribute", 0, 2, "\xE9\"", "\xE9&quot;"},
+        {"utf-8 strings", MODE_UTF_STRINGS, 0, "\xC3\xA9<", "\xC3\xA9&lt;"},
+        {"utf-8 attribute", MODE_UTF_STRINGS, 1, "\xC3\xA9", "\xC3\xA9"},
+        {"empty", 0, 0, "", ""},
+    };
+    for (const auto &c : cases) {
+        SCOPED_TRACE(c.rule);
+        EXPECT_EQ(inside(c.mode, [&](soap *ctx) { soap_text_write(ctx, c.text, c.flag); }), c.bytes);
+        EXPECT_EQ(escaped(c.text, c.flag, c.mode), c.bytes);
+    }
+}
+
+TEST(xml_write, an_escape_is_found_at_every_place_of_every_length)
+{
+    for (const std::uint32_t mode : {0U, MODE_UTF_STRINGS, MODE_CANONICAL}) {
+        writer w(mode);
+        for (const int flag : {0, 1, 2}) {
+            for (std::size_t length = 1; length <= 50; ++length) {
+                for (std::size_t at = 0; at < length; ++at) {
+                    std::string text(length, 'x');
+                    text[at] = "&<>\n\r\t\"\xE9"[(at + length) % 8];
+                    text[length - 1 - at / 2] = '>';
+                    const std::string bytes = w.pass(MODE_BUFFERED, start::inside, [&](soap *ctx) {
+                        soap_text_write(ctx, text.c_str(), flag);
+                    });
+                    ASSERT_EQ(bytes, escaped(text, flag, mode)) << flag << ' ' << length << ' ' << at;
+                }
+            }
+        }
+    }
+}
+
+TEST(xml_write, long_text_of_any_bytes_is_written_whole)
+{
+    std::mt19937 random(7);
+    for (const unsigned spread : {256U, 40U, 3U}) {
+        std::string text(200000, ' ');
+        for (char &c : text)
+            c = static_cast<char>(random() % 5 ? 'a' : 1 + random() % (spread - 1));
+        writer w;
+        EXPECT_EQ(inside(w, [&](soap *ctx) { soap_text_write_n(ctx, text.data(), text.size(), 0); }),
+                  escaped(text, 0, 0));
+    }
+}
+
+TEST(xml_write, code_points_take_one_to_six_bytes)
+{
+    static const struct {
+        std::uint32_t code;
+        const char *bytes;
+    } cases[] = {
+        {0x09, "\t"},
+        {0x7F, "\x7F"},
+        {0x80, "\xC2\x80"},
+        {0x7FF, "\xDF\xBF"},
+        {0x800, "\xE0\xA0\x80"},
+        {0xFFFF, "\xEF\xBF\xBF"},
+        {0x10000, "\xF0\x90\x80\x80"},
+        {0x1FFFFF, "\xF7\xBF\xBF\xBF"},
+        {0x200000, "\xF8\x88\x80\x80\x80"},
+        {0x3FFFFFF, "\xFB\xBF\xBF\xBF\xBF"},
+        {0x4000000, "\xFC\x84\x80\x80\x80\x80"},
+        {0x7FFFFFFF, "\xFD\xBF\xBF\xBF\xBF\xBF"},
+    };
+    for (const auto &c : cases)
+        EXPECT_EQ(inside(0, [&](soap *ctx) { soap_char_write(ctx, c.code); }), c.bytes) << c.code;
+}
+
+TEST(xml_write, wide_text_is_escaped_like_byte_text)
+{
+    const std::u32string text = U"a<\n\t\"&>\u00E9\u20AC\U0001F600" + std::u32string(300, U'\u00E9');
+    std::string tail;
+    for (int i = 0; i < 300; ++i)
+        tail += "\xC3\xA9";
+    const std::string end = "\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80" + tail;
+    EXPECT_EQ(inside(0, [&](soap *ctx) { soap_wide_text_write(ctx, text.c_str(), 0); }),
+              "a&lt;&#xA;\t\"&amp;&gt;" + end);
+    EXPECT_EQ(inside(MODE_UTF_STRINGS, [&](soap *ctx) { soap_wide_text_write(ctx, text.c_str(), 1); }),
+              "a&lt;&#xA;&#x9;&quot;&amp;>" + end);
+    EXPECT_EQ(inside(MODE_CANONICAL, [&](soap *ctx) { soap_wide_text_write(ctx, U"\n", 0); }), "\n");
+}
+
+// ---------------------------------------------------------------------------------------------
+// Tags.
+
+TEST(xml_write, a_start_tag_carries_what_waits_for_it)
+{
+    static const struct {
+        const char *rule;
+        std::uint32_t mode;
+        std::int16_t version;
+        void (*before)(soap *);
+        int id;
+        const char *type;
+        const char *bytes;
+    } cases[] = {
+        {"plain", 0, 1, nullptr, 0, nullptr, "<a:e></a:e>"},
+        {"empty type", 0, 1, nullptr, -1, "", "<a:e></a:e>"},
+        {"id", 0, 1, nullptr, 7, "", "<a:e id=\"_7\"></a:e>"},
+        {"type", 0, 1, nullptr, 0, "xsd:int", "<a:e xsi:type=\"xsd:int\"></a:e>"},
+        {"no types", MODE_NO_TYPE, 1, nullptr, 2, "xsd:int", "<a:e id=\"_2\"></a:e>"},
+        {"no type in a header", 0, 1, [](soap *c) { c->message_part = PART_HEADER; }, 0, "xsd:int",
+         "<a:e></a:e>"},
+        {"a type set before stays", 0, 1, [](soap *c) { soap_attr_set(c, "xsi:type", "a:own", 1); }, 0,
+         "xsd:int", "<a:e xsi:type=\"a:own\"></a:e>"},
+        {"position", 0, 1,
+         [](soap *c) {
+             c->null_flag = 1;
+             c->position_count = 2;
+             c->positions[0] = 3;
+             c->positions[1] = -2147483647 - 1;
+         },
+         0, nullptr, "<a:e SOAP-ENC:position=\"[3,-2147483648]\"></a:e>"},
+        {"position without null", 0, 1, [](soap *c) { c->position_count = 1; }, 0, nullptr, "<a:e></a:e>"},
+        {"must understand 1.1", 0, 1,
+         [](soap *c) {
+             c->must_understand = 1;
+             c->actor = "urn:x";
+         },
+         0, nullptr, "<a:e SOAP-ENV:actor=\"urn:x\" SOAP-ENV:mustUnderstand=\"1\"></a:e>"},
+        {"must understand 1.2", 0, 2,
+         [](soap *c) {
+             c->must_understand = 1;
+             c->actor = "urn:x";
+         },
+         0, nullptr, "<a:e SOAP-ENV:role=\"urn:x\" SOAP-ENV:mustUnderstand=\"true\"></a:e>"},
+        {"must understand, no actor", 0, 1,
+         [](soap *c) {
+             c->must_understand = 1;
+             c->actor = "";
+         },
+         0, nullptr, "<a:e SOAP-ENV:mustUnderstand=\"1\"></a:e>"},
+        {"encoding by the table", 0, 1,
+         [](soap *c) {
+             c->encoding_flag = 1;
+             c->encoding_style = "";
+         },
+         0, nullptr, "<a:e SOAP-ENV:encodingStyle=\"http://schemas.xmlsoap.org/soap/encoding/\"></a:e>"},
+        {"own encoding", 0, 1,
+         [](soap *c) {
+             c->encoding_flag = 1;
+             c->encoding_style = "urn:enc";
+         },
+         0, nullptr, "<a:e SOAP-ENV:encodingStyle=\"urn:enc\"></a:e>"},
+        {"literal", 0, 1,
+         [](soap *c) {
+             c->encoding_flag = 1;
+             c->encoding_style = nullptr;
+         },
+         0, nullptr, "<a:e></a:e>"},
+    };
+    for (const auto &c : cases) {
+        SCOPED_TRACE(c.rule);
+        const auto write = [&](soap *ctx) {
+            if (c.before)
+                c.before(ctx);
+            EXPECT_EQ(soap_element_out_begin(ctx, "a:e", c.id, c.type), 0);
+            EXPECT_EQ(ctx->null_flag + ctx->position_count + ctx->must_understand + ctx->encoding_flag, 0);
+            EXPECT_EQ(ctx->nesting_level, 1U);
+            EXPECT_EQ(soap_element_out_end(ctx, "a:e"), 0);
+            EXPECT_EQ(ctx->nesting_level, 0U);
+        };
+        EXPECT_EQ(inside(c.mode, write, c.version), c.bytes);
+    }
+}
+
+TEST(xml_write, a_dash_stands_for_no_element)
+{
+    const auto write = [](soap *ctx) {
+        element(ctx, "-protocolProfile:set");
+        EXPECT_EQ(soap_element_empty_nil(ctx, "-x"), 0);
+        EXPECT_EQ(ctx->nesting_level, 0U);
+    };
+    EXPECT_EQ(inside(0, write), "");
+    EXPECT_EQ(inside(MODE_INDENT, write), "");
+}
+
+TEST(xml_write, the_root_declares_the_table)
+{
+    const std::string rows = " xmlns:SOAP-ENV=\"http://schemas.xmlsoap.org/soap/envelope/\""
+                             " xmlns:SOAP-ENC=\"http://schemas.xmlsoap.org/soap/encoding/\""
+                             " xmlns:xsi=\"http://www.w3.org/2001/XMLSchema-instance\""
+                             " xmlns:xsd=\"http://www.w3.org/2001/XMLSchema\"";
+    const std::string own = " xmlns:a=\"urn:a\" xmlns:b=\"urn:b\"";
+    const std::string head = "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n";
+    const auto write = [](soap *ctx) { element(ctx, "a:r", [](soap *c) { element(c, "b:e"); }); };
+    EXPECT_EQ(document(0, write), head + "<a:r" + rows + own + "><b:e></b:e></a:r>");
+    EXPECT_EQ(document(MODE_DEFAULT_NAMESPACE, write),
+              head + "<r xmlns=\"urn:a\"" + rows + "><e xmlns=\"urn:b\"></e></r>");
+
+    writer w;
+    w.ctx->xml_prolog = "<!--p-->";
+    EXPECT_EQ(written(w, start::document, write), "<!--p--><a:r" + rows + own + "><b:e></b:e></a:r>");
+
+    // A URI that was received takes the place of the row's own.
+    ASSERT_TRUE(soap_prefix_push_in(w.ctx.get(), "e", "http://www.w3.org/2003/05/soap-envelope"));
+    const std::string answered = written(w, start::document, write);
+    EXPECT_NE(answered.find("xmlns:SOAP-ENV=\"http://www.w3.org/2003/05/soap-envelope\""), std::string::npos);
+    EXPECT_NE(answered.find(own), std::string::npos);
+}
+
+TEST(xml_write, odd_tables_are_declared_as_far_as_they_go)
+{
+    static const soap_namespace odd[] = {{"", "urn:none", nullptr, nullptr},
+                                         {"n", nullptr, nullptr, nullptr},
+                                         {"q", "urn:<\xE9\">", nullptr, nullptr},
+                                         {nullptr, nullptr, nullptr, nullptr}};
+    writer w;
+    w.ctx->xml_prolog = "";
+    ASSERT_EQ(soap_set_namespaces(w.ctx.get(), odd), 0);
+    const auto write = [](soap *ctx) { element(ctx, "q:r"); };
+    EXPECT_EQ(written(w, start::document, write), "<q:r xmlns:q=\"urn:&lt;\xC3\xA9&quot;>\"></q:r>");
+    ASSERT_EQ(soap_set_namespaces(w.ctx.get(), nullptr), 0);
+    EXPECT_EQ(written(w, start::document, write), "<q:r></q:r>");
+}
+
+TEST(xml_write, default_namespaces_change_with_the_prefix)
+{
+    const auto write = [](soap *ctx) {
+        element(ctx, "a:one", [](soap *c) {
+            EXPECT_EQ(soap_element_empty_nil(c, "b:nil"), 0);
+            element(c, "b:two", [](soap *d) {
+                element(d, "a:three", [](soap *e) {
+                    element(e, "a:same");
+                    element(e, "b:four");
+                });
+                EXPECT_EQ(soap_attr_set(d, "b:own", "1", 1), 0);
+                EXPECT_EQ(soap_attr_set(d, "a:other", "2", 1), 0);
+                EXPECT_EQ(soap_element_out_begin(d, "b:five", 0, "a:type"), 0);
+                EXPECT_EQ(soap_element_out_end(d, "b:five"), 0);
+            });
+        });
+    };
+    EXPECT_EQ(inside(MODE_DEFAULT_NAMESPACE, write),
+              "<one xmlns=\"urn:a\"><nil xmlns=\"urn:b\" xsi:nil=\"true\"/>"
+              "<two xmlns=\"urn:b\"><three xmlns=\"urn:a\"><same></same><four xmlns=\"urn:b\"></four></three>"
+              "<five xsi:type=\"type\" a:other=\"2\" own=\"1\"></five></two></one>");
+}
+
+TEST(xml_write, indentation_stops_at_ten_bytes)
+{
+    EXPECT_EQ(inside(MODE_INDENT, [](soap *ctx) { element(ctx, "e"); }), "\n<e></e>");
+    const std::string two = document(MODE_INDENT, [](soap *ctx) {
+        ctx->xml_prolog = "";
+        soap_namespace_table_drop(ctx);
+        element(ctx, "r", [](soap *c) {
+            element(c, "e", [](soap *d) { soap_text_write(d, "t", 0); });
+            element(c, "f", [](soap *d) { element(d, "g"); });
+        });
+    });
+    EXPECT_EQ(two, "<r>\n\t<e>t</e>\n\t<f>\n\t\t<g></g>\n\t</f>\n</r>");
+
+    const std::string deep = inside(MODE_INDENT, [](soap *ctx) {
+        for (int i = 0; i < 12; ++i)
+            soap_element_out_begin(ctx, "e", 0, nullptr);
+    });
+    const std::string full = "\n\t\t\t\t\t\t\t\t\t<e>";
+    EXPECT_EQ(deep.substr(deep.size() - 3 * full.size()), full + full + full);
+}
+
+TEST(xml_write, table_attributes_come_in_reverse_order_of_setting)
+{
+    const auto write = [](soap *ctx) {
+        for (const char *first : {"1", "2"}) {
+            EXPECT_EQ(soap_attr_set(ctx, "x", first, 1), 0);
+            EXPECT_EQ(soap_attr_set(ctx, "x", "later", 1), 0); // the first value stays
+            EXPECT_EQ(soap_attr_set(ctx, "-no", "z", 1), 0);
+            EXPECT_EQ(soap_attr_set(ctx, "y", nullptr, 1), 0);
+            EXPECT_EQ(soap_attr_set(ctx, "z", "<\xE9", 2), 0);
+            EXPECT_EQ(soap_element_out_begin(ctx, "a:e", 1, "xsd:int"), 0);
+            EXPECT_EQ(soap_element_out_end(ctx, "a:e"), 0);
+        }
+        element(ctx, "a:bare");
+    };
+    EXPECT_EQ(inside(0, write),
+              "<a:e id=\"_1\" xsi:type=\"xsd:int\" z=\"&lt;\xE9\" y x=\"1\"></a:e>"
+              "<a:e id=\"_1\" xsi:type=\"xsd:int\" z=\"&lt;\xE9\" y x=\"2\"></a:e><a:bare></a:bare>");
+}
+
+TEST(xml_write, attribute_records_do_not_grow_with_ever_new_names)
+{
+    writer w;
+    const auto write = [](soap *ctx) {
+        for (int i = 1000; i < 3000; ++i) {
+            const std::string name = "xmlns:_" + std::to_string(i);
+            const std::string value(static_cast<std::size_t>(i % 300), 'v');
+            EXPECT_EQ(soap_attr_set(ctx, name.c_str(), value.c_str(), 1), 0);
+            element(ctx, "e");
+        }
+    };
+    const std::string bytes = inside(w, write);
+    EXPECT_NE(bytes.find("<e xmlns:_1001=\"" + std::string(101, 'v') + "\"></e>"), std::string::npos);
+    EXPECT_NE(bytes.find("<e xmlns:_2999=\"" + std::string(299, 'v') + "\"></e>"), std::string::npos);
+    int records = 0;
+    for (const soap_attribute *record = w.ctx->attribute_list; record; record = record->next)
+        ++records;
+    EXPECT_LE(records, 100);
+}
+
+TEST(xml_write, a_wsu_id_is_shown_to_the_signer)
+{
+    writer w(MODE_WSU_ID);
+    w.ctx->encoding_style = nullptr;
+    const std::string bytes = inside(w, [](soap *ctx) {
+        EXPECT_EQ(soap_body_out_begin(ctx), 0);
+        EXPECT_STREQ(ctx->element_id, "Body");
+        EXPECT_EQ(ctx->wsu_id_flag, 0);
+        EXPECT_EQ(soap_attr_set(ctx, "wsu:Id", std::string(2000, 'i').c_str(), 1), 0);
+        EXPECT_EQ(ctx->wsu_id_flag, 1);
+        EXPECT_EQ(std::string(ctx->element_id).size(), SOAP_TEXT_SIZE - 1);
+        element(ctx, "e");
+    });
+    EXPECT_EQ(bytes, "<SOAP-ENV:Body wsu:Id=\"Body\"><e wsu:Id=\"" + std::string(2000, 'i') + "\"></e>");
+}
+
+TEST(xml_write, null_values_are_left_out_or_nil)
+{
+    static const struct {
+        const char *rule;
+        std::uint32_t mode;
+        std::int16_t version;
+        int id;
+        std::int16_t positions;
+        const char *attribute;
+        const char *bytes;
+    } cases[] = {
+        {"left out", 0, 1, 0, 0, nullptr, ""},
+        {"left out with a position in 1.1", 0, 1, -1, 1, nullptr, ""},
+        {"nil mode", MODE_NIL, 1, 0, 0, nullptr, "<e xsi:type=\"t\" xsi:nil=\"true\"/>"},
+        {"id", 0, 1, 3, 0, nullptr, "<e id=\"_3\" xsi:type=\"t\" xsi:nil=\"true\"/>"},
+        {"position in 1.2", 0, 2, 0, 1, nullptr,
+         "<e xsi:type=\"t\" SOAP-ENC:position=\"[4]\" xsi:nil=\"true\"/>"},
+        {"attribute", 0, 1, 0, 0, "k", "<e xsi:type=\"t\" k=\"v\"/>"},
+    };
+    for (const auto &c : cases) {
+        SCOPED_TRACE(c.rule);
+        const auto write = [&](soap *ctx) {
+            ctx->null_flag = 1;
+            ctx->position_count = c.positions;
+            ctx->positions[0] = 4;
+            if (c.attribute)
+                soap_attr_set(ctx, c.attribute, "v", 1);
+            EXPECT_EQ(soap_element_null(ctx, "e", c.id, "t"), 0);
+            EXPECT_EQ(ctx->nesting_level, 0U);
+            EXPECT_EQ(ctx->position_count, 0);
+            EXPECT_EQ(ctx->null_flag, *c.bytes == '\0' ? 1 : 0);
+        };
+        EXPECT_EQ(inside(c.mode, write, c.version), c.bytes);
+    }
+}
+
+TEST(xml_write, empty_elements_carry_one_attribute)
+{
+    const auto write = [](soap *ctx) {
+        EXPECT_EQ(soap_element_empty_nil(ctx, "a:n"), 0);
+        EXPECT_EQ(soap_element_href(ctx, "a:r", 0, 12), 0);
+        EXPECT_EQ(soap_element_empty_attr(ctx, "a:x", 2, "href", "cid:<"), 0);
+    };
+    const std::string tail = "<a:x id=\"_2\" href=\"cid:&lt;\"/>";
+    EXPECT_EQ(inside(0, write), "<a:n xsi:nil=\"true\"/><a:r href=\"#_12\"/>" + tail);
+    EXPECT_EQ(inside(0, write, 2), "<a:n xsi:nil=\"true\"/><a:r SOAP-ENC:ref=\"_12\"/>" + tail);
+}
+
+TEST(xml_write, open_elements_stop_at_the_limit)
+{
+    writer w;
+    const auto open = [](soap *ctx) { return soap_element_out_begin(ctx, "e", 0, nullptr); };
+    const auto write = [&](soap *ctx) {
+        for (int i = 0; i < 4; ++i)
+            EXPECT_EQ(open(ctx), 0);
+        EXPECT_EQ(open(ctx), SOAP_LENGTH);
+        EXPECT_EQ(ctx->error, SOAP_LENGTH);
+    };
+    w.ctx->max_depth = 4;
+    w.pass(MODE_BUFFERED | MODE_COUNTING, start::inside, write);
+    w.pass(MODE_BUFFERED, start::inside, write);
+    w.ctx->output_mode = MODE_INDENT;
+    w.pass(MODE_BUFFERED | MODE_COUNTING, start::inside, write);
+    w.ctx->max_depth = 0;
+    w.pass(MODE_BUFFERED | MODE_COUNTING, start::inside, [&](soap *ctx) {
+        for (int i = 0; i < 10000; ++i)
+            ASSERT_EQ(open(ctx), 0);
+    });
+}
+
+TEST(xml_write, short_ways_write_what_the_long_ways_do)
+{
+    for (const std::uint32_t mode : {0U, MODE_INDENT, MODE_DEFAULT_NAMESPACE, MODE_CANONICAL}) {
+        for (const start where : {start::document, start::inside}) {
+            writer w(mode);
+            const auto short_way = [](soap *ctx) {
+                for (int i = 0; i < 4000; ++i) { // past the end of the buffer
+                    EXPECT_EQ(xml_open_plain(ctx, "a:list", 6), 0);
+                    EXPECT_EQ(xml_text_element_plain(ctx, "b:item", 6, "x<y", 3), 0);
+                    EXPECT_EQ(xml_close_plain(ctx, "a:list", 6), 0);
+                }
+            };
+            const auto long_way = [](soap *ctx) {
+                for (int i = 0; i < 4000; ++i)
+                    element(ctx, "a:list", [](soap *c) {
+                        element(c, "b:item", [](soap *d) { soap_text_write(d, "x<y", 0); });
+                    });
+            };
+            EXPECT_EQ(written(w, where, short_way), written(w, where, long_way));
+        }
+    }
+}
+
+TEST(xml_write, a_failed_send_ends_the_call)
+{
+    writer w;
+    w.ctx->on_send = [](soap *, const char *, std::size_t) -> int { return SOAP_TCP_ERROR; };
+    w.ctx->mode = MODE_DIRECT;
+    EXPECT_EQ(soap_element_out_begin(w.ctx.get(), "a:e", 1, "t"), SOAP_TCP_ERROR);
+    EXPECT_EQ(w.ctx->error, SOAP_TCP_ERROR);
+    EXPECT_EQ(soap_text_write(w.ctx.get(), "t", 0), SOAP_TCP_ERROR);
+}
+
+// ---------------------------------------------------------------------------------------------
+// Values.
+
+TEST(xml_write, arrays_are_typed_by_version)
+{
+    const auto write = [](soap *ctx) {
+        const int sizes[] = {2, 3};
+        const int offsets[] = {1, 0};
+        const std::string sized = soap_array_size_text(ctx, sizes, 2);
+        EXPECT_EQ(sized, "[2,3]");
+        const std::string type =
+            soap_array_type_text(ctx, "xsd:int", sizes, ctx->soap_version == 1 ? offsets : nullptr, 2);
+        EXPECT_EQ(soap_array_open(ctx, "a:l", 4, type.c_str(), "[1]"), 0);
+        EXPECT_EQ(soap_element_out_end(ctx, "a:l"), 0);
+        EXPECT_EQ(soap_array_open(ctx, "a:m", 0, "", nullptr), 0);
+        EXPECT_EQ(soap_element_out_end(ctx, "a:m"), 0);
+    };
+    EXPECT_EQ(inside(0, write), "<a:l id=\"_4\" xsi:type=\"SOAP-ENC:Array\" SOAP-ENC:offset=\"[1]\""
+                                " SOAP-ENC:arrayType=\"xsd:int[3,3]\"></a:l><a:m></a:m>");
+    EXPECT_EQ(inside(0, write, 2), "<a:l id=\"_4\" xsi:type=\"SOAP-ENC:Array\" SOAP-ENC:itemType=\"xsd:int\""
+                                   " SOAP-ENC:arraySize=\"2 3\"></a:l><a:m></a:m>");
+}
+
+TEST(xml_write, array_texts_never_pass_their_buffer)
+{
+    writer w;
+    std::vector<int> sizes(500, -2147483647 - 1);
+    EXPECT_LT(std::string(soap_array_size_text(w.ctx.get(), sizes.data(), 500)).size(), SOAP_TEXT_SIZE);
+    const std::string type(2000, 't');
+    EXPECT_LT(
+        std::string(soap_array_type_text(w.ctx.get(), type.c_str(), sizes.data(), sizes.data(), 500)).size(),
+        SOAP_TEXT_SIZE);
+    EXPECT_STREQ(soap_array_type_text(w.ctx.get(), "t", sizes.data(), sizes.data(), 1), "t[-4294967296]");
+    w.ctx->soap_version = 2;
+    EXPECT_EQ(inside(w, [&](soap *ctx) { soap_array_open(ctx, "e", 0, (type + "[2").c_str(), nullptr); }),
+              "<e xsi:type=\"SOAP-ENC:Array\">");
+}
+
+TEST(xml_write, the_result_name_is_for_encoded_soap_12)
+{
+    const auto write = [](soap *ctx) { EXPECT_EQ(soap_result_out(ctx, "a:return"), 0); };
+    EXPECT_EQ(
+        inside(0, write, 2),
+        "<SOAP-RPC:result xmlns:SOAP-RPC=\"http://www.w3.org/2003/05/soap-rpc\">a:return</SOAP-RPC:result>");
+    EXPECT_EQ(inside(0, write, 1), "");
+    writer literal(0, 2);
+    literal.ctx->encoding_style = nullptr;
+    EXPECT_EQ(inside(literal, write), "");
+}
+
+TEST(xml_write, literal_content_is_not_escaped)
+{
+    static const struct {
+        const char *tag;
+        const char *bytes;
+    } cases[] = {
+        {"a:x", "<x xmlns=\"urn:a\"><b>\xC3\xA9&amp;</b></x>"},
+        {"q:x", "<x xmlns=\"\"><b>\xC3\xA9&amp;</b></x>"},
+        {"x", "<x><b>\xC3\xA9&amp;</b></x>"},
+        {"-x", "<b>\xC3\xA9&amp;</b>"},
+        {nullptr, "<b>\xC3\xA9&amp;</b>"},
+    };
+    char text[] = "<b>\xC3\xA9&amp;</b>";
+    char32_t wide[] = U"<b>\u00E9&amp;</b>";
+    for (const auto &c : cases) {
+        char *place = text;
+        char32_t *wide_place = wide;
+        EXPECT_EQ(
+            inside(0, [&](soap *ctx) { EXPECT_EQ(soap_literal_write(ctx, c.tag, &place, nullptr), 0); }),
+            c.bytes);
+        EXPECT_EQ(inside(0,
+                         [&](soap *ctx) {
+                             EXPECT_EQ(soap_wide_literal_write(ctx, c.tag, &wide_place, nullptr), 0);
+                         }),
+                  c.bytes);
+    }
+    char *none = nullptr;
+    EXPECT_EQ(inside(0, [&](soap *ctx) { EXPECT_EQ(soap_literal_write(ctx, "a:x", &none, nullptr), 0); }),
+              "");
+}
+
+TEST(xml_write, strings_are_elements_with_an_identity)
+{
+    char text[] = "a<b";
+    char empty[] = "";
+    char32_t wide[] = U"\u00E9";
+    const auto write = [&](soap *ctx) {
+        char *place = text;
+        EXPECT_EQ(soap_string_element_out(ctx, "a:s", 0, &place, "xsd:string", 5), 0);
+        place = empty;
+        EXPECT_EQ(soap_string_element_out(ctx, "a:s", 3, &place, "", 5), 0);
+        place = nullptr;
+        EXPECT_EQ(soap_string_element_out(ctx, "a:s", 0, &place, "", 5), 0);
+        char32_t *wide_place = wide;
+        EXPECT_EQ(soap_wide_string_element_out(ctx, "a:w", 0, &wide_place, "", 5), 0);
+    };
+    const std::string first = "<a:s xsi:type=\"xsd:string\">a&lt;b</a:s>";
+    const std::string last = "<a:w>\xC3\xA9</a:w>";
+    EXPECT_EQ(inside(0, write), first + "<a:s id=\"_3\"></a:s>" + last);
+    EXPECT_EQ(inside(MODE_NULL_STRINGS, write), first + "<a:s id=\"_3\" xsi:nil=\"true\"/>" + last);
+    EXPECT_EQ(inside(MODE_NIL, write), first + "<a:s id=\"_3\"></a:s><a:s xsi:nil=\"true\"/>" + last);
+}
+
+// ---------------------------------------------------------------------------------------------
+// The envelope.
+
+static void envelope(soap *ctx)
+{
+    EXPECT_EQ(soap_envelope_out_begin(ctx), 0);
+    EXPECT_EQ(ctx->message_part, PART_ENVELOPE);
+    EXPECT_EQ(soap_body_out_begin(ctx), 0);
+    EXPECT_EQ(ctx->message_part, PART_BODY);
+    EXPECT_EQ(soap_body_out_end(ctx), 0);
+    EXPECT_EQ(ctx->message_part, PART_AFTER_BODY);
+    EXPECT_EQ(soap_envelope_out_end(ctx), 0);
+    EXPECT_EQ(ctx->message_part, PART_AFTER_ENVELOPE);
+    EXPECT_EQ(ctx->nesting_level, 0U);
+}
+
+TEST(xml_write, the_envelope_ends_with_a_line)
+{
+    writer w;
+    w.ctx->encoding_style = nullptr;
+    EXPECT_EQ(inside(w, envelope),
+              "<SOAP-ENV:Envelope><SOAP-ENV:Body></SOAP-ENV:Body></SOAP-ENV:Envelope>\r\n");
+    w.ctx->encoding_style = "urn:s";
+    EXPECT_EQ(inside(w, envelope), "<SOAP-ENV:Envelope><SOAP-ENV:Body SOAP-ENV:encodingStyle=\"urn:s\">"
+                                   "</SOAP-ENV:Body></SOAP-ENV:Envelope>\r\n");
+    w.ctx->soap_version = 2;
+    EXPECT_EQ(inside(w, envelope),
+              "<SOAP-ENV:Envelope><SOAP-ENV:Body></SOAP-ENV:Body></SOAP-ENV:Envelope>\r\n");
+}
+
+TEST(xml_write, the_part_head_names_what_the_part_is)
+{
+    static const struct {
+        std::uint32_t mode;
+        std::int16_t version;
+        const char *type;
+    } cases[] = {
+        {MODE_MIME, 1, "text/xml; charset=utf-8"},
+        {MODE_MIME, 2, "application/soap+xml; charset=utf-8"},
+        {MODE_MIME | MODE_MTOM, 1, "application/xop+xml; charset=utf-8; type=\"text/xml\""},
+        {MODE_MIME | MODE_MTOM, 2, "application/xop+xml; charset=utf-8; type=\"application/soap+xml\""},
+    };
+    std::string boundary = "==b==";
+    std::string start = "<s>";
+    for (const auto &c : cases) {
+        writer w(c.mode, c.version);
+        w.ctx->encoding_style = nullptr;
+        w.ctx->mime.boundary = boundary.data();
+        w.ctx->mime.start = start.data();
+        EXPECT_EQ(
+            inside(w, envelope).substr(0, 90),
+            ("--==b==\r\nContent-Type: " + std::string(c.type) +
+             "\r\nContent-Transfer-Encoding: binary\r\nContent-ID: <s>\r\n\r\n<SOAP-ENV:Envelope><SOAP-ENV")
+                .substr(0, 90));
+        std::string large(941, 'b');
+        w.ctx->mime.boundary = large.data();
+        EXPECT_EQ(inside(w, envelope).substr(0, 3), "<SO");
+        w.ctx->mime = {};
+    }
+}
+
+TEST(xml_write, a_dime_record_is_sized_by_the_counting_pass)
+{
+    writer w(MODE_DIME);
+    w.ctx->encoding_style = nullptr;
+    w.pass(MODE_BUFFERED | MODE_COUNTING, start::inside, envelope);
+    const std::string xml = "<SOAP-ENV:Envelope><SOAP-ENV:Body></SOAP-ENV:Body></SOAP-ENV:Envelope>\r\n";
+    EXPECT_EQ(w.ctx->dime.size, xml.size());
+    EXPECT_EQ(w.ctx->dime.flags, 0x26);
+    EXPECT_STREQ(w.ctx->dime.id, "cid:id0");
+    EXPECT_STREQ(w.ctx->dime.type, table()[0].uri);
+    const std::uint64_t counted = w.ctx->message_count;
+    const std::string record = w.pass(MODE_BUFFERED, start::inside, envelope);
+    EXPECT_EQ(record.size(), counted);
+    EXPECT_EQ(record.size() % 4, 0U);
+    EXPECT_NE(record.find(xml + std::string((4 - xml.size() % 4) % 4, '\0')), std::string::npos);
+}
+
+// ---------------------------------------------------------------------------------------------
+// Canonical output.
+
+static void namespaces_where_used(soap *ctx)
+{
+    element(ctx, "SOAP-ENV:Envelope", [](soap *c) {
+        element(c, "a:one", [](soap *d) {
+            element(d, "b:two", [](soap *e) { soap_text_write(e, "\t\n\r<>&\"\xE9", 0); });
+            element(d, "b:two");
+            element(d, "a:three");
+            element(d, "none");
+        });
+        element(c, "b:again");
+    });
+}
+
+static void attributes_in_order(soap *ctx)
+{
+    element(ctx, "b:root", [](soap *c) {
+        soap_attr_set(c, "z", "\t\n\r<>&\"'\xE9", 1);
+        soap_attr_set(c, "b:a", "1", 1);
+        soap_attr_set(c, "xsi:n", "2", 1);
+        soap_attr_set(c, "a:z", "3", 1);
+        soap_attr_set(c, "a:b", "4", 1);
+        soap_attr_set(c, "xml:lang", "en", 1);
+        soap_attr_set(c, "b", "5", 1);
+        element(c, "a:e", [](soap *d) {
+            soap_attr_set(d, "a:b", "6", 1);
+            soap_attr_set(d, "SOAP-ENC:q", "7", 1);
+            element(d, "b:e");
+        });
+        soap_attr_set(c, "b", "8", 1);
+        EXPECT_EQ(soap_element_empty_nil(c, "a:nil"), 0);
+        EXPECT_EQ(soap_element_href(c, "a:ref", 9, 1), 0);
+    });
+}
+
+static void prefixes_redefined(soap *ctx)
+{
+    char raw[] = "<in xmlns:p=\"urn:p\" p:x=\"1\"></in>";
+    char *place = raw;
+    element(ctx, "a:root", [&](soap *c) {
+        EXPECT_EQ(soap_literal_write(c, "b:literal", &place, nullptr), 0);
+        EXPECT_EQ(soap_element_open(c, "a:e", 0, nullptr), 0);
+        EXPECT_EQ(soap_attr_write(c, "xmlns:b", "urn:other"), 0);
+        EXPECT_EQ(soap_attr_write(c, "b:x", "1"), 0);
+        EXPECT_EQ(soap_element_attrs_close(c, nullptr), 0);
+        element(c, "b:inner");
+        EXPECT_EQ(soap_element_out_end(c, "a:e"), 0);
+        element(c, "b:outer");
+        EXPECT_EQ(soap_attr_set(c, "xmlns:_1", "urn:generated", 1), 0);
+        EXPECT_EQ(soap_attr_set(c, "_1:x", "2", 1), 0);
+        element(c, "a:generated");
+    });
+}
+
+static void types_and_arrays(soap *ctx)
+{
+    element(ctx, "SOAP-ENV:Envelope", [](soap *c) {
+        EXPECT_EQ(soap_element_out_begin(c, "a:typed", 3, "xsd:int"), 0);
+        EXPECT_EQ(soap_element_out_end(c, "a:typed"), 0);
+        EXPECT_EQ(soap_array_open(c, "a:list", 0, "b:item[2]", nullptr), 0);
+        EXPECT_EQ(soap_element_out_end(c, "a:list"), 0);
+        EXPECT_EQ(soap_prefix_use(c, "xsd:value"), 0); // ahead of an element whose text is a name
+        element(c, "a:name");
+        element(c, "xsd:next");
+        EXPECT_EQ(soap_result_out(c, "b:return"), 0);
+    });
+}
+
+TEST(xml_write, canonical_output_is_a_fixed_point_of_canonicalisation)
+{
+    if (!has_xmllint())
+        GTEST_SKIP() << "xmllint is not installed";
+    static const struct {
+        const char *rule;
+        void (*write)(soap *);
+        std::int16_t version;
+        bool is_exclusive; // names in values keep prefixes declared that the exclusive form drops
+    } cases[] = {
+        {"namespaces where used", namespaces_where_used, 1, true},
+        {"attributes in order", attributes_in_order, 1, true},
+        {"prefixes redefined", prefixes_redefined, 1, true},
+        {"types and arrays", types_and_arrays, 1, false},
+        {"arrays of 1.2", types_and_arrays, 2, false},
+        {"envelope", envelope, 1, true},
+    };
+    for (const auto &c : cases) {
+        SCOPED_TRACE(c.rule);
+        std::string bytes = document(MODE_CANONICAL, c.write, c.version);
+        if (bytes.ends_with("\r\n"))
+            bytes.resize(bytes.size() - 2); // behind the document element
+        EXPECT_EQ(bytes, canonical_form(bytes, "--c14n"));
+        if (c.is_exclusive) {
+            EXPECT_EQ(bytes, canonical_form(bytes, "--exc-c14n"));
+        }
+        // The plain form means the same.
+        if (c.is_exclusive) {
+            EXPECT_EQ(canonical_form(document(0, c.write, c.version), "--exc-c14n"),
+                      canonical_form(document(MODE_CANONICAL, c.write, c.version), "--exc-c14n"));
+        }
+    }
+}
+
+TEST(xml_write, canonical_output_has_these_bytes)
+{
+    EXPECT_EQ(document(MODE_CANONICAL, namespaces_where_used),
+              "<SOAP-ENV:Envelope xmlns:SOAP-ENV=\"http://schemas.xmlsoap.org/soap/envelope/\">"
+              "<a:one xmlns:a=\"urn:a\"><b:two xmlns:b=\"urn:b\">\t\n&#xD;&lt;&gt;&amp;\"\xC3\xA9</b:two>"
+              "<b:two xmlns:b=\"urn:b\"></b:two><a:three></a:three><none></none></a:one>"
+              "<b:again xmlns:b=\"urn:b\"></b:again></SOAP-ENV:Envelope>");
+}
+
+TEST(xml_write, canonical_lists_include_and_exclude_prefixes)
+{
+    writer w(MODE_CANONICAL);
+    const auto write = [](soap *ctx) { element(ctx, "a:r", [](soap *c) { element(c, "b:e"); }); };
+    w.ctx->canonical_include = "xsd b";
+    EXPECT_EQ(written(w, start::document, write),
+              "<a:r xmlns:a=\"urn:a\" xmlns:b=\"urn:b\""
+              " xmlns:xsd=\"http://www.w3.org/2001/XMLSchema\"><b:e></b:e></a:r>");
+    w.ctx->canonical_include = nullptr;
+    w.ctx->canonical_exclude = " b: SOAP-ENV";
+    EXPECT_EQ(written(w, start::document, write), "<a:r xmlns:a=\"urn:a\"><b:e></b:e></a:r>");
+}
+
+// ---------------------------------------------------------------------------------------------
+// Failures.
+
+TEST(xml_write, every_refused_allocation_is_error_20_or_done_without)
+{
+    for (const std::uint32_t mode : {0U, MODE_CANONICAL, MODE_DEFAULT_NAMESPACE}) {
+        std::size_t failures = 0;
+        bool was_refused = true;
+        for (std::size_t nth = 1; was_refused; ++nth) {
+            writer w(mode);
+            soap *ctx = w.ctx.get();
+            ctx->mode = mode | MODE_COUNTING;
+            int result = 0;
+            {
+                const failing_malloc::scope armed(nth);
+                result = soap_attr_set(ctx, "a:x", "1", 1);
+                result = result ? result : soap_element_out_begin(ctx, "a:root", 1, "xsd:int");
+                result = result ? result : soap_element_out_end(ctx, "a:root");
+                was_refused = armed.refused() > 0;
+            }
+            if (result != 0) {
+                EXPECT_EQ(result, SOAP_OUT_OF_MEMORY);
+                ++failures;
+            }
+        }
+        EXPECT_GE(failures, mode == MODE_CANONICAL ? 4U : 2U);
+    }
+}
