@@ -1,0 +1,74 @@
+// refill_fuzz.cpp - chunks and compression: bytes through every framing, and any bytes as a framed body.
+//
+// An even first byte sends the rest through a framing and reads it back, which must give the same bytes. An
+// odd one takes the rest for what a peer sent behind a head that announces chunks or compression.
+#include <cstdint>
+#include <cstdlib>
+#include <string>
+
+#include <zuv_client_pro/soap_io.h>
+
+#include "support/memory_wire.h"
+
+namespace {
+
+std::string head_of(unsigned choice)
+{
+    std::string head = "HTTP/1.1 200 OK\r\nContent-Type: text/plain\r\n";
+    if (choice & 1)
+        head += "Transfer-Encoding: chunked\r\n";
+    if (choice & 2)
+        head += choice & 4 ? "Content-Encoding: gzip\r\n" : "Content-Encoding: deflate\r\n";
+    return head + "\r\n";
+}
+
+void read_hostile(unsigned choice, const std::string &body)
+{
+    memory_wire wire;
+    wire.receive(head_of(choice) + body);
+    const std::size_t piece = 1U + choice * 7;
+    wire.piece = [piece](std::size_t) { return piece; };
+    soap_reset_call(&wire);
+    if (soap_receive_begin(&wire) == 0) {
+        wire.read_all();
+        soap_receive_finish(&wire);
+    }
+}
+
+void round_trip(unsigned choice, const std::string &body)
+{
+    static const std::uint32_t framings[] = {MODE_BUFFERED, MODE_STORE, MODE_CHUNKED, MODE_DIRECT};
+    memory_wire wire(0, framings[choice & 3] | MODE_BARE_XML | (choice & 4 ? MODE_DEFLATE : 0));
+    wire.zlib_out = choice & 8 ? 2 : 1;
+    soap_reset_call(&wire);
+    if (soap_send_begin(&wire) || soap_send_bytes(&wire, body.data(), body.size()) || soap_send_finish(&wire))
+        std::abort();
+    const std::string sent = wire.sent();
+    memory_wire back;
+    std::string head = "HTTP/1.1 200 OK\r\nContent-Type: text/plain\r\n";
+    if ((choice & 3) == 2)
+        head += "Transfer-Encoding: chunked\r\n";
+    if (choice & 4)
+        head += choice & 8 ? "Content-Encoding: gzip\r\n" : "Content-Encoding: deflate\r\n";
+    back.receive(head + "\r\n" + sent);
+    soap_reset_call(&back);
+    const int begun = soap_receive_begin(&back);
+    if (body.empty())
+        return;
+    if (begun != 0 || back.read_all() != body || soap_receive_finish(&back) != 0)
+        std::abort();
+}
+
+} // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size)
+{
+    if (size < 1)
+        return 0;
+    const std::string body(reinterpret_cast<const char *>(data + 1), size - 1);
+    if (data[0] & 1)
+        read_hostile(data[0] >> 1, body);
+    else
+        round_trip(data[0] >> 1, body);
+    return 0;
+}
