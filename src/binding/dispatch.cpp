@@ -37,10 +37,11 @@ void *read_chars(soap *ctx, const type_entry &entry, int type)
     return place ? *place : nullptr;
 }
 
-void *read_held_pointer(soap *ctx, bool (*read)(soap *, const char *, void **))
+// The object itself is what a reference fills late: no pointer to it may be waiting when this returns.
+void *read_text(soap *ctx)
 {
-    void *object = nullptr;
-    return read(ctx, nullptr, &object) ? object : nullptr;
+    auto *text = static_cast<std::string *>(soap_instantiate(ctx, TEXT_ID, nullptr, nullptr, nullptr));
+    return text && read_text_object(ctx, nullptr, text) ? text : nullptr;
 }
 
 void *read_vector(soap *ctx, const type_entry &entry, int type)
@@ -74,10 +75,10 @@ void *read_pointer(soap *ctx, const type_entry &entry)
     return place;
 }
 
-void *read_code(soap *ctx, const type_entry &entry)
+void *read_code(soap *ctx, const type_entry &entry, int type)
 {
-    void *code = nullptr;
-    return read_code_pointer(ctx, nullptr, &code, *entry.names) ? code : nullptr;
+    auto *code = static_cast<std::int32_t *>(soap_instantiate(ctx, type, nullptr, nullptr, nullptr));
+    return code && read_code_value(ctx, nullptr, code, *entry.names) ? code : nullptr;
 }
 
 } // namespace
@@ -91,11 +92,11 @@ void *read_by_type(soap *ctx, int type)
     case type_kind::chars:
         return read_chars(ctx, *entry, type);
     case type_kind::text:
-        return read_held_pointer(ctx, &read_text_pointer);
+        return read_text(ctx);
     case type_kind::simple:
         return entry->simple->in(ctx, nullptr, nullptr, entry->xml_name);
     case type_kind::enumeration:
-        return read_code(ctx, *entry);
+        return read_code(ctx, *entry, type);
     case type_kind::object:
         return class_in(ctx, *entry->ops, nullptr, nullptr);
     case type_kind::text_vector:

@@ -26,6 +26,24 @@ bool ends(soap *ctx, const char *tag, bool body)
     return !body || soap_element_in_end(ctx, tag) == 0;
 }
 
+int delete_text(soap_instance *instance)
+{
+    delete static_cast<std::string *>(instance->object);
+    return 0;
+}
+
+// A new text of the context. Null with error 20.
+std::string *new_text(soap *ctx)
+{
+    soap_instance *instance = soap_instance_register(ctx, nullptr, TEXT_TYPE_ID, -1, delete_text);
+    auto *text = instance ? new (std::nothrow) std::string : nullptr;
+    if (!text)
+        ctx->error = SOAP_OUT_OF_MEMORY;
+    else
+        instance->object = text;
+    return text;
+}
+
 bool is_reference(const soap *ctx)
 {
     return ctx->element_href[0] == '#';
@@ -116,6 +134,12 @@ bool refers_item(soap *ctx, const char *tag, void *vector, std::size_t index, in
            ends(ctx, tag, body);
 }
 
+// Copy hook of a text that a reference late in the message fills.
+void copy_text_late(soap *ctx, int, int, void *place, std::size_t, const void *source, std::size_t)
+{
+    copy_text(ctx, *static_cast<std::string *>(place), *static_cast<const std::string *>(source));
+}
+
 } // namespace
 
 bool out_of_memory(soap *ctx)
@@ -151,7 +175,7 @@ bool read_text_pointer(soap *ctx, const char *tag, void **place)
     if (ctx->null_flag || is_reference(ctx))
         return refers_pointer(ctx, tag, place, TEXT_TYPE_ID, sizeof(std::string));
     const bool body = ctx->has_body != 0;
-    auto *text = static_cast<std::string *>(soap_instantiate(ctx, TEXT_TYPE_ID, nullptr, nullptr, nullptr));
+    std::string *text = new_text(ctx);
     if (!text || !registers(ctx, text, TEXT_TYPE_ID, sizeof(std::string)))
         return false;
     if (body && !read_text_content(ctx, *text))
@@ -171,6 +195,21 @@ bool read_text_value(soap *ctx, const char *tag, std::string &value)
     return ends(ctx, tag, body);
 }
 
+bool read_text_object(soap *ctx, const char *tag, std::string *text)
+{
+    if (soap_element_in_begin(ctx, tag, 1, nullptr) || !registers(ctx, text, TEXT_TYPE_ID, sizeof *text))
+        return false;
+    const bool body = ctx->has_body != 0;
+    if (is_reference(ctx)) {
+        return soap_object_forward(ctx, ctx->element_href, text, 0, TEXT_TYPE_ID, 0, sizeof *text, 0,
+                                   copy_text_late) &&
+               ends(ctx, tag, body);
+    }
+    if (body && !ctx->null_flag && !read_text_content(ctx, *text))
+        return false;
+    return ends(ctx, tag, body);
+}
+
 bool read_vector_item_text(soap *ctx, const char *tag, std::vector<std::string> &vector, int vector_type)
 {
     if (soap_element_in_begin(ctx, tag, 1, nullptr))
@@ -183,7 +222,7 @@ bool read_vector_item_text(soap *ctx, const char *tag, std::vector<std::string> 
     const bool body = ctx->has_body != 0;
     std::string *shared = nullptr; // an item with an id needs a place that stays: the vector moves its items
     if (ctx->element_id[0]) {
-        shared = static_cast<std::string *>(soap_instantiate(ctx, TEXT_TYPE_ID, nullptr, nullptr, nullptr));
+        shared = new_text(ctx);
         if (!shared || !registers(ctx, shared, TEXT_TYPE_ID, sizeof(std::string)))
             return false;
     }

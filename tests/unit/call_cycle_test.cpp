@@ -206,6 +206,16 @@ TEST_F(CallCycle, skips_what_follows_the_response_in_both_versions)
     }
 }
 
+TEST_F(CallCycle, a_reference_behind_the_response_leaves_no_place_waiting_on_the_stack)
+{
+    for (const char *where : {"#t", "#nobody"}) {
+        const int error = get("<p:getResponse><p:thisURI href=\"" + std::string(where) +
+                              "\"/><p:thisURI id=\"t\">urn:1</p:thisURI></p:getResponse><p:thisURI href=\"" +
+                              where + "\"/><p:state href=\"" + where + "\"/>");
+        EXPECT_EQ(where == std::string("#t") ? 0 : SOAP_MISSING_ID, error);
+    }
+}
+
 TEST_F(CallCycle, sends_a_received_header_back_until_told_otherwise)
 {
     const std::string header =
