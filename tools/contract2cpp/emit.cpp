@@ -23,6 +23,7 @@ std::vector<emitted_file> emit_contract(const contract_model &model, const std::
         files.push_back(emit_law_header(service));
         add(emit_class_units(model, service));
     }
+    files.push_back(emit_class_list(model));
     files.push_back(emit_registry_tables(model));
     add(emit_namespace_table(model, authority));
     for (const port &port : model.ports)

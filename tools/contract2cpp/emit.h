@@ -27,6 +27,7 @@ emitted_file emit_type_ids(const contract_model &model);
 emitted_file emit_service_header(const service_namespace &service);
 emitted_file emit_law_header(const service_namespace &service);
 std::vector<emitted_file> emit_class_units(const contract_model &model, const service_namespace &service);
+emitted_file emit_class_list(const contract_model &model);
 emitted_file emit_registry_tables(const contract_model &model);
 std::vector<emitted_file> emit_namespace_table(const contract_model &model, const std::string &authority);
 std::vector<emitted_file> emit_port(const port &port);

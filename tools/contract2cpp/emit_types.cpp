@@ -119,6 +119,21 @@ emitted_file emit_type_ids(const contract_model &model)
     return {"include/zuv_client_pro/type_ids.h", text + "};\n"};
 }
 
+emitted_file emit_class_list(const contract_model &model)
+{
+    std::string text = opening("class_list.h", "type_ids.txt", "Every class of the contract, by namespace.");
+    text += "#pragma once\n\n";
+    for (const service_namespace &service : model.services)
+        text += "#include \"law_" + service.prefix + ".h\"\n";
+    for (const service_namespace &service : model.services) {
+        text += "\n#define CLASSES_OF_" + service.prefix + "(X)";
+        for (const data_class &type : service.classes)
+            text += " \\\n    X(" + type.name + ")";
+        text += "\n";
+    }
+    return {"src/class_list.h", text};
+}
+
 emitted_file emit_registry_tables(const contract_model &model)
 {
     std::string text = opening("registry_tables.cpp", "type_ids.txt", "");
