@@ -13,6 +13,7 @@
 #include "binding/member_read.h"
 #include "binding/registry.h"
 #include "codec/tag_view.h"
+#include "codec/xml_scan.h"
 
 namespace binding {
 
@@ -89,6 +90,22 @@ namespace {
 
 enum class step { consumed, unknown, failed };
 
+bool strict(const soap *ctx)
+{
+    return (ctx->mode & MODE_STRICT) != 0;
+}
+
+// The tag as the member's reader is to ask for it: not at all (null) if its namespace is the member's, its
+// local name being so already. Strict mode has the end tag compared too.
+const char *asked_tag(const soap *ctx, const tag_view &held, std::string_view tag, std::string_view local)
+{
+    const std::size_t prefix = tag.size() - local.size();
+    if (prefix == 0 || held.row < 0 || strict(ctx) ||
+        !xml_row_has_prefix(ctx, held.row, tag.data(), prefix - 1))
+        return tag.data();
+    return nullptr;
+}
+
 // Gives the held element to the member that it names. The members with its local name are tried in order.
 step take_member(soap *ctx, const member_table &members, void *object, std::uint64_t &spent)
 {
@@ -96,13 +113,14 @@ step take_member(soap *ctx, const member_table &members, void *object, std::uint
     std::uint32_t slot = tag_local_hash(tag.local, tag.local_length) & members.slot_mask;
     for (; members.slots[slot] != 0; slot = (slot + 1) & members.slot_mask) {
         std::size_t index = members.slots[slot] - 1U;
-        if (members.entries[index].local != std::string_view(tag.local, tag.local_length))
+        const std::string_view local = members.entries[index].local;
+        if (local.size() != tag.local_length || !same_name(local.data(), tag.local, local.size()))
             continue;
         for (;;) {
             const member_entry &entry = members.entries[index];
             const std::uint64_t bit = std::uint64_t{1} << index;
             if (!(spent & bit)) {
-                if (entry.read(ctx, entry.tag.data(), object)) {
+                if (entry.read(ctx, asked_tag(ctx, tag, entry.tag, entry.local), object)) {
                     if (entry.single)
                         spent |= bit;
                     return step::consumed;
@@ -138,11 +156,6 @@ bool read_elements(soap *ctx, const member_table &members, void *object, std::ui
             return true;
         }
     }
-}
-
-bool strict(const soap *ctx)
-{
-    return (ctx->mode & MODE_STRICT) != 0;
 }
 
 bool lacks(const class_ops &ops, const void *object, std::uint64_t spent)

@@ -4,6 +4,7 @@
 #include "binding/member_read.h"
 
 #include <cstring>
+#include <string_view>
 
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_memory.h>
@@ -33,15 +34,30 @@ int delete_text(soap_instance *instance)
 }
 
 // A new text of the context. Null with error 20.
-std::string *new_text(soap *ctx)
+std::string *new_text(soap *ctx, std::string_view content = {})
 {
     soap_instance *instance = soap_instance_register(ctx, nullptr, TEXT_TYPE_ID, -1, delete_text);
-    auto *text = instance ? new (std::nothrow) std::string : nullptr;
-    if (!text)
-        ctx->error = SOAP_OUT_OF_MEMORY;
-    else
+    if (!instance)
+        return nullptr;
+    try {
+        auto *text = new std::string(content);
         instance->object = text;
-    return text;
+        return text;
+    } catch (const std::bad_alloc &) {
+        out_of_memory(ctx);
+        return nullptr;
+    }
+}
+
+// The text up to the end tag. It lives until the next read.
+bool read_characters(soap *ctx, std::string_view &content)
+{
+    const char *text = nullptr;
+    std::size_t length = 0;
+    if (!xml_text_in_place(ctx, &text, &length))
+        text = soap_text_read(ctx, &length);
+    content = {text, length};
+    return text != nullptr;
 }
 
 bool is_reference(const soap *ctx)
@@ -152,15 +168,11 @@ bool out_of_memory(soap *ctx)
 
 bool read_text_content(soap *ctx, std::string &text)
 {
-    const char *bytes = nullptr;
-    std::size_t length = 0;
-    if (!xml_text_in_place(ctx, &bytes, &length)) {
-        bytes = soap_text_read(ctx, &length);
-        if (!bytes)
-            return false;
-    }
+    std::string_view content;
+    if (!read_characters(ctx, content))
+        return false;
     try {
-        text.assign(bytes, length);
+        text.assign(content);
     } catch (const std::bad_alloc &) {
         return out_of_memory(ctx);
     }
@@ -175,10 +187,11 @@ bool read_text_pointer(soap *ctx, const char *tag, void **place)
     if (ctx->null_flag || is_reference(ctx))
         return refers_pointer(ctx, tag, place, TEXT_TYPE_ID, sizeof(std::string));
     const bool body = ctx->has_body != 0;
-    std::string *text = new_text(ctx);
-    if (!text || !registers(ctx, text, TEXT_TYPE_ID, sizeof(std::string)))
+    std::string_view content;
+    if (body && !read_characters(ctx, content))
         return false;
-    if (body && !read_text_content(ctx, *text))
+    std::string *text = new_text(ctx, content);
+    if (!text || !registers(ctx, text, TEXT_TYPE_ID, sizeof(std::string)))
         return false;
     *place = text;
     return ends(ctx, tag, body);

@@ -17,6 +17,12 @@ namespace {
 
 constexpr int TEXT_TYPE_ID = 8; // all texts held by pointer are of one type to the identity tables
 
+// The message will have neither ids nor references, so that a shared value is written out each time.
+bool is_tree(const soap *ctx)
+{
+    return ctx->encoding_style == nullptr && ((ctx->mode | ctx->output_mode) & SOAP_XML_GRAPH) == 0;
+}
+
 // An element with character data alone.
 int write_characters(soap *ctx, std::string_view tag, int id, std::string_view text)
 {
@@ -94,7 +100,7 @@ void mark_text(soap *ctx, const std::string *text)
 
 void mark_plain(soap *ctx, const void *value, int type_id)
 {
-    if (value)
+    if (value && !is_tree(ctx))
         soap_mark_pointer(ctx, value, type_id);
 }
 

@@ -30,10 +30,15 @@ template <class V> const void *vector_item(const void *vector, std::size_t index
     else
         return &items[index];
 }
+// Bytes that an allocation takes at least: a vector's first items may as well have them all.
+constexpr std::size_t SMALLEST_ALLOCATION = 24;
+
 template <class V> bool vector_append(void *vector, const void *item)
 {
     auto &items = *static_cast<std::vector<V> *>(vector);
     try {
+        if (items.capacity() == 0 && sizeof(V) < SMALLEST_ALLOCATION)
+            items.reserve(SMALLEST_ALLOCATION / sizeof(V));
         if constexpr (std::is_pointer_v<V>)
             items.push_back(static_cast<V>(const_cast<void *>(item)));
         else if (item)

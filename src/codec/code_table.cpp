@@ -13,7 +13,7 @@ namespace {
 const soap_code_row *row_of(const soap_code_row *table, std::string_view name)
 {
     for (; table->name != nullptr; table++)
-        if (name == table->name)
+        if (std::strncmp(table->name, name.data(), name.size()) == 0 && table->name[name.size()] == '\0')
             return table;
     return nullptr;
 }

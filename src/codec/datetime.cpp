@@ -123,10 +123,12 @@ bool parse(const char *text, std::time_t *target)
 {
     std::int64_t fields[FIELDS] = {};
     text = scan_fields(text, fields);
+    if (text == nullptr || !fits_int(fields[0]) || !fits_int(fields[1]))
+        return false;
     // Year 1 stands for "no date" with senders that count from it; it is read as the first year of the count.
     const std::int64_t year = fields[0] == 1 ? 70 : fields[0] - 1900;
     const std::int64_t month = fields[1] - 1;
-    if (text == nullptr || !fits_int(year) || !fits_int(month))
+    if (!fits_int(year) || !fits_int(month))
         return false;
     std::tm time = {};
     time.tm_year = static_cast<int>(year);

@@ -13,6 +13,11 @@ constexpr std::size_t PREFIX_CHAINS = 256;      // power of two
 constexpr std::size_t SPARE_PREFIXES_MAX = 256; // records kept for reuse
 constexpr std::size_t SPARE_PREFIX_SIZE = 1024; // bytes of text; larger records are freed at once
 
+// Bytes in a row's own texts.
+struct namespace_lengths {
+    std::size_t prefix, uri;
+};
+
 struct soap_namespace_scope {
     soap_prefix *chains[PREFIX_CHAINS]; // innermost first
     std::uint32_t in_scope;             // records in the chains, which are those of soap::prefix_list
@@ -20,9 +25,10 @@ struct soap_namespace_scope {
     std::uint32_t hash_factor;          // odd, not known to a peer
     soap_prefix *spare;                 // linked by next
     std::size_t spare_count;
+    std::uint8_t tag_prefix; // the reader's last tag: place of its prefix in soap::prefix_cache
 
-    const soap_namespace *rows; // copy of the rows described, without received URIs; owned with uri_lengths
-    const std::size_t *uri_lengths; // bytes in each row's URI
+    const soap_namespace *rows;       // copy of the rows described, without received URIs; owned with lengths
+    const namespace_lengths *lengths; // of each row
     std::size_t row_count;
     char *declarations;            // the rows as attributes, in table order; null until first use
     std::size_t *declaration_ends; // bytes of `declarations` up to and with each row; in the same allocation
@@ -31,6 +37,14 @@ struct soap_namespace_scope {
 
 // The context's record, made now if need be. Null if memory runs out, with error 20.
 soap_namespace_scope *namespace_scope_of(soap *ctx);
+
+// True if the row has a prefix of this length; false too when that isn't known.
+inline bool namespace_prefix_has_length(const soap_namespace_scope *scope, const soap_namespace &row,
+                                        std::size_t index, std::size_t length)
+{
+    return scope && index < scope->row_count && scope->rows[index].prefix == row.prefix &&
+           scope->lengths[index].prefix == length;
+}
 
 // Bytes in a row's own URI.
 std::size_t namespace_uri_length(const soap *ctx, std::size_t row);

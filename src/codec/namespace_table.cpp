@@ -37,12 +37,12 @@ void forget_rows(soap *ctx, soap_namespace_scope *scope)
     SOAP_FREE(ctx, scope->declarations);
     SOAP_FREE(ctx, const_cast<soap_namespace *>(scope->rows));
     scope->rows = nullptr;
-    scope->uri_lengths = nullptr;
+    scope->lengths = nullptr;
     scope->row_count = 0;
     scope->declarations = nullptr;
 }
 
-// Measures the table's URIs unless they are the ones measured last time.
+// Measures the table's texts unless they are the ones measured last time.
 int describe_rows(soap *ctx, const soap_namespace *table, std::size_t count)
 {
     soap_namespace_scope *scope = namespace_scope_of(ctx);
@@ -51,18 +51,18 @@ int describe_rows(soap *ctx, const soap_namespace *table, std::size_t count)
     if (scope->rows && scope->row_count == count && std::equal(table, table + count, scope->rows, same_texts))
         return 0;
     forget_rows(ctx, scope);
-    void *place = SOAP_MALLOC(ctx, (count + 1) * (sizeof(soap_namespace) + sizeof(std::size_t)));
+    void *place = SOAP_MALLOC(ctx, (count + 1) * (sizeof(soap_namespace) + sizeof(namespace_lengths)));
     if (!place)
         return ctx->error = SOAP_OUT_OF_MEMORY;
     auto *rows = static_cast<soap_namespace *>(place);
-    auto *lengths = reinterpret_cast<std::size_t *>(rows + count + 1);
+    auto *lengths = reinterpret_cast<namespace_lengths *>(rows + count + 1);
     for (std::size_t i = 0; i < count; ++i) {
         rows[i] = table[i];
         rows[i].received = nullptr;
-        lengths[i] = table[i].uri ? std::strlen(table[i].uri) : 0;
+        lengths[i] = {std::strlen(table[i].prefix), table[i].uri ? std::strlen(table[i].uri) : 0};
     }
     scope->rows = rows;
-    scope->uri_lengths = lengths;
+    scope->lengths = lengths;
     scope->row_count = count;
     return 0;
 }
@@ -84,7 +84,7 @@ bool compose_declarations(soap *ctx, soap_namespace_scope *scope)
     std::size_t size = scope->row_count * sizeof(std::size_t);
     for (std::size_t i = 0; i < scope->row_count; ++i) {
         if (is_declared(scope->rows[i]))
-            size += FRAME + std::strlen(scope->rows[i].prefix) + scope->uri_lengths[i];
+            size += FRAME + std::strlen(scope->rows[i].prefix) + scope->lengths[i].uri;
     }
     auto *ends = static_cast<std::size_t *>(SOAP_MALLOC(ctx, size + 1));
     if (!ends)
@@ -100,10 +100,10 @@ bool compose_declarations(soap *ctx, soap_namespace_scope *scope)
             end = append(end, " xmlns:", 7);
             end = append(end, row.prefix, std::strlen(row.prefix));
             end = append(end, "=\"", 2);
-            end = append(end, row.uri, scope->uri_lengths[i]);
+            end = append(end, row.uri, scope->lengths[i].uri);
             end = append(end, "\"", 1);
             const auto is_plain = [](char c) { return c > ' ' && !std::strchr("\"&<", c); };
-            if (!std::all_of(row.uri, row.uri + scope->uri_lengths[i], is_plain))
+            if (!std::all_of(row.uri, row.uri + scope->lengths[i].uri, is_plain))
                 scope->declarations_plain = false;
         }
         ends[i] = static_cast<std::size_t>(end - begin);
@@ -135,7 +135,7 @@ std::size_t namespace_uri_length(const soap *ctx, std::size_t row)
 {
     const soap_namespace_scope *scope = ctx->namespace_scope;
     if (scope && row < scope->row_count && scope->rows[row].uri == ctx->local_namespaces[row].uri)
-        return scope->uri_lengths[row];
+        return scope->lengths[row].uri;
     return std::strlen(ctx->local_namespaces[row].uri);
 }
 

@@ -8,7 +8,9 @@
 #include <zuv_client_pro/soap_error.h>
 
 #include "codec/namespace.h"
+#include "codec/namespace_scope.h"
 #include "codec/tag_view.h"
+#include "codec/xml_scan.h"
 
 namespace {
 
@@ -36,14 +38,40 @@ const soap_namespace *table_row(const soap *ctx, int row)
     return table != nullptr ? table + row : nullptr;
 }
 
+std::size_t cache_place(const char *prefix, std::size_t length)
+{
+    return length == 0 ? 0 : (static_cast<unsigned char>(prefix[length - 1]) + length) & (CACHE_SIZE - 1);
+}
+
+// Neighbouring tags mostly have one prefix: that of the tag resolved last is tried first. True: it is the
+// tag's.
+bool resolve_by_last_prefix(soap *ctx)
+{
+    if (ctx->namespace_scope == nullptr || ctx->prefix_cache_list != ctx->prefix_list)
+        return false;
+    const unsigned place = ctx->namespace_scope->tag_prefix;
+    const soap_prefix_cache &last = ctx->prefix_cache[place];
+    if ((ctx->prefix_cache_valid & 1u << place) == 0 || last.length >= ctx->tag_length ||
+        ctx->tag[last.length] != ':' || !same_name(ctx->tag, last.text, last.length))
+        return false;
+    ctx->tag_local = static_cast<std::uint16_t>(last.length + 1u);
+    ctx->tag_row = last.row;
+    ctx->tag_resolved = true;
+    return true;
+}
+
 void resolve_tag(soap *ctx)
 {
+    if (resolve_by_last_prefix(ctx))
+        return;
     const void *colon = std::memchr(ctx->tag, ':', ctx->tag_length);
     const std::size_t prefix_length =
         colon != nullptr ? static_cast<std::size_t>(static_cast<const char *>(colon) - ctx->tag) : 0;
     ctx->tag_local = static_cast<std::uint16_t>(colon != nullptr ? prefix_length + 1 : 0);
     ctx->tag_row = static_cast<std::int16_t>(xml_prefix_row(ctx, ctx->tag, prefix_length));
     ctx->tag_resolved = true;
+    if (ctx->namespace_scope != nullptr)
+        ctx->namespace_scope->tag_prefix = static_cast<std::uint8_t>(cache_place(ctx->tag, prefix_length));
 }
 
 // The parts of a name, from what is known of the held tag where it is that one.
@@ -72,12 +100,11 @@ int xml_prefix_row(soap *ctx, const char *prefix, std::size_t length)
         ctx->prefix_cache_list = ctx->prefix_list;
         ctx->prefix_cache_valid = 0;
     }
-    const std::size_t place =
-        length == 0 ? 0 : (static_cast<unsigned char>(prefix[length - 1]) + length) & (CACHE_SIZE - 1);
+    const std::size_t place = cache_place(prefix, length);
     soap_prefix_cache &entry = ctx->prefix_cache[place];
     const auto bit = static_cast<std::uint8_t>(1u << place);
     if ((ctx->prefix_cache_valid & bit) != 0 && entry.length == length &&
-        std::memcmp(entry.text, prefix, length) == 0)
+        same_name(entry.text, prefix, length))
         return entry.row;
     const int row = search_stack(ctx, prefix, length);
     if (length <= sizeof entry.text) {
@@ -94,6 +121,8 @@ bool xml_row_has_prefix(const soap *ctx, int row, const char *prefix, std::size_
     const soap_namespace *entry = table_row(ctx, row);
     if (entry == nullptr || entry->prefix == nullptr)
         return true;
+    if (namespace_prefix_has_length(ctx->namespace_scope, *entry, static_cast<std::size_t>(row), length))
+        return same_name(entry->prefix, prefix, length);
     if (std::strncmp(entry->prefix, prefix, length) != 0)
         return false;
     return entry->prefix[length] == '\0' || entry->prefix[length] == '_';

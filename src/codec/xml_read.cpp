@@ -194,6 +194,27 @@ int find_end_tag(soap *ctx, std::uint64_t depth)
     return xml_skip_content(ctx, depth);
 }
 
+// The end tag of an element without children comes next, whole, and repeats the name that `tag` still holds.
+// True: it was consumed.
+bool leaf_ends(soap *ctx)
+{
+    if (ctx->peeked != 0 || ctx->look_ahead != 0 || ctx->in_cdata != CDATA_OUTSIDE)
+        return false;
+    const char *here = input_here(ctx);
+    const std::size_t length = ctx->tag_length;
+    if (static_cast<std::size_t>(input_end(ctx) - here) < length + 3 || here[0] != '<' || here[1] != '/' ||
+        here[2 + length] != '>' || !same_name(here + 2, ctx->tag, length))
+        return false;
+    input_consume(ctx, here + length + 3);
+    return true;
+}
+
+void leave_element(soap *ctx)
+{
+    if (ctx->nesting_level != 0)
+        ctx->nesting_level--;
+}
+
 } // namespace
 
 int soap_element_head_read(soap *ctx)
@@ -223,6 +244,10 @@ int soap_element_head_read(soap *ctx)
 
 int soap_element_in_begin(soap *ctx, const char *tag, int nil_allowed, const char *type)
 {
+    if (tag == nullptr && ctx->peeked != 0 && ctx->tag[0] != '\0' && ctx->attributes_set == 0) {
+        ctx->peeked = 0; // any element, and no attribute has a say
+        return ctx->error = enter_element(ctx);
+    }
     const bool own_element = tag == nullptr || *tag != '-';
     if (soap_element_head_read(ctx) != 0) {
         if (ctx->error == SOAP_NO_TAG && !own_element)
@@ -249,6 +274,11 @@ int soap_element_in_end(soap *ctx, const char *tag)
 {
     if (tag != nullptr && *tag == '-')
         return 0;
+    const bool any_name = tag == nullptr || (ctx->mode & MODE_STRICT) == 0;
+    if (any_name && leaf_ends(ctx)) {
+        leave_element(ctx);
+        return ctx->error = 0;
+    }
     if (ctx->error == SOAP_NO_TAG)
         ctx->error = 0;
     const bool inside_held = ctx->peeked != 0 && ctx->tag[0] != '\0' && ctx->has_body != 0;
@@ -258,13 +288,12 @@ int soap_element_in_end(soap *ctx, const char *tag)
     const int error = read_end_tag_name(ctx);
     if (error != 0)
         return ctx->error = error;
-    if (tag != nullptr && (ctx->mode & MODE_STRICT) != 0) {
+    if (!any_name) {
         pop_prefixes(ctx);
         if (soap_tag_compare(ctx, ctx->tag, tag) != 0)
             return ctx->error = SOAP_SYNTAX_ERROR;
     }
-    if (ctx->nesting_level != 0)
-        ctx->nesting_level--;
+    leave_element(ctx);
     return ctx->error = 0;
 }
 

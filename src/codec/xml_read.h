@@ -8,6 +8,9 @@
 #include "codec/xml_scan.h"
 #include "codec/xml_text.h"
 
+// A name up to this many bytes is copied by one block of so many: cheaper than a copy of its exact length.
+constexpr std::size_t SHORT_NAME = 64;
+
 // Reads the attributes behind a tag's name up to the ">" or "/" that ends them, which stays unread: records
 // in the attribute table, declarations on the prefix stack. 0, -1, 5 or 20.
 int xml_attributes_read(soap *ctx);
@@ -27,6 +30,13 @@ template <class Stop> std::size_t xml_name_read(soap *ctx, char *name)
         const char *here = input_here(ctx);
         const char *stop = Stop::find(here, input_end(ctx));
         const auto found = static_cast<std::size_t>(stop - here);
+        if (kept == 0 && found < SHORT_NAME &&
+            input_end(ctx) - here >= static_cast<std::ptrdiff_t>(SHORT_NAME)) {
+            std::memcpy(name, here, SHORT_NAME);
+            name[found] = '\0';
+            input_consume(ctx, stop);
+            return found;
+        }
         const std::size_t room = SOAP_TEXT_SIZE - 1 - kept;
         const std::size_t taken = found < room ? found : room;
         std::memcpy(name + kept, here, taken);

@@ -1,10 +1,12 @@
-// xml_scan.h - searches over a stretch of bytes, sixteen at a time where the processor can.
+// xml_scan.h - searches over a stretch of bytes, sixteen at a time where the processor can, and comparison of
+// names.
 //
-// Always: each returns the first byte of its class in [p, end), or end; nothing outside is read.
+// Always: a search returns the first byte of its class in [p, end), or end; nothing outside is read.
 #pragma once
 
 #include <cstddef>
 #include <cstdint>
+#include <cstring>
 
 #if defined(__SSE2__)
 #include <emmintrin.h>
@@ -47,6 +49,30 @@ private:
     }
 #endif
 };
+
+// True if `length` bytes are equal. Names are so short that a call of memcmp costs more than the comparison.
+inline bool same_name(const char *one, const char *other, std::size_t length)
+{
+    const auto same8 = [](const char *p, const char *q) {
+        std::uint64_t a, b;
+        std::memcpy(&a, p, sizeof a);
+        std::memcpy(&b, q, sizeof b);
+        return a == b;
+    };
+    if (length >= sizeof(std::uint64_t)) {
+        const std::size_t last = length - sizeof(std::uint64_t); // the last step may overlap the one before
+        for (std::size_t done = 0; done < last; done += sizeof(std::uint64_t)) {
+            if (!same8(one + done, other + done))
+                return false;
+        }
+        return same8(one + last, other + last);
+    }
+    for (std::size_t i = 0; i < length; ++i) {
+        if (one[i] != other[i])
+            return false;
+    }
+    return true;
+}
 
 using tag_name_stop = byte_class<true, false, '>', '/'>;
 using attribute_name_stop = byte_class<true, false, '>', '/', '='>;

@@ -111,6 +111,7 @@ static void free_all_blocks(soap *ctx)
     while (ctx->allocation_list != nullptr && check_canary(ctx, ctx->allocation_list) == SOAP_OK) {
         soap_block_trailer *trailer = ctx->allocation_list;
         ctx->allocation_list = trailer->next;
+        __builtin_prefetch(trailer->next); // blocks are scattered: the next one comes while this one goes
         free_block(ctx, trailer);
     }
     forget_managed_fields(ctx); // after a damaged block too: what they point to may be gone

@@ -13,6 +13,11 @@ char lower(char c)
     return c >= 'A' && c <= 'Z' ? static_cast<char>(c + ('a' - 'A')) : c;
 }
 
+bool same_letter(char one, char other)
+{
+    return one == other || lower(one) == lower(other);
+}
+
 bool at_end(const char *text)
 {
     return *text == '\0' || *text == '"';
@@ -32,7 +37,7 @@ int soap_tag_match(const char *text, const char *pattern)
             run_end = text;
             if (*pattern == '\0')
                 return 0;
-        } else if (*pattern == '-' || (*pattern != '\0' && lower(*text) == lower(*pattern))) {
+        } else if (*pattern == '-' || (*pattern != '\0' && same_letter(*text, *pattern))) {
             ++text;
             ++pattern;
         } else if (behind_star != nullptr) {

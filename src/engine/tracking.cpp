@@ -13,10 +13,9 @@
 
 static constexpr std::size_t LOAD_MAX = 1; // entries for each chain before the table doubles
 
-soap_memory_pools *memory_pools(soap *ctx)
+soap_memory_pools *memory_pools_make(soap *ctx)
 {
-    if (ctx->pools == nullptr)
-        ctx->pools = new (std::nothrow) soap_memory_pools;
+    ctx->pools = new (std::nothrow) soap_memory_pools;
     return ctx->pools;
 }
 
@@ -29,9 +28,12 @@ void track_table_clear(soap *ctx)
     ctx->pools = nullptr;
 }
 
+// Blocks of malloc stand at multiples of 16, so that only half of the first table's chains are used; in
+// larger tables all are. Neighbours stay neighbours, which the caches like.
 static soap_track_entry **chain_of(soap *ctx, const void *address)
 {
-    return &ctx->track_chains[(reinterpret_cast<std::uintptr_t>(address) >> 3) & ctx->track_chain_mask];
+    const int shift = ctx->track_chain_mask < SOAP_TRACK_HASH_SIZE ? 3 : 4;
+    return &ctx->track_chains[(reinterpret_cast<std::uintptr_t>(address) >> shift) & ctx->track_chain_mask];
 }
 
 static soap_track_entry *find_entry(soap *ctx, const void *address)

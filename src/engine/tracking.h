@@ -30,7 +30,11 @@ struct soap_memory_pools {
 };
 
 // The context's pools, made now if need be; null if memory runs out.
-soap_memory_pools *memory_pools(soap *ctx);
+soap_memory_pools *memory_pools_make(soap *ctx);
+inline soap_memory_pools *memory_pools(soap *ctx)
+{
+    return ctx->pools != nullptr ? ctx->pools : memory_pools_make(ctx);
+}
 
 // Sets the table to the one inside the context, with no entries.
 void track_table_clear(soap *ctx);
