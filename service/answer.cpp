@@ -1,0 +1,139 @@
+// answer.cpp - see answer.h.
+#include "answer.h"
+
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_http.h>
+#include <zuv_client_pro/soap_io.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_xml.h>
+
+namespace service {
+
+namespace {
+
+constexpr int OK = 200, BAD_REQUEST = 400, INTERNAL_ERROR = 500;
+
+// The Body's content.
+struct content {
+    int (*put)(soap *ctx, const content &self);
+    const operation *op = nullptr;
+    const void *response = nullptr;
+};
+
+int put_response(soap *ctx, const content &self)
+{
+    return self.op->write(ctx, self.response, self.op->response_element);
+}
+
+int put_fault(soap *ctx, const content &)
+{
+    return soap_fault_put(ctx);
+}
+
+int write_message(soap *ctx, const content &body)
+{
+    if (soap_envelope_out_begin(ctx) || soap_header_put(ctx) || soap_body_out_begin(ctx) ||
+        body.put(ctx, body) || soap_body_out_end(ctx) || soap_envelope_out_end(ctx))
+        return ctx->error;
+    return 0;
+}
+
+// What the request left in the context must not shape the answer.
+void forget_request_framing(soap *ctx)
+{
+    ctx->error = SOAP_OK;
+    ctx->encoding_style = nullptr;
+    ctx->mode &= ~(MODE_DIME | MODE_MIME | MODE_MTOM);
+    ctx->dime = {};
+    ctx->mime = {};
+}
+
+// The head, neither chunked nor compressed; that of a stored message is written when its size is known.
+int write_head(soap *ctx, std::uint64_t length)
+{
+    const std::uint32_t mode = ctx->mode;
+    if ((mode & MODE_IO_MASK) == MODE_STORE)
+        return 0;
+    ctx->mode = (mode & ~(MODE_IO_MASK | MODE_DEFLATE)) | MODE_BUFFERED;
+    if (ctx->on_response(ctx, ctx->status, length))
+        return ctx->error;
+    if ((mode & MODE_IO_MASK) == MODE_CHUNKED && soap_send_flush(ctx))
+        return ctx->error;
+    ctx->mode = mode;
+    return 0;
+}
+
+int send_message(soap *ctx, int http_status, const content &body)
+{
+    forget_request_framing(ctx);
+    ctx->status = http_status;
+    if (soap_count_begin(ctx))
+        return ctx->error;
+    if ((ctx->mode & MODE_COUNTING) && write_message(ctx, body))
+        return ctx->error;
+    if (soap_count_end(ctx))
+        return ctx->error;
+    const std::uint64_t length = soap_message_length(ctx);
+    if (soap_send_begin(ctx) || write_head(ctx, length) || write_message(ctx, body))
+        return ctx->error;
+    return soap_send_finish(ctx);
+}
+
+} // namespace
+
+int send_response(soap *ctx, const operation &op, const void *response)
+{
+    return send_message(ctx, OK, {put_response, &op, response});
+}
+
+int send_fault(soap *ctx, int http_status)
+{
+    return send_message(ctx, http_status, {put_fault});
+}
+
+int send_file(soap *ctx, const char *type, const std::string &bytes)
+{
+    forget_request_framing(ctx);
+    const std::uint32_t output_mode = ctx->output_mode;
+    ctx->output_mode = (output_mode & ~MODE_IO_MASK) | MODE_BUFFERED;
+    ctx->status = STATUS_FILE;
+    ctx->http_content = type;
+    int result = soap_send_begin(ctx);
+    if (result == 0)
+        result = ctx->on_response(ctx, bytes.empty() ? OK : STATUS_FILE, bytes.size());
+    if (result == 0)
+        result = soap_send_bytes(ctx, bytes.data(), bytes.size());
+    if (result == 0)
+        result = soap_send_finish(ctx);
+    ctx->output_mode = output_mode;
+    return ctx->error = result != 0 ? result : static_cast<int>(SOAP_STOP);
+}
+
+void settle_version(soap *ctx)
+{
+    if (ctx->soap_version != 0)
+        return;
+    soap_namespace_table_drop(ctx);
+    soap_namespace_table_copy(ctx); // takes the version of the table's own envelope namespace
+}
+
+int fault_from_refusal(soap *ctx, const refusal &refused)
+{
+    settle_version(ctx);
+    const bool is_clients = refused.is_clients();
+    ctx->fault = nullptr;
+    const char *const text = text_of(refused.fault->description).c_str();
+    if (is_clients)
+        soap_fault_sender(ctx, text, nullptr, SOAP_FAULT);
+    else
+        soap_fault_receiver(ctx, text, nullptr, SOAP_FAULT);
+    soap_fault_detail_field(ctx); // makes the detail record
+    if (ctx->fault == nullptr)
+        return INTERNAL_ERROR;
+    SOAP_ENV__Detail *const detail = ctx->soap_version == 1 ? ctx->fault->detail : ctx->fault->Detail;
+    if (detail != nullptr)
+        refused.place(*detail, refused.fault);
+    return is_clients && ctx->soap_version == 2 ? BAD_REQUEST : INTERNAL_ERROR;
+}
+
+} // namespace service

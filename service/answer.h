@@ -1,0 +1,32 @@
+// answer.h - messages on their way back: a response, a fault, a file.
+//
+// Always: results are 0 or the code that also stands in ctx->error. The connection is neither kept nor closed
+// here.
+#pragma once
+
+#include <string>
+
+#include <zuv_client_pro/soap.h>
+
+#include "faults.h"
+#include "port.h"
+
+namespace service {
+
+// Sends the response of an operation in the SOAP version of the request, with ctx->header as its header.
+int send_response(soap *ctx, const operation &op, const void *response);
+
+// Sends ctx->fault under an HTTP status, with ctx->header as its header.
+int send_fault(soap *ctx, int http_status);
+
+// Sends bytes of a media type as they are. SOAP_STOP: the request is dealt with.
+int send_file(soap *ctx, const char *type, const std::string &bytes);
+
+// Makes ctx->fault of a refusal: code, text and typed detail in the SOAP version of the request.
+// The HTTP status to send it under.
+int fault_from_refusal(soap *ctx, const refusal &refused);
+
+// The context can take a fault in some SOAP version: 1.1 if the request's isn't known.
+void settle_version(soap *ctx);
+
+} // namespace service

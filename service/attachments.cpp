@@ -1,0 +1,177 @@
+// attachments.cpp - see attachments.h.
+#include "attachments.h"
+
+#include <algorithm>
+
+#include <zuv_client_pro/protocolHTTP.h>
+
+#include "faults.h"
+#include "moment.h"
+
+namespace service {
+
+namespace {
+
+using state = protocol__AttachmentState;
+
+constexpr double ALL = 100; // per cent
+
+template <class T> bool admits(const std::vector<T> &wanted, std::initializer_list<T> offered)
+{
+    return wanted.empty() ||
+           std::find_first_of(wanted.begin(), wanted.end(), offered.begin(), offered.end()) != wanted.end();
+}
+
+bool admits_uri(const protocol__URITypePreference *wanted)
+{
+    return wanted == nullptr || *wanted == protocol__URITypePreference::direct ||
+           *wanted == protocol__URITypePreference::directIPv4 ||
+           *wanted == protocol__URITypePreference::respondentDecide;
+}
+
+protocol__Authentication authentication_of(const call &c)
+{
+    return c.config.user.empty() ? protocol__Authentication::anonymous : protocol__Authentication::private_;
+}
+
+// What a client must do at a data port, and what it may expect.
+template <class Exchange, class Request, class Response>
+protocol__TransportDetail *exchange_at(const call &c, const std::string &path)
+{
+    auto *const exchange = make<Exchange>(c.ctx);
+    exchange->request = make<Request>(c.ctx);
+    exchange->request->requestUri = make_text(c.ctx, path);
+    auto *const success = make<protocolHTTP__StatusCodeInformation>(c.ctx);
+    success->statusCode = make_value(c.ctx, 200);
+    success->interpretation = make_value(c.ctx, protocolHTTP__StatusCodeInterpretation::success);
+    success->directive = make_value(c.ctx, protocolHTTP__StatusCodeDirective::proceed);
+    exchange->response = make<Response>(c.ctx);
+    exchange->response->statusCodeInformation.push_back(success);
+    auto *const detail = make<protocol__ExchangeDetail>(c.ctx);
+    detail->exchange.push_back(exchange);
+    return detail;
+}
+
+bool holds_data(const protocol__Attachment &attachment)
+{
+    return attachment.data != nullptr || attachment.dataHandler != nullptr;
+}
+
+bool leads_to(const protocol__Attachment &attachment, const std::string &data_uri)
+{
+    return text_of(attachment.dataURI) == data_uri ||
+           std::any_of(attachment.dataPort.begin(), attachment.dataPort.end(),
+                       [&](const protocol__DataPort *port) {
+                           return port != nullptr && text_of(port->dataURI) == data_uri;
+                       });
+}
+
+protocol__Attachment &find_attachment(call &c, const attachments &held,
+                                      const protocol__AttachStatusRequest &report)
+{
+    const std::string &uri = text_of(report.attachmentURI), &data_uri = text_of(report.dataURI);
+    if (uri.empty() && data_uri.empty())
+        refuse<protocol__Client_x002eInsufficientInformation>(c.ctx,
+                                                              "The request does not name its attachment.");
+    for (protocol__Attachment *attachment : held)
+        if (attachment != nullptr &&
+            (uri.empty() ? leads_to(*attachment, data_uri) : text_of(attachment->thisURI) == uri))
+            return *attachment;
+    refuse_not_found(c.ctx, uri.empty() ? data_uri : uri);
+}
+
+bool reports_problem(const protocol__AttachStatusRequest &report)
+{
+    return report.problemEncountered != nullptr && *report.problemEncountered;
+}
+
+state state_after(const protocol__AttachStatusRequest &report)
+{
+    if (report.recommendedAttachmentState != nullptr)
+        return *report.recommendedAttachmentState;
+    if (reports_problem(report))
+        return state::error;
+    return report.percentComplete != nullptr && *report.percentComplete >= ALL ? state::complete
+                                                                               : state::pending;
+}
+
+} // namespace
+
+protocol__DataPort *make_data_port(const call &c, protocol__Direction direction, const std::string &name)
+{
+    auto *const port = make<protocol__DataPort>(c.ctx);
+    port->state = make_value(c.ctx, protocol__DataPortState::open);
+    const std::string path = std::string(DATA_PATH) + name;
+    port->dataURI = make_text(c.ctx, c.root + path);
+    port->dataURIMetaData = make<protocol__URIMetaData>(c.ctx);
+    port->dataURIMetaData->type = make_value(c.ctx, protocol__URIType::direct);
+    port->direction = make_value(c.ctx, direction);
+    port->transport = make_value(c.ctx, protocol__Transport::HTTP);
+    port->transportDetail.push_back(
+        direction == protocol__Direction::in
+            ? exchange_at<protocolHTTP__HttpPost, protocolHTTP__HttpPostRequest,
+                          protocolHTTP__HttpPostResponse>(c, path)
+            : exchange_at<protocolHTTP__HttpGet, protocolHTTP__HttpGetRequest, protocolHTTP__HttpGetResponse>(
+                  c, path));
+    return port;
+}
+
+protocol__Client_x002eDataPortIncompatibility *
+incompatibility(const call &c, const protocol__DataPortPreference *wish, protocol__Direction direction)
+{
+    if (wish == nullptr ||
+        (admits_uri(wish->dataURIType) && admits(wish->direction, {direction, protocol__Direction::inout}) &&
+         admits(wish->transport, {protocol__Transport::HTTP}) &&
+         admits(wish->authentication, {authentication_of(c)})))
+        return nullptr;
+    auto *const fault = make_fault<protocol__Client_x002eDataPortIncompatibility>(
+        c.ctx, "The service has no data port of the kind preferred.");
+    fault->direction = {direction};
+    fault->transport = {protocol__Transport::HTTP};
+    fault->authentication = {authentication_of(c)};
+    return fault;
+}
+
+void take_attachment(call &c, attachments &held, protocol__Attachment *given,
+                     const protocol__DataPortPreference *wish)
+{
+    if (given == nullptr)
+        refuse<protocol__Client_x002eInsufficientInformation>(c.ctx, "The request holds no attachment.");
+    const std::string name = fresh_uuid();
+    given->thisURI = make_text(c.ctx, "urn:zuv:attachment:" + name);
+    given->state = make_value(c.ctx, holds_data(*given) ? state::complete : state::pending);
+    given->dataPort.clear();
+    if (!holds_data(*given)) {
+        if (auto *const fault = incompatibility(c, wish, protocol__Direction::in))
+            refuse(fault);
+        c.documents.expect_data(name);
+        protocol__DataPort *const port = make_data_port(c, protocol__Direction::in, name);
+        port->attachmentURI = given->thisURI;
+        given->dataPort.push_back(port);
+    }
+    held.push_back(given);
+}
+
+void note_progress(call &c, const attachments &held, const protocol__AttachStatusRequest &report)
+{
+    protocol__Attachment &attachment = find_attachment(c, held, report);
+    attachment.state = make_value(c.ctx, state_after(report));
+    if (report.sizeTransferred != nullptr)
+        attachment.size = report.sizeTransferred;
+    if (reports_problem(report))
+        attachment.error = make_fault<protocol__Client>(c.ctx, text_of(report.description));
+    if (*attachment.state == state::pending)
+        return;
+    for (protocol__DataPort *port : attachment.dataPort)
+        if (port != nullptr)
+            port->state = make_value(c.ctx, protocol__DataPortState::closed);
+}
+
+bool all_arrived(const attachments &held)
+{
+    return std::none_of(held.begin(), held.end(), [](const protocol__Attachment *attachment) {
+        return attachment != nullptr && attachment->state != nullptr && *attachment->state == state::pending;
+    });
+}
+
+} // namespace service

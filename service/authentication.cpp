@@ -1,0 +1,87 @@
+// authentication.cpp - see authentication.h.
+#include "authentication.h"
+
+#include <openssl/crypto.h>
+
+#include "faults.h"
+
+namespace service {
+
+namespace {
+
+using request = protocolUpdateOrder__AuthenticateRequest;
+using response = protocolUpdateOrder__AuthenticateResponse;
+
+// Requests may refer to each other: nested ones may be more than there are in the message, or without end.
+constexpr unsigned DEPTH_MAX = 100;
+constexpr unsigned REQUESTS_MAX = 10000;
+
+bool same_secret(const std::string &given, const std::string &expected)
+{
+    return given.size() == expected.size() && CRYPTO_memcmp(given.data(), expected.data(), given.size()) == 0;
+}
+
+// Null if the credentials are good.
+protocol__Fault *fault_with(call &c, protocol__Credentials *credentials)
+{
+    if (credentials == nullptr || credentials->username == nullptr || credentials->password == nullptr)
+        return make_fault<protocol__Client_x002eInsufficientInformation>(c.ctx,
+                                                                         "User name or password is missing.");
+    const auto is_good = [&](const std::string &user, const std::string &password) {
+        return *credentials->username == user && same_secret(*credentials->password, password);
+    };
+    bool known = false;
+    if (!c.config.user.empty()) {
+        if (is_good(c.config.user, c.config.password))
+            return nullptr;
+        known = *credentials->username == c.config.user;
+    }
+    for (const auto &[user, password] : c.config.accounts) {
+        if (is_good(user, password))
+            return nullptr;
+        known = known || *credentials->username == user;
+    }
+    if (known)
+        return make_fault<protocol__Client_x002eAuthentication_x002eCredentialsMismatch>(
+            c.ctx, "The password is wrong.");
+    return make_fault<protocol__Client_x002eAuthentication_x002eNotRecognized>(c.ctx,
+                                                                               "The user is not known.");
+}
+
+// What is told of the credentials: whose they are, not the secret.
+protocol__Credentials *without_secret(call &c, const protocol__Credentials *given, bool good)
+{
+    if (given == nullptr)
+        return nullptr;
+    auto *const told = make<protocol__Credentials>(c.ctx);
+    told->username = given->username;
+    told->state =
+        make_value(c.ctx, good ? protocol__CredentialsState::valid : protocol__CredentialsState::invalid);
+    return told;
+}
+
+response *answer(call &c, const request &asked, unsigned depth, unsigned &left)
+{
+    if (depth > DEPTH_MAX || left-- == 0)
+        refuse<protocol__Client_x002eInvalidRequest>(c.ctx, "The request nests too many requests.");
+    auto *const made = make<response>(c.ctx);
+    protocol__Fault *const fault = fault_with(c, asked.credentials);
+    made->success = fault == nullptr;
+    made->credentials = without_secret(c, asked.credentials, made->success);
+    if (fault != nullptr)
+        made->error.push_back(fault);
+    for (const request *nested : asked.authenticateRequest)
+        if (nested != nullptr)
+            made->authenticateResponse.push_back(answer(c, *nested, depth + 1, left));
+    return made;
+}
+
+} // namespace
+
+response *authenticate(call &c, request &asked)
+{
+    unsigned left = REQUESTS_MAX;
+    return answer(c, asked, 0, left);
+}
+
+} // namespace service

@@ -1,0 +1,53 @@
+// connection.cpp - see connection.h.
+#include "connection.h"
+
+#include <chrono>
+
+#include <poll.h>
+#include <sys/socket.h>
+
+#include <zuv_client_pro/soap_memory.h>
+
+namespace service {
+
+namespace {
+
+constexpr std::chrono::milliseconds LINGER_LIMIT(5000); // time that a peer gets to read the last answer
+
+// A connection closed with unread input is reset, and the peer may lose the answer. What it still sends is
+// dropped until it has closed its side.
+void let_peer_read(int socket)
+{
+    using namespace std::chrono;
+    if (shutdown(socket, SHUT_WR) != 0)
+        return;
+    const auto end = steady_clock::now() + LINGER_LIMIT;
+    char dropped[16384];
+    for (auto left = LINGER_LIMIT; left.count() > 0;
+         left = duration_cast<milliseconds>(end - steady_clock::now())) {
+        pollfd readable{socket, POLLIN, 0};
+        if (poll(&readable, 1, static_cast<int>(left.count())) <= 0 ||
+            recv(socket, dropped, sizeof dropped, MSG_DONTWAIT) <= 0)
+            return;
+    }
+}
+
+void free_objects(soap *ctx)
+{
+    soap_discard_objects(ctx, nullptr);
+    soap_discard_all(ctx);
+}
+
+} // namespace
+
+void serve_connection(soap *ctx, const settings &config, session &lent)
+{
+    reception received(ctx, config, lent);
+    while (serve_exchange(ctx, received))
+        free_objects(ctx);
+    let_peer_read(ctx->socket);
+    ctx->keep_alive = 0;
+    free_objects(ctx);
+}
+
+} // namespace service

@@ -1,0 +1,93 @@
+// document.cpp - see document.h.
+#include "document.h"
+
+#include <algorithm>
+#include <cstring>
+#include <utility>
+
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_io.h>
+
+namespace service {
+
+namespace {
+
+constexpr std::uint32_t CODEC_MODE = MODE_BARE_XML | MODE_BUFFERED | MODE_UTF_STRINGS;
+constexpr std::size_t ERROR_TEXT_SIZE = 512; // bytes of an error's text that are kept
+
+[[noreturn]] void fail(soap &context)
+{
+    if (context.error == SOAP_OUT_OF_MEMORY)
+        throw std::bad_alloc();
+    char text[ERROR_TEXT_SIZE] = "";
+    const int error = context.error;
+    throw document_error(soap_fault_print_text(&context, text, sizeof text), error);
+}
+
+} // namespace
+
+document_codec::document_codec(std::uint64_t byte_limit, std::uint32_t depth_limit)
+    : context_(CODEC_MODE), byte_limit_(byte_limit)
+{
+    context_.max_depth = depth_limit;
+    context_.user = this;
+    context_.on_send = take_output;
+    context_.on_recv = give_input;
+}
+
+// A request may refer to one object from many places, and a document written from it holds the object that
+// often. The limit keeps a small request from becoming a document of any size.
+int document_codec::take_output(soap *ctx, const char *data, std::size_t length)
+{
+    auto *const self = static_cast<document_codec *>(ctx->user);
+    self->too_large_ = self->output_.size() + length > self->byte_limit_;
+    if (self->too_large_)
+        return SOAP_LENGTH;
+    try {
+        self->output_.append(data, length);
+    } catch (const std::bad_alloc &) {
+        return SOAP_OUT_OF_MEMORY;
+    }
+    return SOAP_OK;
+}
+
+std::size_t document_codec::give_input(soap *ctx, char *buffer, std::size_t length)
+{
+    auto *const self = static_cast<document_codec *>(ctx->user);
+    const std::size_t given = std::min(length, self->input_.size());
+    std::memcpy(buffer, self->input_.data(), given);
+    self->input_.remove_prefix(given);
+    return given;
+}
+
+std::string document_codec::write_with(int (*put)(soap *ctx, const void *object), const void *object)
+{
+    context_.encoding_style = nullptr;
+    context_.error = SOAP_OK;
+    output_.clear();
+    too_large_ = false;
+    if (soap_count_begin(&context_) != SOAP_OK || soap_count_end(&context_) != SOAP_OK ||
+        soap_send_begin(&context_) != SOAP_OK || put(&context_, object) != SOAP_OK ||
+        soap_send_finish(&context_) != SOAP_OK) {
+        if (too_large_)
+            throw document_error("the document is too large", 0);
+        fail(context_);
+    }
+    return std::exchange(output_, {});
+}
+
+void document_codec::read_with(bool (*get)(soap *ctx, void *object), void *object, std::string_view xml)
+{
+    input_ = xml;
+    if (soap_receive_begin(&context_) != SOAP_OK || !get(&context_, object) ||
+        soap_receive_finish(&context_) != SOAP_OK)
+        fail(context_);
+}
+
+void document_codec::forget()
+{
+    soap_discard_objects(&context_, nullptr);
+    soap_discard_all(&context_);
+}
+
+} // namespace service

@@ -1,0 +1,68 @@
+// document.h - documents as XML and as objects, and where they are kept.
+//
+// Here: the codec, which puts the library's own writer and reader to work on plain XML, and the shelf of one
+// port. Elsewhere: rows (store.h), what operations do with documents (the ports).
+#pragma once
+
+#include <cstddef>
+#include <stdexcept>
+#include <string>
+#include <string_view>
+
+#include <zuv_client_pro/soap.h>
+
+#include "make.h"
+#include "store.h"
+
+namespace service {
+
+// A document that can't be written or read again; `error` is the engine's code, 0 for one over the size
+// limit.
+struct document_error : std::runtime_error {
+    document_error(const std::string &text, int code) : std::runtime_error(text), error(code) {}
+    int error;
+};
+
+// A context of its own, as the exchange's one buffer is busy with the exchange. Serves one thread at a time.
+class document_codec {
+public:
+    // Documents of more bytes, or of more open elements, are refused.
+    document_codec(std::uint64_t byte_limit, std::uint32_t depth_limit);
+    document_codec(const document_codec &) = delete;
+    document_codec &operator=(const document_codec &) = delete;
+
+    // XML of an object under its type's name.
+    template <class T> std::string write(const T &object)
+    {
+        return write_with(
+            [](soap *ctx, const void *o) { return static_cast<const T *>(o)->soap_put(ctx, nullptr, ""); },
+            &object);
+    }
+
+    // The object, which lives until `forget`.
+    template <class T> T *read(std::string_view xml)
+    {
+        T *const object = make<T>(&context_);
+        read_with([](soap *ctx,
+                     void *o) { return static_cast<T *>(o)->soap_get(ctx, nullptr, nullptr) != nullptr; },
+                  object, xml);
+        return object;
+    }
+
+    // Frees all objects read.
+    void forget();
+
+private:
+    std::string write_with(int (*put)(soap *ctx, const void *object), const void *object);
+    void read_with(bool (*get)(soap *ctx, void *object), void *object, std::string_view xml);
+    static int take_output(soap *ctx, const char *data, std::size_t length);
+    static std::size_t give_input(soap *ctx, char *buffer, std::size_t length);
+
+    soap context_;
+    std::uint64_t byte_limit_;
+    std::string output_;
+    std::string_view input_;
+    bool too_large_ = false;
+};
+
+} // namespace service

@@ -1,0 +1,282 @@
+// exchange.cpp - see exchange.h.
+//
+// Elsewhere: limits and the head (reception.cpp), writing answers (answer.cpp).
+// Always: every request that was begun gets an answer, unless the peer is gone or too slow.
+#include "exchange.h"
+
+#include <cstdio>
+
+#include <zuv_client_pro/soap_envelope.h>
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_http.h>
+#include <zuv_client_pro/soap_io.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include "answer.h"
+#include "data_port.h"
+#include "moment.h"
+
+namespace service {
+
+namespace {
+
+constexpr int BAD_REQUEST = 400, REQUEST_TIMEOUT = 408, TOO_LARGE = 413, INTERNAL_ERROR = 500;
+constexpr int HTTP_STATUS_MIN = 400, HTTP_STATUS_MAX = 599;
+constexpr int METHOD_NOT_ALLOWED = 405;
+
+// The engine could not read the request; ctx->error tells why.
+struct unreadable {};
+
+void demand(int result)
+{
+    if (result != SOAP_OK && result != SOAP_STOP)
+        throw unreadable{};
+}
+
+// ---------------------------------------------------------------------------------------------
+// Reading.
+
+const operation *find_operation(soap *ctx, const port &target)
+{
+    const bool typed = target.by_type && ctx->element_type[0] != '\0';
+    for (const operation &candidate : target.operations)
+        if (soap_tag_compare(ctx, typed ? ctx->element_type : ctx->tag, candidate.request_element) == 0)
+            return &candidate;
+    return nullptr;
+}
+
+[[noreturn]] void refuse_operation(soap *ctx)
+{
+    ctx->error = SOAP_OK;
+    const std::string name = ctx->tag;
+    refuse<protocol__Client_x002eMalformedRequest>(
+        ctx, "Method '" + name + "' not implemented: method name or namespace not recognized");
+}
+
+struct request {
+    const operation *op;
+    void *object;
+};
+
+// The request element, which is the first of the Body, and all that follows it.
+request read_request(soap *ctx, const port &target)
+{
+    demand(soap_envelope_in_begin(ctx));
+    demand(soap_header_get(ctx));
+    demand(soap_body_in_begin(ctx));
+    if (ctx->message_part == PART_EMPTY_BODY || soap_element_head_read(ctx) == SOAP_NO_TAG)
+        refuse<protocol__Client_x002eMalformedRequest>(ctx, "The Body holds no request.");
+    demand(ctx->error);
+    const operation *const op = find_operation(ctx, target);
+    if (op == nullptr)
+        refuse_operation(ctx);
+    void *const object = op->read(ctx, target.by_type ? nullptr : op->request_element);
+    if (object == nullptr)
+        throw unreadable{};
+    if (soap_read_independents(ctx) == SOAP_TAG_MISMATCH)
+        ctx->error = SOAP_OK; // nobody knows it: the end of the Body skips it
+    demand(ctx->error);
+    demand(soap_body_in_end(ctx));
+    demand(soap_envelope_in_end(ctx));
+    demand(soap_receive_finish(ctx));
+    return {op, object};
+}
+
+const protocol__Header *header_of(const soap *ctx)
+{
+    return ctx->header == nullptr ? nullptr : ctx->header->header;
+}
+
+bool has_expired(soap *ctx, const protocol__Credentials &credentials)
+{
+    if (credentials.state != nullptr && *credentials.state == protocol__CredentialsState::expired)
+        return true;
+    const auto end = moment_of(ctx, text_of(credentials.expiration));
+    return end && *end < std::time(nullptr);
+}
+
+void check_credentials(soap *ctx, const protocol__Header *header)
+{
+    if (header == nullptr)
+        return;
+    for (protocol__Credentials *credentials : header->credentials) {
+        if (credentials == nullptr || !has_expired(ctx, *credentials))
+            continue;
+        auto *const fault = make_fault<protocol__Client_x002eAuthentication_x002eCredentialsExpired>(
+            ctx, "The credentials of the request have expired.");
+        fault->credentials.push_back(credentials);
+        refuse(fault);
+    }
+}
+
+// ---------------------------------------------------------------------------------------------
+// Answering.
+
+// The answer's header names the exchange as the request did; with nothing to name there is none.
+void settle_header(soap *ctx)
+{
+    const protocol__Header *const received = header_of(ctx);
+    ctx->header = nullptr;
+    if (received == nullptr || (received->transactionId == nullptr && received->correlationId == nullptr))
+        return;
+    auto *const echo = make<protocol__Header>(ctx);
+    echo->transactionId = received->transactionId;
+    echo->correlationId = received->correlationId;
+    soap_header_record(ctx);
+    if (ctx->header == nullptr)
+        throw std::bad_alloc();
+    ctx->header->header = echo;
+}
+
+// The HTTP status for a request that could not be read.
+int status_of_error(const soap *ctx, const reception &received)
+{
+    if (received.too_large())
+        return TOO_LARGE;
+    if (received.too_slow())
+        return REQUEST_TIMEOUT;
+    if (ctx->error >= HTTP_STATUS_MIN && ctx->error <= HTTP_STATUS_MAX)
+        return ctx->error;
+    switch (ctx->error) {
+    case SOAP_GET_METHOD:
+    case SOAP_PUT_METHOD:
+    case SOAP_HTTP_METHOD:
+        return METHOD_NOT_ALLOWED;
+    case SOAP_MUST_UNDERSTAND:
+    case SOAP_VERSION_MISMATCH:
+    case SOAP_OUT_OF_MEMORY:
+        return INTERNAL_ERROR;
+    default:
+        return BAD_REQUEST;
+    }
+}
+
+// Puts the typed fault of an unreadable request beside the text that the engine made.
+void describe_unreadable(soap *ctx)
+{
+    const char *const *const text = soap_fault_string_field(ctx);
+    auto *const fault =
+        make_fault<protocol__Client_x002eMalformedRequest>(ctx, *text == nullptr ? "" : *text);
+    soap_fault_detail_field(ctx);
+    SOAP_ENV__Detail *const detail = ctx->soap_version == 1 ? ctx->fault->detail : ctx->fault->Detail;
+    if (detail != nullptr)
+        place_fault(*detail, fault);
+}
+
+void answer_unreadable(soap *ctx, const reception &received)
+{
+    if (!received.started())
+        return; // the end of a kept connection, not a request
+    ctx->keep_alive = 0;
+    const int status = status_of_error(ctx, received);
+    settle_version(ctx);
+    settle_header(ctx);
+    if (status == INTERNAL_ERROR || status == BAD_REQUEST) {
+        soap_fault_text_fill(ctx);
+        if (status == BAD_REQUEST)
+            describe_unreadable(ctx);
+    } else {
+        ctx->fault = nullptr;
+        soap_fault_sender(ctx, http_reason(status), nullptr, SOAP_FAULT);
+    }
+    send_fault(ctx, status);
+}
+
+void answer_refusal(soap *ctx, const refusal &refused)
+{
+    settle_header(ctx);
+    if (ctx->response_unfinished)
+        ctx->keep_alive = 0;
+    send_fault(ctx, fault_from_refusal(ctx, refused));
+}
+
+// The request is fine, and the service failed on it. What happened is the operator's to know.
+void answer_failure(soap *ctx, const char *what)
+{
+    std::fprintf(stderr, "zuv-service: %s\n", what);
+    ctx->error = SOAP_OK;
+    answer_refusal(
+        ctx, {make_fault<protocol__Server_x002eProcessing>(ctx, "The service could not process the request."),
+              [](SOAP_ENV__Detail &detail, protocol__Fault *fault) {
+                  place_fault(detail, static_cast<protocol__Server_x002eProcessing *>(fault));
+              }});
+}
+
+// A document that can't be kept: too large, or nested without end.
+[[noreturn]] void refuse_document(soap *ctx, const document_error &error, std::uint64_t limit)
+{
+    if (error.error != 0)
+        refuse<protocol__Client_x002eInvalidInformation>(ctx, error.what());
+    auto *const fault =
+        make_fault<protocol__Server_x002eDataTooLarge>(ctx, "The document is larger than the service keeps.");
+    fault->maxSize = make_text(ctx, std::to_string(limit));
+    refuse(fault);
+}
+
+const void *run(soap *ctx, const request &asked, const reception &received)
+{
+    const protocol__Header *const header = header_of(ctx);
+    check_credentials(ctx, header);
+    call c{ctx, received.lent().documents, received.lent().codec, received.config(), header, received.root()};
+    try {
+        return asked.op->run(c, asked.object);
+    } catch (const document_error &error) {
+        refuse_document(ctx, error, received.config().body_limit);
+    }
+}
+
+void receive_and_answer(soap *ctx, reception &received)
+{
+    const int begun = soap_receive_begin(ctx);
+    if (begun == SOAP_STOP)
+        return; // answered with the head
+    demand(begun);
+    if (!received.data_name().empty()) {
+        demand(receive_data(ctx, received.lent().documents, received.data_name()));
+        return;
+    }
+    if (received.target() == nullptr) { // XML without an HTTP head
+        ctx->error = SOAP_HTTP_ERROR;
+        throw unreadable{};
+    }
+    const request asked = read_request(ctx, *received.target());
+    const void *const response = run(ctx, asked, received);
+    if (ctx->response_unfinished)
+        ctx->keep_alive = 0; // something stands behind the request, which can't be told from a next one
+    settle_header(ctx);
+    if (send_response(ctx, *asked.op, response) != SOAP_OK)
+        ctx->keep_alive = 0;
+}
+
+void serve(soap *ctx, reception &received)
+{
+    try {
+        receive_and_answer(ctx, received);
+    } catch (const refusal &refused) {
+        answer_refusal(ctx, refused);
+    } catch (const unreadable &) {
+        answer_unreadable(ctx, received);
+    } catch (const std::exception &failure) {
+        answer_failure(ctx, failure.what());
+    }
+}
+
+} // namespace
+
+bool serve_exchange(soap *ctx, reception &received)
+{
+    received.expect_next();
+    try {
+        serve(ctx, received);
+    } catch (const std::exception &failure) { // not even an answer could be made
+        std::fprintf(stderr, "zuv-service: %s\n", failure.what());
+        ctx->keep_alive = 0;
+    }
+    received.lent().codec.forget();
+    if (!received.started() || (ctx->error != SOAP_OK && ctx->error != SOAP_STOP))
+        ctx->keep_alive = 0;
+    return ctx->keep_alive != 0;
+}
+
+} // namespace service

@@ -1,0 +1,42 @@
+// expansion.h - what an update order comes to: the updates that it names, narrowed by its filters and joined
+// by those that it wants along.
+//
+// Elsewhere: the answer made of it (update_order_port.cpp).
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include <zuv_client_pro/protocolUpdateOrder.h>
+
+#include "catalogue.h"
+
+namespace service {
+
+// Why an update is in an expansion.
+enum class update_role { base, requisite, supersede, replacement, patch };
+
+struct chosen_update {
+    const update_record *update;
+    update_role role;
+};
+
+struct unknown_update {
+    std::string id, qualifier;
+};
+
+struct expansion {
+    std::vector<chosen_update> chosen; // in the order in which they were found, each once
+    std::vector<unknown_update> unknown;
+};
+
+// True if the order names updates in some way: by identifier, scope or filter.
+bool names_updates(const protocolUpdateOrder__UpdateOrderContent &order);
+
+// Throws filter_error.
+expansion expand(soap *ctx, const catalogue &offered, const protocolUpdateOrder__UpdateOrderContent &order);
+
+// What the data of updates is told as.
+const protocol__Attachment &update_package();
+
+} // namespace service

@@ -1,0 +1,148 @@
+// main.cpp - zuv-service: options, and the program's life from listening to the signal that ends it.
+#include <csignal>
+#include <cstdio>
+#include <cstdlib>
+#include <exception>
+#include <filesystem>
+#include <fstream>
+#include <optional>
+#include <stdexcept>
+#include <string>
+#include <system_error>
+#include <vector>
+
+#include <CLI/CLI.hpp>
+
+#include <zuv_client_pro/soap_log.h>
+
+#include "catalogue.h"
+#include "server.h"
+
+namespace {
+
+struct options {
+    service::settings config;
+    std::vector<std::string> accounts; // "user:password"
+    std::string port_file;             // takes the port once the service listens
+};
+
+void declare(CLI::App &app, options &o)
+{
+    service::settings &s = o.config;
+    app.add_option("--host", s.host, "Address to listen on")->capture_default_str();
+    app.add_option("--port", s.port, "Port to listen on; 0: any free one")
+        ->check(CLI::Range(0, 65535))
+        ->take_last()
+        ->capture_default_str();
+    app.add_option("--database", s.database,
+                   "File that keeps the documents; without one they end with the program");
+    auto *const user = app.add_option("--user", s.user, "User name that clients must give (HTTP Basic)");
+    auto *const password = app.add_option("--password", s.password, "Password that clients must give");
+    user->needs(password);
+    password->needs(user);
+    app.add_option("--account", o.accounts, "USER:PASSWORD that authenticates; may be given several times");
+    app.add_flag("--indent", s.indent, "Indent the XML of answers");
+    app.add_flag("--chunked", s.chunked, "Send answers in chunks");
+    app.add_option("--trace", s.trace, "File that takes a copy of all bytes received and sent");
+    app.add_option("--port-file", o.port_file, "File that takes the port once the service listens");
+    app.add_option("--max-body", s.body_limit, "Largest request, in bytes")->capture_default_str();
+    app.add_option("--connections", s.connections, "Connections served at a time")
+        ->check(CLI::Range(1, 512))
+        ->capture_default_str();
+    app.add_option("--request-time", s.request_seconds, "Seconds that a request may take to arrive")
+        ->check(CLI::Range(1, 86400))
+        ->capture_default_str();
+    app.add_option("--idle", s.idle_seconds, "Seconds of silence that end a connection")
+        ->check(CLI::Range(1, 86400))
+        ->capture_default_str();
+}
+
+void split_accounts(options &o)
+{
+    for (const std::string &account : o.accounts) {
+        const std::size_t colon = account.find(':');
+        if (colon == account.npos)
+            throw std::invalid_argument("an account is USER:PASSWORD");
+        o.config.accounts.emplace_back(account.substr(0, colon), account.substr(colon + 1));
+    }
+}
+
+// A directory for the documents of one run.
+class passing_directory {
+public:
+    passing_directory()
+    {
+        std::string name = std::filesystem::temp_directory_path() / "zuv-service-XXXXXX";
+        if (mkdtemp(name.data()) == nullptr)
+            throw std::system_error(errno, std::generic_category(), name);
+        path_ = name;
+    }
+    ~passing_directory()
+    {
+        std::error_code ignored;
+        std::filesystem::remove_all(path_, ignored);
+    }
+    passing_directory(const passing_directory &) = delete;
+    passing_directory &operator=(const passing_directory &) = delete;
+    std::string database() const { return path_ / "documents.db"; }
+
+private:
+    std::filesystem::path path_;
+};
+
+// Whoever sees the file sees the whole number.
+void write_port_file(const std::string &path, int port)
+{
+    const std::string unfinished = path + ".new";
+    std::ofstream(unfinished) << port << '\n';
+    std::filesystem::rename(unfinished, path);
+}
+
+void announce(const options &o, int port)
+{
+    if (!o.port_file.empty())
+        write_port_file(o.port_file, port);
+    const bool v6 = o.config.host.find(':') != std::string::npos;
+    std::printf(v6 ? "listening on http://[%s]:%d\n" : "listening on http://%s:%d\n", o.config.host.c_str(),
+                port);
+    std::fflush(stdout);
+}
+
+void serve_until_signal(const options &o)
+{
+    sigset_t ending; // blocked in all threads, so that the wait below gets them
+    sigemptyset(&ending);
+    sigaddset(&ending, SIGINT);
+    sigaddset(&ending, SIGTERM);
+    pthread_sigmask(SIG_BLOCK, &ending, nullptr);
+
+    std::optional<passing_directory> passing;
+    service::database place;
+    place.path = o.config.database.empty() ? passing.emplace().database() : o.config.database;
+    service::server server(o.config, place);
+    server.start();
+    announce(o, server.port());
+    int signal = 0;
+    sigwait(&ending, &signal);
+    server.stop();
+}
+
+} // namespace
+
+int main(int argc, char **argv)
+{
+    g_TraceLogFile[0] = '\0'; // no trace unless asked for
+    CLI::App app("zuv-service: the reference service of the zuv protocol");
+    options o;
+    declare(app, o);
+    CLI11_PARSE(app, argc, argv);
+    try {
+        split_accounts(o);
+        service::the_catalogue(); // read now, while there is only one thread
+        serve_until_signal(o);
+        return 0;
+    } catch (const std::exception &failure) {
+        std::fprintf(stderr, "zuv-service: %s\n", failure.what());
+        return 1;
+    }
+}

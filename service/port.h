@@ -1,0 +1,79 @@
+// port.h - what a service port is: a table of operations, each a request element, a handler and a response
+// element.
+//
+// Elsewhere: the handlers (profile_port.cpp and its like), who calls them (exchange.cpp).
+#pragma once
+
+#include <span>
+#include <string>
+#include <string_view>
+
+#include <zuv_client_pro/protocol.h>
+#include <zuv_client_pro/soap.h>
+
+#include "document.h"
+#include "make.h"
+#include "settings.h"
+#include "store.h"
+
+namespace service {
+
+// What a handler works with. Requests and answers belong to the context `ctx`, documents read from the store
+// to the codec; both live until the answer is sent.
+struct call {
+    soap *ctx;
+    store &documents;
+    document_codec &codec;
+    const settings &config;
+    const protocol__Header *header; // null if the request has none
+    std::string root; // URL of this service as the client named it, "http://host:9080"; may be empty
+};
+
+struct operation {
+    const char *request_element;
+    const char *response_element;
+    void *(*read)(soap *ctx, const char *element);                      // null with ctx->error set
+    const void *(*run)(call &c, void *request);                         // throws a refusal
+    int (*write)(soap *ctx, const void *response, const char *element); // ctx->error
+};
+
+// The row of an operation whose handler is `Response *Handler(call &, Request &)`.
+template <auto Handler> struct operation_of;
+template <class Request, class Response, Response *(*Handler)(call &, Request &)>
+struct operation_of<Handler> {
+    static void *read(soap *ctx, const char *element)
+    {
+        auto *const request = make<Request>(ctx);
+        return request->soap_in(ctx, element, nullptr) == nullptr ? nullptr : request;
+    }
+    static const void *run(call &c, void *request) { return Handler(c, *static_cast<Request *>(request)); }
+    static int write(soap *ctx, const void *response, const char *element)
+    {
+        return static_cast<const Response *>(response)->soap_put(ctx, element, "");
+    }
+};
+
+template <auto Handler> constexpr operation row(const char *request_element, const char *response_element)
+{
+    using entry = operation_of<Handler>;
+    return {request_element, response_element, entry::read, entry::run, entry::write};
+}
+
+struct port {
+    std::string_view name; // last part of its path
+    bool by_type = false;  // a request is known by its type, whatever element holds it
+    std::span<const operation> operations;
+};
+
+extern const port profile_port, status_report_port, inventory_report_port, update_order_port,
+    problem_report_port, query_port;
+
+constexpr std::string_view SERVICES_PATH = "/zuv/v1.0/services/";
+
+// The port at a path, or null.
+const port *find_port(std::string_view path);
+
+// All ports, for the page that lists them.
+std::span<const port *const> all_ports();
+
+} // namespace service

@@ -1,0 +1,114 @@
+// problem_report_port.cpp - the operations on problem reports, and the first answers that a report gets.
+#include <zuv_client_pro/protocolProblemReport.h>
+
+#include "catalogue.h"
+#include "comparison.h"
+#include "report_rules.h"
+
+namespace service {
+
+namespace {
+
+using report = protocolProblemReport__ProblemReportContent;
+using state = protocolProblemReport__ProblemReportState;
+using acknowledgment = protocolProblemReport__Answer_x002eServer_x002eAdministration_x002eAcknowledgment;
+using action_answer = protocolProblemReport__Answer_x002eServer_x002eAction;
+using install = protocolProblemReport__Action_x002eUpdate_x002eInstall;
+
+report_rules<report> rules_of(call &c)
+{
+    return {c, "ProblemReport", "problemreport"};
+}
+
+// How sure the service is that an update helps, in per cent; null if it doesn't.
+const char *confidence_of(const std::string &text, const update_record &update)
+{
+    if (words_hold(text_operator::contains_phrase, text, text_of(update.updateId), false))
+        return "90";
+    for (const protocolUpdateOrder__Corrected *corrected : update.corrected)
+        if (corrected->problemReport != nullptr &&
+            words_hold(text_operator::contains_all_words, text, text_of(corrected->problemReport->title),
+                       false))
+            return "75";
+    return nullptr;
+}
+
+// Proposes to install an update.
+action_answer *proposal(call &c, const update_record &update, const char *confidence)
+{
+    auto *const information = make<protocolProblemReport__UpdateInformation>(c.ctx);
+    if (!update.subject.empty())
+        information->product = update.subject.front()->product;
+    information->updateId = update.updateId;
+    information->updateIdQualifier = update.updateIdQualifier;
+    information->confidence = make_text(c.ctx, confidence);
+    auto *const action = make<install>(c.ctx);
+    action->description = make_text(c.ctx, "Install " + text_of(update.name) + ".");
+    action->originator = make_text(c.ctx, "zuv-service");
+    action->updateInformation.push_back(information);
+    auto *const answer = make<action_answer>(c.ctx);
+    answer->description = make_text(c.ctx, "An update is known to help with such a problem.");
+    answer->action = action;
+    return answer;
+}
+
+void give_answers(call &c, report &r)
+{
+    auto *const received = make<acknowledgment>(c.ctx);
+    received->description = make_text(c.ctx, "The report was received and is being worked on.");
+    r.answer = {received};
+    const std::string text = text_of(r.title) + "\n" + text_of(r.problemDescription);
+    for (const update_record *update : the_catalogue().all())
+        if (const char *const confidence = confidence_of(text, *update))
+            r.answer.push_back(proposal(c, *update, confidence));
+}
+
+void note_change(call &c, report &r)
+{
+    r.lastModifiedDateTime = make_text(c.ctx, now_text(c.ctx));
+}
+
+report *get(call &c, _protocolProblemReport__getRequest &)
+{
+    return rules_of(c).get();
+}
+
+report *submit(call &c, report &request)
+{
+    note_change(c, request);
+    request.submitDateTime = request.lastModifiedDateTime;
+    request.state = make_value(c.ctx, state::open);
+    give_answers(c, request);
+    rules_of(c).documents().keep(request);
+    return &request;
+}
+
+report *attach(call &c, _protocolProblemReport__attachRequest &request)
+{
+    return rules_of(c).attach(request.attachment, request.dataPortPreference);
+}
+
+report *attach_status(call &c, protocol__AttachStatusRequest &request)
+{
+    return rules_of(c).note_progress(request);
+}
+
+report *remove(call &c, report &request)
+{
+    return rules_of(c).remove(request);
+}
+
+constexpr operation OPERATIONS[] = {
+    row<get>("protocolProblemReport:getRequest", "protocolProblemReport:getResponse"),
+    row<submit>("protocolProblemReport:submitRequest", "protocolProblemReport:submitResponse"),
+    row<attach>("protocolProblemReport:attachRequest", "protocolProblemReport:attachResponse"),
+    row<attach_status>("protocolProblemReport:attachStatusRequest",
+                       "protocolProblemReport:attachStatusResponse"),
+    row<remove>("protocolProblemReport:removeRequest", "protocolProblemReport:removeResponse"),
+};
+
+} // namespace
+
+const port problem_report_port = {.name = "ProblemReport", .operations = OPERATIONS};
+
+} // namespace service

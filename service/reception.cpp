@@ -1,0 +1,220 @@
+// reception.cpp - see reception.h.
+#include "reception.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <exception>
+#include <string_view>
+#include <utility>
+
+#include <openssl/crypto.h>
+
+#include <zuv_client_pro/soap_http.h>
+#include <zuv_client_pro/soap_tcp.h>
+
+#include "answer.h"
+#include "attachments.h"
+#include "data_port.h"
+
+namespace service {
+
+namespace {
+
+constexpr int BAD_REQUEST = 400, UNAUTHORIZED = 401, NOT_FOUND = 404, METHOD_NOT_ALLOWED = 405,
+              TOO_LARGE = 413, INTERNAL_ERROR = 500;
+char REALM[] = "zuv";
+
+// Compares in a time that tells nothing of the place where the texts differ.
+bool same_secret(const char *given, const std::string &expected)
+{
+    const std::string_view text = given == nullptr ? std::string_view() : given;
+    return text.size() == expected.size() && CRYPTO_memcmp(text.data(), expected.data(), text.size()) == 0;
+}
+
+// A request that should have no body is at its end. A body that it has all the same, or bytes behind it,
+// would be taken for the next request.
+void end_without_body(soap *ctx)
+{
+    const bool chunked = (ctx->input_mode & MODE_IO_MASK) == MODE_CHUNKED;
+    if (chunked || ctx->content_length != 0 || ctx->buffer_index < ctx->buffer_length)
+        ctx->keep_alive = 0;
+    else
+        ctx->response_unfinished = false;
+}
+
+// Chunks are for peers that know them; who they are is told by the start line alone.
+void settle_framing(soap *ctx, bool chunks_wanted)
+{
+    const bool old = std::string_view(ctx->message_text).ends_with("HTTP/1.0");
+    ctx->output_mode =
+        (ctx->output_mode & ~MODE_IO_MASK) | (chunks_wanted && !old ? MODE_CHUNKED : MODE_BUFFERED);
+}
+
+std::string page()
+{
+    std::string html = "<!DOCTYPE html><html><head><title>zuv-service</title></head><body><p>Ports:</p><ul>";
+    for (const port *p : all_ports())
+        html.append("<li>").append(SERVICES_PATH).append(p->name).append("</li>");
+    return html + "</ul></body></html>\r\n";
+}
+
+} // namespace
+
+reception::reception(soap *ctx, const settings &config, session &lent) : config_(config), lent_(lent)
+{
+    ctx->user = this;
+    ctx->on_read_head = read_head;
+    ctx->on_recv_prepare = count_body;
+    ctx->on_recv = receive;
+    ctx->on_header_line = write_line;
+    ctx->on_get = get;
+    ctx->on_head = ctx->on_options = option_or_head;
+    ctx->on_put = ctx->on_delete = refuse_method;
+}
+
+void reception::expect_next()
+{
+    started_ = too_slow_ = false;
+    body_bytes_ = 0;
+    target_ = nullptr;
+    root_.clear();
+    path_.clear();
+}
+
+// ---------------------------------------------------------------------------------------------
+// Bytes.
+
+// The silence ahead of a request is bounded by the idle limit, the request itself by its own as well.
+std::size_t reception::receive(soap *ctx, char *buffer, std::size_t length)
+{
+    using namespace std::chrono;
+    reception &self = of(ctx);
+    const auto start = steady_clock::now();
+    ctx->recv_timeout = self.config_.idle_seconds;
+    if (self.started_) {
+        const auto left = duration_cast<seconds>(self.deadline_ - start).count();
+        self.too_slow_ = left <= 0;
+        if (self.too_slow_)
+            return 0;
+        ctx->recv_timeout = static_cast<int>(std::min<long>(left, ctx->recv_timeout));
+    }
+    const std::size_t received = tcp_recv(ctx, buffer, length);
+    const auto end = steady_clock::now();
+    if (received == 0)
+        self.too_slow_ = self.started_ && end - start >= seconds(ctx->recv_timeout);
+    else if (!std::exchange(self.started_, true))
+        self.deadline_ = end + seconds(self.config_.request_seconds);
+    return received;
+}
+
+int reception::count_body(soap *ctx, const char *, std::size_t length)
+{
+    reception &self = of(ctx);
+    self.body_bytes_ += length;
+    return self.too_large() ? TOO_LARGE : 0;
+}
+
+// ---------------------------------------------------------------------------------------------
+// Heads.
+
+int reception::read_head(soap *ctx)
+{
+    reception &self = of(ctx);
+    const int result = http_read_head(ctx);
+    settle_framing(ctx, self.config_.chunked);
+    if (result != 0)
+        return result;
+    if (std::string_view(ctx->message_text).find(" HTTP/1.") == std::string_view::npos)
+        return ctx->error = BAD_REQUEST; // the library leaves what isn't HTTP to its caller
+    if (const int refused = self.settle_request(ctx))
+        return ctx->error = refused;
+    return self.target_ == nullptr && self.data_name().empty() ? ctx->error = NOT_FOUND : 0;
+}
+
+bool reception::knows_sender(const soap *ctx) const
+{
+    if (config_.user.empty())
+        return true;
+    const bool user = same_secret(ctx->auth_user, config_.user);
+    const bool password = same_secret(ctx->auth_password, config_.password);
+    return user && password;
+}
+
+// Splits the URL that the request is for, and says what keeps the request from being looked at: 0 or an HTTP
+// status.
+int reception::settle_request(soap *ctx)
+{
+    std::string_view url = ctx->endpoint;
+    const std::size_t scheme = url.find("://");
+    const std::size_t path = scheme == url.npos ? 0 : std::min(url.find('/', scheme + 3), url.size());
+    root_ = url.substr(0, path);
+    url.remove_prefix(path);
+    path_ = url.substr(0, url.find('?'));
+    target_ = find_port(path_);
+    if (!knows_sender(ctx)) {
+        ctx->auth_realm = REALM;
+        return UNAUTHORIZED;
+    }
+    return ctx->content_length > config_.body_limit ? TOO_LARGE : 0;
+}
+
+std::string_view reception::data_name() const
+{
+    return path_.starts_with(DATA_PATH) ? std::string_view(path_).substr(DATA_PATH.size())
+                                        : std::string_view();
+}
+
+// An answer that refuses the method names the one that is served.
+int reception::write_line(soap *ctx, const char *key, const char *value)
+{
+    const bool end = key == nullptr;
+    if (end && ctx->status == METHOD_NOT_ALLOWED && http_write_line(ctx, "Allow", "POST"))
+        return ctx->error;
+    return http_write_line(ctx, key, value);
+}
+
+// ---------------------------------------------------------------------------------------------
+// Methods other than POST, answered with the head.
+
+int reception::answer_get(soap *ctx)
+{
+    if (!data_name().empty())
+        return send_data(ctx, lent_.documents, data_name());
+    if (target_ != nullptr)
+        return ctx->error = METHOD_NOT_ALLOWED; // ports are called, not fetched
+    return path_ == "/" || path_ == SERVICES_PATH ? send_file(ctx, "text/html; charset=utf-8", page())
+                                                  : ctx->error = NOT_FOUND;
+}
+
+// Runs what answers a method. The library calls the hooks, and nothing may be thrown through it.
+template <class Answer> int reception::answered(soap *ctx, Answer answer)
+{
+    reception &self = of(ctx);
+    try {
+        if (const int refused = self.settle_request(ctx))
+            return ctx->error = refused;
+        return answer(self);
+    } catch (const std::exception &failure) {
+        std::fprintf(stderr, "zuv-service: %s\n", failure.what());
+        return ctx->error = INTERNAL_ERROR;
+    }
+}
+
+int reception::get(soap *ctx)
+{
+    end_without_body(ctx);
+    return answered(ctx, [ctx](reception &self) { return self.answer_get(ctx); });
+}
+
+int reception::option_or_head(soap *ctx)
+{
+    end_without_body(ctx);
+    return answered(ctx, [ctx](reception &) { return http_method_default(ctx); });
+}
+
+int reception::refuse_method(soap *ctx)
+{
+    return answered(ctx, [ctx](reception &) { return ctx->error = METHOD_NOT_ALLOWED; });
+}
+
+} // namespace service

@@ -1,0 +1,65 @@
+// reception.h - what a request may be before anything is read of its content: its path, who sends it, how
+// large and how slow it is.
+//
+// Here: the hooks of the context that watch the arriving bytes and the head. Elsewhere: the content
+// (exchange.cpp).
+#pragma once
+
+#include <chrono>
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+#include <zuv_client_pro/soap.h>
+
+#include "port.h"
+#include "session.h"
+#include "settings.h"
+
+namespace service {
+
+// What is known of the request that arrives on a context; ctx->user points here.
+class reception {
+public:
+    // Installs the hooks; the context must not be used longer than this object.
+    reception(soap *ctx, const settings &config, session &lent);
+    reception(const reception &) = delete;
+    reception &operator=(const reception &) = delete;
+
+    // Forgets the request before.
+    void expect_next();
+
+    const settings &config() const { return config_; }
+    session &lent() const { return lent_; }
+    bool started() const { return started_; } // some byte has arrived
+    bool too_large() const { return body_bytes_ > config_.body_limit; }
+    bool too_slow() const { return too_slow_; }
+    const port *target() const { return target_; } // null if no head was read, or none of a call
+    std::string_view data_name() const;            // below the path of data; empty for another path
+    const std::string &root() const { return root_; }
+
+private:
+    int settle_request(soap *ctx);
+    int answer_get(soap *ctx);
+    bool knows_sender(const soap *ctx) const;
+
+    static reception &of(soap *ctx) { return *static_cast<reception *>(ctx->user); }
+    static int read_head(soap *ctx);
+    static int count_body(soap *ctx, const char *data, std::size_t length);
+    static std::size_t receive(soap *ctx, char *buffer, std::size_t length);
+    static int write_line(soap *ctx, const char *key, const char *value);
+    static int get(soap *ctx);
+    static int option_or_head(soap *ctx);
+    static int refuse_method(soap *ctx);
+    template <class Answer> static int answered(soap *ctx, Answer answer);
+
+    const settings &config_;
+    session &lent_;
+    bool started_ = false, too_slow_ = false;
+    std::uint64_t body_bytes_ = 0;
+    std::chrono::steady_clock::time_point deadline_;
+    const port *target_ = nullptr;
+    std::string root_, path_;
+};
+
+} // namespace service

@@ -1,0 +1,207 @@
+// server.cpp - see server.h.
+#include "server.h"
+
+#include <algorithm>
+#include <chrono>
+#include <cstdio>
+#include <stdexcept>
+
+#include <netinet/in.h>
+#include <sys/socket.h>
+
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_log.h>
+#include <zuv_client_pro/soap_tcp.h>
+
+#include "connection.h"
+
+namespace service {
+
+namespace {
+
+constexpr int BACKLOG = 128;                  // connections that may wait to be accepted
+constexpr std::chrono::seconds STOP_LIMIT(5); // time that requests under way get at the end
+constexpr std::chrono::milliseconds
+    ACCEPT_PAUSE(100); // after a failed accept, such as for want of descriptors
+
+std::uint32_t mode_of(const settings &config)
+{
+    const std::uint32_t mode = MODE_BUFFERED | MODE_KEEP_ALIVE | MODE_UTF_STRINGS;
+    return config.indent ? mode | MODE_INDENT : mode;
+}
+
+std::string error_text(soap *ctx)
+{
+    char text[512] = "";
+    return soap_fault_print_text(ctx, text, sizeof text);
+}
+
+int bound_port(int socket)
+{
+    sockaddr_storage address{};
+    socklen_t length = sizeof address;
+    if (getsockname(socket, reinterpret_cast<sockaddr *>(&address), &length) != 0)
+        throw std::runtime_error("cannot tell the port");
+    if (address.ss_family == AF_INET6)
+        return ntohs(reinterpret_cast<const sockaddr_in6 &>(address).sin6_port);
+    return ntohs(reinterpret_cast<const sockaddr_in &>(address).sin_port);
+}
+
+} // namespace
+
+server::server(const settings &config, database &place)
+    : config_(config), place_(place), master_(MODE_KEEP_ALIVE | MODE_UTF_STRINGS, mode_of(config))
+{
+    idle_sessions_.push_back(std::make_unique<session>(place, config)); // a useless database shows now
+    master_.bind_flags = SO_REUSEADDR;
+    master_.max_depth = config.depth_limit;
+    master_.recv_timeout = master_.send_timeout = config.idle_seconds;
+    if (!config.trace.empty()) {
+        soap_log_set_received(&master_, config.trace.c_str());
+        soap_log_set_sent(&master_, config.trace.c_str());
+    }
+    if (soap_bind(&master_, config.host.c_str(), config.port, BACKLOG) < 0)
+        throw std::runtime_error(error_text(&master_));
+    port_ = bound_port(master_.master_socket);
+}
+
+server::~server()
+{
+    stop();
+}
+
+void server::start()
+{
+    acceptor_ = std::thread([this] { accept_all(); });
+}
+
+// ---------------------------------------------------------------------------------------------
+// Accepting.
+
+// True once another connection may be served, false at the end.
+bool server::wait_for_room(std::unique_lock<std::mutex> &lock)
+{
+    changed_.wait(lock, [this] {
+        return stopping_ || connections_.size() < config_.connections ||
+               std::any_of(connections_.begin(), connections_.end(),
+                           [](const connection &c) { return c.done; });
+    });
+    reap(lock);
+    return !stopping_;
+}
+
+void server::accept_all()
+{
+    std::unique_lock<std::mutex> lock(mutex_);
+    while (wait_for_room(lock)) {
+        lock.unlock();
+        const int accepted = soap_accept(&master_);
+        soap *const copy = accepted < 0 ? nullptr : soap_context_copy(&master_);
+        if (copy != nullptr)
+            master_.socket = -1; // the copy's from here on; without one, the next accept would lose it
+        else if (accepted >= 0)
+            tcp_disconnect(&master_);
+        lock.lock();
+        if (copy != nullptr)
+            open_connection(copy);
+        else
+            changed_.wait_for(lock, ACCEPT_PAUSE, [this] { return stopping_; });
+    }
+}
+
+void server::open_connection(soap *copy)
+{
+    if (stopping_) {
+        soap_context_free(copy);
+        return;
+    }
+    const auto place = connections_.insert(connections_.end(), connection{copy->socket, false, {}});
+    try {
+        place->thread = std::thread([this, copy, place] { serve(copy, place); });
+    } catch (const std::system_error &) { // no thread to be had: the client may try again
+        connections_.erase(place);
+        soap_context_free(copy);
+    }
+}
+
+std::unique_ptr<session> server::borrow_session()
+{
+    {
+        const std::lock_guard<std::mutex> lock(mutex_);
+        if (!idle_sessions_.empty()) {
+            std::unique_ptr<session> lent = std::move(idle_sessions_.back());
+            idle_sessions_.pop_back();
+            return lent;
+        }
+    }
+    return std::make_unique<session>(place_, config_);
+}
+
+void server::serve(soap *copy, std::list<connection>::iterator place)
+{
+    std::unique_ptr<session> lent;
+    try {
+        lent = borrow_session();
+        serve_connection(copy, config_, *lent);
+    } catch (const std::exception &failure) {
+        std::fprintf(stderr, "zuv-service: %s\n", failure.what());
+    }
+    soap_context_free(copy);
+    const std::lock_guard<std::mutex> lock(mutex_);
+    if (lent)
+        idle_sessions_.push_back(std::move(lent));
+    place->done = true;
+    changed_.notify_all();
+}
+
+// Joins the threads that are done.
+void server::reap(std::unique_lock<std::mutex> &lock)
+{
+    std::list<connection> ended;
+    for (auto place = connections_.begin(); place != connections_.end();) {
+        const auto next = std::next(place);
+        if (place->done)
+            ended.splice(ended.end(), connections_, place);
+        place = next;
+    }
+    lock.unlock();
+    for (connection &c : ended)
+        c.thread.join();
+    lock.lock();
+}
+
+// ---------------------------------------------------------------------------------------------
+// The end.
+
+// A thread may have closed its socket already: then the number is nobody's or another's who has to end too.
+void server::shut_connections(int how)
+{
+    for (const connection &c : connections_)
+        if (!c.done)
+            shutdown(c.socket, how);
+}
+
+void server::stop()
+{
+    if (!acceptor_.joinable())
+        return;
+    std::unique_lock<std::mutex> lock(mutex_);
+    stopping_ = true;
+    changed_.notify_all();
+    shutdown(master_.master_socket, SHUT_RDWR); // wakes the acceptor
+    lock.unlock();
+    acceptor_.join();
+    lock.lock();
+    const auto all_done = [this] {
+        return std::all_of(connections_.begin(), connections_.end(),
+                           [](const connection &c) { return c.done; });
+    };
+    shut_connections(SHUT_RD);
+    if (!changed_.wait_for(lock, STOP_LIMIT, all_done)) {
+        shut_connections(SHUT_RDWR);
+        changed_.wait(lock, all_done);
+    }
+    reap(lock);
+}
+
+} // namespace service

@@ -1,0 +1,18 @@
+// session.h - what a connection's thread works with; lent to one connection at a time.
+#pragma once
+
+#include "document.h"
+#include "settings.h"
+#include "store.h"
+
+namespace service {
+
+struct session {
+    session(database &place, const settings &config)
+        : documents(place), codec(config.body_limit, config.depth_limit)
+    {}
+    store documents;
+    document_codec codec;
+};
+
+} // namespace service

@@ -1,0 +1,199 @@
+// update_order_port.cpp - the operations on update orders.
+//
+// Elsewhere: which updates an order comes to (expansion.cpp), authentication (authentication.cpp).
+#include <zuv_client_pro/protocolUpdateOrder.h>
+
+#include "authentication.h"
+#include "expansion.h"
+#include "filter.h"
+#include "report_rules.h"
+
+namespace service {
+
+namespace {
+
+using order = protocolUpdateOrder__UpdateOrderContent;
+using state = protocolUpdateOrder__UpdateOrderState;
+using detail = protocolUpdateOrder__UpdateIdExpansionDetail;
+
+report_rules<order> rules_of(call &c)
+{
+    return {c, "UpdateOrder", "updateorder"};
+}
+
+bool is_true(const bool *member)
+{
+    return member != nullptr && *member;
+}
+
+// A copy of a shared record, for changes.
+template <class T> T *copy_of(call &c, const T &original)
+{
+    T *const copy = make<T>(c.ctx);
+    *copy = original;
+    copy->soap = c.ctx;
+    return copy;
+}
+
+// The record of an update as far as the order wants it.
+update_record *meta_data_for(call &c, const order &o, const update_record &update)
+{
+    update_record *const told = copy_of(c, update);
+    if (!is_true(o.includeCorrected))
+        told->corrected.clear();
+    if (o.includeOperatingPlatforms && is_true(o.includeFixableComponents))
+        return told;
+    for (protocol__Identity *&subject : told->subject) {
+        subject = copy_of(c, *subject);
+        if (!o.includeOperatingPlatforms)
+            subject->operatingPlatform = nullptr;
+        if (!is_true(o.includeFixableComponents))
+            subject->fixableComponent = subject->fixableComponentName = subject->fixableComponentVersion =
+                nullptr;
+    }
+    return told;
+}
+
+void tell_chosen(call &c, order &o, const update_record &update)
+{
+    o.updateIdExpansion.push_back(text_of(update.updateId));
+    if (!o.includeUpdateIdExpansionDetail)
+        return;
+    auto *const told = make<detail>(c.ctx);
+    told->updateId = update.updateId;
+    told->updateIdQualifier = update.updateIdQualifier;
+    if (o.includeMetaData)
+        told->metaData.push_back(meta_data_for(c, o, update));
+    o.updateIdExpansionDetail.push_back(told);
+}
+
+// An update that isn't known is told whether details are wanted or not: it is what keeps the order from being
+// complete.
+void tell_unknown(call &c, order &o, const unknown_update &unknown)
+{
+    auto *const told = make<detail>(c.ctx);
+    told->updateId = make_text(c.ctx, unknown.id);
+    if (!unknown.qualifier.empty())
+        told->updateIdQualifier = make_text(c.ctx, unknown.qualifier);
+    auto *const fault = make_fault<protocol__Client_x002eObjectNotFound>(
+        c.ctx, "No update has the identifier " + unknown.id + ".");
+    fault->uri.push_back(unknown.id);
+    told->error = fault;
+    o.updateIdExpansionDetail.push_back(told);
+}
+
+// Null if the service can deliver as one of the preferences asks.
+protocol__Fault *undeliverable(call &c, const order &o)
+{
+    protocol__Fault *fault = nullptr;
+    for (const protocolUpdateOrder__DeliveryPreference *wish : o.deliveryPreference) {
+        if (wish == nullptr)
+            continue;
+        if (wish->medium != nullptr && *wish->medium == protocol__Medium::physical) {
+            auto *const refused = make_fault<protocol__Client_x002eDeliveryIncompatibility>(
+                c.ctx, "The service delivers electronically only.");
+            refused->deliverySupported.push_back(make<protocol__DeliverySupported>(c.ctx));
+            refused->deliverySupported.back()->medium = make_value(c.ctx, protocol__Medium::electronic);
+            fault = refused;
+        } else if (protocol__Fault *const port =
+                       incompatibility(c, wish->dataPortPreference, protocol__Direction::out)) {
+            fault = port;
+        } else {
+            return nullptr;
+        }
+    }
+    return fault;
+}
+
+protocol__Attachment *delivery_of(call &c, const update_record &update)
+{
+    protocol__Attachment *const delivered = copy_of(c, update_package());
+    const std::string name = std::string(UPDATE_DATA) + text_of(update.updateId);
+    delivered->thisURI = make_text(c.ctx, "urn:zuv:attachment:" + fresh_uuid());
+    delivered->state = make_value(c.ctx, protocol__AttachmentState::pending);
+    delivered->size = update.size;
+    delivered->reference.push_back(text_of(update.updateId));
+    delivered->dataPort.push_back(make_data_port(c, protocol__Direction::out, name));
+    delivered->dataPort.front()->attachmentURI = delivered->thisURI;
+    delivered->dataURI = delivered->dataPort.front()->dataURI;
+    return delivered;
+}
+
+state deliver(call &c, order &o, const expansion &found)
+{
+    if (found.chosen.empty())
+        return state::complete_x002enoUpdates;
+    protocol__Fault *const fault = o.includeData ? undeliverable(c, o) : nullptr;
+    if (fault != nullptr) {
+        o.error.push_back(fault);
+        return found.unknown.empty() ? state::preprocessed_x002eidentified
+                                     : state::preprocessed_x002eidentified_x002epartial;
+    }
+    for (const chosen_update &chosen : found.chosen)
+        if (o.includeData && text_of(chosen.update->size) != "0")
+            o.attachment.push_back(delivery_of(c, *chosen.update));
+    return found.unknown.empty() ? state::complete_x002eavailable
+                                 : state::complete_x002eavailable_x002epartial;
+}
+
+expansion expansion_of(call &c, const order &o)
+{
+    if (!names_updates(o))
+        refuse<protocol__Client_x002eInsufficientInformation>(
+            c.ctx, "The order names no updates: neither identifiers nor a scope nor a filter.");
+    try {
+        return expand(c.ctx, the_catalogue(), o);
+    } catch (const filter_error &error) {
+        refuse_filter(c.ctx, error);
+    }
+}
+
+order *submit(call &c, order &request)
+{
+    const expansion found = expansion_of(c, request);
+    request.updateIdExpansion.clear();
+    request.updateIdExpansionDetail.clear();
+    request.error.clear();
+    for (const chosen_update &chosen : found.chosen)
+        tell_chosen(c, request, *chosen.update);
+    for (const unknown_update &unknown : found.unknown)
+        tell_unknown(c, request, unknown);
+    request.state = make_value(c.ctx, deliver(c, request, found));
+    rules_of(c).documents().keep(request);
+    return &request;
+}
+
+order *get(call &c, _protocolUpdateOrder__getRequest &)
+{
+    return rules_of(c).get();
+}
+
+order *close(call &c, _protocolUpdateOrder__closeRequest &)
+{
+    return rules_of(c).end(state::closed);
+}
+
+order *cancel(call &c, _protocolUpdateOrder__cancelRequest &)
+{
+    return rules_of(c).end(state::cancelled);
+}
+
+order *remove(call &c, order &request)
+{
+    return rules_of(c).remove(request);
+}
+
+constexpr operation OPERATIONS[] = {
+    row<get>("protocolUpdateOrder:getRequest", "protocolUpdateOrder:getResponse"),
+    row<submit>("protocolUpdateOrder:submitRequest", "protocolUpdateOrder:submitResponse"),
+    row<close>("protocolUpdateOrder:closeRequest", "protocolUpdateOrder:closeResponse"),
+    row<cancel>("protocolUpdateOrder:cancelRequest", "protocolUpdateOrder:cancelResponse"),
+    row<remove>("protocolUpdateOrder:removeRequest", "protocolUpdateOrder:removeResponse"),
+    row<authenticate>("protocolUpdateOrder:authenticateRequest", "protocolUpdateOrder:authenticateResponse"),
+};
+
+} // namespace
+
+const port update_order_port = {.name = "UpdateOrder", .operations = OPERATIONS};
+
+} // namespace service

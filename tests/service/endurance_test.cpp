@@ -1,0 +1,202 @@
+// endurance_test.cpp - what the service outlives: garbage, cut requests, its own violent end, many clients at
+// once.
+#include <atomic>
+#include <random>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+#include <zuv_client_pro/ProfileSoapBindingProxy.h>
+#include <zuv_client_pro/soap_log.h>
+
+#include "service/raw_client.h"
+#include "service/service_process.h"
+
+using namespace service_test;
+
+namespace {
+
+std::string create_request(const std::string &name)
+{
+    return post("Profile", soap11("<protocolProfile:createRequest><protocol:identity><protocol:name>" + name +
+                                  "</protocol:name></protocol:identity></protocolProfile:createRequest>"));
+}
+
+std::string get_request(const std::string &uri)
+{
+    return post("Profile", soap11("<protocolProfile:getRequest/>",
+                                  "<protocol:targetURI>" + uri + "</protocol:targetURI>"));
+}
+
+void expect_useful(service_process &service)
+{
+    ASSERT_TRUE(service.running());
+    EXPECT_EQ(exchange(service.port(), create_request("x")).status, 200);
+}
+
+// Sends the bytes, then the end; reads whatever comes.
+raw_answer send_and_end(int port, std::string_view bytes)
+{
+    raw_client client(port);
+    client.send(bytes);
+    client.end_sending();
+    return client.receive();
+}
+
+} // namespace
+
+TEST(Endurance, GarbageEndsNothing)
+{
+    service_process service;
+    std::mt19937 random(20240501); // the same garbage each time
+    const std::string good = create_request("Ada");
+    for (int i = 0; i < 300; ++i) {
+        std::string bytes;
+        if (i % 3 == 0) { // nothing but noise
+            bytes.resize(random() % 2000);
+            for (char &c : bytes)
+                c = static_cast<char>(random());
+        } else { // a request with some bytes changed, in the head too or only in the message
+            bytes = good;
+            const std::size_t first = i % 3 == 1 ? 0 : good.find("\r\n\r\n") + 4;
+            for (int n = 0; n < 5; ++n)
+                bytes[first + random() % (bytes.size() - first)] = static_cast<char>(random());
+        }
+        send_and_end(service.port(), bytes);
+    }
+    expect_useful(service);
+    EXPECT_EQ(service.stop(), 0);
+}
+
+TEST(Endurance, CutRequestsEndNothingAndChangeNothing)
+{
+    service_process service;
+    const std::string good = create_request("Ada");
+    const std::size_t head = good.find("\r\n\r\n") + 4;
+    for (std::size_t length = 0; length < good.size(); length += length < head ? 1 : 7) {
+        const raw_answer answer = send_and_end(service.port(), std::string_view(good).substr(0, length));
+        EXPECT_NE(answer.status, 200) << "cut at " << length;
+        if (length >= head) {
+            EXPECT_EQ(answer.status, 400) << "cut at " << length;
+        }
+    }
+    expect_useful(service);
+    EXPECT_EQ(service.stop(), 0);
+}
+
+TEST(Endurance, HostileMessagesEndNothing)
+{
+    service_process service;
+    std::string deep, references;
+    for (int i = 0; i < 100000; ++i)
+        deep += "<protocolProfile:profile>";
+    for (int i = 0; i < 40; ++i) // each object twice in the one before: 2^40 elements if written as a tree
+        references += "<protocolProfile:profile id=\"p" + std::to_string(i) +
+                      "\"><protocolProfile:profile href=\"#p" + std::to_string(i + 1) +
+                      "\"/><protocolProfile:profile href=\"#p" + std::to_string(i + 1) +
+                      "\"/></protocolProfile:profile>";
+    references += "<protocolProfile:profile id=\"p40\"/>";
+    const std::string cycle =
+        "<protocolProfile:createRequest><protocolProfile:profile id=\"a\"><protocolProfile:profile "
+        "href=\"#a\"/></protocolProfile:profile></protocolProfile:createRequest>";
+    const std::string requests[] = {
+        soap11("<protocolProfile:createRequest>" + deep),
+        soap11("<protocolProfile:createRequest>" + references + "</protocolProfile:createRequest>"),
+        soap11(cycle),
+        soap11("<protocolProfile:createRequest id=\"a\"><protocolProfile:profile href=\"#a\"/>"
+               "</protocolProfile:createRequest>"),
+        soap11("<protocolProfile:createRequest xsi:type=\"protocol:Identity\"/>"),
+        soap11("<protocolProfile:createRequest xsi:nil=\"true\"/>"),
+        soap11("<protocolProfile:addRequest><protocol:credentials "
+               "xsi:nil=\"true\"/></protocolProfile:addRequest>",
+               "<protocol:credentials xsi:nil=\"true\"/><protocol:targetURI>u</protocol:targetURI>"),
+        "<!DOCTYPE a [<!ENTITY b \"" + std::string(1000, 'b') + "\">]>" + soap11("&b;&b;"),
+    };
+    for (const std::string &request : requests) {
+        const raw_answer answer = exchange(service.port(), post("Profile", request));
+        EXPECT_NE(answer.status, 0) << request.substr(0, 1500);
+    }
+    expect_useful(service);
+    EXPECT_EQ(service.stop(), 0);
+}
+
+TEST(Endurance, AcknowledgedDocumentsOutliveAKilledService)
+{
+    scratch_directory directory;
+    const std::vector<std::string> options = {"--database", directory.file("documents.db")};
+    std::vector<std::string> uris;
+    {
+        service_process service(options);
+        std::atomic<bool> busy = false;
+        std::thread writer([&] { // one client keeps writing until the service dies
+            raw_client client(service.port());
+            for (;;) {
+                client.send(create_request("Ada " + std::to_string(uris.size())));
+                const raw_answer answer = client.receive();
+                if (answer.status != 200 || element_text(answer.body, "thisURI").empty())
+                    return;
+                uris.push_back(element_text(answer.body, "thisURI"));
+                busy = busy || uris.size() >= 20;
+                busy.notify_all();
+            }
+        });
+        busy.wait(false);
+        service.kill();
+        writer.join();
+    }
+    ASSERT_GE(uris.size(), 20u);
+    service_process again(options);
+    for (std::size_t i = 0; i < uris.size(); ++i) {
+        const raw_answer answer = exchange(again.port(), get_request(uris[i]));
+        ASSERT_EQ(answer.status, 200) << i;
+        EXPECT_EQ(element_text(answer.body, "name"), "Ada " + std::to_string(i));
+    }
+    EXPECT_EQ(again.stop(), 0);
+}
+
+TEST(Endurance, ManyClientsWorkSideBySide)
+{
+    constexpr int CLIENTS = 8, CALLS = 25;
+    service_process service({"--connections", "6"}); // fewer than there are clients: some wait
+    const std::string url = service.url("Profile");
+    ProfileSoapBindingProxy first(url.c_str());
+    __protocolProfile__createResponse created{};
+    protocolProfile__ProfileContent profile;
+    soap_log_set_received(&first, nullptr);
+    soap_log_set_sent(&first, nullptr);
+    ASSERT_EQ(first.create(&profile, created), 0);
+    std::string uri = created.result->thisURI.at(0);
+    std::vector<std::thread> clients;
+    std::atomic<int> failures = 0;
+    for (int n = 0; n < CLIENTS; ++n)
+        clients.emplace_back([&] {
+            ProfileSoapBindingProxy proxy(url.c_str(), static_cast<int>(MODE_KEEP_ALIVE));
+            soap_log_set_received(&proxy, nullptr);
+            soap_log_set_sent(&proxy, nullptr);
+            protocol__Contact contact;
+            protocolProfile__ProfileContent more;
+            more.contact.push_back(&contact);
+            protocol__Header header;
+            header.targetURI = &uri;
+            for (int i = 0; i < CALLS; ++i) { // all of them change one document
+                __protocolProfile__addResponse added{};
+                proxy.soap_header(&header);
+                failures += proxy.add(&more, added) != 0;
+                proxy.destroy();
+            }
+        });
+    for (std::thread &client : clients)
+        client.join();
+    EXPECT_EQ(failures, 0);
+    protocol__Header header;
+    header.targetURI = &uri;
+    first.soap_header(&header);
+    _protocolProfile__getRequest get;
+    __protocolProfile__getResponse got{};
+    ASSERT_EQ(first.get(&get, got), 0);
+    EXPECT_EQ(got.result->contact.size(), static_cast<std::size_t>(CLIENTS * CALLS)) << "no change was lost";
+    first.soap_force_close_socket();
+    EXPECT_EQ(service.stop(), 0);
+}

@@ -1,0 +1,288 @@
+// update_order_port_test.cpp - update orders, authentication and queries over the wire.
+#include <string>
+
+#include <gtest/gtest.h>
+
+#include <zuv_client_pro/UpdateOrderSoapBindingProxy.h>
+#include <zuv_client_pro/protocolUpdateOrderFilter.h>
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_log.h>
+
+#include "service/raw_client.h"
+#include "service/service_process.h"
+
+using namespace service_test;
+
+namespace {
+
+using state = protocolUpdateOrder__UpdateOrderState;
+using order = protocolUpdateOrder__UpdateOrderContent;
+
+class UpdateOrder : public testing::Test {
+protected:
+    UpdateOrder() : proxy(url.c_str(), static_cast<int>(MODE_KEEP_ALIVE | MODE_UTF_STRINGS))
+    {
+        soap_log_set_received(&proxy, nullptr);
+        soap_log_set_sent(&proxy, nullptr);
+    }
+
+    const order *submit(order &o)
+    {
+        __protocolUpdateOrder__submitResponse response{};
+        proxy.soap_noheader();
+        error = proxy.submit(&o, response);
+        return response.result;
+    }
+
+    service_process service{{"--account", "ada:sesame", "--account", "bob:x"}};
+    std::string url = service.url("UpdateOrder");
+    UpdateOrderSoapBindingProxy proxy;
+    int error = 0;
+};
+
+} // namespace
+
+TEST_F(UpdateOrder, TellsWhatItFoundAndDeliversIt)
+{
+    order o;
+    o.updateId = {"FW-120", "NONE-1"};
+    o.includeRequisites = o.includeMetaData = true;
+    const order *const answered = submit(o);
+    ASSERT_NE(answered, nullptr);
+    EXPECT_EQ(*answered->state, state::complete_x002eavailable_x002epartial);
+    EXPECT_EQ(answered->updateIdExpansion, (std::vector<std::string>{"FW-120", "BIOS-20", "DRV-5"}));
+    ASSERT_EQ(answered->updateIdExpansionDetail.size(), 4u);
+    const auto *const meta = dynamic_cast<protocolUpdateOrder__UpdateMetaData *>(
+        answered->updateIdExpansionDetail[0]->metaData.at(0));
+    ASSERT_NE(meta, nullptr);
+    EXPECT_EQ(*meta->name, "Array firmware 1.2");
+    EXPECT_TRUE(meta->corrected.empty()) << "not asked for";
+    EXPECT_EQ(meta->subject.at(0)->operatingPlatform, nullptr);
+    EXPECT_NE(dynamic_cast<protocolUpdateOrder__Corequisite *>(meta->requisite.at(1)), nullptr);
+    const auto &unknown = *answered->updateIdExpansionDetail[3];
+    EXPECT_EQ(*unknown.updateId, "NONE-1");
+    const auto *const fault = dynamic_cast<protocol__Client_x002eObjectNotFound *>(unknown.error);
+    ASSERT_NE(fault, nullptr);
+    EXPECT_EQ(fault->uri, std::vector<std::string>{"NONE-1"});
+
+    ASSERT_EQ(answered->attachment.size(), 3u);
+    const protocol__Attachment &delivered = *answered->attachment[0];
+    EXPECT_EQ(*delivered.dataPort.at(0)->direction, protocol__Direction::out);
+    const std::string &where = *delivered.dataURI;
+    const raw_answer data =
+        exchange(service.port(), "GET " + where.substr(where.find("/zuv/")) + " HTTP/1.1\r\nHost: x\r\n\r\n");
+    EXPECT_EQ(data.status, 200);
+    EXPECT_EQ(std::to_string(data.body.size()), *delivered.size);
+
+    // The order stays as it was answered.
+    std::string uri = answered->thisURI.at(0);
+    protocol__Header header;
+    header.targetURI = &uri;
+    _protocolUpdateOrder__getRequest get;
+    __protocolUpdateOrder__getResponse got{};
+    proxy.soap_header(&header);
+    ASSERT_EQ(proxy.get(&get, got), 0);
+    EXPECT_EQ(got.result->updateIdExpansion.size(), 3u);
+    _protocolUpdateOrder__cancelRequest cancel;
+    __protocolUpdateOrder__cancelResponse cancelled{};
+    proxy.soap_header(&header);
+    ASSERT_EQ(proxy.cancel(&cancel, cancelled), 0);
+    EXPECT_EQ(*cancelled.result->state, state::cancelled);
+    _protocolUpdateOrder__closeRequest close;
+    __protocolUpdateOrder__closeResponse closed{};
+    proxy.soap_header(&header);
+    EXPECT_EQ(proxy.close(&close, closed), SOAP_CLIENT_FAULT);
+    __protocolUpdateOrder__removeResponse removed{};
+    proxy.soap_header(&header);
+    EXPECT_EQ(proxy.remove(&o, removed), 0);
+}
+
+TEST_F(UpdateOrder, StateSaysHowFarTheOrderCame)
+{
+    order named, nothing, unknown, bare;
+    named.updateId = {"FW-100"};
+    named.includeData = named.includeUpdateIdExpansionDetail = false;
+    const order *answered = submit(named);
+    ASSERT_NE(answered, nullptr);
+    EXPECT_EQ(*answered->state, state::complete_x002eavailable);
+    EXPECT_TRUE(answered->updateIdExpansionDetail.empty());
+    EXPECT_TRUE(answered->attachment.empty());
+    nothing.updateScope = {"tape"};
+    EXPECT_EQ(*submit(nothing)->state, state::complete_x002enoUpdates);
+    unknown.updateId = {"X"};
+    answered = submit(unknown);
+    EXPECT_EQ(*answered->state, state::complete_x002enoUpdates);
+    EXPECT_EQ(answered->updateIdExpansionDetail.size(), 1u);
+    EXPECT_EQ(submit(bare), nullptr);
+    EXPECT_NE(proxy.soap_fault()->detail->Client_x002eInsufficientInformation, nullptr);
+}
+
+TEST_F(UpdateOrder, TellsWhatItCannotDeliver)
+{
+    protocol__Medium physical = protocol__Medium::physical;
+    protocol__DataPortPreference ftp;
+    ftp.transport = {protocol__Transport::FTP};
+    protocolUpdateOrder__DeliveryPreference by_post, by_ftp, by_any;
+    by_post.medium = &physical;
+    by_ftp.dataPortPreference = &ftp;
+    order o;
+    o.updateId = {"FW-100"};
+    o.deliveryPreference = {&by_post};
+    const order *answered = submit(o);
+    ASSERT_NE(answered, nullptr);
+    EXPECT_EQ(*answered->state, state::preprocessed_x002eidentified);
+    const auto *const delivery =
+        dynamic_cast<protocol__Client_x002eDeliveryIncompatibility *>(answered->error.at(0));
+    ASSERT_NE(delivery, nullptr);
+    EXPECT_EQ(*delivery->deliverySupported.at(0)->medium, protocol__Medium::electronic);
+    o.deliveryPreference = {&by_ftp};
+    answered = submit(o);
+    EXPECT_NE(dynamic_cast<protocol__Client_x002eDataPortIncompatibility *>(answered->error.at(0)), nullptr);
+    o.deliveryPreference = {&by_ftp, &by_any};
+    EXPECT_EQ(*submit(o)->state, state::complete_x002eavailable) << "one way that works is enough";
+}
+
+TEST_F(UpdateOrder, RefusesFiltersThatItCannotJudge)
+{
+    std::string category = "critical";
+    protocolUpdateOrderFilter__CategoryComparison leaf;
+    leaf.category = &category;
+    protocolUpdateOrderFilter__Or wide;
+    wide.operand.assign(200, &leaf);
+    protocolUpdateOrderFilter__And all;
+    all.operand.assign(200, &wide);
+    protocolUpdateOrderFilter__Filter filter;
+    filter.expression = &wide;
+    order o;
+    o.inclusionFilter = {&filter};
+    EXPECT_EQ(submit(o)->updateIdExpansion, (std::vector<std::string>{"FW-120", "DB-10-P1"}));
+    std::vector<protocolUpdateOrderFilter__Not> deep(150);
+    for (std::size_t i = 0; i < deep.size(); ++i)
+        deep[i].operand =
+            i + 1 < deep.size() ? static_cast<protocolUpdateOrderFilter__FilterNode *>(&deep[i + 1]) : &leaf;
+    filter.expression = &deep[0];
+    EXPECT_EQ(submit(o), nullptr);
+    EXPECT_EQ(error, SOAP_SERVER_FAULT);
+    EXPECT_NE(proxy.soap_fault()->detail->Server_x002eUnsupportedRequest_x002eFilterExpressionTooComplex,
+              nullptr);
+    protocolUpdateOrderFilter__FilterNode nothing;
+    filter.expression = &nothing;
+    EXPECT_EQ(submit(o), nullptr);
+    EXPECT_NE(proxy.soap_fault()->detail->Client_x002eMalformedRequest, nullptr);
+}
+
+TEST_F(UpdateOrder, AuthenticatesNestedRequests)
+{
+    std::string ada = "ada", sesame = "sesame", wrong = "sesamf", eve = "eve";
+    protocol__Credentials good, mismatch, stranger, lacking;
+    good.username = mismatch.username = lacking.username = &ada;
+    good.password = &sesame;
+    mismatch.password = stranger.password = &wrong;
+    stranger.username = &eve;
+    protocolUpdateOrder__AuthenticateRequest top, second, third, fourth;
+    top.credentials = &good;
+    second.credentials = &mismatch;
+    third.credentials = &stranger;
+    fourth.credentials = &lacking;
+    top.authenticateRequest = {&second, &third};
+    third.authenticateRequest = {&fourth};
+    __protocolUpdateOrder__authenticateResponse response{};
+    ASSERT_EQ(proxy.authenticate(&top, response), 0);
+    const auto &first = *response.result;
+    EXPECT_TRUE(first.success);
+    EXPECT_TRUE(first.error.empty());
+    EXPECT_EQ(*first.credentials->username, ada);
+    EXPECT_EQ(first.credentials->password, nullptr) << "secrets are not sent back";
+    ASSERT_EQ(first.authenticateResponse.size(), 2u);
+    EXPECT_FALSE(first.authenticateResponse[0]->success);
+    EXPECT_NE(dynamic_cast<protocol__Client_x002eAuthentication_x002eCredentialsMismatch *>(
+                  first.authenticateResponse[0]->error.at(0)),
+              nullptr);
+    EXPECT_NE(dynamic_cast<protocol__Client_x002eAuthentication_x002eNotRecognized *>(
+                  first.authenticateResponse[1]->error.at(0)),
+              nullptr);
+    EXPECT_NE(dynamic_cast<protocol__Client_x002eInsufficientInformation *>(
+                  first.authenticateResponse[1]->authenticateResponse.at(0)->error.at(0)),
+              nullptr);
+}
+
+// A request that refers to itself nests without end.
+TEST_F(UpdateOrder, RefusesRequestsWithoutEnd)
+{
+    const std::string content =
+        "<protocolUpdateOrder:authenticateRequest><protocolUpdateOrder:authenticateRequest id=\"a\">"
+        "<protocolUpdateOrder:authenticateRequest href=\"#a\"/>"
+        "</protocolUpdateOrder:authenticateRequest></protocolUpdateOrder:authenticateRequest>";
+    const raw_answer answer = exchange(service.port(), post("UpdateOrder", soap11(content)));
+    EXPECT_EQ(answer.status, 500);
+    EXPECT_NE(answer.body.find("Client.InvalidRequest"), std::string::npos) << answer.body;
+    EXPECT_TRUE(service.running());
+}
+
+TEST(Query, AnswersEachOfABatch)
+{
+    service_process service;
+    const std::string report = "<protocolProblemReport:submitRequest><protocolProblemReport:title>Smoke"
+                               "</protocolProblemReport:title></protocolProblemReport:submitRequest>";
+    ASSERT_EQ(exchange(service.port(), post("ProblemReport", soap11(report))).status, 200);
+    const auto query = [&](const std::string &type, const std::string &content = {}) {
+        const std::string request = "<protocol:QueryRequests><protocol:queryRequest xsi:type=\"" + type +
+                                    "\">" + content + "</protocol:queryRequest></protocol:QueryRequests>";
+        return exchange(service.port(), post("Query", soap11(request))).body;
+    };
+    struct row {
+        const char *type;
+        std::string content;
+        const char *present, *absent;
+    };
+    const std::string hierarchy = "<protocolUpdateOrder:formProductCollectionHierarchy>true"
+                                  "</protocolUpdateOrder:formProductCollectionHierarchy>";
+    const std::string tape_root = "<protocolUpdateOrder:productCollectionHierarchyRoot>storage"
+                                  "</protocolUpdateOrder:productCollectionHierarchyRoot>";
+    const std::string prune = "<protocolUpdateOrder:recursivelyPruneEmptyProductCollectionLeaves>true"
+                              "</protocolUpdateOrder:recursivelyPruneEmptyProductCollectionLeaves>";
+    const std::string german =
+        "<protocol:inclusionFilter xsi:type=\"protocolUpdateOrderFilter:Filter\">"
+        "<protocolUpdateOrderFilter:expression xsi:type=\"protocolUpdateOrderFilter:"
+        "LanguageNameComparison\" compareOp=\"equal\"><protocolUpdateOrderFilter:languageName>Deutsch"
+        "</protocolUpdateOrderFilter:languageName></protocolUpdateOrderFilter:expression>"
+        "</protocol:inclusionFilter>";
+    const row rows[] = {
+        {"protocolProblemReport:QueryReportsRequest", "", "Smoke", "protocol:error"},
+        {"protocolProblemReport:QueryPatternReportsRequest", "", "Index is corrupt after restart", "Smoke"},
+        {"protocol:QueryRecognizedSubjectsRequest", "", "ZX100 disk array", "ZX200"},
+        {"protocol:QueryRecognizedSubjectsRequest",
+         "<protocol:includeSubjectProperty>product</"
+         "protocol:includeSubjectProperty><protocol:includeSubjectProperty>"
+         "operatingPlatform_name</protocol:includeSubjectProperty>",
+         "<protocol:product>ZX100</protocol:product><protocol:operatingPlatform><protocol:name>zxos</"
+         "protocol:name>"
+         "</protocol:operatingPlatform>",
+         "ZX100 disk array"},
+        {"protocol:QueryRecognizedLanguagesRequest", "",
+         "Fran\xC3\xA7"
+         "ais",
+         "protocol:error"},
+        {"protocol:QueryRecognizedLanguagesRequest", german, "Deutsch", "English"},
+        {"protocol:QueryRecognizedCountriesRequest", "", "Austria", "protocol:error"},
+        {"protocolUpdateOrder:QueryRecognizedProductCollectionsRequest", "", "Servers", "recognizedSubject"},
+        {"protocolUpdateOrder:QueryRecognizedProductCollectionsRequest",
+         "<protocolUpdateOrder:includeSubjects>true</protocolUpdateOrder:includeSubjects>" + prune,
+         "<protocol:product>ZDB</protocol:product>", "Servers"},
+        {"protocolUpdateOrder:QueryRecognizedProductCollectionsRequest", hierarchy + tape_root + prune,
+         "<protocolUpdateOrder:productCollection>disk<", "tape"},
+        {"protocolUpdateOrder:QueryRecognizedCategoriesRequest", "", "A group of updates", "protocol:error"},
+        {"protocolUpdateOrder:QueryRecognizedAttributesRequest", "", "reboot", "protocol:error"},
+        {"protocol:QueryRequest", "", "Server.UnsupportedRequest", "recognized"},
+        {"protocol:QueryRecognizedLanguagesRequest", "<protocol:inclusionFilter/>", "Client.MalformedRequest",
+         "English"},
+    };
+    for (const row &r : rows) {
+        const std::string body = query(r.type, r.content);
+        EXPECT_NE(body.find(r.present), std::string::npos) << r.type << '\n' << body;
+        EXPECT_EQ(body.find(r.absent), std::string::npos) << r.type << '\n' << body;
+    }
+    const raw_answer typed =
+        exchange(service.port(), post("Query", soap12("<any xsi:type=\"protocol:PingRequest\"/>")));
+    EXPECT_NE(typed.body.find("protocol:PingResponse"), std::string::npos) << typed.body;
+}
