@@ -1,0 +1,109 @@
+// engine_run.cpp - the message's part of a call: the same steps in the same order as the proxies'
+// (src/proxies/call.cpp).
+#include "engine_run.h"
+
+#include <algorithm>
+#include <cstring>
+
+#include <zuv_client_pro/soap_envelope.h>
+#include <zuv_client_pro/soap_identity.h>
+#include <zuv_client_pro/soap_io.h>
+#include <zuv_client_pro/soap_log.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include "binding/class_ops.h"
+#include "law_protocolProblemReport.h"
+
+namespace {
+
+using report_class = protocolProblemReport__ProblemReportContent;
+
+constexpr char ELEMENT[] = "protocolProblemReport:submitRequest";
+
+const binding::class_ops &ops = binding::law<report_class>::ops;
+
+int write_message(soap *ctx, const report_class &report)
+{
+    if (soap_envelope_out_begin(ctx) || soap_header_put(ctx) || soap_body_out_begin(ctx) ||
+        binding::class_pointer_out(ctx, ops, ELEMENT, -1, &report, "") || soap_body_out_end(ctx) ||
+        soap_envelope_out_end(ctx))
+        return ctx->error;
+    return 0;
+}
+
+} // namespace
+
+engine_run::engine_run() : soap(0, MODE_BUFFERED)
+{
+    on_send = take;
+    on_recv = give;
+    soap_log_set_received(this, nullptr);
+    soap_log_set_sent(this, nullptr);
+    soap_set_namespaces(this, soap_program_namespaces);
+}
+
+int engine_run::take(soap *ctx, const char *data, std::size_t length)
+{
+    auto &run = *static_cast<engine_run *>(ctx);
+    run.sent += length;
+    if (run.kept)
+        run.kept->append(data, length);
+    return 0;
+}
+
+std::size_t engine_run::give(soap *ctx, char *buffer, std::size_t length)
+{
+    auto &run = *static_cast<engine_run *>(ctx);
+    length = std::min(length, run.unread_length);
+    std::memcpy(buffer, run.unread, length);
+    run.unread += length;
+    run.unread_length -= length;
+    return length;
+}
+
+std::size_t engine_run::write(const report_class &report)
+{
+    sent = 0;
+    encoding_style = nullptr;
+    soap_reset_call(this);
+    soap_mark_header(this);
+    binding::class_pointer_mark(this, ops, &report);
+    if (soap_count_begin(this) || !(mode & MODE_COUNTING) || write_message(this, report) ||
+        soap_count_end(this))
+        return 0;
+    const std::size_t counted = static_cast<std::size_t>(soap_message_length(this));
+    if (soap_send_begin(this) || write_message(this, report) || soap_send_finish(this))
+        return 0;
+    return sent == counted ? sent : 0;
+}
+
+std::string engine_run::written(const report_class &report)
+{
+    std::string message;
+    kept = &message;
+    if (write(report) == 0)
+        message.clear();
+    kept = nullptr;
+    return message;
+}
+
+report_class *engine_run::read(const std::string &message)
+{
+    unread = message.data();
+    unread_length = message.size();
+    void *report = nullptr;
+    soap_reset_call(this);
+    if (soap_receive_begin(this) || soap_envelope_in_begin(this) || soap_header_get(this) ||
+        soap_body_in_begin(this) || !binding::class_pointer_in(this, ops, ELEMENT, &report) ||
+        !binding::independents_read(this) || soap_body_in_end(this) || soap_envelope_in_end(this) ||
+        soap_receive_finish(this))
+        return nullptr;
+    return static_cast<report_class *>(report);
+}
+
+void engine_run::release()
+{
+    soap_discard_objects(this, nullptr);
+    soap_discard_all(this);
+}
