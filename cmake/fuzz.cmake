@@ -7,4 +7,10 @@ foreach(source ${ZUV_FUZZ_TARGETS})
         ${ZUV_GENERATED_DIR}/src)
     target_link_libraries(${name} PRIVATE zuv_objects)
     target_link_options(${name} PRIVATE -fsanitize=fuzzer)
+    # Seeds and old findings, then a few seconds of fuzzing.
+    string(REPLACE "_fuzz" "" target ${name})
+    add_test(NAME ${name} COMMAND ${name} -max_total_time=10 -timeout=10 -rss_limit_mb=2048 -verbosity=0
+        ${PROJECT_BINARY_DIR}/corpus/${target} ${PROJECT_SOURCE_DIR}/tests/fuzz/corpus/${target})
+    file(MAKE_DIRECTORY ${PROJECT_BINARY_DIR}/corpus/${target})
+    set_tests_properties(${name} PROPERTIES LABELS fuzz TIMEOUT 120)
 endforeach()

@@ -26,3 +26,6 @@ target_compile_definitions(zuv_test_support PUBLIC ZUV_GOLDEN_DIR="${PROJECT_SOU
 # Another parser beside the reader.
 find_package(LibXml2 REQUIRED)
 target_link_libraries(xml_reference_test PRIVATE LibXml2::LibXml2)
+if(ZUV_FUZZ OR ZUV_SANITIZE)
+    target_compile_definitions(zuv_test_support PUBLIC ZUV_SANITIZED)
+endif()
