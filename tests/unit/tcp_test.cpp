@@ -1,8 +1,8 @@
 // tcp_test.cpp - sockets of a context against peers on the loopback.
 #include <cerrno>
-#include <optional>
 #include <fcntl.h>
 #include <netinet/tcp.h>
+#include <optional>
 #include <sstream>
 #include <vector>
 
