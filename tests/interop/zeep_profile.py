@@ -4,85 +4,79 @@
 Usage: zeep_profile.py ZUV_SERVICE SCHEMA_DIR. Every request and every answer is validated against the published schemas.
 """
 import os
-import subprocess
 import sys
-import tempfile
 
 import zeep
 from lxml import etree
 
+import messages
 import zuv_service
-
-PROFILE = "{http://www.zuv.example/xmlns/b2b/zuv/v1.0/Profile}"
-COMMON = "{http://www.zuv.example/xmlns/b2b/zuv/v1.0}"
 
 
 class Recorder(zeep.Plugin):
-    """Keeps the Body's child of each message."""
+    """Keeps what the schemas describe in each message."""
 
     def __init__(self):
-        self.bodies = []
-
-    def keep(self, envelope):
-        body = next(child for child in envelope if etree.QName(child).localname == "Body")
-        if len(body) and etree.QName(body[0]).localname != "Fault":
-            self.bodies.append(etree.tostring(body[0]))
+        self.elements = []
 
     def egress(self, envelope, http_headers, operation, binding_options):
-        self.keep(envelope)
+        self.elements += messages.parts(envelope)
         return envelope, http_headers
 
     def ingress(self, envelope, http_headers, operation):
-        self.keep(envelope)
+        self.elements += messages.parts(envelope)
         return envelope, http_headers
 
 
 def call_all(wsdl, address, soap12):
     recorder = Recorder()
     client = zeep.Client(wsdl, plugins=[recorder])
-    binding = PROFILE + ("ProfileSoap12Binding" if soap12 else "ProfileSoapBinding")
-    service = client.create_service(binding, address + "/zuv/v1.0/services/Profile")
-    header = client.get_element(COMMON + "header")
+    binding = "{%s}%s" % (messages.PROFILE, "ProfileSoap12Binding" if soap12 else "ProfileSoapBinding")
+    service = client.create_service(binding, address + zuv_service.PATH)
+    header = client.get_element("{%s}header" % messages.COMMON)
 
-    created = service.create(state="active", identity={"name": "Zoë's workshop"},
-                             contact=[{"name": "Zoë", "email": ["zoe@workshop.example"]}],
-                             credentials=[{"username": "zoe"}])
-    created = getattr(created, "body", created)
+    def call(operation, uri=None, **content):
+        block = header(targetURI=uri, transactionId="transaction-" + operation)
+        answer = service[operation](_soapheaders={"header": block}, **content)
+        assert answer.header.header.transactionId == "transaction-" + operation, answer
+        return answer.body
+
+    created = call("create", identity={"name": "Zoë's workshop", "type": "organization"},
+                   contact=[{"name": "Zoë", "email": ["zoe@workshop.example"]}],
+                   credentials=[{"username": "zoe", "certificate": b"\0\1\xfe\xff"}],
+                   profile=[{"identity": {"name": "inner"}}])
     uri = created.thisURI[0]
-    target = {"header": header(targetURI=uri)}
+    assert created.state == "active", created
 
-    def body(answer):
-        return getattr(answer, "body", answer)
-
-    got = body(service.get(_soapheaders=target))
-    assert got.identity.name == "Zoë's workshop", got
+    got = call("get", uri)
+    assert got.identity.name == "Zoë's workshop" and got.identity.type == "organization", got
     assert got.contact[0].email == ["zoe@workshop.example"], got
-    changed = body(service.set(identity={"name": "Zoë & co"}, _soapheaders=target))
-    assert changed.identity.name == "Zoë & co" and changed.thisURI == [uri], changed
-    added = body(service.add(contact=[{"name": "second"}], _soapheaders=target))
-    assert [c.name for c in added.contact][-1] == "second", added
-    fresh = body(service.refreshCredentials(credentials={"username": "zoe"}, _soapheaders=target))
-    assert fresh.credentials[-1].token and fresh.credentials[-1].state == "valid", fresh
-    removed = body(service.remove(_soapheaders=target))
-    assert removed.thisURI == [uri], removed
+    assert got.credentials[0].certificate == b"\0\1\xfe\xff", got
+    assert got.profile[0].identity.name == "inner", got
+
+    changed = call("set", uri, identity={"name": "Zoë & co"}, contact=[{"name": "first"}],
+                   credentials=[{"username": "zoe"}])
+    assert changed.identity.name == "Zoë & co" and changed.thisURI == [uri] and not changed.profile, changed
+    added = call("add", uri, contact=[{"name": "second"}])
+    assert [contact.name for contact in added.contact] == ["first", "second"], added
+    fresh = call("refreshCredentials", uri, credentials={"username": "zoe"})
+    assert [one.state for one in fresh.credentials] == ["valid"] and fresh.credentials[0].token, fresh
+    removed = call("remove", uri)
+    assert removed.thisURI == [uri] and removed.state == "closed", removed
+    expect_not_found(client, lambda: call("get", uri), uri, soap12)
+    return recorder.elements
+
+
+def expect_not_found(client, call, uri, soap12):
     try:
-        service.get(_soapheaders=target)
+        call()
     except zeep.exceptions.Fault as fault:
-        detail = etree.tostring(fault.detail).decode()
-        assert "Client.ObjectNotFound" in detail and uri in detail, detail
+        assert fault.message and etree.QName(fault.detail).localname == ("Detail" if soap12 else "detail"), fault
+        typed = client.get_element("{%s}Client.ObjectNotFound" % messages.COMMON).parse(
+            fault.detail[0], client.wsdl.types)
+        assert typed.uri == [uri], typed
     else:
         raise AssertionError("a removed profile was found")
-    return recorder.bodies
-
-
-def validate(schema, bodies):
-    with tempfile.TemporaryDirectory() as folder:
-        names = []
-        for number, body in enumerate(bodies):
-            names.append(os.path.join(folder, "%d.xml" % number))
-            with open(names[-1], "wb") as file:
-                file.write(body)
-        subprocess.run(["xmllint", "--noout", "--nonet", "--schema", schema, *names], check=True, capture_output=True)
 
 
 def main():
@@ -90,10 +84,10 @@ def main():
     wsdl = os.path.join(schemas, "profile", "Profile.wsdl")
     with zuv_service.running(program) as address:
         for soap12 in (False, True):
-            bodies = call_all(wsdl, address, soap12)
-            assert len(bodies) == 13, "six requests with answers, and one that ended in a fault"
-            validate(os.path.join(schemas, "profile", "profile.xsd"), bodies)
-            print("SOAP 1.%d: 6 operations and a fault, %d messages valid" % (2 if soap12 else 1, len(bodies)))
+            elements = call_all(wsdl, address, soap12)
+            assert len(elements) == 28, "seven calls, a header block and the content each way, not %d" % len(elements)
+            messages.validate(schemas, elements)
+            print("SOAP 1.%d: 6 operations and a fault, %d elements valid" % (2 if soap12 else 1, len(elements)))
 
 
 if __name__ == "__main__":

@@ -1,25 +1,24 @@
-"""Starts zuv-service on a free port for a test, and stops it."""
+"""Starts the two services that the tests call, each on a free port: zuv-service, and the one on an independent stack."""
 import contextlib
 import os
-import select
-import subprocess
+import signal
 import tempfile
+
+import listening
+
+PATH = "/zuv/v1.0/services/Profile"
 
 
 @contextlib.contextmanager
 def running(program, *options):
-    """Gives the address, such as http://127.0.0.1:40001, of a service that stops at the end of the block."""
+    """Gives the address, such as http://127.0.0.1:40001, of a zuv-service that stops at the end of the block."""
     with tempfile.TemporaryDirectory() as folder:
         database = os.path.join(folder, "zuv.db")
-        process = subprocess.Popen([program, "--port", "0", "--database", database, *options],
-                                   stdout=subprocess.PIPE, text=True)
-        try:
-            ready, _, _ = select.select([process.stdout], [], [], 30)
-            line = process.stdout.readline() if ready else ""
-            if not line.startswith("listening on "):
-                raise RuntimeError("the service did not start: " + repr(line))
-            yield line[len("listening on "):].strip()
-        finally:
-            process.terminate()
-            if process.wait(30) != 0:
-                raise RuntimeError("the service ended with %d" % process.returncode)
+        with listening.started([program, "--port", "0", "--database", database, *options]) as address:
+            yield address
+
+
+def running_npm(folder, schemas, *options):
+    """The same for the service in the folder, where its packages are installed."""
+    wsdl = os.path.join(schemas, "profile", "Profile.wsdl")
+    return listening.started(["node", "server.js", wsdl, *options], end_status=-signal.SIGTERM, cwd=folder)

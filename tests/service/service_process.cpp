@@ -1,6 +1,7 @@
 // service_process.cpp - see service_process.h.
 #include "service/service_process.h"
 
+#include <algorithm>
 #include <csignal>
 #include <cstdlib>
 #include <cstring>
@@ -51,6 +52,8 @@ scratch_directory::~scratch_directory()
 service_process::service_process(std::vector<std::string> options)
 {
     const char *const program = ZUV_SERVICE_PROGRAM;
+    if (std::find(options.begin(), options.end(), "--database") == options.end())
+        options.insert(options.end(), {"--database", scratch_.file("documents.db")});
     options.insert(options.begin(), {program, "--port", "0"});
     std::vector<char *> arguments;
     for (std::string &option : options)

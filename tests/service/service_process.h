@@ -25,7 +25,8 @@ private:
 
 class service_process {
 public:
-    // Starts the service and waits until it listens, at most START_LIMIT_S.
+    // Starts the service and waits until it listens, at most START_LIMIT_MS. Its documents go when it goes,
+    // however it ends, unless the options name a database.
     explicit service_process(std::vector<std::string> options = {});
     ~service_process();
     service_process(const service_process &) = delete;
@@ -43,6 +44,7 @@ public:
 private:
     int wait_for_end();
 
+    scratch_directory scratch_;
     pid_t pid_ = -1;
     int output_ = -1;
     int port_ = 0;

@@ -9,9 +9,11 @@ extern "C" {
 void *__libc_malloc(std::size_t size);
 void *__libc_calloc(std::size_t count, std::size_t size);
 void *__libc_realloc(void *block, std::size_t size);
+void __libc_free(void *block);
 __attribute__((weak)) void *__interceptor_malloc(std::size_t size);
 __attribute__((weak)) void *__interceptor_calloc(std::size_t count, std::size_t size);
 __attribute__((weak)) void *__interceptor_realloc(void *block, std::size_t size);
+__attribute__((weak)) void __interceptor_free(void *block);
 }
 
 // A request beyond the address space is refused by a sanitizer's allocator too, in place of ending the test.
@@ -27,6 +29,7 @@ struct thread_state {
     std::size_t refuse_from = 0; // number of the first allocation to refuse; 0 none
     std::size_t refuse_to = 0;   // number of the last one
     std::size_t refused = 0;
+    std::ptrdiff_t held = 0; // blocks handed out and not freed
 };
 
 constinit thread_local thread_state state;
@@ -41,28 +44,48 @@ bool refuse_this_one()
     return true;
 }
 
+void *counted(void *block)
+{
+    state.held += block != nullptr;
+    return block;
+}
+
 } // namespace
 
 extern "C" __attribute__((visibility("default"))) void *malloc(std::size_t size)
 {
     if (refuse_this_one())
         return nullptr;
-    return __interceptor_malloc != nullptr ? __interceptor_malloc(size) : __libc_malloc(size);
+    return counted(__interceptor_malloc != nullptr ? __interceptor_malloc(size) : __libc_malloc(size));
 }
 
 extern "C" __attribute__((visibility("default"))) void *calloc(std::size_t count, std::size_t size)
 {
     if (refuse_this_one())
         return nullptr;
-    return __interceptor_calloc != nullptr ? __interceptor_calloc(count, size) : __libc_calloc(count, size);
+    return counted(__interceptor_calloc != nullptr ? __interceptor_calloc(count, size)
+                                                   : __libc_calloc(count, size));
 }
 
 extern "C" __attribute__((visibility("default"))) void *realloc(void *block, std::size_t size)
 {
     if (refuse_this_one())
         return nullptr;
-    return __interceptor_realloc != nullptr ? __interceptor_realloc(block, size)
-                                            : __libc_realloc(block, size);
+    void *const moved =
+        __interceptor_realloc != nullptr ? __interceptor_realloc(block, size) : __libc_realloc(block, size);
+    if (block == nullptr)
+        return counted(moved);
+    state.held -= moved == nullptr && size == 0;
+    return moved;
+}
+
+extern "C" __attribute__((visibility("default"))) void free(void *block)
+{
+    state.held -= block != nullptr;
+    if (__interceptor_free != nullptr)
+        __interceptor_free(block);
+    else
+        __libc_free(block);
 }
 
 namespace failing_malloc {
@@ -87,6 +110,11 @@ std::size_t scope::refused() const
 std::size_t allocations()
 {
     return state.asked;
+}
+
+std::ptrdiff_t held()
+{
+    return state.held;
 }
 
 } // namespace failing_malloc

@@ -1,8 +1,8 @@
 // failing_malloc.h - refuses chosen allocations, to see what a function does when memory runs out.
 //
-// Linking failing_malloc.cpp replaces malloc, calloc and realloc of the whole executable; they behave as
-// usual until a scope is armed. operator new goes through malloc and throws std::bad_alloc, except in builds
-// with AddressSanitizer, where new has an allocator of its own that is never refused.
+// Linking failing_malloc.cpp replaces malloc, calloc, realloc and free of the whole executable; they behave
+// as usual until a scope is armed. operator new goes through malloc and throws std::bad_alloc, except in
+// builds with AddressSanitizer, where new has an allocator of its own that is never refused.
 //
 // Only the thread that arms is concerned. Run nothing but the call under test while armed: GoogleTest's own
 // checks allocate too.
@@ -28,6 +28,10 @@ public:
 
 // Allocations asked for by this thread since its start.
 std::size_t allocations();
+
+// Blocks that this thread was handed out, less those that it has freed. It may be negative where others'
+// blocks are freed: only a difference tells something.
+std::ptrdiff_t held();
 
 // Runs `call` with allocation 1, 2, 3... refused, each followed by `check`, which may assert, until a run
 // needs no more allocations. `check` takes whether an allocation was refused. Returns the number of runs in

@@ -5,6 +5,7 @@
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
 #include <zuv_client_pro/protocol.h>
 #include <zuv_client_pro/protocolProfile.h>
+#include <zuv_client_pro/soap_binary.h>
 #include <zuv_client_pro/soap_error.h>
 
 #include "support/call_wire.h"
@@ -12,86 +13,147 @@
 
 namespace {
 
-const std::string ENVELOPE = "<E:Envelope xmlns:E=\"http://schemas.xmlsoap.org/soap/envelope/\""
-                             " xmlns:p=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0/Profile\""
-                             " xmlns:c=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0\""
-                             " xmlns:xsi=\"http://www.w3.org/2001/XMLSchema-instance\">";
-const std::string END = "</E:Body></E:Envelope>";
-const std::string RICH =
-    ENVELOPE +
-    "<E:Header><c:header><c:targetURI>urn:1</c:targetURI></c:header></E:Header><E:Body><p:getResponse>"
-    "<p:thisURI id=\"u\">urn:zuv:profile:with-a-name-that-needs-an-allocation</p:thisURI>"
-    "<p:thisURI href=\"#u\"/><p:state>active</p:state><c:identity xsi:type=\"c:RecognizedSubject\">"
-    "<c:name>caf&#xE9; with a long name that does not fit in place</c:name><c:authorized>true"
-    "</c:authorized></c:identity><c:contact href=\"#c\"/><c:contact id=\"c\"><c:name>n</c:name>"
-    "</c:contact><c:credentials><c:certificate>AAEC/w==</c:certificate></c:credentials>"
-    "</p:getResponse>" +
-    END;
-const std::string FAULT =
-    ENVELOPE +
-    "<E:Body><E:Fault><faultcode>E:Client</faultcode><faultstring>s</faultstring><detail>"
-    "<c:Client.ObjectNotFound><c:uri>urn:1</c:uri></c:Client.ObjectNotFound><x>raw</x></detail>"
-    "</E:Fault>" +
-    END;
+std::string envelope(const std::string &version, const std::string &content)
+{
+    return "<E:Envelope xmlns:E=\"" + version +
+           "\" xmlns:p=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0/Profile\""
+           " xmlns:c=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0\""
+           " xmlns:xsi=\"http://www.w3.org/2001/XMLSchema-instance\">" +
+           content + "</E:Envelope>";
+}
 
-// A get with a header, which is answered by `body`. A proxy of its own, so that nothing is left over from
+const std::string SOAP_11 = "http://schemas.xmlsoap.org/soap/envelope/";
+const std::string SOAP_12 = "http://www.w3.org/2003/05/soap-envelope";
+
+std::string rich_answer(const std::string &operation)
+{
+    return envelope(
+        SOAP_11,
+        "<E:Header><c:header><c:targetURI>urn:1</c:targetURI></c:header></E:Header><E:Body><p:" + operation +
+            "Response><p:thisURI id=\"u\">urn:zuv:profile:with-a-name-that-needs-an-allocation</p:thisURI>"
+            "<p:thisURI href=\"#u\"/><p:state>active</p:state><c:identity xsi:type=\"c:RecognizedSubject\">"
+            "<c:name>caf&#xE9; with a long name that does not fit in place</c:name><c:authorized>true"
+            "</c:authorized></c:identity><c:contact href=\"#c\"/><c:contact id=\"c\"><c:name>n</c:name>"
+            "</c:contact><c:credentials><c:certificate>AAEC/w==</c:certificate></c:credentials></p:" +
+            operation + "Response></E:Body>");
+}
+
+const std::string TYPED_FAULT = "<c:Client.ObjectNotFound><c:uri>urn:1</c:uri></c:Client.ObjectNotFound>"
+                                "<c:Contact><c:name>n</c:name></c:Contact><x>raw</x>";
+const std::string FAULT_11 =
+    envelope(SOAP_11, "<E:Body><E:Fault><faultcode>E:Client</faultcode><faultstring>s</faultstring><detail>" +
+                          TYPED_FAULT + "</detail></E:Fault></E:Body>");
+const std::string FAULT_12 = envelope(
+    SOAP_12,
+    "<E:Body><E:Fault><E:Code><E:Value>E:Sender</E:Value><E:Subcode><E:Value>c:x</E:Value></E:Subcode>"
+    "</E:Code><E:Reason><E:Text xml:lang=\"en\">s</E:Text></E:Reason><E:Detail>" +
+        TYPED_FAULT + "</E:Detail></E:Fault></E:Body>");
+
+// Two calls, which are answered by `body`, with a proxy of their own, so that nothing is left over from
 // another run.
 struct trial {
-    explicit trial(const std::string &body)
+    trial(const std::string &body, std::uint32_t mode)
+        : proxy(static_cast<int>(mode | MODE_KEEP_ALIVE)), answer(http_answer(body))
     {
         wire.carry(proxy);
         wire.sent.reserve(SOAP_BUFFER_SIZE); // the peer's memory is not what is tested
         wire.opened_at.reserve(SOAP_TEXT_SIZE);
-        wire.answers.push_back(http_answer(body));
-        header.targetURI = &uri;
-        proxy.soap_header(&header);
+        identity.name = &name;
+        contact.name = &name;
+        certificate.content = bytes;
+        certificate.size = sizeof bytes;
+        credentials.certificate = &certificate;
+        inner.contact = {&contact};
+        document.thisURI = {name, name};
+        document.identity = &identity;
+        document.contact = {&contact, &contact};
+        document.credentials = {&credentials};
+        document.profile = {&inner, &inner};
+        header.targetURI = &name;
+        prepare();
     }
+    void prepare()
+    {
+        wire.answers.clear();
+        wire.answers.push_back(answer);
+        proxy.soap_header(&header);
+        got.result = nullptr;
+        held.result = nullptr;
+    }
+    int get() { return proxy.get(&request, got); }
+    int set() { return proxy.set(&document, held); }
+    const protocolProfile__ProfileContent *result() const { return got.result ? got.result : held.result; }
+
     call_wire wire;
     ProfileSoapBindingProxy proxy;
-    std::string uri = "urn:1";
+    std::string answer, name = "a name that does not fit in place \xE9 <&>";
+    unsigned char bytes[3] = {1, 2, 3};
+    xsd__base64Binary certificate;
+    protocol__Identity identity;
+    protocol__Contact contact;
+    protocol__Credentials credentials;
+    protocolProfile__ProfileContent inner, document;
     protocol__Header header;
     _protocolProfile__getRequest request;
-    __protocolProfile__getResponse response{};
+    __protocolProfile__getResponse got{};
+    __protocolProfile__setResponse held{};
 };
 
-void refuse_each(const std::string &body, int usual)
+struct call_case {
+    const char *rule;
+    int (trial::*call)();
+    std::string body;
+    std::uint32_t mode;
+    int usual; // what the call ends with when nothing is refused
+};
+
+// Says whether an allocation was refused.
+bool refuse(const call_case &c, std::size_t nth, failing_malloc::refuse how)
 {
-    for (std::size_t nth = 1; nth < 2000; ++nth) {
-        trial t(body);
-        int error;
-        std::size_t refused;
-        {
-            failing_malloc::scope armed(nth);
-            error = t.proxy.get(&t.request, t.response);
-            refused = armed.refused();
-        }
-        if (refused == 0) {
-            EXPECT_EQ(usual, error);
-            EXPECT_GT(nth, 10U) << "the call allocates more than this";
-            return;
-        }
-        // Some allocations only save work: without them the call goes on the long way.
-        EXPECT_TRUE(error != 0 || usual == 0) << "allocation " << nth;
-        EXPECT_TRUE(error != 0 || t.response.result != nullptr) << "allocation " << nth;
-        t.proxy.destroy();
-        t.wire.answers.clear();
-        t.wire.answers.push_back(http_answer(body));
-        EXPECT_EQ(usual, t.proxy.get(&t.request, t.response)) << "after allocation " << nth << " had failed";
+    SCOPED_TRACE(std::string(c.rule) + ", allocation " + std::to_string(nth));
+    trial t(c.body, c.mode);
+    int error;
+    std::size_t refused;
+    {
+        failing_malloc::scope armed(nth, how);
+        error = (t.*c.call)();
+        refused = armed.refused();
     }
-    FAIL() << "the call never ran out of allocations";
+    // Some allocations only save work: without them the call goes on the long way.
+    EXPECT_TRUE(error == c.usual || (refused != 0 && error != 0)) << error;
+    EXPECT_TRUE(error != 0 || t.result() != nullptr);
+    t.proxy.destroy();
+    t.prepare();
+    EXPECT_EQ(c.usual, (t.*c.call)()) << "the next call";
+    EXPECT_EQ(c.usual == 0, t.result() != nullptr) << "the next call";
+    return refused != 0;
 }
 
-TEST(AllocationFailure, of_a_call_with_a_rich_answer_gives_a_code)
+TEST(AllocationFailure, of_a_call_gives_a_code_and_leaves_nothing_behind)
 {
+    const call_case cases[] = {
+        {"get", &trial::get, rich_answer("get"), 0, 0},
+        {"set", &trial::set, rich_answer("set"), 0, 0},
+        {"set, a graph", &trial::set, rich_answer("set"), SOAP_XML_GRAPH | MODE_NIL, 0},
+        {"set, stored", &trial::set, rich_answer("set"), MODE_STORE, 0},
+        {"set, compressed chunks", &trial::set, rich_answer("set"), MODE_CHUNKED | MODE_DEFLATE, 0},
+        {"set, canonical", &trial::set, rich_answer("set"), MODE_CANONICAL, 0},
+        {"fault", &trial::get, FAULT_11, 0, SOAP_CLIENT_FAULT},
+        {"fault of SOAP 1.2", &trial::get, FAULT_12, 0, SOAP_CLIENT_FAULT},
+    };
     testing::internal::CaptureStderr();
-    refuse_each(RICH, 0);
-    EXPECT_EQ("", testing::internal::GetCapturedStderr()) << "no leak is named";
-}
-
-TEST(AllocationFailure, of_a_call_that_ends_in_a_fault_gives_a_code)
-{
-    testing::internal::CaptureStderr();
-    refuse_each(FAULT, SOAP_CLIENT_FAULT);
+    refuse(cases[0], 1, failing_malloc::refuse::one); // what a process makes but once is made now
+    for (const call_case &c : cases) {
+        for (const auto how : {failing_malloc::refuse::one, failing_malloc::refuse::all_from}) {
+            std::size_t nth = 1;
+            for (std::ptrdiff_t before = failing_malloc::held(); refuse(c, nth, how);
+                 ++nth, before = failing_malloc::held()) {
+                EXPECT_EQ(before, failing_malloc::held()) << c.rule << ", allocation " << nth;
+                ASSERT_LT(nth, 2000U) << "the call never runs out of allocations";
+            }
+            EXPECT_GT(nth, 10U) << c.rule << " allocates more than this";
+        }
+    }
     EXPECT_EQ("", testing::internal::GetCapturedStderr()) << "no leak is named";
 }
 
@@ -103,10 +165,11 @@ TEST(ManyCalls, leave_a_proxy_as_small_as_it_was)
     wire.carry(proxy);
     _protocolProfile__getRequest request;
     __protocolProfile__getResponse response;
+    const std::string answer = http_answer(rich_answer("get"));
     std::size_t before = 0, per_call = 0;
     for (int i = 0; i < 20000; ++i) {
         wire.sent.clear();
-        wire.answers.push_back(http_answer(RICH));
+        wire.answers.push_back(answer);
         const std::size_t start = failing_malloc::allocations();
         ASSERT_EQ(0, proxy.get(&request, response));
         proxy.destroy();

@@ -1,19 +1,19 @@
-// A Profile service on the npm package "soap", from the project's WSDL. Usage: node server.js WSDL
-// Keeps one profile in memory. Prints "listening on http://127.0.0.1:PORT" when it is ready, and runs until it is stopped.
+// A Profile service on the npm package "soap", from the project's WSDL.
+//
+// Usage: node server.js WSDL [--soap12]. Keeps one profile in memory. Prints "listening on http://127.0.0.1:PORT" when it
+// is ready, and runs until it is stopped. The stack reads both SOAP versions and answers in one, SOAP 1.1 unless told.
+const crypto = require('crypto');
 const fs = require('fs');
 const http = require('http');
 const soap = require('soap');
 
-const wsdlPath = process.argv[2];
+const [wsdlPath, version] = process.argv.slice(2);
+const soap12 = version === '--soap12';
+const PATH = '/zuv/v1.0/services/Profile';
+const NAME = 'urn:other:1';
 let profile = null;
 
-function stored() {
-  if (profile === null)
-    throw { Fault: { faultcode: 'SOAP-ENV:Client', faultstring: 'no such profile', statusCode: 500 } };
-  return profile;
-}
-
-// Attributes that the parser keeps beside a text value would be written back as elements.
+// Values without the attributes that the parser keeps beside them, which would be written back as elements.
 function plain(value) {
   if (Array.isArray(value)) return value.map(plain);
   if (value === null || typeof value !== 'object') return value;
@@ -32,43 +32,61 @@ function common(value) {
 }
 
 function answer(document) {
-  return Object.fromEntries(Object.entries(document).map(([key, value]) =>
-    COMMON.has(key) ? [`protocol:${key}`, common(value)] : [key, value]));
+  return Object.fromEntries(Object.entries(document).map(([key, value]) => {
+    if (key === 'profile') return [key, [].concat(value).map(answer)];
+    return COMMON.has(key) ? [`protocol:${key}`, common(value)] : [key, value];
+  }));
 }
 
+function notFound(uri) {
+  const detail = { 'protocol:Client.ObjectNotFound': { 'protocol:uri': uri } };
+  const text = `no profile has the name ${uri}`;
+  const fault = soap12
+    ? { Code: { Value: 'soap:Sender' }, Reason: { Text: { attributes: { 'xml:lang': 'en' }, $value: text } }, Detail: detail }
+    : { faultcode: 'soap:Client', faultstring: text, detail };
+  return { Fault: { ...fault, statusCode: soap12 ? 400 : 500 } };
+}
+
+// The profile that the request's header names.
+function target(headers) {
+  const uri = headers?.header?.targetURI;
+  if (profile === null || uri !== NAME) throw notFound(uri);
+  return profile;
+}
+
+// The row of an operation that puts `change(held, request)` in the place of the profile held and answers with it.
+const changing = (change) => async (request, callback, headers) =>
+  answer((profile = change(target(headers), plain(request ?? {}))));
+
 const port = {
-  create: (request) => answer((profile = { thisURI: ['urn:other:1'], ...plain(request) })),
-  get: () => answer(stored()),
-  set: (request) => answer((profile = { ...stored(), ...plain(request) })),
-  add: (request) => {
-    const contacts = [].concat(stored().contact || [], plain(request).contact || []);
-    return answer((profile = { ...profile, contact: contacts }));
-  },
-  refreshCredentials: (request) =>
-    answer((profile = { ...stored(), credentials: [{ ...plain(request).credentials, state: 'valid' }] })),
-  remove: () => {
-    const removed = stored();
+  create: async (request) => answer((profile = { ...plain(request), thisURI: [NAME] })),
+  get: async (request, callback, headers) => answer(target(headers)),
+  set: changing((held, request) => ({ ...request, thisURI: held.thisURI })),
+  add: changing((held, request) => ({ ...held, contact: [].concat(held.contact ?? [], request.contact ?? []) })),
+  refreshCredentials: changing((held, request) =>
+    ({ ...held, credentials: [{ ...request.credentials, state: 'valid', token: crypto.randomUUID() }] })),
+  remove: async (request, callback, headers) => {
+    const removed = target(headers);
     profile = null;
     return answer(removed);
   },
 };
 
+// The answer's header names the exchange as the request did.
+function header(method, args, headers) {
+  const id = headers?.header?.transactionId;
+  return id === undefined ? '' : `<protocol:header><protocol:transactionId>${id}</protocol:transactionId></protocol:header>`;
+}
+
 const server = http.createServer((request, response) => response.writeHead(404).end());
 server.listen(0, '127.0.0.1', () => {
-  const path = '/zuv/v1.0/services/Profile';
-  const wsdl = fs.readFileSync(wsdlPath, 'utf8');
-  soap.listen(server, {
-    path,
-    services: { [serviceName(wsdl)]: Object.fromEntries(portNames(wsdl).map((name) => [name, port])) },
-    xml: wsdl,
+  const service = soap.listen(server, {
+    path: PATH,
+    services: { Profile: { ProfileSoap: port, ProfileSoap12: port } },
+    xml: fs.readFileSync(wsdlPath, 'utf8'),
     uri: wsdlPath,
+    forceSoap12Headers: soap12,
     callback: () => console.log(`listening on http://127.0.0.1:${server.address().port}`),
   });
+  service.addSoapHeader(header);
 });
-
-function serviceName(wsdl) {
-  return /<wsdl:service name="(\w+)"/.exec(wsdl)[1];
-}
-function portNames(wsdl) {
-  return [...wsdl.matchAll(/<wsdl:port name="(\w+)"/g)].map((match) => match[1]);
-}

@@ -1,0 +1,36 @@
+"""Starts a program that says "listening on ADDRESS" once it is ready, and stops it."""
+import contextlib
+import select
+import subprocess
+
+READY = "listening on "
+LIMIT_S = 60
+
+
+def _first_line(process):
+    ready, _, _ = select.select([process.stdout], [], [], LIMIT_S)
+    return process.stdout.readline() if ready else ""
+
+
+@contextlib.contextmanager
+def started(command, end_status=0, **options):
+    """Gives the address, such as http://127.0.0.1:40001, of a program that is stopped at the end of the block.
+
+    end_status is what it has to end with when it is told to terminate; options are those of subprocess.Popen.
+    """
+    process = subprocess.Popen(command, stdout=subprocess.PIPE, text=True, **options)
+    try:
+        line = _first_line(process)
+        if not line.startswith(READY):
+            raise RuntimeError("%s did not start: %r" % (command[0], line))
+        yield line[len(READY):].strip()
+    finally:
+        process.terminate()
+        try:
+            status = process.wait(LIMIT_S)
+        except subprocess.TimeoutExpired:
+            process.kill()
+            status = process.wait()
+        process.stdout.close()
+    if status != end_status:
+        raise RuntimeError("%s ended with %d" % (command[0], status))
