@@ -127,12 +127,14 @@ struct soap_prefix_cache {
 // Each record is one block of SOAP_MALLOC (soap_memory.h).
 struct soap_attribute {
     soap_attribute *next;
-    std::int16_t escape;  // flag handed to soap_text_write for the value
-    char *value;          // owned buffer (another block of SOAP_MALLOC), or null
-    std::size_t size;     // capacity of `value`, bytes
-    const char *uri;      // namespace of the name, for canonical order; borrowed
-    std::int16_t visible; // 0 idle, 1 present without a value, 2 present with a value
-    char name[1];         // in the record itself
+    std::int16_t escape;       // flag handed to soap_text_write for the value
+    char *value;               // owned buffer (another block of SOAP_MALLOC), or null
+    std::size_t size;          // capacity of `value`, bytes
+    const char *uri;           // namespace of the name, for canonical order; borrowed
+    std::int16_t visible;      // 0 idle, 1 present without a value, 2 present with a value
+    std::uint32_t name_length; // bytes of `name`, without its end
+    std::uint32_t name_size;   // room for it, bytes
+    char name[1];              // in the record itself
 };
 
 // Block stack: blocks in which a stored message or an array of unknown size gathers.

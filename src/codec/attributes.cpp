@@ -14,6 +14,7 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "codec/attributes.h"
+#include "codec/namespace_scope.h"
 
 namespace {
 
@@ -21,6 +22,7 @@ namespace {
 // number of records one that is idle takes another name.
 constexpr std::size_t RECORDS_BEFORE_RENAMING = 64;
 constexpr std::size_t USUAL_VALUE = 64; // bytes of a first value buffer
+constexpr std::size_t USUAL_NAME = 64;  // room for a name in a new record, bytes
 
 // What a search of the table found: links that lead to the records.
 struct place_of_name {
@@ -34,12 +36,11 @@ place_of_name search(soap *ctx, std::string_view name)
     place_of_name found;
     for (soap_attribute **link = &ctx->attribute_list; *link; link = &(*link)->next) {
         ++found.records;
-        const std::string_view other((*link)->name);
-        if (other == name) {
+        if (xml_attribute_name(*link) == name) {
             found.named = link;
             return found;
         }
-        if ((*link)->visible == 0 && other.size() >= name.size())
+        if ((*link)->visible == 0 && (*link)->name_size > name.size())
             found.renamable = link;
     }
     return found;
@@ -56,6 +57,7 @@ void move_to_front(soap *ctx, soap_attribute **link)
 void rename(soap_attribute *record, std::string_view name)
 {
     *std::copy(name.begin(), name.end(), record->name) = '\0';
+    record->name_length = static_cast<std::uint32_t>(name.size());
 }
 
 // The idle record that is to hold the attribute, at the front of the table.
@@ -82,19 +84,43 @@ void announce_wsu_id(soap *ctx, const char *value)
     ctx->element_id[length] = '\0';
 }
 
+soap_attribute *take_spare(soap *ctx, std::size_t name_size)
+{
+    soap_namespace_scope *scope = ctx->namespace_scope;
+    if (!scope || !scope->spare_attributes || name_size > USUAL_NAME)
+        return nullptr;
+    soap_attribute *record = scope->spare_attributes;
+    scope->spare_attributes = record->next;
+    --scope->spare_attribute_count;
+    return record;
+}
+
+// A record without a value. Null if memory runs out.
+soap_attribute *allocate(soap *ctx, std::size_t name_size)
+{
+    name_size = std::max(name_size, USUAL_NAME);
+    if (name_size > std::numeric_limits<std::uint32_t>::max())
+        return nullptr;
+    auto *record =
+        static_cast<soap_attribute *>(SOAP_MALLOC(ctx, offsetof(soap_attribute, name) + name_size));
+    if (record) {
+        record->name_size = static_cast<std::uint32_t>(name_size);
+        record->value = nullptr;
+        record->size = 0;
+    }
+    return record;
+}
+
 } // namespace
 
 soap_attribute *xml_attribute_make(soap *ctx, std::string_view name)
 {
-    auto *record =
-        static_cast<soap_attribute *>(SOAP_MALLOC(ctx, offsetof(soap_attribute, name) + name.size() + 1));
-    if (!record) {
+    soap_attribute *record = take_spare(ctx, name.size() + 1);
+    if (!record && !(record = allocate(ctx, name.size() + 1))) {
         ctx->error = SOAP_OUT_OF_MEMORY;
         return nullptr;
     }
     record->escape = 0;
-    record->value = nullptr;
-    record->size = 0;
     record->uri = nullptr;
     record->visible = 0;
     rename(record, name);
@@ -125,13 +151,31 @@ int xml_attribute_store(soap *ctx, soap_attribute *record, std::string_view valu
     return 0;
 }
 
-void xml_attributes_free(soap *ctx)
+void xml_attribute_free(soap *ctx, soap_attribute *record)
+{
+    SOAP_FREE(ctx, record->value);
+    SOAP_FREE(ctx, record);
+}
+
+void xml_attribute_drop(soap *ctx, soap_attribute *record)
+{
+    soap_namespace_scope *scope = ctx->namespace_scope;
+    if (!scope || scope->spare_attribute_count >= SPARE_ATTRIBUTES_MAX || record->name_size != USUAL_NAME ||
+        record->size > SPARE_ATTRIBUTE_SIZE) {
+        xml_attribute_free(ctx, record);
+        return;
+    }
+    record->next = scope->spare_attributes;
+    scope->spare_attributes = record;
+    ++scope->spare_attribute_count;
+}
+
+void xml_attributes_drop(soap *ctx)
 {
     while (ctx->attribute_list) {
         soap_attribute *record = ctx->attribute_list;
         ctx->attribute_list = record->next;
-        SOAP_FREE(ctx, record->value);
-        SOAP_FREE(ctx, record);
+        xml_attribute_drop(ctx, record);
     }
     ctx->attributes_set = 0;
 }
@@ -159,7 +203,7 @@ int soap_attr_set(soap *ctx, const char *name, const char *value, int escape)
 void soap_attr_table_reset(soap *ctx)
 {
     if (ctx->mode & MODE_CANONICAL)
-        xml_attributes_free(ctx);
+        xml_attributes_drop(ctx);
     for (soap_attribute *record = ctx->attribute_list; record; record = record->next)
         record->visible = 0;
     ctx->attributes_set = 0;

@@ -136,22 +136,42 @@ bool same_uri(const char *one, const char *other)
     return one && other && std::strcmp(one, other) == 0;
 }
 
+bool is_row_uri(const soap_namespace &row, const namespace_lengths *lengths, std::string_view uri)
+{
+    return row.uri && (!lengths || lengths->uri == uri.size()) && uri == row.uri;
+}
+
+// The patterns of a table have long heads in common: the last letter of the head tells most apart.
+bool fits_pattern(const soap_namespace &row, const namespace_lengths *lengths, std::string_view uri)
+{
+    if (!row.pattern)
+        return false;
+    if (lengths && lengths->pattern_head > 0) {
+        constexpr char CASE = 'a' - 'A';
+        const std::size_t last = lengths->pattern_head - 1;
+        if (last >= uri.size() || (uri[last] | CASE) != (row.pattern[last] | CASE))
+            return false;
+    }
+    return soap_tag_match(uri.data(), row.pattern) == 0;
+}
+
 // Row of the working copy that a declared URI belongs to, or UNBOUND. False if memory runs out.
 bool bind_uri(soap *ctx, const char *uri, std::int16_t *index)
 {
     *index = UNBOUND;
     if (!ctx->local_namespaces)
         return true;
-    const std::size_t length = std::strlen(uri);
+    const std::string_view text(uri);
     for (std::size_t i = 0; ctx->local_namespaces[i].prefix; ++i) {
         soap_namespace &row = ctx->local_namespaces[i];
-        if (row.uri && namespace_uri_length(ctx, i) == length && std::memcmp(row.uri, uri, length) == 0) {
+        const namespace_lengths *lengths = namespace_row_lengths(ctx, i);
+        if (is_row_uri(row, lengths, text)) {
             xml_received_drop(ctx, row);
         } else if (row.received) {
-            if (std::strcmp(row.received, uri) != 0)
+            if (text != row.received)
                 continue;
         } else {
-            if (!row.pattern || soap_tag_match(uri, row.pattern) != 0)
+            if (!fits_pattern(row, lengths, text))
                 continue;
             if (xml_received_set(ctx, row, uri))
                 return false;

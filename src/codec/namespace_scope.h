@@ -1,4 +1,5 @@
-// namespace_scope.h - what the prefix stack and the namespace table keep from call to call.
+// namespace_scope.h - what the prefix stack, the namespace table and the attribute table keep from call to
+// call.
 //
 // Always: made at first use by namespace_scope_of, freed by soap_namespace_scope_free. The table part
 // describes the rows whose addresses it remembers and is made anew when it meets other rows.
@@ -12,10 +13,14 @@
 constexpr std::size_t PREFIX_CHAINS = 256;      // power of two
 constexpr std::size_t SPARE_PREFIXES_MAX = 256; // records kept for reuse
 constexpr std::size_t SPARE_PREFIX_SIZE = 1024; // bytes of text; larger records are freed at once
+constexpr std::size_t SPARE_ATTRIBUTES_MAX = 64;
+constexpr std::size_t SPARE_ATTRIBUTE_SIZE =
+    1024; // bytes of value; a record with a larger one is freed at once
 
 // Bytes in a row's own texts.
 struct namespace_lengths {
     std::size_t prefix, uri;
+    std::size_t pattern_head; // of the pattern, ahead of its first "*" or "-"
 };
 
 struct soap_namespace_scope {
@@ -25,7 +30,10 @@ struct soap_namespace_scope {
     std::uint32_t hash_factor;          // odd, not known to a peer
     soap_prefix *spare;                 // linked by next
     std::size_t spare_count;
-    std::uint8_t tag_prefix; // the reader's last tag: place of its prefix in soap::prefix_cache
+    soap_attribute *spare_attributes; // linked by next
+    std::size_t spare_attribute_count;
+    soap_namespace *spare_table; // room for row_count rows and their end; null while it is the working copy
+    std::uint8_t tag_prefix;     // the reader's last tag: place of its prefix in soap::prefix_cache
 
     const soap_namespace *rows;       // copy of the rows described, without received URIs; owned with lengths
     const namespace_lengths *lengths; // of each row
@@ -46,5 +54,12 @@ inline bool namespace_prefix_has_length(const soap_namespace_scope *scope, const
            scope->lengths[index].prefix == length;
 }
 
-// Bytes in a row's own URI.
-std::size_t namespace_uri_length(const soap *ctx, std::size_t row);
+// The lengths of a row's texts, or null where the row isn't one of those described.
+inline const namespace_lengths *namespace_row_lengths(const soap *ctx, std::size_t row)
+{
+    const soap_namespace_scope *scope = ctx->namespace_scope;
+    const bool known = scope && row < scope->row_count &&
+                       scope->rows[row].uri == ctx->local_namespaces[row].uri &&
+                       scope->rows[row].pattern == ctx->local_namespaces[row].pattern;
+    return known ? &scope->lengths[row] : nullptr;
+}

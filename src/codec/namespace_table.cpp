@@ -8,10 +8,12 @@
 // own.
 #include <algorithm>
 #include <cstring>
+#include <utility>
 
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_memory.h>
 
+#include "codec/attributes.h"
 #include "codec/namespace.h"
 #include "codec/namespace_scope.h"
 
@@ -29,11 +31,13 @@ std::size_t count_rows(const soap_namespace *table)
 
 bool same_texts(const soap_namespace &one, const soap_namespace &other)
 {
-    return one.prefix == other.prefix && one.uri == other.uri;
+    return one.prefix == other.prefix && one.uri == other.uri && one.pattern == other.pattern;
 }
 
 void forget_rows(soap *ctx, soap_namespace_scope *scope)
 {
+    SOAP_FREE(ctx, scope->spare_table);
+    scope->spare_table = nullptr;
     SOAP_FREE(ctx, scope->declarations);
     SOAP_FREE(ctx, const_cast<soap_namespace *>(scope->rows));
     scope->rows = nullptr;
@@ -59,7 +63,8 @@ int describe_rows(soap *ctx, const soap_namespace *table, std::size_t count)
     for (std::size_t i = 0; i < count; ++i) {
         rows[i] = table[i];
         rows[i].received = nullptr;
-        lengths[i] = {std::strlen(table[i].prefix), table[i].uri ? std::strlen(table[i].uri) : 0};
+        lengths[i] = {std::strlen(table[i].prefix), table[i].uri ? std::strlen(table[i].uri) : 0,
+                      table[i].pattern ? std::strcspn(table[i].pattern, "*-") : 0};
     }
     scope->rows = rows;
     scope->lengths = lengths;
@@ -131,14 +136,6 @@ soap_namespace_scope *namespace_scope_of(soap *ctx)
     return ctx->namespace_scope;
 }
 
-std::size_t namespace_uri_length(const soap *ctx, std::size_t row)
-{
-    const soap_namespace_scope *scope = ctx->namespace_scope;
-    if (scope && row < scope->row_count && scope->rows[row].uri == ctx->local_namespaces[row].uri)
-        return scope->lengths[row].uri;
-    return std::strlen(ctx->local_namespaces[row].uri);
-}
-
 void soap_namespace_scope_free(soap *ctx)
 {
     soap_namespace_scope *scope = ctx->namespace_scope;
@@ -149,6 +146,11 @@ void soap_namespace_scope_free(soap *ctx)
         soap_prefix *next = scope->spare->next;
         SOAP_FREE(ctx, scope->spare);
         scope->spare = next;
+    }
+    while (scope->spare_attributes) {
+        soap_attribute *next = scope->spare_attributes->next;
+        xml_attribute_free(ctx, scope->spare_attributes);
+        scope->spare_attributes = next;
     }
     forget_rows(ctx, scope);
     SOAP_FREE(ctx, scope);
@@ -162,7 +164,9 @@ int soap_namespace_table_copy(soap *ctx)
     const std::size_t count = count_rows(ctx->namespaces);
     if (describe_rows(ctx, ctx->namespaces, count))
         return ctx->error;
-    auto *rows = static_cast<soap_namespace *>(SOAP_MALLOC(ctx, (count + 1) * sizeof(soap_namespace)));
+    soap_namespace *rows = std::exchange(ctx->namespace_scope->spare_table, nullptr);
+    if (!rows)
+        rows = static_cast<soap_namespace *>(SOAP_MALLOC(ctx, (count + 1) * sizeof(soap_namespace)));
     if (!rows)
         return ctx->error = SOAP_OUT_OF_MEMORY;
     std::copy_n(ctx->namespaces, count + 1, rows);
@@ -184,13 +188,19 @@ void soap_namespace_table_drop(soap *ctx)
 {
     if (!ctx->local_namespaces)
         return;
-    for (soap_namespace *row = ctx->local_namespaces; row->prefix; ++row) {
+    soap_namespace *row = ctx->local_namespaces;
+    for (; row->prefix; ++row) {
         // The style was taken from the table in place of "" and may be another one in the next message.
         if (ctx->encoding_style && ctx->encoding_style == row->uri)
             ctx->encoding_style = "";
         xml_received_drop(ctx, *row);
     }
-    SOAP_FREE(ctx, ctx->local_namespaces);
+    soap_namespace_scope *scope = ctx->namespace_scope;
+    if (scope && !scope->spare_table &&
+        scope->row_count == static_cast<std::size_t>(row - ctx->local_namespaces))
+        scope->spare_table = ctx->local_namespaces;
+    else
+        SOAP_FREE(ctx, ctx->local_namespaces);
     ctx->local_namespaces = nullptr;
 }
 

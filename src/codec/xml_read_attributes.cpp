@@ -31,11 +31,11 @@ struct record_search {
     int count = 0;
 };
 
-record_search find_record(soap *ctx, const char *name)
+record_search find_record(soap *ctx, std::string_view name)
 {
     record_search search;
     for (soap_attribute **link = &ctx->attribute_list; *link != nullptr; link = &(*link)->next) {
-        if (std::strcmp((*link)->name, name) == 0) {
+        if (xml_attribute_name(*link) == name) {
             search.found = *link;
             break;
         }
@@ -50,8 +50,7 @@ void free_record(soap *ctx, soap_attribute **link)
 {
     soap_attribute *record = *link;
     *link = record->next;
-    SOAP_FREE(ctx, record->value);
-    SOAP_FREE(ctx, record);
+    xml_attribute_drop(ctx, record);
 }
 
 // Plain names and declarations stay ahead of names with a prefix, so that they are understood first.
@@ -67,13 +66,13 @@ void move_to_end(soap *ctx, soap_attribute *record)
 
 soap_attribute *record_for(soap *ctx, const char *name, std::size_t length)
 {
-    const record_search search = find_record(ctx, name);
+    const record_search search = find_record(ctx, {name, length});
     if (search.found != nullptr)
         return search.found;
     if (search.count >= RECORDS_KEPT && search.idle != nullptr)
         free_record(ctx, search.idle);
     soap_attribute *record = xml_attribute_make(ctx, {name, length});
-    if (record != nullptr && std::strchr(name, ':') != nullptr)
+    if (record != nullptr && std::memchr(name, ':', length) != nullptr)
         move_to_end(ctx, record);
     return record;
 }

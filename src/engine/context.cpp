@@ -185,7 +185,7 @@ void soap_call_scratch_free(soap *ctx)
     soap_prefix_stack_reset(ctx);
     while (ctx->block_stack != nullptr)
         soap_block_stack_drop(ctx, nullptr);
-    xml_attributes_free(ctx);
+    xml_attributes_drop(ctx);
     free_growing_text(ctx);
     soap_namespace_table_drop(ctx);
     free_attachment_references(ctx);
