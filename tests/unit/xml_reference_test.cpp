@@ -1,7 +1,7 @@
 // xml_reference_test.cpp - the reader beside another parser: both must see the same document.
 //
-// Documents come from a small random grammar with fixed seeds, and from the XML files that the system happens
-// to have. Texts, attribute values and the order of tags are compared. Left out of account: line ends and
+// Documents come from a small random grammar with fixed seeds, and from the XML files that the system has,
+// most of them style sheets of a text processor. Texts, attribute values and the order of tags are compared. Left out of account: line ends and
 // white space in attributes, which the reader keeps as they stand, and entities that a document declares for
 // itself.
 #include <filesystem>
@@ -243,7 +243,8 @@ TEST(XmlReference, files_of_the_system_read_the_same)
     for (const char *place : {"/usr/share/xml", "/usr/share/mime/packages", "/usr/share/metainfo"}) {
         std::error_code none;
         for (const auto &entry : std::filesystem::recursive_directory_iterator(place, none)) {
-            if (entry.path().extension() != ".xml" || !entry.is_regular_file(none))
+            const std::string kind = entry.path().extension();
+            if ((kind != ".xml" && kind != ".xsl") || !entry.is_regular_file(none))
                 continue;
             std::ostringstream content;
             content << std::ifstream(entry.path(), std::ios::binary).rdbuf();
@@ -257,10 +258,10 @@ TEST(XmlReference, files_of_the_system_read_the_same)
             ++compared;
         }
     }
-    if (compared == 0)
-        GTEST_SKIP() << "no XML files found";
-    RecordProperty("files", compared);
     std::printf("%d files compared\n", compared);
+    if (!std::filesystem::exists("/usr/share/xml/docbook"))
+        GTEST_SKIP() << "the package docbook-xsl, which brings most of the files, is not installed";
+    EXPECT_GT(compared, 300);
 }
 
 } // namespace
