@@ -1,4 +1,15 @@
-# The pages: what they show is compiled and run. To be included behind service.cmake.
+# The documents: the target "docs" makes the API reference and the wire reference in docs/ of the build; the tests compile
+# and run what the pages show. To be included behind service.cmake.
+configure_file(${PROJECT_SOURCE_DIR}/docs/Doxyfile.in Doxyfile @ONLY)
+file(MAKE_DIRECTORY ${PROJECT_BINARY_DIR}/docs)
+set(ZUV_WIRE_REFERENCE /usr/bin/python3 -B ${PROJECT_SOURCE_DIR}/tools/wire_reference/wire_reference.py
+    ${PROJECT_SOURCE_DIR}/schema ${PROJECT_BINARY_DIR}/docs/wire)
+add_custom_target(docs COMMAND doxygen Doxyfile COMMAND ${ZUV_WIRE_REFERENCE} DEPENDS zuv_generated VERBATIM)
+
+add_test(NAME api_reference COMMAND doxygen Doxyfile WORKING_DIRECTORY ${PROJECT_BINARY_DIR})
+add_test(NAME wire_reference COMMAND /usr/bin/python3 -B ${PROJECT_SOURCE_DIR}/tests/docs/wire_reference_test.py
+    ${PROJECT_SOURCE_DIR} ${ZUV_GENERATED_DIR})
+
 set_property(DIRECTORY APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/README.md)
 
 # The README's host, at a free port in place of the one that it names.
@@ -14,4 +25,4 @@ target_link_libraries(readme_host PRIVATE zuv_objects zuv_flags)
 
 add_test(NAME pages COMMAND /usr/bin/python3 -B ${PROJECT_SOURCE_DIR}/tests/docs/pages_test.py ${PROJECT_SOURCE_DIR}
     $<TARGET_FILE:zuv-service> $<TARGET_FILE:guide> $<TARGET_FILE:readme_host>)
-set_tests_properties(pages PROPERTIES TIMEOUT 120)
+set_tests_properties(api_reference wire_reference pages PROPERTIES LABELS docs TIMEOUT 120)
