@@ -1,5 +1,7 @@
-# The example hosts.
-add_executable(profile_host ${PROJECT_SOURCE_DIR}/examples/profile_host.cpp)
-target_link_libraries(profile_host PRIVATE zuv_objects zuv_flags)
-add_executable(guide ${PROJECT_SOURCE_DIR}/examples/guide.cpp)
-target_link_libraries(guide PRIVATE zuv_objects zuv_flags)
+# The example hosts: each is one source file over the public headers and the shared object, as a host of its own would be.
+foreach(name profile_host care_host problem_report_host guide)
+    add_executable(${name} ${PROJECT_SOURCE_DIR}/examples/${name}.cpp)
+    target_include_directories(${name} PRIVATE ${ZUV_GENERATED_DIR}/include)
+    target_link_libraries(${name} PRIVATE zuv_client_pro OpenSSL::SSL OpenSSL::Crypto ZLIB::ZLIB zuv_flags)
+    add_dependencies(${name} zuv_generated)
+endforeach()
