@@ -135,8 +135,12 @@ void order_updates(const host_options &options, machine &array)
     credentials.password = &password;
     protocolUpdateOrder__AuthenticateRequest who;
     who.credentials = &credentials;
-    expect(orders.call("authenticate", &proxy::authenticate, who).success, "the credentials are accepted");
-    std::printf("    %-13s accepted\n", "authenticate");
+    const protocolUpdateOrder__AuthenticateResponse &verdict =
+        orders.call("authenticate", &proxy::authenticate, who);
+    expect(verdict.success && verdict.credentials != nullptr && verdict.credentials->username != nullptr &&
+               *verdict.credentials->username == user,
+           "the credentials are accepted");
+    std::printf("    %-13s accepted            %s\n", "authenticate", user.c_str());
 
     protocolUpdateOrder__UpdateOrderContent order;
     order.subject = &array.identity;
@@ -225,6 +229,10 @@ void report_status(const host_options &options, machine &array)
     expect(array.is(held.subject) && held.attachment.size() == 1 && held.reason.size() == 1 &&
                held.reason[0]->soap_type() == reason.soap_type(),
            "the service holds the report");
+    const auto *const event = dynamic_cast<const protocolStatusReport__Reason_x002eEvent *>(held.reason[0]);
+    expect(event != nullptr && event->occurrenceDateTime != nullptr &&
+               event->occurrenceDateTime->compare(0, 19, when, 0, 19) == 0,
+           "and when its event occurred");
     _protocolStatusReport__closeRequest close;
     status.call("close", &proxy::close, close, state::closed, "closed");
     status.call("remove", &proxy::remove, report, state::closed, "closed");

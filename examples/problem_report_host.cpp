@@ -17,7 +17,8 @@
 //   context             the host, one for each thread. Its end closes the connection and frees what is the
 //                       context's.
 #include <cstdio>
-#include <cstdlib>
+#include <new>
+#include <stdexcept>
 #include <string>
 
 #include <zuv_client_pro/ProblemReportSoapBinding.h>
@@ -137,16 +138,10 @@ int call(soap *ctx, const char *endpoint, const operation<Wrapper, Response> &op
 // ---------------------------------------------------------------------------------------------
 // The host.
 
-[[noreturn]] void fail(const char *what)
-{
-    std::fprintf(stderr, "problem_report_host: %s\n", what);
-    std::exit(1);
-}
-
 void expect(bool holds, const char *what)
 {
     if (!holds)
-        fail(what);
+        throw std::runtime_error(std::string("not so: ") + what);
 }
 
 class reporter {
@@ -155,7 +150,7 @@ public:
         : context_(options.mode()), endpoint_(options.endpoint("ProblemReport"))
     {
         if (soap_set_namespaces(&context_, options.namespaces()))
-            fail("out of memory");
+            throw std::bad_alloc();
     }
 
     void run()
@@ -178,9 +173,10 @@ private:
         soap_discard_all(&context_);              // and what else was made for it; the connection stays
         aim();
         Response response;
-        if (call(&context_, endpoint_.c_str(), op, request, response) != 0) {
+        const int error = call(&context_, endpoint_.c_str(), op, request, response);
+        if (error != 0) {
             soap_fault_print_file(&context_, stderr);
-            fail(op.name);
+            throw std::runtime_error(std::string(op.name) + " failed with error " + std::to_string(error));
         }
         std::printf("%-13s %zu answers, %zu attachments, %s\n", op.name, response.result->answer.size(),
                     response.result->attachment.size(),
@@ -198,7 +194,7 @@ private:
             return;
         soap_header_record(&context_);
         if (context_.header == nullptr)
-            fail("out of memory");
+            throw std::bad_alloc();
         context_.header->header = &header_;
     }
 
@@ -312,6 +308,11 @@ private:
 
 int main(int argc, char **argv)
 {
-    reporter(host_options(argc, argv)).run();
-    return 0;
+    try {
+        reporter(host_options(argc, argv)).run();
+        return 0;
+    } catch (const std::exception &failure) {
+        std::fprintf(stderr, "problem_report_host: %s\n", failure.what());
+        return 1;
+    }
 }

@@ -13,6 +13,7 @@ import subprocess
 import sys
 import tempfile
 
+import messages
 import zuv_service
 
 LARGE = 5_000_000  # bytes
@@ -70,7 +71,7 @@ def expect_continue(zuv):
     """curl sends nothing of a body of this size before it is told to go on, or a second has passed."""
     for size in (10, LARGE):
         for framing in ([], ["-H", "Transfer-Encoding: chunked"]):
-            statuses, body = post(zuv, zuv_service.PATH, create_request(size), "-H", "Expect: 100-continue",
+            statuses, body = post(zuv, messages.service_path("Profile"), create_request(size), "-H", "Expect: 100-continue",
                                   "--expect100-timeout", str(LIMIT_S), *framing)
             assert statuses == ["100", "200"] and len(body) > size, (size, framing, statuses)
     print("Expect: 100-continue is answered before the body arrives")

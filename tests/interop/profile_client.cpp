@@ -14,7 +14,8 @@
 #include <zuv_client_pro/soap_binary.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_log.h>
-#include <zuv_client_pro/soap_xml.h>
+
+#include "host_options.h"
 
 namespace {
 
@@ -120,14 +121,12 @@ void expect_sample(const profile &p)
 
 class client {
 public:
-    explicit client(const options &o)
-        : options_(o), rows_(o.soap12 ? soap12_rows() : std::vector<soap_namespace>()),
-          proxy_(o.endpoint.c_str(), o.mode())
+    explicit client(const options &o) : options_(o), proxy_(o.endpoint.c_str(), o.mode())
     {
         soap_log_set_received(&proxy_, nullptr);
         soap_log_set_sent(&proxy_, o.trace.empty() ? nullptr : o.trace.c_str());
         if (o.soap12)
-            expect(soap_set_namespaces(&proxy_, rows_.data()) == 0, "the namespaces are installed");
+            expect(soap_set_namespaces(&proxy_, soap12_namespaces()) == 0, "the namespaces are installed");
         open_ = proxy_.on_open;
         proxy_.user = this;
         proxy_.on_open = [](soap *ctx, const char *endpoint, const char *host, int port) {
@@ -155,20 +154,6 @@ public:
     }
 
 private:
-    static std::vector<soap_namespace> soap12_rows()
-    {
-        const ProfileSoapBindingProxy standard;
-        std::vector<soap_namespace> rows;
-        for (const soap_namespace *row = standard.namespaces;; ++row) {
-            rows.push_back(*row);
-            if (row->prefix == nullptr)
-                break;
-        }
-        rows.at(0).uri = "http://www.w3.org/2003/05/soap-envelope";
-        rows.at(1).uri = "http://www.w3.org/2003/05/soap-encoding";
-        return rows;
-    }
-
     // One call about the profile that was created; checks what all answers have in common.
     template <class Response, class Request>
     const profile &answer(const char *name, int (ProfileSoapBindingProxy::*call)(Request *, Response &),
@@ -275,7 +260,6 @@ private:
     }
 
     options options_;
-    std::vector<soap_namespace> rows_;
     ProfileSoapBindingProxy proxy_;
     int (*open_)(soap *, const char *, const char *, int) = nullptr;
     int opened_ = 0;

@@ -6,8 +6,6 @@ import tempfile
 
 import listening
 
-PATH = "/zuv/v1.0/services/Profile"
-
 
 @contextlib.contextmanager
 def running(program, *options):
@@ -20,5 +18,4 @@ def running(program, *options):
 
 def running_npm(folder, schemas, *options):
     """The same for the service in the folder, where its packages are installed."""
-    wsdl = os.path.join(schemas, "profile", "Profile.wsdl")
-    return listening.started(["node", "server.js", wsdl, *options], end_status=-signal.SIGTERM, cwd=folder)
+    return listening.started(["node", "server.js", schemas, *options], end_status=-signal.SIGTERM, cwd=folder)
