@@ -67,7 +67,7 @@ def main():
         check_links(os.path.join(source, page))
     check_guide(source)
     with zuv_service.running(service) as address:
-        endpoint = address + zuv_service.PATH
+        endpoint = address + "/zuv/v1.0/services/Profile"
         check_run(guide, [endpoint], [r"^Ada's workshop$", r"^still here: Ada's workshop$", r"^not found: urn:not:there$",
                                       r"^\d+ bytes$"])
         check_run(readme_host, [], [r"^kept as urn:zuv:profile:"], ZUV_README_ENDPOINT=endpoint)
