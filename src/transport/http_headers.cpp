@@ -65,7 +65,10 @@ int parse_content_type(soap *ctx, const char *value)
 
 int parse_content_length(soap *ctx, const char *value)
 {
-    ctx->content_length = std::strtoul(value, nullptr, 10);
+    const std::uint64_t length = std::strtoul(value, nullptr, 10);
+    if (ctx->content_length_given && length != ctx->content_length)
+        ctx->framing_doubtful = true; // which one holds is anybody's guess
+    ctx->content_length = length;
     ctx->content_length_given = true;
     return SOAP_OK;
 }

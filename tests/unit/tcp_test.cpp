@@ -1,4 +1,6 @@
-// tcp_test.cpp - sockets of a context against peers on the loopback.
+// tcp_test.cpp - stream sockets of a context against peers on the loopback.
+//
+// Elsewhere: datagrams, proxies and the accepting side (tcp_service_test.cpp).
 #include <cerrno>
 #include <fcntl.h>
 #include <netinet/tcp.h>
@@ -13,12 +15,13 @@
 
 #include "support/loopback.h"
 #include "support/socket_calls.h"
+#include "support/tcp_client.h"
 #include "transport/tcp_socket.h"
 
 namespace {
 
+using namespace tcp_clients;
 using loopback::bound_socket;
-using loopback::context;
 using loopback::peer;
 using loopback::write_text;
 
@@ -30,40 +33,6 @@ protected:
         descriptor_test::TearDown();
     }
 };
-
-int open_to(context &ctx, int port, const char *host = "127.0.0.1")
-{
-    return tcp_connect(ctx.get(), "http://peer/", host, port);
-}
-
-std::string receive(context &ctx)
-{
-    char buffer[256];
-    return std::string(buffer, tcp_recv(ctx.get(), buffer, sizeof buffer));
-}
-
-void wait_for_end(int socket)
-{
-    char byte;
-    while (read(socket, &byte, 1) > 0) {
-    }
-}
-
-int option_of(int socket, int level, int name)
-{
-    int value = -1;
-    socklen_t size = sizeof value;
-    getsockopt(socket, level, name, &value, &size);
-    return value;
-}
-
-void expect_failure(context &ctx, int error, const char *text, const char *detail)
-{
-    EXPECT_EQ(ctx->error, error);
-    EXPECT_EQ(ctx->socket, -1);
-    EXPECT_EQ(ctx.fault_text(), text);
-    EXPECT_EQ(ctx.fault_detail(), detail);
-}
 
 // --- connecting ---
 
@@ -413,51 +382,6 @@ TEST_F(tcp, a_stream_that_fails_is_an_error_even_if_it_throws)
     }
 }
 
-// --- datagrams ---
-
-TEST_F(tcp, datagrams_go_to_the_address_and_come_from_the_peer)
-{
-    const bound_socket service(SOCK_DGRAM);
-    context ctx(MODE_UDP);
-    ctx->ipv4_multicast_ttl = 3;
-    const unsigned char loopback_interface[] = {127, 0, 0, 1};
-    ctx->ipv4_multicast_interface = reinterpret_cast<const char *>(loopback_interface);
-    const int socket = tcp_connect(ctx.get(), "soap.udp://x/", "127.0.0.1", service.port());
-    ASSERT_GE(socket, 0);
-    EXPECT_EQ(option_of(socket, IPPROTO_IP, IP_MULTICAST_TTL), 3);
-    EXPECT_EQ(ctx->peer_length, sizeof(sockaddr_in));
-    EXPECT_EQ(tcp_send(ctx.get(), "ping", 4), 0);
-    sockaddr_in from{};
-    socklen_t size = sizeof from;
-    char buffer[16];
-    EXPECT_EQ(
-        recvfrom(service.socket(), buffer, sizeof buffer, 0, reinterpret_cast<sockaddr *>(&from), &size), 4);
-    sendto(service.socket(), "pong", 4, 0, reinterpret_cast<sockaddr *>(&from), size);
-    EXPECT_EQ(receive(ctx), "pong");
-    EXPECT_EQ(reinterpret_cast<sockaddr_in *>(ctx->peer)->sin_port,
-              htons(static_cast<std::uint16_t>(service.port())));
-    EXPECT_EQ(tcp_disconnect(ctx.get()), 0);
-    EXPECT_EQ(ctx->socket, socket) << "a datagram socket outlives the exchange";
-}
-
-TEST_F(tcp, a_refused_datagram_is_sent_once_or_twice_more)
-{
-    static const struct {
-        int flags, failures, result, sends;
-    } cases[] = {{0, 1, 0, 2}, {0, 9, -1, 2}, {SO_BROADCAST, 2, 0, 3}, {SO_BROADCAST, 9, -1, 3}};
-    const bound_socket service(SOCK_DGRAM);
-    for (const auto &c : cases) {
-        context ctx(MODE_UDP);
-        ctx->connect_flags = c.flags;
-        ASSERT_GE(tcp_connect(ctx.get(), "soap.udp://x/", "127.0.0.1", service.port()), 0);
-        socket_calls::counts = {};
-        socket_calls::fail_sendto = {c.failures, ENOBUFS};
-        EXPECT_EQ(tcp_send(ctx.get(), "ping", 4), c.result) << c.flags << ' ' << c.failures;
-        EXPECT_EQ(socket_calls::counts.sendto, c.sends) << c.flags << ' ' << c.failures;
-        EXPECT_EQ(ctx->errno_value, c.result == 0 ? 0 : ENOBUFS);
-    }
-}
-
 // --- the end ---
 
 TEST_F(tcp, a_kept_connection_serves_only_while_it_is_quiet)
@@ -585,101 +509,6 @@ TEST_F(tcp, socket_errors_have_texts_by_their_mode)
         ctx->send_timeout = c.send;
         EXPECT_STREQ(tcp_error_text(ctx.get()), c.text);
     }
-}
-
-// --- proxy ---
-
-TEST_F(tcp, a_proxy_that_refuses_ends_the_attempt_with_its_status)
-{
-    std::string head;
-    {
-        const peer proxy([&](int client) {
-            head = loopback::read_head(client);
-            write_text(client, "HTTP/1.1 407 Who are you\r\nContent-Length: 2\r\n\r\nno");
-            wait_for_end(client);
-        });
-        context ctx;
-        ctx->proxy_host = "[127.0.0.1]";
-        ctx->proxy_port = proxy.port();
-        ctx->proxy_user = "user";
-        ctx->proxy_password = "secret";
-        std::snprintf(ctx->host, sizeof ctx->host, "far.example");
-        ctx->port = 443;
-        const std::uint32_t output_mode = ctx->output_mode;
-        EXPECT_EQ(tcp_connect(ctx.get(), "https://far.example/x", "far.example", 443), -1);
-        EXPECT_EQ(ctx->error, 407);
-        EXPECT_EQ(ctx->socket, -1);
-        EXPECT_EQ(ctx->output_mode, output_mode);
-    }
-    EXPECT_TRUE(head.starts_with("CONNECT far.example:443 HTTP/1.1\r\n")) << head;
-    EXPECT_NE(head.find("Proxy-Authorization: Basic dXNlcjpzZWNyZXQ=\r\n"), std::string::npos) << head;
-}
-
-// --- accepting ---
-
-TEST_F(tcp, a_client_is_accepted_and_named)
-{
-    context service(MODE_KEEP_ALIVE), client;
-    service->bind_flags = SO_REUSEADDR;
-    ASSERT_GE(soap_bind(service.get(), "127.0.0.1", 0, 5), 0);
-    ASSERT_GE(open_to(client, loopback::port_of(service->master_socket)), 0);
-    for (const int limit : {0, 5}) {
-        service->accept_timeout = limit;
-        if (limit != 0) {
-            ASSERT_GE(open_to(client, loopback::port_of(service->master_socket)), 0);
-        }
-        ASSERT_GE(soap_accept(service.get()), 0);
-        EXPECT_STREQ(service->host, "127.0.0.1");
-        EXPECT_EQ(service->peer_address, 0x7F000001u);
-        EXPECT_EQ(service->port, loopback::port_of(client->socket));
-        EXPECT_EQ(service->keep_alive, 1);
-        EXPECT_EQ(option_of(service->socket, SOL_SOCKET, SO_KEEPALIVE), 1);
-        EXPECT_EQ(fcntl(service->socket, F_GETFL) & O_NONBLOCK, 0);
-        EXPECT_EQ(tcp_send(client.get(), "hello", 5), 0);
-        EXPECT_EQ(receive(service), "hello");
-        EXPECT_EQ(tcp_disconnect(service.get()), 0);
-    }
-}
-
-TEST_F(tcp, listening_and_accepting_name_what_failed)
-{
-    context ctx, other;
-    EXPECT_EQ(soap_accept(ctx.get()), -1);
-    EXPECT_EQ(ctx.fault_detail(), "no master socket in soap_accept()");
-    ctx->accept_timeout = -20000;
-    ASSERT_GE(soap_bind(ctx.get(), "127.0.0.1", 0, 1), 0);
-    EXPECT_EQ(soap_accept(ctx.get()), -1);
-    expect_failure(ctx, 28, "Timeout", "accept failed in soap_accept()");
-    EXPECT_EQ(soap_bind(other.get(), "127.0.0.1", loopback::port_of(ctx->master_socket), 1), -1);
-    EXPECT_EQ(other->master_socket, -1);
-    expect_failure(other, 28, "Address already in use", "bind failed in soap_bind()");
-    other->bind_flags = 9999;
-    EXPECT_EQ(soap_bind(other.get(), "127.0.0.1", 0, 1), -1);
-    expect_failure(other, 28, "Protocol not available", "setsockopt failed in soap_bind()");
-    EXPECT_EQ(soap_bind(other.get(), "a..b", 0, 1), -1);
-    expect_failure(other, 28, gai_strerror(EAI_NONAME), "getaddrinfo failed in soap_bind()");
-}
-
-TEST_F(tcp, a_datagram_service_has_one_socket_that_is_closed_once)
-{
-    static int closed;
-    context client(MODE_UDP);
-    closed = 0;
-    {
-        context service(MODE_UDP);
-        service->on_close_socket = [](soap *, int socket) {
-            ++closed;
-            return close(socket);
-        };
-        const int master = soap_bind(service.get(), "127.0.0.1", 0, 0);
-        ASSERT_GE(master, 0);
-        EXPECT_EQ(service->socket, master);
-        EXPECT_EQ(soap_accept(service.get()), master);
-        ASSERT_GE(tcp_connect(client.get(), "soap.udp://x/", "127.0.0.1", loopback::port_of(master)), 0);
-        EXPECT_EQ(tcp_send(client.get(), "ping", 4), 0);
-        EXPECT_EQ(receive(service), "ping");
-    }
-    EXPECT_EQ(closed, 1);
 }
 
 } // namespace

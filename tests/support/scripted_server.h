@@ -1,0 +1,157 @@
+// scripted_server.h - a server that answers calls of Profile's create as a test has it, over TCP or TLS.
+//
+// It tells whose answer an answer is: the name in the request comes back in it.
+#pragma once
+
+#include <cstdio>
+#include <functional>
+#include <netinet/tcp.h>
+#include <string>
+#include <utility>
+
+#include "support/tls_peer.h"
+
+namespace scripted {
+
+constexpr const char *REQUEST_END = "</SOAP-ENV:Envelope>";
+
+// The server's end of one connection.
+class line {
+public:
+    line(int socket, SSL *tls) : socket_(socket), tls_(tls)
+    {
+        const int on = 1;
+        setsockopt(socket_, IPPROTO_TCP, TCP_NODELAY, &on, sizeof on);
+    }
+
+    // A request to its end; empty when the client has ended.
+    std::string request()
+    {
+        std::string text;
+        char bytes[4096];
+        for (int count; text.find(REQUEST_END) == text.npos;
+             text.append(bytes, static_cast<std::size_t>(count)))
+            if ((count = read(bytes, sizeof bytes)) <= 0)
+                return {};
+        return text;
+    }
+    void send(const std::string &bytes)
+    {
+        if (tls_ && !bytes.empty())
+            SSL_write(tls_, bytes.data(), static_cast<int>(bytes.size()));
+        else
+            ::send(socket_, bytes.data(), bytes.size(), MSG_NOSIGNAL);
+    }
+    bool send_while_it_lasts(const std::string &bytes)
+    {
+        return (tls_ ? SSL_write(tls_, bytes.data(), static_cast<int>(bytes.size()))
+                     : static_cast<int>(::send(socket_, bytes.data(), bytes.size(), MSG_NOSIGNAL))) > 0;
+    }
+    void await_end()
+    {
+        char bytes[4096];
+        while (read(bytes, sizeof bytes) > 0) {
+        }
+    }
+    void end() { shutdown(socket_, SHUT_WR); }
+    void reset()
+    {
+        const linger at_once{1, 0};
+        setsockopt(socket_, SOL_SOCKET, SO_LINGER, &at_once, sizeof at_once);
+    }
+
+private:
+    int read(char *bytes, int size)
+    {
+        return tls_ ? SSL_read(tls_, bytes, size)
+                    : static_cast<int>(::read(socket_, bytes, static_cast<std::size_t>(size)));
+    }
+    int socket_;
+    SSL *tls_;
+};
+
+// The name that a request gives, such as "call-7".
+inline std::string name_in(const std::string &request)
+{
+    const std::size_t at = request.find(">call-");
+    return at == request.npos ? "" : request.substr(at + 1, request.find('<', at) - at - 1);
+}
+
+inline std::string answer_body(const std::string &name)
+{
+    return "<?xml version=\"1.0\"?>\n<E:Envelope xmlns:E=\"http://schemas.xmlsoap.org/soap/envelope/\""
+           " xmlns:p=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0/Profile\""
+           " xmlns:c=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0\"><E:Body><p:createResponse>"
+           "<c:identity><c:name>" +
+           name + "</c:name></c:identity></p:createResponse></E:Body></E:Envelope>\n";
+}
+
+inline std::string head(const std::string &more, const std::string &status = "HTTP/1.1 200 OK")
+{
+    return status + "\r\nContent-Type: text/xml; charset=utf-8\r\n" + more + "\r\n";
+}
+
+inline std::string with_length(const std::string &body)
+{
+    return head("Content-Length: " + std::to_string(body.size()) + "\r\n") + body;
+}
+
+inline std::string in_chunks(const std::string &body, std::size_t size = 100)
+{
+    std::string text = head("Transfer-Encoding: chunked\r\n");
+    char number[32];
+    for (std::size_t at = 0; at < body.size(); at += size) {
+        const std::string part = body.substr(at, size);
+        std::snprintf(number, sizeof number, "%zX\r\n", part.size());
+        text += number + part + "\r\n";
+    }
+    return text + "0\r\n\r\n";
+}
+
+// The whole answer to a request, as a healthy server gives it.
+inline std::string answer_to(const std::string &request)
+{
+    return with_length(answer_body(name_in(request)));
+}
+
+inline void serve_well(line &client)
+{
+    for (std::string request; !(request = client.request()).empty();)
+        client.send(answer_to(request));
+}
+
+// The first connection goes as `first` has it, all later ones well.
+class server {
+public:
+    explicit server(std::function<void(line &)> first, bool tls = false)
+        : context_(tls ? tls_peers::server_for({"peer.test", ""}) : nullptr),
+          peer_([this, first = std::move(first)](int client) { serve(client, first); }, 1000000)
+    {}
+    int port() const { return peer_.port(); }
+    std::string endpoint() const
+    {
+        return (context_ ? "https://peer.test:" : "http://peer.test:") + std::to_string(port()) + "/";
+    }
+
+private:
+    void serve(int client, const std::function<void(line &)> &first)
+    {
+        const auto &script = std::exchange(is_first_, false) ? first : WELL;
+        const tls_peers::server_connection tls(context_ ? SSL_new(context_.get()) : nullptr);
+        if (tls) {
+            SSL_set_fd(tls.get(), client);
+            if (SSL_accept(tls.get()) != 1)
+                return;
+        }
+        line end(client, tls.get());
+        script(end);
+        if (tls && SSL_get_shutdown(tls.get()) != 0)
+            SSL_shutdown(tls.get());
+    }
+    inline static const std::function<void(line &)> WELL = serve_well;
+    bool is_first_ = true;
+    tls_peers::server_context context_;
+    loopback::peer peer_;
+};
+
+} // namespace scripted

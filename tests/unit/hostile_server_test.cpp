@@ -1,0 +1,538 @@
+// hostile_server_test.cpp - calls to a server that does what no healthy server does.
+//
+// Each call ends within its time limits, with its own answer or an error, and never with another's answer.
+// The table of what was found is printed.
+#include <algorithm>
+#include <chrono>
+#include <cstdio>
+#include <future>
+#include <string>
+#include <vector>
+
+#include <gtest/gtest.h>
+#include <zuv_client_pro/ProfileSoapBindingProxy.h>
+#include <zuv_client_pro/protocol.h>
+#include <zuv_client_pro/soap_envelope.h>
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_log.h>
+
+#include "support/scripted_server.h"
+#include "support/socket_calls.h"
+
+namespace {
+
+using namespace scripted;
+
+constexpr int GUARD_S = 10;         // time limit of transfers where none should be met
+constexpr int BRIEF_US = -200000;   // as a time limit: microseconds
+constexpr int SLACK_MS = 5000;      // for a machine that is busy
+constexpr int OTHERS_ANSWER = 9999; // in place of a code
+
+class hostile_server : public tls_peers::tls_test {};
+
+// A client that keeps its connection and counts those it needed.
+class client {
+public:
+    explicit client(const server &to) : endpoint_(to.endpoint())
+    {
+        soap_log_set_received(&proxy, nullptr);
+        soap_log_set_sent(&proxy, nullptr);
+        proxy.endpoint = endpoint_.c_str();
+        proxy.input_mode = proxy.output_mode = MODE_KEEP_ALIVE;
+        proxy.connect_timeout = proxy.send_timeout = proxy.recv_timeout = GUARD_S;
+        proxy.user = this;
+        open_ = proxy.on_open;
+        proxy.on_open = [](soap *ctx, const char *url, const char *host, int port) {
+            client &self = *static_cast<client *>(ctx->user);
+            ++self.connections;
+            return self.open_(ctx, url, host, port);
+        };
+        if (endpoint_.starts_with("https")) {
+            const std::string &trusted = ca_file();
+            EXPECT_EQ(soap_ssl_client_context(&proxy, tls_peers::VERIFIED, nullptr, nullptr, trusted.c_str(),
+                                              nullptr, nullptr),
+                      0);
+        }
+    }
+    client(const client &) = delete;
+    client &operator=(const client &) = delete;
+
+    // The code of one call. `padding`: bytes of text besides.
+    int call(std::size_t padding = 0)
+    {
+        using namespace std::chrono;
+        std::string name = "call-" + std::to_string(++calls_), text(padding, 'p');
+        protocol__Identity identity;
+        identity.name = &name;
+        protocolProfile__ProfileContent request;
+        request.identity = &identity;
+        request.profileAuthority = &text;
+        __protocolProfile__createResponse response{};
+        proxy.destroy();
+        const auto began = steady_clock::now();
+        const int code = proxy.create(&request, response);
+        milliseconds =
+            static_cast<int>(duration_cast<std::chrono::milliseconds>(steady_clock::now() - began).count());
+        if (code != 0)
+            return code;
+        const bool own = response.result && response.result->identity && response.result->identity->name &&
+                         *response.result->identity->name == name;
+        return own ? 0 : OTHERS_ANSWER;
+    }
+
+    ProfileSoapBindingProxy proxy;
+    int connections = 0, milliseconds = 0;
+
+private:
+    static const std::string &ca_file()
+    {
+        static const std::string path = tls_peers::ca().ca_file();
+        return path;
+    }
+    std::string endpoint_;
+    int (*open_)(soap *, const char *, const char *, int) = nullptr;
+    int calls_ = 0;
+};
+
+// --- scripts of the first connection ---
+
+std::function<void(line &)> answering(std::string (*make)(const std::string &name))
+{
+    return [make](line &end) {
+        end.send(make(name_in(end.request())));
+        end.await_end();
+    };
+}
+
+void flood(line &end, const std::string &first, const std::string &rest)
+{
+    end.request();
+    end.send(first);
+    while (end.send_while_it_lasts(rest)) {
+    }
+}
+
+void byte_by_byte(line &end)
+{
+    for (std::string request; !(request = end.request()).empty();)
+        for (const char byte : answer_to(request))
+            end.send(std::string(1, byte));
+}
+
+std::string with_false_length(const std::string &name, long off)
+{
+    const std::string body = answer_body(name);
+    return head("Content-Length: " + std::to_string(static_cast<long>(body.size()) + off) + "\r\n") + body;
+}
+
+std::string with_changed_chunk(const std::string &name, const std::string &size)
+{
+    std::string text = in_chunks(answer_body(name));
+    const std::size_t at = text.find("\r\n64\r\n", text.find("\r\n\r\n"));
+    return text.replace(at + 2, 2, size);
+}
+
+constexpr unsigned MEETS_LIMIT = 1; // the first call ends by a time limit of BRIEF_US
+constexpr unsigned SPEAKS_UP = 2; // something arrives between the first two calls, which the second must see
+
+struct hostility {
+    const char *name;
+    std::function<void(line &)> first; // the first connection; all others are well
+    std::vector<int> codes;            // of the calls, in turn
+    int connections;                   // that they need
+    unsigned traits = 0;
+};
+
+const std::string X_LINE = "X: " + std::string(1000, 'x') + "\r\n";
+
+const hostility PEERS[] = {
+    {"well", serve_well, {0, 0, 0}, 1},
+    {"well, one byte at a time", byte_by_byte, {0, 0, 0}, 1},
+    {"ends between two calls",
+     [](line &end) { end.send(answer_to(end.request())); },
+     {0, 0, 0},
+     2,
+     SPEAKS_UP},
+    {"reset between two calls",
+     [](line &end) {
+         end.send(answer_to(end.request()));
+         end.reset();
+     },
+     {0, 0, 0},
+     2,
+     SPEAKS_UP},
+    {"ends at the second request",
+     [](line &end) {
+         end.send(answer_to(end.request()));
+         end.request();
+     },
+     {0, SOAP_EOF, 0},
+     2},
+    {"ends without an answer", [](line &end) { end.request(); }, {SOAP_EOF, 0, 0}, 2},
+    {"ends before the request", [](line &end) { end.end(); }, {SOAP_EOF, 0, 0}, 2},
+    {"silent", [](line &end) { end.await_end(); }, {SOAP_EOF, 0, 0}, 2, true},
+    {"half an answer, then silent",
+     [](line &end) {
+         const std::string whole = answer_to(end.request());
+         end.send(whole.substr(0, whole.size() / 2));
+         end.await_end();
+     },
+     {SOAP_EOF, 0, 0},
+     2,
+     MEETS_LIMIT},
+    {"says close and stays",
+     answering([](const std::string &name) {
+         const std::string body = answer_body(name);
+         return head("Connection: close\r\nContent-Length: " + std::to_string(body.size()) + "\r\n") + body;
+     }),
+     {0, 0, 0},
+     2},
+    {"HTTP/1.0, ends the body by ending",
+     [](line &end) { end.send(head("", "HTTP/1.0 200 OK") + answer_body(name_in(end.request()))); },
+     {0, 0, 0},
+     2},
+    {"HTTP/1.1 without a length",
+     answering([](const std::string &name) { return head("") + answer_body(name); }),
+     {0, 0, 0},
+     2},
+    {"no HTTP at all", answering(answer_body), {0, 0, 0}, 2},
+    {"a second answer at once",
+     answering([](const std::string &name) {
+         return with_length(answer_body(name)) + with_length(answer_body("call-2"));
+     }),
+     {0, 0, 0},
+     2},
+    {"a wrong second answer at once",
+     answering([](const std::string &name) {
+         return with_length(answer_body(name)) + with_length(answer_body("stray"));
+     }),
+     {0, 0, 0},
+     2},
+    {"a wrong second answer, in chunks",
+     answering([](const std::string &name) {
+         return in_chunks(answer_body(name)) + in_chunks(answer_body("stray"));
+     }),
+     {0, 0, 0},
+     2},
+    {"surplus bytes",
+     answering([](const std::string &name) { return with_length(answer_body(name)) + "surplus"; }),
+     {0, 0, 0},
+     2},
+    {"a second answer, later",
+     [](line &end) {
+         const std::string request = end.request();
+         end.send(answer_to(request));
+         end.send(with_length(answer_body("stray")));
+         end.await_end();
+     },
+     {0, 0, 0},
+     2},
+    {"length 10 too small",
+     answering([](const std::string &n) { return with_false_length(n, -10); }),
+     {0, 0, 0},
+     2},
+    {"length 10 too large",
+     answering([](const std::string &n) { return with_false_length(n, 10); }),
+     {0, 0, 0},
+     2,
+     MEETS_LIMIT},
+    {"length 10 too large, and ends",
+     [](line &end) { end.send(with_false_length(name_in(end.request()), 10)); },
+     {0, 0, 0},
+     2},
+    {"length beyond 64 bits",
+     answering([](const std::string &n) {
+         return head("Content-Length: 99999999999999999999999\r\n") + answer_body(n);
+     }),
+     {0, 0, 0},
+     2},
+    {"length negative",
+     answering([](const std::string &n) { return head("Content-Length: -1\r\n") + answer_body(n); }),
+     {0, 0, 0},
+     2},
+    {"length no number",
+     answering([](const std::string &n) { return head("Content-Length: many\r\n") + answer_body(n); }),
+     {0, 0, 0},
+     2},
+    {"two lengths, the second right",
+     answering([](const std::string &n) {
+         std::string text = with_length(answer_body(n));
+         return text.insert(text.find("Content-L"), "Content-Length: 7\r\n");
+     }),
+     {0, 0, 0},
+     2},
+    {"a length beside chunks",
+     answering([](const std::string &n) {
+         std::string text = in_chunks(answer_body(n));
+         return text.insert(text.find("Transfer"), "Content-Length: 7\r\n");
+     }),
+     {0, 0, 0},
+     2},
+    {"chunk size too small",
+     answering([](const std::string &n) { return with_changed_chunk(n, "60"); }),
+     {SOAP_TAG_MISMATCH, 0, 0},
+     2},
+    {"chunk size too large",
+     answering([](const std::string &n) { return with_changed_chunk(n, "6A"); }),
+     {SOAP_EOF, 0, 0},
+     2,
+     MEETS_LIMIT},
+    {"chunk size endless",
+     answering([](const std::string &n) { return with_changed_chunk(n, "FFFFFFFFFFFFFFFFFF"); }),
+     {SOAP_TAG_MISMATCH, 0, 0},
+     2},
+    {"chunk size negative",
+     answering([](const std::string &n) { return with_changed_chunk(n, "-1"); }),
+     {SOAP_SYNTAX_ERROR, 0, 0},
+     2},
+    {"no last chunk",
+     answering([](const std::string &n) {
+         const std::string text = in_chunks(answer_body(n));
+         return text.substr(0, text.size() - 5);
+     }),
+     {0, 0, 0},
+     2,
+     MEETS_LIMIT},
+    {"body broken off inside",
+     answering([](const std::string &n) {
+         const std::string body = answer_body(n);
+         return with_length(body.substr(0, body.find("</c:name>")));
+     }),
+     {SOAP_EOF, 0, 0},
+     2},
+    {"body malformed",
+     answering([](const std::string &n) {
+         std::string body = answer_body(n);
+         return with_length(body.replace(body.find("<c:name>"), 8, "<c:name =\"\">"));
+     }),
+     {SOAP_SYNTAX_ERROR, 0, 0},
+     2},
+    {"body without an envelope",
+     answering([](const std::string &) { return with_length("<a><b></a>"); }),
+     {SOAP_TAG_MISMATCH, 0, 0},
+     2},
+    {"body of another kind",
+     answering([](const std::string &) { return with_length("\x89PNG\r\n\x1A\n"); }),
+     {SOAP_NO_TAG, 0, 0},
+     2},
+    {"body of zeros",
+     answering([](const std::string &) { return with_length(std::string(1000, '\0')); }),
+     {SOAP_EOF, 0, 0},
+     2},
+    {"body empty", answering([](const std::string &) { return with_length(""); }), {SOAP_NO_DATA, 0, 0}, 2},
+    {"gzip promised, none sent",
+     answering([](const std::string &n) {
+         const std::string body = answer_body(n);
+         return head("Content-Encoding: gzip\r\nContent-Length: " + std::to_string(body.size()) + "\r\n") +
+                body;
+     }),
+     {SOAP_ZLIB_ERROR, 0, 0},
+     2},
+    {"endless header lines",
+     [](line &end) { flood(end, "HTTP/1.1 200 OK\r\n", X_LINE); },
+     {SOAP_HEADER_LINE, 0, 0},
+     2},
+    {"an endless header line",
+     [](line &end) { flood(end, "HTTP/1.1 200 OK\r\nX: ", std::string(1000, 'x')); },
+     {SOAP_HEADER_LINE, 0, 0},
+     2},
+    {"an endless folded line",
+     [](line &end) { flood(end, "HTTP/1.1 200 OK\r\nX: y\r\n", " z\r\n"); },
+     {SOAP_HEADER_LINE, 0, 0},
+     2},
+    {"an endless first line",
+     [](line &end) { flood(end, "HTTP/1.1 200 ", std::string(1000, 'x')); },
+     {414, 0, 0},
+     2},
+    {"endless heads of 100",
+     [](line &end) { flood(end, "", "HTTP/1.1 100 Continue\r\n\r\n"); },
+     {SOAP_HEADER_LINE, 0, 0},
+     2},
+    {"endless error body",
+     [](line &end) {
+         flood(end, head("Content-Length: 9999999999\r\n", "HTTP/1.1 503 Busy"), std::string(10000, 'e'));
+     },
+     {503, 0, 0},
+     2},
+    {"endless trailers",
+     [](line &end) {
+         const std::string text = in_chunks(answer_body(name_in(end.request())));
+         end.send(text.substr(0, text.size() - 2));
+         while (end.send_while_it_lasts(X_LINE)) {
+         }
+     },
+     {0, 0, 0},
+     2},
+    {"endless depth",
+     [](line &end) {
+         end.request();
+         const std::string body = answer_body("x");
+         end.send(head("") + body.substr(0, body.find("<c:identity>")));
+         while (end.send_while_it_lasts("<p:profile><p:profile><p:profile><p:profile>")) {
+         }
+     },
+     {SOAP_LENGTH, 0, 0},
+     2},
+};
+
+std::string joined(const std::vector<int> &codes)
+{
+    std::string text;
+    for (const int code : codes)
+        text += (text.empty() ? "" : " ") + std::to_string(code);
+    return text;
+}
+
+void call_all(const hostility &peer, bool tls)
+{
+    const server one(peer.first, tls);
+    client caller(one);
+    const bool meets_limit = (peer.traits & MEETS_LIMIT) != 0;
+    if (meets_limit)
+        caller.proxy.recv_timeout = BRIEF_US;
+    std::vector<int> codes;
+    int longest = 0;
+    for (std::size_t i = 0; i < peer.codes.size(); ++i) {
+        if (i == 1 && (peer.traits & SPEAKS_UP) != 0) {
+            EXPECT_GT(tcp_wait(&caller.proxy, caller.proxy.socket, WAIT_RECV, GUARD_S), 0) << peer.name;
+        }
+        codes.push_back(caller.call());
+        longest = std::max(longest, caller.milliseconds);
+        if (i == 0) {
+            EXPECT_EQ(caller.milliseconds >= -BRIEF_US / 1000, meets_limit) << peer.name;
+        }
+    }
+    std::printf("%-35s %-4s %-12s %d connections %5d ms\n", peer.name, tls ? "TLS" : "TCP",
+                joined(codes).c_str(), caller.connections, longest);
+    EXPECT_EQ(joined(codes), joined(peer.codes)) << peer.name;
+    EXPECT_EQ(caller.connections, peer.connections) << peer.name;
+    EXPECT_LT(longest, SLACK_MS) << peer.name;
+}
+
+TEST_F(hostile_server, costs_the_call_and_nothing_more)
+{
+    for (const bool tls : {false, true})
+        for (const hostility &peer : PEERS)
+            call_all(peer, tls);
+}
+
+TEST_F(hostile_server, cuts_an_answer_at_every_byte)
+{
+    const std::string name = "call-1", body = answer_body(name);
+    const std::string wholes[] = {with_length(body), in_chunks(body)};
+    for (const bool tls : {false, true}) {
+        for (const std::string &whole : wholes) {
+            // From here on the answer is there; what lacks is white space and the end of the framing.
+            const std::size_t sufficient = whole.find("Envelope>", whole.find("</E:Body>")) + 9;
+            int early = 0, answered = 0;
+            for (std::size_t cut = 0; cut < whole.size(); cut += tls ? 5 : 1) {
+                const server one(
+                    [&](line &end) {
+                        end.request();
+                        end.send(whole.substr(0, cut));
+                    },
+                    tls);
+                client caller(one);
+                const int code = caller.call();
+                early += code != 0;
+                answered += code == 0;
+                ASSERT_EQ(code == 0, cut >= sufficient) << code << " at " << cut << " of " << whole.size();
+                ASSERT_NE(code, OTHERS_ANSWER);
+                ASSERT_EQ(caller.call(), 0) << cut;
+                ASSERT_EQ(caller.connections, 2) << "a cut answer ends the connection";
+            }
+            std::printf("%s, %s: %d cuts are errors, %d behind the envelope aren't\n", tls ? "TLS" : "TCP",
+                        &whole == wholes ? "a length" : "chunks", early, answered);
+        }
+    }
+}
+
+using end_of_call = std::shared_future<void>;
+
+// What a client meets ahead of a first answer, by the raw socket of the peer.
+struct obstacle {
+    const char *name;
+    void (*meet)(int socket, const end_of_call &over);
+    bool tls;
+    std::size_t padding; // bytes of text in the request
+    int code;
+    const char *detail; // of the fault
+    int least_ms;       // of the limits below
+};
+
+void stall(int, const end_of_call &over)
+{
+    over.wait();
+}
+
+const obstacle OBSTACLES[] = {
+    {"reads nothing of a large request", stall, false, 50000000, SOAP_EOF, nullptr, 200},
+    {"silent in the handshake", stall, true, 0, SOAP_TCP_ERROR, "SSL_connect failed in tcp_connect()", 1000},
+    {"a bit of a handshake, then silent",
+     [](int socket, const end_of_call &over) {
+         loopback::write_text(socket, std::string("\x16\x03\x03\x01\x00\x02", 6));
+         stall(socket, over);
+     },
+     true, 0, SOAP_TCP_ERROR, "SSL_connect failed in tcp_connect()", 1000},
+    {"plain text for a handshake",
+     [](int socket, const end_of_call &) {
+         loopback::write_text(socket, "HTTP/1.1 400 Bad Request\r\n\r\n");
+     },
+     true, 0, SOAP_TLS_ERROR, "SSL_connect error in tcp_connect()", 0},
+    {"an alert for a handshake",
+     [](int socket, const end_of_call &) {
+         loopback::write_text(socket, std::string("\x15\x03\x03\x00\x02\x02\x28", 7));
+     },
+     true, 0, SOAP_TLS_ERROR, "SSL_connect error in tcp_connect()", 0},
+    {"ends in the handshake", [](int, const end_of_call &) {}, true, 0, SOAP_TLS_ERROR,
+     "SSL_connect error in tcp_connect()", 0},
+    {"ends while a large request is sent",
+     [](int socket, const end_of_call &) { loopback::read_bytes(socket, 100000); }, false, 50000000, SOAP_EOF,
+     nullptr, 0},
+};
+
+TEST_F(hostile_server, meets_a_call_before_its_answer)
+{
+    for (const obstacle &o : OBSTACLES) {
+        std::promise<void> over;
+        const loopback::peer peer([&, end = over.get_future().share()](int socket) { o.meet(socket, end); });
+        const server well(serve_well, o.tls);
+        client caller(well);
+        const std::string endpoint =
+            (o.tls ? "https://peer.test:" : "http://peer.test:") + std::to_string(peer.port()) + "/";
+        const char *const good = caller.proxy.endpoint;
+        caller.proxy.endpoint = endpoint.c_str();
+        caller.proxy.connect_timeout = 1;
+        caller.proxy.send_timeout = BRIEF_US;
+        const int code = caller.call(o.padding);
+        over.set_value();
+        const int milliseconds = caller.milliseconds;
+        const char *const detail = soap_fault_detail_value(&caller.proxy);
+        std::printf("%-35s code %2d %5d ms %s\n", o.name, code, milliseconds, detail ? detail : "");
+        EXPECT_EQ(code, o.code) << o.name;
+        if (o.detail) {
+            EXPECT_STREQ(detail, o.detail) << o.name;
+        }
+        EXPECT_GE(milliseconds, o.least_ms) << o.name;
+        EXPECT_LT(milliseconds, o.least_ms + SLACK_MS) << o.name;
+        caller.proxy.endpoint = good;
+        EXPECT_EQ(caller.call(), 0) << o.name;
+    }
+}
+
+TEST_F(hostile_server, is_called_again_after_a_forced_close)
+{
+    for (const bool tls : {false, true}) {
+        const server one(serve_well, tls);
+        client caller(one);
+        EXPECT_EQ(caller.call(), 0);
+        const int number = caller.proxy.socket;
+        EXPECT_EQ(caller.proxy.soap_force_close_socket(), 0);
+        EXPECT_EQ(caller.proxy.socket, number) << "the number stays";
+        EXPECT_EQ(caller.proxy.soap_force_close_socket(), 0) << "and is not closed again";
+        EXPECT_EQ(caller.call(), 0);
+        EXPECT_EQ(caller.connections, 2);
+    }
+}
+
+} // namespace

@@ -1,0 +1,198 @@
+// http_service_test.cpp - the accepting side of HTTP: requests told by their head, and the heads of answers.
+#include <cstring>
+#include <string>
+
+#include <gtest/gtest.h>
+
+#include <zuv_client_pro/soap_envelope.h>
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_http.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include "support/http_head.h"
+#include "support/read_wire.h"
+
+namespace {
+
+// --- requests ---
+
+struct accepting_wire : memory_wire {
+    accepting_wire() : memory_wire(0, MODE_BUFFERED) {}
+    int request(const std::string &bytes)
+    {
+        sends.clear();
+        receive(bytes);
+        soap_reset_call(this);
+        return soap_receive_begin(this);
+    }
+};
+
+TEST(request, is_told_by_its_method)
+{
+    struct method_case {
+        const char *head;
+        int result;
+        const char *endpoint;
+    };
+    static const method_case cases[] = {
+        {"POST /a/HTTP/b HTTP/1.1\r\nHost: me:80\r\n", 0, "http://me:80/a/HTTP/b"},
+        {"POST http://you/b HTTP/1.1\r\nHost: me\r\n", 0, "http://you/b"},
+        {"POST /a HTTP/1.1\r\n", 0, "/a"},
+        {"GET /a HTTP/1.1\r\nHost: me\r\n", SOAP_GET_METHOD, "http://me/a"},
+        {"DELETE /a HTTP/1.1\r\n", 405, "/a"},
+        {"BREW /a HTTP/1.1\r\n", 405, ""},
+        {"POSTAGE /a HTTP/1.1\r\n", 405, ""},
+    };
+    for (const method_case &c : cases) {
+        accepting_wire wire;
+        EXPECT_EQ(wire.request(std::string(c.head) + "\r\n<a/>"), c.result) << c.head;
+        EXPECT_STREQ(wire.endpoint, c.endpoint) << c.head;
+    }
+    accepting_wire wire;
+    EXPECT_EQ(wire.request("POST /" + std::string(900, 'p') + " HTTP/1.1\r\nHost: " + std::string(2000, 'h') +
+                           "\r\n\r\n<a/>"),
+              0);
+    EXPECT_EQ(std::string(wire.endpoint).size(), SOAP_TEXT_SIZE - 1);
+}
+
+TEST(request, of_options_or_head_is_answered_at_once)
+{
+    for (const char *method : {"OPTIONS", "HEAD"}) {
+        accepting_wire wire;
+        EXPECT_EQ(wire.request(std::string(method) + " / HTTP/1.1\r\nHost: me\r\n\r\n"), SOAP_STOP);
+        EXPECT_EQ(wire.sent(),
+                  "HTTP/1.1 200 OK\r\nServer: zuv_client_pro/1.5.1\r\n"
+                  "Content-Type: text/xml; charset=utf-8\r\nContent-Length: 0\r\nConnection: close\r\n\r\n");
+        EXPECT_EQ(wire.output_mode, MODE_BUFFERED);
+    }
+}
+
+TEST(request, of_put_leads_to_one_more_head_and_not_to_any_number)
+{
+    accepting_wire wire;
+    const std::string put = "PUT /a HTTP/1.1\r\n\r\n";
+    EXPECT_EQ(wire.request(put + "POST /b HTTP/1.1\r\n\r\n<a/>"), SOAP_STOP);
+    std::string many;
+    for (int i = 0; i < 100000; ++i)
+        many += put;
+    EXPECT_EQ(wire.request(many), SOAP_PUT_METHOD);
+}
+
+TEST(request, that_waits_for_leave_gets_it)
+{
+    accepting_wire wire;
+    const std::string head = "POST / HTTP/1.1\r\nExpect: 100-continue\r\nContent-Type: text/xml\r\n\r\n<a/>";
+    EXPECT_EQ(wire.request(head), 0);
+    EXPECT_EQ(wire.sent(), "HTTP/1.1 100 Continue\r\n\r\n");
+    EXPECT_STREQ(wire.http_content, "text/xml");
+    EXPECT_EQ(wire.read_all(), "<a/>");
+    wire.send_limit = 0;
+    EXPECT_EQ(wire.request(head), -1);
+    read_wire response("HTTP/1.1 200 OK\r\nExpect: 100-continue\r\n\r\n<a/>");
+    EXPECT_EQ(response.result, 0);
+    EXPECT_TRUE(response.sends.empty()); // a client gives no leave
+}
+
+TEST(request, of_http_1_0_gets_no_chunks)
+{
+    accepting_wire wire;
+    wire.output_mode = MODE_CHUNKED;
+    wire.receive("POST / HTTP/1.0\r\n\r\n");
+    EXPECT_EQ(http_read_head(&wire), 0);
+    EXPECT_EQ(wire.output_mode & MODE_IO_MASK, MODE_STORE);
+}
+
+TEST(request, informative_result_of_a_header_waits_for_the_end_of_the_head)
+{
+    accepting_wire wire;
+    wire.on_parse_header = [](soap *ctx, const char *key, const char *value) {
+        return std::strcmp(key, "X") == 0 ? static_cast<int>(SOAP_FORM) : http_parse_header(ctx, key, value);
+    };
+    wire.on_form = [](soap *ctx) { return std::strcmp(ctx->http_content, "form") == 0 ? 0 : 1; };
+    EXPECT_EQ(wire.request("POST / HTTP/1.1\r\nX: 1\r\nContent-Type: form\r\n\r\na=b"), SOAP_STOP);
+}
+
+// --- response heads out ---
+
+TEST(response_out, names_the_status)
+{
+    struct response_case {
+        const char *rule;
+        void (*prepare)(memory_wire &wire);
+        int status;
+        std::uint64_t count;
+        const char *lines; // ahead of "Server"
+    };
+    static const auto server = [](memory_wire &wire) { wire.socket = 1000000; };
+    static const response_case cases[] = {
+        {"HTTP status", server, 404, 5, "HTTP/1.1 404 Not Found\r\n"},
+        {"unknown HTTP status", server, 299, 5, "HTTP/1.1 299 \r\n"},
+        {"challenge", server, 401, 5,
+         "HTTP/1.1 401 Unauthorized\r\nWWW-Authenticate: Basic realm=\"zuv Web Service\"\r\n"},
+        {"own realm", [](memory_wire &wire) { server(wire), wire.auth_realm = "mine"; }, 401, 5,
+         "HTTP/1.1 401 Unauthorized\r\nWWW-Authenticate: Basic realm=\"mine\"\r\n"},
+        {"redirect", [](memory_wire &wire) { server(wire), soap_parse_endpoint(&wire, "http://x/"); }, 303, 5,
+         "HTTP/1.1 303 See Other\r\nLocation: http://x/\r\n"},
+        {"304 has no target", server, 304, 5, "HTTP/1.1 304 Not Modified\r\n"},
+        {"success", server, 0, 5, "HTTP/1.1 200 OK\r\n"},
+        {"success, nothing to say", server, 0, 0, "HTTP/1.1 202 ACCEPTED\r\n"},
+        {"success, chunked", [](memory_wire &wire) { server(wire), wire.output_mode = MODE_CHUNKED; }, 0, 0,
+         "HTTP/1.1 200 OK\r\n"},
+        {"no socket at all", [](memory_wire &) {}, 0, 5, "Status: 200 OK\r\n"},
+        {"engine error", server, SOAP_SYNTAX_ERROR, 5, "HTTP/1.1 500 Internal Server Error\r\n"},
+        {"method", server, SOAP_HTTP_METHOD, 5, "HTTP/1.1 405 Method Not Allowed\r\n"},
+        {"method, GET", server, SOAP_GET_METHOD, 5, "HTTP/1.1 405 Method Not Allowed\r\n"},
+        {"SOAP 1.2, sender", [](memory_wire &wire) { server(wire), wire.soap_version = 2; },
+         SOAP_SYNTAX_ERROR, 5, "HTTP/1.1 400 Bad Request\r\n"},
+        {"SOAP 1.2, receiver",
+         [](memory_wire &wire) {
+             server(wire), wire.soap_version = 2;
+             soap_fault_receiver(&wire, "t", nullptr, SOAP_FATAL_ERROR);
+         },
+         SOAP_FATAL_ERROR, 5, "HTTP/1.1 500 Internal Server Error\r\n"},
+    };
+    for (const response_case &c : cases) {
+        memory_wire wire(0, MODE_BUFFERED);
+        c.prepare(wire);
+        wire.mode = MODE_BUFFERED;
+        EXPECT_EQ(http_write_response(&wire, c.status, c.count), 0) << c.rule;
+        wire.socket = -1;
+        soap_send_flush(&wire);
+        const std::string sent = wire.sent();
+        EXPECT_EQ(sent.substr(0, sent.find("Server: ")), c.lines) << c.rule;
+        EXPECT_EQ(line_of(sent, "Server"), "zuv_client_pro/1.5.1");
+        EXPECT_EQ(sent.substr(sent.size() - 4), "\r\n\r\n");
+    }
+    memory_wire wire(0, MODE_BUFFERED);
+    wire.http_version = "1.1.1";
+    EXPECT_EQ(http_write_response(&wire, 200, 0), SOAP_OUT_OF_MEMORY);
+}
+
+TEST(response_out, tells_html_and_files)
+{
+    memory_wire wire(0, MODE_BUFFERED);
+    wire.mode = MODE_BUFFERED;
+    EXPECT_EQ(http_write_response(&wire, STATUS_HTML, 1), 0);
+    wire.http_content = "image/png";
+    EXPECT_EQ(http_write_response(&wire, STATUS_FILE, 1), 0);
+    soap_send_flush(&wire);
+    const std::string sent = wire.sent();
+    EXPECT_EQ(line_of(sent, "Content-Type"), "text/html; charset=utf-8");
+    EXPECT_NE(sent.find("Content-Type: image/png\r\n"), std::string::npos);
+}
+
+TEST(reason, has_every_phrase_once)
+{
+    EXPECT_STREQ(http_reason(200), "OK");
+    EXPECT_STREQ(http_reason(307), "Temporary Redirect");
+    EXPECT_STREQ(http_reason(416), "Requested range not satisfiable");
+    EXPECT_STREQ(http_reason(306), "");
+    EXPECT_STREQ(http_reason(0), "");
+    int known = 0;
+    for (int status = 0; status < 1000; ++status)
+        known += *http_reason(status) != '\0';
+    EXPECT_EQ(known, 7 + 7 + 18 + 6);
+}
+
+} // namespace

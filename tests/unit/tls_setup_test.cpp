@@ -1,0 +1,230 @@
+// tls_setup_test.cpp - the set-up of TLS, and the library's own server side.
+#include <future>
+#include <string>
+
+#include <gtest/gtest.h>
+#include <openssl/ssl.h>
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_http.h>
+#include <zuv_client_pro/soap_tcp.h>
+#include <zuv_client_pro/soap_tls.h>
+
+#include "support/socket_calls.h"
+#include "support/tls_peer.h"
+
+namespace {
+
+using namespace tls_peers;
+
+class tls_setup : public tls_test {};
+
+const subject BY_NAME{"peer.test", ""};
+
+// --- set-up ---
+
+struct setup_case {
+    const char *key, *ca, *dh, *random, *detail;
+};
+
+TEST_F(tls_setup, a_set_up_that_fails_says_why_and_leaves_no_context)
+{
+    const std::string junk = ca().write("junk.pem", [](std::FILE *file) { std::fputs("junk\n", file); });
+    const std::string lone = ca().ca_file(); // a certificate without a key
+    const setup_case cases[] = {
+        {nullptr, "/nonexistent", nullptr, nullptr, "Can't read CA file"},
+        {nullptr, junk.c_str(), nullptr, nullptr, "Can't read CA file"},
+        {"/nonexistent", nullptr, nullptr, nullptr, "Can't read certificate key file"},
+        {lone.c_str(), nullptr, nullptr, nullptr, "Can't read key file"},
+        {nullptr, nullptr, nullptr, "/nonexistent", "Can't load randomness"},
+        {nullptr, nullptr, "/nonexistent", nullptr, "Can't read DH file"},
+        {nullptr, nullptr, "511", nullptr, "Can't read DH file"},
+        {nullptr, nullptr, junk.c_str(), nullptr, "Can't set DH parameters"},
+        {nullptr, nullptr, "8193", nullptr, "Can't set DH parameters"},
+    };
+    for (const setup_case &c : cases) {
+        context ctx;
+        EXPECT_EQ(soap_ssl_server_context(ctx.get(), TLS_NO_DEFAULT_CA, c.key, nullptr, c.ca, nullptr, c.dh,
+                                          c.random, nullptr),
+                  SOAP_TLS_ERROR);
+        EXPECT_EQ(ctx.fault_text(), "SSL/TLS error");
+        EXPECT_EQ(ctx.fault_detail(), c.detail);
+        EXPECT_EQ(ctx->tls_context, nullptr);
+    }
+    context ctx;
+    ctx->tls_crl = "/nonexistent";
+    EXPECT_EQ(set_up_client(ctx), SOAP_TLS_ERROR);
+    EXPECT_EQ(ctx.fault_detail(), "Can't read CRL file");
+}
+
+TEST_F(tls_setup, options_follow_the_flags_and_a_second_set_up_adds_to_the_context)
+{
+    context ctx;
+    ASSERT_EQ(set_up_client(ctx, VERIFIED), 0);
+    SSL_CTX *const first = ctx->tls_context;
+    EXPECT_NE(SSL_CTX_get_options(first) & SSL_OP_NO_TICKET, 0u);
+    EXPECT_EQ(SSL_CTX_get_options(first) & SSL_OP_NO_TLSv1, 0u);
+    EXPECT_EQ(SSL_CTX_get_verify_mode(first), SSL_VERIFY_PEER);
+    EXPECT_EQ(SSL_CTX_get_verify_depth(first), 9);
+    EXPECT_EQ(ctx->tls_verify, tls_verify_plain);
+    ASSERT_EQ(set_up_client(ctx, TLS_NO_TLSV1 | TLS_NO_SSLV3 | TLS_NO_DEFAULT_CA | TLS_ALLOW_EXPIRED), 0);
+    EXPECT_EQ(ctx->tls_context, first);
+    EXPECT_NE(SSL_CTX_get_options(first) & SSL_OP_NO_TLSv1, 0u);
+    EXPECT_NE(SSL_CTX_get_options(first) & SSL_OP_NO_SSLv3, 0u);
+    EXPECT_EQ(SSL_CTX_get_verify_mode(first), SSL_VERIFY_NONE);
+    EXPECT_EQ(ctx->tls_verify, tls_verify_ignore_expiry);
+    EXPECT_EQ(ctx->tls_flags & TLS_CLIENT_SIDE, TLS_CLIENT_SIDE);
+}
+
+TEST_F(tls_setup, the_password_callback_needs_room_for_the_terminator)
+{
+    char buffer[5];
+    char password[] = "four";
+    EXPECT_EQ(tls_password_callback(buffer, 4, 0, password), 0);
+    EXPECT_EQ(tls_password_callback(buffer, 5, 0, password), 4);
+    EXPECT_STREQ(buffer, "four");
+    EXPECT_EQ(tls_password_callback(buffer, 5, 0, nullptr), 0);
+}
+
+// --- the server side of the library ---
+
+struct accept_outcome {
+    int result;
+    std::string text, detail;
+    bool closed;
+};
+
+// Runs the library's server for one client, which echoes one byte if the handshake succeeds.
+std::future<accept_outcome> serve_one(context &service)
+{
+    return std::async(std::launch::async, [&service] {
+        char byte;
+        const bool came = soap_accept(service.get()) >= 0;
+        const int result = came ? soap_ssl_accept(service.get()) : -1;
+        const accept_outcome outcome{result, service.fault_text(), service.fault_detail(),
+                                     service->socket == -1};
+        if (result == 0 && tcp_recv(service.get(), &byte, 1) == 1)
+            tcp_send(service.get(), &byte, 1);
+        tcp_disconnect(service.get());
+        return outcome;
+    });
+}
+
+std::string server_pair()
+{
+    return ca().write_pair("server.pem", ca().issue(BY_NAME, server_key()).get(), server_key());
+}
+
+TEST_F(tls_setup, a_client_certificate_is_asked_for_and_verified)
+{
+    const certificates::key client_key = certificates::make_key();
+    const subject somebody{"somebody", ""};
+    const std::string server = server_pair(), trusted = ca().ca_file();
+    const std::string good = ca().write_pair("client.pem", ca().issue(somebody, client_key.get()).get(),
+                                             client_key.get(), "secret");
+    const certificates::certificate own =
+        certificates::make(somebody, client_key.get(), nullptr, client_key.get(), 7);
+    const std::string unknown = ca().write_pair("unknown.pem", own.get(), client_key.get());
+    const struct {
+        const char *pair, *password;
+        bool accepted;
+    } cases[] = {
+        {good.c_str(), "secret", true}, {unknown.c_str(), nullptr, false}, {nullptr, nullptr, false}};
+    for (const auto &c : cases) {
+        context service, client;
+        service->accept_timeout = 10;
+        ASSERT_EQ(soap_ssl_server_context(service.get(), TLS_REQUIRE_CLIENT_CERT | TLS_NO_DEFAULT_CA,
+                                          server.c_str(), nullptr, trusted.c_str(), nullptr, nullptr, nullptr,
+                                          "service"),
+                  0);
+        ASSERT_GE(soap_bind(service.get(), "127.0.0.1", 0, 5), 0);
+        std::future<accept_outcome> outcome = serve_one(service);
+        ASSERT_EQ(soap_ssl_client_context(client.get(), VERIFIED, c.pair, c.password, trusted.c_str(),
+                                          nullptr, nullptr),
+                  0);
+        client->recv_timeout = 10;
+        ASSERT_GE(open_to(client, loopback::port_of(service->master_socket)), 0) << client.fault_text();
+        EXPECT_EQ(exchange(client, "x"), c.accepted ? "x" : "");
+        tcp_disconnect(client.get());
+        const accept_outcome end = outcome.get();
+        EXPECT_EQ(end.result, c.accepted ? 0 : SOAP_TLS_ERROR) << end.text;
+        EXPECT_EQ(end.closed, !c.accepted);
+        if (!c.accepted) {
+            EXPECT_EQ(end.detail, "SSL_accept() failed in soap_ssl_accept()");
+        }
+    }
+    context wrong;
+    EXPECT_EQ(
+        soap_ssl_client_context(wrong.get(), VERIFIED, good.c_str(), "wrong", nullptr, nullptr, nullptr),
+        SOAP_TLS_ERROR);
+    EXPECT_EQ(wrong.fault_detail(), "Can't read key file");
+    EXPECT_EQ(
+        soap_ssl_client_context(wrong.get(), VERIFIED, good.c_str(), nullptr, nullptr, nullptr, nullptr),
+        SOAP_TLS_ERROR)
+        << "and nobody is asked at the terminal";
+}
+
+TEST_F(tls_setup, a_server_takes_its_diffie_hellman_group_from_file_or_size)
+{
+    const certificates::key key(EVP_RSA_gen(2048)); // no DHE suite goes with an elliptic curve
+    const std::string server = ca().write_pair("rsa.pem", ca().issue(BY_NAME, key.get()).get(), key.get());
+    const std::string file = ca().write("dh.pem", [](std::FILE *out) {
+        EVP_PKEY_CTX *generator = EVP_PKEY_CTX_new_from_name(nullptr, "DH", nullptr);
+        EVP_PKEY *parameters = nullptr;
+        EVP_PKEY_paramgen_init(generator);
+        EVP_PKEY_CTX_set_group_name(generator, "ffdhe3072");
+        EVP_PKEY_paramgen(generator, &parameters);
+        BIO *bio = BIO_new_fp(out, BIO_NOCLOSE);
+        PEM_write_bio_Parameters(bio, parameters);
+        BIO_free(bio);
+        EVP_PKEY_free(parameters);
+        EVP_PKEY_CTX_free(generator);
+    });
+    const struct {
+        const char *dh;
+        int bits;
+    } cases[] = {{"512", 2048}, {"2049", 3072}, {file.c_str(), 3072}, {nullptr, 0}};
+    for (const auto &c : cases) {
+        context service, client;
+        service->accept_timeout = client->connect_timeout = 10;
+        ASSERT_EQ(soap_ssl_server_context(service.get(), TLS_NO_DEFAULT_CA, server.c_str(), nullptr, nullptr,
+                                          nullptr, c.dh, nullptr, nullptr),
+                  0);
+        ASSERT_GE(soap_bind(service.get(), "127.0.0.1", 0, 5), 0);
+        std::future<accept_outcome> outcome = serve_one(service);
+        ASSERT_EQ(set_up_client(client), 0);
+        SSL_CTX_set_max_proto_version(client->tls_context, TLS1_2_VERSION);
+        SSL_CTX_set_cipher_list(client->tls_context, "DHE");
+        ASSERT_GE(open_to(client, loopback::port_of(service->master_socket)), 0) << client.fault_text();
+        EVP_PKEY *temporary = nullptr;
+        ASSERT_EQ(SSL_get_peer_tmp_key(client->tls_connection, &temporary), 1);
+        if (c.bits != 0) {
+            EXPECT_EQ(EVP_PKEY_get_bits(temporary), c.bits) << c.dh;
+        }
+        EVP_PKEY_free(temporary);
+        EXPECT_EQ(exchange(client, "x"), "x");
+        tcp_disconnect(client.get());
+        EXPECT_EQ(outcome.get().result, 0);
+    }
+}
+
+TEST_F(tls_setup, a_server_handshake_without_a_socket_or_a_client_fails)
+{
+    const std::string server = server_pair();
+    context service, client;
+    EXPECT_EQ(soap_ssl_accept(service.get()), SOAP_TLS_ERROR);
+    EXPECT_EQ(service.fault_detail(), "No socket in soap_ssl_accept()");
+    ASSERT_EQ(soap_ssl_server_context(service.get(), TLS_NO_DEFAULT_CA, server.c_str(), nullptr, nullptr,
+                                      nullptr, nullptr, nullptr, nullptr),
+              0);
+    ASSERT_GE(soap_bind(service.get(), "127.0.0.1", 0, 5), 0);
+    ASSERT_GE(tcp_connect(client.get(), "http://x/", "127.0.0.1", loopback::port_of(service->master_socket)),
+              0);
+    ASSERT_EQ(tcp_send(client.get(), "GET / HTTP/1.0\r\n\r\n", 18), 0);
+    ASSERT_GE(soap_accept(service.get()), 0);
+    EXPECT_EQ(soap_ssl_accept(service.get()), SOAP_TLS_ERROR);
+    EXPECT_EQ(service->socket, -1);
+    EXPECT_EQ(service.fault_detail(), "SSL_accept() failed in soap_ssl_accept()");
+    EXPECT_NE(service.fault_text().find("http request"), std::string::npos) << service.fault_text();
+}
+
+} // namespace
