@@ -1,0 +1,56 @@
+#!/usr/bin/python3
+"""Counts the system calls of a call on a kept connection without time limits, with strace.
+
+Usage: system_calls.py CALL_CLIENT ZUV_SERVICE. Skipped, with status 77, where no process may be traced. What a call costs is
+the difference between a run of many calls and one of few: one send, one receive and the question whether the connection
+still lives, and nothing else.
+"""
+import collections
+import os
+import re
+import subprocess
+import sys
+import tempfile
+
+import zuv_service
+from programs import Caller, certificates, command, filled, server
+from real_proxies import STUNNEL
+
+FEW, MANY = 10, 110
+EXPECTED = {"sendto": 1, "recvfrom": 1, "pselect6": 1}
+
+
+def counted(caller, folder, rule, endpoint, calls, *options):
+    """The system calls of a whole run, by name."""
+    file = os.path.join(folder, "strace")
+    caller.run("%s, %d calls" % (rule, calls), endpoint, "--keep-alive", "--calls", calls, *options, codes=0, connections=1,
+               ahead=["strace", "-f", "-c", "-o", file])
+    with open(file, encoding="utf-8") as table:
+        rows = re.findall(r"^ *[\d.]+ +[\d.]+ +\d+ +(\d+)(?: +\d+)? +(\w+)$", table.read(), re.MULTILINE)
+    return collections.Counter({name: int(count) for count, name in rows if name != "total"})
+
+
+def main():
+    client, service = (os.path.abspath(argument) for argument in sys.argv[1:])
+    trial = subprocess.run(["strace", "-c", "-o", os.devnull, "true"], capture_output=True, text=True)
+    if trial.returncode != 0:
+        print("skipped: strace can't trace here:", trial.stderr.strip())
+        sys.exit(77)
+    caller = Caller(client)
+    with tempfile.TemporaryDirectory() as folder, zuv_service.running(service) as zuv:
+        certificates(folder)
+        with server(folder, "stunnel", [command("stunnel4"), "@file@"],
+                    filled(STUNNEL, {"zuv": zuv.removeprefix("http://")})) as (port,):
+            secure = "https://localhost:%d%s" % (port, zuv_service.PATH)
+            for rule, endpoint, options in (("plain", zuv + zuv_service.PATH, []),
+                                            ("TLS", secure, ["--ca", os.path.join(folder, "ca.pem")])):
+                few = counted(caller, folder, rule, endpoint, FEW, *options)
+                many = counted(caller, folder, rule, endpoint, MANY, *options)
+                many.subtract(few)
+                found = {name: count / (MANY - FEW) for name, count in many.items() if count != 0}
+                print("%s: system calls of one call: %s" % (rule, found))
+                assert found == EXPECTED, found
+
+
+if __name__ == "__main__":
+    main()
