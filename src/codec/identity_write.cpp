@@ -245,7 +245,7 @@ int element_id(soap *ctx, int id, const void *address, const void *array, int di
 
 void soap_pointer_table_reset(soap *ctx)
 {
-    if (ctx->pointer_count == 0 && ctx->pointer_blocks == nullptr)
+    if (ctx->pointer_count == 0)
         return;
     if (ctx->pointer_chains != ctx->pointer_table)
         SOAP_FREE(ctx, ctx->pointer_chains);
@@ -253,7 +253,9 @@ void soap_pointer_table_reset(soap *ctx)
         clear_heads_by_record(ctx);
     else
         std::memset(ctx->pointer_table, 0, sizeof ctx->pointer_table);
-    while (soap_pointer_block *block = ctx->pointer_blocks) {
+    // One block stays for the next message, which nearly always needs one.
+    while (ctx->pointer_blocks != nullptr && ctx->pointer_blocks->next != nullptr) {
+        soap_pointer_block *block = ctx->pointer_blocks;
         ctx->pointer_blocks = block->next;
         SOAP_FREE(ctx, block);
     }

@@ -251,6 +251,8 @@ void soap_engine_done(soap *ctx)
         return;
     soap_call_scratch_free(ctx);
     soap_namespace_scope_free(ctx);
+    SOAP_FREE(ctx, ctx->pointer_blocks); // the one that stays from message to message
+    ctx->pointer_blocks = nullptr;
     instance_records_release(ctx);
     if (ctx->state == 1)
         ctx->output_mode &= ~MODE_UDP; // else the socket would stay open

@@ -46,10 +46,26 @@ int parse_host(soap *ctx, const char *value)
     return SOAP_OK;
 }
 
+// True if no item of the type can be one that is looked for, as with most: none begins as those do. One pass
+// in place of one for each.
+bool is_simple_type(const char *type)
+{
+    bool begins = true;
+    for (; *type != '\0'; ++type) {
+        const bool blank = *type == ' ' || *type == '\t';
+        if (begins && !blank && std::strchr("aAmM%", *type) != nullptr)
+            return false;
+        begins = *type == ',' || *type == ';' || (begins && blank);
+    }
+    return true;
+}
+
 int parse_content_type(soap *ctx, const char *value)
 {
     if (store_copy(ctx, value, ctx->http_content) != SOAP_OK)
         return ctx->error;
+    if (is_simple_type(value))
+        return SOAP_OK;
     const char *const type = ctx->http_content;
     if (has_item(ctx, type, "application/dime"))
         ctx->input_mode |= MODE_DIME;
@@ -197,8 +213,11 @@ constexpr header_row HEADERS[] = {
 
 int http_parse_header(soap *ctx, const char *key, const char *value)
 {
+    const auto first_letters_differ = [key](const header_row &row) {
+        return ((*key ^ *row.key) & ~0x20) != 0;
+    };
     for (const header_row &row : HEADERS) {
-        if (soap_tag_match(key, row.key) == 0)
+        if (!first_letters_differ(row) && soap_tag_match(key, row.key) == 0)
             return row.parse(ctx, value);
     }
     return SOAP_OK;
