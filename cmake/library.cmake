@@ -8,15 +8,27 @@ target_link_libraries(zuv_objects PUBLIC OpenSSL::SSL OpenSSL::Crypto ZLIB::ZLIB
 target_compile_options(zuv_objects PRIVATE -fno-strict-aliasing -fno-delete-null-pointer-checks
     -ffile-prefix-map=${PROJECT_SOURCE_DIR}/=)
 
-# The shared object: named and versioned as its file. OpenSSL and zlib come from the host's link line.
+# The shared object: soname and file bear the whole version. OpenSSL and zlib come from the host's link line, where the
+# target brings them.
 add_library(zuv_client_pro SHARED ${PROJECT_SOURCE_DIR}/cmake/empty.cpp)
+set_target_properties(zuv_client_pro PROPERTIES
+    VERSION ${PROJECT_VERSION}
+    SOVERSION ${PROJECT_VERSION}
+    LINK_DEPENDS "${PROJECT_SOURCE_DIR}/cmake/exports.map;$<TARGET_FILE:zuv_objects>")
+target_compile_features(zuv_client_pro INTERFACE cxx_std_17)
+target_include_directories(zuv_client_pro INTERFACE
+    $<BUILD_INTERFACE:${PROJECT_SOURCE_DIR}/include>
+    $<BUILD_INTERFACE:${PROJECT_BINARY_DIR}/generated/include>)
+target_link_libraries(zuv_client_pro INTERFACE OpenSSL::SSL OpenSSL::Crypto ZLIB::ZLIB)
 target_link_options(zuv_client_pro PRIVATE
     -Wl,--whole-archive $<TARGET_FILE:zuv_objects> -Wl,--no-whole-archive
-    -Wl,--version-script=${PROJECT_SOURCE_DIR}/cmake/exports.map -Wl,--as-needed)
+    -Wl,--version-script=${PROJECT_SOURCE_DIR}/cmake/exports.map)
 add_dependencies(zuv_client_pro zuv_objects)
-set_target_properties(zuv_client_pro PROPERTIES
-    SUFFIX .so.${PROJECT_VERSION}
-    LINK_FLAGS -Wl,-soname,libzuv_client_pro.so.${PROJECT_VERSION}
-    NO_SONAME ON
-    LINK_DEPENDS "${PROJECT_SOURCE_DIR}/cmake/exports.map;$<TARGET_FILE:zuv_objects>")
-target_include_directories(zuv_client_pro INTERFACE ${PROJECT_SOURCE_DIR}/include)
+
+# Only these libraries are named as needed. What the compiler leaves to the unwinder (_Unwind_Resume) is found in the one
+# that the C++ runtime brings into every process; a copy of its own would be a second unwinder under the host's exceptions.
+# The counters of coverage need libraries of their own.
+if(NOT ZUV_COVERAGE)
+    target_link_options(zuv_client_pro PRIVATE -nodefaultlibs)
+    target_link_libraries(zuv_client_pro PRIVATE stdc++ m c gcc)
+endif()

@@ -10,7 +10,6 @@ add_dependencies(zuv_service_parts zuv_generated)
 
 add_executable(zuv-service ${PROJECT_SOURCE_DIR}/service/main.cpp)
 target_link_libraries(zuv-service PRIVATE zuv_service_parts CLI11::CLI11 zuv_flags)
-install(TARGETS zuv-service RUNTIME)
 
 if(ZUV_BUILD_TESTS)
     file(GLOB ZUV_SERVICE_TESTS CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/tests/service/*_test.cpp)

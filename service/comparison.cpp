@@ -71,7 +71,7 @@ bool one_text_holds(text_operator op, std::string_view held, std::string_view wa
     case text_operator::greater_or_equal:
         return compare_naturally(held, wanted) >= 0;
     case text_operator::contains:
-        return held.find(wanted) != held.npos;
+        return held.find(wanted) != std::string_view::npos;
     case text_operator::starts_with:
         return held.starts_with(wanted);
     case text_operator::ends_with:

@@ -78,7 +78,7 @@ public:
 private:
     // --- choosing ---
 
-    bool concerns(const protocolUpdateOrderFilter__Filter &filter, update_role role) const
+    static bool concerns(const protocolUpdateOrderFilter__Filter &filter, update_role role)
     {
         return filter.scope.empty() || std::any_of(filter.scope.begin(), filter.scope.end(), [role](scope s) {
                    switch (s) {
@@ -137,7 +137,7 @@ private:
     }
 
     // A scope is the word "all", a category, a type or a product collection.
-    bool in_scope(const update_record &update, const std::string &name) const
+    static bool in_scope(const update_record &update, const std::string &name)
     {
         const auto in_collection = [&](const protocol__Identity *subject) {
             return collection_is_within(text_of(subject->productCollection), name);
@@ -187,7 +187,7 @@ private:
         std::vector<std::string> scopes = order_.updateScope;
         const bool by_filter_alone = order_.updateId.empty() && order_.updateIdQualified.empty();
         if (scopes.empty() && by_filter_alone)
-            scopes.push_back("all");
+            scopes.emplace_back("all");
         const std::set<std::string> distinct(scopes.begin(), scopes.end());
         for (const update_record *update : offered_.all()) {
             const bool left_out = (is_true(update->implicitExclusion) && !wanted_in_spite(*update)) ||
@@ -283,7 +283,8 @@ private:
     void add_requisites()
     {
         const selection how = selection_of(order_.selectRequisites, selection::as_indicated);
-        for (std::size_t i = 0; i < result_.chosen.size(); ++i) // the list grows as it is walked
+        // NOLINTNEXTLINE(modernize-loop-convert): the list grows as it is walked
+        for (std::size_t i = 0; i < result_.chosen.size(); ++i)
             choose_stand_ins(offered_.required(*result_.chosen[i].update), update_role::requisite, how);
     }
 

@@ -61,7 +61,7 @@ void split_accounts(options &o)
 {
     for (const std::string &account : o.accounts) {
         const std::size_t colon = account.find(':');
-        if (colon == account.npos)
+        if (colon == std::string::npos)
             throw std::invalid_argument("an account is USER:PASSWORD");
         o.config.accounts.emplace_back(account.substr(0, colon), account.substr(colon + 1));
     }
@@ -127,20 +127,25 @@ void serve_until_signal(const options &o)
     server.stop();
 }
 
-} // namespace
-
-int main(int argc, char **argv)
+int run(int argc, char **argv)
 {
     g_TraceLogFile[0] = '\0'; // no trace unless asked for
     CLI::App app("zuv-service: the reference service of the zuv protocol");
     options o;
     declare(app, o);
     CLI11_PARSE(app, argc, argv);
+    split_accounts(o);
+    service::the_catalogue(); // read now, while there is only one thread
+    serve_until_signal(o);
+    return 0;
+}
+
+} // namespace
+
+int main(int argc, char **argv)
+{
     try {
-        split_accounts(o);
-        service::the_catalogue(); // read now, while there is only one thread
-        serve_until_signal(o);
-        return 0;
+        return run(argc, argv);
     } catch (const std::exception &failure) {
         std::fprintf(stderr, "zuv-service: %s\n", failure.what());
         return 1;

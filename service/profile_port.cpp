@@ -12,7 +12,8 @@ namespace {
 using profile = protocolProfile__ProfileContent;
 using state = protocolProfile__ProfileState;
 
-constexpr std::time_t CREDENTIALS_LIFE = 365 * 24 * 3600; // seconds that refreshed credentials are valid
+constexpr std::time_t CREDENTIALS_LIFE =
+    std::time_t{365} * 24 * 3600; // seconds that refreshed credentials are valid
 
 shelf<profile> shelf_of(call &c)
 {

@@ -134,7 +134,7 @@ query_categories(call &c, const protocolUpdateOrder__QueryRecognizedCategoriesRe
     auto *const response = make<protocolUpdateOrder__QueryRecognizedCategoriesResponse>(c.ctx);
     for (const category_row &row : CATEGORIES) {
         update_record judged;
-        judged.category.push_back(row.name);
+        judged.category.emplace_back(row.name);
         if (!passes(request.inclusionFilter, facts_of(c.ctx, judged)))
             continue;
         auto *const category = make<protocolUpdateOrder__RecognizedCategory>(c.ctx);

@@ -146,7 +146,8 @@ int reception::settle_request(soap *ctx)
 {
     std::string_view url = ctx->endpoint;
     const std::size_t scheme = url.find("://");
-    const std::size_t path = scheme == url.npos ? 0 : std::min(url.find('/', scheme + 3), url.size());
+    const std::size_t path =
+        scheme == std::string_view::npos ? 0 : std::min(url.find('/', scheme + 3), url.size());
     root_ = url.substr(0, path);
     url.remove_prefix(path);
     path_ = url.substr(0, url.find('?'));

@@ -80,11 +80,11 @@ ZUV_API int soap_multiref_begin(soap *ctx, const void *address, const void *arra
 
 // Copies an object to a place that waited for it: `place_type` and `length` are those of the place. With a
 // place that holds the object at more indirections than the id does, `source` is a cell with the address.
-typedef void (*soap_copy_hook)(soap *ctx, int type, int place_type, void *place, std::size_t length,
-                               const void *source, std::size_t size);
+using soap_copy_hook = void (*)(soap *ctx, int type, int place_type, void *place, std::size_t length,
+                                const void *source, std::size_t size);
 // Makes an object by type id; the default instantiate operation is soap_instantiate (soap_registry.h).
-typedef void *(*soap_instantiate_function)(soap *ctx, int type, const char *xsi_type, const char *array_type,
-                                           std::size_t *size);
+using soap_instantiate_function = void *(*)(soap *ctx, int type, const char *xsi_type, const char *array_type,
+                                            std::size_t *size);
 
 // Bucket of an id text, 0 to SOAP_ID_HASH_SIZE - 1.
 ZUV_API std::size_t soap_id_hash(const char *text);

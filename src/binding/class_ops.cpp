@@ -38,6 +38,7 @@ void *class_instantiate(soap *ctx, const class_ops &ops, int count, const char *
         return nullptr;
     entry->object = actual->create(ctx, count);
     if (!entry->object) {
+        // NOLINTNEXTLINE(clang-analyzer-core.NullDereference): no call lacks a context
         ctx->error = SOAP_OUT_OF_MEMORY;
         return nullptr;
     }
@@ -141,20 +142,14 @@ step take_member(soap *ctx, const member_table &members, void *object, std::uint
 bool read_elements(soap *ctx, const member_table &members, void *object, std::uint64_t &spent)
 {
     for (;;) {
-        if (soap_element_head_read(ctx)) {
-            if (ctx->error != SOAP_NO_TAG)
-                return false;
-            return true;
-        }
+        if (soap_element_head_read(ctx))
+            return ctx->error == SOAP_NO_TAG;
         ctx->error = SOAP_TAG_MISMATCH;
         const step taken = take_member(ctx, members, object, spent);
         if (taken == step::failed)
             return false;
-        if (taken == step::unknown && soap_element_skip(ctx)) {
-            if (ctx->error != SOAP_NO_TAG)
-                return false;
-            return true;
-        }
+        if (taken == step::unknown && soap_element_skip(ctx))
+            return ctx->error == SOAP_NO_TAG;
     }
 }
 

@@ -434,10 +434,11 @@ void soap_fault_record(soap *ctx)
 
 namespace {
 
-// Stands in where memory ran out: written and never read.
+// Stands in where memory ran out: written and never read. In the thread's first block, so that the library
+// needs nothing of the dynamic loader's.
 const char **thrown_away()
 {
-    thread_local const char *place;
+    [[gnu::tls_model("initial-exec")]] thread_local const char *place;
     place = nullptr;
     return &place;
 }

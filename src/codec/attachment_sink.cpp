@@ -9,8 +9,8 @@
 
 namespace {
 
-constexpr std::size_t FIRST_PIECE = 1024;      // bytes
-constexpr std::size_t PIECE_MAX = 1024 * 1024; // bytes; pieces double up to here
+constexpr std::size_t FIRST_PIECE = 1024;                   // bytes
+constexpr std::size_t PIECE_MAX = std::size_t{1024} * 1024; // bytes; pieces double up to here
 
 } // namespace
 

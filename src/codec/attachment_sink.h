@@ -9,7 +9,7 @@
 
 class attachment_sink {
 public:
-    typedef int (*write_callback)(soap *ctx, void *handle, const char *data, std::size_t length);
+    using write_callback = int (*)(soap *ctx, void *handle, const char *data, std::size_t length);
 
     // Gathers in memory.
     explicit attachment_sink(soap *ctx) : ctx_(ctx) {}

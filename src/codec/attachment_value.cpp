@@ -71,7 +71,7 @@ const char *attachment_id(soap *ctx, const char *href, bool bracketed)
         return nullptr;
     id[0] = '<';
     std::memcpy(id + 1, href + 4, length);
-    std::strcpy(id + 1 + length, ">");
+    std::memcpy(id + 1 + length, ">", 2);
     return id;
 }
 

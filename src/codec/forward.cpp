@@ -294,6 +294,7 @@ struct move_range {
     {
         if (!within(address, start, end))
             return address;
+        // NOLINTNEXTLINE(performance-no-int-to-ptr): from one object into another, which no pointer sum may
         return reinterpret_cast<Target *>(reinterpret_cast<std::uintptr_t>(address) + distance);
     }
 };
@@ -353,6 +354,7 @@ int soap_forward_has_pending(soap *ctx, const void *start, const void *end)
     });
 }
 
+// NOLINTNEXTLINE(readability-non-const-parameter): objects at the new address are written
 void soap_forward_relocate(soap *ctx, const void *start, const void *end, char *new_address,
                            const char *old_address)
 {

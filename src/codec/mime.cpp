@@ -27,10 +27,10 @@
 
 namespace {
 
-constexpr std::size_t BOUNDARY_MAX = 1020;        // characters that are compared
-constexpr std::size_t BOUNDARY_RANDOM = 32;       // characters of six random bits each
-constexpr unsigned FIELDS_MAX = 1024;             // fields of one part head
-constexpr const char *BOUNDARY_PREFIX = "=_zuv_"; // "=_" can't come out of base64 or quoted-printable
+constexpr std::size_t BOUNDARY_MAX = 1020;   // characters that are compared
+constexpr std::size_t BOUNDARY_RANDOM = 32;  // characters of six random bits each
+constexpr unsigned FIELDS_MAX = 1024;        // fields of one part head
+constexpr char BOUNDARY_PREFIX[] = "=_zuv_"; // "=_" can't come out of base64 or quoted-printable
 constexpr const char *ROOT_ID = "<message@zuv_client_pro>";
 
 struct encoding_row {
@@ -415,8 +415,8 @@ int soap_mime_boundary_make(soap *ctx)
     if (ctx->mime.boundary != nullptr)
         return SOAP_OK;
     char text[BOUNDARY_RANDOM + 16];
-    std::strcpy(text, BOUNDARY_PREFIX);
-    if (!draw(text + std::strlen(text), BOUNDARY_RANDOM))
+    std::memcpy(text, BOUNDARY_PREFIX, sizeof BOUNDARY_PREFIX);
+    if (!draw(text + sizeof BOUNDARY_PREFIX - 1, BOUNDARY_RANDOM))
         return ctx->error = SOAP_FATAL_ERROR;
     ctx->mime.boundary = soap_string_dup(ctx, text);
     return ctx->mime.boundary == nullptr ? ctx->error : SOAP_OK;

@@ -13,7 +13,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <limits>
-#include <locale.h>
+#include <locale.h> // NOLINT(modernize-deprecated-headers): newlocale is POSIX
 
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_primitive.h>

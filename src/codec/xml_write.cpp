@@ -77,7 +77,7 @@ int put_default_namespace(soap *ctx, std::string_view prefix)
 
 bool drops_prefix(const soap *ctx, std::string_view tag)
 {
-    return has_default_namespaces(ctx) && tag.find(':') != tag.npos;
+    return has_default_namespaces(ctx) && tag.find(':') != std::string_view::npos;
 }
 
 int put_name(soap *ctx, std::string_view tag)

@@ -193,7 +193,7 @@ template <class Char>
 static bool begins_string(soap *ctx, const char *tag, int id, const Char *text, const char *type, int type_id)
 {
     id = soap_element_ref(ctx, tag, id, text, nullptr, 0, type, type_id);
-    if (id < 0)
+    if (id < 0 || !text)
         return false;
     if (*text == 0 && (ctx->mode & MODE_NULL_STRINGS)) {
         soap_element_null(ctx, tag, id, type);

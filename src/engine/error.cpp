@@ -18,7 +18,7 @@
 
 static const char *listed_text(int error)
 {
-    switch (error) {
+    switch (error) { // NOLINT(bugprone-branch-clone): codes may share a text
 #define SOAP_ERROR_TEXT(name, value, text)                                                                   \
     case value:                                                                                              \
         return text;

@@ -164,9 +164,9 @@ int soap_inflate_finish(soap *ctx)
     while (result == SOAP_OK);
     const unsigned long plain_length = ctx->zlib_stream->total_out;
     const bool gzip = ctx->zlib_in == ENCODING_GZIP;
-    if (leave_stream(ctx) != Z_OK || result == RAW_ENDED)
-        result = fail(ctx);
-    else if (result == STREAM_ENDED && gzip && !trailer_is_right(ctx, plain_length))
+    const bool left = leave_stream(ctx) == Z_OK;
+    if (!left || result == RAW_ENDED ||
+        (result == STREAM_ENDED && gzip && !trailer_is_right(ctx, plain_length)))
         result = fail(ctx);
     ctx->zlib_in = 0;
     return result == STREAM_ENDED ? SOAP_OK : ctx->error = result;

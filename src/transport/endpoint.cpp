@@ -178,10 +178,11 @@ int soap_server_connect(soap *ctx, const char *endpoints, const char *action)
 {
     if (endpoints == nullptr || std::strchr(endpoints, ' ') == nullptr)
         return soap_connect_one(ctx, STATUS_POST, endpoints, action), ctx->error;
-    char *const list = static_cast<char *>(SOAP_MALLOC(ctx, std::strlen(endpoints) + 1));
+    const std::size_t bytes = std::strlen(endpoints) + 1;
+    char *const list = static_cast<char *>(SOAP_MALLOC(ctx, bytes));
     if (list == nullptr)
         return ctx->error = SOAP_OUT_OF_MEMORY;
-    std::strcpy(list, endpoints);
+    std::memcpy(list, endpoints, bytes);
     char *item = list + std::strspn(list, " ");
     for (;;) {
         char *end = item + std::strcspn(item, " ");

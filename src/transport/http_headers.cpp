@@ -5,6 +5,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <string_view>
 
 #include <openssl/evp.h>
 
@@ -41,8 +42,10 @@ int store_action(soap *ctx, const char *value)
 
 int parse_host(soap *ctx, const char *value)
 {
-    std::strcpy(ctx->endpoint, (ctx->input_mode & MODE_TLS) != 0 ? "https://" : "http://");
-    std::strncat(ctx->endpoint, value, SOAP_TEXT_SIZE - 1 - std::strlen(ctx->endpoint));
+    const std::string_view scheme = (ctx->input_mode & MODE_TLS) != 0 ? "https://" : "http://";
+    const std::size_t length = scheme.copy(ctx->endpoint, scheme.size());
+    ctx->endpoint[length] = '\0';
+    std::strncat(ctx->endpoint, value, SOAP_TEXT_SIZE - 1 - length);
     return SOAP_OK;
 }
 

@@ -18,11 +18,11 @@
 
 namespace {
 
-constexpr std::size_t LINE_SIZE = 8192;               // bytes of a header line, terminator included
-constexpr unsigned LINES_MAX = 1024;                  // header lines of one message
-constexpr std::size_t HEAD_BYTES_MAX = 1024 * 1024;   // all header lines of one message
-constexpr unsigned INTERIM_HEADS_MAX = 100;           // heads of status 100 ahead of the one that counts
-constexpr std::uint64_t ERROR_BODY_MAX = 1024 * 1024; // bytes of an error body that are kept
+constexpr std::size_t LINE_SIZE = 8192; // bytes of a header line, terminator included
+constexpr unsigned LINES_MAX = 1024;    // header lines of one message
+constexpr std::size_t HEAD_BYTES_MAX = std::size_t{1024} * 1024; // all header lines of one message
+constexpr unsigned INTERIM_HEADS_MAX = 100; // heads of status 100 ahead of the one that counts
+constexpr std::uint64_t ERROR_BODY_MAX = std::uint64_t{1024} * 1024; // bytes of an error body that are kept
 constexpr int STATUS_CONTINUE = 100;
 constexpr int STATUS_URI_TOO_LARGE = 414;
 constexpr int STATUS_NO_METHOD = 405;

@@ -141,7 +141,7 @@ const char *set_dh_parameters(const soap *ctx, SSL_CTX *context)
     }
     if (!parameters || SSL_CTX_set0_tmp_dh_pkey(context, parameters.get()) != 1)
         return "Can't set DH parameters";
-    parameters.release(); // the SSL_CTX has it now
+    static_cast<void>(parameters.release()); // the SSL_CTX has it now
     return nullptr;
 }
 
@@ -261,7 +261,7 @@ int tls_context_setup(soap *ctx)
     if (const char *failure = set_up(ctx, context))
         return fail_setup(ctx, failure);
     ctx->tls_context = context;
-    fresh.release();
+    static_cast<void>(fresh.release());
     return 0;
 }
 

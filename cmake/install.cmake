@@ -1,0 +1,35 @@
+# What `cmake --install` lays down, in three components: runtime, development, tools. Packages of them: packages.cmake. To be
+# included behind whatever makes a program.
+include(CMakePackageConfigHelpers)
+set(ZUV_CMAKE_DIR ${CMAKE_INSTALL_LIBDIR}/cmake/zuv_client_pro)
+
+install(TARGETS zuv_client_pro EXPORT zuv_client_pro
+    LIBRARY COMPONENT runtime NAMELINK_COMPONENT development
+    INCLUDES DESTINATION ${CMAKE_INSTALL_INCLUDEDIR})
+install(DIRECTORY include/zuv_client_pro ${ZUV_GENERATED_DIR}/include/zuv_client_pro
+    DESTINATION ${CMAKE_INSTALL_INCLUDEDIR} COMPONENT development FILES_MATCHING PATTERN *.h)
+install(DIRECTORY schema/ DESTINATION ${CMAKE_INSTALL_DATADIR}/zuv_client_pro/schema COMPONENT development
+    FILES_MATCHING PATTERN *.xsd PATTERN *.wsdl)
+install(DIRECTORY examples/ DESTINATION ${CMAKE_INSTALL_DOCDIR}/examples COMPONENT development
+    FILES_MATCHING PATTERN *.cpp PATTERN *.h)
+
+install(EXPORT zuv_client_pro NAMESPACE zuv_client_pro:: FILE zuv_client_pro-targets.cmake
+    DESTINATION ${ZUV_CMAKE_DIR} COMPONENT development)
+configure_package_config_file(cmake/zuv_client_pro-config.cmake.in ${PROJECT_BINARY_DIR}/zuv_client_pro-config.cmake
+    INSTALL_DESTINATION ${ZUV_CMAKE_DIR})
+write_basic_package_version_file(${PROJECT_BINARY_DIR}/zuv_client_pro-config-version.cmake COMPATIBILITY SameMinorVersion)
+install(FILES ${PROJECT_BINARY_DIR}/zuv_client_pro-config.cmake ${PROJECT_BINARY_DIR}/zuv_client_pro-config-version.cmake
+    DESTINATION ${ZUV_CMAKE_DIR} COMPONENT development)
+
+# From the place of the .pc file, so that the tree may be moved.
+file(RELATIVE_PATH ZUV_PC_PREFIX /${CMAKE_INSTALL_LIBDIR}/pkgconfig /)
+string(REGEX REPLACE "/$" "" ZUV_PC_PREFIX ${ZUV_PC_PREFIX})
+configure_file(cmake/zuv_client_pro.pc.in ${PROJECT_BINARY_DIR}/zuv_client_pro.pc @ONLY)
+install(FILES ${PROJECT_BINARY_DIR}/zuv_client_pro.pc DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig COMPONENT development)
+
+foreach(program zuv-service zuv)
+    if(TARGET ${program})
+        install(TARGETS ${program} RUNTIME COMPONENT tools)
+    endif()
+endforeach()
+install(FILES service/README.md DESTINATION ${CMAKE_INSTALL_DOCDIR} RENAME zuv-service.md COMPONENT tools)

@@ -1,0 +1,23 @@
+# The shared object as a stranger gets it: what it exports and needs, and hosts built from the packages alone. To be
+# included behind install.cmake and packages.cmake.
+if(ZUV_SANITIZE OR ZUV_FUZZ OR ZUV_COVERAGE)
+    return() # such objects are not what is handed out
+endif()
+set(PACKAGE_TESTS ${PROJECT_SOURCE_DIR}/tests/package)
+set(TEST_PACKAGES ${PROJECT_BINARY_DIR}/package_tests/packages)
+
+add_test(NAME library_surface COMMAND /usr/bin/python3 -B ${PROJECT_SOURCE_DIR}/tests/abi/surface.py
+    $<TARGET_FILE:zuv_client_pro> ${PROJECT_SOURCE_DIR}/tests/abi/exported_names.txt
+    ${PROJECT_SOURCE_DIR}/include/zuv_client_pro ${ZUV_GENERATED_DIR}/include/zuv_client_pro)
+
+add_test(NAME package_make COMMAND ${CMAKE_CPACK_COMMAND} --config ${PROJECT_BINARY_DIR}/CPackConfig.cmake -G DEB
+    -B ${TEST_PACKAGES})
+set_tests_properties(package_make PROPERTIES FIXTURES_SETUP packages TIMEOUT 120)
+foreach(way cmake pkg-config)
+    add_test(NAME package_host_${way} COMMAND sh ${PACKAGE_TESTS}/extracted.sh ${way} ${TEST_PACKAGES}
+        ${PROJECT_BINARY_DIR}/package_tests/${way})
+endforeach()
+add_test(NAME package_clean_root COMMAND bash ${PACKAGE_TESTS}/clean_root.sh ${TEST_PACKAGES}
+    ${PROJECT_BINARY_DIR}/package_tests/clean_root)
+set_tests_properties(package_host_cmake package_host_pkg-config package_clean_root PROPERTIES
+    FIXTURES_REQUIRED packages SKIP_RETURN_CODE 77 LABELS package TIMEOUT 600)
