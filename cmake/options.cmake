@@ -30,7 +30,7 @@ if(ZUV_SANITIZE)
     add_link_options(-fsanitize=address,undefined)
 endif()
 if(ZUV_COVERAGE)
-    add_compile_options(--coverage -O0 -g)
+    add_compile_options(--coverage -fprofile-update=atomic -O0 -g) # atomic: the service runs threads
     add_link_options(--coverage)
 endif()
 if(ZUV_FUZZ)

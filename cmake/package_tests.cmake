@@ -10,6 +10,9 @@ add_test(NAME library_surface COMMAND /usr/bin/python3 -B ${PROJECT_SOURCE_DIR}/
     $<TARGET_FILE:zuv_client_pro> ${PROJECT_SOURCE_DIR}/tests/abi/exported_names.txt
     ${PROJECT_SOURCE_DIR}/include/zuv_client_pro ${ZUV_GENERATED_DIR}/include/zuv_client_pro)
 
+add_test(NAME public_headers COMMAND sh ${PACKAGE_TESTS}/public_headers.sh ${PROJECT_SOURCE_DIR}/include
+    ${ZUV_GENERATED_DIR}/include)
+
 add_test(NAME package_make COMMAND ${CMAKE_CPACK_COMMAND} --config ${PROJECT_BINARY_DIR}/CPackConfig.cmake -G DEB
     -B ${TEST_PACKAGES})
 set_tests_properties(package_make PROPERTIES FIXTURES_SETUP packages TIMEOUT 120)

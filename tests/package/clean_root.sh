@@ -20,8 +20,9 @@ trap 'rm -rf --one-file-system "$root"' EXIT
 within() { # command in the root
     env -i PATH=/usr/sbin:/usr/bin:/sbin:/bin HOME=/root DEBIAN_FRONTEND=noninteractive LC_ALL=C chroot "$root" "$@"
 }
-install() { # names of packages, or files
-    within apt-get install -y -q --no-install-recommends "$@" >"$work/apt.log" 2>&1 || { cat "$work/apt.log"; return 1; }
+install() { # names of packages, or patterns of files
+    within sh -c "apt-get install -y -q --no-install-recommends $*" >"$work/apt.log" 2>&1 ||
+        { cat "$work/apt.log"; return 1; }
 }
 keep() { # archive of the root as it is
     within apt-get clean
@@ -53,14 +54,14 @@ fi
 
 restore bare
 within apt-get update -q >"$work/apt.log" 2>&1
-install /packages/libzuv-client-pro1*.deb /packages/zuv-tools*.deb
+install '/packages/libzuv-client-pro1*.deb' '/packages/zuv-tools*.deb'
 within zuv-service --help >/dev/null
 within ldconfig -p | grep libzuv_client_pro.so.1.5.1 >/dev/null
 echo "ok    runtime and tools install on a bare root"
 
 restore compilers
 within apt-get update -q >"$work/apt.log" 2>&1
-install /packages/libzuv-client-pro1*.deb /packages/libzuv-client-pro-dev*.deb /packages/zuv-tools*.deb
+install '/packages/*.deb'
 cp -r "$here" "$root/hosts"
 for way in cmake pkg-config; do
     within sh /hosts/build_and_run_host.sh "$way" /usr "/work/$way"
