@@ -1,0 +1,202 @@
+// dispatch_test.cpp - what is done by type id alone, over every id there is.
+#include <gtest/gtest.h>
+
+#include <cstring>
+
+#include <zuv_client_pro/ProfileSoapBindingProxy.h>
+#include <zuv_client_pro/protocolProfile.h>
+#include <zuv_client_pro/soap_binary.h>
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_identity.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_registry.h>
+#include <zuv_client_pro/soap_xml.h>
+#include <zuv_client_pro/type_ids.h>
+
+#include "binding/registry.h"
+#include "support/memory_wire.h"
+
+using namespace binding;
+
+namespace {
+
+constexpr const char *ENCODING = "http://schemas.xmlsoap.org/soap/encoding/";
+
+class Dispatch : public testing::Test {
+protected:
+    Dispatch() { soap_set_namespaces(&ctx, ProfileSoapBindingProxy().namespaces); }
+
+    // A new object with one thing in it where the kind holds things: an item, a target, a text.
+    void *filled(int type)
+    {
+        const type_entry &entry = type_entries[type];
+        void *object = soap_instantiate(&ctx, type, nullptr, nullptr, nullptr);
+        switch (entry.kind) {
+        case type_kind::chars:
+            return soap_string_dup(&ctx, "xsd:chars"); // text, and a qualified name
+        case type_kind::text:
+            *static_cast<std::string *>(object) = "text";
+            break;
+        case type_kind::text_vector:
+        case type_kind::code_vector:
+        case type_kind::object_vector:
+            EXPECT_TRUE(entry.vector->append(object, filled(entry.item)));
+            break;
+        case type_kind::request:
+        case type_kind::response:
+        case type_kind::pointer:
+            *static_cast<void **>(object) = filled(entry.item);
+            break;
+        case type_kind::object:
+            if (type == SOAP_TYPE_xsd__base64Binary) { // one without content isn't written
+                auto *const bytes = static_cast<xsd__base64Binary *>(object);
+                bytes->content = static_cast<unsigned char *>(soap_block_alloc(&ctx, 1));
+                bytes->content[0] = 'b';
+                bytes->size = 1;
+            }
+            break;
+        default:
+            break;
+        }
+        return object;
+    }
+
+    std::string written(void *object, int type)
+    {
+        ctx.sends.clear();
+        ctx.output_mode = MODE_BARE_XML | MODE_BUFFERED;
+        ctx.encoding_style = nullptr;
+        soap_reset_call(&ctx);
+        soap_mark_object(&ctx, object, type);
+        soap_send_begin(&ctx);
+        ctx.soap_version = 1;
+        ctx.namespace_state = 1; // the first element's declarations are not what is looked at
+        EXPECT_EQ(0, soap_write_element(&ctx, object, "thing", -1, type));
+        soap_send_finish(&ctx);
+        return ctx.sent();
+    }
+
+    // Puts the reader behind the start tag of an element that declares what `content` needs.
+    void receive(const std::string &content)
+    {
+        std::string start = "<all xmlns:SOAP-ENC=\"http://schemas.xmlsoap.org/soap/encoding/\"";
+        for (const soap_namespace *row = ctx.namespaces; row->prefix; ++row)
+            if (std::strncmp(row->prefix, "SOAP-ENC", 8) != 0)
+                start += std::string(" xmlns:") + row->prefix + "=\"" + row->uri + "\"";
+        ctx.receive(start + ">" + content + "</all>");
+        soap_reset_call(&ctx);
+        ctx.input_mode = MODE_BARE_XML;
+        soap_receive_begin(&ctx);
+        ctx.soap_version = 1;
+        ASSERT_EQ(0, soap_element_in_begin(&ctx, "all", 0, nullptr)) << content;
+    }
+
+    memory_wire ctx;
+};
+
+TEST_F(Dispatch, what_is_written_by_id_is_read_by_id_and_written_alike)
+{
+    int kinds[static_cast<int>(type_kind::pointer) + 1] = {};
+    for (int type = 1; type <= DISPATCH_ID_MAX; ++type) {
+        const type_entry &entry = type_entries[type];
+        if (entry.kind == type_kind::none)
+            continue;
+        SCOPED_TRACE(std::to_string(type) + " " + (entry.xml_name ? entry.xml_name : "-"));
+        const std::string text = written(filled(type), type);
+        ASSERT_NE("", text);
+        receive(text);
+        void *back = read_by_type(&ctx, type);
+        ASSERT_NE(nullptr, back) << ctx.error << " " << text;
+        EXPECT_EQ(0, soap_element_in_end(&ctx, "all"));
+        EXPECT_EQ(text, written(back, type));
+        soap_discard_objects(&ctx, nullptr);
+        soap_discard_all(&ctx);
+        EXPECT_EQ(nullptr, ctx.instance_list);
+        ++kinds[static_cast<int>(entry.kind)];
+    }
+    for (int kind = 1; kind <= static_cast<int>(type_kind::pointer); ++kind)
+        EXPECT_GT(kinds[kind], 0) << kind;
+}
+
+TEST_F(Dispatch, arrays_are_made_of_whatever_may_stand_in_one)
+{
+    for (int type = 1; type <= TYPE_ID_MAX; ++type) {
+        const type_entry &entry = type_entries[type];
+        if (entry.kind == type_kind::none)
+            continue;
+        SCOPED_TRACE(type);
+        std::size_t one = 0, three = 0;
+        EXPECT_NE(nullptr, soap_instantiate(&ctx, type, nullptr, nullptr, &one));
+        const bool made = soap_instantiate_array(&ctx, type, 3, nullptr, nullptr, &three) != nullptr;
+        EXPECT_EQ(entry.vector == nullptr, made);
+        EXPECT_GT(one, 0u);
+        EXPECT_EQ(3 * one, three);
+    }
+    soap_discard_objects(&ctx, nullptr); // the sanitizer sees what isn't freed as it was made
+    EXPECT_EQ(nullptr, ctx.instance_list);
+}
+
+TEST_F(Dispatch, elements_nobody_asked_for_are_known_by_type_name_or_id)
+{
+    const struct {
+        const char *rule, *xml;
+        int type, error;
+    } cases[] = {
+        {"xsi:type", "<x xsi:type=\"protocol:Address\"/>", SOAP_TYPE_protocol__Address, 0},
+        {"the type's name as tag", "<protocol:Address/>", SOAP_TYPE_protocol__Address, 0},
+        {"a simple type", "<x xsi:type=\"xsd:int\">7</x>", SOAP_TYPE_xsd__int, 0},
+        {"a text as characters", "<x xsi:type=\"xsd:string\">7</x>", 4, 0},
+        {"an unknown name", "<x xsi:type=\"protocol:Nobody\"/>", 0, SOAP_TAG_MISMATCH},
+        {"no element", "", 0, SOAP_NO_TAG},
+        {"a wrong number", "<x xsi:type=\"xsd:int\">seven</x>", SOAP_TYPE_xsd__int, SOAP_TYPE_MISMATCH},
+    };
+    for (const auto &c : cases) {
+        SCOPED_TRACE(c.rule);
+        receive(c.xml);
+        int type = -1;
+        EXPECT_EQ(c.error == 0, soap_read_element(&ctx, &type) != nullptr);
+        EXPECT_EQ(c.type, type);
+        EXPECT_EQ(c.error, ctx.error);
+    }
+}
+
+TEST_F(Dispatch, encoded_messages_carry_shared_objects_behind_and_find_them_again)
+{
+    protocol__Contact contact;
+    std::string name = "shared";
+    contact.name = &name;
+    protocol__Identity identity;
+    identity.name = &name;
+    protocolProfile__ProfileContent profile;
+    profile.identity = &identity;
+    profile.contact = {&contact, &contact};
+
+    ctx.output_mode = MODE_BARE_XML | MODE_BUFFERED;
+    soap_reset_call(&ctx);
+    ctx.soap_version = 1;
+    ctx.encoding_style = ENCODING;
+    profile.soap_serialize(&ctx);
+    soap_send_begin(&ctx);
+    ctx.namespace_state = 1;
+    ASSERT_EQ(0, profile.soap_put(&ctx, "profile", ""));
+    soap_send_finish(&ctx);
+    const std::string text = ctx.sent();
+    EXPECT_NE(std::string::npos, text.find("</profile><")) << text;
+
+    ctx.encoding_style = nullptr;
+    receive(text);
+    protocolProfile__ProfileContent back;
+    back.soap_default(&ctx);
+    ASSERT_NE(nullptr, back.soap_get(&ctx, "profile", nullptr)) << ctx.error << " " << text;
+    ASSERT_EQ(0, soap_element_in_end(&ctx, "all")) << text;
+    ASSERT_EQ(0, soap_forward_resolve(&ctx)) << text;
+    ASSERT_EQ(2u, back.contact.size());
+    ASSERT_NE(nullptr, back.contact[0]);
+    EXPECT_EQ(back.contact[0], back.contact[1]);
+    ASSERT_NE(nullptr, back.identity);
+    ASSERT_NE(nullptr, back.identity->name);
+    EXPECT_EQ("shared", *back.identity->name);
+    EXPECT_EQ(back.identity->name, back.contact[0]->name);
+}
+
+} // namespace
