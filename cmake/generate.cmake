@@ -53,14 +53,14 @@ function(zuv_contract_outputs schema out headers sources)
     set(${sources} ${private} PARENT_SCOPE)
 endfunction()
 
-# Translates the contract in `schema` while building, below `out`. What is written: see zuv_contract_outputs. Further
-# arguments go to the generator.
+# Translates the contract in `schema` while building, below `out`. What is written: see zuv_contract_outputs, and what the
+# command line is made from, in out/tools. Further arguments go to the generator.
 function(zuv_translate_contract schema out headers sources)
     zuv_contract_outputs(${schema} ${out} public private)
     file(GLOB_RECURSE contract CONFIGURE_DEPENDS ${schema}/*.xsd ${schema}/*.wsdl ${schema}/*.txt)
     set_property(DIRECTORY APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS ${schema}/type_ids.txt)
     add_custom_command(
-        OUTPUT ${public} ${private}
+        OUTPUT ${public} ${private} ${out}/tools/operation_list.h ${out}/tools/contract_description.cpp
         COMMAND contract2cpp --schema ${schema} --out ${out} ${ARGN}
         DEPENDS contract2cpp ${contract}
         COMMENT "Translating the contract in ${schema}"

@@ -1,0 +1,196 @@
+// attachments.cpp - see attachments.h.
+#include "attachments.h"
+
+#include <cerrno>
+#include <filesystem>
+#include <system_error>
+
+#include <zuv_client_pro/soap_attachment.h>
+#include <zuv_client_pro/soap_error.h>
+
+#include "failure.h"
+#include "text_files.h"
+
+namespace cli {
+
+namespace {
+
+constexpr unsigned short DIME_NO_OPTIONS = 0;
+constexpr std::size_t NAME_MAX_LENGTH = 80; // characters of a sender's id in a file name
+
+std::string reason()
+{
+    return std::generic_category().message(errno);
+}
+
+// Takes ",key=value" off the end of a specification; the empty text if it is not there.
+std::string take_parameter(std::string &specification, const std::string &key)
+{
+    const std::size_t at = specification.rfind("," + key + "=");
+    if (at == std::string::npos || specification.find(',', at + 1) != std::string::npos)
+        return "";
+    const std::string value = specification.substr(at + key.size() + 2);
+    specification.erase(at);
+    return value;
+}
+
+// A file name from what a peer says: no path, nothing hidden, nothing that a shell or terminal minds.
+std::string file_name(unsigned number, const char *id)
+{
+    std::string name;
+    for (const char *c = id == nullptr ? "" : id; *c != '\0' && name.size() < NAME_MAX_LENGTH; ++c) {
+        const bool plain = (*c >= 'a' && *c <= 'z') || (*c >= 'A' && *c <= 'Z') || (*c >= '0' && *c <= '9');
+        if (plain || *c == '-' || *c == '.')
+            name += *c;
+        else if (*c != '<' && *c != '>')
+            name += '_';
+    }
+    return std::to_string(number) + (name.empty() ? "" : "-" + name);
+}
+
+} // namespace
+
+attachment_files::attachment_files(const std::vector<std::string> &specifications, bool dime,
+                                   std::string save_folder, bool quiet)
+    : dime_(dime), quiet_(quiet), folder_(std::move(save_folder))
+{
+    for (std::string specification : specifications) {
+        outgoing &one = out_.emplace_back();
+        one.id = take_parameter(specification, "id");
+        one.type = take_parameter(specification, "type");
+        if (one.id.empty())
+            one.id = take_parameter(specification, "id");
+        if (one.id.empty())
+            one.id = "attachment-" + std::to_string(out_.size());
+        if (one.type.empty())
+            one.type = "application/octet-stream";
+        one.path = specification;
+        one.name = std::filesystem::path(specification).filename().string();
+        one.file.reset(std::fopen(specification.c_str(), "rb"));
+        std::error_code error;
+        one.size = std::filesystem::is_regular_file(specification, error)
+                       ? std::filesystem::file_size(specification, error)
+                       : 0;
+        if (!one.file || error || !std::filesystem::is_regular_file(specification, error))
+            throw failure(EXIT_FILE,
+                          specification + ": can't be attached: " + (one.file ? "not a file" : reason()));
+        if (!dime_ && one.id.find_first_of("<>\r\n") == std::string::npos)
+            one.id = "<" + one.id + ">";
+    }
+    std::error_code error;
+    if (!folder_.empty() && !std::filesystem::is_directory(folder_, error) &&
+        !std::filesystem::create_directories(folder_, error))
+        throw failure(EXIT_FILE, folder_ + ": can't be made: " + error.message());
+}
+
+void attachment_files::prepare(soap *ctx)
+{
+    ctx->user = this;
+    ctx->mime_read_open = [](soap *c, void *handle, const char *, const char *, const char *) {
+        return of(c).begin_reading(static_cast<outgoing *>(handle));
+    };
+    ctx->mime_read = ctx->dime_read = [](soap *c, void *handle, char *buffer, std::size_t length) {
+        return of(c).read(*static_cast<outgoing *>(handle), buffer, length);
+    };
+    ctx->dime_read_open = [](soap *c, void *handle, const char *, const char *, const char *) {
+        return of(c).begin_reading(static_cast<outgoing *>(handle));
+    };
+    ctx->mime_read_close =
+        ctx->dime_read_close = [](soap *, void *handle) { static_cast<outgoing *>(handle)->shown.reset(); };
+    if (folder_.empty())
+        return;
+    ctx->mime_write_open = [](soap *c, void *, const char *id, const char *type, const char *, int) {
+        return of(c).begin_writing(c, id, type);
+    };
+    ctx->dime_write_open = [](soap *c, const char *id, const char *type, const char *) {
+        return of(c).begin_writing(c, id, type);
+    };
+    ctx->mime_write = ctx->dime_write = [](soap *c, void *handle, const char *data, std::size_t length) {
+        return of(c).write(c, *static_cast<incoming *>(handle), data, length);
+    };
+    ctx->mime_write_close = ctx->dime_write_close = [](soap *c, void *handle) {
+        of(c).end_writing(*static_cast<incoming *>(handle));
+    };
+}
+
+void attachment_files::attach(soap *ctx)
+{
+    if (out_.empty())
+        return;
+    if (dime_)
+        ctx->output_mode |= MODE_DIME;
+    else
+        soap_mime_start(ctx, nullptr, nullptr);
+    for (outgoing &one : out_) {
+        auto *const handle = reinterpret_cast<char *>(&one);
+        const int error = dime_ ? soap_dime_attach(ctx, handle, one.size, one.type.c_str(), one.id.c_str(),
+                                                   DIME_NO_OPTIONS, nullptr)
+                                : soap_mime_attach(ctx, handle, one.size, MIME_BINARY, one.type.c_str(),
+                                                   one.id.c_str(), nullptr, one.name.c_str());
+        if (error != SOAP_OK)
+            throw std::bad_alloc();
+    }
+}
+
+void *attachment_files::begin_reading(outgoing *from)
+{
+    std::rewind(from->file.get()); // a repeated call sends it again
+    from->shown = std::make_unique<progress>(from->name, from->size, true, quiet_);
+    return from;
+}
+
+std::size_t attachment_files::read(outgoing &from, char *buffer, std::size_t length)
+{
+    const std::size_t got = std::fread(buffer, 1, length, from.file.get());
+    if (std::ferror(from.file.get()) != 0)
+        problem_ = from.path + ": can't be read: " + reason();
+    else if (got == 0 && from.size != 0)
+        problem_ = from.path + ": has become shorter while it was sent";
+    from.shown->advance(got);
+    return got;
+}
+
+void *attachment_files::begin_writing(soap *ctx, const char *id, const char *type)
+{
+    incoming &one = in_.emplace_back();
+    one.path = (std::filesystem::path(folder_) / file_name(++count_, id)).string();
+    one.description = printable(type == nullptr || *type == '\0' ? "no type given" : type);
+    one.file.reset(std::fopen(one.path.c_str(), "wb"));
+    if (!one.file) {
+        problem_ = one.path + ": can't be opened: " + reason();
+        ctx->error = SOAP_USER_ERROR;
+        return nullptr;
+    }
+    one.shown = std::make_unique<progress>(one.path, 0, true, quiet_);
+    return &one;
+}
+
+int attachment_files::write(soap *ctx, incoming &to, const char *data, std::size_t length)
+{
+    if (std::fwrite(data, 1, length, to.file.get()) != length) {
+        problem_ = to.path + ": can't be written: " + reason();
+        return ctx->error = SOAP_USER_ERROR;
+    }
+    to.size += length;
+    to.shown->advance(length);
+    return SOAP_OK;
+}
+
+void attachment_files::end_writing(incoming &to)
+{
+    to.shown.reset();
+    if (std::fclose(to.file.release()) != 0)
+        problem_ = to.path + ": can't be written: " + reason();
+}
+
+std::vector<std::string> attachment_files::saved()
+{
+    std::vector<std::string> lines;
+    for (const incoming &one : in_)
+        if (!one.file)
+            lines.push_back(one.path + ": " + size_words(one.size) + ", " + one.description);
+    in_.clear();
+    return lines;
+}
+
+} // namespace cli

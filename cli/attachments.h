@@ -1,0 +1,68 @@
+// attachments.h - attachments of messages: files that go out, files that come in, a stretch at a time.
+#pragma once
+
+#include <cstdio>
+#include <list>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include <zuv_client_pro/soap.h>
+
+#include "progress.h"
+
+namespace cli {
+
+struct file_closer {
+    void operator()(std::FILE *file) const { std::fclose(file); }
+};
+using file_handle = std::unique_ptr<std::FILE, file_closer>;
+
+// The attachments of one context's messages. Its callbacks are set by `prepare`; the context must not outlive
+// it.
+class attachment_files {
+public:
+    // `specifications`: FILE[,type=TYPE][,id=ID]. An empty `save_folder` keeps nothing; otherwise it is made
+    // where needed. failure if a file can't be opened.
+    attachment_files(const std::vector<std::string> &specifications, bool dime, std::string save_folder,
+                     bool quiet);
+    attachment_files(const attachment_files &) = delete;
+    attachment_files &operator=(const attachment_files &) = delete;
+
+    void prepare(soap *ctx);
+    // Hands the files to the next message. failure if the context has no memory for that.
+    void attach(soap *ctx);
+
+    // What was saved since the last call of it, a line each; and what went wrong with a file here, empty for
+    // nothing.
+    std::vector<std::string> saved();
+    const std::string &problem() const { return problem_; }
+
+private:
+    struct outgoing {
+        std::string path, type, id, name;
+        unsigned long long size = 0;
+        file_handle file;
+        std::unique_ptr<progress> shown;
+    };
+    struct incoming {
+        std::string path, description;
+        unsigned long long size = 0;
+        file_handle file;
+        std::unique_ptr<progress> shown;
+    };
+    void *begin_reading(outgoing *from);
+    std::size_t read(outgoing &from, char *buffer, std::size_t length);
+    void *begin_writing(soap *ctx, const char *id, const char *type);
+    int write(soap *ctx, incoming &to, const char *data, std::size_t length);
+    void end_writing(incoming &to);
+    static attachment_files &of(soap *ctx) { return *static_cast<attachment_files *>(ctx->user); }
+
+    std::list<outgoing> out_; // stable addresses: the engine holds them as handles
+    std::list<incoming> in_;
+    bool dime_, quiet_;
+    std::string folder_, problem_;
+    unsigned count_ = 0;
+};
+
+} // namespace cli

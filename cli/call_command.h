@@ -1,0 +1,12 @@
+// call_command.h - one operation called from the command line: request in, calls made, answer out.
+#pragma once
+
+#include "call_options.h"
+#include "exit_codes.h"
+#include "operations.h"
+
+namespace cli {
+
+exit_code call_operation(const operation &op, const call_options &options); // throws failure
+
+} // namespace cli

@@ -1,0 +1,147 @@
+// main.cpp - zuv, the command line: its commands, and what becomes of failures.
+//
+// Elsewhere: what the commands do, one file each (call_command.h, data_command.h, new_command.h,
+// check_command.h, trace_command.h).
+#include <algorithm>
+#include <cctype>
+#include <cstdio>
+#include <functional>
+#include <list>
+#include <new>
+#include <string>
+
+#include <CLI/CLI.hpp>
+#include <zuv_client_pro/soap_log.h>
+
+#include "call_command.h"
+#include "check_command.h"
+#include "data_command.h"
+#include "failure.h"
+#include "new_command.h"
+
+namespace {
+
+using namespace cli;
+
+using action = std::function<exit_code()>;
+
+std::string lower(std::string text)
+{
+    std::transform(text.begin(), text.end(), text.begin(),
+                   [](unsigned char c) { return static_cast<char>(std::tolower(c)); });
+    return text;
+}
+
+// The first sentence of a documentation.
+std::string summary(const std::string &text)
+{
+    return text.substr(0, text.find(". ")) + (text.find(". ") == std::string::npos ? "" : ".");
+}
+
+void declare_calls(CLI::App &app, std::list<call_options> &options, action &chosen)
+{
+    for (const port &one : all_ports()) {
+        CLI::App *const group =
+            app.add_subcommand(lower(one.name), summary(one.documentation))->group("Ports");
+        group->require_subcommand(1);
+        for (const operation &op : all_operations()) {
+            if (std::string_view(op.port) != one.name)
+                continue;
+            CLI::App *const command = group->add_subcommand(op.name, summary(op.documentation));
+            call_options &own = options.emplace_back();
+            own.declare(*command);
+            command->callback(
+                [&own, &op, &chosen] { chosen = [&own, &op] { return call_operation(op, own); }; });
+        }
+    }
+}
+
+void declare_data(CLI::App &app, std::list<data_options> &options, action &chosen)
+{
+    CLI::App *const group =
+        app.add_subcommand("data", "Fetches data of attachments and updates, or delivers it.")->group("Data");
+    group->require_subcommand(1);
+    const auto add = [&](const char *name, const char *about, bool delivers,
+                         exit_code (*perform)(const data_options &)) {
+        CLI::App *const command = group->add_subcommand(name, about);
+        data_options &own = options.emplace_back();
+        own.declare(*command, delivers);
+        command->callback([&own, &chosen, perform] { chosen = [&own, perform] { return perform(own); }; });
+    };
+    add("get", "Fetches the data at an address.", false, fetch_data);
+    add("put", "Delivers a file to an address.", true, deliver_data);
+}
+
+// Options of the commands that work on documents and traces.
+struct tool_options {
+    std::string class_name;
+    bool list = false;
+    std::vector<std::string> files;
+};
+
+void declare_documents(CLI::App &app, tool_options &options, action &chosen)
+{
+    CLI::App *const make =
+        app.add_subcommand("new", "Prints an empty document of a class, its members explained.")
+            ->group("Documents");
+    CLI::Option *const name =
+        make->add_option("CLASS", options.class_name, "ProfileContent, protocolProfile:ProfileContent");
+    make->add_flag("--list", options.list, "List all classes with their documentation")->excludes(name);
+    make->callback([&] {
+        if (options.list == !options.class_name.empty())
+            throw CLI::RequiredError("CLASS or --list");
+        chosen = [&] { return options.list ? print_classes() : print_new_document(options.class_name); };
+    });
+    CLI::App *const check =
+        app.add_subcommand("check", "Tells whether documents are what the contract allows.")
+            ->group("Documents");
+    check->add_option("FILE", options.files, "Documents or SOAP messages; \"-\" for standard input")
+        ->required();
+    check
+        ->add_option("--class", options.class_name,
+                     "Take the root element for one of this class, whatever its name")
+        ->type_name("CLASS");
+    check->callback([&] { chosen = [&] { return check_files(options.files, options.class_name); }; });
+}
+
+int run(int argc, char **argv)
+{
+    CLI::App app("Calls the services of the contract, and works with their documents and traces.", "zuv");
+    app.set_version_flag("--version", "zuv " ZUV_VERSION);
+    app.require_subcommand(1);
+    app.footer("Exit: 0 done, 1 other, 2 usage, 3 document, 4 network, 5 TLS, 6 HTTP, 7 answer, 8 fault of "
+               "the request,\n"
+               "9 fault of the service, 10 other fault, 11 file. More: man zuv");
+    std::list<call_options> calls;
+    std::list<data_options> transfers;
+    tool_options tools;
+    action chosen;
+    declare_calls(app, calls, chosen);
+    declare_data(app, transfers, chosen);
+    declare_documents(app, tools, chosen);
+    try {
+        app.parse(argc, argv);
+    } catch (const CLI::ParseError &error) {
+        return app.exit(error) == 0 ? EXIT_DONE : EXIT_USAGE;
+    }
+    return chosen();
+}
+
+} // namespace
+
+int main(int argc, char **argv)
+{
+    g_TraceLogFile[0] = '\0'; // a trace is written where --trace asks for one
+    try {
+        return run(argc, argv);
+    } catch (const failure &problem) {
+        std::fprintf(stderr, "zuv: %s\n", problem.what());
+        return problem.code;
+    } catch (const std::bad_alloc &) {
+        std::fprintf(stderr, "zuv: out of memory\n");
+        return EXIT_OTHER;
+    } catch (const std::exception &problem) {
+        std::fprintf(stderr, "zuv: %s\n", problem.what());
+        return EXIT_OTHER;
+    }
+}

@@ -1,0 +1,20 @@
+// simple_types.h - values of simple types as text: what the contract allows.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+namespace cli {
+
+// Empty if `value`, blanks around it aside, is one of the XML type; else what it should be: "a whole number".
+std::string value_problem(std::string_view type, std::string_view value);
+
+// How a value of the type looks, in words for a person: "text", "date and time, 2024-05-01T12:00:00Z".
+std::string value_words(std::string_view type);
+
+// A value of the type, to begin with; empty for texts.
+std::string sample_value(std::string_view type);
+
+bool is_number(std::string_view type);
+
+} // namespace cli

@@ -1,0 +1,222 @@
+#!/usr/bin/python3
+"""Calls from the command line: every operation, the options, what comes back, and how failures are told."""
+import email
+import email.policy
+import glob
+import gzip
+import json
+import os
+import random
+import re
+import subprocess
+import tempfile
+import unittest
+
+from lxml import etree
+
+import zuv
+
+PROFILE_XML = """<p:ProfileContent xmlns:p="%s" xmlns:c="%s">
+  <c:identity><c:type>organization</c:type><c:name>Zo\u00eb &amp; \u4e16</c:name></c:identity>
+  <c:contact><c:name>one</c:name></c:contact>
+</p:ProfileContent>""" % (zuv.PROFILE, zuv.COMMON)
+GOT = zuv.envelope("<p:getResponse><p:thisURI>urn:1</p:thisURI></p:getResponse>")
+PATH = "/zuv/v1.0/services/Profile"
+
+
+class calls(unittest.TestCase):
+    def setUp(self):
+        folder = tempfile.TemporaryDirectory()
+        self.addCleanup(folder.cleanup)
+        self.folder = folder.name
+
+    def file(self, name, content):
+        path = os.path.join(self.folder, name)
+        with open(path, "wb") as file:
+            file.write(content if isinstance(content, bytes) else content.encode())
+        return path
+
+    def expect(self, run, code, *parts):
+        self.assertEqual(run.returncode, code, (run.stdout, run.stderr))
+        for part in parts:
+            self.assertIn(part, run.stdout + run.stderr)
+        return run
+
+    def test_every_operation_of_the_contract_is_a_command(self):
+        wsdl = "{http://schemas.xmlsoap.org/wsdl/}"
+        operations = 0
+        for path in glob.glob(os.path.join(zuv.SOURCE, "schema", "*", "*.wsdl")):
+            port = os.path.basename(path)[:-5].lower()
+            listed = zuv.run(port, "--help").stdout
+            for operation in etree.parse(path).iterfind(wsdl + "portType/" + wsdl + "operation"):
+                name = operation.get("name")
+                summary = " ".join(operation.findtext(wsdl + "documentation").split()).split(". ")[0].rstrip(".")
+                self.assertRegex(listed, r"(?m)^  %s +%s" % (name, re.escape(summary[:40])))
+                self.assertEqual(zuv.run(port, name, "--help").returncode, 0)
+                operations += 1
+        self.assertEqual(operations, 30)
+
+    def test_an_answer_is_the_same_however_it_was_asked_for(self):
+        request = self.file("p.xml", PROFILE_XML)
+        with zuv.service() as address:
+            env = {"ZUV_ENDPOINT": address}
+            created = self.expect(zuv.run("profile", "create", "-", given=PROFILE_XML, env=env), 0)
+            uri = re.search("urn:[^<]*", created.stdout)[0]
+            first = json.loads(zuv.run("profile", "get", "-t", uri, "--json", env=env).stdout)
+            self.assertEqual(first["identity"], {"type": "organization", "name": "Zo\u00eb & \u4e16"})
+            self.assertEqual((first["thisURI"], first["contact"]), ([uri], [{"name": "one"}]))
+            for options in ("", "--soap12", "--gzip", "--chunked", "--chunked --gzip --soap12", "--keep-alive --repeat 5"):
+                with self.subTest(options=options):
+                    run = zuv.run("profile", "set", request, "-t", uri, "--json", *options.split(), env=env)
+                    self.expect(run, 0)
+                    self.assertEqual(json.loads(run.stdout)["identity"], first["identity"])
+                    self.assertEqual("5 calls in" in run.stderr, "repeat" in options)
+            held = self.file("held.xml", zuv.run("profile", "get", "-t", uri, env=env).stdout)
+            self.expect(zuv.run("profile", "set", held, "-t", uri, env=env), 0)  # an answer serves as a request
+            self.expect(zuv.run("profile", "get", "-t", uri, "-e", "http://127.0.0.1:1", "-e", address), 0)
+
+    def test_ports_without_a_proxy_class_are_called_the_same_way(self):
+        self.expect(zuv.run("problemreport", "get"), 2, "no usual address")
+        with zuv.service() as address:
+            for options in ([], ["--soap12", "--chunked"]):
+                run = zuv.run("problemreport", "submit", "--json", "-e", address, *options)
+                report = json.loads(self.expect(run, 0).stdout)
+                self.assertEqual(report["answer"][0]["@type"],
+                                 "protocolProblemReport:Answer.Server.Administration.Acknowledgment")
+                self.expect(zuv.run("problemreport", "get", "-t", report["thisURI"][0], "-e", address), 0)
+                self.expect(zuv.run("problemreport", "get", "-t", "urn:no", "-e", address, *options), 8, "Client.ObjectNotFound",
+                            "uri: urn:no", "try       check the URI")
+
+    def test_what_the_options_ask_for_is_on_the_wire(self):
+        credentials = self.file("c.xml", '<c:Credentials xmlns:c="%s"><c:token>t0k</c:token></c:Credentials>' % zuv.COMMON)
+        header = self.file("h.xml", '<c:Header xmlns:c="%s"><c:note>first</c:note></c:Header>' % zuv.COMMON)
+        with zuv.peer(zuv.answer(zuv.envelope("<p:getResponse/>", 2))) as (address, requests):
+            run = zuv.run("profile", "get", "-e", address, "-t", "urn:1", "--transaction", "T", "--sequence", "2", "--correlation",
+                          "C", "--priority", "7", "--note", "second", "--credentials", credentials, "--header", header, "--user",
+                          "ada", "--soap12", "--action", "urn:go", env={"ZUV_PASSWORD": "s3cret"})
+            self.expect(run, 0)
+        head, _, body = requests[0].decode().partition("\r\n\r\n")
+        for line in ("POST %s HTTP/1.1" % PATH, "Authorization: Basic YWRhOnMzY3JldA==", 'SOAPAction: "urn:go"',
+                     "Content-Type: application/soap+xml"):
+            self.assertIn(line, head)
+        block = etree.fromstring(body.encode()).find("{*}Header/{%s}header" % zuv.COMMON)
+        self.assertEqual([(etree.QName(e).localname, "".join(e.itertext())) for e in block],
+                         [("targetURI", "urn:1"), ("credentials", "t0k"), ("transactionId", "T"), ("sequenceId", "2"),
+                          ("correlationId", "C"), ("priority", "7"), ("note", "first"), ("note", "second")])
+        with zuv.peer(zuv.answer(GOT)) as (address, requests):
+            proxy = address[len("http://"):]
+            self.expect(zuv.run("profile", "get", "-e", "http://there:9", "--proxy", proxy, "--proxy-user", "x", "--gzip"), 0)
+        self.assertTrue(requests[0].startswith(b"POST http://there:9" + PATH.encode()), requests)
+        self.assertIn(b"Proxy-Authorization: Basic ", requests[0])
+        self.assertIn(b":Envelope", gzip.decompress(requests[0].partition(b"\r\n\r\n")[2]))
+
+    def test_failures_are_told_by_code_and_words(self):
+        fault = "<E:Fault><faultcode>%s</faultcode><faultstring>%s</faultstring>%s</E:Fault>"
+        busy = "<detail><c:Server.ServiceUnavailable><c:description>down</c:description></c:Server.ServiceUnavailable></detail>"
+        rows = (
+            (8, zuv.answer(zuv.envelope(fault % ("E:Client", "no\x1b[31m \u202ered", "")), "500 Oops"), "what      no?[31m ?red"),
+            (9, zuv.answer(zuv.envelope(fault % ("E:Server", "busy", busy)), "500 Oops"), "try again later"),
+            (9, zuv.answer(zuv.envelope("<E:Fault><E:Code><E:Value>E:Receiver</E:Value></E:Code><E:Reason><E:Text>r</E:Text>"
+                                        "</E:Reason></E:Fault>", 2), "500 Oops"), "SOAP-ENV:Receiver"),
+            (10, zuv.answer(zuv.envelope(fault % ("E:MustUnderstand", "m", "")), "500 Oops"), "--soap12"),
+            (10, zuv.answer(zuv.envelope(fault % ("c:Odd", "o", "")), "500 Oops"), "what      o"),
+            (6, zuv.answer("", "401 Unauthorized"), "--user"),
+            (6, zuv.answer("<html>gone</html>", "302 Found", ["Location: http://else/"]), "moved to  http://else/"),
+            (6, zuv.answer("", "503 Service Unavailable"), "try again later"),
+            (7, zuv.answer("<html>"), "--trace"),
+            (4, zuv.answer(GOT[:-40]), "--silence-limit"),
+            (7, zuv.answer(zuv.envelope("<p:getResponse/>", 3)), "--soap12"),
+            (7, zuv.answer(zuv.envelope("<p:setResponse/>")), "tag name or namespace mismatch"),
+            (7, zuv.answer(GOT).replace(b"Connection", b"Content-Encoding: gzip\r\nConnection"), "zuv trace"),
+            (4, b"", "--silence-limit"),
+        )
+        for code, bytes_, words in rows:
+            with self.subTest(answer=bytes_), zuv.peer(bytes_) as (address, _):
+                run = self.expect(zuv.run("profile", "get", "-e", address), code, words, "zuv: profile get failed")
+                self.assertEqual(run.stdout, "")
+        wrong = self.file("w.xml", PROFILE_XML.replace("organization", "nobody"))
+        for code, words, arguments in (
+                (4, "Connection refused", ["profile", "get", "-e", "http://127.0.0.1:1"]),
+                (3, "w.xml:2:15: <c:type> should be one of system", ["profile", "set", wrong]),
+                (3, "holds a protocolProfile:ProfileContent, not", ["updateorder", "submit", self.file("p.xml", PROFILE_XML)]),
+                (11, "can't be opened", ["profile", "set", os.path.join(self.folder, "none.xml")]),
+                (11, "can't be attached", ["profile", "set", "--attach", self.folder]),
+                (5, "can't be set up", ["profile", "get", "--ca-file", wrong]),
+                (2, "--endpoint", ["profile", "get", "-e", "ftp://x"]),
+                (2, "", ["profile", "nothing"]), (2, "", ["profile", "get", "--repeat", "0"]), (2, "", [])):
+            with self.subTest(arguments=arguments):
+                self.expect(zuv.run(*arguments), code, words)
+
+    def test_tls_names_must_match_unless_told_otherwise(self):
+        def make(name, subject):
+            path = os.path.join(self.folder, name)
+            subprocess.run(["openssl", "req", "-x509", "-newkey", "rsa:2048", "-nodes", "-days", "2", "-keyout", path + ".key",
+                            "-out", path, "-subj", "/CN=x", "-addext", "subjectAltName=" + subject], check=True,
+                           capture_output=True)
+            with open(path + ".key") as key, open(path, "a") as both:
+                both.write(key.read())
+            return path
+        here, other = make("here.pem", "IP:127.0.0.1"), make("other.pem", "DNS:elsewhere.example")
+        for code, certificate, options in ((0, here, ["--ca-file", here]), (5, here, []), (5, other, ["--ca-file", other]),
+                                           (0, other, ["--ca-file", other, "--no-host-check"]), (5, other, ["--ca-file", here])):
+            with self.subTest(options=options), zuv.peer(zuv.answer(GOT), certificate=certificate) as (address, _):
+                self.expect(zuv.run("profile", "get", "-e", address, *options), code, *(["--ca-file"] if code else []))
+
+    def test_attachments_come_from_files_and_go_to_files(self):
+        data = random.Random(1).randbytes(70000) + b"\r\n--\r\n"
+        one, two = self.file("one.bin", data), self.file("two.txt", "")
+        parts = b"".join(b"--B\r\nContent-ID: <%s>\r\nContent-Type: %s\r\n\r\n%s\r\n" % row for row in (
+            (b"root", b"text/xml", GOT.encode()), (b"../../x\x1b", b"a/\x1bb", data), (b"", b"text/plain", b"")))
+        multipart = zuv.answer(parts + b"--B--", headers=['Content-Type: multipart/related; boundary="B"; type="text/xml"; start="<root>"'])
+        kept = os.path.join(self.folder, "kept")
+        for options in ([], ["--chunked"]):
+            with zuv.peer(multipart) as (address, requests):
+                run = self.expect(zuv.run("profile", "get", "-e", address, "--attach", one + ",type=image/png,id=pic", "--attach",
+                                          two, "--save-attachments", kept, *options), 0, "70.0 kB, a/?b", "urn:1")
+            self.assertEqual(run.stderr.count("saved "), 2, run.stderr)
+            self.assertEqual(sorted(os.listdir(kept)), ["1-.._.._x_", "2"])
+            with open(os.path.join(kept, "1-.._.._x_"), "rb") as file:
+                self.assertEqual(file.read(), data)
+            if options:
+                continue
+            sent = email.message_from_bytes(requests[0].partition(b"\r\n")[2], policy=email.policy.HTTP).get_payload()
+            self.assertEqual([(part["Content-ID"], part.get_content_type(), part["Content-Description"]) for part in sent[1:]],
+                             [("<pic>", "image/png", "one.bin"), ("<attachment-2>", "application/octet-stream", "two.txt")])
+            self.assertIn(b"\r\n\r\n" + data + b"\r\n--", requests[0])
+
+    def test_data_ports_are_read_and_written(self):
+        data = random.Random(2).randbytes(300000)
+        source, back = self.file("source", data), os.path.join(self.folder, "back")
+        attach = ('<s:attachRequest xmlns:s="%s/StatusReport" xmlns:c="%s"><s:attachment/></s:attachRequest>' % (zuv.COMMON, zuv.COMMON))
+        with zuv.service() as address:
+            report = json.loads(zuv.run("statusreport", "create", "--json", "-e", address).stdout)
+            held = zuv.run("statusreport", "attach", "-", "-t", report["thisURI"][0], "--json", "-e", address, given=attach)
+            uri = json.loads(self.expect(held, 0).stdout)["attachment"][0]["dataPort"][0]["dataURI"]
+            self.expect(zuv.run("data", "put", uri, source), 0)
+            self.expect(zuv.run("data", "get", uri, "-o", back), 0)
+            with open(back, "rb") as file:
+                self.assertEqual(file.read(), data)
+            self.assertEqual(zuv.run("data", "get", uri, text=False).stdout, data)
+            self.expect(zuv.run("data", "get", uri + "-not"), 6, "404")
+        with zuv.peer(zuv.answer(b"x" * 5)[:-2]) as (address, _):
+            self.expect(zuv.run("data", "get", address + "/d"), 4)
+
+    def test_whatever_comes_back_ends_in_a_documented_code(self):
+        rows = random.Random(3)
+        seeds = [zuv.answer(GOT), zuv.answer(zuv.envelope("<p:getResponse>" + "<p:profile>" * 5000)),
+                 zuv.answer(zuv.envelope("<E:Fault><faultcode>E:Client</faultcode><detail><c:Client><c:detail/></c:Client></detail></E:Fault>"), "500 x")]
+        answers = [seeds[1]]
+        for _ in range(60):
+            bytes_ = bytearray(rows.choice(seeds[::2]))
+            for _ in range(rows.randrange(1, 8)):
+                bytes_[rows.randrange(len(bytes_))] = rows.choice(b"<>&/\"'=: \r\n\x00\xff\x1b09a")
+            answers.append(bytes(bytes_[:rows.randrange(len(bytes_)) if rows.random() < .3 else None]))
+        with zuv.peer(*answers) as (address, _):
+            for bytes_ in answers:
+                run = zuv.run("profile", "get", "-e", address, "--json", "--silence-limit", "20", text=False)
+                self.assertIn(run.returncode, (0, 4, 6, 7, 8, 10), (bytes_, run))
+                self.assertNotIn(b"\x1b", run.stdout + run.stderr)
+
+
+if __name__ == "__main__":
+    unittest.main()

@@ -1,0 +1,96 @@
+"""Runs zuv for the tests, and peers that play a script. Programs and places come from the environment (cmake/cli.cmake)."""
+import contextlib
+import os
+import socket
+import ssl
+import subprocess
+import sys
+import threading
+
+sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "interop"))
+import zuv_service  # noqa: E402  the reference service, as the interoperability tests start it
+
+SOURCE = os.environ["ZUV_SOURCE_DIR"]
+PROGRAM, SERVICE = os.environ["ZUV_PROGRAM"], os.environ["ZUV_SERVICE_PROGRAM"]
+COMMON = "http://www.zuv.example/xmlns/b2b/zuv/v1.0"
+PROFILE = COMMON + "/Profile"
+LIMIT_S = 120
+
+
+def run(*arguments, given=None, env=None, text=True, cwd=None):
+    """The finished zuv: returncode, stdout, stderr."""
+    clean = {name: value for name, value in os.environ.items() if not name.startswith("ZUV_")}
+    return subprocess.run([PROGRAM, *arguments], input=given, capture_output=True, text=text, timeout=LIMIT_S, cwd=cwd,
+                          env={**clean, **(env or {})})
+
+
+def envelope(body, version=1):
+    uri = {1: "http://schemas.xmlsoap.org/soap/envelope/", 2: "http://www.w3.org/2003/05/soap-envelope", 3: "urn:later"}[version]
+    return ('<?xml version="1.0" encoding="UTF-8"?><E:Envelope xmlns:E="%s" xmlns:c="%s" xmlns:p="%s"><E:Body>%s</E:Body>'
+            '</E:Envelope>' % (uri, COMMON, PROFILE, body))
+
+
+def answer(body, status="200 OK", headers=()):
+    """The bytes of an HTTP response that ends the connection."""
+    body = body if isinstance(body, bytes) else body.encode()
+    lines = ["HTTP/1.1 " + status, "Connection: close", "Content-Length: %d" % len(body), *headers]
+    if not any(line.startswith("Content-Type") for line in headers):
+        lines.append("Content-Type: text/xml; charset=utf-8")
+    return "\r\n".join(lines).encode() + b"\r\n\r\n" + body
+
+
+def _read_request(connection):
+    request = b""
+    while b"\r\n\r\n" not in request:
+        part = connection.recv(65536)
+        if not part:
+            return request
+        request += part
+    head, _, body = request.partition(b"\r\n\r\n")
+    chunked = b"transfer-encoding: chunked" in head.lower()
+    lengths = [line for line in head.lower().split(b"\r\n") if line.startswith(b"content-length:")]
+    while not body.endswith(b"\r\n0\r\n\r\n") if chunked else lengths and len(body) < int(lengths[0].split(b":")[1]):
+        part = connection.recv(65536)
+        if not part:
+            break
+        body += part
+    return head + b"\r\n\r\n" + body
+
+
+@contextlib.contextmanager
+def peer(*answers, certificate=None):
+    """A server that gives these answers, a connection each: gives its address and the list that takes the requests."""
+    listener = socket.create_server(("127.0.0.1", 0))
+    listener.settimeout(LIMIT_S)
+    requests = []
+    context = None
+    if certificate:
+        context = ssl.SSLContext(ssl.PROTOCOL_TLS_SERVER)
+        context.load_cert_chain(certificate)
+
+    def play():
+        for one in answers:
+            try:
+                connection, _ = listener.accept()
+            except OSError:
+                return
+            with contextlib.suppress(OSError):
+                connection.settimeout(LIMIT_S)
+                if context:
+                    connection = context.wrap_socket(connection, server_side=True)
+                requests.append(_read_request(connection))
+                connection.sendall(one)
+            connection.close()
+
+    thread = threading.Thread(target=play)
+    thread.start()
+    try:
+        yield "%s://127.0.0.1:%d" % ("https" if certificate else "http", listener.getsockname()[1]), requests
+    finally:
+        listener.shutdown(socket.SHUT_RDWR)
+        listener.close()
+        thread.join(LIMIT_S)
+
+
+def service():
+    return zuv_service.running(SERVICE)
