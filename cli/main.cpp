@@ -18,6 +18,7 @@
 #include "data_command.h"
 #include "failure.h"
 #include "new_command.h"
+#include "trace_command.h"
 
 namespace {
 
@@ -104,6 +105,19 @@ void declare_documents(CLI::App &app, tool_options &options, action &chosen)
     check->callback([&] { chosen = [&] { return check_files(options.files, options.class_name); }; });
 }
 
+void declare_trace(CLI::App &app, trace_options &options, action &chosen)
+{
+    CLI::App *const command =
+        app.add_subcommand("trace", "Shows a trace file: a table of its exchanges, or a page.")
+            ->group("Documents");
+    command->add_option("FILE", options.file, "Trace; \"-\" for standard input")->capture_default_str();
+    command->add_option("--html", options.page, "Write a page on which each exchange can be opened")
+        ->type_name("FILE");
+    command->add_flag("--show-secrets", options.show_secrets,
+                      "Show certificates, keys, passwords and tokens too");
+    command->callback([&] { chosen = [&] { return show_trace(options); }; });
+}
+
 int run(int argc, char **argv)
 {
     CLI::App app("Calls the services of the contract, and works with their documents and traces.", "zuv");
@@ -115,10 +129,12 @@ int run(int argc, char **argv)
     std::list<call_options> calls;
     std::list<data_options> transfers;
     tool_options tools;
+    trace_options trace;
     action chosen;
     declare_calls(app, calls, chosen);
     declare_data(app, transfers, chosen);
     declare_documents(app, tools, chosen);
+    declare_trace(app, trace, chosen);
     try {
         app.parse(argc, argv);
     } catch (const CLI::ParseError &error) {

@@ -1,0 +1,35 @@
+// trace_reader.h - a trace file as messages: requests and answers in the order in which they stand there.
+//
+// Elsewhere: framing and compression (trace_body.h), what belongs together and what it means
+// (trace_exchange.h).
+//
+// Always: any bytes may be read. What follows no rule is kept as a message without a start line. Time grows
+// with the file's size.
+#pragma once
+
+#include <cstddef>
+#include <string>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+namespace cli {
+
+struct trace_message {
+    bool request = false;
+    std::string start_line; // empty for what no HTTP head goes before
+    std::vector<std::pair<std::string, std::string>> headers;
+    std::string body;          // framing and compression undone
+    std::size_t wire_size = 0; // bytes in the trace
+    bool complete = true;      // false: it broke off, or its body can't be made out
+
+    int status() const; // of an answer; 0 for none
+    // Value of a header by its name, any case; empty for none.
+    std::string_view header(std::string_view name) const;
+};
+
+std::vector<trace_message> read_trace(std::string_view trace);
+
+bool same_name(std::string_view a, std::string_view b); // the case of letters aside
+
+} // namespace cli

@@ -1,0 +1,182 @@
+#!/usr/bin/python3
+"""zuv trace: what the library logs is made out again, hides secrets, and is harmless whatever it holds."""
+import gzip
+import os
+import random
+import re
+import tempfile
+import unittest
+import zlib
+
+from lxml import etree, html
+
+import browser
+import zuv
+
+SECRETS = ("pass-1", "dG9rLTI=", "tok-3", "pass-4", "cookie-5", "query-6", "pass-7", "inner-8")
+CREDENTIALS = ('<c:Credentials xmlns:c="%s"><c:password>pass-1</c:password><c:key>dG9rLTI=</c:key><c:token>tok-3</c:token>'
+               '</c:Credentials>' % zuv.COMMON)
+HOSTILE = b"""</pre></details><script>document.title='owned'</script><img src=x onerror="document.title='owned'">\x1b[2J\xff"""
+
+
+def compact(text):
+    return re.sub(r"\s", "", text)
+
+
+def got(size, version=1):
+    body = random.Random(size).randbytes(size).hex()
+    return zuv.envelope("<p:getResponse><p:thisURI>%s</p:thisURI></p:getResponse>" % body, version)
+
+
+def chunks(body, size):
+    return b"".join(b"%x\r\n%s\r\n" % (len(body[i:i + size]), body[i:i + size]) for i in range(0, len(body), size)) + b"0\r\n\r\n"
+
+
+def chunked(body, *headers):
+    head = ["HTTP/1.1 200 OK", "Transfer-Encoding: chunked", "Content-Type: text/xml", *headers]
+    return "\r\n".join(head).encode() + b"\r\n\r\n" + chunks(body, 9000)
+
+
+def bare_deflate(body):
+    packer = zlib.compressobj(wbits=-15)
+    return packer.compress(body) + packer.flush()
+
+
+class trace(unittest.TestCase):
+    def setUp(self):
+        folder = tempfile.TemporaryDirectory()
+        self.addCleanup(folder.cleanup)
+        self.log, self.page = (os.path.join(folder.name, name) for name in ("t.log", "t.html"))
+        self.folder = folder.name
+
+    def made_page(self, *options):
+        run = zuv.run("trace", self.log, "--html", self.page, *options)
+        self.assertEqual((run.returncode, run.stderr), (0, ""))
+        return html.parse(self.page, html.HTMLParser(encoding="utf-8")).getroot()
+
+    def write(self, *parts):
+        with open(self.log, "wb") as file:
+            file.write(b"".join(parts))
+
+    def test_every_form_of_framing_and_compression_is_undone(self):
+        gzipped = "Content-Encoding: gzip"
+        rows = []
+        for size in (5, 70000, 400000):
+            for make, *options in ((zuv.answer,), (lambda b: zuv.answer(gzip.compress(b), headers=[gzipped]), "--gzip"),
+                                   (lambda b: chunked(zlib.compress(b), "Content-Encoding: deflate"), "--chunked", "--soap12"),
+                                   (lambda b: chunked(gzip.compress(b), gzipped), "--gzip", "--chunked"),
+                                   (chunked, "--keep-alive")):
+                body = got(size, 2 if "--soap12" in options else 1)
+                rows.append((body, make(body.encode()), options))
+        for _, answer, options in rows:
+            with zuv.peer(answer) as (address, _):
+                zuv.run("profile", "get", "-e", address, "-t", "urn:one", "--trace", self.log, *options)
+        with zuv.peer(zuv.answer(got(5))[:-50]) as (address, _):
+            zuv.run("profile", "get", "-e", address, "--trace", self.log)
+        table = zuv.run("trace", self.log).stdout.splitlines()
+        self.assertEqual(len(table), len(rows) + 2)
+        for line, (_, _, options) in zip(table[1:], rows):
+            self.assertRegex(line, r"^ *\d+  get +200 +%s .* /zuv/v1.0/services/Profile$" % ("1.2" if "--soap12" in options else "1.1"))
+        self.assertTrue(table[-1].endswith("incomplete"), table[-1])
+        exchanges = self.made_page().findall(".//details[@class='exchange']")
+        self.assertEqual(len(exchanges), len(rows) + 1)
+        for exchange, (body, _, options) in zip(exchanges, rows):
+            request, answer = (pre.text_content() for pre in exchange.iterfind(".//pre"))
+            self.assertIn("<protocol:targetURI>urn:one</protocol:targetURI>", request)
+            shown = compact(re.sub(r"\d+ namespaces", "", answer))
+            cut = re.search(r"and[\d.]+kBmore$", shown)
+            self.assertEqual(bool(cut), len(body) > 400000)
+            sent = compact(body)
+            self.assertEqual(shown[:cut.start()] if cut else shown, sent[:cut.start()] if cut else sent)
+            self.assertEqual(exchange.findall(".//p[@class='note']"), [])
+
+    def test_secrets_are_not_shown_unless_asked_for(self):
+        credentials = os.path.join(self.folder, "c.xml")
+        with open(credentials, "w") as file:
+            file.write(CREDENTIALS)
+        body = zuv.envelope('<p:getResponse><p:x><c:Password a="1">inner-8<c:b/></c:x>inner-8</c:Password></p:x>'
+                            '<p:y userToken="pass-7"/></p:getResponse>')
+        with zuv.peer(zuv.answer(body, headers=["Set-Cookie: cookie-5"])) as (address, _):
+            zuv.run("profile", "get", "-e", address + "/at?token=query-6", "--credentials", credentials, "--user", "ada",
+                    "--trace", self.log, env={"ZUV_PASSWORD": "pass-4"})
+        with open(self.log) as file:
+            logged = file.read()
+        self.made_page()
+        with open(self.page) as file:
+            shown = file.read() + zuv.run("trace", self.log).stdout
+        self.made_page("--show-secrets")
+        with open(self.page) as file:
+            everything = file.read()
+        for secret in SECRETS:
+            secret = "YWRhOnBhc3MtNA==" if secret == "pass-4" else secret
+            self.assertIn(secret, logged)
+            self.assertNotIn(secret, shown)
+            self.assertIn(secret, everything)
+        self.assertIn("Basic [not shown]", shown)
+
+    def test_attachments_are_told_by_type_and_size(self):
+        data = os.path.join(self.folder, "d.bin")
+        with open(data, "wb") as file:
+            file.write(b"\r\nHTTP/1.1 200 OK\r\n\r\n" * 50)  # what looks like a message is none
+        with zuv.peer(zuv.answer(got(5))) as (address, _):
+            zuv.run("profile", "get", "-e", address, "--attach", data + ",type=image/png,id=pic", "--trace", self.log)
+        exchange, = self.made_page().findall(".//details[@class='exchange']")
+        self.assertEqual([p.text for p in exchange.iterfind(".//p[@class='part']")][1], "image/png, <pic>, 1.1 kB")
+        self.assertEqual([p.text for p in exchange.iterfind(".//p[@class='note']")], ["1.1 kB of image/png, not shown"])
+
+    def hostile_trace(self):
+        post = b"POST /%s?x=%s HTTP/1.1\r\n%s: %s\r\nContent-Type: multipart/related; boundary=B\r\n\r\n" % ((HOSTILE.replace(b" ", b"_"),) * 2 + (HOSTILE,) * 2)
+        parts = b"--B\r\nContent-ID: <%s>\r\nContent-Type: text/xml\r\n\r\n<a b=\"%s\" c='%s'>%s<![CDATA[%s]]><!--%s-->\r\n--B--" % ((HOSTILE,) * 6)
+        fault = b"HTTP/1.1 500 %s\r\n\r\n<E><Body><Fault><faultstring>a ]]>&lt;<![CDATA[%s]]></faultstring>" % (HOSTILE, HOSTILE)
+        return post + parts + fault
+
+    def test_hostile_content_stays_text(self):
+        self.write(self.hostile_trace())
+        page = self.made_page()
+        self.assertEqual([e.tag for e in page.iter("script", "img", "iframe", "object", "link")], [])
+        self.assertIn("<script>document.title='owned'</script>", page.text_content())
+        table = zuv.run("trace", self.log, text=False)
+        self.assertEqual(table.returncode, 0)
+        for byte in b"\x1b", b"\xff":
+            self.assertNotIn(byte, table.stdout)
+            with open(self.page, "rb") as file:
+                self.assertNotIn(byte, file.read())
+        browser.need(self)
+        dom = browser.dom(self.page)
+        self.assertNotIn("owned</title>", dom)
+        self.assertEqual(dom.count('<details class="exchange">'), 1)
+
+    def test_a_page_opens_in_a_browser(self):
+        browser.need(self)
+        with zuv.peer(zuv.answer(got(5)), zuv.answer("", "503 Busy")) as (address, _):
+            for _ in range(2):
+                zuv.run("profile", "get", "-e", address, "--trace", self.log)
+        self.made_page()
+        dom = html.document_fromstring(browser.dom(self.page))
+        self.assertEqual([e.text for e in dom.iterfind(".//span[@class='operation']")], ["get", "get"])
+        self.assertEqual([e.text for e in dom.xpath("//span[starts-with(@class,'badge')]")], ["200", "503"])
+        picture = os.path.join(self.folder, "t.png")
+        browser.screenshot(self.page, picture)
+        with open(picture, "rb") as file:
+            self.assertTrue(file.read().startswith(b"\x89PNG"))
+
+    def test_any_bytes_are_a_trace(self):
+        dice = random.Random(4)
+        seeds = [self.hostile_trace(), b"POST / HTTP/1.1\r\nContent-Length: 4\r\n\r\n<a/>" + zuv.answer(got(200)),
+                 chunked(gzip.compress(got(300).encode()), "Content-Encoding: gzip"), chunked(bare_deflate(b"<a/>" * 99), "Content-Encoding: deflate")]
+        for _ in range(80):
+            bytes_ = bytearray(b"".join(dice.choices(seeds, k=3)))
+            for _ in range(dice.randrange(1, 20)):
+                at = dice.randrange(len(bytes_))
+                bytes_[at:at + dice.randrange(3)] = dice.choice((b"<", b">", b'"', b"\r\n", b"\0", b"HTTP/1.1 200", b"POST ", b"9", b"0"))
+            run = zuv.run("trace", "-", "--html", "-", given=bytes(bytes_), text=False)
+            self.assertEqual((run.returncode, run.stderr), (0, b""), bytes_)
+            self.assertNotIn(b"<script", run.stdout)
+        for bytes_ in (b"", b"\0" * 100, b"HTTP/1.1", b" HTTP/1.1" * 300000, b"<a " * 1000000, b"POST / HTTP/1.1\r\n" * 100000,
+                       chunked(gzip.compress(b"\0" * (300 << 20)), "Content-Encoding: gzip")):
+            self.assertEqual(zuv.run("trace", "-", given=bytes_, text=False).returncode, 0)
+        self.assertEqual(zuv.run("trace", os.path.join(self.folder, "none")).returncode, 11)
+
+
+if __name__ == "__main__":
+    unittest.main()
