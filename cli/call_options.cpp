@@ -71,11 +71,13 @@ void header_options::declare(CLI::App &app)
         ->type_name("NUMBER")
         ->group("Header");
     app.add_option("--note", notes, "Readable note; may be repeated")
+        ->allow_extra_args(false)
         ->take_all()
         ->type_name("TEXT")
         ->group("Header");
     app.add_option("--credentials", credentials,
                    "protocol:Credentials document for the header; may be repeated")
+        ->allow_extra_args(false)
         ->take_all()
         ->type_name("FILE")
         ->group("Header");
@@ -96,6 +98,7 @@ void message_options::declare(CLI::App &app)
         ->group("Message");
     app.add_option("--action", action, "SOAPAction")->type_name("TEXT")->group("Message");
     app.add_option("--attach", attach, "Attach a file to the message; may be repeated")
+        ->allow_extra_args(false)
         ->take_all()
         ->type_name("FILE[,type=TYPE][,id=ID]")
         ->group("Attachments");
@@ -111,6 +114,7 @@ void call_options::declare(CLI::App &app)
                    "Request document, \"-\" for standard input; without it an empty one is sent");
     app.add_option("-e,--endpoint", endpoints,
                    "Address of the service; further ones are tried when it can't be reached")
+        ->allow_extra_args(false)
         ->take_all()
         ->type_name("URL")
         ->group("Connection");

@@ -15,6 +15,7 @@
 
 #include "call_command.h"
 #include "check_command.h"
+#include "completion.h"
 #include "data_command.h"
 #include "failure.h"
 #include "new_command.h"
@@ -135,6 +136,11 @@ int run(int argc, char **argv)
     declare_data(app, transfers, chosen);
     declare_documents(app, tools, chosen);
     declare_trace(app, trace, chosen);
+    if (argc > 1 && std::string_view(argv[1]) == "complete-words") { // for the shell
+        for (const std::string &word : completions(app, std::vector<std::string>(argv + 2, argv + argc)))
+            std::printf("%s\n", word.c_str());
+        return EXIT_DONE;
+    }
     try {
         app.parse(argc, argv);
     } catch (const CLI::ParseError &error) {

@@ -92,8 +92,9 @@ class calls(unittest.TestCase):
         header = self.file("h.xml", '<c:Header xmlns:c="%s"><c:note>first</c:note></c:Header>' % zuv.COMMON)
         with zuv.peer(zuv.answer(zuv.envelope("<p:getResponse/>", 2))) as (address, requests):
             run = zuv.run("profile", "get", "-e", address, "-t", "urn:1", "--transaction", "T", "--sequence", "2", "--correlation",
-                          "C", "--priority", "7", "--note", "second", "--credentials", credentials, "--header", header, "--user",
-                          "ada", "--soap12", "--action", "urn:go", env={"ZUV_PASSWORD": "s3cret"})
+                          "C", "--priority", "7", "--note", "second", "-", "--credentials", credentials, "--header", header, "--user",
+                          "ada", "--soap12", "--action", "urn:go",
+                          given='<p:getRequest xmlns:p="%s"/>' % zuv.PROFILE, env={"ZUV_PASSWORD": "s3cret"})
             self.expect(run, 0)
         head, _, body = requests[0].decode().partition("\r\n\r\n")
         for line in ("POST %s HTTP/1.1" % PATH, "Authorization: Basic YWRhOnMzY3JldA==", 'SOAPAction: "urn:go"',

@@ -1,0 +1,15 @@
+// completion.h - what can come next on the command line, for the shell (completion/zuv.bash).
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include <CLI/CLI.hpp>
+
+namespace cli {
+
+// Candidates for the last of the words behind the program's name: commands, options, classes. None where a
+// file or a text is wanted.
+std::vector<std::string> completions(const CLI::App &app, const std::vector<std::string> &words);
+
+} // namespace cli

@@ -1,0 +1,92 @@
+#!/usr/bin/python3
+"""The manual: its examples do what it says, its options and exit codes are the program's. And completion in bash."""
+import os
+import re
+import shutil
+import subprocess
+import tempfile
+import unittest
+
+import zuv
+
+MANUAL = os.path.join(zuv.SOURCE, "docs", "man", "zuv.1")
+COMPLETION = os.path.join(zuv.SOURCE, "cli", "completion", "zuv.bash")
+HELPERS = "/usr/share/bash-completion/bash_completion"
+
+
+def source():
+    with open(MANUAL) as file:
+        return file.read()
+
+
+def examples():
+    """(command, expected output) of the literal blocks."""
+    found = []
+    for block in re.findall(r"(?ms)^\.Bd -literal.*?\n(.*?)^\.Ed", source()):
+        for line in block.replace("\\e", "\\").splitlines():
+            if line.startswith("$ "):
+                found.append((line[2:], []))
+            else:
+                found[-1][1].append(line)
+    return found
+
+
+def pattern(lines):
+    text = re.escape("".join(line + "\n" for line in lines)).replace(r"\.\.\.", ".*?")
+    return re.compile(text + (".*" if lines and lines[-1].endswith("...") else ""), re.S)
+
+
+class manual(unittest.TestCase):
+    def test_the_examples_do_what_the_text_says(self):
+        rows = examples()
+        self.assertGreater(len(rows), 20)
+        with tempfile.TemporaryDirectory() as folder, zuv.service() as address:
+            script = "".join("{ %s\n} 2>&1; printf '\\0'\n" % command for command, _ in rows)
+            run = subprocess.run(["bash", "-c", script], capture_output=True, text=True, timeout=zuv.LIMIT_S, cwd=folder, env={
+                **os.environ, "PATH": os.path.dirname(zuv.PROGRAM) + ":" + os.environ["PATH"], "ZUV_ENDPOINT": address})
+        outputs = run.stdout.split("\0")[:-1]
+        self.assertEqual((len(outputs), run.stderr), (len(rows), ""))
+        for (command, expected), output in zip(rows, outputs):
+            with self.subTest(command=command):
+                self.assertRegex(output, re.compile(r"\A%s\Z" % pattern(expected).pattern, re.S))
+
+    def test_options_and_exit_codes_are_those_of_the_program(self):
+        told = set(re.findall(r"Fl Fl ([a-z0-9-]+)", source())) - {"help"}
+        listed = set()
+        for command in ("profile get", "data get", "data put", "new", "check", "trace"):
+            listed |= set(re.findall(r"(?m)^  (?:-\w,)?--([a-z0-9-]+)", zuv.run(*command.split(), "--help").stdout))
+        self.assertEqual(told, listed - {"help"})
+        with open(os.path.join(zuv.SOURCE, "cli", "exit_codes.h")) as file:
+            codes = re.findall(r"EXIT_\w+ = (\d+)", file.read())
+        self.assertEqual(re.findall(r"(?m)^\.It (\d+)$", source()), codes)
+        self.assertEqual(re.findall(r"(\d+) [a-zA-Z]", zuv.run("--help").stdout.split("Exit:")[1]), codes)
+
+    def test_the_page_is_well_made(self):
+        if not shutil.which("mandoc"):
+            self.skipTest("mandoc is not installed")
+        run = subprocess.run(["mandoc", "-T", "lint", "-W", "warning", MANUAL], capture_output=True, text=True)
+        self.assertEqual((run.returncode, run.stdout), (0, ""))
+
+    def test_bash_completes_commands_options_and_classes(self):
+        if not os.path.exists(HELPERS):
+            self.skipTest("bash-completion is not installed")
+        rows = ((["pro"], ["problemreport", "profile"]), (["profile", ""], ["add", "create", "get", "refreshCredentials", "remove", "set"]),
+                (["profile", "get", "--sil"], ["--silence-limit"]), (["new", "Client.Authentication.C"], ["Client.Authentication.CredentialsExpired",
+                                                       "Client.Authentication.CredentialsMismatch"]), (["check", "--class", "Addr"], ["Address"]),
+                (["profile", "get", "--output", ""], []), (["trace", "--h"], ["--help", "--html"]), (["new", "protocol:Addr"], ["Address"]))
+        for words, expected in rows:
+            with self.subTest(words=words):
+                line = "zuv " + " ".join(words)
+                split = re.findall(r":|[^:\s]+", line) + ([""] if line.endswith(" ") else [])
+                script = ('. ' + HELPERS + '; . "$0"; '
+                          'COMP_WORDBREAKS=" :"; COMP_WORDS=("$@"); COMP_CWORD=$(($# - 1)); COMP_LINE="%s"; COMP_POINT=${#COMP_LINE}; '
+                          '_zuv; printf "%%s\\n" "${COMPREPLY[@]}"' % line)
+                run = subprocess.run(["bash", "-c", script, COMPLETION, *split], capture_output=True, text=True, timeout=60,
+                                     env={**os.environ, "PATH": os.path.dirname(zuv.PROGRAM) + ":" + os.environ["PATH"]})
+                self.assertEqual(run.stderr, "")
+                found = sorted(filter(None, run.stdout.split("\n")))
+                self.assertEqual(found, expected)
+
+
+if __name__ == "__main__":
+    unittest.main()
