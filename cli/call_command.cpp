@@ -9,6 +9,7 @@
 #include <cstring>
 #include <sstream>
 
+#include <zuv_client_pro/soap_attachment.h>
 #include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_memory.h>
@@ -98,6 +99,9 @@ public:
         print_answer();
         for (const std::string &line : files_.saved())
             std::fprintf(stderr, "saved %s\n", line.c_str());
+        if (const std::size_t count = attachments_received();
+            count != 0 && options_.message.save_folder.empty())
+            std::fprintf(stderr, "%zu attachments came along; --save-attachments DIR keeps them\n", count);
         if (options_.message.repeat > 1)
             std::fprintf(stderr, "%s\n", latency_summary(times_, clock::now() - began).c_str());
         return EXIT_DONE;
@@ -132,6 +136,15 @@ private:
         const int error = op_.call(ctx, addresses_.c_str(), action, request_, &response_);
         times_.push_back(clock::now() - began);
         return error;
+    }
+
+    std::size_t attachments_received() const
+    {
+        std::size_t count = 0;
+        for (const soap_attachment *list : {context_->mime.list, context_->dime.list})
+            for (; list != nullptr; list = list->next)
+                count += list == context_->mime.root ? 0 : 1;
+        return count;
     }
 
     exit_code report_failure()

@@ -23,6 +23,8 @@ json simple_value(const pugi::xml_node &element, std::string_view type)
 {
     if (element.attribute("xsi:nil").as_bool())
         return nullptr;
+    if (const pugi::xml_attribute reference = element.attribute("href"))
+        return {{"@href", reference.value()}};
     const std::string_view text = element.text().get();
     if (type == "xsd:boolean")
         return text == "true" || text == "1";

@@ -5,6 +5,7 @@
 //   xsd:boolean            true or false; xsd:int, xsd:double: number; anything else: string
 //   xsi:nil                null
 //   attribute              member "@name"; xsi:type is "@type"
+//   bytes in an attachment  object with the attachment's id in "@href"
 //   text with attributes   object with the text in "text"
 #pragma once
 

@@ -166,19 +166,27 @@ class calls(unittest.TestCase):
     def test_attachments_come_from_files_and_go_to_files(self):
         data = random.Random(1).randbytes(70000) + b"\r\n--\r\n"
         one, two = self.file("one.bin", data), self.file("two.txt", "")
+        referring = GOT.replace("</p:getResponse>", '<c:credentials><c:key href="cid:../../x%1b"/></c:credentials></p:getResponse>')
         parts = b"".join(b"--B\r\nContent-ID: <%s>\r\nContent-Type: %s\r\n\r\n%s\r\n" % row for row in (
-            (b"root", b"text/xml", GOT.encode()), (b"../../x\x1b", b"a/\x1bb", data), (b"", b"text/plain", b"")))
+            (b"root", b"text/xml", referring.encode()), (b"../../x\x1b", b"a/\x1bb", data), (b"", b"text/plain", b"")))
         multipart = zuv.answer(parts + b"--B--", headers=['Content-Type: multipart/related; boundary="B"; type="text/xml"; start="<root>"'])
+        with zuv.peer(multipart) as (address, _):
+            self.expect(zuv.run("profile", "get", "-e", address), 0, "2 attachments came along")
         kept = os.path.join(self.folder, "kept")
         for options in ([], ["--chunked"]):
             with zuv.peer(multipart) as (address, requests):
-                run = self.expect(zuv.run("profile", "get", "-e", address, "--attach", one + ",type=image/png,id=pic", "--attach",
+                run = self.expect(zuv.run("profile", "get", "-e", address, "--json", "--attach", one + ",type=image/png,id=pic", "--attach",
                                           two, "--save-attachments", kept, *options), 0, "70.0 kB, a/?b", "urn:1")
+            self.assertTrue(json.loads(run.stdout)["credentials"][0]["key"]["@href"].startswith("cid:.."))
             self.assertEqual(run.stderr.count("saved "), 2, run.stderr)
             self.assertEqual(sorted(os.listdir(kept)), ["1-.._.._x_", "2"])
             with open(os.path.join(kept, "1-.._.._x_"), "rb") as file:
                 self.assertEqual(file.read(), data)
             if options:
+                with zuv.peer(zuv.answer(GOT)) as (address, requests):
+                    self.expect(zuv.run("profile", "get", "-e", address, "--dime", "--attach", one), 0)
+                self.assertIn(b"\r\nContent-Type: application/dime\r\n", requests[0])
+                self.assertIn(data, requests[0])
                 continue
             sent = email.message_from_bytes(requests[0].partition(b"\r\n")[2], policy=email.policy.HTTP).get_payload()
             self.assertEqual([(part["Content-ID"], part.get_content_type(), part["Content-Description"]) for part in sent[1:]],
