@@ -17,6 +17,8 @@ namespace {
 using json = nlohmann::ordered_json;
 
 constexpr int INDENT = 2;
+constexpr int DEPTH_MAX =
+    500; // elements within each other; protects the stack, and the size of an indented text
 constexpr std::string_view TYPE_ATTRIBUTE = "xsi:type", NIL_ATTRIBUTE = "xsi:nil";
 
 json simple_value(const pugi::xml_node &element, std::string_view type)
@@ -39,13 +41,13 @@ json simple_value(const pugi::xml_node &element, std::string_view type)
     return std::string(text);
 }
 
-json value_of(const pugi::xml_node &element, std::string_view type);
+json value_of(const pugi::xml_node &element, std::string_view type, int depth);
 
-void add_member(json &object, const pugi::xml_node &child, const contract::data_class &type)
+void add_member(json &object, const pugi::xml_node &child, const contract::data_class &type, int depth)
 {
     const contract::member *const member = contract::find_member(type, child.name());
     const std::string name(contract::local_name(child.name()));
-    json value = value_of(child, member == nullptr ? "xsd:string" : member->type);
+    json value = value_of(child, member == nullptr ? "xsd:string" : member->type, depth + 1);
     const bool repeats = member != nullptr ? member->many : object.contains(name);
     if (!repeats)
         object[name] = std::move(value);
@@ -56,8 +58,10 @@ void add_member(json &object, const pugi::xml_node &child, const contract::data_
         object[name].push_back(std::move(value));
 }
 
-json class_value(const pugi::xml_node &element, const contract::data_class &expected)
+json class_value(const pugi::xml_node &element, const contract::data_class &expected, int depth)
 {
+    if (depth > DEPTH_MAX)
+        throw failure(EXIT_ANSWER, "the answer is too deep for JSON; without --json it is printed as XML");
     if (element.attribute("xsi:nil").as_bool())
         return nullptr;
     const contract::data_class *const named = contract::find_class(element.attribute("xsi:type").value());
@@ -73,14 +77,14 @@ json class_value(const pugi::xml_node &element, const contract::data_class &expe
     else
         for (const pugi::xml_node &child : element.children())
             if (child.type() == pugi::node_element)
-                add_member(object, child, type);
+                add_member(object, child, type, depth);
     return object;
 }
 
-json value_of(const pugi::xml_node &element, std::string_view type)
+json value_of(const pugi::xml_node &element, std::string_view type, int depth)
 {
     const contract::data_class *const described = contract::find_class(type);
-    return described == nullptr ? simple_value(element, type) : class_value(element, *described);
+    return described == nullptr ? simple_value(element, type) : class_value(element, *described, depth);
 }
 
 } // namespace
@@ -92,7 +96,7 @@ std::string json_of(const std::string &xml, const contract::data_class &type)
                               pugi::encoding_utf8))
         throw failure(EXIT_ANSWER,
                       "the answer can't be turned into JSON: it holds characters that XML doesn't allow");
-    return class_value(document.document_element(), type)
+    return class_value(document.document_element(), type, 1)
                .dump(INDENT, ' ', false, json::error_handler_t::replace) +
            "\n";
 }

@@ -28,7 +28,7 @@ bool is_status_line(std::string_view text, std::size_t at)
            is_digit(text, at + 11);
 }
 
-// Length of a request line at this place; 0 if there is none.
+// "POST /path HTTP/1.1" at this place.
 bool is_request_line(std::string_view text, std::size_t at)
 {
     const std::string_view rest = text.substr(at, START_LINE_MAX);

@@ -8,6 +8,7 @@ import json
 import os
 import random
 import re
+import socket
 import subprocess
 import tempfile
 import unittest
@@ -135,6 +136,13 @@ class calls(unittest.TestCase):
             with self.subTest(answer=bytes_), zuv.peer(bytes_) as (address, _):
                 run = self.expect(zuv.run("profile", "get", "-e", address), code, words, "zuv: profile get failed")
                 self.assertEqual(run.stdout, "")
+        deep = zuv.answer(zuv.envelope("<p:getResponse>%s</p:getResponse>" % ("<p:profile>" * 4000 + "</p:profile>" * 4000)))
+        for options, code in ([], 0), (["--json"], 7):
+            with zuv.peer(deep) as (address, _):
+                self.expect(zuv.run("profile", "get", "-e", address, *options), code)
+        with socket.create_server(("127.0.0.1", 0)) as silent:
+            address = "http://127.0.0.1:%d" % silent.getsockname()[1]
+            self.expect(zuv.run("profile", "get", "-e", address, "--silence-limit", "0.1"), 4, "(100000us receive delay)")
         wrong = self.file("w.xml", PROFILE_XML.replace("organization", "nobody"))
         for code, words, arguments in (
                 (4, "Connection refused", ["profile", "get", "-e", "http://127.0.0.1:1"]),
