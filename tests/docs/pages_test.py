@@ -10,6 +10,7 @@ import sys
 import tempfile
 
 sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "interop"))
+import messages
 import zuv_service
 
 
@@ -67,7 +68,7 @@ def main():
         check_links(os.path.join(source, page))
     check_guide(source)
     with zuv_service.running(service) as address:
-        endpoint = address + "/zuv/v1.0/services/Profile"
+        endpoint = address + messages.service_path("Profile")
         check_run(guide, [endpoint], [r"^Ada's workshop$", r"^still here: Ada's workshop$", r"^not found: urn:not:there$",
                                       r"^\d+ bytes$"])
         check_run(readme_host, [], [r"^kept as urn:zuv:profile:"], ZUV_README_ENDPOINT=endpoint)

@@ -10,6 +10,7 @@ import subprocess
 import sys
 
 import listening
+import messages
 import zuv_service
 from programs import Call, Caller, EOF_ERROR, LIMIT_S, TCP_ERROR, command, free_port
 
@@ -147,7 +148,7 @@ def main():
             print("skipped: needs root and network namespaces (%s)" % network.failure)
             sys.exit(77)
         with listening.started([*network.in_far, service, "--host", SERVER, "--port", "0"]) as address:
-            endpoint = address + zuv_service.PATH
+            endpoint = address + messages.service_path("Profile")
             silent_network(network, client, endpoint)
             slow_network(network, client, endpoint)
     finally:

@@ -7,6 +7,7 @@ import os
 import sys
 import tempfile
 
+import messages
 import zuv_service
 from programs import Caller, EOF_ERROR, TCP_ERROR, certificates, command, filled, password_file, server
 
@@ -85,9 +86,9 @@ def main():
         password_file(os.path.join(folder, "users"))
         words = {"zuv": zuv.removeprefix("http://"), "user": "cache_effective_user proxy" if os.geteuid() == 0 else ""}
         trust = ["--ca", os.path.join(folder, "ca.pem")]
-        plain = zuv + zuv_service.PATH
+        plain = zuv + messages.service_path("Profile")
         with server(folder, "stunnel", [command("stunnel4"), "@file@"], filled(STUNNEL, words)) as (tls,):
-            secure = "https://localhost:%d%s" % (tls, zuv_service.PATH)
+            secure = "https://localhost:%d%s" % (tls, messages.service_path("Profile"))
             for locked in (False, True):
                 text = filled(SQUID, {**words, "access": SQUID_LOCKED if locked else ""})
                 with server(folder, "squid", [command("squid"), "-N", "-f", "@file@"], text) as (port,):

@@ -11,6 +11,7 @@ import sys
 import tempfile
 import threading
 
+import messages
 import zuv_service
 from programs import Caller, EOF_ERROR, LIMIT_S, NO_DATA, TLS_ERROR, certificates, command, filled, password_file, server
 
@@ -101,7 +102,7 @@ def through_nginx(caller, folder, words):
                 count=5) as ports:
         plain, _, tls12, tls13, closed = ports
         at = lambda place: "http://127.0.0.1:%d/%s" % (plain, place)
-        whole = zuv_service.PATH[1:]
+        whole = messages.service_path("Profile")[1:]
         for framing in ([], ["--chunked"], ["--gzip"]):
             caller.run("nginx " + " ".join(framing), at(whole), "--keep-alive", "--calls", 50, "--size", 3000, *framing,
                        codes=0, connections=1)
@@ -125,12 +126,12 @@ def through_nginx(caller, folder, words):
                    most_ms=5000)
         trust = ["--ca", os.path.join(folder, "ca.pem")]
         for version, port in (("1.2", tls12), ("1.3", tls13)):
-            endpoint = "https://localhost:%d%s" % (port, zuv_service.PATH)
+            endpoint = "https://localhost:%d%s" % (port, messages.service_path("Profile"))
             caller.run("nginx, TLS " + version, endpoint, *trust, "--keep-alive", "--calls", 50, "--size", 30000, codes=0,
                        connections=1)
             caller.run("nginx, TLS %s, limits" % version, endpoint, *trust, "--recv", 10, "--send", 10, "--connect", 10,
                        "--calls", 5, "--size", 300000, codes=0, connections=5)
-        endpoint = "https://localhost:%d%s" % (closed, zuv_service.PATH)
+        endpoint = "https://localhost:%d%s" % (closed, messages.service_path("Profile"))
         key = ["--key", os.path.join(folder, "client.pem")]
         caller.run("nginx, client's certificate", endpoint, *trust, *key, "--calls", 3, codes=0, connections=3)
         caller.run("nginx, no client's certificate", endpoint, *trust, "--calls", 2, codes={3, 5, 6, 39, 400})
@@ -143,7 +144,7 @@ def through_haproxy(caller, folder, words):
     with server(folder, "haproxy", [command("haproxy"), "-db", "-f", "@file@"], filled(HAPROXY, words), count=4) as ports:
         trust = ["--ca", os.path.join(folder, "ca.pem")]
         key = ["--key", os.path.join(folder, "client.pem")]
-        at = lambda port: "https://127.0.0.1:%d%s" % (port, zuv_service.PATH)
+        at = lambda port: "https://127.0.0.1:%d%s" % (port, messages.service_path("Profile"))
         strict = ["--tls-flags", 1 | 16 | 512]
         for version, port in zip(("1.2", "1.3"), ports):
             caller.run("HAProxy, TLS " + version, at(port), *trust, *strict, "--keep-alive", "--calls", 50, "--size", 30000,
@@ -158,7 +159,7 @@ def through_haproxy(caller, folder, words):
 
 def through_stunnel(caller, folder, words):
     with server(folder, "stunnel", [command("stunnel4"), "@file@"], filled(STUNNEL, words)) as (port,):
-        endpoint = "https://localhost:%d%s" % (port, zuv_service.PATH)
+        endpoint = "https://localhost:%d%s" % (port, messages.service_path("Profile"))
         trust = ["--ca", os.path.join(folder, "ca.pem")]
         caller.run("stunnel", endpoint, *trust, "--keep-alive", "--calls", 30, "--size", 30000, codes=0, connections=1)
         caller.run("stunnel, anew each time", endpoint, *trust, "--calls", 10, codes=0, connections=10)
@@ -231,7 +232,7 @@ def main():
             socket.create_server(("127.0.0.1", 0)) as silent, socket.socket() as dead:
         dead.bind(("127.0.0.1", 0))  # bound, but nobody listens
         certificates(folder)
-        words = {"zuv": zuv.removeprefix("http://"), "path": zuv_service.PATH,
+        words = {"zuv": zuv.removeprefix("http://"), "path": messages.service_path("Profile"),
                  "silent": str(silent.getsockname()[1]), "dead": str(dead.getsockname()[1])}
         through_nginx(caller, folder, words)
         through_haproxy(caller, folder, words)

@@ -12,6 +12,7 @@ import subprocess
 import sys
 import tempfile
 
+import messages
 import zuv_service
 from programs import Caller, certificates, command, filled, server
 from real_proxies import STUNNEL
@@ -41,8 +42,8 @@ def main():
         certificates(folder)
         with server(folder, "stunnel", [command("stunnel4"), "@file@"],
                     filled(STUNNEL, {"zuv": zuv.removeprefix("http://")})) as (port,):
-            secure = "https://localhost:%d%s" % (port, zuv_service.PATH)
-            for rule, endpoint, options in (("plain", zuv + zuv_service.PATH, []),
+            secure = "https://localhost:%d%s" % (port, messages.service_path("Profile"))
+            for rule, endpoint, options in (("plain", zuv + messages.service_path("Profile"), []),
                                             ("TLS", secure, ["--ca", os.path.join(folder, "ca.pem")])):
                 few = counted(caller, folder, rule, endpoint, FEW, *options)
                 many = counted(caller, folder, rule, endpoint, MANY, *options)
