@@ -48,7 +48,9 @@ def main():
                 few = counted(caller, folder, rule, endpoint, FEW, *options)
                 many = counted(caller, folder, rule, endpoint, MANY, *options)
                 many.subtract(few)
-                found = {name: count / (MANY - FEW) for name, count in many.items() if count != 0}
+                # An answer may arrive in two pieces now and then: what isn't in every call is not its cost.
+                found = {name: count / (MANY - FEW) for name, count in many.items()}
+                found = {name: round(each, 1) for name, each in found.items() if abs(each) >= 0.05}
                 print("%s: system calls of one call: %s" % (rule, found))
                 assert found == EXPECTED, found
 
