@@ -18,11 +18,11 @@
 
 static const char *listed_text(int error)
 {
-    switch (error) { // NOLINT(bugprone-branch-clone): codes may share a text
+    switch (error) {
 #define SOAP_ERROR_TEXT(name, value, text)                                                                   \
     case value:                                                                                              \
         return text;
-        SOAP_ERRORS(SOAP_ERROR_TEXT)
+        SOAP_ERRORS(SOAP_ERROR_TEXT) // NOLINT(bugprone-branch-clone): codes may share a text
 #undef SOAP_ERROR_TEXT
     default:
         return "";

@@ -14,6 +14,7 @@
 #include <zuv_client_pro/type_ids.h>
 
 #include "binding/registry.h"
+#include "support/failing_malloc.h"
 #include "support/memory_wire.h"
 
 using namespace binding;
@@ -76,19 +77,40 @@ protected:
         return ctx.sent();
     }
 
-    // Puts the reader behind the start tag of an element that declares what `content` needs.
-    void receive(const std::string &content)
+    // Puts the reader behind the start tag of an element that declares what `content` needs, and which
+    // doesn't end if the content is cut.
+    void receive(const std::string &content, bool cut = false)
     {
         std::string start = "<all xmlns:SOAP-ENC=\"http://schemas.xmlsoap.org/soap/encoding/\"";
         for (const soap_namespace *row = ctx.namespaces; row->prefix; ++row)
             if (std::strncmp(row->prefix, "SOAP-ENC", 8) != 0)
                 start += std::string(" xmlns:") + row->prefix + "=\"" + row->uri + "\"";
-        ctx.receive(start + ">" + content + "</all>");
+        ctx.receive(start + ">" + content + (cut ? "" : "</all>"));
         soap_reset_call(&ctx);
         ctx.input_mode = MODE_BARE_XML;
         soap_receive_begin(&ctx);
         ctx.soap_version = 1;
         ASSERT_EQ(0, soap_element_in_begin(&ctx, "all", 0, nullptr)) << content;
+    }
+
+    // Runs `check` for each type that dispatch knows, with what is written of a filled object of it.
+    template <class Check> void for_each_type(Check check)
+    {
+        for (int type = 1; type <= DISPATCH_ID_MAX; ++type) {
+            if (type_entries[type].kind == type_kind::none)
+                continue;
+            const char *name = type_entries[type].xml_name;
+            SCOPED_TRACE(std::to_string(type) + " " + (name ? name : "-"));
+            check(type, written(filled(type), type));
+            forget();
+        }
+    }
+
+    void forget()
+    {
+        soap_discard_objects(&ctx, nullptr);
+        soap_discard_all(&ctx);
+        EXPECT_EQ(nullptr, ctx.instance_list);
     }
 
     memory_wire ctx;
@@ -97,25 +119,50 @@ protected:
 TEST_F(Dispatch, what_is_written_by_id_is_read_by_id_and_written_alike)
 {
     int kinds[static_cast<int>(type_kind::pointer) + 1] = {};
-    for (int type = 1; type <= DISPATCH_ID_MAX; ++type) {
-        const type_entry &entry = type_entries[type];
-        if (entry.kind == type_kind::none)
-            continue;
-        SCOPED_TRACE(std::to_string(type) + " " + (entry.xml_name ? entry.xml_name : "-"));
-        const std::string text = written(filled(type), type);
+    for_each_type([&](int type, const std::string &text) {
         ASSERT_NE("", text);
         receive(text);
         void *back = read_by_type(&ctx, type);
         ASSERT_NE(nullptr, back) << ctx.error << " " << text;
         EXPECT_EQ(0, soap_element_in_end(&ctx, "all"));
         EXPECT_EQ(text, written(back, type));
-        soap_discard_objects(&ctx, nullptr);
-        soap_discard_all(&ctx);
-        EXPECT_EQ(nullptr, ctx.instance_list);
-        ++kinds[static_cast<int>(entry.kind)];
-    }
+        ++kinds[static_cast<int>(type_entries[type].kind)];
+    });
     for (int kind = 1; kind <= static_cast<int>(type_kind::pointer); ++kind)
         EXPECT_GT(kinds[kind], 0) << kind;
+}
+
+TEST_F(Dispatch, what_is_cut_short_is_refused)
+{
+    for_each_type([&](int type, const std::string &text) {
+        for (std::size_t length = 0; length < text.size(); ++length) {
+            receive(text.substr(0, length), true);
+            EXPECT_EQ(nullptr, read_by_type(&ctx, type)) << text.substr(0, length);
+            EXPECT_NE(0, ctx.error);
+            forget();
+        }
+    });
+}
+
+TEST_F(Dispatch, a_refused_allocation_is_an_error_and_nothing_else)
+{
+    std::size_t refusals = 0;
+    for_each_type([&](int type, const std::string &text) {
+        for (std::size_t nth = 1, refused = 1; refused != 0; ++nth) {
+            receive(text);
+            void *back = nullptr;
+            {
+                const failing_malloc::scope armed(nth);
+                back = read_by_type(&ctx, type);
+                refused = armed.refused();
+            }
+            EXPECT_TRUE(back != nullptr || (refused != 0 && ctx.error == SOAP_OUT_OF_MEMORY))
+                << nth << " " << ctx.error;
+            refusals += refused;
+            forget();
+        }
+    });
+    EXPECT_GT(refusals, 0u);
 }
 
 TEST_F(Dispatch, arrays_are_made_of_whatever_may_stand_in_one)

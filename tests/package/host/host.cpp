@@ -1,7 +1,7 @@
 // host.cpp - a stranger's host: nothing but installed headers and the installed library.
 //
-// Usage: host ENDPOINT of a Profile port. Calls through a proxy, through callbacks of its own, and in a call cycle of its
-// own, and lets an exception of its own cross the library. Says what failed; 0 when nothing did.
+// Usage: host ENDPOINT of a Profile port. Calls through a proxy, through callbacks of its own, and in a call
+// cycle of its own, and lets an exception of its own cross the library. Says what failed; 0 when nothing did.
 #include <cstdio>
 #include <cstring>
 #include <stdexcept>
@@ -89,7 +89,8 @@ bool get_by_hand(ProfileSoapBindingProxy &proxy, const char *endpoint, std::stri
         soap_body_in_end(&proxy) || soap_envelope_in_end(&proxy) || soap_receive_finish(&proxy))
         return false;
     soap_socket_release(&proxy);
-    return answer.identity != nullptr && answer.identity->name != nullptr && *answer.identity->name == "A stranger";
+    return answer.identity != nullptr && answer.identity->name != nullptr &&
+           *answer.identity->name == "A stranger";
 }
 
 bool own_exception_crosses(const char *endpoint)
@@ -116,7 +117,8 @@ int main(int argc, char **argv)
     const std::string uri = make_profile(proxy);
     expect(!uri.empty() && get_by_hand(proxy, argv[1], uri), "a call cycle of the host's");
     expect(own_exception_crosses(argv[1]), "an exception of the host's crosses the library");
-    expect(soap_ssl_client_context(&proxy, 0, nullptr, nullptr, nullptr, nullptr, nullptr) == 0, "OpenSSL is there");
+    expect(soap_ssl_client_context(&proxy, 0, nullptr, nullptr, nullptr, nullptr, nullptr) == 0,
+           "OpenSSL is there");
     expect(IsIPAddr("127.0.0.1") != 0 && g_TraceLogFile[0] != '\0', "what is exported by its plain name");
     return failures == 0 ? 0 : 1;
 }
