@@ -96,7 +96,7 @@ protected:
     {
         signal(SIGPIPE, SIG_IGN); // for the servers of the tests; the library's own test takes it back
         ca();
-        context(); // OpenSSL opens descriptors of its own at its first use
+        const context first; // OpenSSL opens descriptors of its own at its first use
         tls_random_word();
     }
 };
