@@ -60,7 +60,7 @@ private:
     const std::string &prefix_of(const std::string &uri, const place &at) const;
 
     void build_services();
-    enumeration build_enumeration(const known_type &type) const;
+    static enumeration build_enumeration(const known_type &type);
     void add_anonymous(service_namespace &service, const std::string &uri, const complex_declaration &type);
     data_class build_class(const std::string &uri, const known_type &type,
                            const complex_declaration &declared);
@@ -72,12 +72,12 @@ private:
     const known_type &member_type(const std::string &uri, const std::string &owner,
                                   const element_declaration &declared) const;
     void give_form(const element_declaration &declared, const known_type &type, class_member &member);
-    std::string initial_of(const place &at, const known_type &type,
-                           const std::optional<std::string> &text) const;
+    static std::string initial_of(const place &at, const known_type &type,
+                                  const std::optional<std::string> &text);
 
     void check_members(const data_class &type) const;
-    void check_own_members(const data_class &type) const;
-    void sort_by_bases(std::vector<data_class> &classes) const;
+    static void check_own_members(const data_class &type);
+    static void sort_by_bases(std::vector<data_class> &classes);
     const data_class *find_class(const std::string &name) const;
 
     void build_ports();
@@ -301,7 +301,7 @@ namespace {
 
 // The C++ expression of a value's start; texts have none, and start empty.
 std::string model_builder::initial_of(const place &at, const known_type &type,
-                                      const std::optional<std::string> &text) const
+                                      const std::optional<std::string> &text)
 {
     const auto refuse = [&] { refuse_value(at, *text, type.xml_type); };
     if (type.form == held::boolean) {
@@ -460,7 +460,7 @@ data_class model_builder::build_class(const std::string &uri, const known_type &
     return type;
 }
 
-enumeration model_builder::build_enumeration(const known_type &type) const
+enumeration model_builder::build_enumeration(const known_type &type)
 {
     enumeration made{type.xml_type, type.name, type.type_id, type.simple->documentation, {}};
     std::set<std::string> names;
@@ -539,7 +539,7 @@ const data_class *model_builder::find_class(const std::string &name) const
     return nullptr;
 }
 
-void model_builder::check_own_members(const data_class &type) const
+void model_builder::check_own_members(const data_class &type)
 {
     std::map<std::string, std::string> names; // what each member's name stands for
     for (const std::string_view name : RESERVED)
@@ -583,7 +583,7 @@ void model_builder::check_members(const data_class &type) const
     }
 }
 
-void model_builder::sort_by_bases(std::vector<data_class> &classes) const
+void model_builder::sort_by_bases(std::vector<data_class> &classes)
 {
     std::vector<data_class> sorted;
     std::set<std::string> waiting;
@@ -679,8 +679,7 @@ void model_builder::describe_types()
             by_name.emplace(type.name, &type);
         }
     }
-    for (std::size_t i = 0; i < model.types.size(); ++i) {
-        identified_type &type = model.types[i];
+    for (identified_type &type : model.types) {
         if (type.kind == id_kind::vector) {
             const auto item = by_xml_type.find(type.xml_name);
             if (item == by_xml_type.end())

@@ -47,7 +47,7 @@ std::string enumeration_text(const enumeration &type)
     for (const literal &literal : type.literals) {
         std::string note = literal.documentation;
         if (literal.name != literal.text)
-            note = string_literal(literal.text) + (note.empty() ? "" : ": " + note);
+            note.insert(0, string_literal(literal.text) + (note.empty() ? "" : ": "));
         text += documented(literal.name + ",", note, "    ");
     }
     return text + "};\n\n";

@@ -26,7 +26,7 @@ bool parse(int argc, char **argv, options &options)
         const std::string_view name = argv[i];
         if (name == "--dump-model") {
             options.dump = true;
-        } else if (i + 1 == argc) {
+        } else if (i + 1 == argc) { // NOLINT(bugprone-branch-clone): lacks its value; below, nobody knows it
             return false;
         } else if (name == "--schema") {
             options.schema = argv[++i];
