@@ -1,9 +1,9 @@
 // xml_reference_test.cpp - the reader beside another parser: both must see the same document.
 //
 // Documents come from a small random grammar with fixed seeds, and from the XML files that the system has,
-// most of them style sheets of a text processor. Texts, attribute values and the order of tags are compared. Left out of account: line ends and
-// white space in attributes, which the reader keeps as they stand, and entities that a document declares for
-// itself.
+// most of them style sheets of a text processor. Texts, attribute values and the order of tags are compared.
+// Left out of account: line ends and white space in attributes, which the reader keeps as they stand, and
+// entities that a document declares for itself.
 #include <filesystem>
 #include <fstream>
 #include <random>

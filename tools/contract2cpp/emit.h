@@ -1,8 +1,8 @@
 // emit.h - the emit stage: the model to files of C++.
 //
 // Here: what the emitters share. Elsewhere: public headers of the types (emit_headers.cpp), member lists and
-// class units (emit_classes.cpp), type ids and registry (emit_types.cpp), ports (emit_ports.cpp), data for the command
-// line (emit_description.cpp).
+// class units (emit_classes.cpp), type ids and registry (emit_types.cpp), ports (emit_ports.cpp), data for
+// the command line (emit_description.cpp).
 //
 // Always: the text depends on the model and the authority alone.
 #pragma once
