@@ -8,4 +8,5 @@ foreach(prefix ${CLASS_PREFIXES})
         "#define ROWS_OF CLASSES_OF_${prefix}\n#define ROWS_NAME rows_${prefix}\n#include \"classes/class_rows.cpp\"\n" @ONLY)
     list(APPEND class_row_units ${unit})
 endforeach()
-zuv_add_test(classes_test ${PROJECT_SOURCE_DIR}/tests/classes/classes_test.cpp ${class_row_units})
+zuv_add_test(classes_test ${PROJECT_SOURCE_DIR}/tests/classes/classes_test.cpp
+    ${PROJECT_SOURCE_DIR}/tests/classes/graph_test.cpp ${class_row_units})

@@ -1,10 +1,12 @@
 // random_objects.h - objects of any class, filled at random and compared, from the member lists alone.
 //
 // The objects are managed by the context that makes them. Members of a base class now and then hold an object
-// of a class derived from it. Same seed, same objects.
+// of a class derived from it. Same seed, same objects. A source that shares also puts an object in several
+// places, those that are just being filled included, so that there are cycles.
 #pragma once
 
 #include <cstring>
+#include <map>
 #include <random>
 #include <string>
 #include <type_traits>
@@ -31,7 +33,7 @@ const class_row *row_of(int type_id); // class_rows.cpp of the test
 
 class source {
 public:
-    source(soap *ctx, unsigned seed) : ctx_(ctx), engine_(seed) {}
+    source(soap *ctx, unsigned seed, bool shares = false) : ctx_(ctx), engine_(seed), shares_(shares) {}
 
     std::size_t below(std::size_t limit) { return engine_() % limit; }
     bool chance(std::size_t in) { return below(in) == 0; }
@@ -69,11 +71,25 @@ public:
         }
     }
 
+    // What stands elsewhere already as a value of the type, now and then; else null.
+    template <class T> T *again(int type_id)
+    {
+        const std::vector<void *> &made = made_[type_id];
+        return shares_ && !made.empty() && chance(3) ? static_cast<T *>(made[below(made.size())]) : nullptr;
+    }
+    // Lets a value stand elsewhere. An object is to stand only where its very class is asked for: a reference
+    // cannot tell a reader that the class is a derived one.
+    void lend(int type_id, void *value) { made_[type_id].push_back(value); }
+
     // An object of the class, or now and then of one derived from it.
     template <class T> T *object(int depth)
     {
+        if (T *shared = again<T>(binding::law<T>::type_id))
+            return shared;
         const binding::class_ops *ops = chance(2) ? derived(binding::ops_of<T>) : &binding::ops_of<T>;
         void *made = soap_instantiate(ctx_, ops->type_id, nullptr, nullptr, nullptr);
+        if (ops == &binding::ops_of<T>)
+            lend(ops->type_id, made);
         row_of(ops->type_id)->fill(*this, made, depth);
         return static_cast<T *>(made);
     }
@@ -93,6 +109,8 @@ private:
 
     soap *ctx_;
     std::mt19937 engine_;
+    bool shares_;
+    std::map<int, std::vector<void *>> made_;
 };
 
 template <class T> void fill(source &random, T &object, int depth);
@@ -100,7 +118,25 @@ template <class T> bool equal(const T &one, const T &other);
 
 // --- values ---
 
+template <class V> void fill_new(source &random, V &value, int type_id, int depth);
+
 template <class V> void fill_value(source &random, V &value, int type_id, int depth)
+{
+    if constexpr (std::is_pointer_v<V> &&
+                  (std::is_same_v<V, xsd__base64Binary *> || !std::is_class_v<std::remove_pointer_t<V>> ||
+                   std::is_same_v<V, std::string *>)) {
+        const int kind = std::is_same_v<V, std::string *> ? SOAP_TYPE_xsd__string : type_id;
+        value = random.again<std::remove_pointer_t<V>>(kind);
+        if (value == nullptr) {
+            fill_new(random, value, type_id, depth);
+            random.lend(kind, value);
+        }
+    } else {
+        fill_new(random, value, type_id, depth);
+    }
+}
+
+template <class V> void fill_new(source &random, V &value, int type_id, int depth)
 {
     using namespace binding;
     if constexpr (std::is_same_v<V, std::string>)
@@ -134,8 +170,31 @@ template <class V> void fill_value(source &random, V &value, int type_id, int de
     }
 }
 
+// The places compared so far, if sharing counts: what is one on the one side is one on the other.
+struct sharing {
+    std::map<const void *, const void *> there, back;
+};
+inline sharing *compared = nullptr;
+
+// Whether the pair was met before, as the same pair (`same`) or one of them with another.
+inline bool met(const void *one, const void *other, bool &same)
+{
+    same = true;
+    if (compared == nullptr)
+        return false;
+    const auto [there, first] = compared->there.emplace(one, other);
+    const auto [back, also_first] = compared->back.emplace(other, one);
+    same = there->second == other && back->second == one;
+    return !first || !also_first;
+}
+
 template <class V> bool equal_value(const V &one, const V &other)
 {
+    if constexpr (std::is_pointer_v<V>) {
+        bool same;
+        if (one && other && met(one, other, same))
+            return same;
+    }
     if constexpr (std::is_same_v<V, xsd__base64Binary *>) {
         if (!one || !other)
             return one == other;

@@ -1,0 +1,148 @@
+// graph_test.cpp - objects that are shared and that form cycles, in all modes that can carry them: what is
+// read back is the same graph.
+//
+// Elsewhere: which object gets an id (identity_test.cpp), classes as trees (classes_test.cpp).
+#include <gtest/gtest.h>
+
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_identity.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include "support/memory_wire.h"
+#include "support/random_objects.h"
+
+using namespace random_objects;
+
+namespace {
+
+constexpr int DEPTH = 4;
+constexpr unsigned GRAPHS = 12; // of each class
+
+struct form {
+    const char *name;
+    std::int16_t version;
+    bool encoded;
+    std::uint32_t mode;
+};
+constexpr form forms[] = {
+    {"literal SOAP 1.1, graph mode", 1, false, SOAP_XML_GRAPH},
+    {"literal SOAP 1.2, graph mode", 2, false, SOAP_XML_GRAPH},
+    {"encoded SOAP 1.1: shared objects behind the first", 1, true, 0},
+    {"encoded SOAP 1.1, graph mode", 1, true, SOAP_XML_GRAPH},
+    {"encoded SOAP 1.2: shared objects where first met", 2, true, 0},
+};
+
+// The table of the program with the namespaces of SOAP 1.2 in its first rows.
+const soap_namespace *table_12()
+{
+    static const std::vector<soap_namespace> rows = [] {
+        std::vector<soap_namespace> copy;
+        for (const soap_namespace *row = soap_program_namespaces; row->prefix; ++row)
+            copy.push_back(*row);
+        copy[0].uri = "http://www.w3.org/2003/05/soap-envelope";
+        copy[1].uri = "http://www.w3.org/2003/05/soap-encoding";
+        copy.push_back({nullptr, nullptr, nullptr, nullptr});
+        return copy;
+    }();
+    return rows.data();
+}
+
+class Graphs : public testing::Test {
+protected:
+    int put(const binding::class_ops &ops, const void *object)
+    {
+        if (soap_envelope_out_begin(&ctx) || soap_body_out_begin(&ctx) ||
+            binding::class_pointer_out(&ctx, ops, "root", -1, object, "") || soap_put_finish(&ctx) ||
+            soap_body_out_end(&ctx))
+            return ctx.error;
+        return soap_envelope_out_end(&ctx);
+    }
+
+    // The message; the counting pass in front of it has the same length.
+    std::string write(const form &how, std::uint32_t io, const binding::class_ops &ops, const void *object)
+    {
+        ctx.output_mode = MODE_BARE_XML | io | how.mode;
+        ctx.sends.clear();
+        soap_set_namespaces(&ctx, how.version == 1 ? soap_program_namespaces : table_12());
+        ctx.encoding_style = how.encoded ? "" : nullptr;
+        soap_reset_call(&ctx);
+        ctx.soap_version = how.version;
+        binding::class_pointer_mark(&ctx, ops, object);
+        EXPECT_EQ(0, soap_count_begin(&ctx));
+        ctx.mode |= MODE_COUNTING;
+        EXPECT_EQ(0, put(ops, object));
+        const std::uint64_t counted = ctx.message_count;
+        EXPECT_EQ(0, soap_count_end(&ctx));
+        EXPECT_EQ(0, soap_send_begin(&ctx));
+        EXPECT_EQ(0, put(ops, object));
+        EXPECT_EQ(0, soap_send_finish(&ctx));
+        EXPECT_EQ(counted, ctx.sent().size());
+        return ctx.sent();
+    }
+
+    void *read(const binding::class_ops &ops, const std::string &message)
+    {
+        soap_set_namespaces(&ctx, soap_program_namespaces);
+        soap_reset_call(&ctx);
+        ctx.receive(message);
+        void *object = nullptr;
+        if (soap_receive_begin(&ctx) || soap_envelope_in_begin(&ctx) || soap_body_in_begin(&ctx) ||
+            !binding::class_pointer_in(&ctx, ops, "root", &object) || !binding::independents_read(&ctx) ||
+            soap_body_in_end(&ctx) || soap_envelope_in_end(&ctx) || soap_receive_finish(&ctx))
+            return nullptr;
+        return object;
+    }
+
+    memory_wire ctx;
+};
+
+std::size_t references_in(const std::string &message, const form &how)
+{
+    const std::string reference = how.version == 1 ? " href=\"#_" : " SOAP-ENC:ref=\"_";
+    std::size_t count = 0;
+    for (std::size_t at = message.find(reference); at != std::string::npos;
+         at = message.find(reference, at + 1))
+        ++count;
+    return count;
+}
+
+TEST_F(Graphs, come_back_with_the_same_sharing)
+{
+    std::size_t references = 0, classes = 0;
+    for (int id = 1; id <= binding::TYPE_ID_MAX; ++id) {
+        const binding::type_entry *entry = binding::type_entry_of(id);
+        if (!entry || entry->kind != binding::type_kind::object || id == SOAP_TYPE_xsd__base64Binary)
+            continue;
+        ++classes;
+        for (unsigned seed = 0; seed < GRAPHS; ++seed) {
+            source random(&ctx, seed * 1000 + static_cast<unsigned>(id), true);
+            void *object = soap_instantiate(&ctx, id, nullptr, nullptr, nullptr);
+            random.lend(id, object);
+            row_of(id)->fill(random, object, DEPTH);
+            for (const form &how : forms) {
+                const std::uint32_t io = seed % 3 == 0   ? MODE_BUFFERED
+                                         : seed % 3 == 1 ? MODE_STORE
+                                                         : MODE_DIRECT;
+                const std::string message = write(how, io, *entry->ops, object);
+                const void *back = read(*entry->ops, message);
+                ASSERT_NE(nullptr, back) << entry->xml_name << ", " << how.name << ", error " << ctx.error
+                                         << " " << ctx.element_id << "\n"
+                                         << message.substr(0, 6000);
+                sharing pairs;
+                compared = &pairs;
+                bool same;
+                met(object, back, same);
+                EXPECT_TRUE(row_of(id)->equal(object, back)) << entry->xml_name << ", " << how.name << "\n"
+                                                             << message.substr(0, 6000);
+                compared = nullptr;
+                references += references_in(message, how);
+            }
+            soap_discard_objects(&ctx, nullptr);
+            soap_discard_all(&ctx);
+        }
+    }
+    EXPECT_EQ(407U, classes);
+    EXPECT_GT(references, 10 * classes);
+}
+
+} // namespace
