@@ -435,6 +435,8 @@ def refusals(rng):
         if c.text:
             continue
         yield case('nothing', 0, 0)
+        if least:
+            yield case('no content', OCCURS, 0, [])
         for tag in ('{urn:unknown}x', '{urn:unknown}description', '{}description'):
             yield case('unknown ' + tag, MISMATCH, 0, least + [(tag, None, {}, '', '{}string')])
         for m in members:
@@ -448,7 +450,7 @@ def refusals(rng):
             values = [(BAD_VALUES.get(built_in(m.kind).split('}')[1]), TYPE_MISMATCH, TYPE_MISMATCH)]
             if isinstance(words, list):
                 values = [(' ', TYPE_MISMATCH, TYPE_MISMATCH), (words[0].upper() + '_', TYPE_MISMATCH, TYPE_MISMATCH),
-                          (str(len(words)), TYPE_MISMATCH, 0), (str(len(words) - 1), 0, 0)]
+                          ('-1', TYPE_MISMATCH, 0), (str(len(words)), TYPE_MISMATCH, 0), (str(len(words) - 1), 0, 0)]
             for value, strict, otherwise in values:
                 if value:
                     bad = [(m.tag, None, {}, value, '{}string')] * max(m.least, 1)

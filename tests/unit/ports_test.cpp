@@ -69,8 +69,17 @@ public:
         return low + "_" + name + ".txt";
     }
 
+    // The connection from now on, with one answer.
+    void connect(std::string answer)
+    {
+        wire.carry(context());
+        wire.sent.clear();
+        wire.answers = {std::move(answer)};
+    }
+
     std::string port, name;
     int request_id, response_id;
+    call_wire wire; // outlives the context of the class below
 };
 
 template <class V> V *kept(V value) // for the whole run
@@ -526,15 +535,13 @@ TEST(Ports, send_the_golden_request_and_read_the_answer_into_its_class)
 {
     for (const auto &row : all_rows()) {
         SCOPED_TRACE(row->golden_name());
-        call_wire wire;
-        wire.carry(row->context());
-        wire.answers.push_back(answer(*row));
+        row->connect(answer(*row));
         const outcome got = row->call(nullptr, true);
-        EXPECT_EQ(golden::read(row->golden_name()).whole(), wire.sent);
+        EXPECT_EQ(golden::read(row->golden_name()).whole(), row->wire.sent);
         EXPECT_EQ(0, got.error);
         ASSERT_TRUE(got.answered);
         row->expect_answer();
-        EXPECT_EQ((row->context().output_mode & MODE_KEEP_ALIVE) ? 0 : 1, wire.closed);
+        EXPECT_EQ((row->context().output_mode & MODE_KEEP_ALIVE) ? 0 : 1, row->wire.closed);
     }
 }
 
@@ -542,15 +549,13 @@ TEST(Ports, full_forms_take_an_endpoint_and_an_action_and_change_nothing_else)
 {
     for (const auto &row : all_rows()) {
         SCOPED_TRACE(row->golden_name());
-        call_wire wire;
-        wire.carry(row->context());
-        wire.answers.push_back(answer(*row));
+        row->connect(answer(*row));
         EXPECT_EQ(0, row->call("urn:act", true).error);
-        EXPECT_EQ(OTHER_PLACE, wire.opened_at);
-        const std::size_t end = wire.sent.find("\r\n\r\n");
-        EXPECT_EQ(0U, wire.sent.find("POST /place HTTP/1.1\r\nHost: other.example\r\n"));
-        EXPECT_LT(wire.sent.find("\r\nSOAPAction: \"urn:act\"\r\n"), end);
-        EXPECT_EQ(golden::read(row->golden_name()).body, wire.sent.substr(end + 4));
+        EXPECT_EQ(OTHER_PLACE, row->wire.opened_at);
+        const std::size_t end = row->wire.sent.find("\r\n\r\n");
+        EXPECT_EQ(0U, row->wire.sent.find("POST /place HTTP/1.1\r\nHost: other.example\r\n"));
+        EXPECT_LT(row->wire.sent.find("\r\nSOAPAction: \"urn:act\"\r\n"), end);
+        EXPECT_EQ(golden::read(row->golden_name()).body, row->wire.sent.substr(end + 4));
     }
 }
 
@@ -579,9 +584,7 @@ TEST(Ports, read_every_fault_into_its_member_of_the_detail)
                              detail + "</E:Detail>"
                        : std::string("<faultcode>E:") + (client ? "Client" : "Server") +
                              "</faultcode><faultstring>so</faultstring><detail>" + detail + "</detail>";
-        call_wire wire;
-        wire.carry(row.context());
-        wire.answers.push_back(message(row, "<E:Fault>" + fault + "</E:Fault>", version_12));
+        row.connect(message(row, "<E:Fault>" + fault + "</E:Fault>", version_12));
         const outcome got = row.call(nullptr, true);
         EXPECT_EQ(client ? SOAP_CLIENT_FAULT : SOAP_SERVER_FAULT, got.error);
         EXPECT_FALSE(got.answered);
@@ -611,14 +614,12 @@ TEST(Ports, a_null_response_record_sends_and_reads_nothing)
 #else
     for (const auto &row : all_rows()) {
         SCOPED_TRACE(row->golden_name());
-        call_wire wire;
-        wire.carry(row->context());
-        wire.answers.push_back("never read");
+        row->connect("never read");
         const outcome got = row->call(nullptr, false);
         EXPECT_EQ(0, got.error);
         EXPECT_FALSE(got.answered);
-        EXPECT_EQ(golden::read(row->golden_name()).whole(), wire.sent);
-        EXPECT_EQ("never read", wire.answers.at(0));
+        EXPECT_EQ(golden::read(row->golden_name()).whole(), row->wire.sent);
+        EXPECT_EQ("never read", row->wire.answers.at(0));
     }
 #endif
 }
