@@ -249,7 +249,7 @@ void fill_member(source &random, std::vector<V> &member, binding::occurs, int ty
 template <class V> void fill_attribute(source &random, V &member, bool required)
 {
     if (required || random.chance(2))
-        fill_value(random, member, 0, 0);
+        fill_new(random, member, 0, 0); // an attribute has no identity
 }
 
 template <class T> void fill(source &random, T &object, int depth)
