@@ -29,7 +29,7 @@ std::string take_parameter(std::string &specification, const std::string &key)
     const std::size_t at = specification.rfind("," + key + "=");
     if (at == std::string::npos || specification.find(',', at + 1) != std::string::npos)
         return "";
-    const std::string value = specification.substr(at + key.size() + 2);
+    std::string value = specification.substr(at + key.size() + 2);
     specification.erase(at);
     return value;
 }

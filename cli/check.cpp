@@ -156,8 +156,13 @@ private:
             }
             const std::string problem = value_problem(known->type, attribute.value());
             if (!problem.empty())
-                note(element, "attribute \"" + name + "\" should be " + problem + ", not \"" +
-                                  attribute.value() + "\"");
+                note(element, std::string("attribute \"")
+                                  .append(name)
+                                  .append("\" should be ")
+                                  .append(problem)
+                                  .append(", not \"")
+                                  .append(attribute.value())
+                                  .append("\""));
         }
         for (const contract::data_class *one : contract::lineage(type))
             for (const contract::attribute &attribute : one->attributes)

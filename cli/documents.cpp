@@ -26,7 +26,8 @@ std::string problem_of(soap &ctx)
     soap_fault_print_text(&ctx, text, sizeof text);
     const std::string_view all = text;
     const std::size_t begin = all.find('"'), end = all.find("\"\nDetail");
-    return printable(begin < end && end != all.npos ? all.substr(begin + 1, end - begin - 1) : all);
+    return printable(begin < end && end != std::string_view::npos ? all.substr(begin + 1, end - begin - 1)
+                                                                  : all);
 }
 
 int append(soap *ctx, const char *data, std::size_t length)
@@ -39,7 +40,7 @@ int append(soap *ctx, const char *data, std::size_t length)
 bool uses_prefix(std::string_view xml, std::string_view prefix)
 {
     const std::string name = std::string(prefix) + ":";
-    for (std::size_t at = xml.find(name); at != xml.npos; at = xml.find(name, at + 1))
+    for (std::size_t at = xml.find(name); at != std::string_view::npos; at = xml.find(name, at + 1))
         if (at != 0 && std::strchr("</ \"\n", xml[at - 1]) != nullptr)
             return true;
     return false;
@@ -51,7 +52,7 @@ std::string without_idle_declarations(std::string xml)
     constexpr std::string_view DECLARATION = "xmlns:";
     const std::size_t root = xml.find('<', xml.starts_with("<?") ? 2 : 0);
     std::size_t end = xml.find('>', root);
-    for (std::size_t at = xml.find(DECLARATION, root); at < end && end != xml.npos;
+    for (std::size_t at = xml.find(DECLARATION, root); at < end && end != std::string_view::npos;
          at = xml.find(DECLARATION, at)) {
         const std::size_t name = at + DECLARATION.size(), equals = xml.find('=', name);
         const std::size_t behind = xml.find('"', equals + 2) + 1;

@@ -52,8 +52,7 @@ void add_member(json &object, const pugi::xml_node &child, const contract::data_
     if (!repeats)
         object[name] = std::move(value);
     else if (!object.contains(name) || !object[name].is_array())
-        object[name] = object.contains(name) ? json::array({object[name], std::move(value)})
-                                             : json::array({std::move(value)});
+        object[name] = object.contains(name) ? json::array({object[name], value}) : json::array({value});
     else
         object[name].push_back(std::move(value));
 }

@@ -20,15 +20,15 @@ std::string_view local(std::string_view name)
 bool looks_like_xml(std::string_view bytes)
 {
     const std::size_t first = bytes.find_first_not_of(" \t\r\n\xEF\xBB\xBF");
-    return first != bytes.npos && bytes[first] == '<';
+    return first != std::string_view::npos && bytes[first] == '<';
 }
 
 // The parameter of a header value such as `multipart/related; boundary="x"`.
 std::string parameter(std::string_view value, std::string_view name)
 {
-    for (std::size_t at = value.find(';'); at != value.npos;) {
+    for (std::size_t at = value.find(';'); at != std::string_view::npos;) {
         const std::size_t begin = value.find_first_not_of("; \t", at);
-        if (begin == value.npos)
+        if (begin == std::string_view::npos)
             break;
         const std::size_t equals = std::min(value.find('=', begin), value.size());
         const bool quoted = equals + 1 < value.size() && value[equals + 1] == '"';
@@ -49,11 +49,11 @@ void read_part_head(std::string_view head, body_part &part)
         std::string_view line = head.substr(0, end);
         head.remove_prefix(std::min(end + 1, head.size()));
         const std::size_t colon = line.find(':');
-        if (colon == line.npos)
+        if (colon == std::string_view::npos)
             continue;
         const std::string_view value = line.substr(colon + 1);
         const std::size_t first = value.find_first_not_of(" \t\r"), last = value.find_last_not_of(" \t\r");
-        const std::string text(first == value.npos ? "" : value.substr(first, last - first + 1));
+        const std::string text(first == std::string_view::npos ? "" : value.substr(first, last - first + 1));
         if (same_name(line.substr(0, colon), "Content-Type"))
             part.type = text;
         if (same_name(line.substr(0, colon), "Content-ID"))
@@ -66,17 +66,18 @@ std::vector<body_part> mime_parts(std::string_view body, const std::string &boun
     std::vector<body_part> parts;
     const std::string delimiter = "--" + boundary;
     std::size_t at = body.find(delimiter);
-    while (at != body.npos && parts.size() < PARTS_MAX) {
+    while (at != std::string_view::npos && parts.size() < PARTS_MAX) {
         const std::size_t begin = at + delimiter.size();
         if (body.substr(begin).starts_with("--"))
             break;
         at = body.find("\r\n" + delimiter, begin);
-        std::string_view part = body.substr(begin, at == body.npos ? body.npos : at - begin);
-        at = at == body.npos ? at : at + 2;
+        std::string_view part =
+            body.substr(begin, at == std::string_view::npos ? std::string_view::npos : at - begin);
+        at = at == std::string_view::npos ? at : at + 2;
         const std::size_t head_end = part.find("\r\n\r\n");
         body_part &one = parts.emplace_back();
         read_part_head(part.substr(0, head_end), one);
-        one.bytes = head_end == part.npos ? "" : part.substr(head_end + 4);
+        one.bytes = head_end == std::string_view::npos ? "" : part.substr(head_end + 4);
         one.xml = looks_like_xml(one.bytes);
     }
     return parts;
@@ -95,7 +96,7 @@ void read_message(std::string_view xml, bool request, exchange &found)
         if (token.kind != xml_kind::start && token.kind != xml_kind::empty)
             continue;
         const std::string_view name = local(token.name);
-        if (name == "Envelope" && token.source.find("2003/05/soap-envelope") != token.source.npos)
+        if (name == "Envelope" && token.source.find("2003/05/soap-envelope") != std::string_view::npos)
             found.soap12 = true;
         if (name == "Body" && !in_body) {
             in_body = true;

@@ -114,7 +114,7 @@ private:
 
     void add_text(const xml_token &token)
     {
-        if (hides() || token.source.find_first_not_of(" \t\r\n") == token.source.npos)
+        if (hides() || token.source.find_first_not_of(" \t\r\n") == std::string_view::npos)
             return;
         if (!after_start_)
             new_line();

@@ -36,7 +36,8 @@ std::string shown_header(std::string_view name, std::string_view value, bool sho
         return std::string(value);
     if (secret) { // the scheme stays: "Basic"
         const std::size_t blank = value.find(' ');
-        return (blank == value.npos ? "" : std::string(value.substr(0, blank)) + " ") + std::string(BLANKED);
+        return (blank == std::string_view::npos ? "" : std::string(value.substr(0, blank)) + " ") +
+               std::string(BLANKED);
     }
     return same_name(name, "Location") || same_name(name, "Referer") ? shown_start_line(value, false)
                                                                      : std::string(value);
@@ -45,7 +46,7 @@ std::string shown_header(std::string_view name, std::string_view value, bool sho
 std::string shown_start_line(std::string_view line, bool show_secrets)
 {
     const std::size_t query = line.find('?');
-    if (show_secrets || query == line.npos)
+    if (show_secrets || query == std::string_view::npos)
         return std::string(line);
     const std::size_t end = std::min(line.find(' ', query), line.size());
     return std::string(line.substr(0, query + 1)) + std::string(BLANKED) + std::string(line.substr(end));

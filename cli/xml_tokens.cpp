@@ -13,7 +13,7 @@ constexpr std::string_view BLANKS = " \t\r\n";
 std::size_t through(std::string_view text, std::string_view end, std::size_t from)
 {
     const std::size_t at = text.find(end, from);
-    return at == text.npos ? text.size() : at + end.size();
+    return at == std::string_view::npos ? text.size() : at + end.size();
 }
 
 // Bytes of a tag: to the ">" that stands outside of quotes.

@@ -85,6 +85,7 @@ void one_context_for_each_thread()
     ProfileSoapBindingProxy settings(endpoint, MODE_UTF_STRINGS);
     settings.connect_timeout = 5;
     std::vector<std::thread> threads;
+    threads.reserve(4);
     for (int i = 0; i < 4; ++i)
         threads.emplace_back([&settings] {
             ProfileSoapBindingProxy proxy(settings); // modes, limits, callbacks, TLS as in `settings`

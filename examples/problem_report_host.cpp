@@ -178,6 +178,7 @@ private:
             soap_fault_print_file(&context_, stderr);
             throw std::runtime_error(std::string(op.name) + " failed with error " + std::to_string(error));
         }
+        expect(response.result != nullptr, "an answer without an error has a report");
         std::printf("%-13s %zu answers, %zu attachments, %s\n", op.name, response.result->answer.size(),
                     response.result->attachment.size(),
                     response.result->thisURI.empty() ? "(no name)"
