@@ -22,7 +22,7 @@ class xsd__base64Binary;
 enum class all__Colour : int {
     red,
     red_x002edark, // "red.dark": Almost brown.
-    default_,      // "default"
+    default_, // "default"
 };
 
 enum class all__Everything_size : int {
@@ -32,7 +32,7 @@ enum class all__Everything_size : int {
 
 class ZUV_CLASS all__Part {
 public:
-    std::string *id = nullptr;   // What the part is called. Required.
+    std::string *id = nullptr; // What the part is called. Required.
     struct soap *soap = nullptr; // the context that made the object, or null
 
     SOAP_CLASS_OPERATIONS(all__Part)
@@ -59,17 +59,17 @@ public:
     double *weight = nullptr;
     all__Colour *colour = nullptr;
     xsd__base64Binary *bytes = nullptr;
-    all__Part *part = nullptr;                               // Required.
-    std::string title;                                       // Required.
+    all__Part *part = nullptr; // Required.
+    std::string title; // Required.
     all__Everything_size size = all__Everything_size::large; // Required.
     bool wanted = true;
     int retries = 3;
     _all__Everything_place *place = nullptr;
     std::vector<std::string> line;
     std::vector<all__Colour> shade;
-    std::vector<all__Part *> piece;  // At least 2.
+    std::vector<all__Part *> piece; // At least 2.
     std::vector<all__Note *> remark; // What somebody wrote beside it.
-    struct soap *soap = nullptr;     // the context that made the object, or null
+    struct soap *soap = nullptr; // the context that made the object, or null
 
     SOAP_CLASS_OPERATIONS(all__Everything)
 };

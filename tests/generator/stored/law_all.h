@@ -31,7 +31,8 @@ template <> struct law<all__Part> {
     static constexpr bool global_element = false;
     static constexpr std::string self::*text = nullptr;
     static constexpr auto attributes = std::make_tuple();
-    static constexpr auto elements = std::make_tuple(required("all:id", &self::id, SOAP_TYPE_xsd__string));
+    static constexpr auto elements = std::make_tuple(
+        required("all:id", &self::id, SOAP_TYPE_xsd__string));
     static const class_ops ops;
 };
 template <> struct law<all__Note> {
@@ -41,7 +42,8 @@ template <> struct law<all__Note> {
     static constexpr char xml_type[] = "all:Note";
     static constexpr bool global_element = false;
     static constexpr std::string self::*text = &self::value;
-    static constexpr auto attributes = std::make_tuple(attribute{"colour", &self::colour, false});
+    static constexpr auto attributes = std::make_tuple(
+        attribute{"colour", &self::colour, false});
     static constexpr auto elements = std::make_tuple();
     static const class_ops ops;
 };
@@ -82,8 +84,8 @@ template <> struct law<_all__Everything_place> {
     static constexpr bool global_element = true;
     static constexpr std::string self::*text = nullptr;
     static constexpr auto attributes = std::make_tuple();
-    static constexpr auto elements =
-        std::make_tuple(optional("all:room", &self::room, SOAP_TYPE_xsd__string));
+    static constexpr auto elements = std::make_tuple(
+        optional("all:room", &self::room, SOAP_TYPE_xsd__string));
     static const class_ops ops;
 };
 template <> struct law<_all__ask> {
@@ -104,9 +106,10 @@ template <> struct law<all__Part_x002eSpare> {
     static constexpr char xml_type[] = "all:Part.Spare";
     static constexpr bool global_element = false;
     static constexpr std::string self::*text = nullptr;
-    static constexpr auto attributes = std::make_tuple(attribute{"colour", &self::colour, true});
-    static constexpr auto elements =
-        std::make_tuple(optional("all:shelf", &self::shelf, SOAP_TYPE_xsd__string));
+    static constexpr auto attributes = std::make_tuple(
+        attribute{"colour", &self::colour, true});
+    static constexpr auto elements = std::make_tuple(
+        optional("all:shelf", &self::shelf, SOAP_TYPE_xsd__string));
     static const class_ops ops;
 };
 
