@@ -21,7 +21,7 @@ foreach(source ${ZUV_UNIT_TESTS})
     zuv_add_test(${name} ${source})
 endforeach()
 target_compile_definitions(zuv_test_support PUBLIC ZUV_GOLDEN_DIR="${PROJECT_SOURCE_DIR}/tests/golden"
-    ZUV_SCHEMA_DIR="${PROJECT_SOURCE_DIR}/schema")
+    ZUV_SCHEMA_DIR="${PROJECT_SOURCE_DIR}/schema" ZUV_SAMPLE_DIR="${PROJECT_SOURCE_DIR}/tests/samples")
 
 # Another parser beside the reader.
 find_package(LibXml2 REQUIRED)

@@ -38,9 +38,8 @@ struct soap_attachment {
 // --- attachments to send ---
 
 // Adds a DIME record to the next message sent; the host sets MODE_DIME in ctx->output_mode.
-//   content, size  the bytes, or a handle for dime_read_open with the stream's length, 0 if that is unknown.
-//   A length of
-//                  more than 32 bits ends the sending with error 32
+//   content, size  the bytes, or a handle for dime_read_open with the stream's length, 0 if that is unknown
+//                  (in chunked or stored messages). What is longer than a record can be goes out in chunks
 //   type, id       may be null; texts over 65535 bytes are cut on the wire
 //   option_text    null for no options
 //   0, 20
@@ -99,8 +98,8 @@ ZUV_API int soap_attachment_ref_in(soap *ctx, unsigned char **content, int *size
 ZUV_API int soap_xop_include_in(soap *ctx, unsigned char **content, int *size, char **id, char **type,
                                 char **options);
 
-// Gives a received attachment to all values that wait for its id. More than 2^31-1 bytes: error 45 in
-// ctx->error.
+// Gives a received attachment to all values that wait for its id. More than 2^31-1 bytes for one that does:
+// error 45 in ctx->error. Attachments that no value waits for may have any size.
 ZUV_API void soap_attachment_bind(soap *ctx, soap_attachment *attachment);
 
 // 0 if the reference (with or without "cid:", percent-encoded or not) means the id (with or without angle
@@ -119,7 +118,8 @@ ZUV_API int soap_dime_header_read(soap *ctx);
 // it gives a handle is read through dime_read; for others it is memory.
 ZUV_API int soap_dime_attachments_write(soap *ctx);
 // The rest of the message's record and all records behind it. With dime_write_open set, records for which it
-// gives a handle go through dime_write. 0, 20, 32, 34, -1, or the error of a callback.
+// gives a handle go through dime_write. 0, 20, 34, -1, the error of a callback, or 32: a record where it
+// can't stand, a chunk without its record, two records of one id.
 ZUV_API int soap_dime_attachments_read(soap *ctx);
 // Delimiter and head of a part.
 ZUV_API int soap_mime_part_header_write(soap *ctx, const soap_attachment *part);
@@ -131,8 +131,9 @@ ZUV_API int soap_mime_part_header_read(soap *ctx);
 // above.
 ZUV_API int soap_mime_attachments_write(soap *ctx);
 // Reads the content of the part whose head was read, and the head of the next. `handle` goes to
-// mime_write_open, which is asked about all parts but the first. The rest of the part that held the message
-// is dropped. The part; null at the end (ctx->error 0) or on error: 20, 36, -1, or that of a callback.
+// mime_write_open, which is asked about all parts but the one that holds the message. The rest of that one is
+// dropped. The part; null at the end (ctx->error 0) or on error: 20, 36 (also for two parts of one id), -1,
+// or that of a callback.
 ZUV_API soap_attachment *soap_mime_part_read(soap *ctx, void *handle);
 // All parts that remain.
 ZUV_API int soap_mime_parts_read_all(soap *ctx);

@@ -2,12 +2,14 @@
 //
 // Elsewhere: how they go out and come in (dime.cpp, mime.cpp), values that refer to one (attachment_refs.cpp,
 // attachment_value.cpp).
+#include <algorithm>
 #include <cstring>
 
 #include <zuv_client_pro/soap_attachment.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_memory.h>
 
+#include "codec/attachment_list.h"
 #include "codec/dime.h"
 #include "codec/mime.h"
 
@@ -58,6 +60,29 @@ int soap_mime_attach(soap *ctx, char *content, std::size_t size, int encoding, c
     record->location = location;
     record->description = description;
     return SOAP_OK;
+}
+
+int attachment_ids_check(soap *ctx, const soap_attachment *list, int error)
+{
+    std::size_t count = 0;
+    for (const soap_attachment *record = list; record != nullptr; record = record->next)
+        count += record->id != nullptr;
+    if (count < 2)
+        return SOAP_OK;
+    auto **const ids = static_cast<const char **>(SOAP_MALLOC(ctx, count * sizeof(const char *)));
+    if (ids == nullptr)
+        return ctx->error = SOAP_OUT_OF_MEMORY;
+    const char **end = ids;
+    for (const soap_attachment *record = list; record != nullptr; record = record->next) {
+        if (record->id != nullptr)
+            *end++ = record->id;
+    }
+    std::sort(ids, end, [](const char *one, const char *other) { return std::strcmp(one, other) < 0; });
+    const bool twice = std::adjacent_find(ids, end, [](const char *one, const char *other) {
+                           return std::strcmp(one, other) == 0;
+                       }) != end;
+    SOAP_FREE(ctx, ids);
+    return twice ? ctx->error = error : SOAP_OK;
 }
 
 std::uint64_t soap_attachments_length(soap *ctx)

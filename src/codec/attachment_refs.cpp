@@ -159,6 +159,10 @@ void forget(soap *ctx, soap_attachment_ref *reference)
 
 void answer(soap *ctx, soap_attachment_ref *reference, const soap_attachment *attachment)
 {
+    if (attachment->size > INT_MAX) { // a value's size is an int
+        ctx->error = SOAP_LENGTH;
+        return;
+    }
     *reference->content = reinterpret_cast<unsigned char *>(attachment->content);
     *reference->size = static_cast<int>(attachment->size);
     *reference->type = const_cast<char *>(attachment->type);
@@ -228,10 +232,6 @@ void soap_attachment_bind(soap *ctx, soap_attachment *attachment)
 {
     if (attachment->id == nullptr || ctx->mtom_list == nullptr)
         return;
-    if (attachment->size > INT_MAX) { // a value's size is an int
-        ctx->error = SOAP_LENGTH;
-        return;
-    }
     if (ctx->mtom_index->size == 0) {
         answer_in_list(ctx, attachment);
         return;

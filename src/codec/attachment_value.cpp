@@ -18,9 +18,11 @@ namespace {
 
 constexpr int ALL_WRITTEN = -1;  // result: the element stands, or ctx->error tells why not
 constexpr int AS_ATTACHMENT = 3; // mark of a value that goes out as an attachment
+#define XOP_URI "http://www.w3.org/2004/08/xop/include"
 constexpr const char *XOP_TAG = "xop:Include";
 // One attribute carries both: the writer sends a name as it stands.
-constexpr const char *XOP_HREF = "xmlns:xop=\"http://www.w3.org/2004/08/xop/include\" href";
+constexpr const char *XOP_HREF = "xmlns:xop=\"" XOP_URI "\" href";
+constexpr const char *XOP_DEFAULT_HREF = "xmlns=\"" XOP_URI "\" href";
 
 // What a holder of bytes begins with.
 struct byte_holder {
@@ -48,12 +50,23 @@ const char *reference_text(soap *ctx, const char *id_text, int id, const soap_po
     return soap_string_dup(ctx, text);
 }
 
+// The prefix is in no row of the table, so where prefixes follow rules of their own it is declared by them.
+int write_include(soap *ctx, const char *href)
+{
+    if ((ctx->mode & MODE_CANONICAL) != 0)
+        return soap_prefix_push_out(ctx, "xop", XOP_URI, 0) != SOAP_OK
+                   ? ctx->error
+                   : soap_element_empty_attr(ctx, XOP_TAG, 0, "href", href);
+    if ((ctx->mode & MODE_DEFAULT_NAMESPACE) != 0)
+        return soap_element_empty_attr(ctx, "Include", 0, XOP_DEFAULT_HREF, href);
+    return soap_element_empty_attr(ctx, XOP_TAG, 0, XOP_HREF, href);
+}
+
 int write_reference(soap *ctx, const char *tag, const char *href, const char *type_text)
 {
     if ((ctx->mode & MODE_MTOM) == 0 || std::strcmp(tag, XOP_TAG) == 0)
         return soap_element_empty_attr(ctx, tag, 0, "href", href);
-    if (soap_element_out_begin(ctx, tag, 0, type_text) != SOAP_OK ||
-        soap_element_empty_attr(ctx, XOP_TAG, 0, XOP_HREF, href) != SOAP_OK)
+    if (soap_element_out_begin(ctx, tag, 0, type_text) != SOAP_OK || write_include(ctx, href) != SOAP_OK)
         return ctx->error;
     return soap_element_out_end(ctx, tag);
 }

@@ -14,6 +14,7 @@
 #include <zuv_client_pro/soap_io.h>
 #include <zuv_client_pro/soap_memory.h>
 
+#include "codec/attachment_list.h"
 #include "codec/attachment_sink.h"
 #include "codec/attachment_stream.h"
 #include "codec/dime.h"
@@ -25,11 +26,14 @@ constexpr std::size_t HEADER = 12;        // bytes
 constexpr std::size_t OPTIONS_HEADER = 4; // bytes ahead of the options' text
 constexpr std::size_t FIELD_MAX = 65535;  // bytes of options, id and type
 constexpr std::uint64_t DATA_MAX = 0xFFFFFFFF;
+constexpr std::uint64_t RECORD_MAX = 0xFFFFFFFC; // bytes of data; what is longer goes out in chunks of this
 constexpr unsigned VERSION_MASK = 0xF8;
 constexpr unsigned VERSION = 0x08;
+constexpr unsigned MESSAGE_BEGIN = 4;     // MB
 constexpr unsigned MESSAGE_END = 2;       // ME
 constexpr unsigned CHUNK = 1;             // CF
 constexpr unsigned MARKS = 7;             // MB, ME, CF
+constexpr unsigned TYPE_FORMAT = 0xF0;    // 0 in it: the type is that of the chunk ahead
 constexpr unsigned MEDIA_TYPE = 0x18;     // flags of an attachment
 constexpr unsigned UNCHANGED_TYPE = 0x08; // flags of a chunk behind the first
 
@@ -77,8 +81,14 @@ void describe(soap *ctx, const soap_attachment &record)
     ctx->dime.id = const_cast<char *>(record.id);
     ctx->dime.type = const_cast<char *>(record.type);
     ctx->dime.options = const_cast<char *>(record.options);
-    ctx->dime.size = record.size;
-    ctx->dime.flags = static_cast<std::uint8_t>(MEDIA_TYPE | (record.next == nullptr ? MESSAGE_END : 0));
+    ctx->dime.flags = MEDIA_TYPE;
+}
+
+// A chunk's marks, beside its type format: more follow, or it is the last one of the message.
+void mark(soap *ctx, bool more, bool last_record)
+{
+    const unsigned marks = more ? CHUNK : last_record ? MESSAGE_END : 0;
+    ctx->dime.flags = static_cast<std::uint8_t>((ctx->dime.flags & ~(CHUNK | MESSAGE_END)) | marks);
 }
 
 // Only the first chunk tells what the record is.
@@ -105,25 +115,31 @@ int send_in_chunks(soap *ctx, const attachment_stream &stream, bool last_record)
         if (stream.read_full(ctx, data, length) != SOAP_OK)
             return ctx->error;
         const bool more = length == sizeof data;
-        unsigned flags = ctx->dime.flags & ~(CHUNK | MESSAGE_END);
-        if (more)
-            flags |= CHUNK;
-        else if (last_record)
-            flags |= MESSAGE_END;
-        ctx->dime.flags = static_cast<std::uint8_t>(flags);
+        mark(ctx, more, last_record);
         if (send_chunk(ctx, data, length) != SOAP_OK || !more)
             return ctx->error;
         describe_next_chunk(ctx);
     }
 }
 
-int send_stream(soap *ctx, const soap_attachment &record, const attachment_stream &stream)
+// Data of known length, from the stream or, without one, from memory. One record, unless no header can tell
+// the length.
+int send_sized(soap *ctx, const soap_attachment &record, const attachment_stream *stream)
 {
-    if (record.size == 0 && output_length_is_open(ctx))
-        return send_in_chunks(ctx, stream, record.next == nullptr);
-    if (soap_dime_header_write(ctx) != SOAP_OK || stream.copy(ctx, record.size) != SOAP_OK)
-        return ctx->error;
-    return soap_send_bytes(ctx, "\0\0\0", padding_of(record.size));
+    const char *data = record.content;
+    for (std::uint64_t left = record.size;;) {
+        const std::uint64_t part = left < RECORD_MAX ? left : RECORD_MAX;
+        left -= part;
+        ctx->dime.size = part;
+        mark(ctx, left != 0, record.next == nullptr);
+        if (soap_dime_header_write(ctx) != SOAP_OK ||
+            (stream != nullptr ? stream->copy(ctx, part) : soap_send_bytes(ctx, data, part)) != SOAP_OK ||
+            soap_send_bytes(ctx, "\0\0\0", padding_of(part)) != SOAP_OK || left == 0)
+            return ctx->error;
+        if (stream == nullptr)
+            data += part;
+        describe_next_chunk(ctx);
+    }
 }
 
 int send_record(soap *ctx, const soap_attachment &record)
@@ -137,13 +153,13 @@ int send_record(soap *ctx, const soap_attachment &record)
     }
     if (handle != nullptr) {
         const attachment_stream stream = {handle, ctx->dime_read, ctx->dime_read_close};
-        const int result = send_stream(ctx, record, stream);
+        const int result = record.size == 0 && output_length_is_open(ctx)
+                               ? send_in_chunks(ctx, stream, record.next == nullptr)
+                               : send_sized(ctx, record, &stream);
         stream.end(ctx);
         return result;
     }
-    if (soap_dime_header_write(ctx) != SOAP_OK)
-        return ctx->error;
-    return soap_send_padded(ctx, record.content, record.size);
+    return send_sized(ctx, record, nullptr);
 }
 
 // --- in ---
@@ -158,6 +174,19 @@ int skip(soap *ctx, std::size_t length)
     return soap_recv_skip(ctx, length) == 0 ? SOAP_OK : fail_at_end(ctx);
 }
 
+// A length that is too short leaves data where the padding should be.
+int skip_padding(soap *ctx, std::size_t length)
+{
+    for (; length > 0; --length) {
+        const std::int32_t byte = soap_recv_byte(ctx);
+        if (byte < 0)
+            return fail_at_end(ctx);
+        if (byte != 0)
+            return ctx->error = SOAP_DIME_ERROR;
+    }
+    return SOAP_OK;
+}
+
 int read_header(soap *ctx, char (&header)[HEADER])
 {
     for (char &byte : header) {
@@ -168,7 +197,8 @@ int read_header(soap *ctx, char (&header)[HEADER])
     }
     if ((number(header, 1) & VERSION_MASK) != VERSION)
         return ctx->error = SOAP_DIME_VERSION;
-    ctx->dime.flags = static_cast<std::uint8_t>((number(header + 1, 1) & 0xF0) | (number(header, 1) & MARKS));
+    ctx->dime.flags =
+        static_cast<std::uint8_t>((number(header + 1, 1) & TYPE_FORMAT) | (number(header, 1) & MARKS));
     ctx->dime.size = number(header + 8, 4);
     if ((ctx->dime.flags & MESSAGE_END) != 0)
         ctx->mode &= ~MODE_DIME;
@@ -209,7 +239,9 @@ int skip_message_record(soap *ctx)
     const std::uint64_t used = ctx->message_count - (ctx->buffer_length - ctx->buffer_index);
     if (used > ctx->dime.size)
         return ctx->error = SOAP_DIME_ERROR;
-    return skip(ctx, static_cast<std::size_t>(padded(ctx->dime.size) - used));
+    if (skip(ctx, static_cast<std::size_t>(ctx->dime.size - used)) != SOAP_OK)
+        return ctx->error;
+    return skip_padding(ctx, padding_of(ctx->dime.size));
 }
 
 // The data of one record or chunk in stretches of the buffer.
@@ -225,10 +257,10 @@ int take_data(soap *ctx, attachment_sink &sink, std::size_t length)
         ctx->buffer_index += part;
         length -= part;
     }
-    return skip(ctx, padding_of(ctx->dime.size));
+    return skip_padding(ctx, padding_of(ctx->dime.size));
 }
 
-// A chunk behind the first: what it says of itself doesn't count.
+// A chunk behind the first: what it says of itself doesn't count, but that it is one.
 int read_chunk_header(soap *ctx)
 {
     char header[HEADER];
@@ -236,6 +268,8 @@ int read_chunk_header(soap *ctx)
         return ctx->error = SOAP_DIME_ERROR; // the message ended within a record
     if (read_header(ctx, header) != SOAP_OK)
         return ctx->error;
+    if ((ctx->dime.flags & (MESSAGE_BEGIN | TYPE_FORMAT)) != 0)
+        return ctx->error = SOAP_DIME_ERROR;
     std::uint64_t fields = 0;
     for (int i = 2; i <= 6; i += 2)
         fields += padded(number(header + i, 2));
@@ -274,6 +308,8 @@ int receive_to_stream(soap *ctx, soap_attachment *record, void *handle)
 
 int receive_record(soap *ctx)
 {
+    if ((ctx->dime.flags & MESSAGE_BEGIN) != 0 || (ctx->dime.flags & TYPE_FORMAT) == 0)
+        return ctx->error = SOAP_DIME_ERROR; // another message, or a chunk without its first
     soap_attachment *record = soap_attachment_add(ctx, &ctx->dime.list, &ctx->dime.last, nullptr, 0);
     if (record == nullptr)
         return ctx->error;
@@ -313,7 +349,8 @@ char *soap_dime_options_make(soap *ctx, unsigned short type, const char *text)
 
 std::uint64_t dime_record_length(const soap_attachment &record)
 {
-    return HEADER + padded(options_length(record.options)) + padded(field_length(record.id)) +
+    const std::uint64_t further = record.size == 0 ? 0 : (record.size - 1) / RECORD_MAX;
+    return HEADER * (1 + further) + padded(options_length(record.options)) + padded(field_length(record.id)) +
            padded(field_length(record.type)) + padded(record.size);
 }
 
@@ -374,5 +411,5 @@ int soap_dime_attachments_read(soap *ctx)
         if (soap_dime_header_read(ctx) != SOAP_OK || receive_record(ctx) != SOAP_OK)
             return ctx->error;
     }
-    return SOAP_OK;
+    return attachment_ids_check(ctx, ctx->dime.list, SOAP_DIME_ERROR);
 }

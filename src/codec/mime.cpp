@@ -21,6 +21,7 @@
 #include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "codec/attachment_list.h"
 #include "codec/attachment_sink.h"
 #include "codec/attachment_stream.h"
 #include "codec/mime.h"
@@ -344,14 +345,22 @@ int receive_content(soap *ctx, soap_attachment *part, attachment_sink *sink)
     return sink == nullptr ? SOAP_OK : sink->finish(part);
 }
 
+// The host is asked about all parts but the first, which is taken for the message unless the message has been
+// announced under another id.
+bool may_stream(const soap *ctx, const soap_attachment *part)
+{
+    const bool ahead_of_message = ctx->mime.root == nullptr && ctx->mime.start != nullptr;
+    return ctx->mime_write_open != nullptr && ctx->mime_write != nullptr &&
+           (part != ctx->mime.list || ahead_of_message);
+}
+
 // The rest of the part that holds the message is of no use to anybody; another part goes to memory or to the
 // host.
 int receive_part(soap *ctx, soap_attachment *part, void *handle)
 {
     if (part == ctx->mime.root)
         return receive_content(ctx, part, nullptr);
-    const bool streams =
-        ctx->mime_write_open != nullptr && ctx->mime_write != nullptr && part != ctx->mime.list;
+    const bool streams = may_stream(ctx, part);
     if (streams) {
         handle = ctx->mime_write_open(ctx, handle, part->id, part->type, part->description, part->encoding);
         if (handle == nullptr && ctx->error != SOAP_OK)
@@ -375,11 +384,15 @@ void bind_early_parts(soap *ctx)
         soap_attachment_bind(ctx, part);
 }
 
-void end_of_parts(soap *ctx)
+// Fields of a form may have one name.
+int end_of_parts(soap *ctx)
 {
+    const bool form =
+        ctx->http_content != nullptr && soap_attr_value(ctx, ctx->http_content, "multipart/form-data");
     ctx->mode &= ~MODE_MIME;
     ctx->mime.boundary = nullptr; // a message to be sent draws its own
     ctx->mime.start = nullptr;
+    return form ? SOAP_OK : attachment_ids_check(ctx, ctx->mime.list, SOAP_MIME_ERROR);
 }
 
 } // namespace
@@ -470,11 +483,9 @@ soap_attachment *soap_mime_part_read(soap *ctx, void *handle)
         bind_early_parts(ctx);
     else
         soap_attachment_bind(ctx, part);
-    if (last)
-        end_of_parts(ctx);
-    else if (ctx->error == SOAP_OK)
-        read_next_head(ctx);
-    return ctx->error == SOAP_OK ? part : nullptr;
+    if (ctx->error != SOAP_OK || (last ? end_of_parts(ctx) : read_next_head(ctx)) != SOAP_OK)
+        return nullptr;
+    return part;
 }
 
 int soap_mime_parts_read_all(soap *ctx)

@@ -31,8 +31,9 @@ namespace {
 
 constexpr std::int32_t END = -1;
 constexpr std::int32_t GZIP_FIRST_BYTE = 0x1F;
-constexpr std::size_t GZIP_HEAD_REST = 9; // bytes behind the first
-constexpr std::size_t BLOCK_STEP = 65536; // bytes by which a block of announced size grows
+constexpr std::size_t GZIP_HEAD_REST = 9;  // bytes behind the first
+constexpr std::size_t BLOCK_STEP = 65536;  // bytes by which a block of announced size grows
+constexpr unsigned DIME_MESSAGE_BEGIN = 4; // flag of a message's first record
 constexpr std::int32_t HIGH_OF_TRUNCATED_MARK = 0xFEC0;
 
 // The next byte without using it, or -1.
@@ -273,6 +274,8 @@ int begin_dime(soap *ctx)
 {
     if (soap_dime_header_read(ctx) != SOAP_OK)
         return ctx->error;
+    if ((ctx->dime.flags & DIME_MESSAGE_BEGIN) == 0)
+        return ctx->error = SOAP_DIME_ERROR;
     soap_dime_data_begin(ctx);
     return SOAP_OK;
 }

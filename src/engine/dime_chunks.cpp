@@ -10,6 +10,8 @@ namespace {
 constexpr std::size_t HEADER = 12;       // bytes
 constexpr unsigned CHUNK_FLAG = 1;       // more chunks follow
 constexpr unsigned MESSAGE_END_FLAG = 2; // last record of the message
+constexpr unsigned MESSAGE_BEGIN_FLAG = 4;
+constexpr unsigned TYPE_FORMAT_MASK = 0xF0; // 0 in it: the type is that of the chunk ahead
 constexpr unsigned VERSION_MASK = 0xF8;
 constexpr unsigned VERSION = 0x08;
 constexpr int END = -1;
@@ -67,8 +69,11 @@ void unclip(soap *ctx)
 int read_next_header(soap *ctx)
 {
     unsigned char header[HEADER];
-    if (skip(ctx, padded(ctx->dime.size) - ctx->dime.size) != 0)
-        return END;
+    for (std::size_t left = padded(ctx->dime.size) - ctx->dime.size; left != 0; --left) {
+        const int byte = raw_byte(ctx);
+        if (byte != 0)
+            return byte == END ? END : ctx->error = SOAP_DIME_ERROR; // the length was too short
+    }
     for (unsigned char &byte : header) {
         const int c = raw_byte(ctx);
         if (c == END)
@@ -80,7 +85,9 @@ int read_next_header(soap *ctx)
     if (skip(ctx, padded(number(header + 2, 2)) + padded(number(header + 4, 2)) +
                       padded(number(header + 6, 2))) != 0)
         return END;
-    ctx->dime.flags = static_cast<std::uint8_t>((header[1] & 0xF0U) | (header[0] & 7U));
+    if ((header[0] & MESSAGE_BEGIN_FLAG) != 0 || (header[1] & TYPE_FORMAT_MASK) != 0)
+        return ctx->error = SOAP_DIME_ERROR; // not a chunk of this record
+    ctx->dime.flags = static_cast<std::uint8_t>((header[1] & TYPE_FORMAT_MASK) | (header[0] & 7U));
     ctx->dime.size = number(header + 8, 4);
     if ((ctx->dime.flags & MESSAGE_END_FLAG) != 0)
         ctx->mode &= ~MODE_DIME;

@@ -4,7 +4,8 @@
 //
 //   list  = item *( ("," / ";") item )
 //   item  = name [ "=" value ]
-//   value = '"' characters '"' / characters
+//   value = '"' characters '"' / characters; between quotes a backslash may stand ahead of a quote or
+//   backslash
 #include <cstddef>
 #include <cstring>
 
@@ -55,11 +56,15 @@ const char *copy_plain(const char *text, const char *stops, char *target)
 // end.
 const char *copy_quoted(const char *text, char *target)
 {
-    const std::size_t length = std::strcspn(text, "\"");
-    const std::size_t copied = length < SOAP_TEXT_SIZE ? length : SOAP_TEXT_SIZE - 1;
-    std::memcpy(target, text, copied);
-    target[copied] = '\0';
-    return text + length + (text[length] == '"');
+    std::size_t length = 0;
+    for (; *text != '\0' && *text != '"'; ++text) {
+        if (*text == '\\' && (text[1] == '"' || text[1] == '\\'))
+            ++text;
+        if (length < SOAP_TEXT_SIZE - 1)
+            target[length++] = *text;
+    }
+    target[length] = '\0';
+    return text + (*text == '"');
 }
 
 const char *copy_value(const char *text, char *target)

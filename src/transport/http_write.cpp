@@ -51,6 +51,15 @@ struct bounded_text {
         length += part_length;
         text[length] = '\0';
     }
+    // For a place between double quotes.
+    void put_quoted(const char *part)
+    {
+        for (; *part != '\0'; ++part) {
+            if (*part == '"' || *part == '\\')
+                put("\\", 1);
+            put(part, 1);
+        }
+    }
 };
 
 int line(soap *ctx, const char *key, const char *value)
@@ -101,12 +110,12 @@ const char *plain_type(const soap *ctx, int status, std::uint64_t count)
 void put_multipart_type(const soap *ctx, const char *type, const char *start_info, bounded_text &out)
 {
     out.put("multipart/related; charset=utf-8; boundary=\"");
-    out.put(ctx->mime.boundary);
+    out.put_quoted(ctx->mime.boundary);
     out.put("\"; type=\"");
     out.put(type, std::strcspn(type, ";"));
     if (ctx->mime.start != nullptr) {
         out.put("\"; start=\"");
-        out.put(ctx->mime.start);
+        out.put_quoted(ctx->mime.start);
     }
     out.put("\"");
     if (start_info != nullptr) {

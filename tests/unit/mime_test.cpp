@@ -1,5 +1,5 @@
 // MIME and MTOM messages on the wire and back: delimiters at every place, heads, lazy reading, references.
-#include "support/attachment_exchange.h"
+#include "support/attachment_checks.h"
 
 #include <chrono>
 #include <set>
@@ -8,7 +8,7 @@
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_tcp.h>
 
-#include "support/failing_malloc.h"
+#include "support/host_streams.h"
 
 using namespace attachment_exchange;
 
@@ -16,12 +16,6 @@ namespace {
 
 constexpr std::uint32_t SENDING = MODE_BUFFERED | MODE_BARE_XML;
 constexpr std::uint32_t MTOM = MODE_MTOM | MODE_MIME;
-
-std::string envelope(const std::string &body)
-{
-    return "<SOAP-ENV:Envelope xmlns:SOAP-ENV=\"http://schemas.xmlsoap.org/soap/envelope/\"><SOAP-ENV:Body>" +
-           body + "</SOAP-ENV:Body></SOAP-ENV:Envelope>\r\n";
-}
 
 std::string part(const std::string &fields, const std::string &content)
 {
@@ -87,6 +81,30 @@ TEST(mime_out, mtom_puts_an_include_in_the_element_and_brackets_around_the_id)
     EXPECT_EQ(plain.sent().find("--"), std::string::npos);
 }
 
+TEST(mime_out, an_include_has_its_namespace_whatever_the_rules_of_prefixes)
+{
+    const std::string bytes = "x";
+    struct form {
+        std::uint32_t mode;
+        const char *include;
+    };
+    const form forms[] = {
+        {MODE_CANONICAL, "<data><xop:Include xmlns:xop=\"http://www.w3.org/2004/08/xop/include\" "
+                         "href=\"cid:i\"></xop:Include></data>"},
+        {MODE_DEFAULT_NAMESPACE,
+         "<data><Include xmlns=\"http://www.w3.org/2004/08/xop/include\" href=\"cid:i\"/></data>"},
+    };
+    for (const form &f : forms) {
+        memory_wire wire(0, SENDING | MTOM | f.mode);
+        const value v = make_value(bytes, "cid:i", "a/b");
+        ASSERT_EQ(send(wire, {v, v}), 0);
+        const std::size_t first = wire.sent().find(f.include);
+        ASSERT_NE(first, std::string::npos) << wire.sent();
+        EXPECT_NE(wire.sent().find(f.include, first + 1), std::string::npos) << wire.sent();
+        EXPECT_EQ(reception(wire.sent(), MODE_MTOM).summary(), "[cid:i a/b x][cid:i a/b x]");
+    }
+}
+
 TEST(mime_out, an_include_asked_for_by_name_takes_the_reference_itself)
 {
     const std::string bytes = "x";
@@ -134,49 +152,27 @@ TEST(mime_out, draws_boundaries_that_differ)
     }
 }
 
-struct stream {
-    std::string data;
-    std::size_t at = 0;
-    int closed = 0;
-};
-
 TEST(mime_stream, goes_out_and_comes_in_piece_by_piece)
 {
     for (const bool known : {true, false}) {
-        stream source = {std::string(5000, 's')};
+        host_stream source = {std::string(5000, 's')};
+        stream_host sender, receiver;
         memory_wire wire(0, MODE_STORE | MODE_BARE_XML);
+        sender.serve(wire);
         soap_mime_start(&wire, "bb", nullptr);
-        wire.mime_read_open = [](soap *, void *handle, const char *, const char *, const char *) {
-            return handle;
-        };
-        wire.mime_read = [](soap *, void *handle, char *buffer, std::size_t length) {
-            auto &from = *static_cast<stream *>(handle);
-            const std::size_t size = std::min({length, std::size_t{777}, from.data.size() - from.at});
-            std::memcpy(buffer, from.data.data() + from.at, size);
-            from.at += size;
-            return size;
-        };
-        wire.mime_read_close = [](soap *, void *handle) { static_cast<stream *>(handle)->closed++; };
         soap_mime_attach(&wire, reinterpret_cast<char *>(&source), known ? 5000 : 0, MIME_BINARY, "a/b",
                          "<s>", nullptr, nullptr);
         ASSERT_EQ(send(wire, {}), 0);
         EXPECT_EQ(source.closed, 1);
 
-        static stream target;
-        target = {};
         reception read(wire.sent());
-        read.wire->mime_write_open = [](soap *, void *, const char *, const char *, const char *,
-                                        int) -> void * { return &target; };
-        read.wire->mime_write = [](soap *, void *handle, const char *data, std::size_t length) {
-            static_cast<stream *>(handle)->data.append(data, length);
-            return 0;
-        };
-        read.wire->mime_write_close = [](soap *, void *handle) { static_cast<stream *>(handle)->closed++; };
+        receiver.serve(*read.wire);
         EXPECT_EQ(read.run(), 0);
+        const host_stream &target = receiver.taken.at("<s>");
         EXPECT_EQ(target.data, source.data);
         EXPECT_EQ(target.closed, 1);
         const soap_attachment *last = read.wire->mime.last;
-        EXPECT_EQ(static_cast<void *>(last->content), &target);
+        EXPECT_EQ(static_cast<const void *>(last->content), &target);
         EXPECT_EQ(last->size, 5000U);
         EXPECT_EQ(last->encoding, MIME_BINARY);
     }
@@ -268,6 +264,7 @@ TEST(mime_in, reports_what_is_wrong_with_a_message)
         {"blanks behind the boundary", "\r\n--bb \t\r\nContent-ID: <a>\r\n\r\nx\r\n--bb--", 0},
         {"epilogue", a + END + "\r\nepilogue", 0},
         {"something behind the boundary", "\r\n--bbb\r\n\r\nx" + a + END, SOAP_MIME_ERROR},
+        {"two of one id", a + a + END, SOAP_MIME_ERROR},
         {"one dash", a + "\r\n--bb-\r\n", SOAP_MIME_ERROR},
         {"no end", a, SOAP_EOF},
         {"a line of a head too long", part("Content-ID: " + std::string(2000, 'i') + "\r\n", "x") + END,
@@ -358,21 +355,10 @@ TEST(mime_in, survives_any_change_of_a_byte)
 
 TEST(mime_in, survives_every_refused_allocation)
 {
-    std::string message = root("<data href=\"cid:a\"/>");
-    message +=
+    expect_survival_of_every_refused_allocation(
+        root("<data href=\"cid:a\"/>") +
         part("Content-ID: <a>\r\nContent-Type: t\r\nContent-Description: d\r\n", std::string(5000, 'x')) +
-        part("Content-Disposition: x; name=b\r\nContent-Location: l\r\n", "") + END;
-    int result = -2;
-    std::unique_ptr<reception> read;
-    const auto fresh = [&] { read = std::make_unique<reception>(message); };
-    fresh();
-    const std::size_t refusals = failing_malloc::at_each_allocation(
-        failing_malloc::refuse::one, [&] { result = read->run(); },
-        [&](bool refused) {
-            EXPECT_EQ(result, refused ? SOAP_OUT_OF_MEMORY : 0);
-            fresh();
-        });
-    EXPECT_GT(refusals, 10U);
+        part("Content-Disposition: x; name=b\r\nContent-Location: l\r\n", "") + END);
 }
 
 // --- references ---
@@ -464,8 +450,11 @@ TEST(references, take_no_attachment_larger_than_a_value_can_hold)
     std::strcpy(wire.element_href, "cid:a");
     ASSERT_EQ(soap_attachment_ref_in(&wire, &v.content, &v.size, &v.id, &v.type, &v.options), 0);
     soap_attachment huge = {};
-    huge.id = "a";
     huge.size = std::size_t{1} << 31;
+    huge.id = "other";
+    soap_attachment_bind(&wire, &huge);
+    EXPECT_EQ(wire.error, 0); // nobody waits for it
+    huge.id = "a";
     soap_attachment_bind(&wire, &huge);
     EXPECT_EQ(wire.error, SOAP_LENGTH);
     EXPECT_EQ(v.size, 0);
@@ -483,20 +472,9 @@ TEST(http_exchange, carries_attachments_in_every_framing)
                 if (deflate != 0 && framing == MODE_BUFFERED)
                     continue; // its length can't be told ahead
                 memory_wire wire(0, mode);
-                wire.on_open = [](soap *, const char *, const char *, int) { return -1; };
                 const std::deque<value> values = {make_value(bytes, "cid:i", "a/b"),
                                                   make_value(more, nullptr, "c/d")};
-                wire.encoding_style = nullptr;
-                soap_reset_call(&wire);
-                wire.mode |= MODE_DIME;
-                ASSERT_EQ(soap_count_begin(&wire), 0);
-                if ((wire.mode & MODE_COUNTING) != 0) {
-                    ASSERT_EQ(write_message(&wire, values), 0);
-                }
-                ASSERT_EQ(soap_count_end(&wire), 0);
-                ASSERT_EQ(soap_server_connect(&wire, "http://host/path", ""), 0);
-                ASSERT_EQ(write_message(&wire, values), 0);
-                ASSERT_EQ(soap_send_finish(&wire), 0);
+                ASSERT_EQ(send_request(wire, values), 0);
                 const std::string sent = wire.sent();
                 const std::size_t at = sent.find("Content-Length: ");
                 EXPECT_EQ(at == std::string::npos, framing == MODE_CHUNKED) << mode;
@@ -514,14 +492,7 @@ TEST(http_exchange, carries_attachments_in_every_framing)
 
 TEST(mime, carries_megabytes_unchanged)
 {
-    std::string bytes(3000000, '\0');
-    for (std::size_t i = 0; i < bytes.size(); ++i)
-        bytes[i] = "\r\n-=x"[i * 2654435761U >> 13 & 3];
-    memory_wire wire(0, SENDING | MTOM);
-    ASSERT_EQ(send(wire, {make_value(bytes, "cid:big", "a/b")}), 0);
-    reception read(wire.sent(), MODE_MTOM, 1000, 50000);
-    ASSERT_EQ(read.run(), 0);
-    EXPECT_TRUE(read.values[0].bytes() == bytes);
+    expect_megabytes_unchanged(SENDING | MTOM, MODE_MTOM);
 }
 
 } // namespace

@@ -1,0 +1,69 @@
+// attachment_checks.h - what holds of every message with attachments, however it is framed.
+#pragma once
+
+#include <gtest/gtest.h>
+
+#include "support/attachment_exchange.h"
+#include "support/failing_malloc.h"
+
+namespace attachment_exchange {
+
+inline void expect_same_at_every_split(const std::string &bytes, const std::string &expected,
+                                       std::uint32_t mode = 0)
+{
+    EXPECT_EQ(reception(bytes, mode).summary(), expected);
+    for (std::size_t split = 1; split < bytes.size(); ++split)
+        ASSERT_EQ(reception(bytes, mode, split).summary(), expected) << "split at " << split;
+    EXPECT_EQ(reception(bytes, mode, 1, 1).summary(), expected) << "byte by byte";
+}
+
+inline void expect_error_at_every_cut(const std::string &bytes, std::uint32_t mode = 0)
+{
+    for (std::size_t length = 0; length < bytes.size(); ++length)
+        ASSERT_EQ(reception(bytes.substr(0, length), mode).summary().substr(0, 1), "!")
+            << "cut at " << length;
+}
+
+// Any byte may become any other: the outcome is free, its kind is not.
+inline void expect_survival_of_every_change(const std::string &bytes, std::uint32_t mode = 0)
+{
+    for (std::size_t at = 0; at < bytes.size(); ++at) {
+        for (const int byte : {0x00, 0x01, 0x0D, 0x2D, 0x7F, 0x80, 0xFF, bytes[at] ^ 1, bytes[at] ^ 0x20}) {
+            std::string changed = bytes;
+            changed[at] = static_cast<char>(byte);
+            reception read(changed, mode);
+            EXPECT_EQ(read.run(), read.wire->error);
+        }
+    }
+}
+
+// Each allocation of a good message may fail.
+inline void expect_survival_of_every_refused_allocation(const std::string &bytes)
+{
+    int result = -2;
+    std::unique_ptr<reception> read;
+    const auto fresh = [&] { read = std::make_unique<reception>(bytes); };
+    fresh();
+    const std::size_t refusals = failing_malloc::at_each_allocation(
+        failing_malloc::refuse::one, [&] { result = read->run(); },
+        [&](bool refused) {
+            EXPECT_EQ(result, refused ? SOAP_OUT_OF_MEMORY : 0);
+            fresh();
+        });
+    EXPECT_GT(refusals, 10U);
+}
+
+// Megabytes that look like delimiters go out and come back.
+inline void expect_megabytes_unchanged(std::uint32_t output_mode, std::uint32_t input_mode)
+{
+    std::string bytes(3000000, '\0');
+    for (std::size_t i = 0; i < bytes.size(); ++i)
+        bytes[i] = "\r\n-=x\0\xFFy"[i * 2654435761U >> 13 & 7];
+    memory_wire wire(0, output_mode);
+    ASSERT_EQ(send(wire, {make_value(bytes, "cid:big", "a/b")}), 0);
+    reception read(wire.sent(), input_mode, 1000, 50000);
+    ASSERT_EQ(read.run(), 0);
+    EXPECT_TRUE(read.values[0].bytes() == bytes);
+}
+
+} // namespace attachment_exchange

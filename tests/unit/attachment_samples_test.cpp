@@ -1,0 +1,190 @@
+// The samples of tests/samples: read, cut, changed, and taken apart and put together again in ways that lie.
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <utility>
+
+#include "support/annotated_bytes.h"
+#include "support/attachment_checks.h"
+#include "support/dime_bytes.h"
+#include "support/host_streams.h"
+
+using namespace attachment_exchange;
+
+namespace {
+
+std::string sample(const std::string &name)
+{
+    std::ifstream file(std::string(ZUV_SAMPLE_DIR) + "/" + name, std::ios::binary);
+    EXPECT_TRUE(file.good()) << name;
+    const std::string bytes((std::istreambuf_iterator<char>(file)), {});
+    return name.starts_with("dime/") ? annotated_bytes(bytes) : bytes;
+}
+
+struct sample_case {
+    const char *name;
+    const char *summary;
+    const char *end; // the message ends with this text; anything behind it is nobody's
+};
+
+// What is announced as encoded is handed out as it came: its receiver knows the encoding from the record.
+const sample_case SAMPLES[] = {
+    {"dime/two_attachments.txt", "[cid:a image/png pixels][b text/plain text]", ""},
+    {"dime/chunks.txt", "[cid:big application/octet-stream one two]", ""},
+    {"mime/message_between_its_parts.eml",
+     "[cid:ahead text/plain; charset=utf-8 ahead of the message][cid:a%20b image/png; name=\"x.png\" pixels]",
+     "?d==--"},
+    {"mime/include.eml", "[cid:a%40b a/b beside][(null) (null) in place]", "--bb--"},
+    {"mime/line_feeds_in_heads.eml", "[cid:a a/b; c=d line one\nline two]", "--bb--"},
+    {"mime/encoded.eml", "[cid:b64 (null) cGl4ZWxz][cid:qp (null) caf=C3=A9]", "--bb--"},
+};
+
+TEST(samples, are_all_of_those_in_the_directory)
+{
+    std::size_t files = 0;
+    for (const char *form : {"/dime", "/mime"})
+        files += static_cast<std::size_t>(
+            std::distance(std::filesystem::directory_iterator(std::string(ZUV_SAMPLE_DIR) + form), {}));
+    EXPECT_EQ(files, std::size(SAMPLES));
+}
+
+TEST(samples, are_understood_however_they_arrive_and_wherever_they_are_cut)
+{
+    for (const sample_case &c : SAMPLES) {
+        SCOPED_TRACE(c.name);
+        const std::string bytes = sample(c.name);
+        expect_same_at_every_split(bytes, c.summary);
+        const std::size_t end = *c.end == '\0' ? bytes.size() : bytes.rfind(c.end) + std::strlen(c.end);
+        expect_error_at_every_cut(bytes.substr(0, end - 1));
+        expect_survival_of_every_change(bytes);
+    }
+}
+
+TEST(samples, are_the_same_through_the_callbacks)
+{
+    for (const sample_case &c : SAMPLES) {
+        SCOPED_TRACE(c.name);
+        reception in_memory(sample(c.name)), streamed(sample(c.name), 0, 3, 7);
+        stream_host host;
+        host.serve(*streamed.wire);
+        ASSERT_EQ(in_memory.run(), 0);
+        ASSERT_EQ(streamed.run(), 0);
+        for (std::size_t i = 0; i < in_memory.values.size(); ++i) {
+            const value &v = streamed.values[i];
+            if (v.id != nullptr) {
+                EXPECT_EQ(reinterpret_cast<host_stream *>(v.content)->data, in_memory.values[i].bytes());
+            }
+        }
+    }
+}
+
+// ---------------------------------------------------------------------------------------------
+// Messages put together wrongly.
+
+// Pieces of a message in an order that is right, and everything that is wrong with some of them left out,
+// doubled or exchanged. The outcome is the message itself, or a way to say no.
+void expect_no_wrong_reading(const std::string &head, const std::vector<std::string> &pieces,
+                             const std::string &expected)
+{
+    const auto judge = [&](const std::vector<std::string> &changed, const std::string &what) {
+        std::string bytes = head;
+        for (const std::string &piece : changed)
+            bytes += piece;
+        const std::string summary = reception(bytes).summary();
+        EXPECT_TRUE(summary == expected || summary.starts_with("!")) << what << " gives " << summary;
+        return summary;
+    };
+    ASSERT_EQ(judge(pieces, "nothing"), expected);
+    for (std::size_t i = 0; i < pieces.size(); ++i) {
+        const auto at = static_cast<std::ptrdiff_t>(i);
+        std::vector<std::string> changed = pieces;
+        changed.erase(changed.begin() + at);
+        EXPECT_NE(judge(changed, "without piece " + std::to_string(i)), expected);
+        changed = pieces;
+        changed.insert(changed.begin() + at, pieces[i]);
+        if (i + 1 < pieces.size()) { // behind its end a message has nothing to say
+            EXPECT_NE(judge(changed, "with piece " + std::to_string(i) + " twice"), expected);
+        }
+        for (std::size_t j = i + 1; j < pieces.size(); ++j) {
+            changed = pieces;
+            std::swap(changed[i], changed[j]);
+            judge(changed, "with " + std::to_string(i) + " and " + std::to_string(j) + " exchanged");
+        }
+    }
+}
+
+const std::string THREE_VALUES = "<data href=\"cid:a\"/><data href=\"cid:b\"/><data href=\"cid:c\"/>";
+
+std::vector<std::string> dime_pieces()
+{
+    using namespace dime_bytes;
+    const std::string xml = envelope(THREE_VALUES);
+    return {record(MB | CF, URI, "", ENVELOPE_URI, xml.substr(0, 100)),
+            record(CF, UNCHANGED, "", "", xml.substr(100, 61)),
+            record(0, UNCHANGED, "", "", xml.substr(161)),
+            record(CF, MEDIA, "a", "t", "aaaa"),
+            record(CF, UNCHANGED, "", "", "AAAA"),
+            record(0, UNCHANGED, "", "", "AA"),
+            record(0, MEDIA, "b", "t", "bbbb"),
+            record(ME, MEDIA, "c", "t", "cccccc")};
+}
+
+// A middle chunk left out or doubled is a shorter or longer record that nothing in DIME tells from a right
+// one; so only the ends of records are exchanged here.
+TEST(wrong_messages, of_dime_records_are_refused)
+{
+    std::vector<std::string> pieces = dime_pieces();
+    pieces.erase(pieces.begin() + 4);
+    pieces[0] += pieces[1];
+    pieces.erase(pieces.begin() + 1);
+    expect_no_wrong_reading("", pieces, "[cid:a t aaaaAA][cid:b t bbbb][cid:c t cccccc]");
+}
+
+TEST(wrong_messages, of_mime_parts_are_refused)
+{
+    const std::string start = "\r\nContent-ID: <";
+    expect_no_wrong_reading(
+        "HTTP/1.1 200 OK\r\nContent-Type: multipart/related; boundary=bb; start=\"<m>\"\r\n\r\n",
+        {"--bb" + start + "a>\r\n\r\naaaa\r\n",
+         "--bb" + start + "m>\r\n\r\n" + envelope(THREE_VALUES) + "\r\n",
+         "--bb" + start + "b>\r\n\r\nbbbb\r\n", "--bb" + start + "c>\r\n\r\ncccc\r\n", "--bb--"},
+        "[cid:a (null) aaaa][cid:b (null) bbbb][cid:c (null) cccc]");
+}
+
+// Each length of each record tells something else than what is there.
+TEST(wrong_messages, of_records_with_false_lengths_are_refused)
+{
+    const std::vector<std::string> pieces = dime_pieces();
+    const auto joined = [&pieces](std::size_t changed, const std::string &piece) {
+        std::string bytes;
+        for (std::size_t i = 0; i < pieces.size(); ++i)
+            bytes += i == changed ? piece : pieces[i];
+        return bytes;
+    };
+    struct field {
+        std::size_t at;
+        int bytes;
+    };
+    for (std::size_t i = 0; i < pieces.size(); ++i) {
+        for (const field &f : {field{2, 2}, field{4, 2}, field{6, 2}, field{8, 4}}) {
+            std::uint32_t right = 0;
+            for (int k = 0; k < f.bytes; ++k)
+                right =
+                    right << 8 | static_cast<unsigned char>(pieces[i][f.at + static_cast<std::size_t>(k)]);
+            const std::uint32_t most = f.bytes == 2 ? 0xFFFF : 0xFFFFFFFF;
+            for (const std::uint32_t lie : {right - 1, right + 4, right + 8, most, most - 3}) {
+                if ((lie & most) == right || (right == 0 && lie == right - 1 && f.bytes == 4))
+                    continue;
+                if (f.at == 6 && lie + 1 == right)
+                    continue; // a type one shorter, followed by what nobody checks
+                std::string piece = pieces[i];
+                piece.replace(f.at, static_cast<std::size_t>(f.bytes),
+                              dime_bytes::number(lie & most, f.bytes));
+                EXPECT_EQ(reception(joined(i, piece)).summary().substr(0, 1), "!")
+                    << "record " << i << ", field at " << f.at << ": " << lie << " for " << right;
+            }
+        }
+    }
+}
+
+} // namespace
