@@ -66,12 +66,16 @@ std::size_t field_length(const char *text)
     return length < FIELD_MAX ? length : FIELD_MAX;
 }
 
+// A value read from a MIME part has the part's description in place of options. It is no options block, so
+// what stands where the length would be isn't believed beyond the end of the text.
 std::size_t options_length(const char *options)
 {
     if (options == nullptr)
         return 0;
-    const std::size_t length = number(options + 2, 2) + OPTIONS_HEADER;
-    return length < FIELD_MAX ? length : FIELD_MAX;
+    std::size_t length = number(options + 2, 2);
+    if (length > FIELD_MAX - OPTIONS_HEADER)
+        length = FIELD_MAX - OPTIONS_HEADER;
+    return strnlen(options + OPTIONS_HEADER, length) == length ? OPTIONS_HEADER + length : 0;
 }
 
 // --- out ---
@@ -215,10 +219,11 @@ int read_field(soap *ctx, std::size_t length, char *&field)
     return field == nullptr ? ctx->error : SOAP_OK;
 }
 
-// The length in the options counts when they are sent on, so it must not exceed what came.
+// The length in the options must not exceed what came.
 int check_options(soap *ctx, std::size_t length)
 {
-    if (length == 0 || (length >= OPTIONS_HEADER && options_length(ctx->dime.options) <= length))
+    if (length == 0 ||
+        (length >= OPTIONS_HEADER && OPTIONS_HEADER + number(ctx->dime.options + 2, 2) <= length))
         return SOAP_OK;
     return ctx->error = SOAP_DIME_ERROR;
 }

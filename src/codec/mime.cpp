@@ -30,6 +30,7 @@ namespace {
 
 constexpr std::size_t BOUNDARY_MAX = 1020;   // characters that are compared
 constexpr std::size_t BOUNDARY_RANDOM = 32;  // characters of six random bits each
+constexpr std::size_t DIME_OPTIONS_MIN = 5;  // bytes of the smallest options block
 constexpr unsigned FIELDS_MAX = 1024;        // fields of one part head
 constexpr char BOUNDARY_PREFIX[] = "=_zuv_"; // "=_" can't come out of base64 or quoted-printable
 constexpr const char *ROOT_ID = "<message@zuv_client_pro>";
@@ -180,6 +181,20 @@ int store_copy(soap *ctx, const char *text, const char *&field)
     return text != nullptr && field == nullptr ? ctx->error : SOAP_OK;
 }
 
+// A value that the part answers takes the description in place of DIME options, of which every reader may
+// look at the first bytes.
+int store_description(soap *ctx, const char *text, const char *&field)
+{
+    const std::size_t length = std::strlen(text);
+    auto *const copy = static_cast<char *>(soap_block_alloc(ctx, length + DIME_OPTIONS_MIN));
+    if (copy == nullptr)
+        return ctx->error;
+    std::memcpy(copy, text, length);
+    std::memset(copy + length, 0, DIME_OPTIONS_MIN);
+    field = copy;
+    return SOAP_OK;
+}
+
 int take_field(soap *ctx, soap_attachment *part, const char *name, const char *value)
 {
     if (soap_tag_match(name, "Content-ID") == 0)
@@ -189,7 +204,7 @@ int take_field(soap *ctx, soap_attachment *part, const char *name, const char *v
     if (soap_tag_match(name, "Content-Type") == 0)
         return store_copy(ctx, value, part->type);
     if (soap_tag_match(name, "Content-Description") == 0)
-        return store_copy(ctx, value, part->description);
+        return store_description(ctx, value, part->description);
     if (soap_tag_match(name, "Content-Disposition") == 0 && part->id == nullptr)
         return store_copy(ctx, soap_attr_value(ctx, value, "name"), part->id);
     if (soap_tag_match(name, "Content-Transfer-Encoding") == 0)

@@ -3,8 +3,9 @@
 
 #include <algorithm>
 #include <cstring>
-#include <map>
+#include <deque>
 #include <string>
+#include <utility>
 
 #include <zuv_client_pro/soap.h>
 
@@ -19,8 +20,8 @@ struct host_stream {
 // Gives streams, and takes attachments into streams by their ids; ids with "memory" in them are left to the
 // library. Must outlive the context's use of it.
 struct stream_host {
-    std::map<std::string, host_stream> taken;
-    int refusal = 0; // result of the write callback
+    std::deque<std::pair<std::string, host_stream>> taken; // with their ids
+    int refusal = 0;                                       // result of the write callback
 
     void serve(soap &ctx)
     {
@@ -35,6 +36,23 @@ struct stream_host {
         };
         ctx.dime_write = ctx.mime_write = write;
         ctx.dime_write_close = ctx.mime_write_close = close;
+    }
+
+    // The newest stream of an id; std::out_of_range if there is none.
+    const host_stream &of(const std::string &id) const
+    {
+        const auto found =
+            std::find_if(taken.rbegin(), taken.rend(), [&](const auto &entry) { return entry.first == id; });
+        return found != taken.rend() ? found->second : taken.at(taken.size()).second;
+    }
+
+    // The stream whose handle this is, or null.
+    const host_stream *find(const void *handle) const
+    {
+        for (const auto &entry : taken)
+            if (&entry.second == handle)
+                return &entry.second;
+        return nullptr;
     }
 
 private:
@@ -57,7 +75,8 @@ private:
     static void *take(soap *ctx, const char *id)
     {
         auto &taken = static_cast<stream_host *>(ctx->user)->taken;
-        return is_for_memory(id) ? nullptr : &(taken[id == nullptr ? "" : id] = {});
+        return is_for_memory(id) ? nullptr
+                                 : &taken.emplace_back(id == nullptr ? "" : id, host_stream{}).second;
     }
     static int write(soap *ctx, void *handle, const char *data, std::size_t length)
     {

@@ -144,9 +144,9 @@ TEST(dime_stream, takes_received_data_over_all_chunks)
     reception read(message, 0, 7, 5);
     host.serve(*read.wire);
     EXPECT_EQ(read.run(), 0);
-    EXPECT_EQ(host.taken.at("a").data, "onetwo");
-    EXPECT_EQ(host.taken.at("a").closed, 1);
-    EXPECT_EQ(static_cast<void *>(read.values[0].content), &host.taken.at("a"));
+    EXPECT_EQ(host.of("a").data, "onetwo");
+    EXPECT_EQ(host.of("a").closed, 1);
+    EXPECT_EQ(static_cast<const void *>(read.values[0].content), &host.of("a"));
     EXPECT_EQ(read.values[0].size, 6);
     EXPECT_STREQ(read.wire->dime.list->next->content, "m");
 
@@ -154,7 +154,7 @@ TEST(dime_stream, takes_received_data_over_all_chunks)
     host.refusal = 55;
     host.serve(*failing.wire);
     EXPECT_EQ(failing.run(), 55);
-    EXPECT_EQ(host.taken.at("a").closed, 1);
+    EXPECT_EQ(host.of("a").closed, 1);
 }
 
 // What no header can tell goes out in chunks that one can. The data is a stream of zeros, and what leaves is

@@ -168,7 +168,7 @@ TEST(mime_stream, goes_out_and_comes_in_piece_by_piece)
         reception read(wire.sent());
         receiver.serve(*read.wire);
         EXPECT_EQ(read.run(), 0);
-        const host_stream &target = receiver.taken.at("<s>");
+        const host_stream &target = receiver.of("<s>");
         EXPECT_EQ(target.data, source.data);
         EXPECT_EQ(target.closed, 1);
         const soap_attachment *last = read.wire->mime.last;
@@ -329,6 +329,61 @@ TEST(mime_in, gives_the_parts_one_by_one_when_asked_to)
     EXPECT_EQ(cut.wire->error, SOAP_EOF);
 }
 
+// The parts of a compressed message come out of the stream as they are asked for, whatever carries it, and
+// the context serves another message afterwards, also if parts were left unread.
+TEST(mime_in, gives_the_parts_of_a_compressed_message_one_by_one)
+{
+    const std::string one(70000, 'o'), two = "two";
+    const std::deque<value> values = {make_value(one, "cid:one", "a/b"), make_value(two, "cid:two", "c/d")};
+    for (const std::uint32_t framing : {MODE_STORE, MODE_CHUNKED}) {
+        for (const int format : {1, 2}) { // deflate, gzip
+            for (const std::size_t piece : {100U, 65536U}) {
+                memory_wire sender(0, MTOM | MODE_DEFLATE | framing);
+                sender.zlib_out = static_cast<std::int16_t>(format);
+                ASSERT_EQ(send_request(sender, values), 0);
+                EXPECT_LT(sender.sent().size(), one.size());
+                const std::string plain_next =
+                    root("<data href=\"cid:n\"/>") + part("Content-ID: <n>\r\n", "next") + END;
+                for (const int taken : {2, 1, 0}) {
+                    SCOPED_TRACE(taken);
+                    reception read(sender.sent(), MODE_MIME_AFTER | MODE_MTOM, piece, piece);
+                    soap *const ctx = read.wire.get();
+                    ASSERT_EQ(read.run(), 0);
+                    EXPECT_EQ(soap_socket_release(ctx), 0);
+                    for (int i = 0; i < taken; ++i) {
+                        const soap_attachment *p = soap_mime_next_part(ctx);
+                        ASSERT_NE(p, nullptr);
+                        EXPECT_EQ(p->size, i == 0 ? one.size() : two.size());
+                        EXPECT_EQ(read.values[static_cast<std::size_t>(i)].bytes(), i == 0 ? one : two);
+                    }
+                    if (taken == 2) {
+                        EXPECT_EQ(soap_mime_next_part(ctx), nullptr);
+                        EXPECT_EQ(ctx->error, 0);
+                        EXPECT_FALSE(ctx->response_unfinished);
+                        EXPECT_EQ(ctx->zlib_state, 0);
+                    } else {
+                        EXPECT_TRUE(ctx->response_unfinished); // no other call may use the connection
+                    }
+                    ctx->keep_alive = 0;
+                    ctx->input_mode = 0;
+                    read.wire->receive(plain_next);
+                    read.wire->piece = nullptr;
+                    read.values.clear();
+                    EXPECT_EQ(read.summary(), "[cid:n (null) next]");
+                }
+                std::string cut = sender.sent();
+                cut.resize(cut.size() - 20);
+                reception read(cut, MODE_MIME_AFTER | MODE_MTOM, piece, piece);
+                if (read.run() == 0) {
+                    while (soap_mime_next_part(read.wire.get()) != nullptr) {
+                    }
+                }
+                EXPECT_NE(read.wire->error, 0);
+            }
+        }
+    }
+}
+
 TEST(mime_in, takes_a_byte_that_the_reader_gave_back_into_account)
 {
     for (const char byte : {'\r', 'x'}) {
@@ -458,6 +513,20 @@ TEST(references, take_no_attachment_larger_than_a_value_can_hold)
     soap_attachment_bind(&wire, &huge);
     EXPECT_EQ(wire.error, SOAP_LENGTH);
     EXPECT_EQ(v.size, 0);
+}
+
+// What came with a part's description in place of options is no DIME options block.
+TEST(references, answered_by_a_part_go_out_in_a_record)
+{
+    for (const char *description : {"", "d", "longer than it says"}) {
+        reception read(
+            root("<data href=\"cid:a\"/>") +
+            part("Content-ID: <a>\r\nContent-Description: " + std::string(description) + "\r\n", "A") + END);
+        ASSERT_EQ(read.run(), 0);
+        memory_wire wire(0, SENDING);
+        ASSERT_EQ(send(wire, read.values), 0);
+        EXPECT_EQ(reception(wire.sent()).summary(), "[cid:a (null) A]");
+    }
 }
 
 // A whole HTTP request in each framing, read as its receiver would.

@@ -1,0 +1,93 @@
+// attachment_fuzz.h - what the readers of DIME and MIME are held against for any bytes.
+#pragma once
+
+#include <cstdio>
+#include <cstdlib>
+#include <string>
+
+#include "support/attachment_exchange.h"
+#include "support/host_streams.h"
+
+namespace attachment_exchange {
+
+// What one way of reading made of a message: the outcome, and ids and bytes of all attachments.
+struct reading {
+    int error = 0;
+    std::string attachments;
+
+    bool operator==(const reading &) const = default;
+};
+
+inline reading read_in_memory(const std::string &bytes, std::size_t piece)
+{
+    reception read(bytes, 0, piece, piece);
+    reading result = {read.run(), {}};
+    const soap *const ctx = read.wire.get();
+    for (const soap_attachment *list : {ctx->dime.list, ctx->mime.list})
+        for (const soap_attachment *a = list; a != nullptr; a = a->next)
+            if (a != ctx->mime.root && a->content != nullptr)
+                result.attachments += text(a->id) + "=" + std::string(a->content, a->size) + ";";
+    return result;
+}
+
+inline reading read_through_callbacks(const std::string &bytes)
+{
+    reception read(bytes, 0, 1000, 1000);
+    stream_host host;
+    host.serve(*read.wire);
+    reading result = {read.run(), {}};
+    const soap *const ctx = read.wire.get();
+    for (const soap_attachment *list : {ctx->dime.list, ctx->mime.list})
+        for (const soap_attachment *a = list; a != nullptr; a = a->next) {
+            if (a == ctx->mime.root || a->content == nullptr)
+                continue;
+            const auto *const stream = host.find(a->content);
+            result.attachments += text(a->id) + "=" +
+                                  (stream == nullptr ? std::string(a->content, a->size) : stream->data) + ";";
+        }
+    return result;
+}
+
+// Reads part by part. The last thing that went wrong counts.
+inline reading read_lazily(const std::string &bytes)
+{
+    reception read(bytes, MODE_MIME_AFTER);
+    reading result = {read.run(), {}};
+    soap *const ctx = read.wire.get();
+    while (ctx->error == 0 && soap_mime_next_part(ctx) != nullptr) {
+    }
+    result.error = ctx->error;
+    return result;
+}
+
+inline void demand(bool holds, const char *what)
+{
+    if (holds)
+        return;
+    std::fprintf(stderr, "%s\n", what);
+    std::abort();
+}
+
+// Memory, streams, lazy parts and any size of pieces give the same outcome; what was read goes out again and
+// comes back.
+inline void check_any_bytes(const std::string &bytes)
+{
+    const reading whole = read_in_memory(bytes, SOAP_BUFFER_SIZE);
+    demand(whole == read_in_memory(bytes, 1), "byte by byte is different");
+    demand(whole == read_in_memory(bytes, 1 + bytes.size() % 61), "in pieces is different");
+    const reading streamed = read_through_callbacks(bytes);
+    demand(whole.error == streamed.error, "the callbacks give another outcome");
+    demand(whole.error != 0 || whole.attachments == streamed.attachments, "the callbacks got other bytes");
+    read_lazily(bytes);
+    if (whole.error != 0)
+        return;
+    reception read(bytes);
+    read.run();
+    for (const std::uint32_t form : {std::uint32_t{0}, MODE_MTOM}) {
+        memory_wire wire(0, MODE_BUFFERED | MODE_BARE_XML | form);
+        const int sent = send(wire, read.values);
+        demand(sent != LENGTH_DIFFERS, "the length was counted wrongly");
+    }
+}
+
+} // namespace attachment_exchange
