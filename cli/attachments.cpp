@@ -50,11 +50,10 @@ std::string file_name(unsigned number, const char *id)
 
 } // namespace
 
-attachment_files::attachment_files(const std::vector<std::string> &specifications, bool dime,
-                                   std::string save_folder, bool quiet)
-    : dime_(dime), quiet_(quiet), folder_(std::move(save_folder))
+attachment_files::attachment_files(const message_options &options, bool quiet)
+    : options_(options), quiet_(quiet), folder_(options.save_folder)
 {
-    for (std::string specification : specifications) {
+    for (std::string specification : options.attach) {
         outgoing &one = out_.emplace_back();
         one.id = take_parameter(specification, "id");
         one.type = take_parameter(specification, "type");
@@ -74,7 +73,7 @@ attachment_files::attachment_files(const std::vector<std::string> &specification
         if (!one.file || error || !std::filesystem::is_regular_file(specification, error))
             throw failure(EXIT_FILE,
                           specification + ": can't be attached: " + (one.file ? "not a file" : reason()));
-        if (!dime_ && one.id.find_first_of("<>\r\n") == std::string::npos)
+        if (!options_.dime && one.id.find_first_of("<>\r\n") == std::string::npos)
             one.id = "<" + one.id + ">";
     }
     std::error_code error;
@@ -115,18 +114,19 @@ void attachment_files::prepare(soap *ctx)
 
 void attachment_files::attach(soap *ctx)
 {
-    if (out_.empty())
-        return;
-    if (dime_)
+    if (options_.dime)
         ctx->output_mode |= MODE_DIME;
-    else
+    else if (!out_.empty() || options_.mime || options_.mtom)
         soap_mime_start(ctx, nullptr, nullptr);
+    if (options_.mtom)
+        ctx->output_mode |= MODE_MTOM;
     for (outgoing &one : out_) {
         auto *const handle = reinterpret_cast<char *>(&one);
-        const int error = dime_ ? soap_dime_attach(ctx, handle, one.size, one.type.c_str(), one.id.c_str(),
-                                                   DIME_NO_OPTIONS, nullptr)
-                                : soap_mime_attach(ctx, handle, one.size, MIME_BINARY, one.type.c_str(),
-                                                   one.id.c_str(), nullptr, one.name.c_str());
+        const int error = options_.dime
+                              ? soap_dime_attach(ctx, handle, one.size, one.type.c_str(), one.id.c_str(),
+                                                 DIME_NO_OPTIONS, nullptr)
+                              : soap_mime_attach(ctx, handle, one.size, MIME_BINARY, one.type.c_str(),
+                                                 one.id.c_str(), nullptr, one.name.c_str());
         if (error != SOAP_OK)
             throw std::bad_alloc();
     }

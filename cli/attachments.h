@@ -9,6 +9,7 @@
 
 #include <zuv_client_pro/soap.h>
 
+#include "call_options.h"
 #include "progress.h"
 
 namespace cli {
@@ -22,15 +23,15 @@ using file_handle = std::unique_ptr<std::FILE, file_closer>;
 // it.
 class attachment_files {
 public:
-    // `specifications`: FILE[,type=TYPE][,id=ID]. An empty `save_folder` keeps nothing; otherwise it is made
-    // where needed. failure if a file can't be opened.
-    attachment_files(const std::vector<std::string> &specifications, bool dime, std::string save_folder,
-                     bool quiet);
+    // An empty `save_folder` keeps nothing; otherwise it is made where needed. failure if a file can't be
+    // opened.
+    attachment_files(const message_options &options, bool quiet);
     attachment_files(const attachment_files &) = delete;
     attachment_files &operator=(const attachment_files &) = delete;
 
     void prepare(soap *ctx);
-    // Hands the files to the next message. failure if the context has no memory for that.
+    // Gives the next message its form and hands it the files. std::bad_alloc if the context has no memory for
+    // that.
     void attach(soap *ctx);
 
     // What was saved since the last call of it, a line each; and what went wrong with a file here, empty for
@@ -60,7 +61,8 @@ private:
 
     std::list<outgoing> out_; // stable addresses: the engine holds them as handles
     std::list<incoming> in_;
-    bool dime_, quiet_;
+    const message_options &options_;
+    bool quiet_;
     std::string folder_, problem_;
     unsigned count_ = 0;
 };

@@ -78,8 +78,7 @@ public:
     caller(const operation &op, const call_options &options)
         : op_(op), options_(options), addresses_(addresses(options, port_of(op))),
           connection_(options.connection), header_(options.header),
-          files_(options.message.attach, options.message.dime, options.message.save_folder,
-                 options.connection.quiet),
+          files_(options.message, options.connection.quiet),
           request_(read_request_document(reader_, options.request_file, op)), context_(op.make_context())
     {
         connection_.prepare(context_.get());

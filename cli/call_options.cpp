@@ -102,7 +102,13 @@ void message_options::declare(CLI::App &app)
         ->take_all()
         ->type_name("FILE[,type=TYPE][,id=ID]")
         ->group("Attachments");
-    app.add_flag("--dime", dime, "Attach by DIME instead of MIME")->group("Attachments");
+    auto *const as_mime =
+        app.add_flag("--mime", mime, "A MIME message, as it is with --attach; with or without attachments");
+    auto *const as_mtom = app.add_flag("--mtom", mtom, "An MTOM message, a kind of MIME message");
+    auto *const as_dime = app.add_flag("--dime", dime, "A DIME message instead");
+    as_mime->group("Attachments");
+    as_mtom->group("Attachments")->excludes(as_mime);
+    as_dime->group("Attachments")->excludes(as_mime)->excludes(as_mtom);
     app.add_option("--save-attachments", save_folder, "Keep the answer's attachments in this directory")
         ->type_name("DIR")
         ->group("Attachments");

@@ -37,8 +37,8 @@ struct message_options {
     bool soap12 = false, gzip = false, chunked = false, keep_alive = false;
     unsigned repeat = 1;
     std::string action;
-    std::vector<std::string> attach; // FILE[,type=TYPE][,id=ID]
-    bool dime = false;
+    std::vector<std::string> attach;               // FILE[,type=TYPE][,id=ID]
+    bool mime = false, mtom = false, dime = false; // at most one; none: MIME if something is attached
     std::string save_folder;
 
     void declare(CLI::App &app);

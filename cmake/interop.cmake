@@ -30,6 +30,10 @@ set_tests_properties(interop_client_ports interop_nginx_profile PROPERTIES FIXTU
 if(ZUV_SANITIZE OR ZUV_FUZZ)
     return()
 endif()
+add_test(NAME transfer COMMAND /usr/bin/python3 -B ${INTEROP}/transfer.py 40000000 $<TARGET_FILE:file_host>
+    $<TARGET_FILE:zuv-service> $<TARGET_FILE:zuv>)
+set_tests_properties(transfer PROPERTIES LABELS soak TIMEOUT 300)
+
 zuv_add_test(soak_test ${PROJECT_SOURCE_DIR}/tests/soak/soak_test.cpp)
 target_link_libraries(soak_test PRIVATE zuv_service_test_support)
 add_dependencies(soak_test zuv-service)

@@ -1,6 +1,8 @@
 // answer.cpp - see answer.h.
 #include "answer.h"
 
+#include <algorithm>
+
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_io.h>
@@ -11,6 +13,7 @@ namespace service {
 
 namespace {
 
+constexpr std::size_t FILE_PIECE = 32768; // bytes
 constexpr int OK = 200, BAD_REQUEST = 400, INTERNAL_ERROR = 500;
 
 // The Body's content.
@@ -63,11 +66,9 @@ int write_head(soap *ctx, std::uint64_t length)
     return 0;
 }
 
-int send_message(soap *ctx, int http_status, const content &body)
+int send_counted(soap *ctx, const content &body, enclosures *beside)
 {
-    forget_request_framing(ctx);
-    ctx->status = http_status;
-    if (soap_count_begin(ctx))
+    if ((beside != nullptr && beside->attach_all(ctx)) || soap_count_begin(ctx))
         return ctx->error;
     if ((ctx->mode & MODE_COUNTING) && write_message(ctx, body))
         return ctx->error;
@@ -79,19 +80,42 @@ int send_message(soap *ctx, int http_status, const content &body)
     return soap_send_finish(ctx);
 }
 
+int send_message(soap *ctx, int http_status, const content &body, enclosures *beside)
+{
+    forget_request_framing(ctx);
+    ctx->status = http_status;
+    const std::uint32_t output_mode = ctx->output_mode;
+    if (beside != nullptr)
+        ctx->output_mode |= beside->answer_form();
+    const int result = send_counted(ctx, body, beside);
+    ctx->output_mode = output_mode;
+    return result;
+}
+
 } // namespace
 
-int send_response(soap *ctx, const operation &op, const void *response)
+int send_response(soap *ctx, const operation &op, const void *response, enclosures &beside)
 {
-    return send_message(ctx, OK, {put_response, &op, response});
+    return send_message(ctx, OK, {put_response, &op, response}, &beside);
 }
 
 int send_fault(soap *ctx, int http_status)
 {
-    return send_message(ctx, http_status, {put_fault});
+    return send_message(ctx, http_status, {put_fault}, nullptr);
 }
 
 int send_file(soap *ctx, const char *type, const std::string &bytes)
+{
+    std::size_t sent = 0;
+    return send_file(ctx, type, bytes.size(), [&](char *buffer, std::size_t length) {
+        const std::size_t part = bytes.copy(buffer, length, sent);
+        sent += part;
+        return part;
+    });
+}
+
+int send_file(soap *ctx, const char *type, std::uint64_t size,
+              const std::function<std::size_t(char *buffer, std::size_t length)> &read)
 {
     forget_request_framing(ctx);
     const std::uint32_t output_mode = ctx->output_mode;
@@ -100,9 +124,14 @@ int send_file(soap *ctx, const char *type, const std::string &bytes)
     ctx->http_content = type;
     int result = soap_send_begin(ctx);
     if (result == 0)
-        result = ctx->on_response(ctx, bytes.empty() ? OK : STATUS_FILE, bytes.size());
-    if (result == 0)
-        result = soap_send_bytes(ctx, bytes.data(), bytes.size());
+        result = ctx->on_response(ctx, size == 0 ? OK : STATUS_FILE, size);
+    char piece[FILE_PIECE];
+    for (std::uint64_t left = size; result == 0 && left != 0;) {
+        const std::size_t length =
+            read(piece, static_cast<std::size_t>(std::min<std::uint64_t>(left, sizeof piece)));
+        result = length != 0 ? soap_send_bytes(ctx, piece, length) : static_cast<int>(SOAP_EOF);
+        left -= length;
+    }
     if (result == 0)
         result = soap_send_finish(ctx);
     ctx->output_mode = output_mode;

@@ -4,6 +4,8 @@
 // here.
 #pragma once
 
+#include <cstdint>
+#include <functional>
 #include <string>
 
 #include <zuv_client_pro/soap.h>
@@ -13,14 +15,19 @@
 
 namespace service {
 
-// Sends the response of an operation in the SOAP version of the request, with ctx->header as its header.
-int send_response(soap *ctx, const operation &op, const void *response);
+// Sends the response of an operation in the SOAP version of the request, with ctx->header as its header, and
+// the files that go with it.
+int send_response(soap *ctx, const operation &op, const void *response, enclosures &beside);
 
 // Sends ctx->fault under an HTTP status, with ctx->header as its header.
 int send_fault(soap *ctx, int http_status);
 
 // Sends bytes of a media type as they are. SOAP_STOP: the request is dealt with.
 int send_file(soap *ctx, const char *type, const std::string &bytes);
+
+// The same for so many bytes that `read` gives piece by piece; it returns 0 where it has no more.
+int send_file(soap *ctx, const char *type, std::uint64_t size,
+              const std::function<std::size_t(char *buffer, std::size_t length)> &read);
 
 // Makes ctx->fault of a refusal: code, text and typed detail in the SOAP version of the request.
 // The HTTP status to send it under.

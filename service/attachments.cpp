@@ -2,8 +2,10 @@
 #include "attachments.h"
 
 #include <algorithm>
+#include <set>
 
 #include <zuv_client_pro/protocolHTTP.h>
+#include <zuv_client_pro/soap_binary.h>
 
 #include "faults.h"
 #include "moment.h"
@@ -57,6 +59,72 @@ bool holds_data(const protocol__Attachment &attachment)
     return attachment.data != nullptr || attachment.dataHandler != nullptr;
 }
 
+// ---------------------------------------------------------------------------------------------
+// Data beside the message. What the service keeps is referred to by its name.
+
+constexpr std::string_view SCHEME = "cid:";
+
+// The name that a reference gives, if it is one of the service's own.
+std::string name_of(const std::string *reference)
+{
+    const std::string &text = text_of(reference);
+    return text.starts_with(SCHEME) ? text.substr(SCHEME.size()) : std::string();
+}
+
+template <class Use> void each_attachment(const attachments &list, const Use &use)
+{
+    for (protocol__Attachment *attachment : list) {
+        if (attachment == nullptr)
+            continue;
+        use(*attachment);
+        each_attachment(attachment->attachment, use);
+    }
+}
+
+// All names under which the service may keep data of the attachments: of those that came beside a message,
+// and of those that came through a data port.
+std::set<std::string> names_in(const attachments &list)
+{
+    std::set<std::string> names;
+    each_attachment(list, [&](const protocol__Attachment &attachment) {
+        names.insert(name_of(attachment.dataHandler));
+        for (const protocol__DataPort *port : attachment.dataPort) {
+            const std::string &uri = port == nullptr ? text_of(nullptr) : text_of(port->dataURI);
+            const std::size_t path = uri.find(DATA_PATH);
+            if (path != uri.npos)
+                names.insert(uri.substr(path + DATA_PATH.size()));
+        }
+    });
+    names.erase(std::string());
+    return names;
+}
+
+// Keeps data that came beside the message, and lets the attachment refer to it.
+void keep_reference(call &c, protocol__Attachment &attachment)
+{
+    enclosed_data data{};
+    if (!c.beside.find(c.ctx, *attachment.dataHandler, data))
+        refuse<protocol__Client_x002eInvalidInformation>(
+            c.ctx, "Nothing came with the message under the reference " + *attachment.dataHandler + ".");
+    const std::string name = fresh_uuid();
+    c.documents.expect_data(name);
+    c.documents.note_data(name, data.size);
+    c.beside.keep(data, name);
+    attachment.dataHandler = make_text(c.ctx, std::string(SCHEME) + name);
+    attachment.size = make_text(c.ctx, std::to_string(data.size));
+    attachment.state = make_value(c.ctx, state::complete);
+    attachment.dataPort = {make_data_port(c, protocol__Direction::out, name)};
+    attachment.dataPort.front()->attachmentURI = attachment.thisURI;
+}
+
+// A document is kept as plain XML, where binary values stand in place.
+void put_values_in_place(const protocol__Attachment &attachment)
+{
+    for (protocol__DataPort *port : attachment.dataPort)
+        if (port != nullptr && port->hash != nullptr)
+            port->hash->id = port->hash->type = port->hash->options = nullptr;
+}
+
 bool leads_to(const protocol__Attachment &attachment, const std::string &data_uri)
 {
     return text_of(attachment.dataURI) == data_uri ||
@@ -64,20 +132,6 @@ bool leads_to(const protocol__Attachment &attachment, const std::string &data_ur
                        [&](const protocol__DataPort *port) {
                            return port != nullptr && text_of(port->dataURI) == data_uri;
                        });
-}
-
-protocol__Attachment &find_attachment(call &c, const attachments &held,
-                                      const protocol__AttachStatusRequest &report)
-{
-    const std::string &uri = text_of(report.attachmentURI), &data_uri = text_of(report.dataURI);
-    if (uri.empty() && data_uri.empty())
-        refuse<protocol__Client_x002eInsufficientInformation>(c.ctx,
-                                                              "The request does not name its attachment.");
-    for (protocol__Attachment *attachment : held)
-        if (attachment != nullptr &&
-            (uri.empty() ? leads_to(*attachment, data_uri) : text_of(attachment->thisURI) == uri))
-            return *attachment;
-    refuse_not_found(c.ctx, uri.empty() ? data_uri : uri);
 }
 
 bool reports_problem(const protocol__AttachStatusRequest &report)
@@ -141,6 +195,8 @@ void take_attachment(call &c, attachments &held, protocol__Attachment *given,
     given->thisURI = make_text(c.ctx, "urn:zuv:attachment:" + name);
     given->state = make_value(c.ctx, holds_data(*given) ? state::complete : state::pending);
     given->dataPort.clear();
+    attachments taken = {given};
+    take_references(c, taken);
     if (!holds_data(*given)) {
         if (auto *const fault = incompatibility(c, wish, protocol__Direction::in))
             refuse(fault);
@@ -150,6 +206,59 @@ void take_attachment(call &c, attachments &held, protocol__Attachment *given,
         given->dataPort.push_back(port);
     }
     held.push_back(given);
+}
+
+protocol__Attachment &find_attachment(call &c, const attachments &held,
+                                      const protocol__AttachStatusRequest &report)
+{
+    const std::string &uri = text_of(report.attachmentURI), &data_uri = text_of(report.dataURI);
+    if (uri.empty() && data_uri.empty())
+        refuse<protocol__Client_x002eInsufficientInformation>(c.ctx,
+                                                              "The request does not name its attachment.");
+    for (protocol__Attachment *attachment : held)
+        if (attachment != nullptr &&
+            (uri.empty() ? leads_to(*attachment, data_uri) : text_of(attachment->thisURI) == uri))
+            return *attachment;
+    refuse_not_found(c.ctx, uri.empty() ? data_uri : uri);
+}
+
+void take_references(call &c, attachments &given, const attachments *held)
+{
+    const std::set<std::string> known = held == nullptr ? std::set<std::string>() : names_in(*held);
+    each_attachment(given, [&](protocol__Attachment &attachment) {
+        put_values_in_place(attachment);
+        if (attachment.dataHandler != nullptr && known.count(name_of(attachment.dataHandler)) == 0)
+            keep_reference(c, attachment);
+    });
+}
+
+void settle_references(call &c, attachments &answered,
+                       const std::function<bool(const protocol__Attachment &)> &goes)
+{
+    each_attachment(answered, [&](protocol__Attachment &attachment) {
+        const std::string name = name_of(attachment.dataHandler);
+        if (!name.empty() && c.beside.has_form() && goes(attachment) && c.documents.data_size(name))
+            c.beside.enclose(name);
+        else
+            attachment.dataHandler = nullptr;
+    });
+}
+
+void forget_data(call &c, const attachments &gone, const attachments *remaining)
+{
+    std::set<std::string> names = names_in(gone);
+    if (remaining != nullptr)
+        for (const std::string &name : names_in(*remaining))
+            names.erase(name);
+    std::erase_if(names, [&c](const std::string &name) { return !c.documents.data_size(name); });
+    if (names.empty())
+        return;
+    store::writing transaction(c.documents);
+    for (const std::string &name : names)
+        c.documents.forget_data(name);
+    transaction.commit();
+    for (const std::string &name : names)
+        remove_data(c.documents.data_directory(), name);
 }
 
 void note_progress(call &c, const attachments &held, const protocol__AttachStatusRequest &report)

@@ -3,6 +3,7 @@
 // Elsewhere: the bytes that come through a data port (data_port.h).
 #pragma once
 
+#include <functional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -26,10 +27,26 @@ protocol__DataPort *make_data_port(const call &c, protocol__Direction direction,
 protocol__Client_x002eDataPortIncompatibility *
 incompatibility(const call &c, const protocol__DataPortPreference *wish, protocol__Direction direction);
 
-// Adds an attachment, with a data port unless it holds its data. Refused if it is missing, or the wish can't
-// be met. To be called within a transaction of the store.
+// Adds an attachment, with a data port unless it holds its data or has brought it beside the message. Refused
+// if it is missing, or the wish can't be met. To be called within a transaction of the store.
 void take_attachment(call &c, attachments &held, protocol__Attachment *given,
                      const protocol__DataPortPreference *wish);
+
+// Keeps what the attachments of a given document refer to: data that came beside the message, or that the
+// document held already. Refused if a reference leads nowhere. To be called within a transaction.
+void take_references(call &c, attachments &given, const attachments *held = nullptr);
+
+// Of the attachments of an answer, those for which `goes` is true get their data sent beside the message, if
+// the request's form allows it. The others lose their references: their data ports lead to the data.
+void settle_references(call &c, attachments &answered,
+                       const std::function<bool(const protocol__Attachment &)> &goes);
+
+// Forgets the data that documents no longer refer to.
+void forget_data(call &c, const attachments &gone, const attachments *remaining = nullptr);
+
+// The attachment that a client's report is about; refused if there is none.
+protocol__Attachment &find_attachment(call &c, const attachments &held,
+                                      const protocol__AttachStatusRequest &report);
 
 // Notes what a client reports of a transfer. Refused if no attachment is meant.
 void note_progress(call &c, const attachments &held, const protocol__AttachStatusRequest &report);

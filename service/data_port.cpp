@@ -2,7 +2,6 @@
 #include "data_port.h"
 
 #include <algorithm>
-#include <cstdio>
 #include <limits>
 #include <optional>
 #include <string>
@@ -15,66 +14,76 @@
 #include "answer.h"
 #include "attachments.h"
 #include "catalogue.h"
+#include "data_files.h"
 
 namespace service {
 
 namespace {
 
 constexpr int BAD_REQUEST = 400, NOT_FOUND = 404;
-
-std::optional<std::string> find_data(store &documents, std::string_view name)
-{
-    if (!name.starts_with(UPDATE_DATA))
-        return documents.find_data(name);
-    const update_record *const update = the_catalogue().find(name.substr(UPDATE_DATA.size()));
-    return update == nullptr ? std::nullopt : std::optional(update_data(*update));
-}
+constexpr char MEDIA_TYPE[] = "application/octet-stream";
 
 // The body, framing and compression undone. False if less came than was announced; the size is reception's to
 // limit.
-bool read_body(soap *ctx, std::string &bytes)
+bool read_body(soap *ctx, arriving_file &file)
 {
     const bool length_known =
         ctx->content_length_given && (ctx->mode & MODE_IO_MASK) != MODE_CHUNKED && ctx->zlib_in == 0;
-    std::uint64_t left = length_known ? ctx->content_length : std::numeric_limits<std::uint64_t>::max();
-    if (ctx->look_ahead > 0)
-        bytes.push_back(static_cast<char>(std::exchange(ctx->look_ahead, 0)));
-    while (bytes.size() < left && ctx->look_ahead == 0) {
+    const std::uint64_t length =
+        length_known ? ctx->content_length : std::numeric_limits<std::uint64_t>::max();
+    if (ctx->look_ahead > 0) {
+        const char first = static_cast<char>(std::exchange(ctx->look_ahead, 0));
+        file.write(&first, 1);
+    }
+    while (file.size() < length && ctx->look_ahead == 0) {
         if (ctx->buffer_index >= ctx->buffer_length && soap_recv_more(ctx) != SOAP_OK)
             break;
         const std::size_t taken = static_cast<std::size_t>(
-            std::min<std::uint64_t>(left - bytes.size(), ctx->buffer_length - ctx->buffer_index));
-        bytes.append(ctx->buffer + ctx->buffer_index, taken);
+            std::min<std::uint64_t>(length - file.size(), ctx->buffer_length - ctx->buffer_index));
+        file.write(ctx->buffer + ctx->buffer_index, taken);
         ctx->buffer_index += taken;
     }
-    return ctx->error == SOAP_OK && (!length_known || bytes.size() == left) &&
+    return ctx->error == SOAP_OK && (!length_known || file.size() == length) &&
            soap_receive_finish(ctx) == SOAP_OK && (length_known || !ctx->response_unfinished);
 }
 
-bool keep(store &documents, std::string_view name, const std::string &bytes)
+bool keep(store &documents, std::string_view name, arriving_file &file)
 {
     store::writing transaction(documents);
-    const bool known = documents.keep_data(name, bytes);
+    if (!documents.note_data(name, file.size()))
+        return false;
+    file.keep_as(name);
     transaction.commit();
-    return known;
+    return true;
 }
 
 } // namespace
 
 int send_data(soap *ctx, store &documents, std::string_view name)
 {
-    const std::optional<std::string> data = find_data(documents, name);
-    if (!data)
+    if (name.starts_with(UPDATE_DATA)) {
+        const update_record *const update = the_catalogue().find(name.substr(UPDATE_DATA.size()));
+        return update == nullptr ? ctx->error = NOT_FOUND : send_file(ctx, MEDIA_TYPE, update_data(*update));
+    }
+    const std::optional<std::uint64_t> size = documents.data_size(name);
+    if (!size)
         return ctx->error = NOT_FOUND;
-    return send_file(ctx, "application/octet-stream", *data);
+    if (*size == 0)
+        return send_file(ctx, MEDIA_TYPE, "");
+    kept_file file(documents.data_directory(), name);
+    return send_file(ctx, MEDIA_TYPE, file.size(),
+                     [&file](char *buffer, std::size_t length) { return file.read(buffer, length); });
 }
 
 int receive_data(soap *ctx, store &documents, std::string_view name)
 {
-    std::string bytes;
-    if (!read_body(ctx, bytes))
+    if (!documents.data_size(name))
+        return ctx->error = NOT_FOUND;
+    arriving_file file(documents.data_directory());
+    if (!read_body(ctx, file))
         return ctx->error != SOAP_OK ? ctx->error : ctx->error = BAD_REQUEST;
-    if (!keep(documents, name, bytes))
+    file.flush();
+    if (!keep(documents, name, file))
         return ctx->error = NOT_FOUND;
     if (ctx->response_unfinished)
         ctx->keep_alive = 0;

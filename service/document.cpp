@@ -60,6 +60,17 @@ std::size_t document_codec::give_input(soap *ctx, char *buffer, std::size_t leng
     return given;
 }
 
+// A binary value that came beside its message is written as a reference again, which here leads to nothing.
+bool document_codec::refers_beside()
+{
+    if (context_.dime.first == nullptr && context_.mime.first == nullptr)
+        return false;
+    context_.dime.first = context_.dime.last = nullptr;
+    context_.mime.first = context_.mime.last = nullptr;
+    context_.error = SOAP_DIME_HREF;
+    return true;
+}
+
 std::string document_codec::write_with(int (*put)(soap *ctx, const void *object), const void *object)
 {
     context_.encoding_style = nullptr;
@@ -67,7 +78,7 @@ std::string document_codec::write_with(int (*put)(soap *ctx, const void *object)
     output_.clear();
     too_large_ = false;
     if (soap_count_begin(&context_) != SOAP_OK || soap_count_end(&context_) != SOAP_OK ||
-        soap_send_begin(&context_) != SOAP_OK || put(&context_, object) != SOAP_OK ||
+        soap_send_begin(&context_) != SOAP_OK || put(&context_, object) != SOAP_OK || refers_beside() ||
         soap_send_finish(&context_) != SOAP_OK) {
         if (too_large_)
             throw document_error("the document is too large", 0);

@@ -55,6 +55,7 @@ public:
 private:
     std::string write_with(int (*put)(soap *ctx, const void *object), const void *object);
     void read_with(bool (*get)(soap *ctx, void *object), void *object, std::string_view xml);
+    bool refers_beside();
     static int take_output(soap *ctx, const char *data, std::size_t length);
     static std::size_t give_input(soap *ctx, char *buffer, std::size_t length);
 

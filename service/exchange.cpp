@@ -214,11 +214,12 @@ void answer_failure(soap *ctx, const char *what)
     refuse(fault);
 }
 
-const void *run(soap *ctx, const request &asked, const reception &received)
+const void *run(soap *ctx, const request &asked, reception &received)
 {
     const protocol__Header *const header = header_of(ctx);
     check_credentials(ctx, header);
-    call c{ctx, received.lent().documents, received.lent().codec, received.config(), header, received.root()};
+    call c{ctx,    received.lent().documents, received.lent().codec, received.config(),
+           header, received.root(),           received.enclosed()};
     try {
         return asked.op->run(c, asked.object);
     } catch (const document_error &error) {
@@ -240,12 +241,13 @@ void receive_and_answer(soap *ctx, reception &received)
         ctx->error = SOAP_HTTP_ERROR;
         throw unreadable{};
     }
+    received.enclosed().add_form(ctx->mode & MODE_MTOM);
     const request asked = read_request(ctx, *received.target());
     const void *const response = run(ctx, asked, received);
     if (ctx->response_unfinished)
         ctx->keep_alive = 0; // something stands behind the request, which can't be told from a next one
     settle_header(ctx);
-    if (send_response(ctx, *asked.op, response) != SOAP_OK)
+    if (send_response(ctx, *asked.op, response, received.enclosed()) != SOAP_OK)
         ctx->keep_alive = 0;
 }
 
@@ -254,8 +256,10 @@ void serve(soap *ctx, reception &received)
     try {
         receive_and_answer(ctx, received);
     } catch (const refusal &refused) {
+        received.enclosed().discard_arrived();
         answer_refusal(ctx, refused);
     } catch (const unreadable &) {
+        received.enclosed().discard_arrived();
         answer_unreadable(ctx, received);
     } catch (const std::exception &failure) {
         answer_failure(ctx, failure.what());
@@ -274,6 +278,7 @@ bool serve_exchange(soap *ctx, reception &received)
         ctx->keep_alive = 0;
     }
     received.lent().codec.forget();
+    received.enclosed().expect_next();
     if (!received.started() || (ctx->error != SOAP_OK && ctx->error != SOAP_STOP))
         ctx->keep_alive = 0;
     return ctx->keep_alive != 0;

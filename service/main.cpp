@@ -46,6 +46,8 @@ void declare(CLI::App &app, options &o)
     app.add_option("--trace", s.trace, "File that takes a copy of all bytes received and sent");
     app.add_option("--port-file", o.port_file, "File that takes the port once the service listens");
     app.add_option("--max-body", s.body_limit, "Largest request, in bytes")->capture_default_str();
+    app.add_option("--max-attachments", s.attachment_limit, "Largest attachments of a request, in bytes")
+        ->capture_default_str();
     app.add_option("--connections", s.connections, "Connections served at a time")
         ->check(CLI::Range(1, 512))
         ->capture_default_str();
@@ -119,6 +121,7 @@ void serve_until_signal(const options &o)
     std::optional<passing_directory> passing;
     service::database place;
     place.path = o.config.database.empty() ? passing.emplace().database() : o.config.database;
+    place.data_directory = place.path + "-data";
     service::server server(o.config, place);
     server.start();
     announce(o, server.port());

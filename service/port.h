@@ -12,6 +12,7 @@
 #include <zuv_client_pro/soap.h>
 
 #include "document.h"
+#include "enclosures.h"
 #include "make.h"
 #include "settings.h"
 #include "store.h"
@@ -26,7 +27,8 @@ struct call {
     document_codec &codec;
     const settings &config;
     const protocol__Header *header; // null if the request has none
-    std::string root; // URL of this service as the client named it, "http://host:9080"; may be empty
+    std::string root;   // URL of this service as the client named it, "http://host:9080"; may be empty
+    enclosures &beside; // attachments that came with the request, and those to go with the answer
 };
 
 struct operation {

@@ -79,8 +79,7 @@ report *submit(call &c, report &request)
     request.submitDateTime = request.lastModifiedDateTime;
     request.state = make_value(c.ctx, state::open);
     give_answers(c, request);
-    rules_of(c).documents().keep(request);
-    return &request;
+    return rules_of(c).keep(request);
 }
 
 report *attach(call &c, _protocolProblemReport__attachRequest &request)

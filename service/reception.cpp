@@ -23,6 +23,8 @@ namespace {
 constexpr int BAD_REQUEST = 400, UNAUTHORIZED = 401, NOT_FOUND = 404, METHOD_NOT_ALLOWED = 405,
               TOO_LARGE = 413, INTERNAL_ERROR = 500;
 char REALM[] = "zuv";
+// Attachments may be long, and at this pace their bytes don't count in the time that a request may take.
+constexpr std::chrono::microseconds ATTACHED_BYTE_TIME(10);
 
 // Compares in a time that tells nothing of the place where the texts differ.
 bool same_secret(const char *given, const std::string &expected)
@@ -60,7 +62,8 @@ std::string page()
 
 } // namespace
 
-reception::reception(soap *ctx, const settings &config, session &lent) : config_(config), lent_(lent)
+reception::reception(soap *ctx, const settings &config, session &lent)
+    : config_(config), lent_(lent), enclosures_(config, lent.documents.data_directory())
 {
     ctx->user = this;
     ctx->on_read_head = read_head;
@@ -70,6 +73,30 @@ reception::reception(soap *ctx, const settings &config, session &lent) : config_
     ctx->on_get = get;
     ctx->on_head = ctx->on_options = option_or_head;
     ctx->on_put = ctx->on_delete = refuse_method;
+    install_attachment_hooks(ctx);
+}
+
+void reception::install_attachment_hooks(soap *ctx)
+{
+    ctx->dime_write_open = [](soap *c, const char *id, const char *, const char *) {
+        return of(c).enclosures_.open(c, id);
+    };
+    ctx->mime_write_open = [](soap *c, void *, const char *id, const char *, const char *, int) {
+        return of(c).enclosures_.open(c, id);
+    };
+    ctx->dime_write = ctx->mime_write = [](soap *c, void *handle, const char *data, std::size_t length) {
+        reception &self = of(c);
+        self.body_bytes_ -= std::min<std::uint64_t>(length, self.body_bytes_); // it stays in no memory
+        self.deadline_ += ATTACHED_BYTE_TIME * static_cast<long>(length);
+        return self.enclosures_.write(handle, data, length);
+    };
+    ctx->dime_write_close =
+        ctx->mime_write_close = [](soap *c, void *handle) { of(c).enclosures_.close(handle); };
+    ctx->dime_read_open = ctx->mime_read_open = [](soap *c, void *handle, const char *, const char *,
+                                                   const char *) { return of(c).enclosures_.reopen(handle); };
+    ctx->dime_read = ctx->mime_read = [](soap *c, void *handle, char *buffer, std::size_t length) {
+        return of(c).enclosures_.read(handle, buffer, length);
+    };
 }
 
 void reception::expect_next()
@@ -79,6 +106,7 @@ void reception::expect_next()
     target_ = nullptr;
     root_.clear();
     path_.clear();
+    enclosures_.expect_next();
 }
 
 // ---------------------------------------------------------------------------------------------
@@ -111,6 +139,8 @@ int reception::count_body(soap *ctx, const char *, std::size_t length)
 {
     reception &self = of(ctx);
     self.body_bytes_ += length;
+    if (!self.data_name().empty())
+        self.deadline_ += ATTACHED_BYTE_TIME * static_cast<long>(length);
     return self.too_large() ? TOO_LARGE : 0;
 }
 
@@ -121,6 +151,7 @@ int reception::read_head(soap *ctx)
 {
     reception &self = of(ctx);
     const int result = http_read_head(ctx);
+    self.enclosures_.set_form(ctx->input_mode & (MODE_DIME | MODE_MIME));
     settle_framing(ctx, self.config_.chunked);
     if (result != 0)
         return result;
@@ -156,7 +187,8 @@ int reception::settle_request(soap *ctx)
         ctx->auth_realm = REALM;
         return UNAUTHORIZED;
     }
-    return ctx->content_length > config_.body_limit ? TOO_LARGE : 0;
+    const std::uint64_t beside = enclosures_.has_form() ? config_.attachment_limit : 0;
+    return ctx->content_length > body_limit() + beside ? TOO_LARGE : 0;
 }
 
 std::string_view reception::data_name() const

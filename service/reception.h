@@ -12,6 +12,7 @@
 
 #include <zuv_client_pro/soap.h>
 
+#include "enclosures.h"
 #include "port.h"
 #include "session.h"
 #include "settings.h"
@@ -32,13 +33,23 @@ public:
     const settings &config() const { return config_; }
     session &lent() const { return lent_; }
     bool started() const { return started_; } // some byte has arrived
-    bool too_large() const { return body_bytes_ > config_.body_limit; }
+    bool too_large() const { return body_bytes_ > body_limit() || enclosures_.too_large(); }
     bool too_slow() const { return too_slow_; }
     const port *target() const { return target_; } // null if no head was read, or none of a call
     std::string_view data_name() const;            // below the path of data; empty for another path
     const std::string &root() const { return root_; }
+    enclosures &enclosed() { return enclosures_; }
 
 private:
+    // Bytes of a body that belong to no file; all of the data that comes to a data port does. Bytes that
+    // just came into the buffer are counted before it shows whether they are an attachment's.
+    std::uint64_t body_limit() const
+    {
+        if (!data_name().empty())
+            return config_.attachment_limit;
+        return config_.body_limit + (enclosures_.has_form() ? SOAP_BUFFER_SIZE : 0);
+    }
+    void install_attachment_hooks(soap *ctx);
     int settle_request(soap *ctx);
     int answer_get(soap *ctx);
     bool knows_sender(const soap *ctx) const;
@@ -60,6 +71,7 @@ private:
     std::chrono::steady_clock::time_point deadline_;
     const port *target_ = nullptr;
     std::string root_, path_;
+    enclosures enclosures_;
 };
 
 } // namespace service

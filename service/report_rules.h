@@ -21,13 +21,23 @@ public:
 
     void set_state(Document &document, state s) { document.state = make_value(call_.ctx, s); }
 
-    Document *get() { return shelf_.find(target_of(call_)); }
+    // Names a document afresh and keeps it, with the data that came beside it.
+    Document *keep(Document &request)
+    {
+        shelf_.keep(request, [&] { take_references(call_, request.attachment); });
+        return answer(&request);
+    }
+
+    // The document comes with the data of its attachments.
+    Document *get()
+    {
+        return answer(shelf_.find(target_of(call_)), [](const protocol__Attachment &) { return true; });
+    }
 
     Document *create(Document &request)
     {
         set_state(request, state::open);
-        shelf_.keep(request);
-        return &request;
+        return keep(request);
     }
 
     // A report is complete once its data is there.
@@ -35,51 +45,73 @@ public:
     {
         settle(request);
         if (!is_aimed())
-            return shelf_.keep(request), &request;
-        return shelf_.change(target_of(call_), [&](Document *held) {
+            return keep(request);
+        attachments before;
+        Document *const kept = shelf_.change(target_of(call_), [&](Document *held) {
             refuse_ended(*held);
+            before = held->attachment;
+            take_references(call_, request.attachment, &before);
             request.thisURI = held->thisURI;
             return &request;
         });
+        forget_data(call_, before, &request.attachment);
+        return answer(kept);
     }
 
     // Closes or cancels; to be done once.
     Document *end(state last)
     {
-        return shelf_.change(target_of(call_), [&](Document *held) {
+        return answer(shelf_.change(target_of(call_), [&](Document *held) {
             refuse_ended(*held);
             set_state(*held, last);
             return held;
-        });
+        }));
     }
 
     Document *remove(const Document &request)
     {
         Document *const removed = shelf_.take(target_of(call_, &request.thisURI));
+        forget_data(call_, removed->attachment);
         set_state(*removed, state::closed);
-        return removed;
+        return answer(removed);
     }
 
     Document *attach(protocol__Attachment *given, const protocol__DataPortPreference *wish)
     {
-        return shelf_.change(target_of(call_), [&](Document *held) {
+        return answer(shelf_.change(target_of(call_), [&](Document *held) {
             refuse_ended(*held);
             take_attachment(call_, held->attachment, given, wish);
             return held;
-        });
+        }));
     }
 
+    // A client that wants to try again gets the attachment's data once more.
     Document *note_progress(const protocol__AttachStatusRequest &report)
     {
-        return shelf_.change(target_of(call_), [&](Document *held) {
+        const protocol__Attachment *meant = nullptr;
+        Document *const changed = shelf_.change(target_of(call_), [&](Document *held) {
+            meant = &find_attachment(call_, held->attachment, report);
             service::note_progress(call_, held->attachment, report);
             if (held->state != nullptr && *held->state == state::processing)
                 settle(*held);
             return held;
         });
+        const bool again =
+            report.intention != nullptr && *report.intention == protocol__AttachStatusIntention::retry;
+        return answer(changed, [&](const protocol__Attachment &a) { return again && &a == meant; });
     }
 
 private:
+    template <class Goes> Document *answer(Document *document, const Goes &goes)
+    {
+        settle_references(call_, document->attachment, goes);
+        return document;
+    }
+    Document *answer(Document *document)
+    {
+        return answer(document, [](const protocol__Attachment &) { return false; });
+    }
+
     bool is_aimed() const
     {
         const protocol__Header *const header = call_.header;

@@ -14,6 +14,7 @@
 #include <zuv_client_pro/soap_tcp.h>
 
 #include "connection.h"
+#include "data_files.h"
 
 namespace service {
 
@@ -53,6 +54,10 @@ server::server(const settings &config, database &place)
     : config_(config), place_(place), master_(MODE_KEEP_ALIVE | MODE_UTF_STRINGS, mode_of(config))
 {
     idle_sessions_.push_back(std::make_unique<session>(place, config)); // a useless database shows now
+    store &documents = idle_sessions_.back()->documents;
+    open_data_directory(place.data_directory);
+    sweep_data(place.data_directory,
+               [&documents](std::string_view name) { return documents.data_size(name).has_value(); });
     master_.bind_flags = SO_REUSEADDR;
     master_.max_depth = config.depth_limit;
     master_.recv_timeout = master_.send_timeout = config.idle_seconds;

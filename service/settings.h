@@ -20,10 +20,12 @@ struct settings {
     bool chunked = false;                   // answers go out in chunks in place of a Content-Length
     std::string trace;                      // file that takes a copy of all bytes; empty: none
     std::uint64_t body_limit = 64ULL << 20; // bytes of a request, framing and compression undone; 413 beyond
-    std::uint32_t depth_limit = 512;        // open elements of a message or document; protects the stack
-    std::size_t connections = 64;           // served at a time; further ones wait to be accepted
-    int idle_seconds = 30;                  // silence that ends a connection, when receiving and when sending
-    int request_seconds = 120;              // time that a request may take to arrive
+    std::uint64_t attachment_limit =
+        4ULL << 30;                  // bytes of its attachments that go to files, or of data for a port
+    std::uint32_t depth_limit = 512; // open elements of a message or document; protects the stack
+    std::size_t connections = 64;    // served at a time; further ones wait to be accepted
+    int idle_seconds = 30;           // silence that ends a connection, when receiving and when sending
+    int request_seconds = 120;       // time that a request may take to arrive
 };
 
 } // namespace service

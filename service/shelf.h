@@ -28,9 +28,16 @@ public:
     // Names a document afresh and keeps it.
     void keep(Document &document)
     {
+        keep(document, [] {});
+    }
+
+    // The same; `prepare` is done first, within the transaction.
+    template <class Prepare> void keep(Document &document, const Prepare &prepare)
+    {
         document.thisURI = {std::string("urn:zuv:") + kind_ + ":" + fresh_uuid()};
-        const std::string xml = call_.codec.write(document);
         store::writing transaction(call_.documents);
+        prepare();
+        const std::string xml = call_.codec.write(document);
         call_.documents.insert(port_, document.thisURI.front(), state_of(document), xml);
         transaction.commit();
     }

@@ -19,9 +19,9 @@ constexpr const char *SETUP = "PRAGMA journal_mode=WAL;"
                               " created TEXT NOT NULL,"
                               " changed TEXT NOT NULL,"
                               " PRIMARY KEY(port, uri));"
-                              "CREATE TABLE IF NOT EXISTS data("
+                              "CREATE TABLE IF NOT EXISTS data_file("
                               " name TEXT PRIMARY KEY,"
-                              " bytes BLOB NOT NULL);";
+                              " size INTEGER NOT NULL);";
 
 constexpr const char *NOW = "strftime('%Y-%m-%dT%H:%M:%SZ','now')";
 
@@ -76,9 +76,10 @@ store::store(database &place) : place_(place)
     const std::string now = NOW;
     find_ = prepare("SELECT xml FROM document WHERE port=?1 AND uri=?2");
     each_ = prepare("SELECT xml FROM document WHERE port=?1 ORDER BY uri");
-    find_data_ = prepare("SELECT bytes FROM data WHERE name=?1");
-    expect_data_ = prepare("INSERT INTO data VALUES(?1, x'')");
-    keep_data_ = prepare("UPDATE data SET bytes=?2 WHERE name=?1");
+    data_size_ = prepare("SELECT size FROM data_file WHERE name=?1");
+    expect_data_ = prepare("INSERT INTO data_file VALUES(?1, 0)");
+    note_data_ = prepare("UPDATE data_file SET size=?2 WHERE name=?1");
+    forget_data_ = prepare("DELETE FROM data_file WHERE name=?1");
     insert_ = prepare(("INSERT INTO document VALUES(?1,?2,?3,?4," + now + "," + now + ")").c_str());
     replace_ = prepare(
         ("UPDATE document SET state=?3, xml=?4, changed=" + now + " WHERE port=?1 AND uri=?2").c_str());
@@ -126,14 +127,12 @@ std::string_view blob_of(sqlite3_stmt *row)
 
 } // namespace
 
-std::optional<std::string> store::single(const statement &prepared)
+bool store::step_to_row(const statement &prepared)
 {
     const int found = sqlite3_step(prepared.get());
-    if (found == SQLITE_DONE)
-        return std::nullopt;
-    if (found != SQLITE_ROW)
+    if (found != SQLITE_DONE && found != SQLITE_ROW)
         fail();
-    return std::string(blob_of(prepared.get()));
+    return found == SQLITE_ROW;
 }
 
 std::optional<std::string> store::find(std::string_view port, std::string_view uri)
@@ -141,14 +140,16 @@ std::optional<std::string> store::find(std::string_view port, std::string_view u
     const rewinder after{find_.get()};
     bind_text(find_.get(), 1, port);
     bind_text(find_.get(), 2, uri);
-    return single(find_);
+    return step_to_row(find_) ? std::optional(std::string(blob_of(find_.get()))) : std::nullopt;
 }
 
-std::optional<std::string> store::find_data(std::string_view name)
+std::optional<std::uint64_t> store::data_size(std::string_view name)
 {
-    const rewinder after{find_data_.get()};
-    bind_text(find_data_.get(), 1, name);
-    return single(find_data_);
+    const rewinder after{data_size_.get()};
+    bind_text(data_size_.get(), 1, name);
+    if (!step_to_row(data_size_))
+        return std::nullopt;
+    return static_cast<std::uint64_t>(sqlite3_column_int64(data_size_.get(), 0));
 }
 
 void store::each(std::string_view port, const std::function<bool(std::string_view xml)> &use)
@@ -169,12 +170,18 @@ void store::expect_data(std::string_view name)
     run(expect_data_);
 }
 
-bool store::keep_data(std::string_view name, std::string_view bytes)
+bool store::note_data(std::string_view name, std::uint64_t size)
 {
-    bind_text(keep_data_.get(), 1, name);
-    bind_blob(keep_data_.get(), 2, bytes);
-    run(keep_data_);
+    bind_text(note_data_.get(), 1, name);
+    sqlite3_bind_int64(note_data_.get(), 2, static_cast<sqlite3_int64>(size));
+    run(note_data_);
     return sqlite3_changes(handle_.get()) != 0;
+}
+
+void store::forget_data(std::string_view name)
+{
+    bind_text(forget_data_.get(), 1, name);
+    run(forget_data_);
 }
 
 void store::insert(std::string_view port, std::string_view uri, int state, std::string_view xml)

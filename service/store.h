@@ -28,7 +28,8 @@ struct store_error : std::runtime_error {
 // Where the documents are; outlives its stores.
 struct database {
     std::string path;
-    std::mutex writers; // held by the one transaction that may change something
+    std::string data_directory; // of the attachments' files
+    std::mutex writers;         // held by the one transaction that may change something
 };
 
 class store {
@@ -45,8 +46,10 @@ public:
     // Hands each document of a port to `use`, in the order of their names, until it returns false.
     void each(std::string_view port, const std::function<bool(std::string_view xml)> &use);
 
-    // Data that came through a data port: nothing for a name that was never given out, empty until data came.
-    std::optional<std::string> find_data(std::string_view name);
+    // Bytes of an attachment's data, which lie in a file of the name: nothing for a name that was never given
+    // out, 0 until data came.
+    std::optional<std::uint64_t> data_size(std::string_view name);
+    const std::string &data_directory() const { return place_.data_directory; }
 
     // A transaction: what was done since is undone unless it is committed.
     class writing {
@@ -68,7 +71,8 @@ public:
     void replace(std::string_view port, std::string_view uri, int state, std::string_view xml);
     void remove(std::string_view port, std::string_view uri);
     void expect_data(std::string_view name);
-    bool keep_data(std::string_view name, std::string_view bytes); // false for an unknown name
+    bool note_data(std::string_view name, std::uint64_t size); // false for an unknown name
+    void forget_data(std::string_view name);
 
 private:
     struct closer {
@@ -79,14 +83,14 @@ private:
 
     statement prepare(const char *sql);
     void run(const statement &prepared);
-    std::optional<std::string> single(const statement &prepared);
+    bool step_to_row(const statement &prepared); // false if there is none
     void execute(const char *sql);
     [[noreturn]] void fail() const;
 
     database &place_;
     std::unique_ptr<sqlite3, closer> handle_;
-    statement find_, each_, insert_, replace_, remove_, find_data_, expect_data_, keep_data_, begin_, commit_,
-        rollback_;
+    statement find_, each_, insert_, replace_, remove_, data_size_, expect_data_, note_data_, forget_data_,
+        begin_, commit_, rollback_;
 };
 
 } // namespace service

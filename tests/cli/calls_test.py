@@ -201,6 +201,21 @@ class calls(unittest.TestCase):
                              [("<pic>", "image/png", "one.bin"), ("<attachment-2>", "application/octet-stream", "two.txt")])
             self.assertIn(b"\r\n\r\n" + data + b"\r\n--", requests[0])
 
+    def test_a_service_keeps_attachments_and_gives_them_back(self):
+        data = random.Random(4).randbytes(200000)
+        source = self.file("source", data)
+        report = ('<s:createRequest xmlns:s="%s/StatusReport" xmlns:c="%s"><c:attachment><c:dataHandler>cid:it</c:dataHandler>'
+                  "</c:attachment></s:createRequest>" % (zuv.COMMON, zuv.COMMON))
+        with zuv.service() as address:
+            for form in ("--mime", "--mtom", "--dime"):
+                created = zuv.run("statusreport", "create", "-", form, "--attach", source + ",id=it", "--json", "-e", address, given=report)
+                target = json.loads(self.expect(created, 0).stdout)["thisURI"][0]
+                kept = os.path.join(self.folder, form)
+                self.expect(zuv.run("statusreport", "get", form, "-t", target, "--save-attachments", kept, "-e", address), 0, "saved ")
+                with open(os.path.join(kept, *os.listdir(kept)), "rb") as file:
+                    self.assertEqual(file.read(), data, form)
+            self.expect(zuv.run("statusreport", "get", "--mime", "--dime", "-e", address), 2, "excludes")
+
     def test_data_ports_are_read_and_written(self):
         data = random.Random(2).randbytes(300000)
         source, back = self.file("source", data), os.path.join(self.folder, "back")

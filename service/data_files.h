@@ -1,0 +1,67 @@
+// data_files.h - the bytes of attachments, each in a file of its own in one directory.
+//
+// Elsewhere: which of them are known, and their sizes (store.h); how they travel (enclosures.h, data_port.h).
+// Always: a file has its name only once all of it is on the disk; what was not kept is removed. Failures of
+// the system throw std::system_error.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <string>
+#include <string_view>
+
+namespace service {
+
+// A file that is being written, without a name that anybody would look for.
+class arriving_file {
+public:
+    explicit arriving_file(const std::string &directory);
+    ~arriving_file(); // removes it unless it was kept
+    arriving_file(const arriving_file &) = delete;
+    arriving_file &operator=(const arriving_file &) = delete;
+
+    void write(const char *data, std::size_t length);
+    void flush(); // no more bytes: puts them on the disk, which takes its time, and gives the descriptor back
+    std::uint64_t size() const { return size_; }
+
+    // Gives it a name, flushed or not; takes the place of the file that had the name.
+    void keep_as(std::string_view name);
+
+private:
+    void close_descriptor();
+
+    std::string directory_, path_; // empty path: it was kept
+    int descriptor_ = -1;
+    std::uint64_t size_ = 0;
+};
+
+// A file that was kept, for reading. It can be read to its end whatever happens to its name.
+class kept_file {
+public:
+    kept_file(const std::string &directory, std::string_view name);
+    ~kept_file();
+    kept_file(const kept_file &) = delete;
+    kept_file &operator=(const kept_file &) = delete;
+
+    std::uint64_t size() const { return size_; }
+
+    // Bytes read, at most `length`; 0 at the end.
+    std::size_t read(char *buffer, std::size_t length);
+
+private:
+    int descriptor_;
+    std::uint64_t size_ = 0;
+};
+
+// Makes the directory unless it is there.
+void open_data_directory(const std::string &directory);
+
+// Removes a file; nothing if it isn't there.
+void remove_data(const std::string &directory, std::string_view name);
+
+// Removes what an end without warning has left: files that were arriving, and those that `known` doesn't
+// know.
+void sweep_data(const std::string &directory, const std::function<bool(std::string_view name)> &known);
+
+} // namespace service

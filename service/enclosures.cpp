@@ -1,0 +1,158 @@
+// enclosures.cpp - see enclosures.h.
+#include "enclosures.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <exception>
+
+#include <zuv_client_pro/soap_attachment.h>
+#include <zuv_client_pro/soap_error.h>
+
+namespace service {
+
+namespace {
+
+constexpr int TOO_LARGE = 413, INTERNAL_ERROR = 500;
+constexpr std::size_t ATTACHMENTS_MAX = 1000; // of one request
+constexpr std::size_t VALUES_MAX =
+    64; // elements that wait for their bytes; beyond, all attachments go to memory
+constexpr char MEDIA_TYPE[] = "application/octet-stream";
+
+// True if an element of the message waits for the attachment's bytes: then they are a part of the document.
+bool is_value(soap *ctx, const char *id)
+{
+    std::size_t left = VALUES_MAX;
+    for (const soap_attachment_ref *wanted = ctx->mtom_list; wanted != nullptr; wanted = wanted->next)
+        if (left-- == 0 || soap_cid_compare(ctx, wanted->id, id) == 0)
+            return true;
+    return false;
+}
+
+// The message has been read, so what waits for attachments is known.
+bool message_is_known(const soap *ctx)
+{
+    return (ctx->mode & MODE_MIME) == 0 || ctx->mime.root != nullptr;
+}
+
+} // namespace
+
+void enclosures::expect_next()
+{
+    form_ = 0;
+    arrived_bytes_ = 0;
+    arrived_ = 0;
+    too_large_ = false;
+    files_.clear();
+    outgoing_.clear();
+}
+
+// ---------------------------------------------------------------------------------------------
+// In. The library calls these, and nothing may be thrown through it.
+
+void *enclosures::open(soap *ctx, const char *id)
+{
+    if (++arrived_ > ATTACHMENTS_MAX) {
+        too_large_ = true;
+        ctx->error = TOO_LARGE;
+        return nullptr;
+    }
+    if (!message_is_known(ctx) || is_value(ctx, id))
+        return nullptr;
+    try {
+        return &files_.emplace_back(directory_);
+    } catch (const std::exception &failure) {
+        std::fprintf(stderr, "zuv-service: %s\n", failure.what());
+        ctx->error = INTERNAL_ERROR;
+        return nullptr;
+    }
+}
+
+int enclosures::write(void *handle, const char *data, std::size_t length)
+{
+    arrived_bytes_ += length;
+    too_large_ = arrived_bytes_ > config_.attachment_limit;
+    if (too_large_)
+        return TOO_LARGE;
+    try {
+        static_cast<arriving_file *>(handle)->write(data, length);
+        return 0;
+    } catch (const std::exception &failure) {
+        std::fprintf(stderr, "zuv-service: %s\n", failure.what());
+        return INTERNAL_ERROR;
+    }
+}
+
+void enclosures::close(void *handle)
+{
+    try {
+        static_cast<arriving_file *>(handle)->flush(); // now, as nobody waits for this connection
+    } catch (const std::exception &failure) {
+        std::fprintf(stderr, "zuv-service: %s\n", failure.what()); // whoever keeps it tries again
+    }
+}
+
+bool enclosures::find(soap *ctx, const std::string &reference, enclosed_data &found)
+{
+    for (const soap_attachment *list : {ctx->dime.list, ctx->mime.list}) {
+        for (const soap_attachment *a = list; a != nullptr; a = a->next) {
+            if (a == ctx->mime.root || a->content == nullptr ||
+                soap_cid_compare(ctx, reference.c_str(), a->id) != 0)
+                continue;
+            const auto file = std::find_if(files_.begin(), files_.end(), [a](const arriving_file &f) {
+                return static_cast<const void *>(&f) == a->content;
+            });
+            found = {file == files_.end() ? nullptr : &*file, a->content, a->size};
+            return true;
+        }
+    }
+    return false;
+}
+
+void enclosures::keep(const enclosed_data &data, std::string_view name)
+{
+    if (data.file != nullptr) {
+        data.file->keep_as(name);
+        return;
+    }
+    arriving_file copy(directory_);
+    copy.write(data.content, static_cast<std::size_t>(data.size));
+    copy.keep_as(name);
+}
+
+// ---------------------------------------------------------------------------------------------
+// Out.
+
+void enclosures::enclose(const std::string &name)
+{
+    if (has_form())
+        outgoing_.emplace_back(directory_, name);
+}
+
+void *enclosures::reopen(void *handle)
+{
+    const bool is_file = std::any_of(outgoing_.begin(), outgoing_.end(),
+                                     [handle](const outgoing &o) { return &o.file == handle; });
+    return is_file ? handle : nullptr;
+}
+
+std::size_t enclosures::read(void *handle, char *buffer, std::size_t length)
+{
+    return static_cast<kept_file *>(handle)->read(buffer, length);
+}
+
+int enclosures::attach_all(soap *ctx)
+{
+    for (outgoing &o : outgoing_) {
+        char *const handle = reinterpret_cast<char *>(&o.file);
+        const auto size = static_cast<std::size_t>(o.file.size());
+        const int result = (form_ & MODE_MIME) != 0
+                               ? soap_mime_attach(ctx, handle, size, MIME_BINARY, MEDIA_TYPE,
+                                                  o.bracketed_id.c_str(), nullptr, nullptr)
+                               : soap_dime_attach(ctx, handle, size, MEDIA_TYPE, o.id.c_str(), 0, nullptr);
+        if (result != SOAP_OK)
+            return result;
+    }
+    return SOAP_OK;
+}
+
+} // namespace service

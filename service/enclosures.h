@@ -1,0 +1,91 @@
+// enclosures.h - attachments that travel beside messages: those of a request go into files while they arrive,
+// those of an answer come out of files.
+//
+// Here: the context's callbacks for them, and their limits. Elsewhere: the files (data_files.h), what
+// documents say of them (attachments.h), the rest of a request (reception.h).
+#pragma once
+
+#include <cstdint>
+#include <list>
+#include <string>
+#include <string_view>
+#include <utility>
+
+#include <zuv_client_pro/soap.h>
+
+#include "data_files.h"
+#include "settings.h"
+
+namespace service {
+
+// An attachment that came with the request: in a file, or in memory if it stood ahead of the message or is
+// the value of an element.
+struct enclosed_data {
+    arriving_file *file; // null: in memory
+    const char *content;
+    std::uint64_t size;
+};
+
+class enclosures {
+public:
+    enclosures(const settings &config, std::string directory)
+        : config_(config), directory_(std::move(directory))
+    {}
+
+    // Forgets the exchange before; files that nobody has kept go.
+    void expect_next();
+    // Such files go now, since the request is refused.
+    void discard_arrived() { files_.clear(); }
+
+    // The form that a request's head tells (MODE_DIME, MODE_MIME), and the message itself (MODE_MTOM).
+    void set_form(std::uint32_t form) { form_ = form; }
+    void add_form(std::uint32_t form) { form_ |= form; }
+    bool has_form() const { return form_ != 0; }
+
+    // The callbacks for what arrives, in the forms of DIME and MIME. `write` returns 0 or an HTTP status.
+    void *open(soap *ctx, const char *id);
+    int write(void *handle, const char *data, std::size_t length);
+    void close(void *handle);
+
+    // For what goes out: the handle if it is one of a file, null for the bytes of a value.
+    void *reopen(void *handle);
+    std::size_t read(void *handle, char *buffer, std::size_t length);
+
+    bool too_large() const { return too_large_; }
+
+    // What a reference ("cid:...") of the request means; false if nothing does.
+    bool find(soap *ctx, const std::string &reference, enclosed_data &found);
+
+    // Keeps it under a name.
+    void keep(const enclosed_data &data, std::string_view name);
+
+    // A kept file goes with the answer, under the id of its name. Nothing happens for a request without form.
+    void enclose(const std::string &name);
+
+    // The modes of the answer, 0 without enclosures; adds the files to a message about to be counted. 0
+    // or 20.
+    std::uint32_t answer_form() const { return outgoing_.empty() ? 0 : form_; }
+    int attach_all(soap *ctx);
+
+    const std::string &directory() const { return directory_; }
+
+private:
+    struct outgoing {
+        outgoing(const std::string &directory, const std::string &name)
+            : id(name), bracketed_id("<" + name + ">"), file(directory, name)
+        {}
+        std::string id, bracketed_id;
+        kept_file file;
+    };
+
+    const settings &config_;
+    std::string directory_;
+    std::uint32_t form_ = 0;
+    std::uint64_t arrived_bytes_ = 0;
+    std::size_t arrived_ = 0; // attachments, in memory or in files
+    bool too_large_ = false;
+    std::list<arriving_file> files_;
+    std::list<outgoing> outgoing_;
+};
+
+} // namespace service

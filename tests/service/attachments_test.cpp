@@ -1,0 +1,308 @@
+// attachments_test.cpp - data that travels beside the messages: kept as files, given back, forgotten.
+#include <filesystem>
+#include <fstream>
+#include <string>
+
+#include <gtest/gtest.h>
+
+#include <zuv_client_pro/StatusReportSoapBindingProxy.h>
+#include <zuv_client_pro/soap_attachment.h>
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_log.h>
+
+#include "service/raw_client.h"
+#include "service/service_process.h"
+#include "support/host_streams.h"
+
+using namespace service_test;
+
+namespace {
+
+std::string some_bytes(std::size_t size)
+{
+    std::string bytes(size, '\0');
+    for (std::size_t i = 0; i < size; ++i)
+        bytes[i] = "\r\n-=x\0\xFFy"[i * 2654435761U >> 13 & 7];
+    return bytes;
+}
+
+struct form {
+    const char *name;
+    std::uint32_t mode;
+};
+constexpr form FORMS[] = {
+    {"DIME", MODE_DIME},
+    {"DIME in chunks", MODE_DIME | MODE_CHUNKED},
+    {"MIME", MODE_MIME},
+    {"MIME in chunks", MODE_MIME | MODE_CHUNKED},
+    {"MTOM", MODE_MIME | MODE_MTOM},
+    {"MTOM in chunks", MODE_MIME | MODE_MTOM | MODE_CHUNKED},
+};
+
+// A host that sends streams beside its status reports and takes what comes back.
+class stream_client {
+public:
+    stream_client(const service_process &service, std::uint32_t form_mode)
+        : form_(form_mode), url_(service.url("StatusReport")),
+          proxy(static_cast<int>(MODE_KEEP_ALIVE | MODE_UTF_STRINGS),
+                static_cast<int>(MODE_KEEP_ALIVE | MODE_UTF_STRINGS | form_mode))
+    {
+        proxy.endpoint = url_.c_str();
+        soap_log_set_received(&proxy, nullptr);
+        soap_log_set_sent(&proxy, nullptr);
+        host.serve(proxy);
+    }
+
+    void enclose(host_stream &stream, const char *id)
+    {
+        char *const handle = reinterpret_cast<char *>(&stream);
+        const std::size_t size = (form_ & MODE_CHUNKED) == MODE_CHUNKED ? 0 : stream.data.size();
+        if ((form_ & MODE_MIME) != 0)
+            ASSERT_EQ(soap_mime_attach(&proxy, handle, size, MIME_BINARY, "a/b", id, nullptr, nullptr), 0);
+        else
+            ASSERT_EQ(soap_dime_attach(&proxy, handle, size, "a/b", id, 0, nullptr), 0);
+    }
+
+    template <class Request, class Response>
+    const protocolStatusReport__StatusReportContent *
+    call(int (StatusReportSoapBindingProxy::*operation)(Request *, Response &), Request &request)
+    {
+        header_.targetURI = &target;
+        if (target.empty())
+            proxy.soap_noheader();
+        else
+            proxy.soap_header(&header_);
+        Response response{};
+        error = (proxy.*operation)(&request, response);
+        return response.result;
+    }
+
+    // What came with the last answer under a reference; null if nothing did.
+    const host_stream *received(const std::string *reference)
+    {
+        if (reference == nullptr)
+            return nullptr;
+        for (const soap_attachment *list : {proxy.dime.list, proxy.mime.list})
+            for (; list != nullptr; list = list->next)
+                if (list->id != nullptr && soap_cid_compare(&proxy, reference->c_str(), list->id) == 0)
+                    return host.find(list->content);
+        return nullptr;
+    }
+
+private:
+    std::uint32_t form_;
+    std::string url_;
+    protocol__Header header_;
+
+public:
+    stream_host host;
+    StatusReportSoapBindingProxy proxy;
+    std::string target;
+    int error = 0;
+};
+
+std::size_t files_in(const std::string &directory)
+{
+    const std::filesystem::directory_iterator all(directory);
+    return static_cast<std::size_t>(std::distance(begin(all), end(all)));
+}
+
+std::string contents(const std::filesystem::path &path)
+{
+    std::ifstream file(path, std::ios::binary);
+    return {std::istreambuf_iterator<char>(file), {}};
+}
+
+// A message of MIME parts as other toolkits write them. `parts`: each "CONTENT-ID|CONTENT".
+std::string mime_post(const char *port, const std::string &message, const std::vector<std::string> &parts)
+{
+    std::string body = "--edge\r\nContent-Type: text/xml\r\nContent-ID: <root>\r\n\r\n" + message;
+    for (const std::string &part : parts)
+        body += "\r\n--edge\r\nContent-ID: <" + part.substr(0, part.find('|')) + ">\r\n\r\n" +
+                part.substr(part.find('|') + 1);
+    std::string request = post(port, body + "\r\n--edge--\r\n");
+    return request.replace(request.find("text/xml"), 8,
+                           "multipart/related; boundary=edge; type=\"text/xml\"; start=\"<root>\"");
+}
+
+// A problem report, and a request to add to one; each with an attachment that refers to data.
+std::string report_with(const std::string &reference)
+{
+    return "<protocolProblemReport:submitRequest><protocol:attachment><protocol:dataHandler>" + reference +
+           "</protocol:dataHandler></protocol:attachment></protocolProblemReport:submitRequest>";
+}
+
+std::string addition_of(const std::string &reference)
+{
+    return "<protocolProblemReport:attachRequest><protocolProblemReport:attachment><protocol:dataHandler>" +
+           reference +
+           "</protocol:dataHandler></protocolProblemReport:attachment>"
+           "</protocolProblemReport:attachRequest>";
+}
+
+} // namespace
+
+TEST(Attachments, ComeBackAsTheyWereInEveryForm)
+{
+    scratch_directory place;
+    service_process service({"--database", place.file("documents.db")});
+    const std::string directory = place.file("documents.db-data");
+    for (const form &f : FORMS) {
+        SCOPED_TRACE(f.name);
+        stream_client client(service, f.mode);
+        host_stream large{some_bytes(300001)}, small{"in memory"};
+        std::string large_reference = "cid:la%72ge", small_reference = "cid:small";
+        protocol__Attachment first, second;
+        first.dataHandler = &large_reference;
+        second.dataHandler = &small_reference;
+        first.attachment = {&second}; // attachments may hold attachments
+        protocolStatusReport__StatusReportContent report;
+        report.attachment = {&first};
+        client.enclose(large, "large");
+        client.enclose(small, "small");
+        const auto *created = client.call(&StatusReportSoapBindingProxy::create, report);
+        ASSERT_NE(created, nullptr) << client.error;
+        EXPECT_EQ(*created->attachment.at(0)->size, "300001");
+        EXPECT_EQ(*created->attachment.at(0)->state, protocol__AttachmentState::complete);
+        EXPECT_EQ(client.received(created->attachment.at(0)->dataHandler), nullptr) << "the client has it";
+        client.target = created->thisURI.at(0);
+        const std::string port = *created->attachment.at(0)->dataPort.at(0)->dataURI;
+        EXPECT_EQ(files_in(directory), 2u);
+        EXPECT_EQ(contents(directory + port.substr(port.rfind('/'))), large.data);
+
+        // Whole messages one after the other on one connection, so nothing of an attachment is left over.
+        _protocolStatusReport__getRequest get;
+        for (int round = 0; round < 2; ++round) {
+            const auto *got = client.call(&StatusReportSoapBindingProxy::get, get);
+            ASSERT_NE(got, nullptr) << client.error;
+            const protocol__Attachment &outer = *got->attachment.at(0);
+            const host_stream *stream = client.received(outer.dataHandler);
+            ASSERT_NE(stream, nullptr);
+            EXPECT_TRUE(stream->data == large.data);
+            stream = client.received(outer.attachment.at(0)->dataHandler);
+            ASSERT_NE(stream, nullptr);
+            EXPECT_EQ(stream->data, small.data);
+        }
+        EXPECT_EQ(
+            exchange(service.port(), "GET " + port.substr(port.find("/zuv")) + " HTTP/1.1\r\n\r\n").body,
+            large.data)
+            << "those who don't ask in a form with attachments have the data port";
+
+        // What a new version of the report no longer refers to is forgotten, what it refers to stays.
+        const auto *got = client.call(&StatusReportSoapBindingProxy::get, get);
+        ASSERT_NE(got, nullptr);
+        protocolStatusReport__StatusReportContent next;
+        next.attachment = {got->attachment.at(0)->attachment.at(0)};
+        ASSERT_NE(client.call(&StatusReportSoapBindingProxy::submit, next), nullptr) << client.error;
+        EXPECT_EQ(files_in(directory), 1u);
+        ASSERT_NE(client.call(&StatusReportSoapBindingProxy::remove, next), nullptr);
+        EXPECT_EQ(files_in(directory), 0u);
+    }
+}
+
+TEST(Attachments, GoWithProblemReportsToo)
+{
+    service_process service;
+    raw_answer answer =
+        exchange(service.port(),
+                 mime_post("ProblemReport", soap11(report_with("cid:dump@machine")),
+                           {"unwanted|nobody refers to it", "dump@machine|first line\r\n-- edge\r\n--edg"}));
+    ASSERT_EQ(answer.status, 200) << answer.body;
+    const std::string target =
+        "<protocol:targetURI>" + element_text(answer.body, "thisURI") + "</protocol:targetURI>";
+    answer = exchange(service.port(),
+                      mime_post("ProblemReport", soap11("<protocolProblemReport:getRequest/>", target), {}));
+    EXPECT_TRUE(answer.has("multipart/related")) << answer.head;
+    const std::string name = element_text(answer.body, "dataHandler").substr(4);
+    EXPECT_NE(answer.body.find("Content-ID: <" + name + ">\r\n\r\nfirst line\r\n-- edge\r\n--edg\r\n--"),
+              std::string::npos)
+        << answer.body;
+    EXPECT_EQ(answer.body.find("nobody refers to it"), std::string::npos);
+
+    answer = exchange(service.port(),
+                      mime_post("ProblemReport", soap11(addition_of("cid:log"), target), {"log|more"}));
+    ASSERT_EQ(answer.status, 200) << answer.body;
+    const std::string uri = answer.body.substr(answer.body.rfind("urn:zuv:attachment:"), 55);
+    answer = exchange(
+        service.port(),
+        mime_post("ProblemReport",
+                  soap11("<protocolProblemReport:attachStatusRequest><protocol:attachmentURI>" + uri +
+                             "</protocol:attachmentURI><protocol:intention>retry</protocol:intention>"
+                             "</protocolProblemReport:attachStatusRequest>",
+                         target),
+                  {}));
+    EXPECT_NE(answer.body.find("\r\n\r\nmore\r\n--"), std::string::npos) << "sent once more: " << answer.body;
+    EXPECT_EQ(answer.body.find("first line"), std::string::npos) << "the other one isn't";
+    answer = exchange(service.port(),
+                      post("ProblemReport", soap11("<protocolProblemReport:getRequest/>", target)));
+    EXPECT_TRUE(answer.has("text/xml") && !answer.has("multipart")) << answer.head;
+    EXPECT_TRUE(element_text(answer.body, "dataHandler").empty()) << "a reference to nothing";
+}
+
+TEST(Attachments, LeaveNothingWhenTheRequestIsRefused)
+{
+    scratch_directory place;
+    service_process service(
+        {"--database", place.file("documents.db"), "--max-attachments", "100000", "--max-body", "20000"});
+    const std::string directory = place.file("documents.db-data");
+    const std::string message = soap11(report_with("cid:data"));
+    const std::string whole = mime_post("ProblemReport", message, {"data|" + some_bytes(50000)});
+    std::vector<std::string> crowd;
+    for (int i = 0; i < 1001; ++i)
+        crowd.push_back(std::to_string(i) + "|x");
+    const struct {
+        const char *what;
+        std::string request;
+        int status;
+    } cases[] = {
+        {"nothing has the id", mime_post("ProblemReport", message, {"other|" + some_bytes(50000)}), 500},
+        {"too long", mime_post("ProblemReport", message, {"data|" + some_bytes(100001)}), 413},
+        {"too long together",
+         mime_post("ProblemReport", message, {"data|" + some_bytes(60000), "x|" + some_bytes(60000)}), 413},
+        {"too many", mime_post("ProblemReport", message, crowd), 413},
+        {"two of one id", mime_post("ProblemReport", message, {"data|1", "data|2"}), 400},
+        {"a document that is too long",
+         mime_post("ProblemReport",
+                   soap11("<protocolProblemReport:submitRequest><protocolProblemReport:title>" +
+                          std::string(100000, 'x') +
+                          "</protocolProblemReport:title></protocolProblemReport:submitRequest>"),
+                   {"data|1"}),
+         413},
+    };
+    for (const auto &c : cases) {
+        EXPECT_EQ(exchange(service.port(), c.request).status, c.status) << c.what;
+        EXPECT_EQ(files_in(directory), 0u) << c.what;
+    }
+    for (const std::size_t cut : {whole.size() - 4, whole.size() / 2}) {
+        raw_client client(service.port());
+        client.send(whole.substr(0, cut));
+        client.end_sending();
+        EXPECT_EQ(client.receive().status, 400);
+        EXPECT_TRUE(client.ended());
+        EXPECT_EQ(files_in(directory), 0u) << "cut at " << cut;
+    }
+    EXPECT_EQ(exchange(service.port(), whole).status, 200) << "the limits are those of refused ones";
+    EXPECT_EQ(files_in(directory), 1u);
+}
+
+TEST(Attachments, OutliveTheProcessThatKeptThem)
+{
+    scratch_directory place;
+    const std::string directory = place.file("documents.db-data");
+    std::string target;
+    {
+        service_process service({"--database", place.file("documents.db")});
+        const raw_answer answer = exchange(
+            service.port(), mime_post("ProblemReport", soap11(report_with("cid:data")), {"data|kept"}));
+        target = "<protocol:targetURI>" + element_text(answer.body, "thisURI") + "</protocol:targetURI>";
+        service.kill();
+    }
+    std::ofstream(directory + "/arriving-ABCDEF") << "half of it";
+    std::ofstream(directory + "/00000000-0000-4000-8000-000000000000") << "nobody's";
+    service_process service({"--database", place.file("documents.db")});
+    EXPECT_EQ(files_in(directory), 1u) << "what an earlier end left over is swept away";
+    const raw_answer answer =
+        exchange(service.port(),
+                 mime_post("ProblemReport", soap11("<protocolProblemReport:getRequest/>", target), {}));
+    EXPECT_NE(answer.body.find("\r\n\r\nkept\r\n--"), std::string::npos) << answer.body;
+}
