@@ -91,7 +91,7 @@ std::set<std::string> names_in(const attachments &list)
         for (const protocol__DataPort *port : attachment.dataPort) {
             const std::string &uri = port == nullptr ? text_of(nullptr) : text_of(port->dataURI);
             const std::size_t path = uri.find(DATA_PATH);
-            if (path != uri.npos)
+            if (path != std::string::npos)
                 names.insert(uri.substr(path + DATA_PATH.size()));
         }
     });

@@ -114,9 +114,12 @@ std::size_t kept_file::read(char *buffer, std::size_t length)
 {
     ssize_t count;
     do
-        count = ::read(descriptor_, buffer, length);
+        count = pread(descriptor_, buffer, length, static_cast<off_t>(position_));
     while (count < 0 && errno == EINTR);
-    return count < 0 ? 0 : static_cast<std::size_t>(count);
+    if (count < 0)
+        return 0;
+    position_ += static_cast<std::uint64_t>(count);
+    return static_cast<std::size_t>(count);
 }
 
 void open_data_directory(const std::string &directory)

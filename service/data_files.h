@@ -51,7 +51,7 @@ public:
 
 private:
     int descriptor_;
-    std::uint64_t size_ = 0;
+    std::uint64_t size_ = 0, position_ = 0;
 };
 
 // Makes the directory unless it is there.

@@ -45,11 +45,11 @@ public:
     // The callbacks for what arrives, in the forms of DIME and MIME. `write` returns 0 or an HTTP status.
     void *open(soap *ctx, const char *id);
     int write(void *handle, const char *data, std::size_t length);
-    void close(void *handle);
+    static void close(void *handle);
 
     // For what goes out: the handle if it is one of a file, null for the bytes of a value.
     void *reopen(void *handle);
-    std::size_t read(void *handle, char *buffer, std::size_t length);
+    static std::size_t read(void *handle, char *buffer, std::size_t length);
 
     bool too_large() const { return too_large_; }
 

@@ -49,7 +49,7 @@ private:
             return config_.attachment_limit;
         return config_.body_limit + (enclosures_.has_form() ? SOAP_BUFFER_SIZE : 0);
     }
-    void install_attachment_hooks(soap *ctx);
+    static void install_attachment_hooks(soap *ctx);
     int settle_request(soap *ctx);
     int answer_get(soap *ctx);
     bool knows_sender(const soap *ctx) const;

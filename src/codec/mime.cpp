@@ -189,8 +189,8 @@ int store_description(soap *ctx, const char *text, const char *&field)
     auto *const copy = static_cast<char *>(soap_block_alloc(ctx, length + DIME_OPTIONS_MIN));
     if (copy == nullptr)
         return ctx->error;
-    std::memcpy(copy, text, length);
-    std::memset(copy + length, 0, DIME_OPTIONS_MIN);
+    std::memcpy(copy, text, length + 1);
+    std::memset(copy + length + 1, 0, DIME_OPTIONS_MIN - 1);
     field = copy;
     return SOAP_OK;
 }

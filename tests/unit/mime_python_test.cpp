@@ -50,7 +50,7 @@ for line in lines:
 TEST(python_email, takes_apart_what_is_sent)
 {
     const std::string text = "line one\r\nline two";
-    const std::string binary("\r\n--bb\0\xFF\r\n--=_zuv_\r", 20);
+    const std::string binary("\r\n--bb\0\xFF\r\n--=_zuv_\r", 19);
     const std::string nothing_special = "x";
     const std::string wanted =
         "a/b <a>|" + hex(text) + "|c/d <id2>|" + hex(binary) + "|e/f <x@y>|" + hex(nothing_special);
