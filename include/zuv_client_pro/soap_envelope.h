@@ -100,7 +100,7 @@ ZUV_API void soap_mark_header(soap *ctx);
 ZUV_API int soap_header_put(soap *ctx);
 ZUV_API int soap_header_get(soap *ctx);
 
-// The fault as the Body's content. soap_fault_get stores the record in ctx->fault, null included.
+// The fault as the Body's content. soap_fault_read stores the record in ctx->fault, null included.
 ZUV_API void soap_mark_fault(soap *ctx);
 ZUV_API int soap_fault_put(soap *ctx);
-ZUV_API int soap_fault_get(soap *ctx);
+ZUV_API int soap_fault_read(soap *ctx);

@@ -180,6 +180,10 @@ template <class R> bool record_in(soap *ctx, const char *tag, R **place)
 {
     if (soap_element_in_begin(ctx, tag, 1, nullptr))
         return false;
+    if (ctx->null_flag) {
+        *place = nullptr;
+        return !ctx->has_body || soap_element_in_end(ctx, tag) == 0;
+    }
     R *record = make<R>(ctx);
     *place = record;
     return record && record_content_in(ctx, tag, record);
@@ -407,7 +411,7 @@ int soap_fault_put(soap *ctx)
     return ctx->fault ? record_out(ctx, "SOAP-ENV:Fault", ctx->fault) : ctx->error;
 }
 
-int soap_fault_get(soap *ctx)
+int soap_fault_read(soap *ctx)
 {
     SOAP_ENV__Fault *fault = nullptr;
     if (record_in(ctx, "SOAP-ENV:Fault", &fault))
