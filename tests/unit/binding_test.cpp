@@ -247,6 +247,14 @@ TEST_F(Binding, references_forward_and_back_share_one_object)
     EXPECT_EQ(profile->contact[1], profile->contact[0]);
     EXPECT_EQ(profile->contact[1], profile->contact[2]);
     EXPECT_EQ(profile->contact[1]->name, profile->contact[1]->organization);
+    for (const char *xml :
+         {"<f><protocol:uri href=\"#s\"/><protocol:subcode id=\"s\">urn:x</protocol:subcode></f>",
+          "<f><protocol:subcode href=\"#s\"/><protocol:uri id=\"s\">urn:x</protocol:uri></f>"}) {
+        const auto *redirection = read<protocol__Server_x002eRedirection>(xml);
+        ASSERT_NE(nullptr, redirection) << ctx.error << " " << xml;
+        EXPECT_EQ("urn:x", redirection->uri) << "a text by value";
+        EXPECT_EQ("urn:x", *redirection->subcode) << xml;
+    }
     read<protocolProfile__ProfileContent>("<p><protocol:contact href=\"#nobody\"/></p>");
     EXPECT_EQ(SOAP_MISSING_ID, ctx.error);
     read<protocolProfile__ProfileContent>("<p><protocol:contact id=\"c\"/><protocol:contact id=\"c\"/></p>");
