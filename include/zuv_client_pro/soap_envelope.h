@@ -95,7 +95,8 @@ soap_fault_detail_field(soap *ctx); // raw text of the detail, by the rule versi
 ZUV_API const char *soap_fault_subcode_value(soap *ctx);
 ZUV_API const char *soap_fault_detail_value(soap *ctx);
 
-// The header's turn in a message. Each returns ctx->error.
+// The header's turn in a message. Each returns ctx->error. The block that is written bears mustUnderstand: a
+// peer that doesn't know it has to refuse the message.
 ZUV_API void soap_mark_header(soap *ctx);
 ZUV_API int soap_header_put(soap *ctx);
 ZUV_API int soap_header_get(soap *ctx);

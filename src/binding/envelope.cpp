@@ -214,10 +214,8 @@ template <class R> int record_out(soap *ctx, const char *tag, const R *record);
 
 int members_out(soap *ctx, const SOAP_ENV__Header &header)
 {
-    ctx->must_understand = 0;
-    return header.header
-               ? class_pointer_out(ctx, ops_of<protocol__Header>, "protocol:header", -1, header.header, "")
-               : write_absent(ctx, "protocol:header", occurs::optional);
+    ctx->must_understand = 1; // taken by the start tag of the block, or by its absence
+    return class_pointer_out(ctx, ops_of<protocol__Header>, "protocol:header", -1, header.header, "");
 }
 
 int members_out(soap *ctx, const SOAP_ENV__Code &code)
