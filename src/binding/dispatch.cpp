@@ -212,7 +212,7 @@ int soap_write_element(soap *ctx, void *object, const char *tag, int id, int typ
     case type_kind::object_vector:
         return write_vector(ctx, *entry, name, id, object);
     case type_kind::envelope:
-        return envelope_out(ctx, type, name, id, object);
+        return envelope_out(ctx, type, name, id, object, entry->xml_name);
     case type_kind::request:
     case type_kind::response:
         return write_wrapper(ctx, *entry, object);

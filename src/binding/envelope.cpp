@@ -210,7 +210,8 @@ int code_out(soap *ctx, const char *tag, const char *code)
     return soap_element_out_end(ctx, tag);
 }
 
-template <class R> int record_out(soap *ctx, const char *tag, const R *record);
+template <class R>
+int record_out(soap *ctx, const char *tag, const R *record, int id = 0, const char *type = "");
 
 int members_out(soap *ctx, const SOAP_ENV__Header &header)
 {
@@ -257,11 +258,11 @@ int members_out(soap *ctx, const SOAP_ENV__Fault &fault)
     return record_out(ctx, "SOAP-ENV:Detail", fault.Detail);
 }
 
-template <class R> int record_out(soap *ctx, const char *tag, const R *record)
+template <class R> int record_out(soap *ctx, const char *tag, const R *record, int id, const char *type)
 {
     if (!record)
         return 0;
-    if (soap_element_out_begin(ctx, tag, 0, "") || members_out(ctx, *record))
+    if (soap_element_out_begin(ctx, tag, id, type) || members_out(ctx, *record))
         return ctx->error;
     return soap_element_out_end(ctx, tag);
 }
@@ -334,11 +335,12 @@ void *envelope_in(soap *ctx, int type_id, const char *tag, void *record)
     });
 }
 
-int envelope_out(soap *ctx, int type_id, const char *tag, int, const void *record)
+int envelope_out(soap *ctx, int type_id, const char *tag, int id, const void *record, const char *type)
 {
     return with_record(type_id, [=](auto *r) {
         using R = std::remove_pointer_t<decltype(r)>;
-        return record_out(ctx, tag, static_cast<const R *>(record));
+        return record_out(ctx, tag, static_cast<const R *>(record), soap_element_id(ctx, id, record, type_id),
+                          type);
     });
 }
 
