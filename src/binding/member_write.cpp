@@ -67,7 +67,7 @@ int write_absent(soap *ctx, std::string_view tag, occurs how)
 {
     if (how == occurs::required)
         return soap_element_empty_nil(ctx, tag.data());
-    if (!(ctx->mode & MODE_NIL))
+    if (!(ctx->mode & MODE_NIL) && ctx->attributes_set == 0) // attributes need an element to stand on
         return 0;
     return soap_element_null(ctx, tag.data(), -1, "");
 }

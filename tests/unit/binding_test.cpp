@@ -212,6 +212,10 @@ TEST_F(Binding, attributes_come_first_and_a_required_one_is_missed_in_strict_mod
     EXPECT_EQ("<f xsi:type=\"protocolPRFilter:ProductComparison\" compareOp=\"containsPhrase\">"
               "<protocolPRFilter:product>P</protocolPRFilter:product></f>",
               write(comparison, "f"));
+    EXPECT_EQ("<protocolPRFilter:caseSensitive compareOp=\"containsPhrase\"/><protocolPRFilter:text "
+              "xsi:nil=\"true\"/>",
+              write(protocolPRFilter__ReportTextComparison(), "-f"))
+        << "without an element of its own";
     const std::string bare = "<f><protocolPRFilter:product>P</protocolPRFilter:product></f>";
     ASSERT_NE(nullptr, read<protocolPRFilter__ProductComparison>(bare));
     EXPECT_EQ(nullptr, read<protocolPRFilter__ProductComparison>(bare, MODE_STRICT));
