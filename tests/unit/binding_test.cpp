@@ -8,6 +8,7 @@
 #include <zuv_client_pro/protocolProblemReport.h>
 #include <zuv_client_pro/protocolProfile.h>
 #include <zuv_client_pro/protocolUpdateOrder.h>
+#include <zuv_client_pro/soap_binary.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_registry.h>
@@ -314,6 +315,11 @@ TEST_F(Binding, the_registry_makes_finds_and_destroys_by_id)
     ASSERT_NE(nullptr, identity);
     EXPECT_EQ(3 * sizeof(protocol__Identity), size);
     EXPECT_EQ(&ctx, identity[2].soap);
+    auto *binary = soap_instantiate_xsd__base64Binary(&ctx, 2, nullptr, nullptr, &size);
+    ASSERT_NE(nullptr, binary);
+    EXPECT_EQ(SOAP_TYPE_xsd__base64Binary, binary[1].soap_type());
+    EXPECT_EQ(2 * sizeof *binary, size);
+    soap_discard_objects(&ctx, binary);
     soap_discard_objects(&ctx, identity);
     EXPECT_EQ(nullptr, ctx.instance_list);
     EXPECT_EQ(nullptr, soap_instantiate(&ctx, 893, nullptr, nullptr, nullptr));
