@@ -2,6 +2,7 @@
 #pragma once
 
 #include <zuv_client_pro/soap.h>
+#include <zuv_client_pro/soap_registry.h>
 
 class ZUV_CLASS xsd__base64Binary {
 public:
@@ -24,3 +25,12 @@ public:
     virtual void *soap_in(struct soap *ctx, const char *tag, const char *type);
     virtual ~xsd__base64Binary();
 };
+
+// Makes managed objects, as soap_instantiate_T of every class (soap_class.h).
+inline xsd__base64Binary *soap_instantiate_xsd__base64Binary(struct soap *ctx, int n, const char *xsi_type,
+                                                             const char *array_type, std::size_t *size)
+{
+    constexpr int type_id = 10;
+    return static_cast<xsd__base64Binary *>(
+        soap_instantiate_array(ctx, type_id, n, xsi_type, array_type, size));
+}

@@ -95,12 +95,13 @@ soap_fault_detail_field(soap *ctx); // raw text of the detail, by the rule versi
 ZUV_API const char *soap_fault_subcode_value(soap *ctx);
 ZUV_API const char *soap_fault_detail_value(soap *ctx);
 
-// The header's turn in a message. Each returns ctx->error.
+// The header's turn in a message. Each returns ctx->error. The block that is written bears mustUnderstand: a
+// peer that doesn't know it has to refuse the message.
 ZUV_API void soap_mark_header(soap *ctx);
 ZUV_API int soap_header_put(soap *ctx);
 ZUV_API int soap_header_get(soap *ctx);
 
-// The fault as the Body's content. soap_fault_get stores the record in ctx->fault, null included.
+// The fault as the Body's content. soap_fault_read stores the record in ctx->fault, null included.
 ZUV_API void soap_mark_fault(soap *ctx);
 ZUV_API int soap_fault_put(soap *ctx);
-ZUV_API int soap_fault_get(soap *ctx);
+ZUV_API int soap_fault_read(soap *ctx);

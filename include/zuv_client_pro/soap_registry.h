@@ -19,7 +19,7 @@ ZUV_API void *soap_instantiate_array(soap *ctx, int type, int count, const char 
 ZUV_API int soap_delete_object(soap_instance *entry);
 // Reads whatever known element comes next. `type` takes its id. Null with error 3 if nobody knows it.
 ZUV_API void *soap_read_element(soap *ctx, int *type);
-// Writes an object by type id; null tag: its XML type's name. Ids outside 1 to 877 write nothing and give 0.
+// Writes an object by type id, with xsi:type; null tag: its XML type's name. Ids beyond 1 to 877: nothing, 0.
 ZUV_API int soap_write_element(soap *ctx, void *object, const char *tag, int id, int type);
 // The mark pass by type id.
 ZUV_API void soap_mark_object(soap *ctx, void *object, int type);

@@ -139,12 +139,16 @@ int write_chars(soap *ctx, const type_entry &entry, const char *tag, int id, cha
     return soap_string_element_out(ctx, tag, id, text, entry.xml_name, type);
 }
 
+// Items that are held by pointer may be null or shared, as those of a member.
 int write_vector(soap *ctx, const type_entry &entry, const char *tag, int id, const void *vector)
 {
+    const type_entry &item_entry = type_entries[entry.item];
     const std::size_t length = entry.vector->length(vector);
     for (std::size_t i = 0; i < length; ++i) {
         void *item = const_cast<void *>(entry.vector->item(vector, i));
-        if (item && soap_write_element(ctx, item, tag, id, entry.item))
+        if (entry.kind == type_kind::object_vector
+                ? class_pointer_out(ctx, *item_entry.ops, tag, id, item, item_entry.xml_name)
+                : soap_write_element(ctx, item, tag, id, entry.item))
             return ctx->error;
     }
     return 0;
@@ -159,7 +163,8 @@ int write_wrapper(soap *ctx, const type_entry &entry, const void *record)
 int write_pointer(soap *ctx, const type_entry &entry, const char *tag, int id, const void *place)
 {
     const void *object = *static_cast<void *const *>(place);
-    return class_pointer_out(ctx, *type_entries[entry.item].ops, tag, id, object, "");
+    const type_entry &target = type_entries[entry.item];
+    return class_pointer_out(ctx, *target.ops, tag, id, object, target.xml_name);
 }
 
 } // namespace
@@ -194,12 +199,12 @@ int soap_write_element(soap *ctx, void *object, const char *tag, int id, int typ
         return write_chars(ctx, *entry, name, id, reinterpret_cast<char *const *>(&object), type);
     case type_kind::text:
         return write_text_element(ctx, name, soap_element_id(ctx, id, object, type),
-                                  *static_cast<const std::string *>(object));
+                                  *static_cast<const std::string *>(object), entry->xml_name);
     case type_kind::simple:
         return entry->simple->out(ctx, name, id, object, entry->xml_name);
     case type_kind::enumeration:
         return write_code(ctx, name, soap_element_id(ctx, id, object, type),
-                          *static_cast<std::int32_t *>(object), *entry->names);
+                          *static_cast<std::int32_t *>(object), *entry->names, entry->xml_name);
     case type_kind::object:
         return entry->ops->out(object, ctx, name, id, entry->xml_name);
     case type_kind::text_vector:
@@ -207,7 +212,7 @@ int soap_write_element(soap *ctx, void *object, const char *tag, int id, int typ
     case type_kind::object_vector:
         return write_vector(ctx, *entry, name, id, object);
     case type_kind::envelope:
-        return envelope_out(ctx, type, name, id, object);
+        return envelope_out(ctx, type, name, id, object, entry->xml_name);
     case type_kind::request:
     case type_kind::response:
         return write_wrapper(ctx, *entry, object);

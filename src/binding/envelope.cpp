@@ -180,6 +180,10 @@ template <class R> bool record_in(soap *ctx, const char *tag, R **place)
 {
     if (soap_element_in_begin(ctx, tag, 1, nullptr))
         return false;
+    if (ctx->null_flag) {
+        *place = nullptr;
+        return !ctx->has_body || soap_element_in_end(ctx, tag) == 0;
+    }
     R *record = make<R>(ctx);
     *place = record;
     return record && record_content_in(ctx, tag, record);
@@ -206,14 +210,13 @@ int code_out(soap *ctx, const char *tag, const char *code)
     return soap_element_out_end(ctx, tag);
 }
 
-template <class R> int record_out(soap *ctx, const char *tag, const R *record);
+template <class R>
+int record_out(soap *ctx, const char *tag, const R *record, int id = 0, const char *type = "");
 
 int members_out(soap *ctx, const SOAP_ENV__Header &header)
 {
-    ctx->must_understand = 0;
-    return header.header
-               ? class_pointer_out(ctx, ops_of<protocol__Header>, "protocol:header", -1, header.header, "")
-               : write_absent(ctx, "protocol:header", occurs::optional);
+    ctx->must_understand = 1; // taken by the start tag of the block, or by its absence
+    return class_pointer_out(ctx, ops_of<protocol__Header>, "protocol:header", -1, header.header, "");
 }
 
 int members_out(soap *ctx, const SOAP_ENV__Code &code)
@@ -255,11 +258,11 @@ int members_out(soap *ctx, const SOAP_ENV__Fault &fault)
     return record_out(ctx, "SOAP-ENV:Detail", fault.Detail);
 }
 
-template <class R> int record_out(soap *ctx, const char *tag, const R *record)
+template <class R> int record_out(soap *ctx, const char *tag, const R *record, int id, const char *type)
 {
     if (!record)
         return 0;
-    if (soap_element_out_begin(ctx, tag, 0, "") || members_out(ctx, *record))
+    if (soap_element_out_begin(ctx, tag, id, type) || members_out(ctx, *record))
         return ctx->error;
     return soap_element_out_end(ctx, tag);
 }
@@ -332,11 +335,12 @@ void *envelope_in(soap *ctx, int type_id, const char *tag, void *record)
     });
 }
 
-int envelope_out(soap *ctx, int type_id, const char *tag, int, const void *record)
+int envelope_out(soap *ctx, int type_id, const char *tag, int id, const void *record, const char *type)
 {
     return with_record(type_id, [=](auto *r) {
         using R = std::remove_pointer_t<decltype(r)>;
-        return record_out(ctx, tag, static_cast<const R *>(record));
+        return record_out(ctx, tag, static_cast<const R *>(record), soap_element_id(ctx, id, record, type_id),
+                          type);
     });
 }
 
@@ -407,7 +411,7 @@ int soap_fault_put(soap *ctx)
     return ctx->fault ? record_out(ctx, "SOAP-ENV:Fault", ctx->fault) : ctx->error;
 }
 
-int soap_fault_get(soap *ctx)
+int soap_fault_read(soap *ctx)
 {
     SOAP_ENV__Fault *fault = nullptr;
     if (record_in(ctx, "SOAP-ENV:Fault", &fault))

@@ -14,7 +14,7 @@ void envelope_destroy(int type_id, void *record, int count);
 
 // Reading and writing by type id, tag included.
 void *envelope_in(soap *ctx, int type_id, const char *tag, void *record);
-int envelope_out(soap *ctx, int type_id, const char *tag, int id, const void *record);
+int envelope_out(soap *ctx, int type_id, const char *tag, int id, const void *record, const char *type);
 void envelope_mark(soap *ctx, int type_id, const void *record);
 
 } // namespace binding

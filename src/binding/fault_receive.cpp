@@ -59,7 +59,7 @@ int soap_fault_receive(soap *ctx, int check)
     if (!check && !may_be_fault(ctx))
         return result;
     ctx->error = 0;
-    if (soap_fault_get(ctx)) {
+    if (soap_fault_read(ctx)) {
         if (check && ctx->error == SOAP_TAG_MISMATCH && ctx->nesting_level == 2)
             return ctx->error = 0;
         result = keep_error(ctx, result);

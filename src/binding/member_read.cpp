@@ -197,21 +197,11 @@ bool read_text_pointer(soap *ctx, const char *tag, void **place)
     return ends(ctx, tag, body);
 }
 
-bool read_text_value(soap *ctx, const char *tag, std::string &value)
-{
-    if (soap_element_in_begin(ctx, tag, 1, nullptr))
-        return false;
-    value.clear();
-    const bool body = ctx->has_body != 0;
-    if (body && !ctx->null_flag && !read_text_content(ctx, value))
-        return false;
-    return ends(ctx, tag, body);
-}
-
 bool read_text_object(soap *ctx, const char *tag, std::string *text)
 {
     if (soap_element_in_begin(ctx, tag, 1, nullptr) || !registers(ctx, text, TEXT_TYPE_ID, sizeof *text))
         return false;
+    text->clear();
     const bool body = ctx->has_body != 0;
     if (is_reference(ctx)) {
         return soap_object_forward(ctx, ctx->element_href, text, 0, TEXT_TYPE_ID, 0, sizeof *text, 0,

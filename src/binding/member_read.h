@@ -24,8 +24,7 @@ namespace binding {
 
 bool read_text_content(soap *ctx, std::string &text); // of the element whose start tag was consumed
 bool read_text_pointer(soap *ctx, const char *tag, void **place);
-bool read_text_object(soap *ctx, const char *tag, std::string *text); // a text that stands by itself
-bool read_text_value(soap *ctx, const char *tag, std::string &value); // by value; nil gives the empty text
+bool read_text_object(soap *ctx, const char *tag, std::string *text); // by value; nil gives the empty text
 bool read_code_value(soap *ctx, const char *tag, std::int32_t *place, const enum_table &names);
 bool read_code_pointer(soap *ctx, const char *tag, void **place, const enum_table &names);
 bool read_boolean_value(soap *ctx, const char *tag, bool *place);
@@ -66,7 +65,7 @@ requires(std::is_arithmetic_v<V> || std::is_enum_v<V> ||
                                                          int)
 {
     if constexpr (std::is_same_v<V, std::string>)
-        return read_text_value(ctx, tag, member);
+        return read_text_object(ctx, tag, &member);
     else if constexpr (std::is_same_v<V, bool>)
         return read_boolean_value(ctx, tag, &member);
     else if constexpr (std::is_enum_v<V>)

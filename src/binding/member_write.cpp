@@ -24,11 +24,11 @@ bool is_tree(const soap *ctx)
 }
 
 // An element with character data alone.
-int write_characters(soap *ctx, std::string_view tag, int id, std::string_view text)
+int write_characters(soap *ctx, std::string_view tag, int id, std::string_view text, const char *type)
 {
-    if (id <= 0)
+    if (id <= 0 && *type == '\0')
         return xml_text_element_plain(ctx, tag.data(), tag.size(), text.data(), text.size());
-    if (soap_element_out_begin(ctx, tag.data(), id, "") ||
+    if (soap_element_out_begin(ctx, tag.data(), id, type) ||
         soap_text_write_n(ctx, text.data(), text.size(), 0))
         return ctx->error;
     return soap_element_out_end(ctx, tag.data());
@@ -41,11 +41,11 @@ int write_text(soap *ctx, const std::string &text)
     return soap_text_write_n(ctx, text.data(), text.size(), 0);
 }
 
-int write_text_element(soap *ctx, std::string_view tag, int id, const std::string &text)
+int write_text_element(soap *ctx, std::string_view tag, int id, const std::string &text, const char *type)
 {
     if (text.empty() && (ctx->mode & MODE_NULL_STRINGS))
-        return soap_element_null(ctx, tag.data(), id, "");
-    return write_characters(ctx, tag, id, text);
+        return soap_element_null(ctx, tag.data(), id, type);
+    return write_characters(ctx, tag, id, text, type);
 }
 
 int write_text_pointer(soap *ctx, std::string_view tag, const std::string *text, occurs how)
@@ -67,23 +67,24 @@ int write_absent(soap *ctx, std::string_view tag, occurs how)
 {
     if (how == occurs::required)
         return soap_element_empty_nil(ctx, tag.data());
-    if (!(ctx->mode & MODE_NIL))
+    if (!(ctx->mode & MODE_NIL) && ctx->attributes_set == 0) // attributes need an element to stand on
         return 0;
     return soap_element_null(ctx, tag.data(), -1, "");
 }
 
-int write_code(soap *ctx, std::string_view tag, int id, std::int32_t code, const enum_table &names)
+int write_code(soap *ctx, std::string_view tag, int id, std::int32_t code, const enum_table &names,
+               const char *type)
 {
     const char *text =
         static_cast<std::uint32_t>(code) < names.count ? names.codes[code].name : soap_long_text(ctx, code);
-    return write_characters(ctx, tag, id, text);
+    return write_characters(ctx, tag, id, text, type);
 }
 
-int write_boolean(soap *ctx, std::string_view tag, int id, const bool *value)
+int write_boolean(soap *ctx, std::string_view tag, int id, const bool *value, const char *type)
 {
     unsigned char byte; // a host may have stored any byte: one that is no boolean has no word
     std::memcpy(&byte, value, sizeof byte);
-    return write_characters(ctx, tag, id, byte == 1 ? "true" : byte == 0 ? "false" : "");
+    return write_characters(ctx, tag, id, byte == 1 ? "true" : byte == 0 ? "false" : "", type);
 }
 
 int write_code_attribute(soap *ctx, const char *name, std::int32_t code, const enum_table &names)

@@ -15,13 +15,15 @@
 
 namespace binding {
 
-// --- leaves; `tag` is terminated ---
+// --- leaves; `tag` is terminated, `type` is the xsi:type or empty ---
 
-int write_text_element(soap *ctx, std::string_view tag, int id, const std::string &text);
+int write_text_element(soap *ctx, std::string_view tag, int id, const std::string &text,
+                       const char *type = "");
 int write_text_pointer(soap *ctx, std::string_view tag, const std::string *text, occurs how);
 int write_text(soap *ctx, const std::string &text); // character data, no element
-int write_code(soap *ctx, std::string_view tag, int id, std::int32_t code, const enum_table &names);
-int write_boolean(soap *ctx, std::string_view tag, int id, const bool *value);
+int write_code(soap *ctx, std::string_view tag, int id, std::int32_t code, const enum_table &names,
+               const char *type = "");
+int write_boolean(soap *ctx, std::string_view tag, int id, const bool *value, const char *type = "");
 int write_absent(soap *ctx, std::string_view tag, occurs how); // a null member
 int write_code_attribute(soap *ctx, const char *name, std::int32_t code, const enum_table &names);
 // Id for a value held by pointer; -1 when a reference to it was written.

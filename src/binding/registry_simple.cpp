@@ -1,4 +1,5 @@
 // registry_simple.cpp - the simple types as dispatch by type id sees them.
+#include <zuv_client_pro/soap_identity.h>
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_primitive.h>
 
@@ -35,9 +36,10 @@ void *boolean_in(soap *ctx, const char *tag, void *place, const char *)
     return read_boolean_value(ctx, tag, value) ? value : nullptr;
 }
 
-int boolean_out(soap *ctx, const char *tag, int id, const void *place, const char *)
+int boolean_out(soap *ctx, const char *tag, int id, const void *place, const char *type)
 {
-    return write_boolean(ctx, tag, id, static_cast<const bool *>(place));
+    return write_boolean(ctx, tag, soap_element_id(ctx, id, place, BOOLEAN_ID),
+                         static_cast<const bool *>(place), type);
 }
 
 } // namespace

@@ -1,4 +1,5 @@
 """Takes SOAP messages apart, and holds what is in them against the published schemas."""
+import copy
 import os
 import re
 import subprocess
@@ -75,6 +76,15 @@ def _schema_of(schemas, ports):
     return '<xsd:schema xmlns:xsd="http://www.w3.org/2001/XMLSchema">%s</xsd:schema>' % "".join(sorted(lines))
 
 
+def _without_envelope_attributes(element):
+    """A copy without mustUnderstand and its like, which a header block bears for the envelope."""
+    envelope = etree.QName(element.getroottree().getroot()).namespace
+    lone = copy.deepcopy(element)
+    for name in [name for name in lone.attrib if etree.QName(name).namespace == envelope]:
+        del lone.attrib[name]
+    return lone
+
+
 def validate(schemas, ports, elements):
     """Lets xmllint validate each element as a document of its own; raises AssertionError with its words."""
     with tempfile.TemporaryDirectory() as folder:
@@ -84,6 +94,6 @@ def validate(schemas, ports, elements):
         names = [os.path.join(folder, "%d.xml" % number) for number in range(len(elements))]
         for name, element in zip(names, elements):
             with open(name, "wb") as file:
-                file.write(etree.tostring(element, with_tail=False))
+                file.write(etree.tostring(_without_envelope_attributes(element), with_tail=False))
         run = subprocess.run(["xmllint", "--noout", "--nonet", "--schema", schema, *names], capture_output=True, text=True)
         assert run.returncode == 0, [line for line in run.stderr.splitlines() if not line.endswith(" validates")]

@@ -8,6 +8,7 @@
 #include <zuv_client_pro/protocolProblemReport.h>
 #include <zuv_client_pro/protocolProfile.h>
 #include <zuv_client_pro/protocolUpdateOrder.h>
+#include <zuv_client_pro/soap_binary.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_registry.h>
@@ -212,6 +213,10 @@ TEST_F(Binding, attributes_come_first_and_a_required_one_is_missed_in_strict_mod
     EXPECT_EQ("<f xsi:type=\"protocolPRFilter:ProductComparison\" compareOp=\"containsPhrase\">"
               "<protocolPRFilter:product>P</protocolPRFilter:product></f>",
               write(comparison, "f"));
+    EXPECT_EQ("<protocolPRFilter:caseSensitive compareOp=\"containsPhrase\"/><protocolPRFilter:text "
+              "xsi:nil=\"true\"/>",
+              write(protocolPRFilter__ReportTextComparison(), "-f"))
+        << "without an element of its own";
     const std::string bare = "<f><protocolPRFilter:product>P</protocolPRFilter:product></f>";
     ASSERT_NE(nullptr, read<protocolPRFilter__ProductComparison>(bare));
     EXPECT_EQ(nullptr, read<protocolPRFilter__ProductComparison>(bare, MODE_STRICT));
@@ -247,6 +252,14 @@ TEST_F(Binding, references_forward_and_back_share_one_object)
     EXPECT_EQ(profile->contact[1], profile->contact[0]);
     EXPECT_EQ(profile->contact[1], profile->contact[2]);
     EXPECT_EQ(profile->contact[1]->name, profile->contact[1]->organization);
+    for (const char *xml :
+         {"<f><protocol:uri href=\"#s\"/><protocol:subcode id=\"s\">urn:x</protocol:subcode></f>",
+          "<f><protocol:subcode href=\"#s\"/><protocol:uri id=\"s\">urn:x</protocol:uri></f>"}) {
+        const auto *redirection = read<protocol__Server_x002eRedirection>(xml);
+        ASSERT_NE(nullptr, redirection) << ctx.error << " " << xml;
+        EXPECT_EQ("urn:x", redirection->uri) << "a text by value";
+        EXPECT_EQ("urn:x", *redirection->subcode) << xml;
+    }
     read<protocolProfile__ProfileContent>("<p><protocol:contact href=\"#nobody\"/></p>");
     EXPECT_EQ(SOAP_MISSING_ID, ctx.error);
     read<protocolProfile__ProfileContent>("<p><protocol:contact id=\"c\"/><protocol:contact id=\"c\"/></p>");
@@ -302,6 +315,11 @@ TEST_F(Binding, the_registry_makes_finds_and_destroys_by_id)
     ASSERT_NE(nullptr, identity);
     EXPECT_EQ(3 * sizeof(protocol__Identity), size);
     EXPECT_EQ(&ctx, identity[2].soap);
+    auto *binary = soap_instantiate_xsd__base64Binary(&ctx, 2, nullptr, nullptr, &size);
+    ASSERT_NE(nullptr, binary);
+    EXPECT_EQ(SOAP_TYPE_xsd__base64Binary, binary[1].soap_type());
+    EXPECT_EQ(2 * sizeof *binary, size);
+    soap_discard_objects(&ctx, binary);
     soap_discard_objects(&ctx, identity);
     EXPECT_EQ(nullptr, ctx.instance_list);
     EXPECT_EQ(nullptr, soap_instantiate(&ctx, 893, nullptr, nullptr, nullptr));

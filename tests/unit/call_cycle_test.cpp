@@ -229,8 +229,14 @@ TEST_F(CallCycle, sends_a_received_header_back_until_told_otherwise)
     EXPECT_EQ("t-9", *proxy.soap_header()->header->transactionId);
     wire.sent.clear();
     EXPECT_EQ(0, get(OK));
-    EXPECT_NE(std::string::npos, wire.sent.find("<protocol:transactionId>t-9</protocol:transactionId>"));
+    EXPECT_NE(std::string::npos,
+              wire.sent.find("<SOAP-ENV:Header><protocol:header SOAP-ENV:mustUnderstand=\"1\">"
+                             "<protocol:transactionId>t-9</protocol:transactionId></protocol:header>"));
     EXPECT_EQ(nullptr, proxy.soap_header());
+    proxy.soap_header(nullptr);
+    wire.sent.clear();
+    EXPECT_EQ(0, get(OK));
+    EXPECT_NE(std::string::npos, wire.sent.find("<SOAP-ENV:Header></SOAP-ENV:Header><SOAP-ENV:Body>"));
     proxy.soap_header(nullptr);
     proxy.soap_noheader();
     wire.sent.clear();

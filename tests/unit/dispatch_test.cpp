@@ -6,6 +6,7 @@
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
 #include <zuv_client_pro/protocolProfile.h>
 #include <zuv_client_pro/soap_binary.h>
+#include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_identity.h>
 #include <zuv_client_pro/soap_memory.h>
@@ -121,15 +122,35 @@ TEST_F(Dispatch, what_is_written_by_id_is_read_by_id_and_written_alike)
     int kinds[static_cast<int>(type_kind::pointer) + 1] = {};
     for_each_type([&](int type, const std::string &text) {
         ASSERT_NE("", text);
+        const type_entry &entry = type_entries[type];
+        const type_kind kind = entry.kind;
+        if (kind != type_kind::request && kind != type_kind::response) {
+            const type_entry &told = entry.item ? type_entries[entry.item] : entry;
+            EXPECT_EQ(0u, text.find(std::string("<thing xsi:type=\"") + told.xml_name + "\"")) << text;
+        }
         receive(text);
         void *back = read_by_type(&ctx, type);
         ASSERT_NE(nullptr, back) << ctx.error << " " << text;
         EXPECT_EQ(0, soap_element_in_end(&ctx, "all"));
         EXPECT_EQ(text, written(back, type));
-        ++kinds[static_cast<int>(type_entries[type].kind)];
+        ++kinds[static_cast<int>(kind)];
     });
     for (int kind = 1; kind <= static_cast<int>(type_kind::pointer); ++kind)
         EXPECT_GT(kinds[kind], 0) << kind;
+}
+
+TEST_F(Dispatch, an_absent_item_writes_nothing_and_a_nil_record_is_null)
+{
+    std::vector<protocol__Identity *> items = {
+        nullptr, soap_instantiate_protocol__Identity(&ctx, -1, nullptr, nullptr, nullptr)};
+    const std::string last = "<thing xsi:type=\"protocol:Identity\"></thing>";
+    EXPECT_EQ(last, written(&items, SOAP_TYPE_vector_of_protocol__Identity));
+    receive("<x><SOAP-ENV:Subcode "
+            "xsi:nil=\"true\"></SOAP-ENV:Subcode><SOAP-ENV:Value>SOAP-ENV:Sender</SOAP-ENV:Value></x>");
+    const auto *code = static_cast<SOAP_ENV__Code *>(read_by_type(&ctx, SOAP_TYPE_SOAP_ENV__Code));
+    ASSERT_NE(nullptr, code) << ctx.error;
+    EXPECT_EQ(nullptr, code->Subcode);
+    EXPECT_STREQ("SOAP-ENV:Sender", code->Value);
 }
 
 TEST_F(Dispatch, what_is_cut_short_is_refused)
