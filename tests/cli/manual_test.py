@@ -17,16 +17,6 @@ PAGE = os.path.join(zuv.SOURCE, "docs", "command-line.md")
 COMPLETION = os.path.join(zuv.SOURCE, "cli", "completion", "zuv.bash")
 HELPERS = "/usr/share/bash-completion/bash_completion"
 
-STUNNEL = """
-foreground = yes
-pid =
-[service]
-accept = 127.0.0.1:@port0@
-connect = @behind@
-cert = @folder@/server.pem
-"""
-
-
 def source():
     with open(MANUAL) as file:
         return file.read()
@@ -53,8 +43,7 @@ class manual(unittest.TestCase):
         with tempfile.TemporaryDirectory() as folder, zuv.service() as open_to_all, \
                 zuv.service("--user", "ada", "--password", "sesame") as locked:
             programs.certificates(folder)
-            stunnel = programs.filled(STUNNEL, {"behind": locked.removeprefix("http://")})
-            with programs.server(folder, "stunnel", [programs.command("stunnel4"), "@file@"], stunnel) as (port,):
+            with programs.stunnel(folder, locked) as (port,):
                 examples.check(self, rows, folder, service=open_to_all, secured="https://127.0.0.1:%d" % port)
 
     def test_options_and_exit_codes_are_those_of_the_program(self):
