@@ -2,10 +2,6 @@
 # And endurance. To be included behind service.cmake.
 set(INTEROP ${PROJECT_SOURCE_DIR}/tests/interop)
 set(ZUV_SCHEMA ${PROJECT_SOURCE_DIR}/schema)
-find_package(CLI11 REQUIRED)
-add_executable(profile_client ${INTEROP}/profile_client.cpp)
-target_include_directories(profile_client PRIVATE ${PROJECT_SOURCE_DIR}/examples)
-target_link_libraries(profile_client PRIVATE zuv_objects zuv_flags CLI11::CLI11)
 
 # The five ports on the npm package "soap"; its packages go to the build tree.
 set(NPM_SERVICE ${PROJECT_BINARY_DIR}/soap_server)
@@ -21,9 +17,9 @@ function(zuv_add_interop name)
     set_tests_properties(interop_${name} PROPERTIES LABELS interop TIMEOUT 300)
 endfunction()
 zuv_add_interop(zeep_ports $<TARGET_FILE:zuv-service>)
-zuv_add_interop(client_ports $<TARGET_FILE:profile_client> $<TARGET_FILE:care_host> $<TARGET_FILE:problem_report_host>
+zuv_add_interop(client_ports $<TARGET_FILE:zuv> $<TARGET_FILE:care_host> $<TARGET_FILE:problem_report_host>
     $<TARGET_FILE:zuv-service> ${NPM_SERVICE})
-zuv_add_interop(nginx_profile $<TARGET_FILE:profile_client> $<TARGET_FILE:zuv-service> ${NPM_SERVICE})
+zuv_add_interop(nginx_profile $<TARGET_FILE:zuv> $<TARGET_FILE:zuv-service> ${NPM_SERVICE})
 set_tests_properties(interop_client_ports interop_nginx_profile PROPERTIES FIXTURES_REQUIRED npm_service)
 
 # What follows looks at memory itself, which a sanitizer changes.

@@ -22,5 +22,7 @@ foreach(way cmake pkg-config)
 endforeach()
 add_test(NAME package_clean_root COMMAND bash ${PACKAGE_TESTS}/clean_root.sh ${TEST_PACKAGES}
     ${PROJECT_BINARY_DIR}/package_tests/clean_root)
-set_tests_properties(package_host_cmake package_host_pkg-config package_clean_root PROPERTIES
+add_test(NAME package_readme COMMAND /usr/bin/python3 -B ${PACKAGE_TESTS}/readme_test.py ${PROJECT_SOURCE_DIR}
+    ${PROJECT_BINARY_DIR} ${TEST_PACKAGES})
+set_tests_properties(package_host_cmake package_host_pkg-config package_clean_root package_readme PROPERTIES
     FIXTURES_REQUIRED packages SKIP_RETURN_CODE 77 LABELS package TIMEOUT 600)

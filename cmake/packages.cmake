@@ -33,6 +33,7 @@ set(CPACK_DEBIAN_TOOLS_PACKAGE_NAME zuv-tools)
 set(CPACK_DEBIAN_TOOLS_PACKAGE_SECTION net)
 set(CPACK_COMPONENT_TOOLS_DESCRIPTION "SOAP client of a customer-care service: programs
  zuv-service, a reference service with documents in SQLite, to develop and test
- hosts against, and what goes with it.")
+ hosts against; zuv, the command line, which calls services, checks documents and
+ shows traces.")
 set(CMAKE_SKIP_INSTALL_ALL_DEPENDENCY ON) # what is missing is built by whoever packages
 include(CPack)

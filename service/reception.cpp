@@ -14,6 +14,7 @@
 
 #include "answer.h"
 #include "attachments.h"
+#include "contract_files.h"
 #include "data_port.h"
 
 namespace service {
@@ -212,6 +213,10 @@ int reception::answer_get(soap *ctx)
 {
     if (!data_name().empty())
         return send_data(ctx, lent_.documents, data_name());
+    const std::string contract =
+        contract_document(std::string_view(ctx->endpoint).substr(root_.size()), root_);
+    if (!contract.empty())
+        return send_file(ctx, "text/xml; charset=utf-8", contract);
     if (target_ != nullptr)
         return ctx->error = METHOD_NOT_ALLOWED; // ports are called, not fetched
     return path_ == "/" || path_ == SERVICES_PATH ? send_file(ctx, "text/html; charset=utf-8", page())

@@ -9,6 +9,9 @@
 #include "codec/xml_read.h"
 
 #include <cstring>
+#include <string_view>
+
+#include "codec/namespace.h"
 
 namespace {
 
@@ -215,6 +218,14 @@ void leave_element(soap *ctx)
         ctx->nesting_level--;
 }
 
+// A type whose prefix nobody has declared names no type at all. Generous reading takes it for one that it
+// doesn't know.
+bool has_undeclared_type(const soap *ctx)
+{
+    const std::string_view prefix = xml_prefix_of(ctx->element_type);
+    return !prefix.empty() && xml_prefix_find(ctx, prefix) == nullptr;
+}
+
 } // namespace
 
 int soap_element_head_read(soap *ctx)
@@ -265,8 +276,12 @@ int soap_element_in_begin(soap *ctx, const char *tag, int nil_allowed, const cha
     if (type != nullptr && ctx->element_type[0] != '\0' &&
         soap_tag_compare(ctx, ctx->element_type, type) != 0)
         return ctx->error = SOAP_TYPE_MISMATCH;
-    if (nil_allowed == 0 && ctx->null_flag != 0 && (ctx->mode & MODE_STRICT) != 0)
-        return ctx->error = SOAP_NIL;
+    if ((ctx->mode & MODE_STRICT) != 0) {
+        if (has_undeclared_type(ctx))
+            return ctx->error = SOAP_TYPE_MISMATCH;
+        if (nil_allowed == 0 && ctx->null_flag != 0)
+            return ctx->error = SOAP_NIL;
+    }
     return ctx->error = enter_element(ctx);
 }
 

@@ -120,7 +120,16 @@ bool begins_dime(soap *ctx, std::int32_t first)
     return first >= 12 && first <= 15 && (peek_byte(ctx) & 0xF0) == 0x20;
 }
 
-// A UTF-8 mark, whose first byte was read, is dropped. The byte behind it, or what is left of a false mark.
+// The byte c, or if it is blank the first behind it that isn't.
+std::int32_t skip_blanks(soap *ctx, std::int32_t c)
+{
+    while (c >= 0 && c <= ' ')
+        c = soap_recv_byte(ctx);
+    return c;
+}
+
+// A UTF-8 mark, whose first byte was read, is dropped, and the blanks behind it. The byte that follows, or
+// what is left of a false mark.
 std::int32_t skip_utf8_mark(soap *ctx)
 {
     if (peek_byte(ctx) != 0xBB)
@@ -132,7 +141,7 @@ std::int32_t skip_utf8_mark(soap *ctx)
     if (third != 0xBF)
         return third | HIGH_OF_TRUNCATED_MARK;
     ctx->mode &= ~MODE_LATIN1;
-    return soap_recv_byte(ctx);
+    return skip_blanks(ctx, soap_recv_byte(ctx));
 }
 
 // Finds out by the first bytes what comes, and leaves the first that counts in look_ahead.
@@ -149,8 +158,7 @@ int recognise_start(soap *ctx)
         ctx->look_ahead = c;
         return SOAP_OK;
     }
-    while (c >= 0 && c <= ' ')
-        c = soap_recv_byte(ctx);
+    c = skip_blanks(ctx, c);
     if (c == '-' && peek_byte(ctx) == '-')
         ctx->mode |= MODE_MIME;
     else if (c == 0xEF)

@@ -24,6 +24,7 @@ constexpr std::size_t HEAD_BYTES_MAX = std::size_t{1024} * 1024; // all header l
 constexpr unsigned INTERIM_HEADS_MAX = 100; // heads of status 100 ahead of the one that counts
 constexpr std::uint64_t ERROR_BODY_MAX = std::uint64_t{1024} * 1024; // bytes of an error body that are kept
 constexpr int STATUS_CONTINUE = 100;
+constexpr int STATUS_MIN = 100, STATUS_MAX = 999; // other numbers could pass for codes of the engine
 constexpr int STATUS_URI_TOO_LARGE = 414;
 constexpr int STATUS_NO_METHOD = 405;
 
@@ -222,16 +223,16 @@ int take_request(soap *ctx, const head_state &head, const char *version)
     return ctx->error = head.deferred != SOAP_OK ? head.deferred : STATUS_NO_METHOD;
 }
 
-// The status alone is the outcome: text and detail in managed memory, as message_text serves every later text
-// too.
-int fail_with_status(soap *ctx, const char *body)
+// The code, a status or one of the engine's, is the outcome: text and detail in managed memory, as
+// message_text serves every later text too.
+int fail_with(soap *ctx, int code, const char *body)
 {
     const char *const start_line = soap_string_dup(ctx, ctx->message_text);
     if (start_line == nullptr)
         return ctx->error;
     if (body != nullptr)
-        return soap_fault_receiver(ctx, start_line, body, ctx->status);
-    return soap_fault_receiver(ctx, "HTTP Error", start_line, ctx->status);
+        return soap_fault_receiver(ctx, start_line, body, code);
+    return soap_fault_receiver(ctx, "HTTP Error", start_line, code);
 }
 
 bool is_chunked(const soap *ctx)
@@ -244,15 +245,19 @@ int take_response(soap *ctx)
     const int status = ctx->status;
     if (status == 200)
         return SOAP_OK;
+    if (status < STATUS_MIN || status > STATUS_MAX) {
+        ctx->keep_alive = 0;
+        return fail_with(ctx, SOAP_HTTP_ERROR, nullptr);
+    }
     if (ctx->content_length == 0 && (ctx->http_content == nullptr || ctx->recv_timeout == 0) &&
         !is_chunked(ctx)) {
         ctx->response_unfinished = !ctx->content_length_given && status != 204 && status != 304;
-        return fail_with_status(ctx, nullptr);
+        return fail_with(ctx, status, nullptr);
     }
     if ((status > 200 && status < 300) || status == 400 || status == 500)
         return SOAP_OK;
     ctx->keep_alive = 0;
-    return fail_with_status(ctx, http_drain_body(ctx));
+    return fail_with(ctx, status, http_drain_body(ctx));
 }
 
 int read_head(soap *ctx, bool is_retry)

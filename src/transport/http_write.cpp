@@ -235,6 +235,14 @@ int write_credentials(soap *ctx, const char *key, const char *user, const char *
     return result;
 }
 
+// They are for the proxy alone: what goes through a tunnel is read by the host behind it.
+int write_proxy_credentials(soap *ctx)
+{
+    if (ctx->proxy_host != nullptr && tls_active(ctx))
+        return SOAP_OK;
+    return write_credentials(ctx, "Proxy-Authorization", ctx->proxy_user, ctx->proxy_password);
+}
+
 int write_action(soap *ctx, const char *action)
 {
     if (action == nullptr || ctx->status == STATUS_GET)
@@ -333,8 +341,7 @@ int http_write_request(soap *ctx, const char *endpoint, const char *host, int po
         http_write_entity_headers(ctx, 0, count) != SOAP_OK ||
         line(ctx, "Accept-Encoding", "deflate") != SOAP_OK ||
         write_credentials(ctx, "Authorization", ctx->auth_user, ctx->auth_password) != SOAP_OK ||
-        write_credentials(ctx, "Proxy-Authorization", ctx->proxy_user, ctx->proxy_password) != SOAP_OK ||
-        write_action(ctx, action) != SOAP_OK)
+        write_proxy_credentials(ctx) != SOAP_OK || write_action(ctx, action) != SOAP_OK)
         return ctx->error;
     return line(ctx, nullptr, nullptr);
 }

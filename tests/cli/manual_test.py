@@ -1,5 +1,6 @@
 #!/usr/bin/python3
-"""The manual: its examples do what it says, its options and exit codes are the program's. And completion in bash."""
+"""The manual and the page about the command line: their examples do what they say, options and exit codes are the program's.
+And completion in bash."""
 import os
 import re
 import shutil
@@ -7,48 +8,43 @@ import subprocess
 import tempfile
 import unittest
 
+import examples
 import zuv
+import programs  # of the interoperability tests: servers and certificates
 
 MANUAL = os.path.join(zuv.SOURCE, "docs", "man", "zuv.1")
+PAGE = os.path.join(zuv.SOURCE, "docs", "command-line.md")
 COMPLETION = os.path.join(zuv.SOURCE, "cli", "completion", "zuv.bash")
 HELPERS = "/usr/share/bash-completion/bash_completion"
-
 
 def source():
     with open(MANUAL) as file:
         return file.read()
 
 
-def examples():
-    """(command, expected output) of the literal blocks."""
-    found = []
-    for block in re.findall(r"(?ms)^\.Bd -literal.*?\n(.*?)^\.Ed", source()):
-        for line in block.replace("\\e", "\\").splitlines():
-            if line.startswith("$ "):
-                found.append((line[2:], []))
-            else:
-                found[-1][1].append(line)
-    return found
-
-
-def pattern(lines):
-    text = re.escape("".join(line + "\n" for line in lines)).replace(r"\.\.\.", ".*?")
-    return re.compile(text + (".*" if lines and lines[-1].endswith("...") else ""), re.S)
+def exit_codes():
+    with open(os.path.join(zuv.SOURCE, "cli", "exit_codes.h")) as file:
+        return re.findall(r"EXIT_\w+ = (\d+)", file.read())
 
 
 class manual(unittest.TestCase):
     def test_the_examples_do_what_the_text_says(self):
-        rows = examples()
+        rows = examples.of(block.replace("\\e", "\\") for block in re.findall(r"(?ms)^\.Bd -literal.*?\n(.*?)^\.Ed", source()))
         self.assertGreater(len(rows), 20)
         with tempfile.TemporaryDirectory() as folder, zuv.service() as address:
-            script = "".join("{ %s\n} 2>&1; printf '\\0'\n" % command for command, _ in rows)
-            run = subprocess.run(["bash", "-c", script], capture_output=True, text=True, timeout=zuv.LIMIT_S, cwd=folder, env={
-                **os.environ, "PATH": os.path.dirname(zuv.PROGRAM) + ":" + os.environ["PATH"], "ZUV_ENDPOINT": address})
-        outputs = run.stdout.split("\0")[:-1]
-        self.assertEqual((len(outputs), run.stderr), (len(rows), ""))
-        for (command, expected), output in zip(rows, outputs):
-            with self.subTest(command=command):
-                self.assertRegex(output, re.compile(r"\A%s\Z" % pattern(expected).pattern, re.S))
+            examples.check(self, rows, folder, ZUV_ENDPOINT=address)
+
+    def test_so_does_the_page_about_the_command_line(self):
+        with open(PAGE) as file:
+            text = file.read().replace("http://127.0.0.1:9080", "$service")
+        rows = examples.of(re.findall(r"(?ms)^```console\n(.*?)^```$", text))
+        self.assertGreater(len(rows), 30)
+        self.assertEqual(re.findall(r"(?m)^\| (\d+) \|", text), exit_codes())
+        with tempfile.TemporaryDirectory() as folder, zuv.service() as open_to_all, \
+                zuv.service("--user", "ada", "--password", "sesame") as locked:
+            programs.certificates(folder)
+            with programs.stunnel(folder, locked) as (port,):
+                examples.check(self, rows, folder, service=open_to_all, secured="https://127.0.0.1:%d" % port)
 
     def test_options_and_exit_codes_are_those_of_the_program(self):
         told = set(re.findall(r"Fl Fl ([a-z0-9-]+)", source())) - {"help"}
@@ -56,8 +52,7 @@ class manual(unittest.TestCase):
         for command in ("profile get", "data get", "data put", "new", "check", "trace"):
             listed |= set(re.findall(r"(?m)^  (?:-\w,)?--([a-z0-9-]+)", zuv.run(*command.split(), "--help").stdout))
         self.assertEqual(told, listed - {"help"})
-        with open(os.path.join(zuv.SOURCE, "cli", "exit_codes.h")) as file:
-            codes = re.findall(r"EXIT_\w+ = (\d+)", file.read())
+        codes = exit_codes()
         self.assertEqual(re.findall(r"(?m)^\.It (\d+)$", source()), codes)
         self.assertEqual(re.findall(r"(\d+) [a-zA-Z]", zuv.run("--help").stdout.split("Exit:")[1]), codes)
 

@@ -92,5 +92,5 @@ def peer(*answers, certificate=None):
         thread.join(LIMIT_S)
 
 
-def service():
-    return zuv_service.running(SERVICE)
+def service(*options):
+    return zuv_service.running(SERVICE, *options)

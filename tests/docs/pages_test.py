@@ -1,5 +1,6 @@
 #!/usr/bin/python3
-"""What the pages show is so: their C++ stands in programs that compile and run, and their links lead somewhere.
+"""What the pages show is so: their C++ stands in programs that compile and run, their commands are run by some test, and their
+links lead somewhere.
 
 Usage: pages_test.py SOURCE_DIR ZUV_SERVICE GUIDE README_HOST. The programs call a zuv-service started here.
 """
@@ -10,8 +11,20 @@ import sys
 import tempfile
 
 sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "interop"))
+import listening
 import messages
 import zuv_service
+
+COMMAND = re.compile(r"^(?:script/|cmake |ctest |g\+\+ |zuv|\.ci/)")
+# The README's commands: the file that runs each, a script or a test that takes it from the text, and how it stands there.
+RUN_BY = {
+    "script/demo": (".ci/run", "script/demo\n"),
+    "script/test": (".ci/run", "script/test\n"),
+    "script/package": (".ci/run", "script/package "),
+    "cmake --install build/release": ("tests/package/readme_test.py", "cmake --install"),
+    "g++ host.cpp $(pkg-config --cflags --libs zuv_client_pro)": ("tests/package/readme_test.py", r"g\+\+"),
+    "cmake --build build/release --target docs": ("cmake/docs.cmake", "--build . --target docs"),
+}
 
 
 def blocks(page, language):
@@ -51,6 +64,35 @@ def check_guide(source):
         assert words(piece) in compiled, "not in examples/guide.cpp:\n" + piece
 
 
+def commands(page):
+    """Those of the page's shell blocks, and what stands in back quotes and looks like one."""
+    lines = "".join(blocks(page, "sh") + re.findall(r"^    .*\n", page, re.M)).splitlines()
+    inline = re.findall(r"``(.+?)``|`([^`\n]+)`", re.sub(r"^```.*?^```", "", page, flags=re.S | re.M))
+    found = [line.partition("#")[0].strip() for line in lines] + [one or other for one, other in inline]
+    return [command for command in found if COMMAND.match(command)]
+
+
+def check_commands(source, service):
+    """Each command of the README is run somewhere; scripts that any page names are there; the service's own page starts it."""
+    text = {}
+    for page in ("README.md", "CONTRIBUTING.md", "docs/host-guide.md", "docs/command-line.md", "service/README.md"):
+        with open(os.path.join(source, page), encoding="utf-8") as file:
+            text[page] = file.read()
+        for script in re.findall(r"(?<![\w/])(?:script/[\w-]+(?:\.\w+)?|\.ci/run)", text[page]):
+            assert os.path.exists(os.path.join(source, script)), "%s: there is no %s" % (page, script)
+    assert {one for one in commands(text["README.md"]) if " " in one or "/" in one} == set(RUN_BY), commands(text["README.md"])
+    for command, (place, words) in RUN_BY.items():
+        with open(os.path.join(source, place), encoding="utf-8") as file:
+            assert words in file.read(), "%s doesn't run %s" % (place, command)
+    start = [one for one in commands(text["service/README.md"]) if one.startswith("zuv-service ")]
+    assert len(start) == 1, start
+    with tempfile.TemporaryDirectory() as folder:
+        arguments = start[0].replace("9080", "0").split()[1:]
+        with listening.started([service, *arguments], cwd=folder) as address:
+            assert re.fullmatch(r"http://[\d.]+:\d+", address), address
+        assert os.path.exists(os.path.join(folder, arguments[-1])), arguments
+
+
 def check_run(program, arguments, expected, **environment):
     with tempfile.TemporaryDirectory() as folder:
         run = subprocess.run([program, *arguments], cwd=folder, text=True, capture_output=True, timeout=60,
@@ -63,16 +105,17 @@ def check_run(program, arguments, expected, **environment):
 def main():
     source, service, guide, readme_host = sys.argv[1:]
     pages = subprocess.run(["git", "ls-files", "*.md"], cwd=source, text=True, capture_output=True).stdout.split()
-    pages = pages or ["README.md", "docs/host-guide.md", "docs/architecture.md"]  # not a checkout
+    pages = pages or ["README.md", "docs/host-guide.md", "docs/architecture.md", "docs/command-line.md"]  # not a checkout
     for page in pages:
         check_links(os.path.join(source, page))
     check_guide(source)
+    check_commands(source, service)
     with zuv_service.running(service) as address:
         endpoint = address + messages.service_path("Profile")
         check_run(guide, [endpoint], [r"^Ada's workshop$", r"^still here: Ada's workshop$", r"^not found: urn:not:there$",
                                       r"^\d+ bytes$"])
         check_run(readme_host, [], [r"^kept as urn:zuv:profile:"], ZUV_README_ENDPOINT=endpoint)
-    print("%d pages, the guide's code and the README's host" % len(pages))
+    print("%d pages, the guide's code, the README's host and commands" % len(pages))
 
 
 if __name__ == "__main__":

@@ -1,7 +1,7 @@
 #!/usr/bin/python3
-"""nginx between the library's client and the Profile services; and curl, with Expect: 100-continue, before zuv-service.
+"""nginx between a host of the library and the Profile services; and curl, with Expect: 100-continue, before zuv-service.
 
-Usage: nginx_profile.py PROFILE_CLIENT ZUV_SERVICE NPM_FOLDER SCHEMA_DIR. Needs no privileges: nginx runs from a directory of
+Usage: nginx_profile.py ZUV ZUV_SERVICE NPM_FOLDER SCHEMA_DIR. Needs no privileges: nginx runs from a directory of
 its own, on a free port.
 """
 import contextlib
@@ -14,6 +14,7 @@ import sys
 import tempfile
 
 import messages
+import profile_calls
 import zuv_service
 
 LARGE = 5_000_000  # bytes
@@ -46,9 +47,16 @@ def nginx(folder, zuv, npm):
     assert program.returncode == 0 and not problems, problems
 
 
-def call_all(client, endpoint, *options):
-    run = subprocess.run([client, endpoint, *options], capture_output=True, text=True, timeout=LIMIT_S)
-    assert run.returncode == 0, (endpoint, options, run.stdout, run.stderr)
+def call_all(program, endpoint, many, *options):
+    """A small profile many times over one connection, then a large one, and one that isn't there."""
+    profiles = profile_calls.Profiles(program, endpoint, *options)
+    profiles.call("create", given=profile_calls.SAMPLE % "")
+    profiles.call("get", "--keep-alive", "--repeat", str(many))
+    large = "a" * LARGE
+    given = profile_calls.SAMPLE % ("<p:profileAuthority>%s</p:profileAuthority>" % large)
+    profiles.call("set", "--keep-alive", "--repeat", "2", given=given, profileAuthority=large)
+    profiles.uri = "urn:nobody"
+    profiles.expect_not_found()
 
 
 def post(address, name, request, *options):
@@ -87,7 +95,7 @@ class Log:
         self.next = 0
 
     def take(self, count):
-        """The next exchanges, which belong to one run of the client; the last one is answered by the fault."""
+        """The next exchanges, which belong to one service; the last one is answered by the fault."""
         run = self.exchanges[self.next:self.next + count]
         self.next += count
         assert len(run) == count and [e["status"] for e in run[:-1]] == ["200"] * (count - 1), run
@@ -95,20 +103,22 @@ class Log:
         return run
 
 
-def through_nginx(client, zuv, npm, chunked_answers):
-    """Runs of the client in turn, then a look at nginx's log: connections, and the framing both ways."""
+def through_nginx(program, zuv, npm, chunked_answers):
+    """Runs of the host in turn, then a look at nginx's log: connections, and the framing both ways."""
     runs = [(place, many, chunked, ["--soap12"] if soap12 else [])
             for place in ("zuv", "stored/zuv") for soap12 in (False, True)
             for many, chunked in ((500, False), (20, True))] + [("npm/zuv", 200, False, []), ("npm/zuv", 20, True, [])]
     with tempfile.TemporaryDirectory() as folder:
         with nginx(folder, zuv, npm) as address:
             for place, many, chunked, version in runs:
-                call_all(client, "%s/%s/v1.0/services/Profile" % (address, place), "--keep-alive", "--calls", str(many),
-                         "--size", str(LARGE), *(["--chunked"] if chunked else []), *version)
+                call_all(program, "%s/%s/v1.0/services/Profile" % (address, place), many,
+                         *(["--chunked"] if chunked else []), *version)
         log = Log(folder)
         for place, many, chunked, _ in runs:
-            exchanges = log.take(many + 6)
-            assert len({e["connection"] for e in exchanges}) == 1, "one connection for all calls"
+            exchanges = log.take(many + 4)
+            connections = [e["connection"] for e in exchanges]
+            assert len(set(connections)) == 4, "one each for create, all of get, both of set, and what isn't there"
+            assert connections == sorted(connections, key=connections.index), "none is come back to"
             assert {e["request"] for e in exchanges} == {"chunked" if chunked else "-"}, exchanges[0]
             assert {e["answer"] for e in exchanges} == {"chunked" if chunked_answers or place.startswith("npm") else "-"}
         assert log.next == len(log.exchanges)
@@ -116,12 +126,12 @@ def through_nginx(client, zuv, npm, chunked_answers):
 
 
 def main():
-    client, service, npm_folder, schemas = (os.path.abspath(argument) for argument in sys.argv[1:])
+    program, service, npm_folder, schemas = (os.path.abspath(argument) for argument in sys.argv[1:])
     with zuv_service.running_npm(npm_folder, schemas) as npm:
         for chunked in (False, True):
             with zuv_service.running(service, *(["--chunked"] if chunked else [])) as zuv:
                 expect_continue(zuv)
-                through_nginx(client, zuv, npm, chunked)
+                through_nginx(program, zuv, npm, chunked)
 
 
 if __name__ == "__main__":

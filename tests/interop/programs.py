@@ -10,6 +10,15 @@ import time
 LIMIT_S = 60
 EOF_ERROR, NO_DATA, TCP_ERROR, TLS_ERROR = -1, 14, 28, 30  # codes of calls; others are HTTP's
 
+STUNNEL = """
+foreground = yes
+pid =
+[zuv]
+accept = 127.0.0.1:@port0@
+connect = @zuv@
+cert = @folder@/server.pem
+"""
+
 
 def command(name):
     """Path of a program that Debian may have put beside the PATH of users."""
@@ -74,6 +83,11 @@ def filled(text, words):
     for word, value in words.items():
         text = text.replace("@%s@" % word, value)
     return text
+
+
+def stunnel(folder, address):
+    """stunnel ahead of a service without TLS, with the certificate in the folder; gives its port as a list."""
+    return server(folder, "stunnel", [command("stunnel4"), "@file@"], filled(STUNNEL, {"zuv": address.removeprefix("http://")}))
 
 
 def password_file(path):

@@ -9,7 +9,7 @@ import tempfile
 
 import messages
 import zuv_service
-from programs import Caller, EOF_ERROR, TCP_ERROR, certificates, command, filled, password_file, server
+from programs import Caller, EOF_ERROR, TCP_ERROR, certificates, command, filled, password_file, server, stunnel
 
 SQUID = """
 http_port 127.0.0.1:@port0@
@@ -41,16 +41,6 @@ MaxClients 20
 LogLevel Error
 @access@
 """
-
-STUNNEL = """
-foreground = yes
-pid =
-[zuv]
-accept = 127.0.0.1:@port0@
-connect = @zuv@
-cert = @folder@/server.pem
-"""
-
 
 def all_ways(caller, name, proxy, plain, secure, trust, locked):
     """Through one proxy: plain and CONNECT, with the password where one is wanted."""
@@ -87,7 +77,7 @@ def main():
         words = {"zuv": zuv.removeprefix("http://"), "user": "cache_effective_user proxy" if os.geteuid() == 0 else ""}
         trust = ["--ca", os.path.join(folder, "ca.pem")]
         plain = zuv + messages.service_path("Profile")
-        with server(folder, "stunnel", [command("stunnel4"), "@file@"], filled(STUNNEL, words)) as (tls,):
+        with stunnel(folder, words["zuv"]) as (tls,):
             secure = "https://localhost:%d%s" % (tls, messages.service_path("Profile"))
             for locked in (False, True):
                 text = filled(SQUID, {**words, "access": SQUID_LOCKED if locked else ""})

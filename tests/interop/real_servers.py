@@ -13,7 +13,7 @@ import threading
 
 import messages
 import zuv_service
-from programs import Caller, EOF_ERROR, LIMIT_S, NO_DATA, TLS_ERROR, certificates, command, filled, password_file, server
+from programs import Caller, EOF_ERROR, LIMIT_S, NO_DATA, TLS_ERROR, certificates, command, filled, password_file, server, stunnel
 
 NGINX = """
 daemon off; worker_processes 1; @user@
@@ -85,16 +85,6 @@ backend dead
     server dead 127.0.0.1:@dead@
 """
 
-STUNNEL = """
-foreground = yes
-pid =
-[zuv]
-accept = 127.0.0.1:@port0@
-connect = @zuv@
-cert = @folder@/server.pem
-"""
-
-
 def through_nginx(caller, folder, words):
     password_file(os.path.join(folder, "users"))
     words = {**words, "user": "user root;" if os.geteuid() == 0 else ""}
@@ -158,7 +148,7 @@ def through_haproxy(caller, folder, words):
 
 
 def through_stunnel(caller, folder, words):
-    with server(folder, "stunnel", [command("stunnel4"), "@file@"], filled(STUNNEL, words)) as (port,):
+    with stunnel(folder, words["zuv"]) as (port,):
         endpoint = "https://localhost:%d%s" % (port, messages.service_path("Profile"))
         trust = ["--ca", os.path.join(folder, "ca.pem")]
         caller.run("stunnel", endpoint, *trust, "--keep-alive", "--calls", 30, "--size", 30000, codes=0, connections=1)

@@ -14,8 +14,7 @@ import tempfile
 
 import messages
 import zuv_service
-from programs import Caller, certificates, command, filled, server
-from real_proxies import STUNNEL
+from programs import Caller, certificates, stunnel
 
 FEW, MANY = 10, 110
 EXPECTED = {"sendto": 1, "recvfrom": 1, "pselect6": 1}
@@ -40,8 +39,7 @@ def main():
     caller = Caller(client)
     with tempfile.TemporaryDirectory() as folder, zuv_service.running(service) as zuv:
         certificates(folder)
-        with server(folder, "stunnel", [command("stunnel4"), "@file@"],
-                    filled(STUNNEL, {"zuv": zuv.removeprefix("http://")})) as (port,):
+        with stunnel(folder, zuv) as (port,):
             secure = "https://localhost:%d%s" % (port, messages.service_path("Profile"))
             for rule, endpoint, options in (("plain", zuv + messages.service_path("Profile"), []),
                                             ("TLS", secure, ["--ca", os.path.join(folder, "ca.pem")])):

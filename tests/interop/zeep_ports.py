@@ -1,8 +1,11 @@
 #!/usr/bin/python3
-"""An independent SOAP toolkit calls every operation of zuv-service, knowing nothing but the WSDLs.
+"""An independent SOAP toolkit calls every operation of zuv-service, knowing nothing but the WSDLs: for SOAP 1.1 the files, for
+SOAP 1.2 what the service itself hands out at the address of the port, which tells the port's address too.
 
 Usage: zeep_ports.py ZUV_SERVICE SCHEMA_DIR. Every request and every answer is validated against the published schemas.
 """
+import glob
+import os
 import sys
 import urllib.request
 
@@ -18,10 +21,11 @@ class Peer(zeep.Plugin):
 
     def __init__(self, schemas, port, address, soap12):
         self.elements, self.called, self.count, self.soap12 = [], set(), 0, soap12
-        self.client = zeep.Client(messages.wsdl(schemas, port), plugins=[self])
+        endpoint = address + messages.service_path(port)
+        self.client = zeep.Client(endpoint + "?wsdl" if soap12 else messages.wsdl(schemas, port), plugins=[self])
         self.namespace = messages.namespace(port)
-        binding = "{%s}%s%s" % (self.namespace, port, "Soap12Binding" if soap12 else "SoapBinding")
-        self.service = self.client.create_service(binding, address + messages.service_path(port))
+        self.service = (self.client.bind(port, port + "Soap12") if soap12 else
+                        self.client.create_service("{%s}%sSoapBinding" % (self.namespace, port), endpoint))
         self.header = self.client.get_element("{%s}header" % messages.COMMON)
 
     def egress(self, envelope, http_headers, operation, binding_options):
@@ -176,9 +180,19 @@ WALKS = {"Profile": profile, "InventoryReport": inventory_report, "UpdateOrder":
          "StatusReport": status_report, "ProblemReport": problem_report}
 
 
+def check_files(schemas, address):
+    """The service hands out each file of the contract as it stands."""
+    names = glob.glob("*/*.xsd", root_dir=schemas) + glob.glob("*/*.wsdl", root_dir=schemas)
+    assert len(names) > 10, names
+    for name in names:
+        with open(os.path.join(schemas, name), "rb") as file, urllib.request.urlopen(address + "/zuv/v1.0/contract/" + name) as answer:
+            assert answer.read() == file.read(), name
+
+
 def main():
     program, schemas = sys.argv[1:]
     with zuv_service.running(program, "--account", "ada:sesame") as address:
+        check_files(schemas, address)
         for port in messages.PORTS:
             for soap12 in (False, True):
                 peer = Peer(schemas, port, address, soap12)

@@ -1,5 +1,5 @@
 // expansion_test.cpp - what update orders come to.
-#include <functional>
+#include <regex>
 #include <string>
 
 #include <gtest/gtest.h>
@@ -7,7 +7,7 @@
 #include <zuv_client_pro/protocolUpdateOrderFilter.h>
 
 #include "expansion.h"
-#include "make.h"
+#include "parsed.h"
 
 using namespace service;
 
@@ -25,142 +25,67 @@ std::string ids(const expansion &found)
     return text;
 }
 
+// XML of an order's members: "name=text", with blanks between them.
+std::string members(const std::string &words)
+{
+    const std::regex word("([A-Za-z]+)=([^ <]+)");
+    return std::regex_replace(words, word, "<protocolUpdateOrder:$1>$2</protocolUpdateOrder:$1>");
+}
+
 } // namespace
 
 TEST(Expansion, FollowsTheOrder)
 {
-    soap ctx;
-    const auto yes = [&] { return make_value(&ctx, true); };
-    struct row {
-        const char *rule;
-        std::function<void(order &)> ask;
-        const char *ids;
-    };
-    using requisites = protocolUpdateOrder__SelectRequisites;
-    using supersedes = protocolUpdateOrder__SelectSupersedes;
-    using exclusions = protocolUpdateOrder__SelectImplicitExclusions;
-    using groups = protocolUpdateOrder__ExpandGroups;
-    const row rows[] = {
-        {"identifiers, each once",
-         [](order &o) {
-             o.updateId = {"DRV-5", "FW-100", "DRV-5"};
-         },
-         "DRV-5 FW-100"},
-        {"unknown ones are told once",
-         [](order &o) {
-             o.updateId = {"X", "FW-100", "X"};
-         },
-         "FW-100 ?X"},
-        {"a qualifier of another",
-         [&](order &o) {
-             auto *const q = make<protocolUpdateOrder__UpdateIdQualified>(&ctx);
-             q->updateId = make_text(&ctx, "FW-100");
-             q->updateIdQualifier = make_text(&ctx, "OTHER");
-             o.updateIdQualified.push_back(q);
-         },
-         "?FW-100"},
-        {"a category", [](order &o) { o.updateScope = {"critical"}; }, "FW-120 DB-10-P1"},
-        {"a collection", [](order &o) { o.updateScope = {"software"}; },
-         "DB-10 DB-10-P1 DB-11 PACK-DB PACK-2024"},
-        {"ancillaries",
-         [&](order &o) {
-             o.updateScope = {"tools"};
-             o.includeAncillaries = yes();
-         },
-         "TOOLS-1"},
-        {"what is left out implicitly", [](order &o) { o.updateScope = {"tape"}; }, ""},
-        {"unless asked for",
-         [&](order &o) {
-             o.updateScope = {"tape"};
-             o.includeImplicitExclusions = yes();
-         },
+    const std::string data = "DB-10 DB-10-P1 DB-11 PACK-DB PACK-2024";
+    const struct {
+        const char *rule, *asked;
+        std::string ids;
+    } rows[] = {
+        {"identifiers, each once", "updateId=DRV-5 updateId=FW-100 updateId=DRV-5", "DRV-5 FW-100"},
+        {"unknown ones are told once", "updateId=X updateId=FW-100 updateId=X", "FW-100 ?X"},
+        {"a category", "updateScope=critical", "FW-120 DB-10-P1"},
+        {"a collection", "updateScope=software", data},
+        {"ancillaries", "updateScope=tools includeAncillaries=true", "TOOLS-1"},
+        {"what is left out implicitly", "updateScope=tape", ""},
+        {"unless asked for", "updateScope=tape includeImplicitExclusions=true", "TAPE-7"},
+        {"by its kind", "updateScope=tape includeImplicitExclusions=true selectImplicitExclusions=allPending",
          "TAPE-7"},
-        {"by its kind",
-         [&](order &o) {
-             o.updateScope = {"tape"};
-             o.includeImplicitExclusions = yes();
-             o.selectImplicitExclusions = {exclusions::allPending};
-         },
-         "TAPE-7"},
-        {"or by name", [](order &o) { o.updateId = {"TAPE-7"}; }, "TAPE-7"},
-        {"for a subject",
-         [&](order &o) {
-             o.updateScope = {"all"};
-             o.subject = make<protocol__Identity>(&ctx);
-             o.subject->product = make_text(&ctx, "ZDB");
-         },
-         "DB-10 DB-10-P1 DB-11 PACK-DB PACK-2024"},
-        {"requisites as indicated",
-         [](order &o) {
-             o.updateId = {"FW-120"};
-             o.includeRequisites = true;
-         },
-         "FW-120 BIOS-20 DRV-5"},
+        {"or by name", "updateId=TAPE-7", "TAPE-7"},
+        {"requisites as indicated", "updateId=FW-120 includeRequisites=true", "FW-120 BIOS-20 DRV-5"},
         {"the last that supersede them",
-         [&](order &o) {
-             o.updateId = {"FW-120"};
-             o.includeRequisites = true;
-             o.selectRequisites = make_value(&ctx, requisites::lastSupersedingOnly);
-         },
+         "updateId=FW-120 includeRequisites=true selectRequisites=lastSupersedingOnly",
          "FW-120 BIOS-30 DRV-5"},
-        {"superseding ones",
-         [](order &o) {
-             o.updateId = {"FW-100"};
-             o.includeSupersedes = true;
-         },
-         "FW-100 FW-110 FW-120"},
-        {"the first only",
-         [&](order &o) {
-             o.updateId = {"FW-100"};
-             o.includeSupersedes = true;
-             o.selectSupersedes = make_value(&ctx, supersedes::firstSupersedingOnly);
-         },
+        {"superseding ones", "updateId=FW-100 includeSupersedes=true", "FW-100 FW-110 FW-120"},
+        {"the first only", "updateId=FW-100 includeSupersedes=true selectSupersedes=firstSupersedingOnly",
          "FW-100 FW-110"},
         {"the last only, with what it requires",
-         [&](order &o) {
-             o.updateId = {"FW-100"};
-             o.includeSupersedes = o.includeRequisites = true;
-             o.selectSupersedes = make_value(&ctx, supersedes::lastSupersedingOnly);
-         },
+         "updateId=FW-100 includeSupersedes=true includeRequisites=true selectSupersedes=lastSupersedingOnly",
          "FW-100 FW-120 BIOS-20 DRV-5"},
         {"shared by several",
-         [&](order &o) {
-             o.updateId = {"FW-100", "FW-110", "BIOS-20"};
-             o.includeSupersedes = true;
-             o.selectSupersedes = make_value(&ctx, supersedes::sharedSupersedingOnly);
-         },
+         "updateId=FW-100 updateId=FW-110 updateId=BIOS-20 includeSupersedes=true "
+         "selectSupersedes=sharedSupersedingOnly",
          "FW-100 FW-110 BIOS-20 FW-120"},
-        {"superseded ones",
-         [&](order &o) {
-             o.updateId = {"FW-120"};
-             o.includeSupersedes = true;
-             o.selectSupersedes = make_value(&ctx, supersedes::allSuperseded);
-         },
+        {"superseded ones", "updateId=FW-120 includeSupersedes=true selectSupersedes=allSuperseded",
          "FW-120 FW-110 FW-100"},
-        {"patches and replacements",
-         [&](order &o) {
-             o.updateId = {"DB-10"};
-             o.includePatches = o.includeConditionalReplacements = yes();
-         },
+        {"patches and replacements", "updateId=DB-10 includePatches=true includeConditionalReplacements=true",
          "DB-10 DB-10-P1 DB-11"},
-        {"a group as it is", [](order &o) { o.updateId = {"PACK-2024"}; }, "PACK-2024"},
-        {"a group's members",
-         [&](order &o) {
-             o.updateId = {"PACK-2024"};
-             o.expandGroups = make_value(&ctx, groups::all);
-         },
+        {"a group as it is", "updateId=PACK-2024", "PACK-2024"},
+        {"a group's members", "updateId=PACK-2024 expandGroups=all",
          "PACK-2024 FW-120 BIOS-30 PACK-DB DB-10 DB-10-P1"},
-        {"those of nested groups",
-         [&](order &o) {
-             o.updateId = {"PACK-2024"};
-             o.expandGroups = make_value(&ctx, groups::nestedGroupsOnly);
-         },
+        {"those of nested groups", "updateId=PACK-2024 expandGroups=nestedGroupsOnly",
          "PACK-2024 DB-10 DB-10-P1"},
+        {"a qualifier of another",
+         "<protocolUpdateOrder:updateIdQualified>updateId=FW-100 "
+         "updateIdQualifier=OTHER</protocolUpdateOrder:updateIdQualified>",
+         "?FW-100"},
+        {"for a subject",
+         "updateScope=all <protocol:subject><protocol:product>ZDB</protocol:product></protocol:subject>",
+         data},
     };
-    for (const row &r : rows) {
-        order o;
-        r.ask(o);
-        EXPECT_EQ(ids(expand(&ctx, the_catalogue(), o)), r.ids) << r.rule;
+    for (const auto &r : rows) {
+        soap ctx;
+        const parsed<order> asked("protocolUpdateOrder:UpdateOrderContent", members(r.asked));
+        EXPECT_EQ(ids(expand(&ctx, the_catalogue(), *asked)), r.ids) << r.rule;
     }
 }
 

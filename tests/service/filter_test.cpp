@@ -5,29 +5,12 @@
 #include <gtest/gtest.h>
 
 #include "catalogue.h"
-#include "document.h"
 #include "filter.h"
+#include "parsed.h"
 
 using namespace service;
 
 namespace {
-
-// XML of a filter: `expression` is the content of a Filter of a language.
-template <class Filter> class parsed_filter {
-public:
-    parsed_filter(const std::string &prefix, const std::string &expression) : codec_(1 << 20, 200)
-    {
-        std::string xml = "<" + prefix + ":Filter";
-        for (const soap_namespace *row = soap_program_namespaces; row->prefix != nullptr; ++row)
-            xml += std::string(" xmlns:") + row->prefix + "=\"" + row->uri + "\"";
-        filter_ = codec_.read<Filter>(xml + ">" + expression + "</" + prefix + ":Filter>");
-    }
-    const Filter &operator*() const { return *filter_; }
-
-private:
-    document_codec codec_;
-    Filter *filter_;
-};
 
 // A comparison of the update language: class, operator, then elements in turn with their texts.
 std::string node(const std::string &element, const std::string &type, const std::string &content,
@@ -47,7 +30,7 @@ std::string text(const std::string &element, const std::string &value,
 // The identifiers of the updates that pass, in order, with blanks between them.
 std::string passing(const std::string &expression)
 {
-    const parsed_filter<protocolUpdateOrderFilter__Filter> filter("protocolUpdateOrderFilter", expression);
+    const parsed<protocolUpdateOrderFilter__Filter> filter("protocolUpdateOrderFilter:Filter", expression);
     soap ctx;
     std::string ids;
     for (const update_record *update : the_catalogue().all())
@@ -235,7 +218,6 @@ TEST(Filters, JudgeEveryComparisonOfBothLanguages)
 
 TEST(ReportFilter, ComparesWhatTheClassNames)
 {
-    document_codec codec(1 << 20, 200);
     const std::string p = "protocolPRFilter";
     std::string product = "ZX100", country = "AT", number = "4711", other = "DE", description = "It hangs",
                 submitted = "2024-02-03T04:05:06Z";
@@ -269,8 +251,8 @@ TEST(ReportFilter, ComparesWhatTheClassNames)
          false},
     };
     for (const row &r : rows) {
-        const parsed_filter<protocolPRFilter__Filter> filter(p,
-                                                             node("expression", r.type, r.content, r.op, p));
+        const parsed<protocolPRFilter__Filter> filter(p + ":Filter",
+                                                      node("expression", r.type, r.content, r.op, p));
         EXPECT_EQ(filter_holds(*filter, facts_of(&ctx, report)), r.holds) << r.type << ' ' << r.op;
     }
 }

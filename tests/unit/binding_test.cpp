@@ -112,6 +112,10 @@ TEST_F(Binding, xsi_type_makes_the_derived_class_and_an_unknown_one_the_base)
     EXPECT_EQ("U1", *static_cast<protocolUpdateOrder__UpdateMetaData *>(query->metaData[0])->updateId);
     EXPECT_EQ(SOAP_TYPE_protocol__MetaData, query->metaData[1]->soap_type());
     EXPECT_EQ(SOAP_TYPE_protocol__MetaData, query->metaData[2]->soap_type()) << "a class outside the family";
+    const std::string undeclared = "<d><protocolUpdateOrder:metaData xsi:type=\"nobody:MetaData\"/></d>";
+    EXPECT_NE(nullptr, read<protocolUpdateOrder__UpdateIdExpansionDetail>(undeclared));
+    EXPECT_EQ(nullptr, read<protocolUpdateOrder__UpdateIdExpansionDetail>(undeclared, MODE_STRICT));
+    EXPECT_EQ(SOAP_TYPE_MISMATCH, ctx.error);
 }
 
 TEST_F(Binding, enumerations_take_words_exactly_and_numbers_by_mode)

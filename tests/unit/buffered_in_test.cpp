@@ -152,6 +152,8 @@ TEST(buffered_in, the_first_bytes_decide_what_is_read)
         {"nothing", "", SOAP_EOF, MODE_LATIN1, -1},
         {"blanks alone", "   ", SOAP_EOF, MODE_LATIN1, -1},
         {"UTF-8 mark", "\xEF\xBB\xBF<a/>", 0, 0, '<'},
+        {"UTF-8 mark, blanks behind it", "\xEF\xBB\xBF \r\n<a/>", 0, 0, '<'},
+        {"UTF-8 mark and blanks alone", "\xEF\xBB\xBF  ", SOAP_EOF, 0, -1},
         {"UTF-16, low byte first", "\xFF\xFE<", SOAP_UTF_ERROR, MODE_LATIN1, -1},
         {"UTF-16, high byte first", "\xFE\xFF<", SOAP_UTF_ERROR, MODE_LATIN1, -1},
         {"gzip", gzipped("\n<a/>"), 0, MODE_LATIN1 | MODE_DEFLATE, '<'},

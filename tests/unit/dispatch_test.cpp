@@ -169,19 +169,16 @@ TEST_F(Dispatch, a_refused_allocation_is_an_error_and_nothing_else)
 {
     std::size_t refusals = 0;
     for_each_type([&](int type, const std::string &text) {
-        for (std::size_t nth = 1, refused = 1; refused != 0; ++nth) {
-            receive(text);
-            void *back = nullptr;
-            {
-                const failing_malloc::scope armed(nth);
-                back = read_by_type(&ctx, type);
-                refused = armed.refused();
-            }
-            EXPECT_TRUE(back != nullptr || (refused != 0 && ctx.error == SOAP_OUT_OF_MEMORY))
-                << nth << " " << ctx.error;
-            refusals += refused;
-            forget();
-        }
+        void *back = nullptr;
+        receive(text);
+        refusals += failing_malloc::at_each_allocation(
+            failing_malloc::refuse::one, [&] { back = read_by_type(&ctx, type); },
+            [&](bool refused) {
+                EXPECT_TRUE(back != nullptr || (refused && ctx.error == SOAP_OUT_OF_MEMORY)) << ctx.error;
+                forget();
+                receive(text);
+            });
+        forget();
     });
     EXPECT_GT(refusals, 0u);
 }

@@ -135,244 +135,146 @@ std::string with_changed_chunk(const std::string &name, const std::string &size)
 constexpr unsigned MEETS_LIMIT = 1; // the first call ends by a time limit of BRIEF_US
 constexpr unsigned SPEAKS_UP = 2; // something arrives between the first two calls, which the second must see
 
+struct outcome {
+    std::vector<int> codes; // of the calls, in turn
+    int connections;        // that they need
+    unsigned traits = 0;
+};
+
 struct hostility {
     const char *name;
+    outcome expected;
     std::function<void(line &)> first; // the first connection; all others are well
-    std::vector<int> codes;            // of the calls, in turn
-    int connections;                   // that they need
-    unsigned traits = 0;
 };
 
 const std::string X_LINE = "X: " + std::string(1000, 'x') + "\r\n";
 
 const hostility PEERS[] = {
-    {"well", serve_well, {0, 0, 0}, 1},
-    {"well, one byte at a time", byte_by_byte, {0, 0, 0}, 1},
-    {"ends between two calls",
-     [](line &end) { end.send(answer_to(end.request())); },
-     {0, 0, 0},
-     2,
-     SPEAKS_UP},
-    {"reset between two calls",
-     [](line &end) {
+    {"well", {{0, 0, 0}, 1}, serve_well},
+    {"well, one byte at a time", {{0, 0, 0}, 1}, byte_by_byte},
+    {"ends between two calls", {{0, 0, 0}, 2, SPEAKS_UP},
+     [](line &end) { end.send(answer_to(end.request())); }},
+    {"reset between two calls", {{0, 0, 0}, 2, SPEAKS_UP}, [](line &end) {
          end.send(answer_to(end.request()));
          end.reset();
-     },
-     {0, 0, 0},
-     2,
-     SPEAKS_UP},
-    {"ends at the second request",
-     [](line &end) {
+     }},
+    {"ends at the second request", {{0, SOAP_EOF, 0}, 2}, [](line &end) {
          end.send(answer_to(end.request()));
          end.request();
-     },
-     {0, SOAP_EOF, 0},
-     2},
-    {"ends without an answer", [](line &end) { end.request(); }, {SOAP_EOF, 0, 0}, 2},
-    {"ends before the request", [](line &end) { end.end(); }, {SOAP_EOF, 0, 0}, 2},
-    {"silent", [](line &end) { end.await_end(); }, {SOAP_EOF, 0, 0}, 2, true},
-    {"half an answer, then silent",
-     [](line &end) {
+     }},
+    {"ends without an answer", {{SOAP_EOF, 0, 0}, 2}, [](line &end) { end.request(); }},
+    {"ends before the request", {{SOAP_EOF, 0, 0}, 2}, [](line &end) { end.end(); }},
+    {"silent", {{SOAP_EOF, 0, 0}, 2, MEETS_LIMIT}, [](line &end) { end.await_end(); }},
+    {"half an answer, then silent", {{SOAP_EOF, 0, 0}, 2, MEETS_LIMIT}, [](line &end) {
          const std::string whole = answer_to(end.request());
          end.send(whole.substr(0, whole.size() / 2));
          end.await_end();
-     },
-     {SOAP_EOF, 0, 0},
-     2,
-     MEETS_LIMIT},
-    {"says close and stays",
-     answering([](const std::string &name) {
+     }},
+    {"says close and stays", {{0, 0, 0}, 2}, answering([](const std::string &name) {
          const std::string body = answer_body(name);
          return head("Connection: close\r\nContent-Length: " + std::to_string(body.size()) + "\r\n") + body;
-     }),
-     {0, 0, 0},
-     2},
-    {"HTTP/1.0, ends the body by ending",
-     [](line &end) { end.send(head("", "HTTP/1.0 200 OK") + answer_body(name_in(end.request()))); },
-     {0, 0, 0},
-     2},
-    {"HTTP/1.1 without a length",
-     answering([](const std::string &name) { return head("") + answer_body(name); }),
-     {0, 0, 0},
-     2},
-    {"no HTTP at all", answering(answer_body), {0, 0, 0}, 2},
-    {"a second answer at once",
-     answering([](const std::string &name) {
+     })},
+    {"HTTP/1.0, ends the body by ending", {{0, 0, 0}, 2},
+     [](line &end) { end.send(head("", "HTTP/1.0 200 OK") + answer_body(name_in(end.request()))); }},
+    {"HTTP/1.1 without a length", {{0, 0, 0}, 2},
+     answering([](const std::string &name) { return head("") + answer_body(name); })},
+    {"no HTTP at all", {{0, 0, 0}, 2}, answering(answer_body)},
+    {"a second answer at once", {{0, 0, 0}, 2}, answering([](const std::string &name) {
          return with_length(answer_body(name)) + with_length(answer_body("call-2"));
-     }),
-     {0, 0, 0},
-     2},
-    {"a wrong second answer at once",
-     answering([](const std::string &name) {
+     })},
+    {"a wrong second answer at once", {{0, 0, 0}, 2}, answering([](const std::string &name) {
          return with_length(answer_body(name)) + with_length(answer_body("stray"));
-     }),
-     {0, 0, 0},
-     2},
-    {"a wrong second answer, in chunks",
-     answering([](const std::string &name) {
+     })},
+    {"a wrong second answer, in chunks", {{0, 0, 0}, 2}, answering([](const std::string &name) {
          return in_chunks(answer_body(name)) + in_chunks(answer_body("stray"));
-     }),
-     {0, 0, 0},
-     2},
-    {"surplus bytes",
-     answering([](const std::string &name) { return with_length(answer_body(name)) + "surplus"; }),
-     {0, 0, 0},
-     2},
-    {"a second answer, later",
-     [](line &end) {
+     })},
+    {"surplus bytes", {{0, 0, 0}, 2},
+     answering([](const std::string &name) { return with_length(answer_body(name)) + "surplus"; })},
+    {"a second answer, later", {{0, 0, 0}, 2}, [](line &end) {
          const std::string request = end.request();
          end.send(answer_to(request));
          end.send(with_length(answer_body("stray")));
          end.await_end();
-     },
-     {0, 0, 0},
-     2},
-    {"length 10 too small",
-     answering([](const std::string &n) { return with_false_length(n, -10); }),
-     {0, 0, 0},
-     2},
-    {"length 10 too large",
-     answering([](const std::string &n) { return with_false_length(n, 10); }),
-     {0, 0, 0},
-     2,
-     MEETS_LIMIT},
-    {"length 10 too large, and ends",
-     [](line &end) { end.send(with_false_length(name_in(end.request()), 10)); },
-     {0, 0, 0},
-     2},
-    {"length beyond 64 bits",
-     answering([](const std::string &n) {
+     }},
+    {"length 10 too small", {{0, 0, 0}, 2},
+     answering([](const std::string &n) { return with_false_length(n, -10); })},
+    {"length 10 too large", {{0, 0, 0}, 2, MEETS_LIMIT},
+     answering([](const std::string &n) { return with_false_length(n, 10); })},
+    {"length 10 too large, and ends", {{0, 0, 0}, 2},
+     [](line &end) { end.send(with_false_length(name_in(end.request()), 10)); }},
+    {"length beyond 64 bits", {{0, 0, 0}, 2}, answering([](const std::string &n) {
          return head("Content-Length: 99999999999999999999999\r\n") + answer_body(n);
-     }),
-     {0, 0, 0},
-     2},
-    {"length negative",
-     answering([](const std::string &n) { return head("Content-Length: -1\r\n") + answer_body(n); }),
-     {0, 0, 0},
-     2},
-    {"length no number",
-     answering([](const std::string &n) { return head("Content-Length: many\r\n") + answer_body(n); }),
-     {0, 0, 0},
-     2},
-    {"two lengths, the second right",
-     answering([](const std::string &n) {
+     })},
+    {"length negative", {{0, 0, 0}, 2},
+     answering([](const std::string &n) { return head("Content-Length: -1\r\n") + answer_body(n); })},
+    {"length no number", {{0, 0, 0}, 2},
+     answering([](const std::string &n) { return head("Content-Length: many\r\n") + answer_body(n); })},
+    {"two lengths, the second right", {{0, 0, 0}, 2}, answering([](const std::string &n) {
          std::string text = with_length(answer_body(n));
          return text.insert(text.find("Content-L"), "Content-Length: 7\r\n");
-     }),
-     {0, 0, 0},
-     2},
-    {"a length beside chunks",
-     answering([](const std::string &n) {
+     })},
+    {"a length beside chunks", {{0, 0, 0}, 2}, answering([](const std::string &n) {
          std::string text = in_chunks(answer_body(n));
          return text.insert(text.find("Transfer"), "Content-Length: 7\r\n");
-     }),
-     {0, 0, 0},
-     2},
-    {"chunk size too small",
-     answering([](const std::string &n) { return with_changed_chunk(n, "60"); }),
-     {SOAP_TAG_MISMATCH, 0, 0},
-     2},
-    {"chunk size too large",
-     answering([](const std::string &n) { return with_changed_chunk(n, "6A"); }),
-     {SOAP_EOF, 0, 0},
-     2,
-     MEETS_LIMIT},
-    {"chunk size endless",
-     answering([](const std::string &n) { return with_changed_chunk(n, "FFFFFFFFFFFFFFFFFF"); }),
-     {SOAP_TAG_MISMATCH, 0, 0},
-     2},
-    {"chunk size negative",
-     answering([](const std::string &n) { return with_changed_chunk(n, "-1"); }),
-     {SOAP_SYNTAX_ERROR, 0, 0},
-     2},
-    {"no last chunk",
-     answering([](const std::string &n) {
+     })},
+    {"chunk size too small", {{SOAP_TAG_MISMATCH, 0, 0}, 2},
+     answering([](const std::string &n) { return with_changed_chunk(n, "60"); })},
+    {"chunk size too large", {{SOAP_EOF, 0, 0}, 2, MEETS_LIMIT},
+     answering([](const std::string &n) { return with_changed_chunk(n, "6A"); })},
+    {"chunk size endless", {{SOAP_TAG_MISMATCH, 0, 0}, 2},
+     answering([](const std::string &n) { return with_changed_chunk(n, "FFFFFFFFFFFFFFFFFF"); })},
+    {"chunk size negative", {{SOAP_SYNTAX_ERROR, 0, 0}, 2},
+     answering([](const std::string &n) { return with_changed_chunk(n, "-1"); })},
+    {"no last chunk", {{0, 0, 0}, 2, MEETS_LIMIT}, answering([](const std::string &n) {
          const std::string text = in_chunks(answer_body(n));
          return text.substr(0, text.size() - 5);
-     }),
-     {0, 0, 0},
-     2,
-     MEETS_LIMIT},
-    {"body broken off inside",
-     answering([](const std::string &n) {
+     })},
+    {"body broken off inside", {{SOAP_EOF, 0, 0}, 2}, answering([](const std::string &n) {
          const std::string body = answer_body(n);
          return with_length(body.substr(0, body.find("</c:name>")));
-     }),
-     {SOAP_EOF, 0, 0},
-     2},
-    {"body malformed",
-     answering([](const std::string &n) {
+     })},
+    {"body malformed", {{SOAP_SYNTAX_ERROR, 0, 0}, 2}, answering([](const std::string &n) {
          std::string body = answer_body(n);
          return with_length(body.replace(body.find("<c:name>"), 8, "<c:name =\"\">"));
-     }),
-     {SOAP_SYNTAX_ERROR, 0, 0},
-     2},
-    {"body without an envelope",
-     answering([](const std::string &) { return with_length("<a><b></a>"); }),
-     {SOAP_TAG_MISMATCH, 0, 0},
-     2},
-    {"body of another kind",
-     answering([](const std::string &) { return with_length("\x89PNG\r\n\x1A\n"); }),
-     {SOAP_NO_TAG, 0, 0},
-     2},
-    {"body of zeros",
-     answering([](const std::string &) { return with_length(std::string(1000, '\0')); }),
-     {SOAP_EOF, 0, 0},
-     2},
-    {"body empty", answering([](const std::string &) { return with_length(""); }), {SOAP_NO_DATA, 0, 0}, 2},
-    {"gzip promised, none sent",
-     answering([](const std::string &n) {
+     })},
+    {"body without an envelope", {{SOAP_TAG_MISMATCH, 0, 0}, 2},
+     answering([](const std::string &) { return with_length("<a><b></a>"); })},
+    {"body of another kind", {{SOAP_NO_TAG, 0, 0}, 2},
+     answering([](const std::string &) { return with_length("\x89PNG\r\n\x1A\n"); })},
+    {"body of zeros", {{SOAP_EOF, 0, 0}, 2},
+     answering([](const std::string &) { return with_length(std::string(1000, '\0')); })},
+    {"body empty", {{SOAP_NO_DATA, 0, 0}, 2}, answering([](const std::string &) { return with_length(""); })},
+    {"gzip promised, none sent", {{SOAP_ZLIB_ERROR, 0, 0}, 2}, answering([](const std::string &n) {
          const std::string body = answer_body(n);
          return head("Content-Encoding: gzip\r\nContent-Length: " + std::to_string(body.size()) + "\r\n") +
                 body;
-     }),
-     {SOAP_ZLIB_ERROR, 0, 0},
-     2},
-    {"endless header lines",
-     [](line &end) { flood(end, "HTTP/1.1 200 OK\r\n", X_LINE); },
-     {SOAP_HEADER_LINE, 0, 0},
-     2},
-    {"an endless header line",
-     [](line &end) { flood(end, "HTTP/1.1 200 OK\r\nX: ", std::string(1000, 'x')); },
-     {SOAP_HEADER_LINE, 0, 0},
-     2},
-    {"an endless folded line",
-     [](line &end) { flood(end, "HTTP/1.1 200 OK\r\nX: y\r\n", " z\r\n"); },
-     {SOAP_HEADER_LINE, 0, 0},
-     2},
-    {"an endless first line",
-     [](line &end) { flood(end, "HTTP/1.1 200 ", std::string(1000, 'x')); },
-     {414, 0, 0},
-     2},
-    {"endless heads of 100",
-     [](line &end) { flood(end, "", "HTTP/1.1 100 Continue\r\n\r\n"); },
-     {SOAP_HEADER_LINE, 0, 0},
-     2},
-    {"endless error body",
-     [](line &end) {
+     })},
+    {"endless header lines", {{SOAP_HEADER_LINE, 0, 0}, 2},
+     [](line &end) { flood(end, "HTTP/1.1 200 OK\r\n", X_LINE); }},
+    {"an endless header line", {{SOAP_HEADER_LINE, 0, 0}, 2},
+     [](line &end) { flood(end, "HTTP/1.1 200 OK\r\nX: ", std::string(1000, 'x')); }},
+    {"an endless folded line", {{SOAP_HEADER_LINE, 0, 0}, 2},
+     [](line &end) { flood(end, "HTTP/1.1 200 OK\r\nX: y\r\n", " z\r\n"); }},
+    {"an endless first line", {{414, 0, 0}, 2},
+     [](line &end) { flood(end, "HTTP/1.1 200 ", std::string(1000, 'x')); }},
+    {"endless heads of 100", {{SOAP_HEADER_LINE, 0, 0}, 2},
+     [](line &end) { flood(end, "", "HTTP/1.1 100 Continue\r\n\r\n"); }},
+    {"endless error body", {{503, 0, 0}, 2}, [](line &end) {
          flood(end, head("Content-Length: 9999999999\r\n", "HTTP/1.1 503 Busy"), std::string(10000, 'e'));
-     },
-     {503, 0, 0},
-     2},
-    {"endless trailers",
-     [](line &end) {
+     }},
+    {"endless trailers", {{0, 0, 0}, 2}, [](line &end) {
          const std::string text = in_chunks(answer_body(name_in(end.request())));
          end.send(text.substr(0, text.size() - 2));
          while (end.send_while_it_lasts(X_LINE)) {
          }
-     },
-     {0, 0, 0},
-     2},
-    {"endless depth",
-     [](line &end) {
+     }},
+    {"endless depth", {{SOAP_LENGTH, 0, 0}, 2}, [](line &end) {
          end.request();
          const std::string body = answer_body("x");
          end.send(head("") + body.substr(0, body.find("<c:identity>")));
          while (end.send_while_it_lasts("<p:profile><p:profile><p:profile><p:profile>")) {
          }
-     },
-     {SOAP_LENGTH, 0, 0},
-     2},
+     }},
 };
 
 std::string joined(const std::vector<int> &codes)
@@ -387,13 +289,13 @@ void call_all(const hostility &peer, bool tls)
 {
     const server one(peer.first, tls);
     client caller(one);
-    const bool meets_limit = (peer.traits & MEETS_LIMIT) != 0;
+    const bool meets_limit = (peer.expected.traits & MEETS_LIMIT) != 0;
     if (meets_limit)
         caller.proxy.recv_timeout = BRIEF_US;
     std::vector<int> codes;
     int longest = 0;
-    for (std::size_t i = 0; i < peer.codes.size(); ++i) {
-        if (i == 1 && (peer.traits & SPEAKS_UP) != 0) {
+    for (std::size_t i = 0; i < peer.expected.codes.size(); ++i) {
+        if (i == 1 && (peer.expected.traits & SPEAKS_UP) != 0) {
             EXPECT_GT(tcp_wait(&caller.proxy, caller.proxy.socket, WAIT_RECV, GUARD_S), 0) << peer.name;
         }
         codes.push_back(caller.call());
@@ -404,8 +306,8 @@ void call_all(const hostility &peer, bool tls)
     }
     std::printf("%-35s %-4s %-12s %d connections %5d ms\n", peer.name, tls ? "TLS" : "TCP",
                 joined(codes).c_str(), caller.connections, longest);
-    EXPECT_EQ(joined(codes), joined(peer.codes)) << peer.name;
-    EXPECT_EQ(caller.connections, peer.connections) << peer.name;
+    EXPECT_EQ(joined(codes), joined(peer.expected.codes)) << peer.name;
+    EXPECT_EQ(caller.connections, peer.expected.connections) << peer.name;
     EXPECT_LT(longest, SLACK_MS) << peer.name;
 }
 

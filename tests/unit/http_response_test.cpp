@@ -243,7 +243,11 @@ TEST(response_head, decides_by_the_status)
          "HTTP/1.1 503 Busy", "busy"},
         {"199 Odd\r\nContent-Length: 1\r\n\r\n", "x", 199, "HTTP/1.1 199 Odd", "x"},
         {"65735 Huge\r\n\r\n", "", 199, "HTTP Error", "HTTP/1.1 65735 Huge"}, // the number is kept to 16 bits
-        {"404x Bad number\r\n\r\n", "", 405, nullptr, nullptr},               // so this is no response
+        {"7 Fake\r\n\r\n", "", SOAP_HTTP_ERROR, "HTTP Error", "HTTP/1.1 7 Fake"}, // not the engine's 7
+        {"20 Fake\r\nContent-Length: 1\r\n\r\n", "x", SOAP_HTTP_ERROR, "HTTP Error", "HTTP/1.1 20 Fake"},
+        {"1000 Fake\r\n\r\n", "", SOAP_HTTP_ERROR, "HTTP Error", "HTTP/1.1 1000 Fake"},
+        {"65535 Fake\r\n\r\n", "", SOAP_HTTP_ERROR, "HTTP Error", "HTTP/1.1 65535 Fake"},
+        {"404x Bad number\r\n\r\n", "", 405, nullptr, nullptr}, // so this is no response
     };
     for (const status_case &c : cases) {
         for (const std::size_t piece : {65536U, 1U}) {

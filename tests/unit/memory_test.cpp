@@ -436,27 +436,19 @@ TEST(MemoryExhausted, EveryAllocationMayFail)
 
 TEST(MemoryExhausted, AMoveFailsWholeOrNotAtAll)
 {
-    std::size_t refusals = 0;
-    for (std::size_t nth = 1;; ++nth) {
-        soap source, target;
-        for (int i = 0; i < 600; ++i) {
-            soap_block_alloc(&source, 8);
-            soap_instance_register(&source, &source, i + 1, -1, note_destruction);
-        }
-        bool refused = false;
-        {
-            const failing_malloc::scope armed(nth);
-            soap_blocks_move(&source, &target);
-            refused = armed.refused() > 0;
-        }
-        if (!refused)
-            break;
-        ++refusals;
-        EXPECT_NE(source.allocation_list, nullptr);
-        EXPECT_EQ(target.allocation_list, nullptr);
-        EXPECT_EQ(source.error, SOAP_OUT_OF_MEMORY);
+    soap source, target;
+    for (int i = 0; i < 600; ++i) {
+        soap_block_alloc(&source, 8);
+        soap_instance_register(&source, &source, i + 1, -1, note_destruction);
     }
-    EXPECT_GT(refusals, 1u);
+    const auto move = [&] { soap_blocks_move(&source, &target); };
+    const auto check = [&](bool refused) {
+        EXPECT_EQ(source.allocation_list == nullptr, !refused);
+        EXPECT_EQ(target.allocation_list == nullptr, refused);
+        EXPECT_EQ(source.error, refused ? SOAP_OUT_OF_MEMORY : 0);
+        source.error = 0;
+    };
+    EXPECT_GT(failing_malloc::at_each_allocation(failing_malloc::refuse::one, move, check), 1u);
 }
 
 } // namespace

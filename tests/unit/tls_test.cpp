@@ -123,6 +123,7 @@ TEST_F(tls, a_tunnel_through_a_proxy_leads_to_the_host_behind_it)
     ctx->keep_alive = 1;
     ctx->action = "urn:action";
     ctx->auth_user = "user";
+    ctx->proxy_user = ctx->proxy_password = "p";
     ctx->mode = ctx->output_mode = MODE_STORE | MODE_KEEP_ALIVE | MODE_INDENT;
     ctx->message_count = 42;
     ASSERT_GE(tcp_connect(ctx.get(), "https://far.example/service", "far.example", 443), 0)
@@ -138,6 +139,16 @@ TEST_F(tls, a_tunnel_through_a_proxy_leads_to_the_host_behind_it)
     EXPECT_EQ(ctx->message_count, 42u);
     EXPECT_STREQ(ctx->endpoint, "https://far.example/service");
     EXPECT_EQ(exchange(ctx, "hello"), "hello");
+    EXPECT_NE(head.find("\r\nProxy-Authorization: Basic cDpw\r\n"), std::string::npos) << head;
+    std::string within; // the head that the host behind the proxy reads
+    ctx->user = &within;
+    ctx->on_header_line = [](soap *line_ctx, const char *key, const char *) {
+        static_cast<std::string *>(line_ctx->user)->append(key == nullptr ? "" : key).append("\n");
+        return 0;
+    };
+    EXPECT_EQ(http_write_request(ctx.get(), ctx->endpoint, ctx->host, 443, "/service", "", 1), 0);
+    EXPECT_NE(within.find("\nHost\n"), std::string::npos) << within;
+    EXPECT_EQ(within.find("Proxy-Authorization"), std::string::npos) << within;
     ctx->action = ctx->auth_user = nullptr;
 }
 

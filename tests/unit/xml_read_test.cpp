@@ -517,31 +517,23 @@ TEST(XmlRead, every_allocation_may_fail)
 {
     const std::string document = "<p:a xmlns:p='urn:one' long='" + std::string(2000, 'x') + "&amp;'><p:b>" +
                                  std::string(600, 'y') + "&lt;</p:b><p:c>\xC3\xA9</p:c></p:a>";
-    for (std::size_t nth = 1;; ++nth) {
-        reception in(document);
-        soap *ctx = in.context();
-        int error;
-        char *text = nullptr;
-        char32_t *wide = nullptr;
-        bool one_refused;
-        {
-            const failing_malloc::scope armed(nth);
-            error = soap_element_in_begin(ctx, "one:a", 1, nullptr);
-            if (error == 0 && soap_string_element_in(ctx, "one:b", &text, nullptr, 4, 1, -1, -1) == nullptr)
-                error = ctx->error;
-            if (error == 0 &&
-                soap_wide_string_element_in(ctx, "one:c", &wide, nullptr, 4, 1, -1, -1) == nullptr)
-                error = ctx->error;
-            if (error == 0)
-                error = soap_element_in_end(ctx, "one:a");
-            one_refused = armed.refused() != 0;
-        }
-        EXPECT_EQ(error, one_refused ? SOAP_OUT_OF_MEMORY : 0) << nth;
-        if (!one_refused) {
-            EXPECT_GT(nth, 5u);
-            break;
-        }
-    }
+    auto in = std::make_unique<reception>(document);
+    char *text = nullptr;
+    char32_t *wide = nullptr;
+    const auto read = [&] {
+        soap *const ctx = in->context();
+        soap_element_in_begin(ctx, "one:a", 1, nullptr) == 0 &&
+            soap_string_element_in(ctx, "one:b", &text, nullptr, 4, 1, -1, -1) !=
+                nullptr &&soap_wide_string_element_in(ctx, "one:c", &wide, nullptr, 4, 1, -1, -1) !=
+                nullptr &&soap_element_in_end(ctx, "one:a");
+    };
+    const auto check = [&](bool refused) {
+        EXPECT_EQ(in->context()->error, refused ? SOAP_OUT_OF_MEMORY : 0);
+        in = std::make_unique<reception>(document);
+        text = nullptr;
+        wide = nullptr;
+    };
+    EXPECT_GT(failing_malloc::at_each_allocation(failing_malloc::refuse::one, read, check), 5u);
 }
 
 } // namespace
