@@ -22,7 +22,7 @@ namespace {
 
 constexpr std::size_t RAW_DETAIL_MAX = 500; // bytes of a detail that nobody knows
 constexpr int DETAIL_DEPTH_MAX = 20;
-constexpr int HTTP_FIRST = 201, HTTP_LAST = 599;
+constexpr int HTTP_OK = 200, HTTP_FIRST = 201, HTTP_LAST = 599;
 
 // --- the typed detail ---
 
@@ -120,6 +120,8 @@ bool has_record(const soap *ctx)
 
 exit_code exit_code_of(soap *ctx)
 {
+    if (ctx->error == HTTP_OK) // what came with it is no Envelope
+        return EXIT_ANSWER;
     if (ctx->error > 0 && ctx->error == ctx->status) // also where a strange status has the value of a code
         return EXIT_HTTP;
     switch (ctx->error) {

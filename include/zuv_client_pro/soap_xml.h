@@ -327,8 +327,8 @@ ZUV_API char32_t **soap_wide_raw_element_in(soap *ctx, const char *tag, char32_t
 // The frame of a SOAP message; each sets message_part. The Envelope's namespace settles soap_version and the
 // received namespace of the encoding row. An empty Body has no end.
 //   0, or the codes of soap_element_in_begin and soap_element_in_end. soap_envelope_in_begin also
-//   SOAP_VERSION_MISMATCH (an Envelope of another namespace), SOAP_OUT_OF_MEMORY, or the HTTP status of a
-//   response that isn't a success
+//   SOAP_VERSION_MISMATCH (an Envelope of another namespace), SOAP_OUT_OF_MEMORY, or the response's HTTP
+//   status: a success (200) if it holds something else than an Envelope, any other on every failure
 ZUV_API int soap_envelope_in_begin(soap *ctx);
 ZUV_API int soap_envelope_in_end(soap *ctx);
 ZUV_API int soap_body_in_begin(soap *ctx);

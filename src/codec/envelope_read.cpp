@@ -21,12 +21,21 @@ constexpr soap_version_row versions[] = {
     {2, "http://www.w3.org/2003/05/soap-envelope", "http://www.w3.org/2003/05/soap-encoding"},
 };
 
+// Input was there, but no Envelope.
+bool is_something_else(int error)
+{
+    return error == SOAP_TAG_MISMATCH || error == SOAP_SYNTAX_ERROR || error == SOAP_NO_TAG;
+}
+
 int failed_envelope(soap *ctx)
 {
     if (ctx->error == SOAP_TAG_MISMATCH && soap_tag_compare(ctx, ctx->tag, "Envelope") == 0)
         return ctx->error = SOAP_VERSION_MISMATCH;
-    const bool success = ctx->status == 0 || (ctx->status >= 200 && ctx->status < 300);
-    return success ? ctx->error : ctx->error = ctx->status;
+    // A success has nothing to say about input that broke off or could not be unpacked.
+    const bool success = ctx->status >= 200 && ctx->status < 300;
+    if (ctx->status != 0 && (!success || is_something_else(ctx->error)))
+        ctx->error = ctx->status;
+    return ctx->error;
 }
 
 // The version follows from the namespace that the envelope row was bound to; the encoding row follows the

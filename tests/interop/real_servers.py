@@ -109,7 +109,7 @@ def through_nginx(caller, folder, words):
         caller.run("nginx, request too large", at("small"), "--size", 5000, "--calls", 2, codes=413)
         caller.run("nginx, moved", at("moved"), "--calls", 2, "--keep-alive", codes=301)
         caller.run("nginx, no body", at("empty"), "--calls", 2, "--keep-alive", codes=NO_DATA)
-        caller.run("nginx, no XML", at("text"), "--calls", 2, "--keep-alive", codes=6)
+        caller.run("nginx, no XML", at("text"), "--calls", 2, "--keep-alive", codes=200)
         caller.run("nginx, service gone", at("dead"), "--calls", 2, "--keep-alive", codes=502)
         caller.run("nginx, service silent", at("silent"), "--keep-alive", codes=504, least_ms=900)
         caller.run("nginx, service silent, own limit", at("silent"), "--recv", -200000, codes=EOF_ERROR, least_ms=200,

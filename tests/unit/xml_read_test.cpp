@@ -479,11 +479,24 @@ TEST(XmlRead, the_envelope_settles_the_version)
         EXPECT_EQ(soap_envelope_in_end(ctx), 0);
         EXPECT_EQ(ctx->message_part, PART_AFTER_ENVELOPE);
     }
-    reception other("<html/>");
-    EXPECT_EQ(soap_envelope_in_begin(other.context()), SOAP_TAG_MISMATCH);
-    reception status("<html/>");
-    status.context()->status = 404;
-    EXPECT_EQ(soap_envelope_in_begin(status.context()), 404);
+    static const struct {
+        const char *document;
+        std::int16_t status;
+        int error;
+    } responses[] = {{"<html/>", 0, SOAP_TAG_MISMATCH},
+                     {"<html/>", 200, 200},
+                     {"<html/>", 404, 404},
+                     {"text", 200, 200},
+                     {"<q:html/>", 200, 200},
+                     {"<html", 200, SOAP_EOF},
+                     {"<html", 500, 500},
+                     {"<Envelope xmlns='urn:x'/>", 500, SOAP_VERSION_MISMATCH}};
+    for (const auto &c : responses) {
+        SCOPED_TRACE(c.document);
+        reception in(c.document);
+        in.context()->status = c.status;
+        EXPECT_EQ(soap_envelope_in_begin(in.context()), c.error);
+    }
 }
 
 TEST(XmlRead, an_empty_body_has_no_end_tag)
