@@ -5,7 +5,9 @@ target_include_directories(zuv_objects PUBLIC ${PROJECT_SOURCE_DIR}/include PRIV
 target_link_libraries(zuv_objects PUBLIC OpenSSL::SSL OpenSSL::Crypto ZLIB::ZLIB PRIVATE zuv_flags)
 
 # Places that wait for a late reference hold pointers of any type, and a host may pass a null reference for the response.
+# Calls within a unit are not left open to a host that defines a function of the same name.
 target_compile_options(zuv_objects PRIVATE -fno-strict-aliasing -fno-delete-null-pointer-checks
+    -fno-semantic-interposition
     -ffile-prefix-map=${PROJECT_SOURCE_DIR}/=)
 
 # The shared object: soname and file bear the whole version. OpenSSL and zlib come from the host's link line, where the

@@ -12,6 +12,7 @@
 
 #include "binding/member_read.h"
 #include "binding/registry.h"
+#include "codec/namespace_scope.h"
 #include "codec/tag_view.h"
 #include "codec/xml_scan.h"
 
@@ -102,37 +103,48 @@ const char *asked_tag(const soap *ctx, const tag_view &held, std::string_view ta
 {
     const std::size_t prefix = tag.size() - local.size();
     if (prefix == 0 || held.row < 0 || strict(ctx) ||
-        !xml_row_has_prefix(ctx, held.row, tag.data(), prefix - 1))
+        !namespace_row_has_prefix(ctx, held.row, tag.data(), prefix - 1))
         return tag.data();
     return nullptr;
+}
+
+constexpr std::size_t NO_MEMBER = MEMBERS_MAX;
+
+// The first member with the tag's local name, or NO_MEMBER.
+std::size_t first_member(const member_table &members, const tag_view &tag)
+{
+    std::uint32_t slot = tag_local_hash(tag.local, tag.local_length) & members.slot_mask;
+    for (; members.slots[slot] != 0; slot = (slot + 1) & members.slot_mask) {
+        const std::size_t index = members.slots[slot] - 1U;
+        const std::string_view local = members.entries[index].local;
+        if (local.size() == tag.local_length && same_name(local.data(), tag.local, local.size()))
+            return index;
+    }
+    return NO_MEMBER;
+}
+
+std::size_t next_member(const member_table &members, std::size_t index)
+{
+    return members.next_same[index] != 0 ? members.next_same[index] - 1U : NO_MEMBER;
 }
 
 // Gives the held element to the member that it names. The members with its local name are tried in order.
 step take_member(soap *ctx, const member_table &members, void *object, std::uint64_t &spent)
 {
     const tag_view tag = soap_held_tag(ctx);
-    std::uint32_t slot = tag_local_hash(tag.local, tag.local_length) & members.slot_mask;
-    for (; members.slots[slot] != 0; slot = (slot + 1) & members.slot_mask) {
-        std::size_t index = members.slots[slot] - 1U;
-        const std::string_view local = members.entries[index].local;
-        if (local.size() != tag.local_length || !same_name(local.data(), tag.local, local.size()))
+    std::size_t index = first_member(members, tag);
+    for (; index != NO_MEMBER; index = next_member(members, index)) {
+        const member_entry &entry = members.entries[index];
+        const std::uint64_t bit = std::uint64_t{1} << index;
+        if ((spent & bit) != 0)
             continue;
-        for (;;) {
-            const member_entry &entry = members.entries[index];
-            const std::uint64_t bit = std::uint64_t{1} << index;
-            if (!(spent & bit)) {
-                if (entry.read(ctx, asked_tag(ctx, tag, entry.tag, entry.local), object)) {
-                    if (entry.single)
-                        spent |= bit;
-                    return step::consumed;
-                }
-                if (ctx->error != SOAP_TAG_MISMATCH)
-                    return step::failed;
-            }
-            if (members.next_same[index] == 0)
-                return step::unknown;
-            index = members.next_same[index] - 1U;
+        if (entry.read(ctx, asked_tag(ctx, tag, entry.tag, entry.local), object)) {
+            if (entry.single)
+                spent |= bit;
+            return step::consumed;
         }
+        if (ctx->error != SOAP_TAG_MISMATCH)
+            return step::failed;
     }
     return step::unknown;
 }

@@ -40,6 +40,18 @@ template <class T> constexpr auto bearer_tag()
 }
 template <class T> using bearer = std::remove_pointer_t<decltype(bearer_tag<T>())>;
 
+// Calls `visit` with each own element of T as a constant, in order, until it gives true: the result tells
+// whether it did. Constants, and not references into the tuple, so that a member costs no more than its own
+// code.
+template <class T, class Visit> constexpr bool any_element(Visit visit)
+{
+    return [&]<std::size_t... I>(std::index_sequence<I...>)
+    {
+        return (... || visit(std::integral_constant<std::size_t, I>{}));
+    }
+    (std::make_index_sequence<own_count<T>>{});
+}
+
 // --- defaulting ---
 
 template <class T> void reset_members(T &object)
@@ -49,8 +61,11 @@ template <class T> void reset_members(T &object)
     std::apply([&](const auto &...row) { (reset_attribute(object.*row.member), ...); }, law<T>::attributes);
     if constexpr (law<T>::text != nullptr)
         (object.*law<T>::text).clear();
-    std::apply([&](const auto &...row) { (reset_value(object.*row.member, row.initial), ...); },
-               law<T>::elements);
+    any_element<T>([&](auto index) {
+        constexpr const auto &row = std::get<index>(law<T>::elements);
+        reset_value(object.*row.member, row.initial);
+        return false;
+    });
 }
 
 // --- marking ---
@@ -59,8 +74,11 @@ template <class T> void mark_members(soap *ctx, const T &object)
 {
     if constexpr (!std::is_void_v<typename law<T>::base>)
         mark_members<typename law<T>::base>(ctx, object);
-    std::apply([&](const auto &...row) { (mark_value(ctx, object.*row.member, row.item_type), ...); },
-               law<T>::elements);
+    any_element<T>([&](auto index) {
+        constexpr const auto &row = std::get<index>(law<T>::elements);
+        mark_value(ctx, object.*row.member, row.item_type);
+        return false;
+    });
 }
 
 // --- writing ---
@@ -71,11 +89,10 @@ template <class T> int write_members(soap *ctx, const T &object)
         if (write_members<bearer<typename law<T>::base>>(ctx, object))
             return ctx->error;
     }
-    const bool failed = std::apply(
-        [&](const auto &...row) {
-            return (... || (write_value(ctx, row.tag, object.*row.member, row.how, row.item_type) != 0));
-        },
-        law<T>::elements);
+    const bool failed = any_element<T>([&](auto index) {
+        constexpr const auto &row = std::get<index>(law<T>::elements);
+        return write_value(ctx, row.tag, object.*row.member, row.how, row.item_type) != 0;
+    });
     return failed ? ctx->error : 0;
 }
 
@@ -129,9 +146,10 @@ template <class T> bool enough_items(const void *object)
         if (!enough_items<typename law<T>::base>(static_cast<const typename law<T>::base *>(&self)))
             return false;
     }
-    return std::apply(
-        [&](const auto &...row) { return (... && holds_minimum(self.*row.member, row.minimum)); },
-        law<T>::elements);
+    return !any_element<T>([&](auto index) {
+        constexpr const auto &row = std::get<index>(law<T>::elements);
+        return !holds_minimum(self.*row.member, row.minimum);
+    });
 }
 
 // --- the table of members ---

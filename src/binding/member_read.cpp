@@ -49,6 +49,16 @@ std::string *new_text(soap *ctx, std::string_view content = {})
     }
 }
 
+bool append_text(soap *ctx, std::vector<std::string> &vector, std::string_view content)
+{
+    try {
+        vector.emplace_back(content);
+        return true;
+    } catch (const std::bad_alloc &) {
+        return out_of_memory(ctx);
+    }
+}
+
 // The text up to the end tag. It lives until the next read.
 bool read_characters(soap *ctx, std::string_view &content)
 {
@@ -181,13 +191,15 @@ bool read_text_content(soap *ctx, std::string &text)
 
 bool read_text_pointer(soap *ctx, const char *tag, void **place)
 {
+    std::string_view content;
+    if (tag == nullptr && xml_leaf_in_place(ctx, &content))
+        return (*place = new_text(ctx, content)) != nullptr;
     if (soap_element_in_begin(ctx, tag, 1, nullptr))
         return false;
     *place = nullptr;
     if (ctx->null_flag || is_reference(ctx))
         return refers_pointer(ctx, tag, place, TEXT_TYPE_ID, sizeof(std::string));
     const bool body = ctx->has_body != 0;
-    std::string_view content;
     if (body && !read_characters(ctx, content))
         return false;
     std::string *text = new_text(ctx, content);
@@ -215,6 +227,9 @@ bool read_text_object(soap *ctx, const char *tag, std::string *text)
 
 bool read_vector_item_text(soap *ctx, const char *tag, std::vector<std::string> &vector, int vector_type)
 {
+    std::string_view content;
+    if (tag == nullptr && xml_leaf_in_place(ctx, &content))
+        return append_text(ctx, vector, content);
     if (soap_element_in_begin(ctx, tag, 1, nullptr))
         return false;
     if (!vector_append<std::string>(&vector, nullptr))

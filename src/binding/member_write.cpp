@@ -48,10 +48,8 @@ int write_text_element(soap *ctx, std::string_view tag, int id, const std::strin
     return write_characters(ctx, tag, id, text, type);
 }
 
-int write_text_pointer(soap *ctx, std::string_view tag, const std::string *text, occurs how)
+int write_text_pointer(soap *ctx, std::string_view tag, const std::string *text)
 {
-    if (!text)
-        return write_absent(ctx, tag, how);
     const int id = write_reference(ctx, tag, text, TEXT_TYPE_ID);
     return id < 0 ? ctx->error : write_text_element(ctx, tag, id, *text);
 }
@@ -63,12 +61,10 @@ int write_reference(soap *ctx, std::string_view tag, const void *address, int ty
     return soap_element_ref(ctx, tag.data(), -1, address, nullptr, 0, "", type_id);
 }
 
-int write_absent(soap *ctx, std::string_view tag, occurs how)
+int write_nil(soap *ctx, std::string_view tag, occurs how)
 {
     if (how == occurs::required)
         return soap_element_empty_nil(ctx, tag.data());
-    if (!(ctx->mode & MODE_NIL) && ctx->attributes_set == 0) // attributes need an element to stand on
-        return 0;
     return soap_element_null(ctx, tag.data(), -1, "");
 }
 

@@ -19,17 +19,25 @@ namespace binding {
 
 int write_text_element(soap *ctx, std::string_view tag, int id, const std::string &text,
                        const char *type = "");
-int write_text_pointer(soap *ctx, std::string_view tag, const std::string *text, occurs how);
+int write_text_pointer(soap *ctx, std::string_view tag, const std::string *text); // not null
 int write_text(soap *ctx, const std::string &text); // character data, no element
 int write_code(soap *ctx, std::string_view tag, int id, std::int32_t code, const enum_table &names,
                const char *type = "");
 int write_boolean(soap *ctx, std::string_view tag, int id, const bool *value, const char *type = "");
-int write_absent(soap *ctx, std::string_view tag, occurs how); // a null member
+int write_nil(soap *ctx, std::string_view tag, occurs how); // a null member that shows itself
 int write_code_attribute(soap *ctx, const char *name, std::int32_t code, const enum_table &names);
 // Id for a value held by pointer; -1 when a reference to it was written.
 int write_reference(soap *ctx, std::string_view tag, const void *address, int type_id);
 void mark_text(soap *ctx, const std::string *text);
 void mark_plain(soap *ctx, const void *value, int type_id);
+
+// A null member. Most members of an object are null and write nothing, which is settled without a call.
+inline int write_absent(soap *ctx, std::string_view tag, occurs how)
+{
+    const bool shows = how == occurs::required || (ctx->mode & MODE_NIL) != 0 ||
+                       ctx->attributes_set != 0; // attributes need an element to stand on
+    return shows ? write_nil(ctx, tag, how) : 0;
+}
 
 // --- defaulting ---
 
@@ -61,6 +69,8 @@ template <class V> void mark_value(soap *ctx, const V &member, int item_type)
 {
     if constexpr (std::is_pointer_v<V>) {
         using target = std::remove_cv_t<std::remove_pointer_t<V>>;
+        if (member == nullptr) [[likely]]
+            return;
         if constexpr (std::is_same_v<target, std::string>)
             mark_text(ctx, member);
         else if constexpr (std::is_class_v<target>)
@@ -95,14 +105,14 @@ template <class V> int write_simple(soap *ctx, std::string_view tag, int id, con
 }
 
 template <class V>
-int write_value(soap *ctx, std::string_view tag, const V &member, occurs how, int item_type)
+inline int write_value(soap *ctx, std::string_view tag, const V &member, occurs how, int item_type)
 {
     if constexpr (std::is_pointer_v<V>) {
         using target = std::remove_cv_t<std::remove_pointer_t<V>>;
-        if constexpr (std::is_same_v<target, std::string>) {
-            return write_text_pointer(ctx, tag, member, how);
-        } else if (member == nullptr) {
+        if (member == nullptr) [[likely]]
             return write_absent(ctx, tag, how);
+        if constexpr (std::is_same_v<target, std::string>) {
+            return write_text_pointer(ctx, tag, member);
         } else if constexpr (std::is_class_v<target>) {
             return class_pointer_out(ctx, ops_of<target>, tag.data(), -1, member, "");
         } else {

@@ -10,6 +10,9 @@
 
 #include <zuv_client_pro/soap.h>
 
+#include "codec/tag_view.h"
+#include "codec/xml_scan.h"
+
 constexpr std::size_t PREFIX_CHAINS = 256;      // power of two
 constexpr std::size_t SPARE_PREFIXES_MAX = 256; // records kept for reuse
 constexpr std::size_t SPARE_PREFIX_SIZE = 1024; // bytes of text; larger records are freed at once
@@ -52,6 +55,16 @@ inline bool namespace_prefix_has_length(const soap_namespace_scope *scope, const
 {
     return scope && index < scope->row_count && scope->rows[index].prefix == row.prefix &&
            scope->lengths[index].prefix == length;
+}
+
+// xml_row_has_prefix with its usual case, a row of the working copy that was measured, decided in place.
+inline bool namespace_row_has_prefix(const soap *ctx, int row, const char *prefix, std::size_t length)
+{
+    const soap_namespace *table = ctx->local_namespaces;
+    if (table &&
+        namespace_prefix_has_length(ctx->namespace_scope, table[row], static_cast<std::size_t>(row), length))
+        return same_name(table[row].prefix, prefix, length);
+    return xml_row_has_prefix(ctx, row, prefix, length);
 }
 
 // The lengths of a row's texts, or null where the row isn't one of those described.

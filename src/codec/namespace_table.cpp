@@ -34,6 +34,17 @@ bool same_texts(const soap_namespace &one, const soap_namespace &other)
     return one.prefix == other.prefix && one.uri == other.uri && one.pattern == other.pattern;
 }
 
+// True if the table holds just the rows measured last time, none with a received URI. The end of a shorter
+// table differs from the row in its place, so nothing behind it is looked at.
+bool is_measured(const soap_namespace_scope *scope, const soap_namespace *table)
+{
+    const auto same_row = [](const soap_namespace &one, const soap_namespace &other) {
+        return same_texts(one, other) && one.received == other.received;
+    };
+    return scope && scope->rows && std::equal(scope->rows, scope->rows + scope->row_count, table, same_row) &&
+           table[scope->row_count].prefix == nullptr;
+}
+
 void forget_rows(soap *ctx, soap_namespace_scope *scope)
 {
     SOAP_FREE(ctx, scope->spare_table);
@@ -161,8 +172,9 @@ int soap_namespace_table_copy(soap *ctx)
 {
     if (ctx->local_namespaces || !ctx->namespaces)
         return 0;
-    const std::size_t count = count_rows(ctx->namespaces);
-    if (describe_rows(ctx, ctx->namespaces, count))
+    const bool measured = is_measured(ctx->namespace_scope, ctx->namespaces);
+    const std::size_t count = measured ? ctx->namespace_scope->row_count : count_rows(ctx->namespaces);
+    if (!measured && describe_rows(ctx, ctx->namespaces, count))
         return ctx->error;
     soap_namespace *rows = std::exchange(ctx->namespace_scope->spare_table, nullptr);
     if (!rows)
@@ -244,13 +256,8 @@ const char *xml_root_declarations(soap *ctx, std::size_t rows_max, std::size_t *
     const soap_namespace *table = ctx->local_namespaces;
     if (!scope || !table)
         return nullptr;
-    for (std::size_t i = 0; i <= scope->row_count; ++i) {
-        const bool is_end = table[i].prefix == nullptr;
-        if (is_end != (i == scope->row_count))
-            return nullptr;
-        if (!is_end && (table[i].received || !same_texts(table[i], scope->rows[i])))
-            return nullptr;
-    }
+    if (!is_measured(scope, table))
+        return nullptr;
     if (!scope->declarations && !compose_declarations(ctx, scope))
         return nullptr;
     if (!scope->declarations_plain)

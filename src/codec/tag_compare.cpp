@@ -60,10 +60,15 @@ bool resolve_by_last_prefix(soap *ctx)
     return true;
 }
 
-void resolve_tag(soap *ctx)
+tag_view view_of_tag(const soap *ctx)
 {
-    if (resolve_by_last_prefix(ctx))
-        return;
+    return {ctx->tag + ctx->tag_local, static_cast<std::uint32_t>(ctx->tag_length - ctx->tag_local),
+            ctx->tag_row};
+}
+
+// Out of line, so that the short way of soap_held_tag saves no registers for it.
+[[gnu::noinline]] tag_view resolve_tag(soap *ctx)
+{
     const void *colon = std::memchr(ctx->tag, ':', ctx->tag_length);
     const std::size_t prefix_length =
         colon != nullptr ? static_cast<std::size_t>(static_cast<const char *>(colon) - ctx->tag) : 0;
@@ -72,6 +77,7 @@ void resolve_tag(soap *ctx)
     ctx->tag_resolved = true;
     if (ctx->namespace_scope != nullptr)
         ctx->namespace_scope->tag_prefix = static_cast<std::uint8_t>(cache_place(ctx->tag, prefix_length));
+    return view_of_tag(ctx);
 }
 
 // The parts of a name, from what is known of the held tag where it is that one.
@@ -121,8 +127,6 @@ bool xml_row_has_prefix(const soap *ctx, int row, const char *prefix, std::size_
     const soap_namespace *entry = table_row(ctx, row);
     if (entry == nullptr || entry->prefix == nullptr)
         return true;
-    if (namespace_prefix_has_length(ctx->namespace_scope, *entry, static_cast<std::size_t>(row), length))
-        return same_name(entry->prefix, prefix, length);
     if (std::strncmp(entry->prefix, prefix, length) != 0)
         return false;
     return entry->prefix[length] == '\0' || entry->prefix[length] == '_';
@@ -130,10 +134,8 @@ bool xml_row_has_prefix(const soap *ctx, int row, const char *prefix, std::size_
 
 tag_view soap_held_tag(soap *ctx)
 {
-    if (!ctx->tag_resolved || ctx->prefix_cache_list != ctx->prefix_list)
-        resolve_tag(ctx);
-    return {ctx->tag + ctx->tag_local, static_cast<std::uint32_t>(ctx->tag_length - ctx->tag_local),
-            ctx->tag_row};
+    const bool known = ctx->tag_resolved && ctx->prefix_cache_list == ctx->prefix_list;
+    return known || resolve_by_last_prefix(ctx) ? view_of_tag(ctx) : resolve_tag(ctx);
 }
 
 int soap_prefix_compare(soap *ctx, const char *read, const char *asked, std::size_t read_length,
@@ -148,7 +150,7 @@ int soap_prefix_compare(soap *ctx, const char *read, const char *asked, std::siz
         return ctx->error = SOAP_SYNTAX_ERROR;
     if (row < 0)
         return SOAP_NAMESPACE_ERROR;
-    return xml_row_has_prefix(ctx, row, asked, asked_length) ? 0 : SOAP_NAMESPACE_ERROR;
+    return namespace_row_has_prefix(ctx, row, asked, asked_length) ? 0 : SOAP_NAMESPACE_ERROR;
 }
 
 int soap_tag_compare(soap *ctx, const char *read, const char *asked)

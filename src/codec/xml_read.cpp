@@ -125,6 +125,31 @@ int find_start_tag(soap *ctx)
     return find_start_tag_slow(ctx);
 }
 
+// Reads the start tag that most are, a short name in brackets, if it stands whole in the buffer. False: the
+// next thing is another, and nothing but blanks was looked at.
+bool read_plain_tag(soap *ctx)
+{
+    if (ctx->look_ahead != 0 || ctx->in_cdata != CDATA_OUTSIDE)
+        return false;
+    const char *p = input_here(ctx);
+    const char *end = input_end(ctx);
+    while (p != end && is_blank(static_cast<unsigned char>(*p)))
+        ++p;
+    if (end - p <= static_cast<std::ptrdiff_t>(SHORT_NAME) || p[0] != '<' ||
+        static_cast<unsigned char>(p[1]) <= '?') // one of the marks that lead to something else
+        return false;
+    const char *name = p + 1;
+    const char *stop = tag_name_stop::find(name, name + SHORT_NAME);
+    if (stop == name + SHORT_NAME || *stop != '>')
+        return false;
+    std::memcpy(ctx->tag, name, SHORT_NAME);
+    ctx->tag_length = static_cast<std::uint16_t>(stop - name);
+    ctx->tag[ctx->tag_length] = '\0';
+    ctx->has_body = 1;
+    input_consume(ctx, stop + 1);
+    return true;
+}
+
 int read_tag_name(soap *ctx)
 {
     if (input_skip_blanks(ctx) == XML_EOF)
@@ -133,12 +158,17 @@ int read_tag_name(soap *ctx)
     return ctx->tag_length == 0 ? no_tag(ctx, SOAP_SYNTAX_ERROR) : 0;
 }
 
+// The innermost declaration is of an element that has ended.
+bool prefixes_end(const soap *ctx)
+{
+    return ctx->prefix_list != nullptr && ctx->prefix_list->level >= ctx->nesting_level;
+}
+
 // Drops the declarations of elements that have ended.
 void pop_prefixes(soap *ctx)
 {
-    if (ctx->prefix_list == nullptr || ctx->prefix_list->level < ctx->nesting_level)
-        return;
-    soap_prefix_pop(ctx);
+    if (prefixes_end(ctx))
+        soap_prefix_pop(ctx);
 }
 
 int read_tag_end(soap *ctx)
@@ -154,6 +184,35 @@ int read_tag_end(soap *ctx)
         return no_tag(ctx, end_of_input(ctx));
     ctx->buffer_index++; // the ">"
     return 0;
+}
+
+// What the elements before this one have left: declarations of those that have ended, attributes of the last.
+[[gnu::noinline]] void leave_previous_head(soap *ctx)
+{
+    pop_prefixes(ctx);
+    if (ctx->attributes_set != 0)
+        xml_attributes_hide(ctx);
+}
+
+// A start tag of any kind; the rest of soap_element_head_read where it isn't a plain one.
+[[gnu::noinline]] int read_head(soap *ctx)
+{
+    if (find_start_tag(ctx) != 0 || read_tag_name(ctx) != 0)
+        return ctx->error;
+    leave_previous_head(ctx);
+    if (input_ready(ctx) && *input_here(ctx) == '>') {
+        ctx->buffer_index++;
+        ctx->has_body = 1;
+        return ctx->error = 0;
+    }
+    const int error = xml_attributes_read(ctx);
+    if (error != 0)
+        return no_tag(ctx, error == SOAP_EOF ? end_of_input(ctx) : error);
+    if (read_tag_end(ctx) != 0)
+        return ctx->error;
+    if (ctx->attributes_set != 0)
+        xml_attributes_apply(ctx);
+    return ctx->error = 0;
 }
 
 int enter_element(soap *ctx)
@@ -197,6 +256,14 @@ int find_end_tag(soap *ctx, std::uint64_t depth)
     return xml_skip_content(ctx, depth);
 }
 
+// `here` begins the end tag that repeats the name in `tag`, whole in the buffer and without blanks.
+inline bool is_own_end(const soap *ctx, const char *here)
+{
+    const std::size_t length = ctx->tag_length;
+    return static_cast<std::size_t>(input_end(ctx) - here) >= length + 3 && here[0] == '<' &&
+           here[1] == '/' && here[2 + length] == '>' && same_name(here + 2, ctx->tag, length);
+}
+
 // The end tag of an element without children comes next, whole, and repeats the name that `tag` still holds.
 // True: it was consumed.
 bool leaf_ends(soap *ctx)
@@ -204,11 +271,9 @@ bool leaf_ends(soap *ctx)
     if (ctx->peeked != 0 || ctx->look_ahead != 0 || ctx->in_cdata != CDATA_OUTSIDE)
         return false;
     const char *here = input_here(ctx);
-    const std::size_t length = ctx->tag_length;
-    if (static_cast<std::size_t>(input_end(ctx) - here) < length + 3 || here[0] != '<' || here[1] != '/' ||
-        here[2 + length] != '>' || !same_name(here + 2, ctx->tag, length))
+    if (!is_own_end(ctx, here))
         return false;
-    input_consume(ctx, here + length + 3);
+    input_consume(ctx, here + ctx->tag_length + 3);
     return true;
 }
 
@@ -226,39 +291,10 @@ bool has_undeclared_type(const soap *ctx)
     return !prefix.empty() && xml_prefix_find(ctx, prefix) == nullptr;
 }
 
-} // namespace
-
-int soap_element_head_read(soap *ctx)
+// The ways of soap_element_in_begin and soap_element_in_end that are not the short ones. Kept out of line, so
+// that the short ones save no registers for them.
+[[gnu::noinline]] int begin_asked(soap *ctx, const char *tag, int nil_allowed, const char *type)
 {
-    if (ctx->peeked != 0)
-        return ctx->tag[0] != '\0' ? 0 : ctx->error = SOAP_NO_TAG;
-    forget_tag(ctx);
-    if (find_start_tag(ctx) != 0 || read_tag_name(ctx) != 0)
-        return ctx->error;
-    pop_prefixes(ctx);
-    if (ctx->attributes_set != 0)
-        xml_attributes_hide(ctx);
-    if (input_ready(ctx) && *input_here(ctx) == '>') {
-        ctx->buffer_index++;
-        ctx->has_body = 1;
-        return ctx->error = 0;
-    }
-    const int error = xml_attributes_read(ctx);
-    if (error != 0)
-        return no_tag(ctx, error == SOAP_EOF ? end_of_input(ctx) : error);
-    if (read_tag_end(ctx) != 0)
-        return ctx->error;
-    if (ctx->attributes_set != 0)
-        xml_attributes_apply(ctx);
-    return ctx->error = 0;
-}
-
-int soap_element_in_begin(soap *ctx, const char *tag, int nil_allowed, const char *type)
-{
-    if (tag == nullptr && ctx->peeked != 0 && ctx->tag[0] != '\0' && ctx->attributes_set == 0) {
-        ctx->peeked = 0; // any element, and no attribute has a say
-        return ctx->error = enter_element(ctx);
-    }
     const bool own_element = tag == nullptr || *tag != '-';
     if (soap_element_head_read(ctx) != 0) {
         if (ctx->error == SOAP_NO_TAG && !own_element)
@@ -285,15 +321,8 @@ int soap_element_in_begin(soap *ctx, const char *tag, int nil_allowed, const cha
     return ctx->error = enter_element(ctx);
 }
 
-int soap_element_in_end(soap *ctx, const char *tag)
+[[gnu::noinline]] int end_after_content(soap *ctx, const char *tag, bool any_name)
 {
-    if (tag != nullptr && *tag == '-')
-        return 0;
-    const bool any_name = tag == nullptr || (ctx->mode & MODE_STRICT) == 0;
-    if (any_name && leaf_ends(ctx)) {
-        leave_element(ctx);
-        return ctx->error = 0;
-    }
     if (ctx->error == SOAP_NO_TAG)
         ctx->error = 0;
     const bool inside_held = ctx->peeked != 0 && ctx->tag[0] != '\0' && ctx->has_body != 0;
@@ -308,6 +337,59 @@ int soap_element_in_end(soap *ctx, const char *tag)
         if (soap_tag_compare(ctx, ctx->tag, tag) != 0)
             return ctx->error = SOAP_SYNTAX_ERROR;
     }
+    leave_element(ctx);
+    return ctx->error = 0;
+}
+
+} // namespace
+
+int soap_element_head_read(soap *ctx)
+{
+    if (ctx->peeked != 0)
+        return ctx->tag[0] != '\0' ? 0 : ctx->error = SOAP_NO_TAG;
+    forget_tag(ctx);
+    if (!read_plain_tag(ctx))
+        return read_head(ctx);
+    if (prefixes_end(ctx) || ctx->attributes_set != 0)
+        leave_previous_head(ctx);
+    return ctx->error = 0;
+}
+
+int soap_element_in_begin(soap *ctx, const char *tag, int nil_allowed, const char *type)
+{
+    if (tag == nullptr && ctx->peeked != 0 && ctx->tag[0] != '\0' && ctx->attributes_set == 0) {
+        ctx->peeked = 0; // any element, and no attribute has a say
+        return ctx->error = enter_element(ctx);
+    }
+    return begin_asked(ctx, tag, nil_allowed, type);
+}
+
+bool xml_leaf_in_place(soap *ctx, std::string_view *text)
+{
+    const bool is_plain_head =
+        ctx->peeked != 0 && ctx->tag[0] != '\0' && ctx->attributes_set == 0 && ctx->has_body != 0;
+    const bool too_deep = ctx->max_depth != 0 && ctx->nesting_level >= ctx->max_depth;
+    if (!is_plain_head || too_deep || (ctx->mode & MODE_STRICT) != 0 || ctx->look_ahead != 0 ||
+        ctx->in_cdata != CDATA_OUTSIDE)
+        return false;
+    const char *here = input_here(ctx);
+    const char *stop = text_end(ctx, here, input_end(ctx));
+    if (!is_own_end(ctx, stop))
+        return false;
+    *text = {here, static_cast<std::size_t>(stop - here)};
+    input_consume(ctx, stop + ctx->tag_length + 3);
+    ctx->peeked = 0;
+    ctx->error = 0;
+    return true;
+}
+
+int soap_element_in_end(soap *ctx, const char *tag)
+{
+    if (tag != nullptr && *tag == '-')
+        return 0;
+    const bool any_name = tag == nullptr || (ctx->mode & MODE_STRICT) == 0;
+    if (!any_name || !leaf_ends(ctx))
+        return end_after_content(ctx, tag, any_name);
     leave_element(ctx);
     return ctx->error = 0;
 }

@@ -50,23 +50,32 @@ private:
 #endif
 };
 
+template <class Word> bool same_word(const char *one, const char *other)
+{
+    Word a, b;
+    std::memcpy(&a, one, sizeof a);
+    std::memcpy(&b, other, sizeof b);
+    return a == b;
+}
+
+// The same of at least a word's bytes; the last word may overlap the one before.
+template <class Word> bool same_words(const char *one, const char *other, std::size_t length)
+{
+    const std::size_t last = length - sizeof(Word);
+    for (std::size_t done = 0; done < last; done += sizeof(Word)) {
+        if (!same_word<Word>(one + done, other + done))
+            return false;
+    }
+    return same_word<Word>(one + last, other + last);
+}
+
 // True if `length` bytes are equal. Names are so short that a call of memcmp costs more than the comparison.
 inline bool same_name(const char *one, const char *other, std::size_t length)
 {
-    const auto same8 = [](const char *p, const char *q) {
-        std::uint64_t a, b;
-        std::memcpy(&a, p, sizeof a);
-        std::memcpy(&b, q, sizeof b);
-        return a == b;
-    };
-    if (length >= sizeof(std::uint64_t)) {
-        const std::size_t last = length - sizeof(std::uint64_t); // the last step may overlap the one before
-        for (std::size_t done = 0; done < last; done += sizeof(std::uint64_t)) {
-            if (!same8(one + done, other + done))
-                return false;
-        }
-        return same8(one + last, other + last);
-    }
+    if (length >= sizeof(std::uint64_t))
+        return same_words<std::uint64_t>(one, other, length);
+    if (length >= sizeof(std::uint32_t))
+        return same_words<std::uint32_t>(one, other, length);
     for (std::size_t i = 0; i < length; ++i) {
         if (one[i] != other[i])
             return false;

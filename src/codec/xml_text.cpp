@@ -21,10 +21,9 @@ constexpr std::size_t SIMPLE_BYTES_MAX = SOAP_TEXT_SIZE - 1;
 // The end of the plain stretch at the read position.
 const char *plain_end(const soap *ctx, const char *here, const char *end)
 {
-    const bool decode = text_needs_decoding(ctx);
-    if (ctx->in_cdata != CDATA_OUTSIDE)
-        return decode ? cdata_decode_stop::find(here, end) : cdata_stop::find(here, end);
-    return decode ? text_decode_stop::find(here, end) : text_stop::find(here, end);
+    if (ctx->in_cdata == CDATA_OUTSIDE)
+        return text_end(ctx, here, end);
+    return text_needs_decoding(ctx) ? cdata_decode_stop::find(here, end) : cdata_stop::find(here, end);
 }
 
 // Copies what needs no look at single bytes.
@@ -186,8 +185,7 @@ bool xml_text_in_place(soap *ctx, const char **text, std::size_t *length)
         return false;
     const char *here = input_here(ctx);
     const char *end = input_end(ctx);
-    const char *stop =
-        text_needs_decoding(ctx) ? text_decode_stop::find(here, end) : text_stop::find(here, end);
+    const char *stop = text_end(ctx, here, end);
     if (end - stop < 2 || stop[0] != '<' || stop[1] != '/')
         return false;
     *text = here;

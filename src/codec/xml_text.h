@@ -4,8 +4,11 @@
 // Elsewhere: managed texts (soap_string_read and its kin in soap_xml.h).
 #pragma once
 
+#include <string_view>
+
 #include <zuv_client_pro/soap_memory.h>
 
+#include "codec/xml_scan.h"
 #include "codec/xml_token.h"
 
 // When the whole text up to "</" stands in the buffer as it is to be (no child, no reference, no CDATA
@@ -13,10 +16,21 @@
 // The text isn't terminated, and lives until the next read. Nothing may be held.
 bool xml_text_in_place(soap *ctx, const char **text, std::size_t *length);
 
+// The same for the whole element whose start tag is held: when it has neither attributes nor children, and
+// all of it stands in the buffer, consumes it with its end tag. Any name and no type is asked for. Not in
+// strict mode.
+bool xml_leaf_in_place(soap *ctx, std::string_view *text);
+
 // Truth: bytes from 128 on have to be decoded before they become characters of a byte string.
 inline bool text_needs_decoding(const soap *ctx)
 {
     return (ctx->mode & (MODE_LATIN1 | MODE_UTF_STRINGS)) == 0;
+}
+
+// The first byte of [here, end) that isn't text as it stands.
+inline const char *text_end(const soap *ctx, const char *here, const char *end)
+{
+    return text_needs_decoding(ctx) ? text_decode_stop::find(here, end) : text_stop::find(here, end);
 }
 
 // The next token of a byte string: a byte of UTF-8 if strings are kept so, else a decoded character.

@@ -11,18 +11,33 @@
 #include "engine/context_state.h"
 #include "engine/tracking.h"
 
-soap_instance *soap_instance_register(soap *ctx, void *object, int type_id, int array_size,
-                                      int (*hook)(soap_instance *instance))
+static soap_instance *enter_instance(soap *ctx, void *object, int type_id, int array_size,
+                                     int (*hook)(soap_instance *instance))
 {
-    soap_memory_pools *pools = memory_pools(ctx);
-    soap_instance *instance = pools == nullptr ? nullptr : pools->instances.take();
-    if (instance == nullptr) {
-        ctx->error = SOAP_OUT_OF_MEMORY;
-        return nullptr;
-    }
+    soap_instance *instance = ctx->pools->instances.take();
     *instance = {ctx->instance_list, object, type_id, array_size, hook};
     ctx->instance_list = instance;
     return instance;
+}
+
+// With no idle record at hand. Out of line, so that the usual way saves no registers for it.
+[[gnu::noinline]] static soap_instance *
+enter_in_new_slab(soap *ctx, void *object, int type_id, int array_size, int (*hook)(soap_instance *instance))
+{
+    soap_memory_pools *pools = memory_pools(ctx);
+    if (pools == nullptr || !pools->instances.reserve(1)) {
+        ctx->error = SOAP_OUT_OF_MEMORY;
+        return nullptr;
+    }
+    return enter_instance(ctx, object, type_id, array_size, hook);
+}
+
+soap_instance *soap_instance_register(soap *ctx, void *object, int type_id, int array_size,
+                                      int (*hook)(soap_instance *instance))
+{
+    const bool at_hand = ctx->pools != nullptr && ctx->pools->instances.holds_idle();
+    return at_hand ? enter_instance(ctx, object, type_id, array_size, hook)
+                   : enter_in_new_slab(ctx, object, type_id, array_size, hook);
 }
 
 // The record must be out of the list: a destructor may come back to it.

@@ -22,7 +22,7 @@ public:
         }
     }
 
-    // An idle record with undefined contents; null if memory runs out.
+    // An idle record with undefined contents; null if memory runs out, which can't be while holds_idle().
     Record *take()
     {
         if (idle == nullptr && !add_slab())
@@ -39,6 +39,8 @@ public:
         idle = record;
         ++idle_count;
     }
+
+    bool holds_idle() const { return idle != nullptr; }
 
     // Makes sure that the next `count` takes succeed. False if memory runs out.
     bool reserve(std::size_t count)

@@ -2,6 +2,9 @@
 //
 // Elsewhere: what the lines mean (transport's http_read.cpp, codec's mime_read.cpp), filling the buffer.
 // Always: what is stored is terminated and shorter than the size given, whatever arrives.
+#include <algorithm>
+#include <cstring>
+
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_io.h>
 
@@ -25,6 +28,27 @@ int end_of_input(soap *ctx)
     return ctx->error;
 }
 
+bool ends_stretch(char c)
+{
+    return c == '\r' || c == '\n';
+}
+
+// Moves what stands in the buffer up to a CR or LF, but no more than `left` bytes, to `end`, as far as that
+// fits before `limit`. The bytes moved or dropped.
+std::size_t take_stretch(soap *ctx, char *&end, const char *limit, std::size_t left)
+{
+    if (ctx->look_ahead != 0)
+        return 0;
+    const char *const here = ctx->buffer + ctx->buffer_index;
+    const char *const stop = here + std::min(left, ctx->buffer_length - ctx->buffer_index);
+    const auto length = static_cast<std::size_t>(std::find_if(here, stop, ends_stretch) - here);
+    const std::size_t kept = std::min(length, static_cast<std::size_t>(limit - end));
+    std::memcpy(end, here, kept);
+    end += kept;
+    ctx->buffer_index += length;
+    return length;
+}
+
 } // namespace
 
 int soap_recv_line(soap *ctx, char *text, std::size_t size)
@@ -35,6 +59,9 @@ int soap_recv_line(soap *ctx, char *text, std::size_t size)
     for (;;) {
         std::int32_t byte = 0;
         while (left > 0) {
+            left -= take_stretch(ctx, end, limit, left);
+            if (left == 0)
+                break;
             byte = soap_recv_byte(ctx);
             if (byte < 0)
                 return *end = '\0', end_of_input(ctx);

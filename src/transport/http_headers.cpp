@@ -191,7 +191,7 @@ int parse_forwarded_for(soap *ctx, const char *value)
 }
 
 struct header_row {
-    const char *key; // pattern of soap_tag_match
+    std::string_view key; // pattern of soap_tag_match without a "*", terminated
     int (*parse)(soap *ctx, const char *value);
 };
 
@@ -216,11 +216,9 @@ constexpr header_row HEADERS[] = {
 
 int http_parse_header(soap *ctx, const char *key, const char *value)
 {
-    const auto first_letters_differ = [key](const header_row &row) {
-        return ((*key ^ *row.key) & ~0x20) != 0;
-    };
+    const std::size_t length = std::strcspn(key, "\""); // where the match ends
     for (const header_row &row : HEADERS) {
-        if (!first_letters_differ(row) && soap_tag_match(key, row.key) == 0)
+        if (row.key.size() == length && soap_tag_match(key, row.key.data()) == 0)
             return row.parse(ctx, value);
     }
     return SOAP_OK;

@@ -3,9 +3,10 @@
 // Elsewhere: when a head is due (endpoint.cpp, soap_io.h), reading heads (http_read.cpp, http_headers.cpp).
 // Always: values are composed in ctx->scratch_text or on the stack, so a value given to on_header_line is
 // good only during that call; no line feed or carriage return of a value reaches the wire.
-#include <cinttypes>
+#include <charconv>
 #include <cstdio>
 #include <cstring>
+#include <iterator>
 
 #include <openssl/crypto.h>
 #include <openssl/evp.h>
@@ -42,7 +43,8 @@ struct bounded_text {
     bool fits = true;
 
     void put(const char *part) { put(part, std::strlen(part)); }
-    void put(const char *part, std::size_t part_length)
+    [[gnu::noinline]] void put(const char *part,
+                               std::size_t part_length) // inlined it would be most of this file
     {
         fits = fits && part_length < sizeof text - length;
         if (!fits)
@@ -50,6 +52,12 @@ struct bounded_text {
         std::memcpy(text + length, part, part_length);
         length += part_length;
         text[length] = '\0';
+    }
+    void put_number(int number)
+    {
+        char digits[16];
+        put(digits, static_cast<std::size_t>(std::to_chars(std::begin(digits), std::end(digits), number).ptr -
+                                             digits));
     }
     // For a place between double quotes.
     void put_quoted(const char *part)
@@ -73,14 +81,15 @@ int line(soap *ctx, const char *key, const char *value)
 // Sends a text without the line breaks in it: what follows one must not become a header of its own.
 int send_without_breaks(soap *ctx, const char *text)
 {
-    while (*text != '\0') {
+    for (;;) {
         const std::size_t length = std::strcspn(text, "\r\n");
         if (soap_send_bytes(ctx, text, length) != SOAP_OK)
             return ctx->error;
         text += length;
+        if (*text == '\0')
+            return SOAP_OK;
         text += std::strspn(text, "\r\n");
     }
-    return SOAP_OK;
 }
 
 bool output_is_chunked(const soap *ctx)
@@ -161,7 +170,7 @@ int write_framing(soap *ctx, std::uint64_t count)
 {
     if (output_is_chunked(ctx))
         return line(ctx, "Transfer-Encoding", "chunked");
-    std::snprintf(ctx->scratch_text, SOAP_TEXT_SIZE, "%" PRIu64, count);
+    *std::to_chars(ctx->scratch_text, ctx->scratch_text + SOAP_TEXT_SIZE - 1, count).ptr = '\0';
     return line(ctx, "Content-Length", ctx->scratch_text);
 }
 
@@ -193,10 +202,9 @@ int write_request_line(soap *ctx, const char *endpoint, const char *host, int po
     text.put(method_text(ctx->status));
     text.put(" ");
     if (ctx->status == STATUS_CONNECT) {
-        char number[16];
-        std::snprintf(number, sizeof number, ":%d", port);
         text.put(host);
-        text.put(number);
+        text.put(":");
+        text.put_number(port);
     } else if (ctx->proxy_host != nullptr) {
         text.put(endpoint);
     } else {
@@ -214,8 +222,12 @@ int write_host(soap *ctx, const char *host, int port)
     if (port == default_port)
         return line(ctx, "Host", host);
     const bool needs_brackets = *host != '[' && std::strchr(host, ':') != nullptr;
-    std::snprintf(ctx->scratch_text, SOAP_TEXT_SIZE, needs_brackets ? "[%s]:%d" : "%s:%d", host, port);
-    return line(ctx, "Host", ctx->scratch_text);
+    bounded_text value;
+    value.put(needs_brackets ? "[" : "");
+    value.put(host);
+    value.put(needs_brackets ? "]:" : ":");
+    value.put_number(port);
+    return line(ctx, "Host", value.text);
 }
 
 // Credentials that don't fit are left out; no copy of them stays behind.
@@ -247,9 +259,12 @@ int write_action(soap *ctx, const char *action)
 {
     if (action == nullptr || ctx->status == STATUS_GET)
         return SOAP_OK;
-    const bool too_long = std::strlen(action) >= ACTION_LIMIT;
-    std::snprintf(ctx->scratch_text, SOAP_TEXT_SIZE, "\"%s\"", too_long ? "" : action);
-    return line(ctx, "SOAPAction", ctx->scratch_text);
+    bounded_text value;
+    value.put("\"");
+    if (std::strlen(action) < ACTION_LIMIT)
+        value.put(action);
+    value.put("\"");
+    return line(ctx, "SOAPAction", value.text);
 }
 
 // --- the response's own lines ---
