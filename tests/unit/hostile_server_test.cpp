@@ -190,7 +190,7 @@ const hostility PEERS[] = {
      })},
     {"surplus bytes", {{0, 0, 0}, 2},
      answering([](const std::string &name) { return with_length(answer_body(name)) + "surplus"; })},
-    {"a second answer, later", {{0, 0, 0}, 2}, [](line &end) {
+    {"a second answer, later", {{0, 0, 0}, 2, SPEAKS_UP}, [](line &end) {
          const std::string request = end.request();
          end.send(answer_to(request));
          end.send(with_length(answer_body("stray")));
