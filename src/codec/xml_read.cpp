@@ -125,8 +125,22 @@ int find_start_tag(soap *ctx)
     return find_start_tag_slow(ctx);
 }
 
-// Reads the start tag that most are, a short name in brackets, if it stands whole in the buffer. False: the
-// next thing is another, and nothing but blanks was looked at.
+// Takes the name at `name` and the ">" behind it, which most tags are, if it is short. False: nothing was
+// consumed. The buffer must hold SHORT_NAME bytes there.
+template <class Stop> bool take_plain_name(soap *ctx, const char *name)
+{
+    const char *stop = Stop::find(name, name + SHORT_NAME);
+    if (stop == name + SHORT_NAME || *stop != '>')
+        return false;
+    std::memcpy(ctx->tag, name, SHORT_NAME);
+    ctx->tag_length = static_cast<std::uint16_t>(stop - name);
+    ctx->tag[ctx->tag_length] = '\0';
+    input_consume(ctx, stop + 1);
+    return true;
+}
+
+// Reads a start tag that is a short name in brackets and stands whole in the buffer. False: the next thing is
+// another, and nothing was consumed.
 bool read_plain_tag(soap *ctx)
 {
     if (ctx->look_ahead != 0 || ctx->in_cdata != CDATA_OUTSIDE)
@@ -136,17 +150,10 @@ bool read_plain_tag(soap *ctx)
     while (p != end && is_blank(static_cast<unsigned char>(*p)))
         ++p;
     if (end - p <= static_cast<std::ptrdiff_t>(SHORT_NAME) || p[0] != '<' ||
-        static_cast<unsigned char>(p[1]) <= '?') // one of the marks that lead to something else
+        static_cast<unsigned char>(p[1]) <= '?' || // one of the marks that lead to something else
+        !take_plain_name<tag_name_stop>(ctx, p + 1))
         return false;
-    const char *name = p + 1;
-    const char *stop = tag_name_stop::find(name, name + SHORT_NAME);
-    if (stop == name + SHORT_NAME || *stop != '>')
-        return false;
-    std::memcpy(ctx->tag, name, SHORT_NAME);
-    ctx->tag_length = static_cast<std::uint16_t>(stop - name);
-    ctx->tag[ctx->tag_length] = '\0';
     ctx->has_body = 1;
-    input_consume(ctx, stop + 1);
     return true;
 }
 
@@ -229,6 +236,9 @@ int enter_element(soap *ctx)
 int read_end_tag_name(soap *ctx)
 {
     ctx->tag_resolved = false;
+    if (ctx->look_ahead == 0 && input_end(ctx) - input_here(ctx) >= static_cast<std::ptrdiff_t>(SHORT_NAME) &&
+        take_plain_name<end_name_stop>(ctx, input_here(ctx)))
+        return 0;
     ctx->tag_length = static_cast<std::uint16_t>(xml_name_read<end_name_stop>(ctx, ctx->tag));
     const std::int32_t byte = input_skip_blanks(ctx);
     if (byte == XML_EOF)

@@ -339,4 +339,66 @@ TEST(XmlText, in_place_text_is_only_what_needs_no_work)
     EXPECT_EQ(text[length], '\0');
 }
 
+// What a reading that begins with the held tag of the first child of <r> leaves behind.
+std::string state(soap *ctx, std::string_view text)
+{
+    std::string seen = std::string(text) + "; level " + std::to_string(ctx->nesting_level) + ", error " +
+                       std::to_string(ctx->error) + ", next ";
+    return seen + (soap_element_head_read(ctx) == 0 ? ctx->tag : "none");
+}
+
+TEST(XmlText, a_leaf_in_place_is_read_as_step_by_step)
+{
+    const struct {
+        const char *element;
+        std::uint32_t mode;
+        bool in_place;
+    } cases[] = {
+        {"<a>text</a>", 0, true},
+        {"<a></a>", 0, true},
+        {"<p:name_of_more_than_sixteen>text</p:name_of_more_than_sixteen>", 0, true},
+        {"<a>\xC3\xA9</a>", MODE_UTF_STRINGS, true},
+        {"<a>\xC3\xA9</a>", 0, false},
+        {"<a>text</a>", MODE_STRICT, false},
+        {"<a>text</a >", 0, false},
+        {"<a>text</ab>", 0, false},
+        {"<a>t&amp;t</a>", 0, false},
+        {"<a>t<!-- -->t</a>", 0, false},
+        {"<a b='c'>text</a>", 0, false},
+        {"<a/>", 0, false},
+    };
+    for (const auto &c : cases) {
+        SCOPED_TRACE(c.element);
+        const std::string document = "<r>" + std::string(c.element) + "<next/></r>";
+        reception quick(document, SOAP_BUFFER_SIZE, SOAP_BUFFER_SIZE, c.mode);
+        soap *const ctx = quick.context();
+        soap_element_in_begin(ctx, nullptr, 1, nullptr);
+        std::string_view text = "none";
+        EXPECT_FALSE(xml_leaf_in_place(ctx, &text)) << "nothing is held";
+        soap_element_head_read(ctx);
+        EXPECT_EQ(xml_leaf_in_place(ctx, &text), c.in_place);
+        if (!c.in_place) {
+            EXPECT_EQ(text, "none");
+            EXPECT_EQ(soap_element_in_begin(ctx, nullptr, 1, nullptr), 0) << "the tag is still held";
+            continue;
+        }
+        reception steps(document, 1, 1, c.mode);
+        soap *const slow = steps.context();
+        soap_element_in_begin(slow, nullptr, 1, nullptr);
+        soap_element_in_begin(slow, nullptr, 1, nullptr);
+        std::size_t length = 0;
+        const char *const read = soap_text_read(slow, &length);
+        ASSERT_NE(read, nullptr);
+        const std::string expected(read, length);
+        ASSERT_EQ(soap_element_in_end(slow, nullptr), 0);
+        EXPECT_EQ(state(ctx, text), state(slow, expected));
+    }
+    reception deep("<r><a>text</a></r>");
+    deep.context()->max_depth = 1;
+    soap_element_in_begin(deep.context(), nullptr, 1, nullptr);
+    soap_element_head_read(deep.context());
+    std::string_view text;
+    EXPECT_FALSE(xml_leaf_in_place(deep.context(), &text)) << "too deep";
+}
+
 } // namespace
