@@ -17,7 +17,7 @@ namespace {
 // The records are managed memory; only the lists end here.
 void forget_attachments(soap *ctx)
 {
-    ctx->dime.first = ctx->dime.last = nullptr;
+    ctx->dime.list = ctx->dime.first = ctx->dime.last = nullptr;
     ctx->mime.list = ctx->mime.first = ctx->mime.last = nullptr;
 }
 

@@ -9,6 +9,7 @@
 #include <vector>
 
 #include <gtest/gtest.h>
+#include <zuv_client_pro/soap_attachment.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_tcp.h>
@@ -424,7 +425,12 @@ TEST_F(tcp, release_keeps_or_closes_by_the_keep_alive_rule)
         ctx->error = c.error;
         ctx->keep_alive = c.keep_alive;
         ctx->response_unfinished = c.unfinished;
+        soap_attachment *const part =
+            soap_attachment_add(ctx.get(), &ctx->dime.list, &ctx->dime.last, nullptr, 0);
+        ctx->mime.list = ctx->mime.last = part;
         EXPECT_EQ(soap_socket_release(ctx.get()), c.error);
+        for (const soap_attachment *kept : {ctx->dime.list, ctx->dime.last, ctx->mime.list, ctx->mime.last})
+            EXPECT_EQ(kept, c.error == 0 ? part : nullptr) << c.error;
         EXPECT_EQ(ctx->error, c.error);
         EXPECT_EQ(ctx->socket != -1, c.kept) << c.error << ' ' << c.keep_alive << ' ' << c.unfinished;
         EXPECT_EQ(ctx->keep_alive, c.kept ? c.keep_alive : 0);
