@@ -36,6 +36,10 @@ outcome read_document(const std::string &document, std::uint32_t mode, std::size
             soap_receive_finish(&wire);
     }
     result.error = wire.error;
+    // How much of a broken compressed stream came at once settles what is noticed first. That it fails shows
+    // either way.
+    if (result.error == SOAP_ZLIB_ERROR || (result.error != 0 && (wire.mode & MODE_DEFLATE) != 0))
+        return {SOAP_ZLIB_ERROR, 0, false};
     return result;
 }
 

@@ -31,6 +31,8 @@ inline reading read_in_memory(const std::string &bytes, std::size_t piece)
     const soap *const ctx = read.wire.get();
     const int error = read.run();
     reading result = {outcome(ctx, error), {}};
+    if (result.error == SOAP_ZLIB_ERROR)
+        return result; // what came ahead of the break may differ as well
     for (const soap_attachment *list : {ctx->dime.list, ctx->mime.list})
         for (const soap_attachment *a = list; a != nullptr; a = a->next)
             if (a != ctx->mime.root && a->content != nullptr)
