@@ -55,7 +55,7 @@ struct bounded_text {
     }
     void put_number(int number)
     {
-        char digits[16];
+        char digits[16] = {};
         put(digits, static_cast<std::size_t>(std::to_chars(std::begin(digits), std::end(digits), number).ptr -
                                              digits));
     }

@@ -64,7 +64,7 @@ within apt-get update -q >"$work/apt.log" 2>&1
 install '/packages/*.deb'
 cp -r "$here" "$root/hosts"
 for way in cmake pkg-config; do
-    within sh /hosts/build_and_run_host.sh "$way" /usr "/work/$way"
+    within sh /hosts/build_and_run_host.sh "$way" /usr "/built/$way"
     echo "ok    a host built with $way"
 done
 within apt-get purge -y -q libzuv-client-pro1.5.1 libzuv-client-pro-dev zuv-tools >"$work/apt.log" 2>&1
