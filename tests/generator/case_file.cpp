@@ -49,6 +49,14 @@ void write_input(const std::filesystem::path &directory, const std::string &name
     std::ofstream(directory / name, std::ios::binary) << text;
 }
 
+void write_class_of(const std::filesystem::path &directory, const std::string &members, std::string &type_ids)
+{
+    type_ids.insert(0, "20 class t__Thing\n");
+    write_input(directory, "t.xsd",
+                schema_text("t", "<xsd:complexType name=\"Thing\"><xsd:sequence>" + members +
+                                     "</xsd:sequence></xsd:complexType>"));
+}
+
 } // namespace
 
 std::vector<contract_case> read_cases(const std::filesystem::path &path)
@@ -65,7 +73,8 @@ std::vector<contract_case> read_cases(const std::filesystem::path &path)
         }
         std::istringstream words(line.substr(3));
         case_section section;
-        words >> section.kind >> section.argument;
+        words >> section.kind >> std::ws;
+        std::getline(words, section.argument);
         section.line = number;
         if (section.kind != "case") {
             sections.push_back(section);
@@ -115,6 +124,8 @@ translation translate(const contract_case &contract)
         else if (section.kind == "schema")
             write_input(directory.path, section.argument + ".xsd",
                         schema_text(section.argument, section.text));
+        else if (section.kind == "members")
+            write_class_of(directory.path, section.argument, type_ids);
         else if (section.kind == "file")
             write_input(directory.path, section.argument, section.text);
     }

@@ -4,9 +4,10 @@
 //   case NAME        in a file of several cases: opens one
 //   types            rows of type_ids.txt; those of BASE_TYPE_IDS follow them
 //   schema PREFIX    what stands inside xsd:schema in PREFIX.xsd, whose first line is the section's
+//   members XML      schema t with the one class Thing, id 20, of these elements, all in its first line
 //   file NAME        any other input file, as it stands
 //   expect PATH      lines that stand together in this output; "model": in the dump of the model
-//   error            the message that refuses the contract
+//   error MESSAGE    what refuses the contract
 // Lines ahead of the first section say what the case is about.
 #pragma once
 
