@@ -7,7 +7,7 @@ set(PACKAGE_TESTS ${PROJECT_SOURCE_DIR}/tests/package)
 set(TEST_PACKAGES ${PROJECT_BINARY_DIR}/package_tests/packages)
 
 add_test(NAME library_surface COMMAND /usr/bin/python3 -B ${PROJECT_SOURCE_DIR}/tests/abi/surface.py
-    $<TARGET_FILE:zuv_client_pro> ${PROJECT_SOURCE_DIR}/tests/abi/exported_names.txt
+    $<TARGET_FILE:zuv_client_pro> ${PROJECT_SOURCE_DIR}/docs/interface/exported_names.txt
     ${PROJECT_SOURCE_DIR}/include/zuv_client_pro ${ZUV_GENERATED_DIR}/include/zuv_client_pro)
 
 add_test(NAME public_headers COMMAND sh ${PACKAGE_TESTS}/public_headers.sh ${PROJECT_SOURCE_DIR}/include
