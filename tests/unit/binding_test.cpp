@@ -131,14 +131,15 @@ TEST_F(Binding, enumerations_take_words_exactly_and_numbers_by_mode)
                  {"", 0, SOAP_TYPE_MISMATCH, SOAP_TYPE_MISMATCH},
                  {"1x", 0, SOAP_TYPE_MISMATCH, SOAP_TYPE_MISMATCH}};
     for (const auto &c : cases) {
+        SCOPED_TRACE(c.text);
         const std::string xml = std::string("<d><protocol:medium>") + c.text + "</protocol:medium></d>";
         const auto *supported = read<protocol__DeliverySupported>(xml);
-        EXPECT_EQ(c.error, ctx.error) << c.text;
+        EXPECT_EQ(c.error, ctx.error);
         if (supported) {
-            EXPECT_EQ(c.code, static_cast<int>(*supported->medium)) << c.text;
+            EXPECT_EQ(c.code, static_cast<int>(*supported->medium));
         }
         read<protocol__DeliverySupported>(xml, MODE_STRICT);
-        EXPECT_EQ(c.strict_error, ctx.error) << c.text;
+        EXPECT_EQ(c.strict_error, ctx.error);
     }
     protocol__DeliverySupported supported;
     protocol__Medium medium = static_cast<protocol__Medium>(99);
@@ -156,12 +157,8 @@ TEST_F(Binding, booleans_take_two_words_and_two_numbers)
     for (const auto &c : cases) {
         const auto *compliance = read<protocol__ProductFullNameCompliance>(
             std::string("<d><protocol:compliant>") + c.text + "</protocol:compliant></d>");
-        if (c.value < 0) {
-            EXPECT_EQ(SOAP_TYPE_MISMATCH, ctx.error) << c.text;
-        } else {
-            ASSERT_NE(nullptr, compliance) << c.text;
-            EXPECT_EQ(c.value == 1, *compliance->compliant) << c.text;
-        }
+        EXPECT_EQ(c.value, compliance ? *compliance->compliant : -1) << c.text;
+        EXPECT_EQ(compliance ? 0 : SOAP_TYPE_MISMATCH, ctx.error) << c.text;
     }
 }
 
@@ -264,13 +261,16 @@ TEST_F(Binding, references_forward_and_back_share_one_object)
         EXPECT_EQ("urn:x", redirection->uri) << "a text by value";
         EXPECT_EQ("urn:x", *redirection->subcode) << xml;
     }
-    read<protocolProfile__ProfileContent>("<p><protocol:contact href=\"#nobody\"/></p>");
-    EXPECT_EQ(SOAP_MISSING_ID, ctx.error);
-    read<protocolProfile__ProfileContent>("<p><protocol:contact id=\"c\"/><protocol:contact id=\"c\"/></p>");
-    EXPECT_EQ(SOAP_DUPLICATE_ID, ctx.error);
-    read<protocolProfile__ProfileContent>(
-        "<p><protocol:contact id=\"c\"/><protocol:identity href=\"#c\"/></p>");
-    EXPECT_EQ(SOAP_ID_CONFLICT, ctx.error);
+    static const struct {
+        const char *content;
+        int error;
+    } wrong[] = {{"<protocol:contact href=\"#nobody\"/>", SOAP_MISSING_ID},
+                 {"<protocol:contact id=\"c\"/><protocol:contact id=\"c\"/>", SOAP_DUPLICATE_ID},
+                 {"<protocol:contact id=\"c\"/><protocol:identity href=\"#c\"/>", SOAP_ID_CONFLICT}};
+    for (const auto &c : wrong) {
+        read<protocolProfile__ProfileContent>(std::string("<p>") + c.content + "</p>");
+        EXPECT_EQ(c.error, ctx.error);
+    }
 }
 
 TEST_F(Binding, graph_mode_writes_shared_objects_once_and_literal_mode_each_time)
@@ -287,30 +287,6 @@ TEST_F(Binding, graph_mode_writes_shared_objects_once_and_literal_mode_each_time
               write(profile, "p", SOAP_XML_GRAPH));
 }
 
-TEST_F(Binding, numbers_fail_with_a_type_mismatch)
-{
-    const auto *status = read<protocolHTTP__StatusCodeInformation>(
-        "<s><protocolHTTP:statusCode> 404 </protocolHTTP:statusCode></s>");
-    ASSERT_NE(nullptr, status);
-    EXPECT_EQ(404, *status->statusCode);
-    EXPECT_EQ(nullptr, read<protocolHTTP__StatusCodeInformation>(
-                           "<s><protocolHTTP:statusCode>abc</protocolHTTP:statusCode></s>"));
-    EXPECT_EQ(SOAP_TYPE_MISMATCH, ctx.error);
-}
-
-TEST_F(Binding, assignment_shares_what_pointers_name)
-{
-    std::string city = "Graz";
-    protocol__Address one, other;
-    one.city = &city;
-    one.soap = &ctx;
-    other = one;
-    EXPECT_EQ(&city, other.city);
-    EXPECT_EQ(&ctx, other.soap);
-    other.soap_default(nullptr);
-    EXPECT_EQ(&city, one.city);
-}
-
 TEST_F(Binding, the_registry_makes_finds_and_destroys_by_id)
 {
     std::size_t size = 0;
@@ -319,11 +295,6 @@ TEST_F(Binding, the_registry_makes_finds_and_destroys_by_id)
     ASSERT_NE(nullptr, identity);
     EXPECT_EQ(3 * sizeof(protocol__Identity), size);
     EXPECT_EQ(&ctx, identity[2].soap);
-    auto *binary = soap_instantiate_xsd__base64Binary(&ctx, 2, nullptr, nullptr, &size);
-    ASSERT_NE(nullptr, binary);
-    EXPECT_EQ(SOAP_TYPE_xsd__base64Binary, binary[1].soap_type());
-    EXPECT_EQ(2 * sizeof *binary, size);
-    soap_discard_objects(&ctx, binary);
     soap_discard_objects(&ctx, identity);
     EXPECT_EQ(nullptr, ctx.instance_list);
     EXPECT_EQ(nullptr, soap_instantiate(&ctx, 893, nullptr, nullptr, nullptr));

@@ -9,12 +9,9 @@ namespace {
 
 std::string hex(const std::string &bytes)
 {
-    static const char DIGITS[] = "0123456789abcdef";
     std::string text;
-    for (const char c : bytes) {
-        text += DIGITS[static_cast<unsigned char>(c) >> 4];
-        text += DIGITS[c & 15];
-    }
+    for (const char c : bytes)
+        text += {"0123456789abcdef"[static_cast<unsigned char>(c) >> 4], "0123456789abcdef"[c & 15]};
     return text;
 }
 
@@ -54,25 +51,16 @@ TEST(python_email, takes_apart_what_is_sent)
     const std::string nothing_special = "x";
     const std::string wanted =
         "a/b <a>|" + hex(text) + "|c/d <id2>|" + hex(binary) + "|e/f <x@y>|" + hex(nothing_special);
-    struct form {
-        std::uint32_t mode;
-        const char *start, *summary;
-    };
-    const form forms[] = {
-        {MODE_MTOM, nullptr, "application/xop+xml|application/xop+xml <message@zuv_client_pro>|"},
-        {MODE_MTOM, "<\"the \\message\"@x>",
-         "application/xop+xml|application/xop+xml <\"the \\message\"@x>|"},
-    };
     std::vector<std::string> requests, expected;
-    for (const form &f : forms) {
-        memory_wire wire(0, f.mode | MODE_BUFFERED);
-        if (f.start != nullptr)
-            soap_mime_start(&wire, nullptr, f.start);
+    for (const char *start : {"<message@zuv_client_pro>", "<\"the \\message\"@x>"}) {
+        memory_wire wire(0, MODE_MTOM | MODE_BUFFERED);
+        if (requests.size() == 1) // the first is that of the library
+            soap_mime_start(&wire, nullptr, start);
         ASSERT_EQ(send_request(wire, {make_value(text, "cid:a", "a/b"), make_value(binary, nullptr, "c/d"),
                                       make_value(nothing_special, "cid:x@y", "e/f")}),
                   0);
         requests.push_back(hex(wire.sent()));
-        expected.push_back(f.summary + wanted);
+        expected.push_back("application/xop+xml|application/xop+xml " + (start + ("|" + wanted)));
     }
     EXPECT_EQ(python_batch(TAKE_APART, requests), expected);
 }
@@ -91,20 +79,14 @@ random.seed(1)
 def envelope(hrefs):
     return ('<SOAP-ENV:Envelope xmlns:SOAP-ENV="http://schemas.xmlsoap.org/soap/envelope/"><SOAP-ENV:Body>'
             + "".join('<data href="%s"/>' % h for h in hrefs) + "</SOAP-ENV:Body></SOAP-ENV:Envelope>")
-def part(kind, id, data, encoder):
-    made = MIMEApplication(data, kind, encoder)
-    made["Content-ID"] = id
-    return made
-def root(hrefs):
-    made = MIMENonMultipart("text", "xml")
-    made.set_payload(envelope(hrefs))
-    made["Content-ID"] = '<the "root";x="y"@z>'
-    return made
-plain = part("x-plain", "<a@b>", b"plain bytes, two\r\nlines", encode_noop)
-base64 = part("x-base64", "<b c>", bytes(range(256)), encode_base64)
-quoted = part("x-quoted", "<q>", "caf\u00e9 = 1\r\n".encode(), encode_quopri)
 hrefs = ["cid:a%40b", "cid:b%20c", "q"]
-parts = [root(hrefs), plain, base64, quoted]
+parts = [MIMENonMultipart("text", "xml"),
+         MIMEApplication(b"plain bytes, two\r\nlines", "x-plain", encode_noop),
+         MIMEApplication(bytes(range(256)), "x-base64", encode_base64),
+         MIMEApplication("caf\u00e9 = 1\r\n".encode(), "x-quoted", encode_quopri)]
+parts[0].set_payload(envelope(hrefs))
+for part, id in zip(parts, ['<the "root";x="y"@z>', "<a@b>", "<b c>", "<q>"]):
+    part["Content-ID"] = id
 def crlf(text):
     return "\r\n".join(text.split("\r\n") if "\r\n" in text else text.split("\n"))
 def expectation():
