@@ -30,12 +30,6 @@ std::string uri_of(soap *ctx, const char *name)
     return uri ? uri : "(none)";
 }
 
-int state_of(const soap *ctx, const char *prefix)
-{
-    const soap_prefix *record = xml_prefix_find(ctx, prefix);
-    return record ? record->index : -2;
-}
-
 } // namespace
 
 // ---------------------------------------------------------------------------------------------
@@ -45,32 +39,27 @@ TEST(namespaces, the_copy_is_made_once_and_sets_the_version)
 {
     static const soap_namespace soap12[] = {{"SOAP-ENV", SOAP12_ENVELOPE, nullptr, nullptr},
                                             {nullptr, nullptr, nullptr, nullptr}};
-    static const soap_namespace empty[] = {{nullptr, nullptr, nullptr, nullptr}};
-    const auto ctx = std::make_unique<soap>();
-    ASSERT_EQ(soap_set_namespaces(ctx.get(), table()), 0);
-    EXPECT_EQ(ctx->soap_version, 1);
-    const soap_namespace *copy = ctx->local_namespaces;
+    soap ctx;
+    ASSERT_EQ(soap_set_namespaces(&ctx, table()), 0);
+    EXPECT_EQ(ctx.soap_version, 1);
+    const soap_namespace *copy = ctx.local_namespaces;
     EXPECT_NE(copy, table());
-    EXPECT_STREQ(copy[5].uri, "urn:b");
-    EXPECT_EQ(copy[6].prefix, nullptr);
+    ctx.soap_version = 0;
+    ASSERT_EQ(soap_namespace_table_copy(&ctx), 0);
+    EXPECT_EQ(ctx.local_namespaces, copy);
+    EXPECT_EQ(ctx.soap_version, 0);
 
-    ctx->soap_version = 0;
-    ASSERT_EQ(soap_namespace_table_copy(ctx.get()), 0);
-    EXPECT_EQ(ctx->local_namespaces, copy);
-    EXPECT_EQ(ctx->soap_version, 0);
+    ASSERT_EQ(soap_set_namespaces(&ctx, soap12), 0);
+    EXPECT_EQ(ctx.soap_version, 2);
+    ASSERT_EQ(soap_set_namespaces(&ctx, ctx.local_namespaces), 0);
+    EXPECT_EQ(ctx.namespaces, soap12);
 
-    ASSERT_EQ(soap_set_namespaces(ctx.get(), soap12), 0);
-    EXPECT_EQ(ctx->soap_version, 2);
-    EXPECT_EQ(ctx->namespaces, soap12);
-    ASSERT_EQ(soap_set_namespaces(ctx.get(), ctx->local_namespaces), 0);
-    EXPECT_EQ(ctx->namespaces, soap12);
-
-    ASSERT_EQ(soap_set_namespaces(ctx.get(), empty), 0);
-    EXPECT_EQ(ctx->soap_version, 2);
-    EXPECT_EQ(declare(ctx.get(), "p", "urn:p"), -1);
-    ASSERT_EQ(soap_set_namespaces(ctx.get(), nullptr), 0);
-    EXPECT_EQ(ctx->local_namespaces, nullptr);
-    EXPECT_EQ(declare(ctx.get(), "q", "urn:p"), -1);
+    ASSERT_EQ(soap_set_namespaces(&ctx, soap12 + 1), 0);
+    EXPECT_EQ(declare(&ctx, "p", "urn:p"), -1);
+    ASSERT_EQ(soap_set_namespaces(&ctx, nullptr), 0);
+    EXPECT_EQ(ctx.local_namespaces, nullptr);
+    EXPECT_EQ(declare(&ctx, "q", "urn:p"), -1);
+    EXPECT_EQ(ctx.soap_version, 2);
 }
 
 TEST(namespaces, received_uris_go_along_to_another_copy)
@@ -232,53 +221,4 @@ TEST(namespaces, every_refused_allocation_is_error_20)
         ctx = std::make_unique<soap>();
     };
     EXPECT_GE(failing_malloc::at_each_allocation(failing_malloc::refuse::one, declare_one, check), 5U);
-}
-
-// ---------------------------------------------------------------------------------------------
-// Writing.
-
-TEST(namespaces, a_prefix_is_pushed_once_and_declared_where_it_is_used)
-{
-    writer w;
-    soap *ctx = w.ctx.get();
-    ctx->mode = MODE_CANONICAL;
-    const auto push = [ctx](const char *uri) {
-        EXPECT_EQ(soap_prefix_push_out(ctx, "p", uri, 0), 0);
-        std::ptrdiff_t records = 0;
-        for (const soap_prefix *record = ctx->prefix_list; record; record = record->next)
-            ++records;
-        return records;
-    };
-    ctx->nesting_level = 1;
-    EXPECT_EQ(push("urn:p"), 1);
-    ctx->nesting_level = 2;
-    EXPECT_EQ(push("urn:p"), 1);
-    EXPECT_EQ(state_of(ctx, "p"), 0);
-    EXPECT_EQ(soap_prefix_use(ctx, "p:x"), 0);
-    EXPECT_EQ(soap_prefix_use(ctx, "p:x"), 0);
-    EXPECT_EQ(state_of(ctx, "p"), 1);
-    EXPECT_EQ(push("urn:p"), 2);
-    EXPECT_EQ(push("urn:new"), 3); // another meaning is declared here
-    EXPECT_EQ(state_of(ctx, "p"), 1);
-    soap_prefix_pop(ctx);
-    EXPECT_EQ(push("urn:p"), 1);
-    EXPECT_EQ(state_of(ctx, "p"), 0);
-
-    soap_prefix_stack_reset(ctx);
-    EXPECT_EQ(soap_prefix_use(ctx, "p:x"), 0); // ahead of its meaning
-    EXPECT_EQ(soap_prefix_use(ctx, "xml:lang"), 0);
-    EXPECT_EQ(xml_prefixes_waiting(ctx), 0U);
-    EXPECT_EQ(push("urn:p"), 2);
-    EXPECT_EQ(state_of(ctx, "p"), 1);
-    EXPECT_EQ(xml_prefixes_waiting(ctx), 1U);
-    soap_prefix_stack_reset(ctx);
-    EXPECT_EQ(xml_prefixes_waiting(ctx), 0U);
-}
-
-TEST(namespaces, a_list_names_whole_prefixes)
-{
-    EXPECT_TRUE(xml_list_names("a bc d", "bc"));
-    EXPECT_TRUE(xml_list_names(" a\tbc: ", "bc"));
-    EXPECT_FALSE(xml_list_names("abc bcd b", "bc"));
-    EXPECT_FALSE(xml_list_names("  ", ""));
 }

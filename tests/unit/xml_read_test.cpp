@@ -3,7 +3,6 @@
 
 #include <zuv_client_pro/soap_error.h>
 
-#include "codec/tag_view.h"
 #include "support/failing_malloc.h"
 
 using namespace reader_input;
@@ -168,23 +167,6 @@ TEST(XmlRead, names_are_compared_by_namespace_row)
         EXPECT_EQ(soap_tag_compare(in, c.tag, c.asked), other_local ? 3 : 0);
     }
     EXPECT_EQ(begin(reception("<x/>"), "one:x"), SOAP_TAG_MISMATCH);
-}
-
-TEST(XmlRead, the_row_of_a_tag_follows_the_declarations_in_scope)
-{
-    reception in(
-        "<p:a xmlns:p='urn:one'><p:b xmlns:p='urn:two'><p:c/></p:b><p:d/><p:e xmlns:p='urn:x'/><f/></p:a>");
-    const int rows[] = {5, 6, 6, 5, TAG_ROW_UNBOUND, TAG_ROW_NO_PREFIX};
-    for (int next = 0; next < 6;) {
-        if (soap_element_in_begin(in, nullptr, 1, nullptr) != 0) {
-            ASSERT_EQ(soap_element_in_end(in, nullptr), 0);
-            continue;
-        }
-        const tag_view tag = soap_held_tag(in);
-        EXPECT_EQ(tag.row, rows[next]) << in->tag;
-        EXPECT_EQ(std::string(tag.local, tag.local_length), std::string(1, "abcdef"[next]));
-        ++next;
-    }
 }
 
 constexpr char DECLARATIONS[] = " xmlns:i='http://www.w3.org/2001/XMLSchema-instance'"

@@ -111,17 +111,4 @@ TEST(XmlTokens, the_declaration_chooses_the_encoding)
     });
 }
 
-TEST(XmlTokens, the_end_of_input_stays)
-{
-    reception in("a");
-    EXPECT_EQ(soap_char_next(in), 'a');
-    EXPECT_EQ(soap_char_next(in), XML_EOF);
-    in->on_recv = [](soap *, char *, std::size_t) -> std::size_t {
-        ADD_FAILURE() << "asked for more input behind its end";
-        return 0;
-    };
-    EXPECT_EQ(soap_char_next(in), XML_EOF);
-    EXPECT_EQ(soap_char_next_utf8(in), XML_EOF);
-}
-
 } // namespace

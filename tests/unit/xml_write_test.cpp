@@ -739,7 +739,7 @@ TEST(xml_write, canonical_lists_include_and_exclude_prefixes)
 {
     writer w(MODE_CANONICAL);
     const auto write = [](soap *ctx) { element(ctx, "a:r", [](soap *c) { element(c, "b:e"); }); };
-    w.ctx->canonical_include = "xsd b";
+    w.ctx->canonical_include = "xsi2 xsd\tb:"; // names whole prefixes
     EXPECT_EQ(written(w, start::document, write),
               "<a:r xmlns:a=\"urn:a\" xmlns:b=\"urn:b\""
               " xmlns:xsd=\"http://www.w3.org/2001/XMLSchema\"><b:e></b:e></a:r>");
