@@ -1,4 +1,4 @@
-// The samples of tests/samples: read, cut, changed, and taken apart and put together again in ways that lie.
+// The samples of tests/samples: read, cut and changed; records whose lengths lie.
 #include <filesystem>
 #include <fstream>
 #include <iterator>
@@ -71,69 +71,6 @@ TEST(samples, are_the_same_through_the_callbacks)
             }
         }
     }
-}
-
-// ---------------------------------------------------------------------------------------------
-// Messages put together wrongly.
-
-// Pieces of a message in an order that is right, and everything that is wrong with some of them left out,
-// doubled or exchanged. The outcome is the message itself, or a way to say no.
-void expect_no_wrong_reading(const std::string &head, const std::vector<std::string> &pieces,
-                             const std::string &expected)
-{
-    const auto judge = [&](const std::vector<std::string> &changed, const std::string &what) {
-        std::string bytes = head;
-        for (const std::string &piece : changed)
-            bytes += piece;
-        const std::string summary = reception(bytes).summary();
-        EXPECT_TRUE(summary == expected || summary.starts_with("!")) << what << " gives " << summary;
-        return summary;
-    };
-    ASSERT_EQ(judge(pieces, "nothing"), expected);
-    for (std::size_t i = 0; i < pieces.size(); ++i) {
-        const auto at = static_cast<std::ptrdiff_t>(i);
-        std::vector<std::string> changed = pieces;
-        changed.erase(changed.begin() + at);
-        EXPECT_NE(judge(changed, "without piece " + std::to_string(i)), expected);
-        changed = pieces;
-        changed.insert(changed.begin() + at, pieces[i]);
-        if (i + 1 < pieces.size()) { // behind its end a message has nothing to say
-            EXPECT_NE(judge(changed, "with piece " + std::to_string(i) + " twice"), expected);
-        }
-        for (std::size_t j = i + 1; j < pieces.size(); ++j) {
-            changed = pieces;
-            std::swap(changed[i], changed[j]);
-            judge(changed, "with " + std::to_string(i) + " and " + std::to_string(j) + " exchanged");
-        }
-    }
-}
-
-const std::string THREE_VALUES = "<data href=\"cid:a\"/><data href=\"cid:b\"/><data href=\"cid:c\"/>";
-
-// A middle chunk left out or doubled is a shorter or longer record that nothing in DIME tells from a right
-// one; so only the ends of records are exchanged here.
-TEST(wrong_messages, of_dime_records_are_refused)
-{
-    using namespace dime_bytes;
-    const std::string xml = envelope(THREE_VALUES);
-    expect_no_wrong_reading("",
-                            {record(MB | CF, URI, "", ENVELOPE_URI, xml.substr(0, 100)) +
-                                 record(CF, UNCHANGED, "", "", xml.substr(100, 61)),
-                             record(0, UNCHANGED, "", "", xml.substr(161)),
-                             record(CF, MEDIA, "a", "t", "aaaa"), record(0, UNCHANGED, "", "", "AA"),
-                             record(0, MEDIA, "b", "t", "bbbb"), record(ME, MEDIA, "c", "t", "cccccc")},
-                            "[cid:a t aaaaAA][cid:b t bbbb][cid:c t cccccc]");
-}
-
-TEST(wrong_messages, of_mime_parts_are_refused)
-{
-    const std::string start = "\r\nContent-ID: <";
-    expect_no_wrong_reading(
-        "HTTP/1.1 200 OK\r\nContent-Type: multipart/related; boundary=bb; start=\"<m>\"\r\n\r\n",
-        {"--bb" + start + "a>\r\n\r\naaaa\r\n",
-         "--bb" + start + "m>\r\n\r\n" + envelope(THREE_VALUES) + "\r\n",
-         "--bb" + start + "b>\r\n\r\nbbbb\r\n", "--bb" + start + "c>\r\n\r\ncccc\r\n", "--bb--"},
-        "[cid:a (null) aaaa][cid:b (null) bbbb][cid:c (null) cccc]");
 }
 
 // Each length of each record tells something else than what is there.

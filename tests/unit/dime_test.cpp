@@ -217,6 +217,10 @@ TEST(dime_in, reports_what_is_wrong_with_a_message)
         {"version", wrong_version, SOAP_DIME_VERSION},
         {"no end", record(0, MEDIA, "a", "t", "x"), SOAP_EOF},
         {"no such attachment", record(ME, MEDIA, "b", "t", "x"), SOAP_DIME_HREF},
+        {"a chunk without a beginning", record(CF, UNCHANGED, "", "", "x") + good, SOAP_DIME_ERROR},
+        {"a beginning within chunks", record(CF, MEDIA, "b", "t", "x") + good, SOAP_DIME_ERROR},
+        {"the message again", start + good, SOAP_DIME_ERROR},
+        {"nothing but the attachment's end", record(ME, UNCHANGED, "", "", "x"), SOAP_DIME_ERROR},
         {"end within a record", record(ME | CF, MEDIA, "a", "t", "x") + good, SOAP_DIME_ERROR},
     };
     for (const wrong_case &c : cases)

@@ -204,21 +204,3 @@ TEST(namespaces, texts_of_any_length_are_kept)
     EXPECT_EQ(soap_prefix_push_in(ctx, std::string(70000, 'p').c_str(), ""), nullptr);
     EXPECT_EQ(ctx->error, SOAP_LENGTH);
 }
-
-TEST(namespaces, every_refused_allocation_is_error_20)
-{
-    auto ctx = std::make_unique<soap>();
-    const soap_prefix *made = nullptr;
-    const auto declare_one = [&] {
-        made = soap_set_namespaces(ctx.get(), table()) == 0
-                   ? soap_prefix_push_in(ctx.get(), "e", SOAP12_ENVELOPE)
-                   : nullptr;
-    };
-    const auto check = [&](bool refused) {
-        EXPECT_TRUE(made != nullptr || (refused && ctx->error == SOAP_OUT_OF_MEMORY)) << ctx->error;
-        declare_one();
-        EXPECT_NE(made, nullptr);
-        ctx = std::make_unique<soap>();
-    };
-    EXPECT_GE(failing_malloc::at_each_allocation(failing_malloc::refuse::one, declare_one, check), 5U);
-}
