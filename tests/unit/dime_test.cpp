@@ -252,8 +252,9 @@ TEST(dime_in, costs_no_memory_for_what_is_only_announced)
 TEST(dime_in, survives_every_refused_allocation)
 {
     expect_survival_of_every_refused_allocation(
-        message_record(0, "<data href=\"a\"/>") + record(CF, MEDIA, "a", "t", "one") +
-        record(0, UNCHANGED, "", "", std::string(5000, 'x')) + record(ME, MEDIA, "b", "", "y"));
+        message_record(CF, "<data href=\"a\"/>") + record(0, UNCHANGED, "", "", "") +
+        record(CF, MEDIA, "a", "t", "one") + record(0, UNCHANGED, "", "", std::string(5000, 'x')) +
+        record(ME, MEDIA, "b", "", "y"));
 }
 
 TEST(dime, carries_megabytes_unchanged)

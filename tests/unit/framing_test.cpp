@@ -217,7 +217,7 @@ TEST(framing, every_allocation_of_reading_may_fail_once)
 {
     const std::string text = "<a>stored and compressed, stored and compressed!</a>";
     memory_wire wire;
-    wire.receive(sent_message({MODE_STORE, false, 2, nullptr}, text, 1));
+    wire.receive(sent_message({MODE_STORE, true, 2, nullptr}, text, 1));
     int result = 0;
     const auto read = [&] {
         wire.given = 0;

@@ -134,9 +134,13 @@ TEST(XmlText, a_held_tag_begins_the_text)
 TEST(XmlText, simple_values_are_trimmed_and_bounded)
 {
     const reading bodies[] = {
-        {"blanks", " \n 42\t", "42"},        {"blanks within", " a &amp; 'b' \"c\" > ", "a & 'b' \"c\" >"},
-        {"up to a child", "4<b>2</b>", "4"}, {"section", "<![CDATA[ x ]]>", "x"},
-        {"Latin-1", "\xC3\xA9", "\xE9"},     {"UTF-8", "&#233;", "\xC3\xA9", MODE_UTF_STRINGS},
+        {"blanks", " \n 42\t", "42"},
+        {"only blanks", " \n", ""},
+        {"blanks within", " a &amp; 'b' \"c\" > ", "a & 'b' \"c\" >"},
+        {"up to a child", "4<b>2</b>", "4"},
+        {"section", "<![CDATA[ x ]]>", "x"},
+        {"Latin-1", "\xC3\xA9", "\xE9"},
+        {"UTF-8", "&#233;", "\xC3\xA9", MODE_UTF_STRINGS},
     };
     for (const reading &body : bodies)
         EXPECT_EQ(element_text(body.document, body.mode, soap_simple_value_read), body.expected) << body.rule;

@@ -681,7 +681,10 @@ static void prefixes_redefined(soap *ctx)
         EXPECT_EQ(soap_attr_write(c, "xmlns:b", "urn:other"), 0);
         EXPECT_EQ(soap_attr_write(c, "b:x", "1"), 0);
         EXPECT_EQ(soap_element_attrs_close(c, nullptr), 0);
-        element(c, "b:inner");
+        EXPECT_EQ(soap_element_open(c, "b:inner", 0, nullptr), 0);
+        EXPECT_EQ(soap_attr_write(c, "xmlns:b", "urn:other"), 0); // says what is known
+        EXPECT_EQ(soap_element_attrs_close(c, nullptr), 0);
+        EXPECT_EQ(soap_element_out_end(c, "b:inner"), 0);
         EXPECT_EQ(soap_element_out_end(c, "a:e"), 0);
         element(c, "b:outer");
         EXPECT_EQ(soap_attr_set(c, "xmlns:_1", "urn:generated", 1), 0);
