@@ -228,6 +228,11 @@ TEST(dime_in, reports_what_is_wrong_with_a_message)
     std::string overrun = start + good; // the message's own record is shorter than the message
     overrun[11] = 10;
     EXPECT_NE(reception(overrun).run(), 0);
+    std::string chunk = record(MB | CF, URI, "m", "", envelope("").substr(0, 101));
+    EXPECT_EQ(reception(chunk + good).run(), SOAP_DIME_ERROR);
+    chunk.back() = '!'; // padding that isn't: the length was too short
+    EXPECT_EQ(reception(chunk + record(ME, UNCHANGED, "", "", envelope("").substr(101))).run(),
+              SOAP_DIME_ERROR);
     EXPECT_EQ(reception(message_record(ME, "<data href=\"a\"/>")).run(), SOAP_DIME_HREF);
 }
 

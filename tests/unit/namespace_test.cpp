@@ -204,3 +204,16 @@ TEST(namespaces, texts_of_any_length_are_kept)
     EXPECT_EQ(soap_prefix_push_in(ctx, std::string(70000, 'p').c_str(), ""), nullptr);
     EXPECT_EQ(ctx->error, SOAP_LENGTH);
 }
+
+TEST(namespaces, a_prefix_that_waits_for_its_declaration_is_forgotten_with_the_message)
+{
+    writer w(MODE_CANONICAL);
+    soap *ctx = w.ctx.get();
+    ctx->mode = MODE_CANONICAL;
+    EXPECT_EQ(soap_prefix_use(ctx, "q:x"), 0);
+    EXPECT_EQ(xml_prefixes_waiting(ctx), 0U);
+    EXPECT_EQ(soap_prefix_push_out(ctx, "q", "urn:q", 0), 0);
+    EXPECT_EQ(xml_prefixes_waiting(ctx), 1U);
+    soap_prefix_stack_reset(ctx);
+    EXPECT_EQ(xml_prefixes_waiting(ctx), 0U);
+}

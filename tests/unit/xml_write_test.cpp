@@ -8,6 +8,7 @@
 #include <zuv_client_pro/soap_error.h>
 
 #include "codec/xml_write_fast.h"
+#include "support/failing_malloc.h"
 #include "support/writer_fixture.h"
 
 using namespace writer_fixture;
@@ -748,4 +749,25 @@ TEST(xml_write, canonical_lists_include_and_exclude_prefixes)
     w.ctx->canonical_include = nullptr;
     w.ctx->canonical_exclude = " b: SOAP-ENV";
     EXPECT_EQ(written(w, start::document, write), "<a:r xmlns:a=\"urn:a\"><b:e></b:e></a:r>");
+}
+
+TEST(xml_write, every_refused_allocation_is_error_20_or_done_without)
+{
+    for (const std::uint32_t mode : {0U, MODE_CANONICAL, MODE_DEFAULT_NAMESPACE}) {
+        int failures = 0, result = 0;
+        auto w = std::make_unique<writer>(mode);
+        const auto write = [&] {
+            soap *const ctx = w->ctx.get();
+            ctx->mode = mode | MODE_COUNTING;
+            result = soap_attr_set(ctx, "a:x", "1", 1);
+            result = result ? result : soap_element_out_begin(ctx, "a:root", 1, "xsd:int");
+            result = result ? result : soap_element_out_end(ctx, "a:root");
+        };
+        failing_malloc::at_each_allocation(failing_malloc::refuse::one, write, [&](bool) {
+            EXPECT_TRUE(result == 0 || result == SOAP_OUT_OF_MEMORY) << result;
+            failures += result != 0;
+            w = std::make_unique<writer>(mode);
+        });
+        EXPECT_GE(failures, mode == MODE_CANONICAL ? 4 : 2);
+    }
 }
