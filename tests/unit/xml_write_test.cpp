@@ -1,5 +1,7 @@
 // Start tags, text, arrays and the envelope as they stand on the wire, in every output mode.
+#include <cstdio>
 #include <cstdlib>
+#include <fstream>
 #include <random>
 #include <vector>
 
@@ -44,11 +46,7 @@ void element(soap *ctx, const char *tag, const calls &content = {})
 std::string canonical_form(const std::string &text, const char *form)
 {
     const std::string path = ::testing::TempDir() + "xml_write_" + std::to_string(::getpid()) + ".xml";
-    std::FILE *file = std::fopen(path.c_str(), "wb");
-    if (!file)
-        return "";
-    std::fwrite(text.data(), 1, text.size(), file);
-    std::fclose(file);
+    std::ofstream(path, std::ios::binary) << text;
     std::string result;
     if (std::FILE *pipe = ::popen(("xmllint " + std::string(form) + " " + path).c_str(), "r")) {
         char bytes[4096];
