@@ -230,6 +230,7 @@ TEST(dime_in, reports_what_is_wrong_with_a_message)
     EXPECT_NE(reception(overrun).run(), 0);
     std::string chunk = record(MB | CF, URI, "m", "", envelope("").substr(0, 101));
     EXPECT_EQ(reception(chunk + good).run(), SOAP_DIME_ERROR);
+    EXPECT_EQ(reception(message_record(CF, "<data href=\"a\"/>") + good).run(), SOAP_DIME_ERROR);
     chunk.back() = '!'; // padding that isn't: the length was too short
     EXPECT_EQ(reception(chunk + record(ME, UNCHANGED, "", "", envelope("").substr(101))).run(),
               SOAP_DIME_ERROR);

@@ -212,8 +212,10 @@ TEST(namespaces, a_prefix_that_waits_for_its_declaration_is_forgotten_with_the_m
     ctx->mode = MODE_CANONICAL;
     EXPECT_EQ(soap_prefix_use(ctx, "q:x"), 0);
     EXPECT_EQ(xml_prefixes_waiting(ctx), 0U);
-    EXPECT_EQ(soap_prefix_push_out(ctx, "q", "urn:q", 0), 0);
-    EXPECT_EQ(xml_prefixes_waiting(ctx), 1U);
+    for (int times = 0; times < 2; ++times) {
+        EXPECT_EQ(soap_prefix_push_out(ctx, "q", "urn:q", 0), 0);
+        EXPECT_EQ(xml_prefixes_waiting(ctx), 1U);
+    }
     soap_prefix_stack_reset(ctx);
     EXPECT_EQ(xml_prefixes_waiting(ctx), 0U);
 }
