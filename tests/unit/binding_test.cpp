@@ -1,4 +1,6 @@
 // binding_test.cpp - the rules of data classes, on documents read from memory and objects written to it.
+//
+// Elsewhere: order and number of members, words and values that are refused, in every class (tests/foreign).
 #include <gtest/gtest.h>
 
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
@@ -66,31 +68,6 @@ protected:
     memory_wire ctx;
 };
 
-TEST_F(Binding, reads_elements_in_any_order_and_skips_the_unknown)
-{
-    const auto *profile = read<protocolProfile__ProfileContent>(
-        "<protocolProfile:setRequest><protocolProfile:profile/><x><y/>z</x><protocolProfile:thisURI>b</"
-        "protocolProfile:thisURI>"
-        "<protocol:identity><protocol:name>n</protocol:name></protocol:identity><protocolProfile:state>2</"
-        "protocolProfile:state>"
-        "<protocolProfile:thisURI>a</protocolProfile:thisURI></protocolProfile:setRequest>");
-    ASSERT_NE(nullptr, profile) << ctx.error;
-    EXPECT_EQ((std::vector<std::string>{"b", "a"}), profile->thisURI);
-    EXPECT_EQ("n", *profile->identity->name);
-    EXPECT_EQ(protocolProfile__ProfileState::inactive_x002esuspended, *profile->state);
-    EXPECT_EQ(1u, profile->profile.size());
-    EXPECT_EQ(&ctx, profile->identity->soap);
-}
-
-TEST_F(Binding, takes_a_single_member_once)
-{
-    const std::string twice = "<protocol:MetaData><protocol:type>a</protocol:type><protocol:type>b</"
-                              "protocol:type></protocol:MetaData>";
-    EXPECT_EQ("a", *read<protocol__ProductMetaData>(twice)->type);
-    EXPECT_EQ(nullptr, read<protocol__ProductMetaData>(twice, MODE_STRICT));
-    EXPECT_EQ(SOAP_TAG_MISMATCH, ctx.error);
-}
-
 TEST_F(Binding, refuses_what_must_be_understood_and_is_unknown)
 {
     EXPECT_EQ(nullptr, read<protocol__Contact>("<c><x SOAP-ENV:mustUnderstand=\"1\"/></c>"));
@@ -118,53 +95,6 @@ TEST_F(Binding, xsi_type_makes_the_derived_class_and_an_unknown_one_the_base)
     EXPECT_EQ(SOAP_TYPE_MISMATCH, ctx.error);
 }
 
-TEST_F(Binding, enumerations_take_words_exactly_and_numbers_by_mode)
-{
-    static const struct {
-        const char *text;
-        int code, strict_error, error;
-    } cases[] = {{"physical", 1, 0, 0},
-                 {"99", 99, SOAP_TYPE_MISMATCH, 0},
-                 {"1", 1, 0, 0},
-                 {"-1", -1, SOAP_TYPE_MISMATCH, 0},
-                 {"Physical", 0, SOAP_TYPE_MISMATCH, SOAP_TYPE_MISMATCH},
-                 {"", 0, SOAP_TYPE_MISMATCH, SOAP_TYPE_MISMATCH},
-                 {"1x", 0, SOAP_TYPE_MISMATCH, SOAP_TYPE_MISMATCH}};
-    for (const auto &c : cases) {
-        const std::string xml = std::string("<d><protocol:medium>") + c.text + "</protocol:medium></d>";
-        const auto *supported = read<protocol__DeliverySupported>(xml);
-        EXPECT_EQ(c.error, ctx.error) << c.text;
-        if (supported) {
-            EXPECT_EQ(c.code, static_cast<int>(*supported->medium)) << c.text;
-        }
-        read<protocol__DeliverySupported>(xml, MODE_STRICT);
-        EXPECT_EQ(c.strict_error, ctx.error) << c.text;
-    }
-    protocol__DeliverySupported supported;
-    protocol__Medium medium = static_cast<protocol__Medium>(99);
-    supported.medium = &medium;
-    EXPECT_EQ("<d><protocol:medium>99</protocol:medium></d>", write(supported, "d"));
-}
-
-TEST_F(Binding, booleans_take_two_words_and_two_numbers)
-{
-    static const struct {
-        const char *text;
-        int value;
-    } cases[] = {{"true", 1}, {"false", 0}, {"1", 1},    {"0", 0},
-                 {"2", -1},   {"-1", -1},   {"yes", -1}, {"TRUE", -1}};
-    for (const auto &c : cases) {
-        const auto *compliance = read<protocol__ProductFullNameCompliance>(
-            std::string("<d><protocol:compliant>") + c.text + "</protocol:compliant></d>");
-        if (c.value < 0) {
-            EXPECT_EQ(SOAP_TYPE_MISMATCH, ctx.error) << c.text;
-        } else {
-            ASSERT_NE(nullptr, compliance) << c.text;
-            EXPECT_EQ(c.value == 1, *compliance->compliant) << c.text;
-        }
-    }
-}
-
 TEST_F(Binding, always_written_members_have_their_defaults)
 {
     EXPECT_EQ(
@@ -183,33 +113,23 @@ TEST_F(Binding, always_written_members_have_their_defaults)
     EXPECT_EQ(nullptr, order->includePatches);
 }
 
-TEST_F(Binding, required_members_are_nil_when_null_and_missed_in_strict_mode)
+TEST_F(Binding, a_code_without_a_word_goes_out_as_its_number)
+{
+    protocol__DeliverySupported supported;
+    protocol__Medium medium = static_cast<protocol__Medium>(99);
+    supported.medium = &medium;
+    EXPECT_EQ("<d><protocol:medium>99</protocol:medium></d>", write(supported, "d"));
+}
+
+TEST_F(Binding, required_members_are_nil_when_null_and_attributes_come_first)
 {
     protocolPRFilter__Not negation;
     EXPECT_EQ("<f xsi:type=\"protocolPRFilter:Not\"><protocolPRFilter:operand xsi:nil=\"true\"/></f>",
               write(negation, "f"));
     protocol__Server_x002eRedirection redirection;
-    EXPECT_EQ("<f "
-              "xsi:type=\"protocol:Server.Redirection\"><protocol:uri></"
-              "protocol:uri><protocol:term>permanent</protocol:term></f>",
+    EXPECT_EQ("<f xsi:type=\"protocol:Server.Redirection\"><protocol:uri></protocol:uri>"
+              "<protocol:term>permanent</protocol:term></f>",
               write(redirection, "f"));
-    static const struct {
-        const char *xml;
-        int strict_error;
-    } cases[] = {
-        {"<f><protocolPRFilter:operand/></f>", SOAP_OCCURS},
-        {"<f><protocolPRFilter:operand/><protocolPRFilter:operand/></f>", 0},
-        {"<f/>", SOAP_OCCURS},
-    };
-    for (const auto &c : cases) {
-        EXPECT_NE(nullptr, read<protocolPRFilter__And>(c.xml)) << c.xml;
-        read<protocolPRFilter__And>(c.xml, MODE_STRICT);
-        EXPECT_EQ(c.strict_error, ctx.error) << c.xml;
-    }
-}
-
-TEST_F(Binding, attributes_come_first_and_a_required_one_is_missed_in_strict_mode)
-{
     std::string product = "P";
     protocolPRFilter__ProductComparison comparison;
     comparison.compareOp = protocolPRFilter__StringCompareOp::containsPhrase;
@@ -221,14 +141,6 @@ TEST_F(Binding, attributes_come_first_and_a_required_one_is_missed_in_strict_mod
               "xsi:nil=\"true\"/>",
               write(protocolPRFilter__ReportTextComparison(), "-f"))
         << "without an element of its own";
-    const std::string bare = "<f><protocolPRFilter:product>P</protocolPRFilter:product></f>";
-    ASSERT_NE(nullptr, read<protocolPRFilter__ProductComparison>(bare));
-    EXPECT_EQ(nullptr, read<protocolPRFilter__ProductComparison>(bare, MODE_STRICT));
-    EXPECT_EQ(SOAP_REQUIRED, ctx.error);
-    const auto *data = read<protocol__Data>("<d encoding=\"UTF-8\">a &amp; b</d>");
-    ASSERT_NE(nullptr, data);
-    EXPECT_EQ("a & b", data->value);
-    EXPECT_EQ(protocol__Encoding::UTF_8, *data->encoding);
     EXPECT_EQ(nullptr, read<protocol__Data>("<d/>")->encoding);
 }
 
@@ -264,13 +176,16 @@ TEST_F(Binding, references_forward_and_back_share_one_object)
         EXPECT_EQ("urn:x", redirection->uri) << "a text by value";
         EXPECT_EQ("urn:x", *redirection->subcode) << xml;
     }
-    read<protocolProfile__ProfileContent>("<p><protocol:contact href=\"#nobody\"/></p>");
-    EXPECT_EQ(SOAP_MISSING_ID, ctx.error);
-    read<protocolProfile__ProfileContent>("<p><protocol:contact id=\"c\"/><protocol:contact id=\"c\"/></p>");
-    EXPECT_EQ(SOAP_DUPLICATE_ID, ctx.error);
-    read<protocolProfile__ProfileContent>(
-        "<p><protocol:contact id=\"c\"/><protocol:identity href=\"#c\"/></p>");
-    EXPECT_EQ(SOAP_ID_CONFLICT, ctx.error);
+    static const struct {
+        const char *content;
+        int error;
+    } wrong[] = {{"<protocol:contact href=\"#nobody\"/>", SOAP_MISSING_ID},
+                 {"<protocol:contact id=\"c\"/><protocol:contact id=\"c\"/>", SOAP_DUPLICATE_ID},
+                 {"<protocol:contact id=\"c\"/><protocol:identity href=\"#c\"/>", SOAP_ID_CONFLICT}};
+    for (const auto &c : wrong) {
+        read<protocolProfile__ProfileContent>(std::string("<p>") + c.content + "</p>");
+        EXPECT_EQ(c.error, ctx.error);
+    }
 }
 
 TEST_F(Binding, graph_mode_writes_shared_objects_once_and_literal_mode_each_time)
@@ -287,43 +202,12 @@ TEST_F(Binding, graph_mode_writes_shared_objects_once_and_literal_mode_each_time
               write(profile, "p", SOAP_XML_GRAPH));
 }
 
-TEST_F(Binding, numbers_fail_with_a_type_mismatch)
-{
-    const auto *status = read<protocolHTTP__StatusCodeInformation>(
-        "<s><protocolHTTP:statusCode> 404 </protocolHTTP:statusCode></s>");
-    ASSERT_NE(nullptr, status);
-    EXPECT_EQ(404, *status->statusCode);
-    EXPECT_EQ(nullptr, read<protocolHTTP__StatusCodeInformation>(
-                           "<s><protocolHTTP:statusCode>abc</protocolHTTP:statusCode></s>"));
-    EXPECT_EQ(SOAP_TYPE_MISMATCH, ctx.error);
-}
-
-TEST_F(Binding, assignment_shares_what_pointers_name)
-{
-    std::string city = "Graz";
-    protocol__Address one, other;
-    one.city = &city;
-    one.soap = &ctx;
-    other = one;
-    EXPECT_EQ(&city, other.city);
-    EXPECT_EQ(&ctx, other.soap);
-    other.soap_default(nullptr);
-    EXPECT_EQ(&city, one.city);
-}
-
 TEST_F(Binding, the_registry_makes_finds_and_destroys_by_id)
 {
-    std::size_t size = 0;
     auto *identity = static_cast<protocol__Identity *>(
-        soap_instantiate_array(&ctx, SOAP_TYPE_protocol__Identity, 3, nullptr, nullptr, &size));
+        soap_instantiate_array(&ctx, SOAP_TYPE_protocol__Identity, 3, nullptr, nullptr, nullptr));
     ASSERT_NE(nullptr, identity);
-    EXPECT_EQ(3 * sizeof(protocol__Identity), size);
     EXPECT_EQ(&ctx, identity[2].soap);
-    auto *binary = soap_instantiate_xsd__base64Binary(&ctx, 2, nullptr, nullptr, &size);
-    ASSERT_NE(nullptr, binary);
-    EXPECT_EQ(SOAP_TYPE_xsd__base64Binary, binary[1].soap_type());
-    EXPECT_EQ(2 * sizeof *binary, size);
-    soap_discard_objects(&ctx, binary);
     soap_discard_objects(&ctx, identity);
     EXPECT_EQ(nullptr, ctx.instance_list);
     EXPECT_EQ(nullptr, soap_instantiate(&ctx, 893, nullptr, nullptr, nullptr));

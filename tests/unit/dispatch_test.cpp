@@ -1,4 +1,6 @@
 // dispatch_test.cpp - what is done by type id alone, over every id there is.
+//
+// Elsewhere: objects that are shared (tests/classes/graph_test.cpp).
 #include <gtest/gtest.h>
 
 #include <cstring>
@@ -21,8 +23,6 @@
 using namespace binding;
 
 namespace {
-
-constexpr const char *ENCODING = "http://schemas.xmlsoap.org/soap/encoding/";
 
 class Dispatch : public testing::Test {
 protected:
@@ -223,45 +223,6 @@ TEST_F(Dispatch, elements_nobody_asked_for_are_known_by_type_name_or_id)
         EXPECT_EQ(c.type, type);
         EXPECT_EQ(c.error, ctx.error);
     }
-}
-
-TEST_F(Dispatch, encoded_messages_carry_shared_objects_behind_and_find_them_again)
-{
-    protocol__Contact contact;
-    std::string name = "shared";
-    contact.name = &name;
-    protocol__Identity identity;
-    identity.name = &name;
-    protocolProfile__ProfileContent profile;
-    profile.identity = &identity;
-    profile.contact = {&contact, &contact};
-
-    ctx.output_mode = MODE_BARE_XML | MODE_BUFFERED;
-    soap_reset_call(&ctx);
-    ctx.soap_version = 1;
-    ctx.encoding_style = ENCODING;
-    profile.soap_serialize(&ctx);
-    soap_send_begin(&ctx);
-    ctx.namespace_state = 1;
-    ASSERT_EQ(0, profile.soap_put(&ctx, "profile", ""));
-    soap_send_finish(&ctx);
-    const std::string text = ctx.sent();
-    EXPECT_NE(std::string::npos, text.find("</profile><")) << text;
-
-    ctx.encoding_style = nullptr;
-    receive(text);
-    protocolProfile__ProfileContent back;
-    back.soap_default(&ctx);
-    ASSERT_NE(nullptr, back.soap_get(&ctx, "profile", nullptr)) << ctx.error << " " << text;
-    ASSERT_EQ(0, soap_element_in_end(&ctx, "all")) << text;
-    ASSERT_EQ(0, soap_forward_resolve(&ctx)) << text;
-    ASSERT_EQ(2u, back.contact.size());
-    ASSERT_NE(nullptr, back.contact[0]);
-    EXPECT_EQ(back.contact[0], back.contact[1]);
-    ASSERT_NE(nullptr, back.identity);
-    ASSERT_NE(nullptr, back.identity->name);
-    EXPECT_EQ("shared", *back.identity->name);
-    EXPECT_EQ(back.identity->name, back.contact[0]->name);
 }
 
 } // namespace

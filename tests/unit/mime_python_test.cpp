@@ -9,12 +9,9 @@ namespace {
 
 std::string hex(const std::string &bytes)
 {
-    static const char DIGITS[] = "0123456789abcdef";
     std::string text;
-    for (const char c : bytes) {
-        text += DIGITS[static_cast<unsigned char>(c) >> 4];
-        text += DIGITS[c & 15];
-    }
+    for (const char c : bytes)
+        text += {"0123456789abcdef"[static_cast<unsigned char>(c) >> 4], "0123456789abcdef"[c & 15]};
     return text;
 }
 
@@ -54,92 +51,57 @@ TEST(python_email, takes_apart_what_is_sent)
     const std::string nothing_special = "x";
     const std::string wanted =
         "a/b <a>|" + hex(text) + "|c/d <id2>|" + hex(binary) + "|e/f <x@y>|" + hex(nothing_special);
-    struct form {
-        std::uint32_t mode;
-        const char *start, *summary;
-    };
-    const form forms[] = {
-        {MODE_MTOM, nullptr, "application/xop+xml|application/xop+xml <message@zuv_client_pro>|"},
-        {MODE_MTOM, "<\"the \\message\"@x>",
-         "application/xop+xml|application/xop+xml <\"the \\message\"@x>|"},
-    };
     std::vector<std::string> requests, expected;
-    for (const form &f : forms) {
-        memory_wire wire(0, f.mode | MODE_BUFFERED);
-        if (f.start != nullptr)
-            soap_mime_start(&wire, nullptr, f.start);
+    for (const char *start : {"<message@zuv_client_pro>", "<\"the \\message\"@x>"}) {
+        memory_wire wire(0, MODE_MTOM | MODE_BUFFERED);
+        if (requests.size() == 1) // the first is that of the library
+            soap_mime_start(&wire, nullptr, start);
         ASSERT_EQ(send_request(wire, {make_value(text, "cid:a", "a/b"), make_value(binary, nullptr, "c/d"),
                                       make_value(nothing_special, "cid:x@y", "e/f")}),
                   0);
         requests.push_back(hex(wire.sent()));
-        expected.push_back(f.summary + wanted);
+        expected.push_back("application/xop+xml|application/xop+xml " + (start + ("|" + wanted)));
     }
     EXPECT_EQ(python_batch(TAKE_APART, requests), expected);
 }
 
 // Prints messages: their HTTP form in hexadecimal, and what has to be read. The parts stand in every order,
-// with and without start, preamble and epilogue, with line feeds alone in the heads, and with parameters that
-// are hard to split.
+// with and without start, preamble and epilogue, and with parameters that are hard to split.
 constexpr char COMPOSE[] = R"(
-import itertools, random
+import itertools
 from email import policy
 from email.mime.application import MIMEApplication
 from email.mime.multipart import MIMEMultipart
 from email.mime.nonmultipart import MIMENonMultipart
 from email.encoders import encode_base64, encode_noop, encode_quopri
-random.seed(1)
-def envelope(hrefs):
-    return ('<SOAP-ENV:Envelope xmlns:SOAP-ENV="http://schemas.xmlsoap.org/soap/envelope/"><SOAP-ENV:Body>'
-            + "".join('<data href="%s"/>' % h for h in hrefs) + "</SOAP-ENV:Body></SOAP-ENV:Envelope>")
-def part(kind, id, data, encoder):
-    made = MIMEApplication(data, kind, encoder)
-    made["Content-ID"] = id
-    return made
-def root(hrefs):
-    made = MIMENonMultipart("text", "xml")
-    made.set_payload(envelope(hrefs))
-    made["Content-ID"] = '<the "root";x="y"@z>'
-    return made
-plain = part("x-plain", "<a@b>", b"plain bytes, two\r\nlines", encode_noop)
-base64 = part("x-base64", "<b c>", bytes(range(256)), encode_base64)
-quoted = part("x-quoted", "<q>", "caf\u00e9 = 1\r\n".encode(), encode_quopri)
 hrefs = ["cid:a%40b", "cid:b%20c", "q"]
-parts = [root(hrefs), plain, base64, quoted]
+parts = [MIMENonMultipart("text", "xml"),
+         MIMEApplication(b"plain bytes, two\r\nlines", "x-plain", encode_noop),
+         MIMEApplication(bytes(range(256)), "x-base64", encode_base64),
+         MIMEApplication("caf\u00e9 = 1\r\n".encode(), "x-quoted", encode_quopri)]
+parts[0].set_payload(
+    '<SOAP-ENV:Envelope xmlns:SOAP-ENV="http://schemas.xmlsoap.org/soap/envelope/"><SOAP-ENV:Body>'
+    + "".join('<data href="%s"/>' % h for h in hrefs) + "</SOAP-ENV:Body></SOAP-ENV:Envelope>")
+for part, id in zip(parts, ['<the "root";x="y"@z>', "<a@b>", "<b c>", "<q>"]):
+    part["Content-ID"] = id
 def crlf(text):
-    return "\r\n".join(text.split("\r\n") if "\r\n" in text else text.split("\n"))
-def expectation():
-    return "".join("[%s %s %s]" % (h, p["Content-Type"], crlf(p.get_payload()))
-                   for h, p in zip(hrefs, parts[1:]))
-def compose(order, preamble, epilogue, boundary, start, head_end):
-    out = [preamble]
-    for p in order:
-        head = head_end.join("%s: %s" % item for item in p.items())
-        out.append("--%s%s%s%s%s%s" % (boundary, head_end, head, head_end, head_end, crlf(p.get_payload())))
-    body = "\r\n".join(o for o in out if o is not None) + "\r\n--%s--%s" % (boundary, epilogue)
-    escaped = lambda text: text.replace("\\", "\\\\").replace('"', '\\"')
-    kind = 'multipart/related; type="text/xml; a=\\"b\\", boundary=none"; boundary="%s"' % escaped(boundary)
-    if start:
-        kind += '; start="%s"' % escaped(order[order.index(parts[0])]["Content-ID"])
-    return "HTTP/1.1 200 OK\r\nContent-Type: %s\r\n\r\n" % kind + body
-def show(message):
-    print(message.encode("utf-8", "surrogateescape").hex() + " " + expectation().encode().hex())
+    return "\r\n".join(text.replace("\r\n", "\n").split("\n"))
+expected = "".join("[%s %s %s]" % (h, p["Content-Type"], crlf(p.get_payload())) for h, p in zip(hrefs, parts[1:]))
+boundaries = itertools.cycle(["b", "===============1234567890==", "a b'()+_,-./:=? c", "x" * 70])
 for order in itertools.permutations(parts):
-    for preamble, epilogue in ((None, ""), ("A preamble\r\n -- with dashes", "\r\nand an epilogue\r\n--b--")):
-        boundary = random.choice(["b", "===============1234567890==", "a b'()+_,-./:=? c", "x" * 70])
-        show(compose(list(order), preamble, epilogue, boundary, True, random.choice(["\r\n", "\n"])))
-        if order[0] is parts[0]:
-            show(compose(list(order), preamble, epilogue, boundary, False, "\r\n"))
-# As the package itself puts a message together.
-message = MIMEMultipart("related", type="text/xml", start=parts[0]["Content-ID"])
-for p in parts:
-    message.attach(p)
-show("HTTP/1.1 200 OK\r\n" + message.as_bytes(policy=policy.HTTP).decode("ascii", "surrogateescape"))
+    for ends in ((None, None), ("A preamble\r\n -- with dashes", "\r\nand an epilogue\r\n--b--")):
+        for start in [{"start": parts[0]["Content-ID"]}] + [{}] * (order[0] is parts[0]):
+            message = MIMEMultipart("related", next(boundaries), order, type='text/xml; a="b", boundary=none',
+                                    **start)
+            message.preamble, message.epilogue = ends
+            sent = message.as_bytes(policy=policy.HTTP)
+            print((b"HTTP/1.1 200 OK\r\n" + sent).hex() + " " + expected.encode().hex())
 )";
 
 TEST(python_email, is_read)
 {
     const std::vector<std::string> composed = python_batch(COMPOSE, {});
-    ASSERT_EQ(composed.size(), 24U * 2 + 6 * 2 + 1);
+    ASSERT_EQ(composed.size(), 24U * 2 + 6 * 2);
     for (const std::string &line : composed) {
         const std::string message = unhex(line.substr(0, line.find(' ')));
         const std::string expected = unhex(line.substr(line.find(' ') + 1));

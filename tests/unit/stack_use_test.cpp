@@ -31,8 +31,8 @@ std::size_t stack_used_by(std::function<void()> work)
     void *memory =
         mmap(nullptr, STACK_SIZE, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS | MAP_STACK, -1, 0);
     EXPECT_NE(MAP_FAILED, memory);
-    auto *const stack = static_cast<unsigned char *>(memory);
-    std::fill_n(stack, STACK_SIZE, PAINT);
+    auto *const stack = static_cast<unsigned char *>(memory), *const end = stack + STACK_SIZE;
+    std::fill(stack, end, PAINT);
     pthread_attr_t attributes;
     pthread_attr_init(&attributes);
     EXPECT_EQ(0, pthread_attr_setstack(&attributes, stack, STACK_SIZE));
@@ -44,11 +44,9 @@ std::size_t stack_used_by(std::function<void()> work)
     EXPECT_EQ(0, pthread_create(&thread, &attributes, run, &work));
     EXPECT_EQ(0, pthread_join(thread, nullptr));
     pthread_attr_destroy(&attributes);
-    const unsigned char *deepest =
-        std::find_if(stack, stack + STACK_SIZE, [](unsigned char byte) { return byte != PAINT; });
-    const auto used = static_cast<std::size_t>(stack + STACK_SIZE - deepest);
+    const auto deepest = std::find_if(stack, end, [](unsigned char byte) { return byte != PAINT; });
     munmap(memory, STACK_SIZE);
-    return used;
+    return static_cast<std::size_t>(end - deepest);
 }
 
 std::string repeated(const std::string &text, std::size_t times)
@@ -78,25 +76,21 @@ int set(protocolProfile__ProfileContent &request, const std::string &content)
     return proxy.set(&request, response);
 }
 
-std::size_t bytes_per_level(const std::function<void(std::size_t)> &with_levels)
+// A level more costs no more than the limit.
+void expect_bounded(const char *rule, const std::function<void(std::size_t)> &with_levels)
 {
+#if defined(ZUV_SANITIZED) || !defined(__OPTIMIZE__)
+    GTEST_SKIP() << "frames are larger in this build";
+#endif
     constexpr std::size_t FEW = 500, MANY = 1000;
     const std::size_t few = stack_used_by([&] { with_levels(FEW); });
     const std::size_t many = stack_used_by([&] { with_levels(MANY); });
-    return (std::max(many, few) - few) / (MANY - FEW);
+    const std::size_t bytes = (std::max(many, few) - few) / (MANY - FEW);
+    EXPECT_LE(bytes, LEVEL_LIMIT) << rule;
+    std::printf("%s: %zu bytes of stack a level\n", rule, bytes);
 }
 
-class StackUse : public testing::Test {
-protected:
-    void SetUp() override
-    {
-#if defined(ZUV_SANITIZED) || !defined(__OPTIMIZE__)
-        GTEST_SKIP() << "frames are larger in this build";
-#endif
-    }
-};
-
-TEST_F(StackUse, of_reading_one_level)
+TEST(StackUse, of_reading_one_level)
 {
     static const struct {
         const char *rule, *begin, *end, *around_begin, *around_end;
@@ -105,28 +99,24 @@ TEST_F(StackUse, of_reading_one_level)
         {"objects of a pointer", "<c:address>", "</c:address>", "<c:contact>", "</c:contact>"},
         {"elements that nobody knows", "<p:unknown>", "</p:unknown>", "", ""},
     };
-    for (const auto &c : cases) {
-        protocolProfile__ProfileContent request;
-        const std::size_t bytes = bytes_per_level([&](std::size_t levels) {
+    for (const auto &c : cases)
+        expect_bounded(c.rule, [&c](std::size_t levels) {
+            protocolProfile__ProfileContent request;
             EXPECT_EQ(0, set(request, c.around_begin + repeated(c.begin, levels) + repeated(c.end, levels) +
                                           c.around_end))
                 << c.rule;
         });
-        EXPECT_LE(bytes, LEVEL_LIMIT) << c.rule;
-        std::printf("%s: %zu bytes of stack a level\n", c.rule, bytes);
-    }
 }
 
-TEST_F(StackUse, of_writing_one_level)
+TEST(StackUse, of_writing_one_level)
 {
-    const std::size_t list = bytes_per_level([](std::size_t levels) {
+    expect_bounded("a list", [](std::size_t levels) {
         std::deque<protocolProfile__ProfileContent> profiles(levels);
         for (std::size_t i = 1; i < levels; ++i)
             profiles[i - 1].profile = {&profiles[i]};
         EXPECT_EQ(0, set(profiles[0], ""));
     });
-    EXPECT_LE(list, LEVEL_LIMIT);
-    const std::size_t pointer = bytes_per_level([](std::size_t levels) {
+    expect_bounded("a pointer", [](std::size_t levels) {
         std::deque<protocol__Address> addresses(levels);
         for (std::size_t i = 1; i < levels; ++i)
             addresses[i - 1].address = &addresses[i];
@@ -136,8 +126,6 @@ TEST_F(StackUse, of_writing_one_level)
         request.contact = {&contact};
         EXPECT_EQ(0, set(request, ""));
     });
-    EXPECT_LE(pointer, LEVEL_LIMIT);
-    std::printf("a list: %zu, a pointer: %zu bytes of stack a level\n", list, pointer);
 }
 
 } // namespace

@@ -1,14 +1,11 @@
 // xml_reference_test.cpp - the reader beside another parser: both must see the same document.
 //
-// Documents come from a small random grammar with fixed seeds, and from the XML files that the system has,
-// most of them style sheets of a text processor. Texts, attribute values and the order of tags are compared.
+// Documents come from a small random grammar with fixed seeds. Texts, attribute values and the order of tags
+// are compared.
 // Left out of account: line ends and white space in attributes, which the reader keeps as they stand, and
 // entities that a document declares for itself.
-#include <filesystem>
-#include <fstream>
 #include <random>
 #include <set>
-#include <sstream>
 
 #include <libxml/xmlreader.h>
 
@@ -20,10 +17,12 @@ using reader_input::reception;
 
 namespace {
 
-void put_attributes(std::string &events, const std::set<std::string> &attributes)
+std::string joined(const std::set<std::string> &attributes)
 {
+    std::string text;
     for (const std::string &attribute : attributes)
-        events += " " + attribute;
+        text += " " + attribute;
+    return text;
 }
 
 std::string blanks_unified(std::string text)
@@ -52,9 +51,7 @@ bool reference_events(const std::string &document, std::string &events)
             while (xmlTextReaderMoveToNextAttribute(reader) == 1)
                 attributes.insert(text_of(xmlTextReaderConstName(reader)) + "=" +
                                   blanks_unified(text_of(xmlTextReaderConstValue(reader))));
-            events += "<" + name;
-            put_attributes(events, attributes);
-            events += empty ? "/>" : ">";
+            events += "<" + name + joined(attributes) + (empty ? "/>" : ">");
             break;
         }
         case XML_READER_TYPE_END_ELEMENT:
@@ -74,25 +71,17 @@ bool reference_events(const std::string &document, std::string &events)
     return more == 0;
 }
 
-void put_code(std::string &events, std::int32_t token)
-{
-    char bytes[6];
-    events.append(bytes, utf8_encode(token_code(token), bytes));
-}
-
 bool put_start(soap *ctx, std::string &events)
 {
     ctx->look_ahead = XML_START;
     if (soap_element_in_begin(ctx, nullptr, 1, nullptr) != 0)
         return false;
-    events += "<" + std::string(ctx->tag);
     std::set<std::string> attributes;
     for (const soap_attribute *p = ctx->attribute_list; p != nullptr; p = p->next) {
         if (p->visible == 2)
             attributes.insert(std::string(p->name) + "=" + blanks_unified(p->value));
     }
-    put_attributes(events, attributes);
-    events += ctx->has_body != 0 ? ">" : "/>";
+    events += "<" + std::string(ctx->tag) + joined(attributes) + (ctx->has_body != 0 ? ">" : "/>");
     const char *text;
     std::size_t length;
     if (ctx->has_body != 0 && xml_text_in_place(ctx, &text, &length))
@@ -117,7 +106,8 @@ bool reader_events(soap *ctx, std::string &events)
                 return false;
             events += "</" + std::string(ctx->tag) + ">";
         } else if (ctx->nesting_level != 0) {
-            put_code(events, token);
+            char bytes[6];
+            events.append(bytes, utf8_encode(token_code(token), bytes));
         }
     }
 }
@@ -127,22 +117,20 @@ void compare(const std::string &document, const std::string &expected, std::size
 {
     reception in(document, first, piece, MODE_UTF_STRINGS);
     std::string events;
-    EXPECT_TRUE(reader_events(in.context(), events));
-    if (events == expected)
-        return;
+    EXPECT_TRUE(reader_events(in, events));
     const auto parted = std::mismatch(events.begin(), events.end(), expected.begin(), expected.end());
     const auto from =
         static_cast<std::size_t>(std::max<std::ptrdiff_t>(parted.first - events.begin() - 60, 0));
-    ADD_FAILURE() << "reader:    " << events.substr(from, 120)
-                  << "\nreference: " << expected.substr(from, 120) << "\nfirst " << first << " piece "
-                  << piece;
+    EXPECT_TRUE(events == expected) << "reader:    " << events.substr(from, 120)
+                                    << "\nreference: " << expected.substr(from, 120) << "\nfirst " << first
+                                    << " piece " << piece;
 }
 
 // ------------------------------------------------------------------------------------------ random documents
 
 class grammar {
 public:
-    explicit grammar(unsigned seed) : random_(seed) {}
+    grammar(unsigned seed, unsigned children) : random_(seed), children_(children) {} // of the root
 
     std::string document()
     {
@@ -202,66 +190,30 @@ private:
         const std::string tag = name();
         const std::string scope = depth == 0 ? " xmlns:x='urn:one' xmlns:y=\"urn:two\"" : "";
         std::string text = "<" + tag + scope + attributes() + blank();
-        if (below(5) == 0)
+        if (depth != 0 && below(5) == 0)
             return text + "/>";
         text += ">";
-        for (unsigned i = depth < 6 ? below(5) : 0; i != 0; --i)
+        for (unsigned i = depth == 0 ? children_ : depth < 6 ? below(5) : 0; i != 0; --i)
             text += characters(false) + element(depth + 1);
         return text + characters(false) + "</" + tag + blank() + ">";
     }
 
     std::mt19937 random_;
+    unsigned children_;
 };
 
 TEST(XmlReference, random_documents_read_the_same)
 {
-    int compared = 0;
     for (unsigned seed = 1; seed <= 400; ++seed) {
-        const std::string document = grammar(seed).document();
+        const std::string document = grammar(seed, seed % 50 == 0 ? 1000 : seed % 5).document();
         std::string expected;
         ASSERT_TRUE(reference_events(document, expected)) << seed << ": " << document;
+        EXPECT_EQ(document.size() > 2 * SOAP_BUFFER_SIZE, seed % 50 == 0);
         SCOPED_TRACE(seed);
         compare(document, expected, SOAP_BUFFER_SIZE, SOAP_BUFFER_SIZE);
         compare(document, expected, 1, 1);
         compare(document, expected, seed % 97 + 1, seed % 13 + 2);
-        ++compared;
     }
-    EXPECT_EQ(compared, 400);
-}
-
-// ------------------------------------------------------------------------------------------ files
-
-bool comparable(const std::string &document)
-{
-    return document.find("<!ENTITY") == std::string::npos && document.find('\r') == std::string::npos &&
-           document.find("encoding=\"UTF-16") == std::string::npos && document.size() < 5000000;
-}
-
-TEST(XmlReference, files_of_the_system_read_the_same)
-{
-    int compared = 0;
-    for (const char *place : {"/usr/share/xml", "/usr/share/mime/packages", "/usr/share/metainfo"}) {
-        std::error_code none;
-        for (const auto &entry : std::filesystem::recursive_directory_iterator(place, none)) {
-            const std::string kind = entry.path().extension();
-            if ((kind != ".xml" && kind != ".xsl") || !entry.is_regular_file(none))
-                continue;
-            std::ostringstream content;
-            content << std::ifstream(entry.path(), std::ios::binary).rdbuf();
-            const std::string document = content.str();
-            std::string expected;
-            if (!comparable(document) || !reference_events(document, expected))
-                continue;
-            SCOPED_TRACE(entry.path());
-            compare(document, expected, SOAP_BUFFER_SIZE, SOAP_BUFFER_SIZE);
-            compare(document, expected, 1000, 1447);
-            ++compared;
-        }
-    }
-    std::printf("%d files compared\n", compared);
-    if (!std::filesystem::exists("/usr/share/xml/docbook"))
-        GTEST_SKIP() << "the package docbook-xsl, which brings most of the files, is not installed";
-    EXPECT_GT(compared, 300);
 }
 
 } // namespace
