@@ -8,10 +8,9 @@
 #include <zuv_client_pro/StatusReportSoapBindingProxy.h>
 #include <zuv_client_pro/soap_attachment.h>
 #include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_log.h>
 
+#include "service/port_client.h"
 #include "service/raw_client.h"
-#include "service/service_process.h"
 #include "support/host_streams.h"
 
 using namespace service_test;
@@ -40,16 +39,11 @@ constexpr form FORMS[] = {
 };
 
 // A host that sends streams beside its status reports and takes what comes back.
-class stream_client {
+class stream_client : public port_client<StatusReportSoapBindingProxy> {
 public:
     stream_client(const service_process &service, std::uint32_t form_mode)
-        : form_(form_mode), url_(service.url("StatusReport")),
-          proxy(static_cast<int>(MODE_KEEP_ALIVE | MODE_UTF_STRINGS),
-                static_cast<int>(MODE_KEEP_ALIVE | MODE_UTF_STRINGS | form_mode))
+        : port_client(service, "StatusReport", form_mode), form_(form_mode)
     {
-        proxy.endpoint = url_.c_str();
-        soap_log_set_received(&proxy, nullptr);
-        soap_log_set_sent(&proxy, nullptr);
         host.serve(proxy);
     }
 
@@ -61,20 +55,6 @@ public:
             ASSERT_EQ(soap_mime_attach(&proxy, handle, size, MIME_BINARY, "a/b", id, nullptr, nullptr), 0);
         else
             ASSERT_EQ(soap_dime_attach(&proxy, handle, size, "a/b", id, 0, nullptr), 0);
-    }
-
-    template <class Request, class Response>
-    const protocolStatusReport__StatusReportContent *
-    call(int (StatusReportSoapBindingProxy::*operation)(Request *, Response &), Request &request)
-    {
-        header_.targetURI = &target;
-        if (target.empty())
-            proxy.soap_noheader();
-        else
-            proxy.soap_header(&header_);
-        Response response{};
-        error = (proxy.*operation)(&request, response);
-        return response.result;
     }
 
     // What came with the last answer under a reference; null if nothing did.
@@ -89,16 +69,10 @@ public:
         return nullptr;
     }
 
+    stream_host host;
+
 private:
     std::uint32_t form_;
-    std::string url_;
-    protocol__Header header_;
-
-public:
-    stream_host host;
-    StatusReportSoapBindingProxy proxy;
-    std::string target;
-    int error = 0;
 };
 
 std::size_t files_in(const std::string &directory)
@@ -165,7 +139,7 @@ TEST(Attachments, ComeBackAsTheyWereInEveryForm)
         EXPECT_EQ(*created->attachment.at(0)->size, "300001");
         EXPECT_EQ(*created->attachment.at(0)->state, protocol__AttachmentState::complete);
         EXPECT_EQ(client.received(created->attachment.at(0)->dataHandler), nullptr) << "the client has it";
-        client.target = created->thisURI.at(0);
+        const std::string target = created->thisURI.at(0);
         const std::string port = *created->attachment.at(0)->dataPort.at(0)->dataURI;
         EXPECT_EQ(files_in(directory), 2u);
         EXPECT_EQ(contents(directory + port.substr(port.rfind('/'))), large.data);
@@ -173,7 +147,7 @@ TEST(Attachments, ComeBackAsTheyWereInEveryForm)
         // Whole messages one after the other on one connection, so nothing of an attachment is left over.
         _protocolStatusReport__getRequest get;
         for (int round = 0; round < 2; ++round) {
-            const auto *got = client.call(&StatusReportSoapBindingProxy::get, get);
+            const auto *got = client.call(&StatusReportSoapBindingProxy::get, get, target);
             ASSERT_NE(got, nullptr) << client.error;
             const protocol__Attachment &outer = *got->attachment.at(0);
             const host_stream *stream = client.received(outer.dataHandler);
@@ -189,13 +163,13 @@ TEST(Attachments, ComeBackAsTheyWereInEveryForm)
             << "those who don't ask in a form with attachments have the data port";
 
         // What a new version of the report no longer refers to is forgotten, what it refers to stays.
-        const auto *got = client.call(&StatusReportSoapBindingProxy::get, get);
+        const auto *got = client.call(&StatusReportSoapBindingProxy::get, get, target);
         ASSERT_NE(got, nullptr);
         protocolStatusReport__StatusReportContent next;
         next.attachment = {got->attachment.at(0)->attachment.at(0)};
-        ASSERT_NE(client.call(&StatusReportSoapBindingProxy::submit, next), nullptr) << client.error;
+        ASSERT_NE(client.call(&StatusReportSoapBindingProxy::submit, next, target), nullptr) << client.error;
         EXPECT_EQ(files_in(directory), 1u);
-        ASSERT_NE(client.call(&StatusReportSoapBindingProxy::remove, next), nullptr);
+        ASSERT_NE(client.call(&StatusReportSoapBindingProxy::remove, next, target), nullptr);
         EXPECT_EQ(files_in(directory), 0u);
     }
 }

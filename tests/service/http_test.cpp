@@ -32,6 +32,8 @@ TEST(Http, StatusSaysWhatBecameOfARequest)
     const std::string big(100001, ' ');
     const status_row rows[] = {
         {"a response", post("Profile", soap11(CREATE)), 200, "createResponse"},
+        {"a response in SOAP 1.2", post("Profile", soap12(CREATE)), 200,
+         "<SOAP-ENV:Envelope xmlns:SOAP-ENV=\"http://www.w3.org/2003/05/soap-envelope\""},
         {"a fault of the client in SOAP 1.1", post("Profile", unknown_get()), 500,
          "faultcode>SOAP-ENV:Client<"},
         {"an unknown operation", post("Profile", soap11("<protocolProfile:fly/>")), 500,

@@ -7,51 +7,13 @@
 #include <zuv_client_pro/InventoryReportSoapBindingProxy.h>
 #include <zuv_client_pro/StatusReportSoapBindingProxy.h>
 #include <zuv_client_pro/protocolHTTP.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_log.h>
 
+#include "service/port_client.h"
 #include "service/raw_client.h"
-#include "service/service_process.h"
 
 using namespace service_test;
 
 namespace {
-
-template <class Proxy> class port_client {
-public:
-    port_client(const service_process &service, const char *port)
-        : url_(service.url(port)), proxy(url_.c_str(), static_cast<int>(MODE_KEEP_ALIVE | MODE_UTF_STRINGS))
-    {
-        soap_log_set_received(&proxy, nullptr);
-        soap_log_set_sent(&proxy, nullptr);
-    }
-
-    // Calls an operation on a document, or on none.
-    template <class Request, class Response>
-    auto call(int (Proxy::*operation)(Request *, Response &), Request &request,
-              const std::string &target = {})
-    {
-        target_ = target;
-        header_.targetURI = &target_;
-        if (target.empty())
-            proxy.soap_noheader();
-        else
-            proxy.soap_header(&header_);
-        Response response{};
-        error = (proxy.*operation)(&request, response);
-        return response.result;
-    }
-
-    const SOAP_ENV__Detail &detail() { return *proxy.soap_fault()->detail; }
-
-private:
-    std::string url_, target_;
-    protocol__Header header_;
-
-public:
-    Proxy proxy;
-    int error = 0;
-};
 
 using status_proxy = StatusReportSoapBindingProxy;
 using status_state = protocolStatusReport__StatusReportState;
@@ -134,19 +96,15 @@ TEST(StatusReport, TakesDataThroughADataPort)
 
     // The bytes go to the data port as they are, in one piece or in chunks.
     const std::string path = path_of(*port.dataURI), bytes("\0<binary>\r\n\xFF", 12);
-    EXPECT_EQ(
-        ::exchange(service.port(), "POST " + path + " HTTP/1.1\r\nContent-Length: 12\r\n\r\n" + bytes).status,
-        200);
-    EXPECT_EQ(::exchange(service.port(), "GET " + path + " HTTP/1.1\r\n\r\n").body, bytes);
-    EXPECT_EQ(::exchange(service.port(),
-                         "POST " + path +
-                             " HTTP/1.1\r\nTransfer-Encoding: chunked\r\n\r\n3\r\nabc\r\n2\r\nde\r\n"
-                             "0\r\n\r\n")
-                  .status,
-              200);
-    EXPECT_EQ(::exchange(service.port(), "GET " + path + " HTTP/1.1\r\n\r\n").body, "abcde");
-    EXPECT_EQ(::exchange(service.port(), "POST " + path + "x HTTP/1.1\r\nContent-Length: 1\r\n\r\nx").status,
-              404);
+    const auto send = [&](const std::string &where, const std::string &rest) {
+        return ::exchange(service.port(), "POST " + where + " HTTP/1.1\r\n" + rest).status;
+    };
+    const auto kept = [&] { return ::exchange(service.port(), "GET " + path + " HTTP/1.1\r\n\r\n").body; };
+    EXPECT_EQ(send(path, "Content-Length: 12\r\n\r\n" + bytes), 200);
+    EXPECT_EQ(kept(), bytes);
+    EXPECT_EQ(send(path, "Transfer-Encoding: chunked\r\n\r\n3\r\nabc\r\n2\r\nde\r\n0\r\n\r\n"), 200);
+    EXPECT_EQ(kept(), "abcde");
+    EXPECT_EQ(send(path + "x", "Content-Length: 1\r\n\r\nx"), 404);
 
     // The client reports how the transfer goes.
     protocol__AttachStatusRequest progress;
@@ -241,8 +199,8 @@ TEST(InventoryReport, IsProcessedUntilItsDataHasArrived)
     report.attachment.clear();
     submitted = client.call(&inventory_proxy::submit, report);
     EXPECT_EQ(*submitted->state, inventory_state::complete);
-    const std::string second = submitted->thisURI.at(0);
     _protocolInventoryReport__closeRequest close;
+    const std::string second = submitted->thisURI.at(0);
     EXPECT_EQ(*client.call(&inventory_proxy::close, close, second)->state, inventory_state::closed);
 }
 

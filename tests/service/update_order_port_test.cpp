@@ -6,10 +6,9 @@
 #include <zuv_client_pro/UpdateOrderSoapBindingProxy.h>
 #include <zuv_client_pro/protocolUpdateOrderFilter.h>
 #include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_log.h>
 
+#include "service/port_client.h"
 #include "service/raw_client.h"
-#include "service/service_process.h"
 
 using namespace service_test;
 
@@ -17,27 +16,14 @@ namespace {
 
 using state = protocolUpdateOrder__UpdateOrderState;
 using order = protocolUpdateOrder__UpdateOrderContent;
+using port = UpdateOrderSoapBindingProxy;
 
 class UpdateOrder : public testing::Test {
 protected:
-    UpdateOrder() : proxy(url.c_str(), static_cast<int>(MODE_KEEP_ALIVE | MODE_UTF_STRINGS))
-    {
-        soap_log_set_received(&proxy, nullptr);
-        soap_log_set_sent(&proxy, nullptr);
-    }
-
-    const order *submit(order &o)
-    {
-        __protocolUpdateOrder__submitResponse response{};
-        proxy.soap_noheader();
-        error = proxy.submit(&o, response);
-        return response.result;
-    }
+    const order *submit(order &o) { return client.call(&port::submit, o); }
 
     service_process service{{"--account", "ada:sesame", "--account", "bob:x"}};
-    std::string url = service.url("UpdateOrder");
-    UpdateOrderSoapBindingProxy proxy;
-    int error = 0;
+    port_client<port> client{service, "UpdateOrder"};
 };
 
 } // namespace
@@ -75,26 +61,15 @@ TEST_F(UpdateOrder, TellsWhatItFoundAndDeliversIt)
     EXPECT_EQ(std::to_string(data.body.size()), *delivered.size);
 
     // The order stays as it was answered.
-    std::string uri = answered->thisURI.at(0);
-    protocol__Header header;
-    header.targetURI = &uri;
+    const std::string uri = answered->thisURI.at(0);
     _protocolUpdateOrder__getRequest get;
-    __protocolUpdateOrder__getResponse got{};
-    proxy.soap_header(&header);
-    ASSERT_EQ(proxy.get(&get, got), 0);
-    EXPECT_EQ(got.result->updateIdExpansion.size(), 3u);
+    EXPECT_EQ(client.call(&port::get, get, uri)->updateIdExpansion.size(), 3u);
     _protocolUpdateOrder__cancelRequest cancel;
-    __protocolUpdateOrder__cancelResponse cancelled{};
-    proxy.soap_header(&header);
-    ASSERT_EQ(proxy.cancel(&cancel, cancelled), 0);
-    EXPECT_EQ(*cancelled.result->state, state::cancelled);
+    EXPECT_EQ(*client.call(&port::cancel, cancel, uri)->state, state::cancelled);
     _protocolUpdateOrder__closeRequest close;
-    __protocolUpdateOrder__closeResponse closed{};
-    proxy.soap_header(&header);
-    EXPECT_EQ(proxy.close(&close, closed), SOAP_CLIENT_FAULT);
-    __protocolUpdateOrder__removeResponse removed{};
-    proxy.soap_header(&header);
-    EXPECT_EQ(proxy.remove(&o, removed), 0);
+    EXPECT_EQ(client.call(&port::close, close, uri), nullptr);
+    EXPECT_EQ(client.error, SOAP_CLIENT_FAULT);
+    EXPECT_NE(client.call(&port::remove, o, uri), nullptr);
 }
 
 TEST_F(UpdateOrder, StateSaysHowFarTheOrderCame)
@@ -114,7 +89,7 @@ TEST_F(UpdateOrder, StateSaysHowFarTheOrderCame)
     EXPECT_EQ(*answered->state, state::complete_x002enoUpdates);
     EXPECT_EQ(answered->updateIdExpansionDetail.size(), 1u);
     EXPECT_EQ(submit(bare), nullptr);
-    EXPECT_NE(proxy.soap_fault()->detail->Client_x002eInsufficientInformation, nullptr);
+    EXPECT_NE(client.detail().Client_x002eInsufficientInformation, nullptr);
 }
 
 TEST_F(UpdateOrder, TellsWhatItCannotDeliver)
@@ -162,13 +137,12 @@ TEST_F(UpdateOrder, RefusesFiltersThatItCannotJudge)
             i + 1 < deep.size() ? static_cast<protocolUpdateOrderFilter__FilterNode *>(&deep[i + 1]) : &leaf;
     filter.expression = &deep[0];
     EXPECT_EQ(submit(o), nullptr);
-    EXPECT_EQ(error, SOAP_SERVER_FAULT);
-    EXPECT_NE(proxy.soap_fault()->detail->Server_x002eUnsupportedRequest_x002eFilterExpressionTooComplex,
-              nullptr);
+    EXPECT_EQ(client.error, SOAP_SERVER_FAULT);
+    EXPECT_NE(client.detail().Server_x002eUnsupportedRequest_x002eFilterExpressionTooComplex, nullptr);
     protocolUpdateOrderFilter__FilterNode nothing;
     filter.expression = &nothing;
     EXPECT_EQ(submit(o), nullptr);
-    EXPECT_NE(proxy.soap_fault()->detail->Client_x002eMalformedRequest, nullptr);
+    EXPECT_NE(client.detail().Client_x002eMalformedRequest, nullptr);
 }
 
 TEST_F(UpdateOrder, AuthenticatesNestedRequests)
@@ -186,9 +160,9 @@ TEST_F(UpdateOrder, AuthenticatesNestedRequests)
     fourth.credentials = &lacking;
     top.authenticateRequest = {&second, &third};
     third.authenticateRequest = {&fourth};
-    __protocolUpdateOrder__authenticateResponse response{};
-    ASSERT_EQ(proxy.authenticate(&top, response), 0);
-    const auto &first = *response.result;
+    const auto *const answered = client.call(&port::authenticate, top);
+    ASSERT_NE(answered, nullptr);
+    const auto &first = *answered;
     EXPECT_TRUE(first.success);
     EXPECT_TRUE(first.error.empty());
     EXPECT_EQ(*first.credentials->username, ada);

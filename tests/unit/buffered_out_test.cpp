@@ -174,19 +174,6 @@ TEST(buffered_out, an_uncounted_direct_message_to_a_socket_is_stored)
     wire.socket = -1;
 }
 
-TEST(buffered_out, literal_messages_are_trees_unless_a_graph_is_asked_for)
-{
-    memory_wire wire(0, MODE_BUFFERED);
-    wire.encoding_style = nullptr;
-    soap_count_begin(&wire);
-    EXPECT_TRUE(wire.mode & SOAP_XML_TREE);
-    wire.output_mode |= SOAP_XML_GRAPH;
-    soap_count_begin(&wire);
-    EXPECT_FALSE(wire.mode & SOAP_XML_TREE);
-    soap_send_begin(&wire);
-    EXPECT_FALSE(wire.mode & SOAP_XML_TREE);
-}
-
 TEST(buffered_out, the_buffer_leaves_when_it_is_exactly_full)
 {
     memory_wire wire(0, MODE_BUFFERED);

@@ -67,26 +67,12 @@ TEST_F(CallCycle, goes_to_the_default_endpoint_until_one_is_given_and_then_stays
     EXPECT_EQ("http://127.0.0.1:9080/zuv/v1.0/services/Profile", wire.opened_at);
     wire.answers.push_back(http_answer(envelope(OK)));
     EXPECT_EQ(0, proxy._get("http://one.example/x", nullptr, &request, response));
-    EXPECT_EQ("http://one.example/x", wire.opened_at);
-    EXPECT_EQ(0, get(OK));
+    wire.answers.push_back(http_answer(envelope(OK)));
+    EXPECT_EQ(0, proxy.get(nullptr, response));
+    EXPECT_NE(std::string::npos, wire.sent.find("<SOAP-ENV:Body></SOAP-ENV:Body>")) << "a null request";
     EXPECT_EQ("http://one.example/x", wire.opened_at);
     proxy.destroy();
     EXPECT_STREQ("http://one.example/x", proxy.endpoint);
-}
-
-TEST_F(CallCycle, tries_the_endpoints_of_a_list_in_turn_on_connection_errors_only)
-{
-    proxy.on_open = [](soap *ctx, const char *endpoint, const char *, int) {
-        if (std::string(endpoint) == "http://down/") {
-            ctx->error = SOAP_TCP_ERROR;
-            return -1;
-        }
-        return CALL_WIRE_SOCKET;
-    };
-    wire.answers.push_back(http_answer(envelope(OK)));
-    EXPECT_EQ(0, proxy._get("http://down/ http://up/ http://never/", nullptr, &request, response));
-    EXPECT_NE(std::string::npos, wire.sent.find("Host: up\r\n"));
-    EXPECT_EQ(SOAP_TCP_ERROR, proxy._get("http://down/ http://down/", nullptr, &request, response));
 }
 
 TEST_F(CallCycle, keeps_a_connection_when_asked_and_only_after_a_whole_answer)
@@ -113,13 +99,6 @@ TEST_F(CallCycle, keeps_a_connection_when_asked_and_only_after_a_whole_answer)
     wire.answers.push_back(http_answer(envelope(OK), "200 OK", "Connection: close\r\n"));
     EXPECT_EQ(0, proxy.get(&request, response));
     EXPECT_EQ(-1, proxy.socket);
-}
-
-TEST_F(CallCycle, a_null_request_writes_no_element)
-{
-    wire.answers.push_back(http_answer(envelope(OK)));
-    EXPECT_EQ(0, proxy.get(nullptr, response));
-    EXPECT_NE(std::string::npos, wire.sent.find("<SOAP-ENV:Body></SOAP-ENV:Body>"));
 }
 
 TEST_F(CallCycle, maps_fault_codes_in_both_versions)
@@ -233,11 +212,11 @@ TEST_F(CallCycle, sends_a_received_header_back_until_told_otherwise)
 
 TEST_F(CallCycle, answers_outlive_later_calls_until_destroy)
 {
-    ASSERT_EQ(0, get("<p:getResponse><p:profileAuthority>first</p:profileAuthority></p:getResponse>"));
+    ASSERT_EQ(0, get(OK));
     const protocolProfile__ProfileContent *first = response.result;
-    ASSERT_EQ(0, get("<p:getResponse><p:profileAuthority>second</p:profileAuthority></p:getResponse>"));
-    EXPECT_EQ("first", *first->profileAuthority);
-    EXPECT_EQ("second", *response.result->profileAuthority);
+    ASSERT_EQ(0, get("<p:getResponse><p:thisURI>urn:2</p:thisURI></p:getResponse>"));
+    EXPECT_EQ("urn:1", first->thisURI.at(0));
+    EXPECT_EQ("urn:2", response.result->thisURI.at(0));
 }
 
 TEST_F(CallCycle, reads_the_same_at_every_size_of_a_receive)
@@ -253,30 +232,39 @@ TEST_F(CallCycle, reads_the_same_at_every_size_of_a_receive)
     }
 }
 
+TEST_F(CallCycle, an_answer_cut_at_any_byte_costs_the_connection)
+{
+    proxy.input_mode = proxy.output_mode = MODE_KEEP_ALIVE;
+    const std::string whole = http_answer(envelope(OK));
+    // From here on the answer is there; what lacks is the end of the framing.
+    const std::size_t sufficient = whole.find("Envelope>", whole.find("</E:Body>")) + 9;
+    ASSERT_EQ(0, get(OK));
+    for (std::size_t cut = 1; cut < whole.size(); ++cut) {
+        wire.answers.push_back(whole.substr(0, cut));
+        ASSERT_EQ(cut >= sufficient, proxy.get(&request, response) == 0) << "cut at " << cut;
+        wire.opened = 0;
+        ASSERT_EQ(0, get(OK));
+        ASSERT_EQ(1, wire.opened) << "cut at " << cut;
+    }
+}
+
 TEST_F(CallCycle, counting_and_sending_give_the_same_bytes_in_every_framing)
 {
-    std::string text(200000, 'x');
+    std::string text(200000, 'x'), first;
     protocolProfile__ProfileContent document;
     document.profileAuthority = &text;
-    std::string bodies[3];
-    const std::uint32_t modes[] = {MODE_BUFFERED, MODE_STORE, MODE_CHUNKED};
-    for (int i = 0; i < 3; ++i) {
+    for (const std::uint32_t mode : {MODE_BUFFERED, MODE_STORE}) {
         wire.sent.clear();
-        proxy.output_mode = modes[i];
+        proxy.output_mode = mode;
         wire.answers.push_back(http_answer(envelope("<p:setResponse/>")));
         __protocolProfile__setResponse set;
         ASSERT_EQ(0, proxy.set(&document, set));
-        const std::size_t end = wire.sent.find("\r\n\r\n");
-        bodies[i] = wire.sent.substr(end + 4);
-        if (modes[i] == MODE_CHUNKED) {
-            EXPECT_NE(std::string::npos, wire.sent.find("Transfer-Encoding: chunked\r\n"));
-        } else {
-            EXPECT_NE(std::string::npos,
-                      wire.sent.find("Content-Length: " + std::to_string(bodies[i].size()) + "\r\n"));
-        }
+        const std::string body = wire.sent.substr(wire.sent.find("\r\n\r\n") + 4);
+        EXPECT_NE(std::string::npos,
+                  wire.sent.find("Content-Length: " + std::to_string(body.size()) + "\r\n"));
+        EXPECT_TRUE(first.empty() || first == body);
+        first = body;
     }
-    EXPECT_EQ(bodies[0], bodies[1]);
-    EXPECT_GT(bodies[2].size(), bodies[0].size());
 }
 
 TEST_F(CallCycle, an_http_error_is_the_calls_error_with_its_text)
@@ -305,18 +293,25 @@ TEST(Proxy, has_the_same_start_from_every_constructor)
 {
     const ProfileSoapBindingProxy plain, one(MODE_KEEP_ALIVE), two(MODE_STRICT, MODE_CHUNKED),
         at("http://h/"), at_mode("http://h/", MODE_STORE);
-    EXPECT_EQ(nullptr, plain.endpoint);
-    EXPECT_EQ(MODE_KEEP_ALIVE, one.input_mode);
-    EXPECT_EQ(MODE_KEEP_ALIVE, one.output_mode);
-    EXPECT_EQ(MODE_STRICT, two.input_mode);
-    EXPECT_EQ(MODE_CHUNKED, two.output_mode);
-    EXPECT_STREQ("http://h/", at.endpoint);
-    EXPECT_STREQ("http://h/", at_mode.endpoint);
-    EXPECT_EQ(MODE_STORE, at_mode.input_mode);
-    const soap &engine = two;
-    const ProfileSoapBindingProxy copy(engine);
-    EXPECT_EQ(MODE_CHUNKED, copy.output_mode);
-    EXPECT_EQ(two.namespaces, copy.namespaces);
+    const ProfileSoapBindingProxy copy(static_cast<const soap &>(two));
+    const struct {
+        const ProfileSoapBindingProxy &proxy;
+        const char *endpoint;
+        std::uint32_t input, output;
+    } rows[] = {
+        {plain, nullptr, 0, 0},
+        {one, nullptr, MODE_KEEP_ALIVE, MODE_KEEP_ALIVE},
+        {at, "http://h/", 0, 0},
+        {two, nullptr, MODE_STRICT, MODE_CHUNKED},
+        {at_mode, "http://h/", MODE_STORE, MODE_STORE},
+        {copy, nullptr, MODE_STRICT, MODE_CHUNKED},
+    };
+    for (const auto &row : rows) {
+        EXPECT_STREQ(row.endpoint, row.proxy.endpoint);
+        EXPECT_EQ(row.input, row.proxy.input_mode);
+        EXPECT_EQ(row.output, row.proxy.output_mode);
+        EXPECT_EQ(plain.namespaces, row.proxy.namespaces);
+    }
     EXPECT_EQ(2, copy.state);
 }
 

@@ -137,19 +137,6 @@ TEST(ErrorText, ConstraintTextNamesTheElementIfThereIsOne)
         << "cut to the buffer";
 }
 
-TEST(ErrorText, EndOfInputNamesTheCause)
-{
-    soap ctx;
-    ctx.recv_timeout = 5;
-    EXPECT_STREQ(soap_eof_text(&ctx), "Operation interrupted or timed out (5 s receive delay)");
-    ctx.recv_timeout = -500;
-    ctx.send_timeout = INT_MIN;
-    EXPECT_STREQ(soap_eof_text(&ctx),
-                 "Operation interrupted or timed out (500us receive delay) (2147483648us send delay)");
-    ctx.errno_value = ECONNRESET;
-    EXPECT_STREQ(soap_eof_text(&ctx), std::strerror(ECONNRESET));
-}
-
 TEST(Fault, TheCodeFollowsTheVersionUnlessTheErrorHasItsOwn)
 {
     struct code_case {
