@@ -21,12 +21,11 @@ namespace {
 
 TEST(parse_endpoint, splits_urls)
 {
-    struct url_case {
+    static const struct {
         const char *url, *host;
         int port;
         const char *path;
-    };
-    static const url_case cases[] = {
+    } cases[] = {
         {"http://host/a/b", "host", 80, "/a/b"},
         {"https://host/a", "host", 443, "/a"},
         {"HTTPS://host", "host", 443, "/"},
@@ -44,7 +43,7 @@ TEST(parse_endpoint, splits_urls)
         {"", "", 80, "/"},
     };
     memory_wire wire;
-    for (const url_case &c : cases) {
+    for (const auto &c : cases) {
         soap_parse_endpoint(&wire, c.url);
         EXPECT_STREQ(wire.endpoint, c.url);
         EXPECT_STREQ(wire.host, c.host) << c.url;
@@ -178,21 +177,21 @@ TEST(request_head, is_written_line_by_line)
         EXPECT_EQ(wire.result, SOAP_OK) << c.rule;
     }
 }
+
 TEST(request_head, names_the_host_by_the_connection_that_carries_it)
 {
-    struct host_case {
+    static const struct {
         const char *url;
         bool tls;
         const char *host;
-    };
-    static const host_case cases[] = {
+    } cases[] = {
         {"http://host/", false, "host"},
         {"http://host:443/", false, "host:443"},
         {"https://host/", true, "host"},
         {"https://host:80/", true, "host:80"},
         {"http://[fe80::1]:8080/", false, "[fe80::1]:8080"},
     };
-    for (const host_case &c : cases) {
+    for (const auto &c : cases) {
         request_wire wire;
         if (c.tls)
             wire.tls_connection = reinterpret_cast<ssl_st *>(&wire);
@@ -202,15 +201,14 @@ TEST(request_head, names_the_host_by_the_connection_that_carries_it)
 
 TEST(request_head, tells_the_type_of_the_body)
 {
-    struct type_case {
+    const std::string half(480, 'b');
+    const struct {
         const char *rule;
         std::uint32_t mode;
         std::int16_t version;
         std::string boundary, start;
         std::string type;
-    };
-    const std::string half(480, 'b');
-    const type_case cases[] = {
+    } cases[] = {
         {"DIME", MODE_DIME, 1, "", "", "application/dime"},
         {"MIME", MODE_MIME, 1, "bb", "<s>",
          "multipart/related; charset=utf-8; boundary=\"bb\"; type=\"text/xml\"; start=\"<s>\""},
@@ -224,7 +222,7 @@ TEST(request_head, tells_the_type_of_the_body)
          "start-info=\"application/soap+xml\""},
         {"too long a boundary", MODE_MIME | MODE_MTOM, 1, half, half, "application/xop+xml"},
     };
-    for (const type_case &c : cases) {
+    for (const auto &c : cases) {
         request_wire wire;
         wire.output_mode |= c.mode;
         wire.soap_version = c.version;
@@ -321,19 +319,18 @@ struct connecting_wire : memory_wire {
 
 TEST(connect, tries_a_list_until_an_endpoint_takes_the_connection)
 {
-    struct list_case {
+    static const struct {
         const char *endpoints;
         std::size_t tried;
         int result;
-    };
-    static const list_case cases[] = {
+    } cases[] = {
         {"http://one/", 1, 0},
         {"http://dead/", 1, SOAP_TCP_ERROR},
         {"http://dead/ http://one/ http://two/", 2, 0},
         {"  http://dead1/  http://dead2/  ", 2, SOAP_TCP_ERROR},
         {"http://dead/ http://one/ ", 2, 0},
     };
-    for (const list_case &c : cases) {
+    for (const auto &c : cases) {
         connecting_wire wire(0);
         EXPECT_EQ(wire.call(c.endpoints), c.result) << c.endpoints;
         EXPECT_EQ(wire.error, c.result);
@@ -353,15 +350,14 @@ TEST(connect, tries_a_list_until_an_endpoint_takes_the_connection)
 
 TEST(connect, uses_a_kept_connection_only_where_it_may)
 {
-    struct reuse_case {
+    static const auto nothing = [](connecting_wire &) {};
+    static const struct {
         const char *rule;
         std::uint32_t modes;
         void (*between)(connecting_wire &wire);
         const char *second;
         std::size_t opened;
-    };
-    static const auto nothing = [](connecting_wire &) {};
-    static const reuse_case cases[] = {
+    } cases[] = {
         {"the same peer", MODE_KEEP_ALIVE, nothing, "http://host:1/other", 1},
         {"keeping was not asked for", 0, nothing, "http://host:1/", 2},
         {"another port", MODE_KEEP_ALIVE, nothing, "http://host:2/", 2},
@@ -378,7 +374,7 @@ TEST(connect, uses_a_kept_connection_only_where_it_may)
          },
          "http://host:1/", 2},
     };
-    for (const reuse_case &c : cases) {
+    for (const auto &c : cases) {
         connecting_wire wire(c.modes);
         ASSERT_EQ(wire.call("http://host:1/"), 0) << c.rule;
         c.between(wire);
