@@ -116,42 +116,41 @@ TEST(request, informative_result_of_a_header_waits_for_the_end_of_the_head)
 
 TEST(response_out, names_the_status)
 {
-    static const auto server = [](memory_wire &wire) { wire.socket = 1000000; };
     static const struct {
         const char *rule;
-        void (*prepare)(memory_wire &wire);
         int status;
         std::uint64_t count;
         const char *lines; // ahead of "Server"
+        void (*prepare)(memory_wire &wire) = [](memory_wire &) {};
     } cases[] = {
-        {"HTTP status", server, 404, 5, "HTTP/1.1 404 Not Found\r\n"},
-        {"unknown HTTP status", server, 299, 5, "HTTP/1.1 299 \r\n"},
-        {"challenge", server, 401, 5,
+        {"HTTP status", 404, 5, "HTTP/1.1 404 Not Found\r\n"},
+        {"unknown HTTP status", 299, 5, "HTTP/1.1 299 \r\n"},
+        {"challenge", 401, 5,
          "HTTP/1.1 401 Unauthorized\r\nWWW-Authenticate: Basic realm=\"zuv Web Service\"\r\n"},
-        {"own realm", [](memory_wire &wire) { server(wire), wire.auth_realm = "mine"; }, 401, 5,
-         "HTTP/1.1 401 Unauthorized\r\nWWW-Authenticate: Basic realm=\"mine\"\r\n"},
-        {"redirect", [](memory_wire &wire) { server(wire), soap_parse_endpoint(&wire, "http://x/"); }, 303, 5,
-         "HTTP/1.1 303 See Other\r\nLocation: http://x/\r\n"},
-        {"304 has no target", server, 304, 5, "HTTP/1.1 304 Not Modified\r\n"},
-        {"success", server, 0, 5, "HTTP/1.1 200 OK\r\n"},
-        {"success, nothing to say", server, 0, 0, "HTTP/1.1 202 ACCEPTED\r\n"},
-        {"success, chunked", [](memory_wire &wire) { server(wire), wire.output_mode = MODE_CHUNKED; }, 0, 0,
-         "HTTP/1.1 200 OK\r\n"},
-        {"no socket at all", [](memory_wire &) {}, 0, 5, "Status: 200 OK\r\n"},
-        {"engine error", server, SOAP_SYNTAX_ERROR, 5, "HTTP/1.1 500 Internal Server Error\r\n"},
-        {"method", server, SOAP_HTTP_METHOD, 5, "HTTP/1.1 405 Method Not Allowed\r\n"},
-        {"method, GET", server, SOAP_GET_METHOD, 5, "HTTP/1.1 405 Method Not Allowed\r\n"},
-        {"SOAP 1.2, sender", [](memory_wire &wire) { server(wire), wire.soap_version = 2; },
-         SOAP_SYNTAX_ERROR, 5, "HTTP/1.1 400 Bad Request\r\n"},
-        {"SOAP 1.2, receiver",
+        {"own realm", 401, 5, "HTTP/1.1 401 Unauthorized\r\nWWW-Authenticate: Basic realm=\"mine\"\r\n",
+         [](memory_wire &wire) { wire.auth_realm = "mine"; }},
+        {"redirect", 303, 5, "HTTP/1.1 303 See Other\r\nLocation: http://x/\r\n",
+         [](memory_wire &wire) { soap_parse_endpoint(&wire, "http://x/"); }},
+        {"304 has no target", 304, 5, "HTTP/1.1 304 Not Modified\r\n"},
+        {"success", 0, 5, "HTTP/1.1 200 OK\r\n"},
+        {"success, nothing to say", 0, 0, "HTTP/1.1 202 ACCEPTED\r\n"},
+        {"success, chunked", 0, 0, "HTTP/1.1 200 OK\r\n",
+         [](memory_wire &wire) { wire.output_mode = MODE_CHUNKED; }},
+        {"no socket at all", 0, 5, "Status: 200 OK\r\n", [](memory_wire &wire) { wire.socket = -1; }},
+        {"engine error", SOAP_SYNTAX_ERROR, 5, "HTTP/1.1 500 Internal Server Error\r\n"},
+        {"method", SOAP_HTTP_METHOD, 5, "HTTP/1.1 405 Method Not Allowed\r\n"},
+        {"method, GET", SOAP_GET_METHOD, 5, "HTTP/1.1 405 Method Not Allowed\r\n"},
+        {"SOAP 1.2, sender", SOAP_SYNTAX_ERROR, 5, "HTTP/1.1 400 Bad Request\r\n",
+         [](memory_wire &wire) { wire.soap_version = 2; }},
+        {"SOAP 1.2, receiver", SOAP_FATAL_ERROR, 5, "HTTP/1.1 500 Internal Server Error\r\n",
          [](memory_wire &wire) {
-             server(wire), wire.soap_version = 2;
+             wire.soap_version = 2;
              soap_fault_receiver(&wire, "t", nullptr, SOAP_FATAL_ERROR);
-         },
-         SOAP_FATAL_ERROR, 5, "HTTP/1.1 500 Internal Server Error\r\n"},
+         }},
     };
     for (const auto &c : cases) {
         memory_wire wire(0, MODE_BUFFERED);
+        wire.socket = 1000000;
         c.prepare(wire);
         wire.mode = MODE_BUFFERED;
         EXPECT_EQ(http_write_response(&wire, c.status, c.count), 0) << c.rule;
