@@ -6,6 +6,7 @@
 #include <climits>
 #include <cstdio>
 #include <cstring>
+#include <set>
 #include <sstream>
 #include <string>
 
@@ -95,6 +96,18 @@ TEST(ErrorText, IsComposedOfWhatIsKnown)
     };
     for (const auto &c : cases)
         EXPECT_EQ(filled_text(c.error), c.text) << c.error;
+}
+
+TEST(ErrorText, EveryCodeHasATextOfItsOwn)
+{
+    std::set<std::string> texts;
+    for (int error = 1; error <= 48; ++error) {
+        if (error == SOAP_FAULT)
+            continue; // has the text of its fault
+        const std::string text = filled_text(error);
+        EXPECT_EQ(text == "Error " + std::to_string(error), error == 17 || error == 18) << text;
+        EXPECT_TRUE(texts.insert(text).second) << text;
+    }
 }
 
 TEST(ErrorText, ConstraintTextNamesTheElementIfThereIsOne)

@@ -4,7 +4,7 @@
 
 #include <cstdlib>
 #include <cstring>
-#include <new>
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -131,6 +131,8 @@ TEST_F(Memory, AnEmptyBlockIsSharedAndTheHostsAllocatorTakesThePlaceOfOthers)
     soap_block_free(&ctx, empty);
     std::free(soap_block_alloc(nullptr, 8));
     ctx.on_malloc = nullptr;
+    EXPECT_EQ(soap_string_dup(&ctx, nullptr), nullptr);
+    EXPECT_EQ(soap_wide_string_dup(&ctx, nullptr), nullptr);
     EXPECT_EQ(std::u32string(soap_wide_string_dup(&ctx, U"\U0001F600x")), U"\U0001F600x");
 }
 
@@ -325,6 +327,33 @@ TEST_F(Memory, SizesBeyondTheAddressSpaceAreOutOfMemory)
     soap_text_buffer_put(&ctx, "x", 1);
     EXPECT_EQ(soap_text_buffer_reserve(&ctx, SIZE_MAX), SOAP_OUT_OF_MEMORY);
     expect_refusal();
+}
+
+TEST(MemoryExhausted, TextsAndGatheredBlocksGiveAnErrorAndLeaveNothing)
+{
+    bool (*const runs[])(soap * ctx) = {
+        // each says whether it failed
+        [](soap *ctx) { return soap_wide_string_dup(ctx, U"abc") == nullptr; },
+        [](soap *ctx) { return soap_text_buffer_put(ctx, "abc", 3) != 0; },
+        [](soap *ctx) {
+            return soap_block_stack_push(ctx) == nullptr ||
+                   soap_block_stack_grow(ctx, nullptr, 8) == nullptr ||
+                   soap_block_stack_save(ctx, nullptr, nullptr, 0) == nullptr;
+        }};
+    for (const auto run : runs) {
+        std::unique_ptr<soap> ctx = std::make_unique<soap>();
+        bool failed = false;
+        CaptureStderr();
+        const std::size_t refusals = failing_malloc::at_each_allocation(
+            failing_malloc::refuse::one, [&] { failed = run(ctx.get()); },
+            [&](bool refused) {
+                EXPECT_EQ(failed, refused);
+                EXPECT_EQ(ctx->error, refused ? SOAP_OUT_OF_MEMORY : 0);
+                ctx = std::make_unique<soap>();
+            });
+        EXPECT_GT(refusals, 0u);
+        EXPECT_EQ(GetCapturedStderr(), "");
+    }
 }
 
 TEST(MemoryExhausted, AMoveFailsWholeOrNotAtAll)
