@@ -12,42 +12,29 @@
 
 namespace {
 
-std::string envelope(const std::string &version, const std::string &content)
-{
-    return "<E:Envelope xmlns:E=\"" + version +
-           "\" xmlns:p=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0/Profile\""
-           " xmlns:c=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0\""
-           " xmlns:xsi=\"http://www.w3.org/2001/XMLSchema-instance\">" +
-           content + "</E:Envelope>";
-}
-
-const std::string SOAP_11 = "http://schemas.xmlsoap.org/soap/envelope/";
-const std::string SOAP_12 = "http://www.w3.org/2003/05/soap-envelope";
-
 std::string rich_answer(const std::string &operation)
 {
-    return envelope(
-        SOAP_11,
+    return answer_envelope(
         "<E:Header><c:header><c:targetURI>urn:1</c:targetURI></c:header></E:Header><E:Body><p:" + operation +
-            "Response><p:thisURI id=\"u\">urn:zuv:profile:with-a-name-that-needs-an-allocation</p:thisURI>"
-            "<p:thisURI href=\"#u\"/><p:state>active</p:state><c:identity xsi:type=\"c:RecognizedSubject\">"
-            "<c:name>caf&#xE9; with a long name that does not fit in place</c:name><c:authorized>true"
-            "</c:authorized></c:identity><c:contact href=\"#c\"/><c:contact id=\"c\"><c:name>n</c:name>"
-            "</c:contact><c:credentials><c:certificate>AAEC/w==</c:certificate></c:credentials>"
-            "<p:profile href=\"#p\"/><p:profile id=\"p\"><c:contact href=\"#c\"/></p:profile></p:" +
-            operation + "Response></E:Body>");
+        "Response><p:thisURI id=\"u\">urn:zuv:profile:with-a-name-that-needs-an-allocation</p:thisURI>"
+        "<p:thisURI href=\"#u\"/><p:state>active</p:state><c:identity xsi:type=\"c:RecognizedSubject\">"
+        "<c:name>caf&#xE9; with a long name that does not fit in place</c:name><c:authorized>true"
+        "</c:authorized></c:identity><c:contact href=\"#c\"/><c:contact id=\"c\"><c:name>n</c:name>"
+        "</c:contact><c:credentials><c:certificate>AAEC/w==</c:certificate></c:credentials>"
+        "<p:profile href=\"#p\"/><p:profile id=\"p\"><c:contact href=\"#c\"/></p:profile></p:" +
+        operation + "Response></E:Body>");
 }
 
 const std::string TYPED_FAULT = "<c:Client.ObjectNotFound><c:uri>urn:1</c:uri></c:Client.ObjectNotFound>"
                                 "<c:Contact><c:name>n</c:name></c:Contact><x>raw</x>";
 const std::string FAULT_11 =
-    envelope(SOAP_11, "<E:Body><E:Fault><faultcode>E:Client</faultcode><faultstring>s</faultstring><detail>" +
-                          TYPED_FAULT + "</detail></E:Fault></E:Body>");
-const std::string FAULT_12 = envelope(
-    SOAP_12,
+    answer_envelope("<E:Body><E:Fault><faultcode>E:Client</faultcode><faultstring>s</faultstring><detail>" +
+                    TYPED_FAULT + "</detail></E:Fault></E:Body>");
+const std::string FAULT_12 = answer_envelope(
     "<E:Body><E:Fault><E:Code><E:Value>E:Sender</E:Value><E:Subcode><E:Value>c:x</E:Value></E:Subcode>"
     "</E:Code><E:Reason><E:Text xml:lang=\"en\">s</E:Text></E:Reason><E:Detail>" +
-        TYPED_FAULT + "</E:Detail></E:Fault></E:Body>");
+        TYPED_FAULT + "</E:Detail></E:Fault></E:Body>",
+    ENVELOPE_12);
 
 // A document that has something of everything, and parts of it twice.
 const protocolProfile__ProfileContent *rich_document()

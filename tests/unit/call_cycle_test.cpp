@@ -15,17 +15,10 @@
 
 namespace {
 
-constexpr char SOAP_11[] = "http://schemas.xmlsoap.org/soap/envelope/";
-constexpr char SOAP_12[] = "http://www.w3.org/2003/05/soap-envelope";
-
-std::string envelope(const std::string &body, const std::string &uri = SOAP_11,
+std::string envelope(const std::string &body, const std::string &uri = ENVELOPE_11,
                      const std::string &header = "")
 {
-    return "<?xml version=\"1.0\"?><E:Envelope xmlns:E=\"" + uri +
-           "\" xmlns:p=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0/Profile\""
-           " xmlns:c=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0\""
-           " xmlns:xsi=\"http://www.w3.org/2001/XMLSchema-instance\">" +
-           header + "<E:Body>" + body + "</E:Body></E:Envelope>";
+    return "<?xml version=\"1.0\"?>" + answer_envelope(header + "<E:Body>" + body + "</E:Body>", uri);
 }
 
 const std::string OK = "<p:getResponse><p:thisURI>urn:1</p:thisURI></p:getResponse>";
@@ -49,7 +42,7 @@ class CallCycle : public testing::Test {
 protected:
     CallCycle() { wire.carry(proxy); }
 
-    int get(const std::string &body, const std::string &uri = SOAP_11)
+    int get(const std::string &body, const std::string &uri = ENVELOPE_11)
     {
         wire.answers.push_back(http_answer(envelope(body, uri)));
         return proxy.get(&request, response);
@@ -94,16 +87,16 @@ TEST_F(CallCycle, maps_fault_codes_in_both_versions)
         const char *version, *code;
         int error;
     } cases[] = {
-        {SOAP_11, "E:Client", SOAP_CLIENT_FAULT},
-        {SOAP_11, "E:Server", SOAP_SERVER_FAULT},
-        {SOAP_11, "E:MustUnderstand", SOAP_MUST_UNDERSTAND},
-        {SOAP_11, "E:VersionMismatch", SOAP_VERSION_MISMATCH},
-        {SOAP_11, "E:Other", SOAP_FAULT},
-        {SOAP_12, "E:Sender", SOAP_CLIENT_FAULT},
-        {SOAP_12, "E:Receiver", SOAP_SERVER_FAULT},
+        {ENVELOPE_11, "E:Client", SOAP_CLIENT_FAULT},
+        {ENVELOPE_11, "E:Server", SOAP_SERVER_FAULT},
+        {ENVELOPE_11, "E:MustUnderstand", SOAP_MUST_UNDERSTAND},
+        {ENVELOPE_11, "E:VersionMismatch", SOAP_VERSION_MISMATCH},
+        {ENVELOPE_11, "E:Other", SOAP_FAULT},
+        {ENVELOPE_12, "E:Sender", SOAP_CLIENT_FAULT},
+        {ENVELOPE_12, "E:Receiver", SOAP_SERVER_FAULT},
     };
     for (const auto &c : cases) {
-        const bool v12 = std::string(c.version) == SOAP_12;
+        const bool v12 = std::string(c.version) == ENVELOPE_12;
         EXPECT_EQ(c.error, get(v12 ? fault_12(c.code) : fault_11(c.code), c.version)) << c.code;
         EXPECT_EQ(c.error, proxy.error);
         EXPECT_EQ(nullptr, response.result);
@@ -155,7 +148,7 @@ TEST_F(CallCycle, an_answer_without_the_response_ends_with_the_readers_error)
 
 TEST_F(CallCycle, skips_what_follows_the_response_in_both_versions)
 {
-    for (const char *version : {SOAP_11, SOAP_12}) {
+    for (const char *version : {ENVELOPE_11, ENVELOPE_12}) {
         EXPECT_EQ(0, get(OK + "<p:unknown><deep>x</deep></p:unknown>", version));
         ASSERT_NE(nullptr, response.result);
         EXPECT_EQ("urn:1", response.result->thisURI.at(0));
@@ -176,7 +169,7 @@ TEST_F(CallCycle, sends_a_received_header_back_until_told_otherwise)
 {
     const std::string header =
         "<E:Header><c:header><c:transactionId>t-9</c:transactionId></c:header></E:Header>";
-    wire.answers.push_back(http_answer(envelope(OK, SOAP_11, header)));
+    wire.answers.push_back(http_answer(envelope(OK, ENVELOPE_11, header)));
     ASSERT_EQ(0, proxy.get(&request, response));
     ASSERT_NE(nullptr, proxy.soap_header());
     EXPECT_EQ("t-9", *proxy.soap_header()->header->transactionId);

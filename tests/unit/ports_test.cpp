@@ -242,12 +242,7 @@ std::vector<operation> all_rows()
 std::string message(const operation &row, const std::string &body, bool version_12 = false)
 {
     return http_answer(
-        std::string("<E:Envelope xmlns:E=\"http://") +
-        (version_12 ? "www.w3.org/2003/05/soap-envelope" : "schemas.xmlsoap.org/soap/envelope/") +
-        "\" xmlns:xsi=\"http://www.w3.org/2001/XMLSchema-instance\""
-        " xmlns:c=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0\""
-        " xmlns:p=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0/" +
-        row.port + "\"><E:Body>" + body + "</E:Body></E:Envelope>");
+        answer_envelope("<E:Body>" + body + "</E:Body>", version_12 ? ENVELOPE_12 : ENVELOPE_11, row.port));
 }
 
 std::string answer(const operation &row)
