@@ -86,8 +86,6 @@ TEST_F(UpdateOrder, RefusesFiltersThatItCannotJudge)
     leaf.category = &category;
     protocolUpdateOrderFilter__Or wide;
     wide.operand.assign(200, &leaf);
-    protocolUpdateOrderFilter__And all;
-    all.operand.assign(200, &wide);
     protocolUpdateOrderFilter__Filter filter;
     filter.expression = &wide;
     order o;

@@ -22,15 +22,13 @@ const subject BY_NAME{"peer.test", ""};
 
 // --- set-up ---
 
-struct setup_case {
-    const char *key, *ca, *dh, *random, *detail;
-};
-
 TEST_F(tls_setup, a_set_up_that_fails_says_why_and_leaves_no_context)
 {
     const std::string junk = ca().write("junk.pem", [](std::FILE *file) { std::fputs("junk\n", file); });
     const std::string lone = ca().ca_file(); // a certificate without a key
-    const setup_case cases[] = {
+    const struct {
+        const char *key, *ca, *dh, *random, *detail;
+    } cases[] = {
         {nullptr, "/nonexistent", nullptr, nullptr, "Can't read CA file"},
         {nullptr, junk.c_str(), nullptr, nullptr, "Can't read CA file"},
         {"/nonexistent", nullptr, nullptr, nullptr, "Can't read certificate key file"},
@@ -41,7 +39,7 @@ TEST_F(tls_setup, a_set_up_that_fails_says_why_and_leaves_no_context)
         {nullptr, nullptr, junk.c_str(), nullptr, "Can't set DH parameters"},
         {nullptr, nullptr, "8193", nullptr, "Can't set DH parameters"},
     };
-    for (const setup_case &c : cases) {
+    for (const auto &c : cases) {
         context ctx;
         EXPECT_EQ(soap_ssl_server_context(ctx.get(), TLS_NO_DEFAULT_CA, c.key, nullptr, c.ca, nullptr, c.dh,
                                           c.random, nullptr),

@@ -6,6 +6,7 @@
 #include <future>
 #include <optional>
 #include <string>
+#include <tuple>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -114,17 +115,16 @@ TEST_F(tls, a_tunnel_through_a_proxy_leads_to_the_host_behind_it)
     ctx->proxy_user = ctx->proxy_password = "p";
     ctx->mode = ctx->output_mode = MODE_STORE | MODE_KEEP_ALIVE | MODE_INDENT;
     ctx->message_count = 42;
+    const auto settings = [&] {
+        return std::tuple(ctx->status, ctx->keep_alive, std::string(ctx->action), std::string(ctx->auth_user),
+                          ctx->http_content, ctx->mode, ctx->output_mode & ~MODE_TLS, ctx->message_count);
+    };
+    const auto before = settings();
     ASSERT_GE(tcp_connect(ctx.get(), "https://far.example/service", "far.example", 443), 0)
         << ctx.fault_text();
+    EXPECT_EQ(settings(), before);
     EXPECT_TRUE(head.starts_with("CONNECT far.example:443 HTTP/1.1\r\n")) << head;
-    EXPECT_EQ(ctx->status, STATUS_POST);
-    EXPECT_EQ(ctx->keep_alive, 1);
-    EXPECT_STREQ(ctx->action, "urn:action");
-    EXPECT_STREQ(ctx->auth_user, "user");
-    EXPECT_EQ(ctx->http_content, nullptr);
-    EXPECT_EQ(ctx->mode, MODE_STORE | MODE_KEEP_ALIVE | MODE_INDENT);
-    EXPECT_EQ(ctx->output_mode, ctx->mode | MODE_TLS);
-    EXPECT_EQ(ctx->message_count, 42u);
+    EXPECT_NE(ctx->output_mode & MODE_TLS, 0u);
     EXPECT_STREQ(ctx->endpoint, "https://far.example/service");
     EXPECT_EQ(exchange(ctx, "hello"), "hello");
     EXPECT_NE(head.find("\r\nProxy-Authorization: Basic cDpw\r\n"), std::string::npos) << head;
