@@ -38,6 +38,7 @@ TEST(request, is_told_by_its_method)
         {"POST /a/HTTP/b HTTP/1.1\r\nHost: me:80\r\n", 0, "http://me:80/a/HTTP/b"},
         {"POST http://you/b HTTP/1.1\r\nHost: me\r\n", 0, "http://you/b"},
         {"POST /a HTTP/1.1\r\n", 0, "/a"},
+        {"POST /a HTTP/1\r\n", 0, "/a"},
         {"GET /a HTTP/1.1\r\nHost: me\r\n", SOAP_GET_METHOD, "http://me/a"},
         {"DELETE /a HTTP/1.1\r\n", 405, "/a"},
         {"BREW /a HTTP/1.1\r\n", 405, ""},

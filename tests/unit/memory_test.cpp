@@ -132,6 +132,7 @@ TEST_F(Memory, AnEmptyBlockIsSharedAndTheHostsAllocatorTakesThePlaceOfOthers)
     std::free(soap_block_alloc(nullptr, 8));
     ctx.on_malloc = nullptr;
     EXPECT_EQ(soap_string_dup(&ctx, nullptr), nullptr);
+    EXPECT_EQ(soap_string_dup_n(&ctx, nullptr, 3), nullptr);
     EXPECT_EQ(soap_wide_string_dup(&ctx, nullptr), nullptr);
     EXPECT_EQ(std::u32string(soap_wide_string_dup(&ctx, U"\U0001F600x")), U"\U0001F600x");
 }
