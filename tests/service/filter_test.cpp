@@ -50,11 +50,10 @@ TEST(UpdateFilter, ComparesWhatTheClassNames)
 {
     const std::string disk = "FW-100 FW-110 FW-120 BIOS-20 BIOS-30 DRV-5 PACK-2024";
     const std::string data = "DB-10 DB-10-P1 DB-11 PACK-DB PACK-2024";
-    struct row {
+    const struct {
         const char *type, *op;
         std::string content, ids;
-    };
-    const row rows[] = {
+    } rows[] = {
         {"Product", "equal", text("product", "ZX100"), disk},
         {"Product", "notEqual", text("product", "ZX100"), "DB-10 DB-10-P1 DB-11 TOOLS-1 TAPE-7 PACK-DB"},
         {"ProductName", "containsAllWords", text("productName", "array disk"), disk},
@@ -114,7 +113,7 @@ TEST(UpdateFilter, ComparesWhatTheClassNames)
         {"ReleaseDateTime", "after", text("releaseDateTime", "2024-01-31T00:00:00Z"), "TAPE-7"},
         {"ReleaseDateTime", "onOrAfter", text("releaseDateTime", "2024-01-31T00:00:00Z"), "TAPE-7 PACK-2024"},
     };
-    for (const row &r : rows)
+    for (const auto &r : rows)
         EXPECT_EQ(passing(comparison(r.type, r.op, r.content)), r.ids)
             << r.type << ' ' << r.op << ' ' << r.content;
 }
@@ -150,7 +149,7 @@ TEST(UpdateFilter, RefusesWhatItCannotJudge)
          node("expression", "ReleaseDateTimeComparison", text("releaseDateTime", "soon"), "on"), false},
         {"too deep", node("expression", "Not", deep), true},
     };
-    for (const row &r : rows) {
+    for (const auto &r : rows) {
         try {
             passing(r.expression);
             ADD_FAILURE() << r.rule;
@@ -228,12 +227,11 @@ TEST(ReportFilter, ComparesWhatTheClassNames)
             text("problemDescription", "It hangs", "protocolProblemReport") +
             text("submitDateTime", "2024-02-03T04:05:06Z", "protocolProblemReport"));
     soap ctx;
-    struct row {
+    const struct {
         const char *type, *op;
         std::string content;
         bool holds;
-    };
-    const row rows[] = {
+    } rows[] = {
         {"ProductComparison", "equal", text("product", "ZX100", p), true},
         {"ProductComparison", "containsPhrase", text("product", "zx100", p), true},
         {"SubmitterCountryComparison", "equal", text("country", "AT", p), true},
@@ -245,7 +243,7 @@ TEST(ReportFilter, ComparesWhatTheClassNames)
         {"LastModifiedDateTimeComparison", "before", text("lastModifiedDateTime", "2999-01-01T00:00:00Z", p),
          false},
     };
-    for (const row &r : rows) {
+    for (const auto &r : rows) {
         const parsed<protocolPRFilter__Filter> filter(p + ":Filter",
                                                       node("expression", r.type, r.content, r.op, p));
         EXPECT_EQ(filter_holds(*filter, facts_of(&ctx, *report)), r.holds) << r.type << ' ' << r.op;

@@ -204,7 +204,7 @@ TEST(Query, AnswersEachOfABatch)
         {"protocol:QueryRecognizedLanguagesRequest", "<protocol:inclusionFilter/>", "Client.MalformedRequest",
          "English"},
     };
-    for (const row &r : rows) {
+    for (const auto &r : rows) {
         const std::string body = query(r.type, r.content);
         EXPECT_NE(body.find(r.present), std::string::npos) << r.type << '\n' << body;
         EXPECT_EQ(body.find(r.absent), std::string::npos) << r.type << '\n' << body;

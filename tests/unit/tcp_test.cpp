@@ -15,8 +15,6 @@
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_tcp.h>
 
-#include "support/loopback.h"
-#include "support/socket_calls.h"
 #include "support/tcp_client.h"
 #include "transport/tcp_socket.h"
 
@@ -27,14 +25,7 @@ using loopback::bound_socket;
 using loopback::peer;
 using loopback::write_text;
 
-class tcp : public loopback::descriptor_test {
-protected:
-    void TearDown() override
-    {
-        socket_calls::fail_connect = socket_calls::fail_sendto = socket_calls::fail_recv = {};
-        descriptor_test::TearDown();
-    }
-};
+class tcp : public socket_test {};
 
 struct connected : context {
     explicit connected(int port) { EXPECT_GE(open_to(*this, port), 0); }

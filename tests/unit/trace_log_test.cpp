@@ -138,10 +138,9 @@ std::string redacted(const std::string &message)
 
 TEST(Redaction, BlanksCertificatesOfTheTwoPrefixes)
 {
-    struct redaction_case {
+    static const struct {
         const char *rule, *message, *expected;
-    };
-    static const redaction_case cases[] = {
+    } cases[] = {
         {"protocol", "<a><protocol:certificate>MIIC<b/></protocol:certificate></a>",
          "<a><protocol:certificate>...</protocol:certificate></a>"},
         {"p760", "<p760:certificate>MIIC</p760:certificate>x", "<p760:certificate>...</p760:certificate>x"},
@@ -160,7 +159,7 @@ TEST(Redaction, BlanksCertificatesOfTheTwoPrefixes)
         {"cut tag", "<protocol:certificat", "<protocol:certificat"},
         {"empty", "", ""},
     };
-    for (const redaction_case &c : cases)
+    for (const auto &c : cases)
         EXPECT_EQ(redacted(c.message), c.expected) << c.rule;
     std::int32_t length = -1;
     delete[] soap_log_redact_certificates("x", -1, &length);
