@@ -8,10 +8,9 @@
 #include <zuv_client_pro/StatusReportSoapBindingProxy.h>
 #include <zuv_client_pro/soap_attachment.h>
 #include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_log.h>
 
+#include "service/port_client.h"
 #include "service/raw_client.h"
-#include "service/service_process.h"
 #include "support/host_streams.h"
 
 using namespace service_test;
@@ -26,30 +25,21 @@ std::string some_bytes(std::size_t size)
     return bytes;
 }
 
-struct form {
-    const char *name;
-    std::uint32_t mode;
-};
-constexpr form FORMS[] = {
-    {"DIME", MODE_DIME},
-    {"DIME in chunks", MODE_DIME | MODE_CHUNKED},
-    {"MIME", MODE_MIME},
-    {"MIME in chunks", MODE_MIME | MODE_CHUNKED},
-    {"MTOM", MODE_MIME | MODE_MTOM},
-    {"MTOM in chunks", MODE_MIME | MODE_MTOM | MODE_CHUNKED},
+constexpr std::uint32_t FORMS[] = {
+    MODE_DIME,
+    MODE_MIME,
+    MODE_MIME | MODE_MTOM,
+    MODE_DIME | MODE_CHUNKED,
+    MODE_MIME | MODE_CHUNKED,
+    MODE_MIME | MODE_MTOM | MODE_CHUNKED,
 };
 
 // A host that sends streams beside its status reports and takes what comes back.
-class stream_client {
+class stream_client : public port_client<StatusReportSoapBindingProxy> {
 public:
     stream_client(const service_process &service, std::uint32_t form_mode)
-        : form_(form_mode), url_(service.url("StatusReport")),
-          proxy(static_cast<int>(MODE_KEEP_ALIVE | MODE_UTF_STRINGS),
-                static_cast<int>(MODE_KEEP_ALIVE | MODE_UTF_STRINGS | form_mode))
+        : port_client(service, "StatusReport", form_mode), form_(form_mode)
     {
-        proxy.endpoint = url_.c_str();
-        soap_log_set_received(&proxy, nullptr);
-        soap_log_set_sent(&proxy, nullptr);
         host.serve(proxy);
     }
 
@@ -61,20 +51,6 @@ public:
             ASSERT_EQ(soap_mime_attach(&proxy, handle, size, MIME_BINARY, "a/b", id, nullptr, nullptr), 0);
         else
             ASSERT_EQ(soap_dime_attach(&proxy, handle, size, "a/b", id, 0, nullptr), 0);
-    }
-
-    template <class Request, class Response>
-    const protocolStatusReport__StatusReportContent *
-    call(int (StatusReportSoapBindingProxy::*operation)(Request *, Response &), Request &request)
-    {
-        header_.targetURI = &target;
-        if (target.empty())
-            proxy.soap_noheader();
-        else
-            proxy.soap_header(&header_);
-        Response response{};
-        error = (proxy.*operation)(&request, response);
-        return response.result;
     }
 
     // What came with the last answer under a reference; null if nothing did.
@@ -89,16 +65,10 @@ public:
         return nullptr;
     }
 
+    stream_host host;
+
 private:
     std::uint32_t form_;
-    std::string url_;
-    protocol__Header header_;
-
-public:
-    stream_host host;
-    StatusReportSoapBindingProxy proxy;
-    std::string target;
-    int error = 0;
 };
 
 std::size_t files_in(const std::string &directory)
@@ -147,9 +117,9 @@ TEST(Attachments, ComeBackAsTheyWereInEveryForm)
     scratch_directory place;
     service_process service({"--database", place.file("documents.db")});
     const std::string directory = place.file("documents.db-data");
-    for (const form &f : FORMS) {
-        SCOPED_TRACE(f.name);
-        stream_client client(service, f.mode);
+    for (const std::uint32_t form : FORMS) {
+        SCOPED_TRACE(form);
+        stream_client client(service, form);
         host_stream large{some_bytes(300001)}, small{"in memory"};
         std::string large_reference = "cid:la%72ge", small_reference = "cid:small";
         protocol__Attachment first, second;
@@ -165,7 +135,7 @@ TEST(Attachments, ComeBackAsTheyWereInEveryForm)
         EXPECT_EQ(*created->attachment.at(0)->size, "300001");
         EXPECT_EQ(*created->attachment.at(0)->state, protocol__AttachmentState::complete);
         EXPECT_EQ(client.received(created->attachment.at(0)->dataHandler), nullptr) << "the client has it";
-        client.target = created->thisURI.at(0);
+        const std::string target = created->thisURI.at(0);
         const std::string port = *created->attachment.at(0)->dataPort.at(0)->dataURI;
         EXPECT_EQ(files_in(directory), 2u);
         EXPECT_EQ(contents(directory + port.substr(port.rfind('/'))), large.data);
@@ -173,7 +143,7 @@ TEST(Attachments, ComeBackAsTheyWereInEveryForm)
         // Whole messages one after the other on one connection, so nothing of an attachment is left over.
         _protocolStatusReport__getRequest get;
         for (int round = 0; round < 2; ++round) {
-            const auto *got = client.call(&StatusReportSoapBindingProxy::get, get);
+            const auto *got = client.call(&StatusReportSoapBindingProxy::get, get, target);
             ASSERT_NE(got, nullptr) << client.error;
             const protocol__Attachment &outer = *got->attachment.at(0);
             const host_stream *stream = client.received(outer.dataHandler);
@@ -189,13 +159,13 @@ TEST(Attachments, ComeBackAsTheyWereInEveryForm)
             << "those who don't ask in a form with attachments have the data port";
 
         // What a new version of the report no longer refers to is forgotten, what it refers to stays.
-        const auto *got = client.call(&StatusReportSoapBindingProxy::get, get);
+        const auto *got = client.call(&StatusReportSoapBindingProxy::get, get, target);
         ASSERT_NE(got, nullptr);
         protocolStatusReport__StatusReportContent next;
         next.attachment = {got->attachment.at(0)->attachment.at(0)};
-        ASSERT_NE(client.call(&StatusReportSoapBindingProxy::submit, next), nullptr) << client.error;
+        ASSERT_NE(client.call(&StatusReportSoapBindingProxy::submit, next, target), nullptr) << client.error;
         EXPECT_EQ(files_in(directory), 1u);
-        ASSERT_NE(client.call(&StatusReportSoapBindingProxy::remove, next), nullptr);
+        ASSERT_NE(client.call(&StatusReportSoapBindingProxy::remove, next, target), nullptr);
         EXPECT_EQ(files_in(directory), 0u);
     }
 }

@@ -22,14 +22,13 @@ TEST(Comparison, OrdersNumbersWithinTextsAsNumbers)
 TEST(Comparison, OfText)
 {
     using op = text_operator;
-    struct row {
+    const struct {
         const char *rule;
         op how;
         values held;
         const char *wanted;
         bool holds;
-    };
-    const row rows[] = {
+    } rows[] = {
         {"equal to one of several", op::equal, {"a", "b"}, "b", true},
         {"case counts", op::equal, {"A"}, "a", false},
         {"no value is equal to nothing", op::equal, {}, "", false},
@@ -38,16 +37,11 @@ TEST(Comparison, OfText)
         {"less by number", op::less, {"9"}, "10", true},
         {"greater", op::greater, {"1.2"}, "1.10", false},
         {"less or equal", op::less_or_equal, {"3"}, "3", true},
-        {"greater or equal", op::greater_or_equal, {"2"}, "3", false},
-        {"substring", op::contains, {"abcd"}, "bc", true},
-        {"head", op::starts_with, {"abcd"}, "bc", false},
-        {"tail", op::ends_with, {"abcd"}, "cd", true},
         {"phrase", op::contains_phrase, {"The Disk-Array hangs"}, "disk array", true},
         {"phrase out of order", op::contains_phrase, {"array disk"}, "disk array", false},
         {"phrase of part of a word", op::contains_phrase, {"diskarray"}, "disk", false},
         {"all words in any order", op::contains_all_words, {"array of a disk"}, "disk array", true},
         {"a word is missing", op::contains_all_words, {"disk"}, "disk array", false},
-        {"some word", op::contains_some_word, {"disk"}, "tape, disk", true},
         {"no words to search for", op::contains_all_words, {"disk"}, " - ", false},
         {"words of other letters",
          op::contains_all_words,
@@ -58,7 +52,7 @@ TEST(Comparison, OfText)
          "e",
          true},
     };
-    for (const row &r : rows)
+    for (const auto &r : rows)
         EXPECT_EQ(text_holds(r.how, r.held, r.wanted), r.holds) << r.rule;
     EXPECT_FALSE(words_hold(op::contains_all_words, "Disk", "disk", true));
     EXPECT_TRUE(words_hold(op::contains_all_words, "Disk", "disk", false));
@@ -80,17 +74,16 @@ TEST(Comparison, OfSetsTruthAndTime)
     constexpr std::time_t noon = 1700049600; // 2023-11-15T12:00:00Z
     constexpr std::time_t evening = noon + 6 * 3600, next_day = noon + 86400;
     using op = moment_operator;
-    struct row {
+    const struct {
         op how;
         std::time_t held, wanted;
         bool holds;
-    };
-    const row rows[] = {{op::equal, noon, evening, false},         {op::on, noon, evening, true},
-                        {op::on, noon, next_day, false},           {op::not_equal, noon, evening, true},
-                        {op::not_on, noon, evening, false},        {op::before, noon, evening, true},
-                        {op::after, noon, evening, false},         {op::on_or_before, evening, noon, true},
-                        {op::on_or_before, next_day, noon, false}, {op::on_or_after, noon, evening, true}};
-    for (const row &r : rows)
+    } rows[] = {{op::equal, noon, evening, false},         {op::on, noon, evening, true},
+                {op::on, noon, next_day, false},           {op::not_equal, noon, evening, true},
+                {op::not_on, noon, evening, false},        {op::before, noon, evening, true},
+                {op::after, noon, evening, false},         {op::on_or_before, evening, noon, true},
+                {op::on_or_before, next_day, noon, false}, {op::on_or_after, noon, evening, true}};
+    for (const auto &r : rows)
         EXPECT_EQ(moment_holds(r.how, {r.held}, r.wanted), r.holds) << static_cast<int>(r.how);
     EXPECT_TRUE(moment_holds(op::not_on, {}, noon));
     EXPECT_FALSE(moment_holds(op::before, {}, noon));

@@ -9,10 +9,9 @@
 #include <gtest/gtest.h>
 
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
-#include <zuv_client_pro/soap_log.h>
 
+#include "service/port_client.h"
 #include "service/raw_client.h"
-#include "service/service_process.h"
 
 using namespace service_test;
 
@@ -159,44 +158,31 @@ TEST(Endurance, AcknowledgedDocumentsOutliveAKilledService)
 TEST(Endurance, ManyClientsWorkSideBySide)
 {
     constexpr int CLIENTS = 8, CALLS = 25;
+    using port = ProfileSoapBindingProxy;
     service_process service({"--connections", "6"}); // fewer than there are clients: some wait
-    const std::string url = service.url("Profile");
-    ProfileSoapBindingProxy first(url.c_str());
-    __protocolProfile__createResponse created{};
-    protocolProfile__ProfileContent profile;
-    soap_log_set_received(&first, nullptr);
-    soap_log_set_sent(&first, nullptr);
-    ASSERT_EQ(first.create(&profile, created), 0);
-    std::string uri = created.result->thisURI.at(0);
+    const std::string uri = element_text(exchange(service.port(), create_request("x")).body, "thisURI");
     std::vector<std::thread> clients;
     std::atomic<int> failures = 0;
     for (int n = 0; n < CLIENTS; ++n)
         clients.emplace_back([&] {
-            ProfileSoapBindingProxy proxy(url.c_str(), static_cast<int>(MODE_KEEP_ALIVE));
-            soap_log_set_received(&proxy, nullptr);
-            soap_log_set_sent(&proxy, nullptr);
+            port_client<port> client(service, "Profile");
             protocol__Contact contact;
             protocolProfile__ProfileContent more;
             more.contact.push_back(&contact);
-            protocol__Header header;
-            header.targetURI = &uri;
             for (int i = 0; i < CALLS; ++i) { // all of them change one document
-                __protocolProfile__addResponse added{};
-                proxy.soap_header(&header);
-                failures += proxy.add(&more, added) != 0;
-                proxy.destroy();
+                failures += client.call(&port::add, more, uri) == nullptr;
+                client.proxy.destroy();
             }
         });
     for (std::thread &client : clients)
         client.join();
     EXPECT_EQ(failures, 0);
-    protocol__Header header;
-    header.targetURI = &uri;
-    first.soap_header(&header);
-    _protocolProfile__getRequest get;
-    __protocolProfile__getResponse got{};
-    ASSERT_EQ(first.get(&get, got), 0);
-    EXPECT_EQ(got.result->contact.size(), static_cast<std::size_t>(CLIENTS * CALLS)) << "no change was lost";
-    first.soap_force_close_socket();
+    {
+        port_client<port> client(service, "Profile");
+        _protocolProfile__getRequest get;
+        const auto *const got = client.call(&port::get, get, uri);
+        ASSERT_NE(got, nullptr);
+        EXPECT_EQ(got->contact.size(), static_cast<std::size_t>(CLIENTS * CALLS)) << "no change was lost";
+    }
     EXPECT_EQ(service.stop(), 0);
 }

@@ -50,11 +50,10 @@ TEST(UpdateFilter, ComparesWhatTheClassNames)
 {
     const std::string disk = "FW-100 FW-110 FW-120 BIOS-20 BIOS-30 DRV-5 PACK-2024";
     const std::string data = "DB-10 DB-10-P1 DB-11 PACK-DB PACK-2024";
-    struct row {
+    const struct {
         const char *type, *op;
         std::string content, ids;
-    };
-    const row rows[] = {
+    } rows[] = {
         {"Product", "equal", text("product", "ZX100"), disk},
         {"Product", "notEqual", text("product", "ZX100"), "DB-10 DB-10-P1 DB-11 TOOLS-1 TAPE-7 PACK-DB"},
         {"ProductName", "containsAllWords", text("productName", "array disk"), disk},
@@ -114,7 +113,7 @@ TEST(UpdateFilter, ComparesWhatTheClassNames)
         {"ReleaseDateTime", "after", text("releaseDateTime", "2024-01-31T00:00:00Z"), "TAPE-7"},
         {"ReleaseDateTime", "onOrAfter", text("releaseDateTime", "2024-01-31T00:00:00Z"), "TAPE-7 PACK-2024"},
     };
-    for (const row &r : rows)
+    for (const auto &r : rows)
         EXPECT_EQ(passing(comparison(r.type, r.op, r.content)), r.ids)
             << r.type << ' ' << r.op << ' ' << r.content;
 }
@@ -150,7 +149,7 @@ TEST(UpdateFilter, RefusesWhatItCannotJudge)
          node("expression", "ReleaseDateTimeComparison", text("releaseDateTime", "soon"), "on"), false},
         {"too deep", node("expression", "Not", deep), true},
     };
-    for (const row &r : rows) {
+    for (const auto &r : rows) {
         try {
             passing(r.expression);
             ADD_FAILURE() << r.rule;
@@ -219,26 +218,20 @@ TEST(Filters, JudgeEveryComparisonOfBothLanguages)
 TEST(ReportFilter, ComparesWhatTheClassNames)
 {
     const std::string p = "protocolPRFilter";
-    std::string product = "ZX100", country = "AT", number = "4711", other = "DE", description = "It hangs",
-                submitted = "2024-02-03T04:05:06Z";
-    protocol__Identity subject, submitter, beneficiary;
-    subject.product = &product;
-    submitter.country = &country;
-    submitter.customerNumber = {"1", number};
-    beneficiary.country = &other;
-    protocolProblemReport__ProblemReportContent report;
-    report.subject = &subject;
-    report.submitter = &submitter;
-    report.beneficiary = {&beneficiary};
-    report.problemDescription = &description;
-    report.submitDateTime = &submitted;
+    const parsed<protocolProblemReport__ProblemReportContent> report(
+        "protocolProblemReport:ProblemReportContent",
+        "<protocol:subject><protocol:product>ZX100</protocol:product></protocol:subject><protocol:submitter>"
+        "<protocol:country>AT</protocol:country><protocol:customerNumber>1</protocol:customerNumber>"
+        "<protocol:customerNumber>4711</protocol:customerNumber></protocol:submitter><protocol:beneficiary>"
+        "<protocol:country>DE</protocol:country></protocol:beneficiary>" +
+            text("problemDescription", "It hangs", "protocolProblemReport") +
+            text("submitDateTime", "2024-02-03T04:05:06Z", "protocolProblemReport"));
     soap ctx;
-    struct row {
+    const struct {
         const char *type, *op;
         std::string content;
         bool holds;
-    };
-    const row rows[] = {
+    } rows[] = {
         {"ProductComparison", "equal", text("product", "ZX100", p), true},
         {"ProductComparison", "containsPhrase", text("product", "zx100", p), true},
         {"SubmitterCountryComparison", "equal", text("country", "AT", p), true},
@@ -250,9 +243,9 @@ TEST(ReportFilter, ComparesWhatTheClassNames)
         {"LastModifiedDateTimeComparison", "before", text("lastModifiedDateTime", "2999-01-01T00:00:00Z", p),
          false},
     };
-    for (const row &r : rows) {
+    for (const auto &r : rows) {
         const parsed<protocolPRFilter__Filter> filter(p + ":Filter",
                                                       node("expression", r.type, r.content, r.op, p));
-        EXPECT_EQ(filter_holds(*filter, facts_of(&ctx, report)), r.holds) << r.type << ' ' << r.op;
+        EXPECT_EQ(filter_holds(*filter, facts_of(&ctx, *report)), r.holds) << r.type << ' ' << r.op;
     }
 }

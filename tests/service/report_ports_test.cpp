@@ -1,62 +1,20 @@
-// report_ports_test.cpp - status, inventory and problem reports over the wire, and the data that belongs to
-// them.
+// report_ports_test.cpp - status, inventory and problem reports, and the data that belongs to them, beside
+// the walk through all operations, which tests/interop takes.
 #include <string>
 
 #include <gtest/gtest.h>
 
-#include <zuv_client_pro/InventoryReportSoapBindingProxy.h>
 #include <zuv_client_pro/StatusReportSoapBindingProxy.h>
-#include <zuv_client_pro/protocolHTTP.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_log.h>
 
+#include "service/port_client.h"
 #include "service/raw_client.h"
-#include "service/service_process.h"
 
 using namespace service_test;
 
 namespace {
 
-template <class Proxy> class port_client {
-public:
-    port_client(const service_process &service, const char *port)
-        : url_(service.url(port)), proxy(url_.c_str(), static_cast<int>(MODE_KEEP_ALIVE | MODE_UTF_STRINGS))
-    {
-        soap_log_set_received(&proxy, nullptr);
-        soap_log_set_sent(&proxy, nullptr);
-    }
-
-    // Calls an operation on a document, or on none.
-    template <class Request, class Response>
-    auto call(int (Proxy::*operation)(Request *, Response &), Request &request,
-              const std::string &target = {})
-    {
-        target_ = target;
-        header_.targetURI = &target_;
-        if (target.empty())
-            proxy.soap_noheader();
-        else
-            proxy.soap_header(&header_);
-        Response response{};
-        error = (proxy.*operation)(&request, response);
-        return response.result;
-    }
-
-    const SOAP_ENV__Detail &detail() { return *proxy.soap_fault()->detail; }
-
-private:
-    std::string url_, target_;
-    protocol__Header header_;
-
-public:
-    Proxy proxy;
-    int error = 0;
-};
-
 using status_proxy = StatusReportSoapBindingProxy;
 using status_state = protocolStatusReport__StatusReportState;
-using inventory_proxy = InventoryReportSoapBindingProxy;
-using inventory_state = protocolInventoryReport__InventoryReportState;
 
 // Where on the service a URL leads.
 std::string path_of(const std::string &url)
@@ -66,46 +24,23 @@ std::string path_of(const std::string &url)
 
 } // namespace
 
-TEST(StatusReport, GoesFromOpenToClosed)
+TEST(StatusReport, StaysAsItEnded)
 {
     service_process service;
     port_client<status_proxy> client(service, "StatusReport");
-    std::string note = "noted";
-    protocolStatusReport__Reason_x002eEvent_x002eComponent_x002eChanged reason;
-    reason.description = &note;
     protocolStatusReport__StatusReportContent report;
-    report.reason.push_back(&reason);
-    const auto *created = client.call(&status_proxy::create, report);
-    ASSERT_NE(created, nullptr);
-    EXPECT_EQ(*created->state, status_state::open);
-    const std::string uri = created->thisURI.at(0);
-    EXPECT_EQ(uri.rfind("urn:zuv:statusreport:", 0), 0u);
-    EXPECT_EQ(created->reason.at(0)->soap_type(), reason.soap_type()) << "derived classes survive the store";
-
-    const auto *submitted = client.call(&status_proxy::submit, report, uri);
-    ASSERT_NE(submitted, nullptr);
-    EXPECT_EQ(*submitted->state, status_state::complete);
-    EXPECT_EQ(submitted->thisURI.at(0), uri) << "the report that was created";
-
+    const std::string uri = client.call(&status_proxy::create, report)->thisURI.at(0);
     _protocolStatusReport__closeRequest close;
-    const auto *closed = client.call(&status_proxy::close, close, uri);
-    ASSERT_NE(closed, nullptr);
-    EXPECT_EQ(*closed->state, status_state::closed);
+    ASSERT_NE(client.call(&status_proxy::close, close, uri), nullptr);
     _protocolStatusReport__cancelRequest cancel;
     EXPECT_EQ(client.call(&status_proxy::cancel, cancel, uri), nullptr);
     EXPECT_NE(client.detail().Client_x002eInvalidRequest, nullptr);
-
+    EXPECT_EQ(client.call(&status_proxy::submit, report, uri), nullptr);
     _protocolStatusReport__getRequest get;
-    const auto *got = client.call(&status_proxy::get, get, uri);
-    ASSERT_NE(got, nullptr);
-    EXPECT_EQ(*got->state, status_state::closed);
-    EXPECT_EQ(got->reason.at(0)->soap_type(), reason.soap_type());
-    ASSERT_NE(client.call(&status_proxy::remove, report, uri), nullptr);
-    EXPECT_EQ(client.call(&status_proxy::get, get, uri), nullptr);
-    EXPECT_NE(client.detail().Client_x002eObjectNotFound, nullptr);
+    EXPECT_EQ(*client.call(&status_proxy::get, get, uri)->state, status_state::closed);
 }
 
-TEST(StatusReport, TakesDataThroughADataPort)
+TEST(StatusReport, TakesDataThroughADataPortAndNotesHowItGoes)
 {
     service_process service;
     port_client<status_proxy> client(service, "StatusReport");
@@ -119,58 +54,38 @@ TEST(StatusReport, TakesDataThroughADataPort)
     request.dataPortPreference = &wish;
     const auto *attached = client.call(&status_proxy::attach, request, uri);
     ASSERT_NE(attached, nullptr);
-    const protocol__Attachment &pending = *attached->attachment.at(0);
-    EXPECT_EQ(*pending.state, protocol__AttachmentState::pending);
-    const protocol__DataPort &port = *pending.dataPort.at(0);
-    EXPECT_EQ(*port.direction, protocol__Direction::in);
+    const protocol__DataPort &port = *attached->attachment.at(0)->dataPort.at(0);
     EXPECT_EQ(*port.transport, protocol__Transport::HTTP);
-    EXPECT_EQ(*port.attachmentURI, *pending.thisURI);
-    EXPECT_EQ(
-        port.dataURI->rfind("http://127.0.0.1:" + std::to_string(service.port()) + "/zuv/v1.0/data/", 0), 0u)
-        << *port.dataURI;
-    const auto *const exchange = dynamic_cast<protocol__ExchangeDetail *>(port.transportDetail.at(0));
-    ASSERT_NE(exchange, nullptr);
-    EXPECT_NE(dynamic_cast<protocolHTTP__HttpPost *>(exchange->exchange.at(0)), nullptr);
 
     // The bytes go to the data port as they are, in one piece or in chunks.
     const std::string path = path_of(*port.dataURI), bytes("\0<binary>\r\n\xFF", 12);
-    EXPECT_EQ(
-        ::exchange(service.port(), "POST " + path + " HTTP/1.1\r\nContent-Length: 12\r\n\r\n" + bytes).status,
-        200);
-    EXPECT_EQ(::exchange(service.port(), "GET " + path + " HTTP/1.1\r\n\r\n").body, bytes);
-    EXPECT_EQ(::exchange(service.port(),
-                         "POST " + path +
-                             " HTTP/1.1\r\nTransfer-Encoding: chunked\r\n\r\n3\r\nabc\r\n2\r\nde\r\n"
-                             "0\r\n\r\n")
-                  .status,
-              200);
-    EXPECT_EQ(::exchange(service.port(), "GET " + path + " HTTP/1.1\r\n\r\n").body, "abcde");
-    EXPECT_EQ(::exchange(service.port(), "POST " + path + "x HTTP/1.1\r\nContent-Length: 1\r\n\r\nx").status,
-              404);
+    const auto send = [&](const std::string &where, const std::string &rest) {
+        return exchange(service.port(), "POST " + where + " HTTP/1.1\r\n" + rest).status;
+    };
+    const auto kept = [&] { return exchange(service.port(), "GET " + path + " HTTP/1.1\r\n\r\n").body; };
+    EXPECT_EQ(send(path, "Content-Length: 12\r\n\r\n" + bytes), 200);
+    EXPECT_EQ(kept(), bytes);
+    EXPECT_EQ(send(path, "Transfer-Encoding: chunked\r\n\r\n3\r\nabc\r\n2\r\nde\r\n0\r\n\r\n"), 200);
+    EXPECT_EQ(kept(), "abcde");
+    EXPECT_EQ(send(path + "x", "Content-Length: 1\r\n\r\nx"), 404);
 
-    // The client reports how the transfer goes.
     protocol__AttachStatusRequest progress;
     double percent = 40;
-    std::string attachment_uri = *pending.thisURI, size = "5";
+    bool problem = true;
+    std::string attachment_uri = *port.attachmentURI;
+    protocol__AttachmentState recommended = protocol__AttachmentState::error;
     progress.attachmentURI = &attachment_uri;
     progress.percentComplete = &percent;
-    progress.sizeTransferred = &size;
-    const auto *noted = client.call(&status_proxy::attachStatus, progress, uri);
-    ASSERT_NE(noted, nullptr);
-    EXPECT_EQ(*noted->attachment.at(0)->state, protocol__AttachmentState::pending);
+    const auto noted = [&]() -> const protocol__Attachment & {
+        return *client.call(&status_proxy::attachStatus, progress, uri)->attachment.at(0);
+    };
+    EXPECT_EQ(*noted().state, protocol__AttachmentState::pending);
     percent = 100;
-    noted = client.call(&status_proxy::attachStatus, progress, uri);
-    EXPECT_EQ(*noted->attachment.at(0)->state, protocol__AttachmentState::complete);
-    EXPECT_EQ(*noted->attachment.at(0)->size, size);
-    EXPECT_EQ(*noted->attachment.at(0)->dataPort.at(0)->state, protocol__DataPortState::closed);
-    protocol__AttachmentState recommended = protocol__AttachmentState::error;
-    bool problem = true;
+    EXPECT_EQ(*noted().dataPort.at(0)->state, protocol__DataPortState::closed);
     progress.recommendedAttachmentState = &recommended;
     progress.problemEncountered = &problem;
-    noted = client.call(&status_proxy::attachStatus, progress, uri);
-    EXPECT_EQ(*noted->attachment.at(0)->state, protocol__AttachmentState::error);
-    EXPECT_NE(noted->attachment.at(0)->error, nullptr);
-
+    EXPECT_EQ(*noted().state, protocol__AttachmentState::error);
+    EXPECT_NE(noted().error, nullptr);
     attachment_uri = "urn:nothing";
     EXPECT_EQ(client.call(&status_proxy::attachStatus, progress, uri), nullptr);
     EXPECT_NE(client.detail().Client_x002eObjectNotFound, nullptr);
@@ -217,83 +132,29 @@ TEST(StatusReport, RefusesDataPortsThatItDoesNotHave)
     EXPECT_TRUE(attached->attachment.at(0)->dataPort.empty());
 }
 
-TEST(InventoryReport, IsProcessedUntilItsDataHasArrived)
-{
-    service_process service;
-    port_client<inventory_proxy> client(service, "InventoryReport");
-    protocol__AttachmentState pending = protocol__AttachmentState::pending;
-    protocol__Attachment attachment;
-    attachment.state = &pending;
-    protocolInventoryReport__InventoryReportContent report, inner;
-    report.inventoryReport.push_back(&inner);
-    report.attachment.push_back(&attachment);
-    const auto *submitted = client.call(&inventory_proxy::submit, report);
-    ASSERT_NE(submitted, nullptr);
-    EXPECT_EQ(*submitted->state, inventory_state::processing);
-    EXPECT_EQ(submitted->inventoryReport.size(), 1u);
-    const std::string uri = submitted->thisURI.at(0);
-    _protocolInventoryReport__cancelRequest cancel;
-    EXPECT_EQ(*client.call(&inventory_proxy::cancel, cancel, uri)->state, inventory_state::cancelled);
-    EXPECT_EQ(client.call(&inventory_proxy::submit, report, uri), nullptr) << "what is cancelled stays so";
-    _protocolInventoryReport__getRequest get;
-    EXPECT_EQ(*client.call(&inventory_proxy::get, get, uri)->state, inventory_state::cancelled);
-    EXPECT_NE(client.call(&inventory_proxy::remove, report, uri), nullptr);
-    report.attachment.clear();
-    submitted = client.call(&inventory_proxy::submit, report);
-    EXPECT_EQ(*submitted->state, inventory_state::complete);
-    const std::string second = submitted->thisURI.at(0);
-    _protocolInventoryReport__closeRequest close;
-    EXPECT_EQ(*client.call(&inventory_proxy::close, close, second)->state, inventory_state::closed);
-}
-
 // The problem report port has no proxy: its messages are written by hand.
-TEST(ProblemReport, IsAnsweredAtOnce)
+TEST(ProblemReport, IsAnsweredAtOnceByWhatItsWordsSay)
 {
     service_process service;
-    const auto call = [&](const std::string &content, const std::string &target = {}) {
-        const std::string header =
-            target.empty() ? "" : "<protocol:targetURI>" + target + "</protocol:targetURI>";
-        return exchange(service.port(), post("ProblemReport", soap11(content, header)));
-    };
     const auto submit = [&](const std::string &title, const std::string &description) {
-        return call("<protocolProblemReport:submitRequest><protocolProblemReport:title>" + title +
-                    "</protocolProblemReport:title><protocolProblemReport:problemDescription>" + description +
-                    "</protocolProblemReport:problemDescription></protocolProblemReport:submitRequest>");
+        return exchange(
+            service.port(),
+            post(
+                "ProblemReport",
+                soap11("<protocolProblemReport:submitRequest><protocolProblemReport:title>" + title +
+                       "</protocolProblemReport:title><protocolProblemReport:problemDescription>" +
+                       description +
+                       "</protocolProblemReport:problemDescription></protocolProblemReport:submitRequest>")));
     };
     const std::string action = "xsi:type=\"protocolProblemReport:Action.Update.Install\"";
     raw_answer answer = submit("Heavy load", "Under it the controller hangs.");
     ASSERT_EQ(answer.status, 200) << answer.body;
-    EXPECT_EQ(element_text(answer.body, "state"), "open");
-    EXPECT_NE(answer.body.find("\"protocolProblemReport:Answer.Server.Administration.Acknowledgment\""),
-              std::string::npos);
-    EXPECT_NE(answer.body.find("\"protocolProblemReport:Answer.Server.Action\""), std::string::npos);
     EXPECT_NE(answer.body.find(action), std::string::npos);
     EXPECT_EQ(element_text(answer.body, "updateId"), "FW-120");
     EXPECT_FALSE(element_text(answer.body, "submitDateTime").empty());
-    const std::string uri = element_text(answer.body, "thisURI");
-
     answer = submit("Question", "Is DRV-5 of use to me?");
     EXPECT_EQ(element_text(answer.body, "updateId"), "DRV-5");
     EXPECT_EQ(element_text(answer.body, "confidence"), "90");
     answer = submit("Coffee", "It is cold.");
     EXPECT_EQ(answer.body.find(action), std::string::npos);
-
-    answer = call("<protocolProblemReport:getRequest/>", uri);
-    EXPECT_EQ(element_text(answer.body, "updateId"), "FW-120") << "answers are kept";
-    answer = call(
-        "<protocolProblemReport:attachRequest><protocolProblemReport:attachment><protocol:description>dump"
-        "</protocol:description></protocolProblemReport:attachment></protocolProblemReport:attachRequest>",
-        uri);
-    ASSERT_EQ(answer.status, 200) << answer.body;
-    const std::string attachment = element_text(answer.body, "attachmentURI");
-    EXPECT_EQ(attachment.rfind("urn:zuv:attachment:", 0), 0u);
-    answer = call("<protocolProblemReport:attachStatusRequest><protocol:attachmentURI>" + attachment +
-                      "</protocol:attachmentURI><protocol:recommendedAttachmentState>complete"
-                      "</protocol:recommendedAttachmentState></protocolProblemReport:attachStatusRequest>",
-                  uri);
-    EXPECT_NE(answer.body.find("<protocol:state>complete</protocol:state>"), std::string::npos)
-        << answer.body;
-    EXPECT_EQ(call("<protocolProblemReport:removeRequest/>", uri).status, 200);
-    EXPECT_NE(call("<protocolProblemReport:getRequest/>", uri).body.find("Client.ObjectNotFound"),
-              std::string::npos);
 }

@@ -69,3 +69,17 @@ inline std::string http_answer(const std::string &body, const std::string &statu
            "\r\nContent-Type: text/xml; charset=utf-8\r\nContent-Length: " + std::to_string(body.size()) +
            "\r\n" + more + "\r\n" + body;
 }
+
+constexpr char ENVELOPE_11[] = "http://schemas.xmlsoap.org/soap/envelope/";
+constexpr char ENVELOPE_12[] = "http://www.w3.org/2003/05/soap-envelope";
+
+// An envelope around header and body; "E" is its prefix, "p" the port's and "c" that of what ports share.
+inline std::string answer_envelope(const std::string &content, const std::string &uri = ENVELOPE_11,
+                                   const std::string &port = "Profile")
+{
+    return "<E:Envelope xmlns:E=\"" + uri +
+           "\" xmlns:xsi=\"http://www.w3.org/2001/XMLSchema-instance\""
+           " xmlns:c=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0\""
+           " xmlns:p=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0/" +
+           port + "\">" + content + "</E:Envelope>";
+}

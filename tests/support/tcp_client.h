@@ -6,10 +6,21 @@
 #include <zuv_client_pro/soap_tcp.h>
 
 #include "support/loopback.h"
+#include "support/socket_calls.h"
 
 namespace tcp_clients {
 
 using loopback::context;
+
+// A test that may have socket calls fail.
+class socket_test : public loopback::descriptor_test {
+protected:
+    void TearDown() override
+    {
+        socket_calls::fail_connect = socket_calls::fail_sendto = socket_calls::fail_recv = {};
+        descriptor_test::TearDown();
+    }
+};
 
 inline int open_to(context &ctx, int port, const char *host = "127.0.0.1")
 {

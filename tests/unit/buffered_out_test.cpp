@@ -1,11 +1,7 @@
 // How a message leaves: modes, stages, framing on the wire, hooks, failures.
-#include <cstdio>
-#include <fstream>
-#include <iterator>
 #include <string>
 
 #include <gtest/gtest.h>
-#include <unistd.h>
 #include <zlib.h>
 
 #include <zuv_client_pro/soap_error.h>
@@ -77,14 +73,16 @@ std::string text_of_size(std::size_t size)
 }
 
 // zlib's own reading of a stream: window bits 31 for gzip with head and trailer checked, 15 for deflate.
-std::string inflated(const std::string &bytes, int window_bits, const char *dictionary = nullptr)
+std::string inflated(const std::string &bytes, int window_bits, const std::string &dictionary)
 {
     z_stream stream{};
     EXPECT_EQ(inflateInit2(&stream, window_bits), Z_OK);
-    if (dictionary != nullptr && window_bits < 0) {
-        EXPECT_EQ(inflateSetDictionary(&stream, reinterpret_cast<const Bytef *>(dictionary),
-                                       static_cast<uInt>(std::strlen(dictionary))),
-                  Z_OK);
+    const auto preset = [&] {
+        return inflateSetDictionary(&stream, reinterpret_cast<const Bytef *>(dictionary.data()),
+                                    static_cast<uInt>(dictionary.size()));
+    };
+    if (window_bits < 0) {
+        EXPECT_EQ(preset(), Z_OK);
     }
     std::string out(4U << 20, '\0');
     stream.next_in = reinterpret_cast<Bytef *>(const_cast<char *>(bytes.data()));
@@ -92,23 +90,20 @@ std::string inflated(const std::string &bytes, int window_bits, const char *dict
     stream.next_out = reinterpret_cast<Bytef *>(out.data());
     stream.avail_out = static_cast<uInt>(out.size());
     int result = inflate(&stream, Z_FINISH);
-    if (result == Z_NEED_DICT && dictionary != nullptr) {
-        inflateSetDictionary(&stream, reinterpret_cast<const Bytef *>(dictionary),
-                             static_cast<uInt>(std::strlen(dictionary)));
+    if (result == Z_NEED_DICT && preset() == Z_OK)
         result = inflate(&stream, Z_FINISH);
-    }
     EXPECT_EQ(result, Z_STREAM_END);
     out.resize(stream.total_out);
     inflateEnd(&stream);
     return out;
 }
 
-unsigned long least_first(const std::string &bytes, std::size_t at)
+std::string least_first(unsigned long value)
 {
-    unsigned long value = 0;
-    for (std::size_t i = 4; i-- > 0;)
-        value = value << 8 | static_cast<unsigned char>(bytes[at + i]);
-    return value;
+    std::string bytes;
+    for (int i = 0; i < 4; ++i)
+        bytes += static_cast<char>(value >> (8 * i) & 0xFF);
+    return bytes;
 }
 
 struct mode_row {
@@ -179,33 +174,17 @@ TEST(buffered_out, an_uncounted_direct_message_to_a_socket_is_stored)
     wire.socket = -1;
 }
 
-TEST(buffered_out, literal_messages_are_trees_unless_a_graph_is_asked_for)
-{
-    memory_wire wire(0, MODE_BUFFERED);
-    wire.encoding_style = nullptr;
-    soap_count_begin(&wire);
-    EXPECT_TRUE(wire.mode & SOAP_XML_TREE);
-    wire.output_mode |= SOAP_XML_GRAPH;
-    soap_count_begin(&wire);
-    EXPECT_FALSE(wire.mode & SOAP_XML_TREE);
-    soap_send_begin(&wire);
-    EXPECT_FALSE(wire.mode & SOAP_XML_TREE);
-}
-
 TEST(buffered_out, the_buffer_leaves_when_it_is_exactly_full)
 {
     memory_wire wire(0, MODE_BUFFERED);
     const std::string body = text_of_size(SOAP_BUFFER_SIZE);
     ASSERT_EQ(soap_send_begin(&wire), 0);
     soap_send_bytes(&wire, body.data(), SOAP_BUFFER_SIZE - 1);
-    EXPECT_EQ(wire.sends.size(), 0U);
+    EXPECT_TRUE(wire.sends.empty());
     soap_send_bytes(&wire, body.data() + SOAP_BUFFER_SIZE - 1, 1);
-    ASSERT_EQ(wire.sends.size(), 1U);
-    EXPECT_EQ(wire.sends[0], body);
-    EXPECT_EQ(wire.buffer_index, 0U);
+    EXPECT_EQ(wire.sends, std::vector{body});
     ASSERT_EQ(soap_send_finish(&wire), 0);
     EXPECT_EQ(wire.sends.size(), 1U);
-    EXPECT_EQ(wire.message_part, PART_OUTSIDE);
 }
 
 TEST(buffered_out, each_mode_has_its_form_on_the_wire)
@@ -248,35 +227,30 @@ TEST(buffered_out, later_chunks_close_the_ones_before)
 
 TEST(buffered_out, compressed_streams_are_what_zlib_reads)
 {
-    static const char DICTIONARY[] = "<a/><a/>1234567890";
-    for (const char *dictionary : {static_cast<const char *>(nullptr), DICTIONARY}) {
-        for (const int encoding : {1, 2, 0}) {
-            for (const std::size_t size : {0U, 1U, 1000U, 65536U, 700000U}) {
+    for (const std::string dictionary : {"", "<a/><a/>1234567890"}) {
+        for (const int encoding : {1, 2, 0}) { // deflate, gzip, and gzip if nothing was agreed on
+            for (const std::size_t size : {0U, 1U, 700000U}) {
                 memory_wire wire(0, MODE_BUFFERED | MODE_BARE_XML | MODE_DEFLATE);
-                wire.zlib_dictionary = dictionary;
-                wire.zlib_dictionary_length = dictionary != nullptr ? sizeof DICTIONARY - 1 : 0;
+                wire.zlib_dictionary = dictionary.empty() ? nullptr : dictionary.data();
+                wire.zlib_dictionary_length = static_cast<unsigned>(dictionary.size());
                 wire.zlib_out = static_cast<std::int16_t>(encoding);
                 const std::string body = text_of_size(size);
                 ASSERT_EQ(send_message(wire, body, 4096), 0);
                 const std::string stream = wire.sent();
-                if (encoding == 1) {
-                    EXPECT_EQ(inflated(stream, 15, dictionary), body);
-                } else if (dictionary == nullptr) {
-                    EXPECT_EQ(inflated(stream, 31), body); // checks the trailer too
-                    EXPECT_EQ(stream.substr(0, 10), std::string("\x1F\x8B\x08\0\0\0\0\0\0\xFF", 10));
-                } else {
-                    EXPECT_EQ(stream.substr(0, 10), std::string("\x1F\x8B\xFF\0\0\0\0\0\0\xFF", 10));
-                    EXPECT_EQ(inflated(stream.substr(10, stream.size() - 18), -15, dictionary), body);
-                    EXPECT_EQ(
-                        least_first(stream, stream.size() - 8),
-                        crc32(0, reinterpret_cast<const Bytef *>(body.data()), static_cast<uInt>(size)));
-                    EXPECT_EQ(least_first(stream, stream.size() - 4), size);
-                }
                 EXPECT_EQ(wire.zlib_state, 0);
-                if (size >= 65536U) {
-                    EXPECT_GT(wire.zlib_ratio_out, 0.0F);
-                    EXPECT_LT(wire.zlib_ratio_out, 1.0F);
+                if (size > 1) {
+                    EXPECT_NEAR(wire.zlib_ratio_out, 0.5F, 0.5F);
                 }
+                if (encoding == 1 || dictionary.empty()) {
+                    EXPECT_EQ(inflated(stream, encoding == 1 ? 15 : 31, dictionary), body);
+                    continue;
+                }
+                // A form of our own: the flags announce the dictionary, which gzip doesn't have.
+                EXPECT_EQ(stream.substr(0, 10), std::string("\x1F\x8B\xFF\0\0\0\0\0\0\xFF", 10));
+                EXPECT_EQ(inflated(stream.substr(10, stream.size() - 18), -15, dictionary), body);
+                const auto *const bytes = reinterpret_cast<const Bytef *>(body.data());
+                EXPECT_EQ(stream.substr(stream.size() - 8),
+                          least_first(crc32(0, bytes, static_cast<uInt>(size))) + least_first(size));
             }
         }
     }
@@ -333,17 +307,6 @@ TEST(buffered_out, a_datagram_is_one_send_or_an_error)
     EXPECT_EQ(soap_send_begin(&wire), SOAP_UDP_ERROR);
 }
 
-TEST(buffered_out, padding_reaches_the_next_multiple_of_four)
-{
-    for (std::size_t length = 0; length < 9; ++length) {
-        memory_wire wire(0, MODE_BUFFERED);
-        soap_send_begin(&wire);
-        ASSERT_EQ(soap_send_padded(&wire, "12345678", length), 0);
-        soap_send_finish(&wire);
-        EXPECT_EQ(wire.sent(), std::string("12345678", length) + std::string((4 - length % 4) % 4, '\0'));
-    }
-}
-
 TEST(buffered_out, every_send_may_fail_and_leaves_nothing_behind)
 {
     const std::string body = text_of_size(300000);
@@ -365,20 +328,4 @@ TEST(buffered_out, every_send_may_fail_and_leaves_nothing_behind)
             EXPECT_EQ(wire.block_stack, nullptr);
         }
     }
-}
-
-TEST(buffered_out, the_trace_holds_every_byte_sent)
-{
-    const std::string path = testing::TempDir() + "buffered_out_trace_" + std::to_string(getpid()) + ".log";
-    std::remove(path.c_str());
-    {
-        memory_wire wire(0, MODE_CHUNKED | MODE_DEFLATE);
-        ASSERT_EQ(soap_log_set_sent(&wire, path.c_str()), 0);
-        ASSERT_EQ(send_message(wire, text_of_size(500000), 5000), 0);
-        std::ifstream file(path, std::ios::binary);
-        const std::string trace{std::istreambuf_iterator<char>(file), std::istreambuf_iterator<char>()};
-        EXPECT_TRUE(trace == wire.sent());
-        EXPECT_FALSE(trace.empty());
-    }
-    std::remove(path.c_str());
 }

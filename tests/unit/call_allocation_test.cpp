@@ -5,7 +5,6 @@
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
 #include <zuv_client_pro/protocol.h>
 #include <zuv_client_pro/protocolProfile.h>
-#include <zuv_client_pro/soap_binary.h>
 #include <zuv_client_pro/soap_error.h>
 
 #include "support/call_wire.h"
@@ -13,41 +12,44 @@
 
 namespace {
 
-std::string envelope(const std::string &version, const std::string &content)
-{
-    return "<E:Envelope xmlns:E=\"" + version +
-           "\" xmlns:p=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0/Profile\""
-           " xmlns:c=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0\""
-           " xmlns:xsi=\"http://www.w3.org/2001/XMLSchema-instance\">" +
-           content + "</E:Envelope>";
-}
-
-const std::string SOAP_11 = "http://schemas.xmlsoap.org/soap/envelope/";
-const std::string SOAP_12 = "http://www.w3.org/2003/05/soap-envelope";
-
 std::string rich_answer(const std::string &operation)
 {
-    return envelope(
-        SOAP_11,
+    return answer_envelope(
         "<E:Header><c:header><c:targetURI>urn:1</c:targetURI></c:header></E:Header><E:Body><p:" + operation +
-            "Response><p:thisURI id=\"u\">urn:zuv:profile:with-a-name-that-needs-an-allocation</p:thisURI>"
-            "<p:thisURI href=\"#u\"/><p:state>active</p:state><c:identity xsi:type=\"c:RecognizedSubject\">"
-            "<c:name>caf&#xE9; with a long name that does not fit in place</c:name><c:authorized>true"
-            "</c:authorized></c:identity><c:contact href=\"#c\"/><c:contact id=\"c\"><c:name>n</c:name>"
-            "</c:contact><c:credentials><c:certificate>AAEC/w==</c:certificate></c:credentials></p:" +
-            operation + "Response></E:Body>");
+        "Response><p:thisURI id=\"u\">urn:zuv:profile:with-a-name-that-needs-an-allocation</p:thisURI>"
+        "<p:thisURI href=\"#u\"/><p:state>active</p:state><c:identity xsi:type=\"c:RecognizedSubject\">"
+        "<c:name>caf&#xE9; with a long name that does not fit in place</c:name><c:authorized>true"
+        "</c:authorized></c:identity><c:contact href=\"#c\"/><c:contact id=\"c\"><c:name>n</c:name>"
+        "</c:contact><c:credentials><c:certificate>AAEC/w==</c:certificate></c:credentials>"
+        "<p:profile href=\"#p\"/><p:profile id=\"p\"><c:contact href=\"#c\"/></p:profile></p:" +
+        operation + "Response></E:Body>");
 }
 
 const std::string TYPED_FAULT = "<c:Client.ObjectNotFound><c:uri>urn:1</c:uri></c:Client.ObjectNotFound>"
                                 "<c:Contact><c:name>n</c:name></c:Contact><x>raw</x>";
 const std::string FAULT_11 =
-    envelope(SOAP_11, "<E:Body><E:Fault><faultcode>E:Client</faultcode><faultstring>s</faultstring><detail>" +
-                          TYPED_FAULT + "</detail></E:Fault></E:Body>");
-const std::string FAULT_12 = envelope(
-    SOAP_12,
+    answer_envelope("<E:Body><E:Fault><faultcode>E:Client</faultcode><faultstring>s</faultstring><detail>" +
+                    TYPED_FAULT + "</detail></E:Fault></E:Body>");
+const std::string FAULT_12 = answer_envelope(
     "<E:Body><E:Fault><E:Code><E:Value>E:Sender</E:Value><E:Subcode><E:Value>c:x</E:Value></E:Subcode>"
     "</E:Code><E:Reason><E:Text xml:lang=\"en\">s</E:Text></E:Reason><E:Detail>" +
-        TYPED_FAULT + "</E:Detail></E:Fault></E:Body>");
+        TYPED_FAULT + "</E:Detail></E:Fault></E:Body>",
+    ENVELOPE_12);
+
+// A document that has something of everything, and parts of it twice.
+const protocolProfile__ProfileContent *rich_document()
+{
+    static call_wire wire;
+    static ProfileSoapBindingProxy proxy;
+    static __protocolProfile__getResponse read{};
+    if (read.result == nullptr) {
+        _protocolProfile__getRequest request;
+        wire.carry(proxy);
+        wire.answers.push_back(http_answer(rich_answer("get")));
+        EXPECT_EQ(0, proxy.get(&request, read));
+    }
+    return read.result;
+}
 
 // Two calls, which are answered by `body`, with a proxy of their own, so that nothing is left over from
 // another run.
@@ -58,17 +60,6 @@ struct trial {
         wire.carry(proxy);
         wire.sent.reserve(SOAP_BUFFER_SIZE); // the peer's memory is not what is tested
         wire.opened_at.reserve(SOAP_TEXT_SIZE);
-        identity.name = &name;
-        contact.name = &name;
-        certificate.content = bytes;
-        certificate.size = sizeof bytes;
-        credentials.certificate = &certificate;
-        inner.contact = {&contact};
-        document.thisURI = {name, name};
-        document.identity = &identity;
-        document.contact = {&contact, &contact};
-        document.credentials = {&credentials};
-        document.profile = {&inner, &inner};
         header.targetURI = &name;
         prepare();
     }
@@ -81,18 +72,12 @@ struct trial {
         held.result = nullptr;
     }
     int get() { return proxy.get(&request, got); }
-    int set() { return proxy.set(&document, held); }
+    int set() { return proxy.set(const_cast<protocolProfile__ProfileContent *>(rich_document()), held); }
     const protocolProfile__ProfileContent *result() const { return got.result ? got.result : held.result; }
 
     call_wire wire;
     ProfileSoapBindingProxy proxy;
     std::string answer, name = "a name that does not fit in place \xE9 <&>";
-    unsigned char bytes[3] = {1, 2, 3};
-    xsd__base64Binary certificate;
-    protocol__Identity identity;
-    protocol__Contact contact;
-    protocol__Credentials credentials;
-    protocolProfile__ProfileContent inner, document;
     protocol__Header header;
     _protocolProfile__getRequest request;
     __protocolProfile__getResponse got{};
@@ -141,6 +126,7 @@ TEST(AllocationFailure, of_a_call_gives_a_code_and_leaves_nothing_behind)
         {"fault", &trial::get, FAULT_11, 0, SOAP_CLIENT_FAULT},
         {"fault of SOAP 1.2", &trial::get, FAULT_12, 0, SOAP_CLIENT_FAULT},
     };
+    rich_document();
     testing::internal::CaptureStderr();
     refuse(cases[0], 1, failing_malloc::refuse::one); // what a process makes but once is made now
     for (const call_case &c : cases) {

@@ -6,6 +6,7 @@
 #include <climits>
 #include <cstdio>
 #include <cstring>
+#include <set>
 #include <sstream>
 #include <string>
 
@@ -57,63 +58,34 @@ std::string filled_text(int error)
     return *soap_fault_string_field(&ctx);
 }
 
-TEST(ErrorText, EveryCodeHasItsText)
+TEST(ErrorText, IsComposedOfWhatIsKnown)
 {
-    struct text_case {
+    static const struct {
         int error;
         const char *text;
-    };
-    static const text_case cases[] = {
+    } cases[] = {
         {-1, "End of file or no input: Operation interrupted or timed out"},
         {0, "Error 0"},
         {1, "Client fault"},
-        {2, "Server fault"},
         {3, "Validation constraint violation: tag name or namespace mismatch in element 't:tag'"},
         {4, "Validation constraint violation: data type mismatch xsd:int in element 't:tag'"},
-        {5, "Well-formedness violation"},
-        {6, "No XML root element"},
-        {7, "Array index out of bounds"},
         {8, "The data in element 't:tag' must be understood but cannot be handled"},
         {9, "Validation constraint violation: namespace error in element 't:tag'"},
-        {10, "User data error"},
-        {11, "Fatal error"},
         {13, "Method 't:tag' not implemented: method name or namespace not recognized"},
-        {14, "Data required for operation"},
-        {15, "HTTP GET method not implemented"},
-        {16, "HTTP PUT method not implemented"},
         {17, "Error 17"},
-        {18, "Error 18"},
-        {19, "HTTP method not implemented"},
-        {20, "Out of memory"},
-        {21, "Memory overflow or memory corruption error"},
-        {22, "Header line too long"},
         {23, "Validation constraint violation: nil not allowed in element 't:tag'"},
         {24,
          "Validation constraint violation: multiple definitions (use the SOAP_XML_TREE flag) of the same id "
          "#id7 in element 't:tag'"},
         {25, "Validation constraint violation: missing id for ref #id7 in element 't:tag'"},
         {26, "Validation constraint violation: incompatible object type ref/id pair #id7 in element 't:tag'"},
-        {27, "Message too large for UDP packet"},
-        {29, "An HTTP processing error occurred"},
-        {30, "SSL/TLS error"},
         {31, "Zlib/gzip error: ''"},
-        {32, "DIME format error"},
-        {33, "DIME href to missing attachment"},
-        {34, "DIME version/transmission error"},
-        {35, "End of DIME error"},
-        {36, "MIME format error"},
-        {37, "MIME href to missing attachment"},
-        {38, "End of MIME error"},
         {39, "Invalid SOAP message or SOAP version mismatch"},
-        {40, "Plugin registry error"},
-        {41, "Unsupported SOAP data encoding"},
         {42, "Validation constraint violation: missing required attribute in element 't:tag'"},
         {43, "Validation constraint violation: prohibited attribute present in element 't:tag'"},
         {44, "Validation constraint violation: occurrence violation in element 't:tag'"},
         {45, "Validation constraint violation: content range or length violation in element 't:tag'"},
         {46, "Maximum number of open connections was reached (no define HAVE_POLL): increase FD_SETSIZE"},
-        {47, "UTF content encoding error"},
-        {48, "An HTTP NTLM authentication error occurred"},
         {200, "Error 200"},
         {201, "HTTP Error: 201 Created"},
         {404, "HTTP Error: 404 Not Found"},
@@ -122,8 +94,20 @@ TEST(ErrorText, EveryCodeHasItsText)
         {1000, "Stopped: no response to be sent or received (informative)"},
         {1001, "Error 1001"},
     };
-    for (const text_case &c : cases)
+    for (const auto &c : cases)
         EXPECT_EQ(filled_text(c.error), c.text) << c.error;
+}
+
+TEST(ErrorText, EveryCodeHasATextOfItsOwn)
+{
+    std::set<std::string> texts;
+    for (int error = 1; error <= 48; ++error) {
+        if (error == SOAP_FAULT)
+            continue; // has the text of its fault
+        const std::string text = filled_text(error);
+        EXPECT_EQ(text == "Error " + std::to_string(error), error == 17 || error == 18) << text;
+        EXPECT_TRUE(texts.insert(text).second) << text;
+    }
 }
 
 TEST(ErrorText, ConstraintTextNamesTheElementIfThereIsOne)
@@ -137,27 +121,13 @@ TEST(ErrorText, ConstraintTextNamesTheElementIfThereIsOne)
         << "cut to the buffer";
 }
 
-TEST(ErrorText, EndOfInputNamesTheCause)
-{
-    soap ctx;
-    ctx.recv_timeout = 5;
-    EXPECT_STREQ(soap_eof_text(&ctx), "Operation interrupted or timed out (5 s receive delay)");
-    ctx.recv_timeout = -500;
-    ctx.send_timeout = INT_MIN;
-    EXPECT_STREQ(soap_eof_text(&ctx),
-                 "Operation interrupted or timed out (500us receive delay) (2147483648us send delay)");
-    ctx.errno_value = ECONNRESET;
-    EXPECT_STREQ(soap_eof_text(&ctx), std::strerror(ECONNRESET));
-}
-
 TEST(Fault, TheCodeFollowsTheVersionUnlessTheErrorHasItsOwn)
 {
-    struct code_case {
+    static const struct {
         int error;
         std::int16_t version;
         const char *code, *subcode;
-    };
-    static const code_case cases[] = {
+    } cases[] = {
         {5, 0, "SOAP-ENV:Client", nullptr},
         {5, 1, "SOAP-ENV:Client", nullptr},
         {5, 2, "SOAP-ENV:Sender", nullptr},
@@ -169,7 +139,7 @@ TEST(Fault, TheCodeFollowsTheVersionUnlessTheErrorHasItsOwn)
         {25, 2, "SOAP-ENV:Sender", "SOAP-ENC:MissingID"},
         {25, 1, "SOAP-ENV:Client", nullptr},
     };
-    for (const code_case &c : cases) {
+    for (const auto &c : cases) {
         SCOPED_TRACE(c.error);
         soap ctx;
         ctx.soap_version = c.version;

@@ -8,8 +8,6 @@
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_tcp.h>
 
-#include "support/loopback.h"
-#include "support/socket_calls.h"
 #include "support/tcp_client.h"
 
 namespace {
@@ -19,14 +17,7 @@ using loopback::bound_socket;
 using loopback::peer;
 using loopback::write_text;
 
-class tcp_service : public loopback::descriptor_test {
-protected:
-    void TearDown() override
-    {
-        socket_calls::fail_connect = socket_calls::fail_sendto = socket_calls::fail_recv = {};
-        descriptor_test::TearDown();
-    }
-};
+class tcp_service : public socket_test {};
 
 // --- datagrams ---
 

@@ -22,15 +22,13 @@ const subject BY_NAME{"peer.test", ""};
 
 // --- set-up ---
 
-struct setup_case {
-    const char *key, *ca, *dh, *random, *detail;
-};
-
 TEST_F(tls_setup, a_set_up_that_fails_says_why_and_leaves_no_context)
 {
     const std::string junk = ca().write("junk.pem", [](std::FILE *file) { std::fputs("junk\n", file); });
     const std::string lone = ca().ca_file(); // a certificate without a key
-    const setup_case cases[] = {
+    const struct {
+        const char *key, *ca, *dh, *random, *detail;
+    } cases[] = {
         {nullptr, "/nonexistent", nullptr, nullptr, "Can't read CA file"},
         {nullptr, junk.c_str(), nullptr, nullptr, "Can't read CA file"},
         {"/nonexistent", nullptr, nullptr, nullptr, "Can't read certificate key file"},
@@ -41,7 +39,7 @@ TEST_F(tls_setup, a_set_up_that_fails_says_why_and_leaves_no_context)
         {nullptr, nullptr, junk.c_str(), nullptr, "Can't set DH parameters"},
         {nullptr, nullptr, "8193", nullptr, "Can't set DH parameters"},
     };
-    for (const setup_case &c : cases) {
+    for (const auto &c : cases) {
         context ctx;
         EXPECT_EQ(soap_ssl_server_context(ctx.get(), TLS_NO_DEFAULT_CA, c.key, nullptr, c.ca, nullptr, c.dh,
                                           c.random, nullptr),
@@ -56,23 +54,19 @@ TEST_F(tls_setup, a_set_up_that_fails_says_why_and_leaves_no_context)
     EXPECT_EQ(ctx.fault_detail(), "Can't read CRL file");
 }
 
-TEST_F(tls_setup, options_follow_the_flags_and_a_second_set_up_adds_to_the_context)
+TEST_F(tls_setup, a_second_set_up_adds_to_the_context)
 {
     context ctx;
     ASSERT_EQ(set_up_client(ctx, VERIFIED), 0);
     SSL_CTX *const first = ctx->tls_context;
-    EXPECT_NE(SSL_CTX_get_options(first) & SSL_OP_NO_TICKET, 0u);
-    EXPECT_EQ(SSL_CTX_get_options(first) & SSL_OP_NO_TLSv1, 0u);
+    EXPECT_EQ(SSL_CTX_get_options(first) & (SSL_OP_NO_TICKET | SSL_OP_NO_TLSv1), SSL_OP_NO_TICKET);
     EXPECT_EQ(SSL_CTX_get_verify_mode(first), SSL_VERIFY_PEER);
     EXPECT_EQ(SSL_CTX_get_verify_depth(first), 9);
-    EXPECT_EQ(ctx->tls_verify, tls_verify_plain);
     ASSERT_EQ(set_up_client(ctx, TLS_NO_TLSV1 | TLS_NO_SSLV3 | TLS_NO_DEFAULT_CA | TLS_ALLOW_EXPIRED), 0);
     EXPECT_EQ(ctx->tls_context, first);
-    EXPECT_NE(SSL_CTX_get_options(first) & SSL_OP_NO_TLSv1, 0u);
-    EXPECT_NE(SSL_CTX_get_options(first) & SSL_OP_NO_SSLv3, 0u);
+    const std::uint64_t both = SSL_OP_NO_TLSv1 | SSL_OP_NO_SSLv3;
+    EXPECT_EQ(SSL_CTX_get_options(first) & both, both);
     EXPECT_EQ(SSL_CTX_get_verify_mode(first), SSL_VERIFY_NONE);
-    EXPECT_EQ(ctx->tls_verify, tls_verify_ignore_expiry);
-    EXPECT_EQ(ctx->tls_flags & TLS_CLIENT_SIDE, TLS_CLIENT_SIDE);
 }
 
 TEST_F(tls_setup, the_password_callback_needs_room_for_the_terminator)
