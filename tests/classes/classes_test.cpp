@@ -6,6 +6,7 @@
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
+#include <utility>
 
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_xml.h>
@@ -46,14 +47,19 @@ class Classes : public testing::Test {
 protected:
     Classes() : ctx(0, MODE_BARE_XML | MODE_BUFFERED) { soap_set_namespaces(&ctx, soap_program_namespaces); }
 
-    // The object as a document of its own: the element "root" of no namespace bears the type.
-    std::string write(const binding::class_ops &ops, const void *object, std::uint32_t mode)
+    void begin_message(const binding::class_ops &ops, const void *object)
     {
-        ctx.output_mode = MODE_BARE_XML | mode;
         ctx.sends.clear();
         ctx.encoding_style = nullptr;
         soap_reset_call(&ctx);
         ops.mark(object, &ctx);
+    }
+
+    // The object as a document of its own: the element "root" of no namespace bears the type.
+    std::string write(const binding::class_ops &ops, const void *object, std::uint32_t mode)
+    {
+        ctx.output_mode = MODE_BARE_XML | mode;
+        begin_message(ops, object);
         EXPECT_EQ(0, soap_count_begin(&ctx));
         std::uint64_t counted = 0;
         if ((mode & MODE_IO_MASK) == MODE_BUFFERED) {
@@ -146,6 +152,31 @@ TEST_F(Classes, come_back_equal_from_every_framing_and_mode)
         }
         const void *strict = read(ops, write(ops, object, MODE_BUFFERED), MODE_STRICT);
         EXPECT_NE(nullptr, strict) << ops.xml_type << " in strict mode, error " << ctx.error;
+    });
+}
+
+// A peer that goes away, or whose message breaks off, at every place that a class can be left at.
+TEST_F(Classes, end_in_an_error_wherever_their_bytes_stop)
+{
+    each_class([&](int id, const binding::class_ops &ops) {
+        source random(&ctx, static_cast<unsigned>(id));
+        void *object = soap_instantiate(&ctx, id, nullptr, nullptr, nullptr);
+        row_of(id)->fill(random, object, 1);
+        write(ops, object, MODE_DIRECT);
+        const std::vector<std::string> sends = std::exchange(ctx.sends, {});
+        std::string came;
+        for (std::size_t taken = 0; taken < sends.size(); came += sends[taken++]) {
+            if (sends[taken][0] != '<')
+                continue;
+            ctx.send_limit = taken;
+            begin_message(ops, object);
+            EXPECT_TRUE(soap_count_begin(&ctx) || soap_count_end(&ctx) || soap_send_begin(&ctx) ||
+                        put(ops, object) || soap_send_finish(&ctx));
+            EXPECT_EQ(-1, ctx.error);
+            EXPECT_TRUE(came == ctx.sent()) << ops.xml_type << " after " << taken << " of " << sends.size();
+            EXPECT_EQ(nullptr, read(ops, came, 0));
+        }
+        ctx.send_limit = std::numeric_limits<std::size_t>::max();
     });
 }
 
