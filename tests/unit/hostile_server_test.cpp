@@ -1,9 +1,11 @@
 // hostile_server_test.cpp - calls to a server that does what no healthy server does.
 //
 // Each call ends within its time limits, with its own answer or an error, and never with another's answer.
+// The table of what was found is printed.
 #include <algorithm>
 #include <atomic>
 #include <chrono>
+#include <cstdio>
 #include <future>
 #include <string>
 #include <vector>
@@ -328,6 +330,8 @@ void call_all(const hostility &peer, bool tls)
             EXPECT_EQ(caller.milliseconds >= -BRIEF_US / 1000, meets_limit) << peer.name;
         }
     }
+    std::printf("%-35s %-4s %-12s %d connections %5d ms\n", peer.name.c_str(), tls ? "TLS" : "TCP",
+                testing::PrintToString(codes).c_str(), caller.connections, longest);
     EXPECT_EQ(codes, peer.codes) << peer.name << (tls ? ", TLS" : "");
     EXPECT_EQ(caller.connections, (peer.traits & STAYS) != 0 ? 1 : 2) << peer.name;
     EXPECT_LT(longest, SLACK_MS) << peer.name;
@@ -338,6 +342,37 @@ TEST_F(hostile_server, costs_the_call_and_nothing_more)
     for (const bool tls : {false, true})
         for (const hostility &peer : all_peers())
             call_all(peer, tls);
+}
+
+TEST_F(hostile_server, cuts_an_answer_at_every_byte)
+{
+    const std::string name = "call-1", body = answer_body(name);
+    const std::string wholes[] = {with_length(body), in_chunks(body)};
+    for (const bool tls : {false, true}) {
+        for (const std::string &whole : wholes) {
+            // From here on the answer is there; what lacks is white space and the end of the framing.
+            const std::size_t sufficient = whole.find("Envelope>", whole.find("</E:Body>")) + 9;
+            int early = 0, answered = 0;
+            for (std::size_t cut = 0; cut < whole.size(); cut += tls ? 5 : 1) {
+                const server one(
+                    [&](line &end) {
+                        end.request();
+                        end.send(whole.substr(0, cut));
+                    },
+                    tls);
+                client caller(one);
+                const int code = caller.call();
+                early += code != 0;
+                answered += code == 0;
+                ASSERT_EQ(code == 0, cut >= sufficient) << code << " at " << cut << " of " << whole.size();
+                ASSERT_NE(code, OTHERS_ANSWER);
+                ASSERT_EQ(caller.call(), 0) << cut;
+                ASSERT_EQ(caller.connections, 2) << "a cut answer ends the connection";
+            }
+            std::printf("%s, %s: %d cuts are errors, %d behind the envelope aren't\n", tls ? "TLS" : "TCP",
+                        &whole == wholes ? "a length" : "chunks", early, answered);
+        }
+    }
 }
 
 using end_of_call = std::shared_future<void>;
@@ -400,14 +435,31 @@ TEST_F(hostile_server, meets_a_call_before_its_answer)
         const int code = caller.call(o.padding);
         over.set_value();
         const int milliseconds = caller.milliseconds;
+        const char *const detail = soap_fault_detail_value(&caller.proxy);
+        std::printf("%-35s code %2d %5d ms %s\n", o.name, code, milliseconds, detail ? detail : "");
         EXPECT_EQ(code, o.code) << o.name;
         if (o.detail) {
-            EXPECT_STREQ(soap_fault_detail_value(&caller.proxy), o.detail) << o.name;
+            EXPECT_STREQ(detail, o.detail) << o.name;
         }
         EXPECT_GE(milliseconds, o.least_ms) << o.name;
         EXPECT_LT(milliseconds, o.least_ms + SLACK_MS) << o.name;
         caller.proxy.endpoint = good;
         EXPECT_EQ(caller.call(), 0) << o.name;
+    }
+}
+
+TEST_F(hostile_server, is_called_again_after_a_forced_close)
+{
+    for (const bool tls : {false, true}) {
+        const server one(serve_well, tls);
+        client caller(one);
+        EXPECT_EQ(caller.call(), 0);
+        const int number = caller.proxy.socket;
+        EXPECT_EQ(caller.proxy.soap_force_close_socket(), 0);
+        EXPECT_EQ(caller.proxy.socket, number) << "the number stays";
+        EXPECT_EQ(caller.proxy.soap_force_close_socket(), 0) << "and is not closed again";
+        EXPECT_EQ(caller.call(), 0);
+        EXPECT_EQ(caller.connections, 2);
     }
 }
 
