@@ -43,6 +43,8 @@ constexpr std::size_t SOAP_POINTER_BLOCK_SIZE = 32;  // pointer records in one b
 constexpr std::size_t SOAP_POSITIONS_MAX = 16;       // array positions kept for SOAP-ENC:position
 constexpr std::size_t SOAP_LOG_CHANNELS = 3;         // received, sent, third
 constexpr std::uint32_t SOAP_MAX_DEPTH = 4096;       // default of soap::max_depth
+constexpr std::uint64_t SOAP_MAX_MESSAGE = std::uint64_t{1} << 30;  // bytes; default of soap::max_message
+constexpr std::uint64_t SOAP_MAX_MEMORY = std::uint64_t{512} << 20; // bytes; default of soap::max_memory
 
 // ---------------------------------------------------------------------------------------------
 // Mode flags: the same values serve `mode`, `input_mode` and `output_mode`.
@@ -76,6 +78,24 @@ constexpr std::uint32_t SOAP_XML_GRAPH = 0x20000000;     // id and ref in litera
 constexpr std::uint32_t MODE_MIME_AFTER = 0x40000000;    // the rest of the MIME parts is read after the call
 constexpr std::uint32_t MODE_WSU_ID = 0x80000000;        // wsu:Id on the Body of the next message sent
 
+// ---------------------------------------------------------------------------------------------
+// Older behaviour that a host may ask for: bits of soap::legacy. Each gives up a protection; none is set by
+// default.
+
+constexpr std::uint32_t LEGACY_ANY_ROUTE = 0x1; // a kept connection carries calls through another HTTP proxy
+                                                // or under other TLS rules than it was made with
+constexpr std::uint32_t LEGACY_TUNNEL_CREDENTIALS = 0x2; // a CONNECT head carries the service's credentials,
+                                                         // where the HTTP proxy can read them
+constexpr std::uint32_t LEGACY_ANSWER_CREDENTIALS = 0x4; // an Authorization header of a response replaces
+                                                         // auth_user and auth_password
+constexpr std::uint32_t LEGACY_FIRST_ADDRESS = 0x8;      // with connect_timeout, an address that is silent or
+                                                         // refuses late ends the attempt
+constexpr std::uint32_t LEGACY_ANY_ENDPOINT = 0x10; // a proxy object's call takes endpoints without a host,
+                                                    // with any port and any scheme
+constexpr std::uint32_t LEGACY_CLOSE_WAIT = 0x20;   // closing TLS waits for the peer's close_notify
+constexpr std::uint32_t LEGACY_HOST_CHECK = 0x40;   // the default host check matches names as patterns
+
+// ---------------------------------------------------------------------------------------------
 // Stages of a message, kept in soap::message_part.
 constexpr std::int16_t PART_BEGIN = 0;
 constexpr std::int16_t PART_ENVELOPE = 2;
@@ -222,13 +242,19 @@ struct ZUV_CLASS soap {
     const char *actor;          // borrowed; actor or role to send, and the one this receiver plays
     const char *language;       // borrowed; xml:lang of fault texts
     int recv_timeout, send_timeout, connect_timeout, accept_timeout; // 0 none, > 0 s, < 0 us
-    int socket_flags;                                                // flags for send and recv
-    int connect_flags;                // SOL_SOCKET option to set on a client socket, or SO_LINGER; 0 none
-    int bind_flags, accept_flags;     // the same for a listening and an accepted socket
-    std::uint16_t linger_seconds;     // l_linger when the option above is SO_LINGER
-    const soap_namespace *namespaces; // borrowed; static table
-    soap_namespace *local_namespaces; // owned copy, made by the first message
-    soap_prefix *prefix_list;         // innermost first
+    int call_timeout;          // the same for a whole exchange, from connecting to the response's last byte
+    std::uint32_t legacy;      // LEGACY_...
+    std::uint64_t max_message; // most bytes of one message's XML, both ways, as plain text: after framing and
+                               // decompression, attachments through callbacks not counted; 0 no limit
+    std::uint64_t max_memory;  // most bytes held for one message in objects, texts, blocks and attachments; 0
+                               // no limit
+    int socket_flags;          // flags for send and recv
+    int connect_flags;         // SOL_SOCKET option to set on a client socket, or SO_LINGER; 0 none
+    int bind_flags, accept_flags;          // the same for a listening and an accepted socket
+    std::uint16_t linger_seconds;          // l_linger when the option above is SO_LINGER
+    const soap_namespace *namespaces;      // borrowed; static table
+    soap_namespace *local_namespaces;      // owned copy, made by the first message
+    soap_prefix *prefix_list;              // innermost first
     soap_namespace_scope *namespace_scope; // owned; null until first use; kept from call to call
     soap_block_stack *block_stack;
     soap_instance *instance_list;        // newest first

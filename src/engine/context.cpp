@@ -78,6 +78,8 @@ static void set_field_defaults(soap *ctx)
     ctx->send_fd = 1;
     ctx->recv_fd = 0;
     ctx->max_depth = SOAP_MAX_DEPTH;
+    ctx->max_message = SOAP_MAX_MESSAGE;
+    ctx->max_memory = SOAP_MAX_MEMORY;
     ctx->path[0] = '/';
     ctx->keep_alive_limit = 100;
     ctx->proxy_http_version = "1.0";
