@@ -20,3 +20,13 @@ foreach(source ${ZUV_FUZZ_TARGETS})
     file(MAKE_DIRECTORY ${PROJECT_BINARY_DIR}/corpus/${target})
     set_tests_properties(${name} PROPERTIES LABELS fuzz TIMEOUT 120)
 endforeach()
+
+# One target has a fault on purpose, and has to find it.
+add_executable(fault_fuzz ${PROJECT_SOURCE_DIR}/tests/fuzz/http_head_fuzz.cpp)
+target_include_directories(fault_fuzz PRIVATE ${PROJECT_SOURCE_DIR}/tests)
+target_compile_definitions(fault_fuzz PRIVATE ZUV_FUZZ_FAULT)
+target_link_libraries(fault_fuzz PRIVATE zuv_objects)
+target_link_options(fault_fuzz PRIVATE -fsanitize=fuzzer)
+add_test(NAME fuzz_fault COMMAND sh ${PROJECT_SOURCE_DIR}/tests/fuzz/fault_is_found.sh $<TARGET_FILE:fault_fuzz>
+    ${PROJECT_SOURCE_DIR}/tests/fuzz/corpus/http_head ${PROJECT_BINARY_DIR}/fault)
+set_tests_properties(fuzz_fault PROPERTIES LABELS fuzz TIMEOUT 120)

@@ -29,9 +29,11 @@ add_dependencies(public_headers_alone zuv_generated)
 # One of everything, translated, compiled and sent through the rules. Its registry and its namespaces stand in for the
 # library's: being objects of the program, they come ahead of those in the archive.
 zuv_translate_contract(${GENERATOR_TESTS}/everything ${PROJECT_BINARY_DIR}/everything everything_headers everything_sources)
+add_custom_target(everything_generated DEPENDS ${everything_headers} ${everything_sources})
 add_executable(everything_test ${GENERATOR_TESTS}/everything_test.cpp ${everything_sources} ${everything_headers})
 target_include_directories(everything_test PRIVATE
     ${PROJECT_BINARY_DIR}/everything/include ${PROJECT_BINARY_DIR}/everything/src
     ${PROJECT_SOURCE_DIR}/src ${PROJECT_SOURCE_DIR}/tests)
 target_link_libraries(everything_test PRIVATE zuv_objects zuv_flags GTest::gtest_main Threads::Threads)
+add_dependencies(everything_test everything_generated)
 add_test(NAME everything_test COMMAND everything_test)

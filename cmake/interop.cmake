@@ -30,7 +30,7 @@ add_test(NAME transfer COMMAND /usr/bin/python3 -B ${INTEROP}/transfer.py 400000
     $<TARGET_FILE:zuv-service> $<TARGET_FILE:zuv>)
 set_tests_properties(transfer PROPERTIES LABELS soak TIMEOUT 300)
 
-zuv_add_test(soak_test ${PROJECT_SOURCE_DIR}/tests/soak/soak_test.cpp)
+zuv_add_test(soak_test ${PROJECT_SOURCE_DIR}/tests/soak/soak_test.cpp) # script/soak makes more calls
 target_link_libraries(soak_test PRIVATE zuv_service_test_support)
 add_dependencies(soak_test zuv-service)
 set_tests_properties(soak_test PROPERTIES LABELS soak)

@@ -2,7 +2,7 @@
 file(GLOB ZUV_SOURCES CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/src/*/*.cpp)
 add_library(zuv_objects STATIC ${ZUV_SOURCES})
 target_include_directories(zuv_objects PUBLIC ${PROJECT_SOURCE_DIR}/include PRIVATE ${PROJECT_SOURCE_DIR}/src)
-target_link_libraries(zuv_objects PUBLIC OpenSSL::SSL OpenSSL::Crypto ZLIB::ZLIB PRIVATE zuv_flags)
+target_link_libraries(zuv_objects PUBLIC OpenSSL::SSL OpenSSL::Crypto ZLIB::ZLIB PRIVATE zuv_flags zuv_hardening)
 
 # Places that wait for a late reference hold pointers of any type, and a host may pass a null reference for the response.
 # Calls within a unit are not left open to a host that defines a function of the same name.
@@ -21,7 +21,7 @@ target_compile_features(zuv_client_pro INTERFACE cxx_std_17)
 target_include_directories(zuv_client_pro INTERFACE
     $<BUILD_INTERFACE:${PROJECT_SOURCE_DIR}/include>
     $<BUILD_INTERFACE:${PROJECT_BINARY_DIR}/generated/include>)
-target_link_libraries(zuv_client_pro INTERFACE OpenSSL::SSL OpenSSL::Crypto ZLIB::ZLIB)
+target_link_libraries(zuv_client_pro INTERFACE OpenSSL::SSL OpenSSL::Crypto ZLIB::ZLIB PRIVATE zuv_hardening)
 target_link_options(zuv_client_pro PRIVATE
     -Wl,--whole-archive $<TARGET_FILE:zuv_objects> -Wl,--no-whole-archive
     -Wl,--version-script=${PROJECT_SOURCE_DIR}/cmake/exports.map)

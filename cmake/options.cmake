@@ -3,6 +3,7 @@ set(ZUV_AUTHORITY "http://www.zuv.example" CACHE STRING "Authority of the servic
 option(ZUV_BUILD_TESTS "Build the test suite" ON)
 option(ZUV_BUILD_BENCH "Build the benchmarks" OFF)
 option(ZUV_SANITIZE "Build with AddressSanitizer and UndefinedBehaviorSanitizer" OFF)
+option(ZUV_THREADS "Build with ThreadSanitizer" OFF)
 option(ZUV_COVERAGE "Build with coverage counters" OFF)
 option(ZUV_FUZZ "Build the libFuzzer targets (needs clang)" OFF)
 
@@ -28,6 +29,10 @@ target_compile_options(zuv_flags INTERFACE -Wall -Wextra -Wpedantic -Wshadow -Wc
 if(ZUV_SANITIZE)
     add_compile_options(-fsanitize=address,undefined -fno-sanitize-recover=all -fno-omit-frame-pointer -g)
     add_link_options(-fsanitize=address,undefined)
+endif()
+if(ZUV_THREADS)
+    add_compile_options(-fsanitize=thread -fno-omit-frame-pointer -g1)
+    add_link_options(-fsanitize=thread)
 endif()
 if(ZUV_COVERAGE)
     add_compile_options(--coverage -fprofile-update=atomic -O0 -g) # atomic: the service runs threads

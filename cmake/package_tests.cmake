@@ -1,6 +1,6 @@
 # The shared object as a stranger gets it: what it exports and needs, and hosts built from the packages alone. To be
 # included behind install.cmake and packages.cmake.
-if(ZUV_SANITIZE OR ZUV_FUZZ OR ZUV_COVERAGE)
+if(ZUV_SANITIZE OR ZUV_THREADS OR ZUV_FUZZ OR ZUV_COVERAGE)
     return() # such objects are not what is handed out
 endif()
 set(PACKAGE_TESTS ${PROJECT_SOURCE_DIR}/tests/package)
@@ -9,6 +9,11 @@ set(TEST_PACKAGES ${PROJECT_BINARY_DIR}/package_tests/packages)
 add_test(NAME library_surface COMMAND /usr/bin/python3 -B ${PROJECT_SOURCE_DIR}/tests/abi/surface.py
     $<TARGET_FILE:zuv_client_pro> ${PROJECT_SOURCE_DIR}/docs/interface/exported_names.txt
     ${PROJECT_SOURCE_DIR}/include/zuv_client_pro ${ZUV_GENERATED_DIR}/include/zuv_client_pro)
+
+if(CMAKE_BUILD_TYPE MATCHES Rel) # else copies go unchecked
+    add_test(NAME hardening COMMAND /usr/bin/python3 -B ${PACKAGE_TESTS}/hardening_test.py $<TARGET_FILE:zuv_client_pro>
+        $<TARGET_FILE:zuv-service> $<TARGET_FILE:zuv>)
+endif()
 
 add_test(NAME public_headers COMMAND sh ${PACKAGE_TESTS}/public_headers.sh ${PROJECT_SOURCE_DIR}/include
     ${ZUV_GENERATED_DIR}/include)

@@ -330,6 +330,7 @@ struct ZUV_CLASS soap {
     int filter_stop;          // result of the read that a receive filter is holding back
     int master_socket;        // listening socket; -1 none
     int socket;               // connected socket; -1 none
+    std::uint16_t opened_by;  // which process of a forking host opened `socket`; 0: not for a call
     bool socket_abandoned;    // soap_force_close closed `socket`: the number is neither used nor closed again
     bool response_unfinished; // the last response was not read to its end: the connection carries no other
                               // call

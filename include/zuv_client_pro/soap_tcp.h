@@ -47,11 +47,14 @@ ZUV_API int tcp_send(soap *ctx, const char *data, std::size_t length);
 ZUV_API std::size_t tcp_recv(soap *ctx, char *buffer, std::size_t length);
 
 // Closes the TLS layer, whose session is kept for the next connection to the same host and port, and the
-// socket (default of on_close). A UDP socket stays open. Returns 0, or 30 if TLS did not close properly.
+// socket (default of on_close). A UDP socket stays open. What a parent process connected is its connection:
+// a child closes its own descriptor alone, and says nothing on it. Returns 0, or 30 if TLS did not close
+// properly.
 ZUV_API int tcp_disconnect(soap *ctx);
 
 // Asks whether a kept connection may carry another call (default of on_poll): 0 if it may. Otherwise -1, or
-// 28 with a fault if it can't be asked. Bytes that nobody asked for make a connection unusable. Never blocks.
+// 28 with a fault if it can't be asked. Bytes that nobody asked for make a connection unusable, and so does a
+// fork since it was made. Never blocks.
 ZUV_API int tcp_peek(soap *ctx);
 
 // Ends a transaction: closes the connection (on_close) after an end of input, a network or TLS failure, a

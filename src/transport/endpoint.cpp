@@ -79,6 +79,7 @@ int open_connection(soap *ctx, const char *endpoint)
 {
     ctx->socket = ctx->on_open(ctx, endpoint, ctx->host, ctx->port);
     ctx->socket_abandoned = false;
+    ctx->opened_by = tcp_process();
     ctx->response_unfinished = false;
     if (ctx->error != SOAP_OK)
         return ctx->error;

@@ -62,6 +62,11 @@ int peek_master(soap *ctx)
 
 int tcp_disconnect(soap *ctx)
 {
+    if (tcp_inherited(ctx)) {
+        tls_discard(ctx);
+        tcp_drop_socket(ctx);
+        return 0;
+    }
     const int tls_result = tls_close(ctx);
     if (tcp_is_udp(ctx) && soap_socket_open(ctx))
         return tls_result;
@@ -75,6 +80,8 @@ int tcp_peek(soap *ctx)
 {
     if (!soap_socket_open(ctx))
         return peek_master(ctx);
+    if (tcp_inherited(ctx))
+        return -1;
     if (tls_active(ctx) && tls_has_pending(ctx) && tls_peek(ctx) != 0)
         return -1;
     const int ready = tcp_wait(ctx, ctx->socket, WAIT_ALL, 0);

@@ -5,9 +5,11 @@
 #include "transport/tcp_socket.h"
 
 #include <cerrno>
+#include <cstdint>
 #include <cstdio>
 #include <cstring>
 #include <fcntl.h>
+#include <pthread.h>
 #include <sys/select.h>
 #include <unistd.h>
 
@@ -48,7 +50,28 @@ private:
     fd_set set_;
 };
 
+std::uint16_t process = 1;
+
+void note_fork()
+{
+    process = process == UINT16_MAX ? 1 : static_cast<std::uint16_t>(process + 1);
+}
+
 } // namespace
+
+// Counted by forks and not asked of the system, which would be a call for each use of a kept connection.
+// Forks before the first connection don't matter, so they go uncounted.
+std::uint16_t tcp_process()
+{
+    static const int counting = pthread_atfork(nullptr, nullptr, note_fork);
+    static_cast<void>(counting); // with no memory for the hook a fork goes unnoticed, as it would without it
+    return process;
+}
+
+bool tcp_inherited(const soap *ctx)
+{
+    return ctx->opened_by != 0 && ctx->opened_by != process;
+}
 
 int tcp_wait(soap *ctx, int socket, int flags, int timeout)
 {
@@ -104,6 +127,7 @@ void tcp_store_socket(soap *ctx, int socket)
 {
     ctx->socket = socket;
     ctx->socket_abandoned = false;
+    ctx->opened_by = 0;
     ctx->response_unfinished = false;
 }
 

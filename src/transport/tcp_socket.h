@@ -19,6 +19,13 @@ inline bool soap_socket_open(const soap *ctx)
     return ctx->socket != -1 && !ctx->socket_abandoned;
 }
 
+// The number of this process among those that a host forks from one another; never 0.
+std::uint16_t tcp_process();
+
+// True if a parent of this process connected ctx->socket. The connection is the parent's: nothing may be sent
+// on it here, not even its end, which would also end the parent's.
+bool tcp_inherited(const soap *ctx);
+
 // Datagrams or a stream: the output mode decides for both directions.
 inline bool tcp_is_udp(const soap *ctx)
 {

@@ -1,10 +1,27 @@
 // http_head_fuzz.cpp - heads of requests and responses, read by the default callbacks.
+//
+// With ZUV_FUZZ_FAULT it has a fault on purpose, for fault_is_found.sh to see that one is found.
 #include <cstdint>
+#include <cstring>
 #include <string>
 
 #include <zuv_client_pro/soap_http.h>
 
 #include "support/memory_wire.h"
+
+namespace {
+
+// One byte too few, for a status that no seed has.
+[[maybe_unused]] void keep_start_line(const soap &ctx)
+{
+    if (ctx.status != 407)
+        return;
+    char *copy = new char[std::strlen(ctx.message_text)];
+    std::strcpy(copy, ctx.message_text);
+    delete[] copy;
+}
+
+} // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size)
 {
@@ -18,5 +35,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size
     soap_reset_call(&wire);
     if (soap_receive_begin(&wire) == 0)
         soap_receive_finish(&wire);
+#ifdef ZUV_FUZZ_FAULT
+    keep_start_line(wire);
+#endif
     return 0;
 }

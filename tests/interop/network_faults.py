@@ -20,22 +20,27 @@ SLACK_MS = 5000
 
 
 def run(*arguments):
-    return subprocess.run([command(arguments[0]), *arguments[1:]], capture_output=True, text=True)
+    return subprocess.run(arguments, capture_output=True, text=True)
 
 
 class Network:
-    """The two ends; their names hold the process's number, so that tests can run side by side."""
+    """The two ends. Each namespace is that of a process that waits for its input to end, and goes with it: nothing has to be
+    mounted, and nothing stays, however the test ends."""
 
     def __init__(self):
-        self.near, self.far = "near%d" % os.getpid(), "far%d" % os.getpid()
-        self.in_near, self.in_far = ([command("ip"), "netns", "exec", name] for name in (self.near, self.far))
+        self.ends = [subprocess.Popen(["unshare", "--net", "cat"], stdin=subprocess.PIPE, stdout=subprocess.PIPE,
+                                      stderr=subprocess.PIPE, bufsize=0) for _ in range(2)]
+        self.in_near, self.in_far = (["nsenter", "--net=/proc/%d/ns/net" % end.pid] for end in self.ends)
         self.failure = self._set_up()
 
     def _set_up(self):
-        near = ["ip", "-n", self.near]
-        far = ["ip", "-n", self.far]
-        for step in (["ip", "netns", "add", self.near], ["ip", "netns", "add", self.far],
-                     [*near, "link", "add", "cable", "type", "veth", "peer", "name", "cable", "netns", self.far],
+        for end in self.ends:
+            with contextlib.suppress(BrokenPipeError):
+                end.stdin.write(b"\n")
+            if not end.stdout.readline():
+                return end.stderr.read().decode().strip()
+        near, far = ([*inside, command("ip")] for inside in (self.in_near, self.in_far))
+        for step in ([*near, "link", "add", "cable", "type", "veth", "peer", "name", "cable", "netns", str(self.ends[1].pid)],
                      [*near, "address", "add", CLIENT + "/24", "dev", "cable"], [*near, "link", "set", "cable", "up"],
                      [*far, "address", "add", SERVER + "/24", "dev", "cable"], [*far, "link", "set", "cable", "up"],
                      [*far, "link", "set", "lo", "up"],
@@ -47,8 +52,8 @@ class Network:
         return None
 
     def end(self):
-        for name in (self.near, self.far):
-            run("ip", "netns", "del", name)
+        for end in self.ends:
+            end.communicate()
 
     def unplugged(self):
         """From here to the end of the block packets leave and vanish, both ways."""
@@ -56,16 +61,16 @@ class Network:
 
     @contextlib.contextmanager
     def _far_neighbours(self, address):
-        for place, other in ((self.near, SERVER), (self.far, CLIENT)):
-            assert run("ip", "-n", place, "neigh", "replace", other, "lladdr", address, "dev", "cable").returncode == 0
+        for inside, other in ((self.in_near, SERVER), (self.in_far, CLIENT)):
+            assert run(*inside, command("ip"), "neigh", "replace", other, "lladdr", address, "dev", "cable").returncode == 0
         yield
-        for place, other in ((self.near, SERVER), (self.far, CLIENT)):
-            assert run("ip", "-n", place, "neigh", "del", other, "dev", "cable").returncode == 0
+        for inside, other in ((self.in_near, SERVER), (self.in_far, CLIENT)):
+            assert run(*inside, command("ip"), "neigh", "del", other, "dev", "cable").returncode == 0
 
     def impaired(self, *how):
         """Makes the cable so, both ways. An error text, or none."""
-        for place in (self.near, self.far):
-            done = run("ip", "netns", "exec", place, command("tc"), "qdisc", "replace", "dev", "cable", "root", "netem", *how)
+        for inside in (self.in_near, self.in_far):
+            done = run(*inside, command("tc"), "qdisc", "replace", "dev", "cable", "root", "netem", *how)
             if done.returncode != 0:
                 return done.stderr.strip()
         return None

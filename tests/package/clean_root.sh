@@ -12,8 +12,7 @@ here=$(cd "$(dirname "$0")" && pwd)
 [ "$(id -u)" -eq 0 ] || { echo "skipped: only root can make a clean root"; exit 77; }
 command -v debootstrap >/dev/null || { echo "skipped: debootstrap is not installed"; exit 77; }
 
-mirror=$(grep -hoE 'https?://[^ ]+/debian/?( |$)' /etc/apt/sources.list /etc/apt/sources.list.d/* 2>/dev/null | head -1) || true
-mirror=${mirror:-http://deb.debian.org/debian}
+. "$here/../../script/bare_root.sh"
 root=$work/root
 trap 'rm -rf --one-file-system "$root"' EXIT
 
@@ -24,32 +23,17 @@ install() { # names of packages, or patterns of files
     within sh -c "apt-get install -y -q --no-install-recommends $*" >"$work/apt.log" 2>&1 ||
         { cat "$work/apt.log"; return 1; }
 }
-keep() { # archive of the root as it is
-    within apt-get clean
-    tar -C "$root" -cf "$work/$1.tar.new" .
-    mv "$work/$1.tar.new" "$work/$1.tar"
-}
 restore() {
-    rm -rf --one-file-system "$root"
-    mkdir -p "$root"
-    tar -C "$root" -xf "$work/$1.tar"
-    cp /etc/resolv.conf "$root/etc/resolv.conf"
+    bare_root "$work/$1.tar" "$root"
     mkdir "$root/packages"
     cp "$packages"/*.deb "$root/packages"
 }
 
-if [ ! -f "$work/bare.tar" ]; then
-    rm -rf --one-file-system "$root"
-    debootstrap --variant=minbase bookworm "$root" "$mirror" >"$work/debootstrap.log" 2>&1 ||
-        { tail -20 "$work/debootstrap.log"; exit 1; }
-    keep bare
-fi
 if [ ! -f "$work/compilers.tar" ]; then
-    restore bare
+    bare_root "$work/bare.tar" "$root"
     within apt-get update -q >"$work/apt.log" 2>&1
     install g++ cmake make pkg-config libssl-dev zlib1g-dev
-    rm -rf "$root/packages"
-    keep compilers
+    bare_root_keep "$work/compilers.tar" "$root"
 fi
 
 restore bare

@@ -33,6 +33,7 @@ public:
     service_process &operator=(const service_process &) = delete;
 
     int port() const { return port_; } // 0: it did not start
+    pid_t pid() const { return pid_; }
     std::string url(const char *port_name) const;
     bool running();
 

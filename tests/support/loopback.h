@@ -6,6 +6,7 @@
 #include <cstddef>
 #include <filesystem>
 #include <functional>
+#include <list>
 #include <memory>
 #include <netinet/in.h>
 #include <string>
@@ -96,6 +97,27 @@ public:
 private:
     bound_socket listener_;
     std::thread thread_;
+};
+
+// A peer that serves all its clients at the same time, each on a thread. Its end waits for those being
+// served.
+class crowd {
+public:
+    crowd(std::function<void(int)> serve, int clients)
+        : peer_(
+              [this, serve = std::move(serve)](int client) {
+                  served_.emplace_back([serve, own = dup(client)] {
+                      serve(own);
+                      close(own);
+                  });
+              },
+              clients)
+    {}
+    int port() const { return peer_.port(); }
+
+private:
+    std::list<std::jthread> served_;
+    peer peer_;
 };
 
 // Reads until the peer ends, or `length` bytes.

@@ -3,11 +3,11 @@
 // It tells whose answer an answer is: the name in the request comes back in it.
 #pragma once
 
+#include <atomic>
 #include <cstdio>
 #include <functional>
 #include <netinet/tcp.h>
 #include <string>
-#include <utility>
 
 #include "support/tls_peer.h"
 
@@ -120,10 +120,11 @@ inline void serve_well(line &client)
         client.send(answer_to(request));
 }
 
-// The first connection goes as `first` has it, all later ones well.
-class server {
+// The first connection goes as `first` has it, all later ones well. Acceptor: a peer, which serves one client
+// after the other, or a crowd.
+template <class Acceptor> class basic_server {
 public:
-    explicit server(std::function<void(line &)> first, bool tls = false)
+    explicit basic_server(std::function<void(line &)> first, bool tls = false)
         : context_(tls ? tls_peers::server_for({"peer.test", ""}) : nullptr),
           peer_([this, first = std::move(first)](int client) { serve(client, first); }, 1000000)
     {}
@@ -132,11 +133,12 @@ public:
     {
         return (context_ ? "https://peer.test:" : "http://peer.test:") + std::to_string(port()) + "/";
     }
+    int connections() const { return connections_; }
 
 private:
     void serve(int client, const std::function<void(line &)> &first)
     {
-        const auto &script = std::exchange(is_first_, false) ? first : WELL;
+        const auto &script = connections_++ == 0 ? first : WELL;
         const tls_peers::server_connection tls(context_ ? SSL_new(context_.get()) : nullptr);
         if (tls) {
             SSL_set_fd(tls.get(), client);
@@ -149,9 +151,16 @@ private:
             SSL_shutdown(tls.get());
     }
     inline static const std::function<void(line &)> WELL = serve_well;
-    bool is_first_ = true;
+    std::atomic<int> connections_ = 0;
     tls_peers::server_context context_;
-    loopback::peer peer_;
+    Acceptor peer_;
+};
+using server = basic_server<loopback::peer>;
+
+// Serves all its clients at once, and well.
+class crowd_server : public basic_server<loopback::crowd> {
+public:
+    explicit crowd_server(bool tls) : basic_server(serve_well, tls) {}
 };
 
 } // namespace scripted

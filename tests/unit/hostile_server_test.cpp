@@ -17,83 +17,17 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_log.h>
 
-#include "support/scripted_server.h"
+#include "support/scripted_client.h"
 #include "support/socket_calls.h"
 
 namespace {
 
 using namespace scripted;
 
-constexpr int GUARD_S = 10;         // time limit of transfers where none should be met
-constexpr int BRIEF_US = -200000;   // as a time limit: microseconds
-constexpr int SLACK_MS = 5000;      // for a machine that is busy
-constexpr int OTHERS_ANSWER = 9999; // in place of a code
+constexpr int BRIEF_US = -200000; // as a time limit: microseconds
+constexpr int SLACK_MS = 5000;    // for a machine that is busy
 
 class hostile_server : public tls_peers::tls_test {};
-
-// A client that keeps its connection and counts those it needed.
-class client {
-public:
-    explicit client(const server &to) : endpoint_(to.endpoint())
-    {
-        soap_log_set_received(&proxy, nullptr);
-        soap_log_set_sent(&proxy, nullptr);
-        proxy.endpoint = endpoint_.c_str();
-        proxy.input_mode = proxy.output_mode = MODE_KEEP_ALIVE;
-        proxy.connect_timeout = proxy.send_timeout = proxy.recv_timeout = GUARD_S;
-        proxy.user = this;
-        open_ = proxy.on_open;
-        proxy.on_open = [](soap *ctx, const char *url, const char *host, int port) {
-            client &self = *static_cast<client *>(ctx->user);
-            ++self.connections;
-            return self.open_(ctx, url, host, port);
-        };
-        if (endpoint_.starts_with("https")) {
-            const std::string &trusted = ca_file();
-            EXPECT_EQ(soap_ssl_client_context(&proxy, tls_peers::VERIFIED, nullptr, nullptr, trusted.c_str(),
-                                              nullptr, nullptr),
-                      0);
-        }
-    }
-    client(const client &) = delete;
-    client &operator=(const client &) = delete;
-
-    // The code of one call. `padding`: bytes of text besides.
-    int call(std::size_t padding = 0)
-    {
-        using namespace std::chrono;
-        std::string name = "call-" + std::to_string(++calls_), text(padding, 'p');
-        protocol__Identity identity;
-        identity.name = &name;
-        protocolProfile__ProfileContent request;
-        request.identity = &identity;
-        request.profileAuthority = &text;
-        __protocolProfile__createResponse response{};
-        proxy.destroy();
-        const auto began = steady_clock::now();
-        const int code = proxy.create(&request, response);
-        milliseconds =
-            static_cast<int>(duration_cast<std::chrono::milliseconds>(steady_clock::now() - began).count());
-        if (code != 0)
-            return code;
-        const bool own = response.result && response.result->identity && response.result->identity->name &&
-                         *response.result->identity->name == name;
-        return own ? 0 : OTHERS_ANSWER;
-    }
-
-    ProfileSoapBindingProxy proxy;
-    int connections = 0, milliseconds = 0;
-
-private:
-    static const std::string &ca_file()
-    {
-        static const std::string path = tls_peers::ca().ca_file();
-        return path;
-    }
-    std::string endpoint_;
-    int (*open_)(soap *, const char *, const char *, int) = nullptr;
-    int calls_ = 0;
-};
 
 // --- scripts of the first connection ---
 

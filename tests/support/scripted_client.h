@@ -1,0 +1,97 @@
+// scripted_client.h - a client of the scripted servers: whether a call brought its own answer, and by how
+// many connections.
+#pragma once
+
+#include <atomic>
+#include <chrono>
+#include <string>
+
+#include <zuv_client_pro/ProfileSoapBindingProxy.h>
+#include <zuv_client_pro/protocol.h>
+#include <zuv_client_pro/soap_log.h>
+
+#include "support/scripted_server.h"
+
+namespace scripted {
+
+constexpr int GUARD_S = 10;         // time limit of transfers where none should be met
+constexpr int OTHERS_ANSWER = 9999; // in place of a code
+
+// A client that keeps its connection and counts those it needed.
+class client {
+public:
+    template <class Server> explicit client(const Server &to) : endpoint_(to.endpoint())
+    {
+        proxy.endpoint = endpoint_.c_str();
+        proxy.input_mode = proxy.output_mode = MODE_KEEP_ALIVE;
+        proxy.connect_timeout = proxy.send_timeout = proxy.recv_timeout = GUARD_S;
+        open_ = proxy.on_open;
+        proxy.on_open = count_and_open;
+        be_own();
+        if (endpoint_.starts_with("https")) {
+            const std::string &trusted = ca_file();
+            EXPECT_EQ(soap_ssl_client_context(&proxy, tls_peers::VERIFIED, nullptr, nullptr, trusted.c_str(),
+                                              nullptr, nullptr),
+                      0);
+        }
+    }
+    // A client of its own with the settings of another, as a host's threads have them.
+    explicit client(const client &settings)
+        : proxy(static_cast<const soap &>(settings.proxy)), endpoint_(settings.endpoint_),
+          open_(settings.open_)
+    {
+        proxy.endpoint = endpoint_.c_str();
+        be_own();
+    }
+    client &operator=(const client &) = delete;
+
+    // The code of one call. `padding`: bytes of text besides.
+    int call(std::size_t padding = 0)
+    {
+        using namespace std::chrono;
+        std::string name = "call-" + std::to_string(++names_), text(padding, 'p');
+        protocol__Identity identity;
+        identity.name = &name;
+        protocolProfile__ProfileContent request;
+        request.identity = &identity;
+        request.profileAuthority = &text;
+        __protocolProfile__createResponse response{};
+        proxy.destroy();
+        const auto began = steady_clock::now();
+        const int code = proxy.create(&request, response);
+        milliseconds =
+            static_cast<int>(duration_cast<std::chrono::milliseconds>(steady_clock::now() - began).count());
+        if (code != 0)
+            return code;
+        const bool own = response.result && response.result->identity && response.result->identity->name &&
+                         *response.result->identity->name == name;
+        return own ? 0 : OTHERS_ANSWER;
+    }
+
+    ProfileSoapBindingProxy proxy;
+    int connections = 0, milliseconds = 0;
+
+private:
+    void be_own()
+    {
+        soap_log_set_received(&proxy, nullptr);
+        soap_log_set_sent(&proxy, nullptr);
+        proxy.user = this;
+    }
+    static int count_and_open(soap *ctx, const char *url, const char *host, int port)
+    {
+        client &self = *static_cast<client *>(ctx->user);
+        ++self.connections;
+        return self.open_(ctx, url, host, port);
+    }
+    static const std::string &ca_file()
+    {
+        static const std::string path = tls_peers::ca().ca_file();
+        return path;
+    }
+    std::string endpoint_;
+    int (*open_)(soap *, const char *, const char *, int) = nullptr;
+    inline static std::atomic<int> names_ = 0; // no two clients say the same
+};
+
+} // namespace scripted

@@ -1,0 +1,101 @@
+// fork_test.cpp - a host that forks: the child's calls and ends leave the parent's connections alone.
+#include <functional>
+#include <memory>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <gtest/gtest.h>
+#include <zuv_client_pro/soap_tcp.h>
+
+#include "support/scripted_client.h"
+#include "support/socket_calls.h"
+
+namespace {
+
+using namespace scripted;
+using loopback::context;
+
+constexpr int CHILD_LIMIT_S = 30;
+constexpr int NOTHING_SAID = 77; // exit status of a child whose calls all brought their own answers
+
+struct child_row {
+    const char *rule;
+    std::function<bool(std::unique_ptr<client> &)> act; // in the child; false: not as it should be
+    int connections;                                    // that the child makes
+};
+
+const child_row CHILDREN[] = {
+    {"calls twice on the inherited proxy",
+     [](std::unique_ptr<client> &own) { return own->call() == 0 && own->call() == 0; }, 1},
+    {"lets go of it", [](std::unique_ptr<client> &own) { return own.reset(), true; }, 0},
+    {"closes it and calls",
+     [](std::unique_ptr<client> &own) {
+         own->proxy.keep_alive = 0;
+         return own->proxy.soap_close_socket() == 0 && own->proxy.socket == -1 && own->call() == 0;
+     },
+     1},
+    {"closes it by force and calls",
+     [](std::unique_ptr<client> &own) {
+         return own->proxy.soap_force_close_socket() == 0 && own->call() == 0;
+     },
+     1},
+    {"calls on a copy", [](std::unique_ptr<client> &own) { return client(*own).call() == 0; }, 1},
+};
+
+// The exit status of a child that does so.
+int child_that(const child_row &row, std::unique_ptr<client> &own)
+{
+    const pid_t child = fork();
+    if (child == 0) {
+        alarm(CHILD_LIMIT_S);
+        const bool right = row.act(own);
+        own.reset();
+        _exit(right ? NOTHING_SAID : 1);
+    }
+    int status = 0;
+    EXPECT_EQ(waitpid(child, &status, 0), child);
+    return WIFEXITED(status) ? WEXITSTATUS(status) : -WTERMSIG(status);
+}
+
+class Fork : public tls_peers::tls_test {};
+
+TEST_F(Fork, a_child_leaves_the_connections_of_its_parent_alone)
+{
+    for (const bool tls : {false, true})
+        for (const child_row &row : CHILDREN) {
+            SCOPED_TRACE(std::string(row.rule) + (tls ? ", TLS" : ", plain"));
+            const crowd_server server(tls);
+            auto own = std::make_unique<client>(server);
+            ASSERT_EQ(own->call(), 0);
+            const int socket = own->proxy.socket;
+            EXPECT_EQ(child_that(row, own), NOTHING_SAID);
+            EXPECT_EQ(own->call(), 0);
+            EXPECT_EQ(own->proxy.socket, socket);
+            EXPECT_EQ(own->connections, 1) << "the parent's connection goes on";
+            EXPECT_EQ(server.connections(), 1 + row.connections);
+        }
+}
+
+// The pattern of servers that fork for each client.
+TEST_F(Fork, a_child_serves_the_client_that_its_parent_accepted)
+{
+    context serving;
+    ASSERT_GE(soap_bind(serving.get(), "127.0.0.1", 0, 1), 0);
+    context caller;
+    ASSERT_GE(
+        tcp_connect(caller.get(), "http://peer/", "127.0.0.1", loopback::port_of(serving->master_socket)), 0);
+    ASSERT_GE(soap_accept(serving.get()), 0);
+    const pid_t child = fork();
+    if (child == 0) {
+        alarm(CHILD_LIMIT_S);
+        const bool right = tcp_send(serving.get(), "hello", 5) == 0 && tcp_disconnect(serving.get()) == 0;
+        _exit(right ? NOTHING_SAID : 1);
+    }
+    EXPECT_EQ(soap_force_close(serving.get()), 0);
+    EXPECT_EQ(loopback::read_bytes(caller->socket, 100), "hello");
+    int status = 0;
+    EXPECT_EQ(waitpid(child, &status, 0), child);
+    EXPECT_EQ(status, NOTHING_SAID << 8);
+}
+
+} // namespace
