@@ -62,8 +62,6 @@ public:
         case SOAP_TYPE_xsd__nonNegativeInteger:
         case SOAP_TYPE_xsd__positiveInteger:
             return std::to_string(1 + below(1000000));
-        case SOAP_TYPE_protocol__Percentage:
-            return std::to_string(below(101));
         case SOAP_TYPE_ns1__swaRef:
             return "cid:part" + std::to_string(below(10));
         default:

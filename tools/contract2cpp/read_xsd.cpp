@@ -3,7 +3,7 @@
 // The part of XSD that the contract uses, and no more:
 //   schema       = import* (simpleType | complexType | element)*
 //   simpleType   = restriction of facets, or of enumeration*
-//   complexType  = sequence? attribute* | complexContent extension | simpleContent extension
+//   complexType  = sequence? attribute* anyAttribute? | complexContent extension | simpleContent extension
 //   element      = reference, or a named type, or a type of its own
 // Elsewhere: what the names refer to (build_model.cpp).
 #include <algorithm>
@@ -34,6 +34,7 @@ private:
     bool class_part(std::string_view local, pugi::xml_node node, complex_declaration &type) const;
     void sequence(pugi::xml_node node, complex_declaration &type) const;
     attribute_declaration attribute(pugi::xml_node node) const;
+    void any_attribute(pugi::xml_node node) const;
     element_declaration element(pugi::xml_node node) const;
     element_declaration top_element(pugi::xml_node node) const;
     void occurrence(pugi::xml_node node, element_declaration &element) const;
@@ -139,6 +140,16 @@ attribute_declaration xsd_reader::attribute(pugi::xml_node node) const
     return attribute;
 }
 
+// Attributes of other namespaces are passed over by the reader of every class, so leave for them needs no
+// code.
+void xsd_reader::any_attribute(pugi::xml_node node) const
+{
+    xml.allow_attributes(node, {"namespace", "processContents"});
+    if (node.attribute("namespace").as_string() != std::string_view("##other"))
+        xml.refuse(node, "attributes of the class's own namespace or of none must be declared: "
+                         "xsd:anyAttribute is for namespace=\"##other\"");
+}
+
 // minOccurs and maxOccurs: at most once, or without an upper bound.
 void xsd_reader::occurrence(pugi::xml_node node, element_declaration &element) const
 {
@@ -215,6 +226,8 @@ bool xsd_reader::class_part(std::string_view local, pugi::xml_node node, complex
         sequence(node, type);
     else if (local == "attribute")
         type.attributes.push_back(attribute(node));
+    else if (local == "anyAttribute")
+        any_attribute(node);
     else
         return false;
     return true;
