@@ -1,6 +1,7 @@
 // attachments.cpp - see attachments.h.
 #include "attachments.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <filesystem>
 #include <system_error>
@@ -48,6 +49,13 @@ std::string file_name(unsigned number, const char *id)
     return std::to_string(number) + (name.empty() ? "" : "-" + name);
 }
 
+// True if there is nothing to read: some files of the system have bytes and tell a size of 0.
+bool is_empty(std::FILE *file)
+{
+    std::rewind(file);
+    return std::fgetc(file) == EOF && std::ferror(file) == 0;
+}
+
 } // namespace
 
 attachment_files::attachment_files(const message_options &options, bool quiet)
@@ -86,13 +94,13 @@ void attachment_files::prepare(soap *ctx)
 {
     ctx->user = this;
     ctx->mime_read_open = [](soap *c, void *handle, const char *, const char *, const char *) {
-        return of(c).begin_reading(static_cast<outgoing *>(handle));
+        return of(c).begin_reading(c, handle);
     };
     ctx->mime_read = ctx->dime_read = [](soap *c, void *handle, char *buffer, std::size_t length) {
         return of(c).read(*static_cast<outgoing *>(handle), buffer, length);
     };
     ctx->dime_read_open = [](soap *c, void *handle, const char *, const char *, const char *) {
-        return of(c).begin_reading(static_cast<outgoing *>(handle));
+        return of(c).begin_reading(c, handle);
     };
     ctx->mime_read_close =
         ctx->dime_read_close = [](soap *, void *handle) { static_cast<outgoing *>(handle)->shown.reset(); };
@@ -121,7 +129,8 @@ void attachment_files::attach(soap *ctx)
     if (options_.mtom)
         ctx->output_mode |= MODE_MTOM;
     for (outgoing &one : out_) {
-        auto *const handle = reinterpret_cast<char *>(&one);
+        char *const handle =
+            one.size == 0 && is_empty(one.file.get()) ? nullptr : reinterpret_cast<char *>(&one);
         const int error = options_.dime
                               ? soap_dime_attach(ctx, handle, one.size, one.type.c_str(), one.id.c_str(),
                                                  DIME_NO_OPTIONS, nullptr)
@@ -132,11 +141,15 @@ void attachment_files::attach(soap *ctx)
     }
 }
 
-void *attachment_files::begin_reading(outgoing *from)
+void *attachment_files::begin_reading(soap *ctx, const void *handle)
 {
-    std::rewind(from->file.get()); // a repeated call sends it again
+    const auto from =
+        std::find_if(out_.begin(), out_.end(), [handle](const outgoing &one) { return &one == handle; });
+    if (from == out_.end())
+        return soap_attachment_in_memory(ctx); // the bytes of a value
+    std::rewind(from->file.get());             // a repeated call sends it again
     from->shown = std::make_unique<progress>(from->name, from->size, true, quiet_);
-    return from;
+    return &*from;
 }
 
 std::size_t attachment_files::read(outgoing &from, char *buffer, std::size_t length)

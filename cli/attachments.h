@@ -52,7 +52,7 @@ private:
         file_handle file;
         std::unique_ptr<progress> shown;
     };
-    void *begin_reading(outgoing *from);
+    void *begin_reading(soap *ctx, const void *handle);
     std::size_t read(outgoing &from, char *buffer, std::size_t length);
     void *begin_writing(soap *ctx, const char *id, const char *type);
     int write(soap *ctx, incoming &to, const char *data, std::size_t length);

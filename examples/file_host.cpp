@@ -116,10 +116,11 @@ std::size_t read_file(soap *, void *handle, char *buffer, std::size_t length)
     return count;
 }
 
-// Null: the library keeps the bytes in memory, which suits the small parts that nobody expects.
+// The library keeps the bytes of what nobody expects in memory, which suits small parts.
 void *take_expected(soap *ctx)
 {
-    return static_cast<host *>(ctx->user)->expected;
+    transfer *const expected = static_cast<host *>(ctx->user)->expected;
+    return expected != nullptr ? expected : soap_attachment_in_memory(ctx);
 }
 
 int write_file(soap *, void *handle, const char *data, std::size_t length)
@@ -166,10 +167,12 @@ struct form {
             soap_mime_start(ctx, nullptr, nullptr);
     }
 
-    // The id is told in the XML as "cid:file".
-    void attach(soap *ctx, transfer &source, std::size_t size) const
+    // The id is told in the XML as "cid:file". A stream of length 0 is one of unknown length, so an empty
+    // file goes without one.
+    void attach(soap *ctx, transfer &source, std::size_t file_size) const
     {
-        char *const handle = reinterpret_cast<char *>(&source);
+        char *const handle = file_size == 0 ? nullptr : reinterpret_cast<char *>(&source);
+        const std::size_t size = chunked ? 0 : file_size;
         const int error =
             dime ? soap_dime_attach(ctx, handle, size, MEDIA_TYPE, "file", 0, nullptr)
                  : soap_mime_attach(ctx, handle, size, MIME_BINARY, MEDIA_TYPE, "<file>", nullptr, nullptr);
@@ -205,7 +208,7 @@ public:
         report.attachment = {&attachment};
         transfer source(path, "rb", "sent", size);
         form_.start(&proxy_);
-        form_.attach(&proxy_, source, form_.chunked ? 0 : size);
+        form_.attach(&proxy_, source, size);
         __protocolStatusReport__createResponse response;
         demand("create", proxy_.create(&report, response));
         source.shown.end();

@@ -57,7 +57,7 @@ void *enclosures::open(soap *ctx, const char *id)
         return nullptr;
     }
     if (!message_is_known(ctx) || is_value(ctx, id))
-        return nullptr;
+        return soap_attachment_in_memory(ctx);
     try {
         return &files_.emplace_back(directory_);
     } catch (const std::exception &failure) {
@@ -128,11 +128,11 @@ void enclosures::enclose(const std::string &name)
         outgoing_.emplace_back(directory_, name);
 }
 
-void *enclosures::reopen(void *handle)
+void *enclosures::reopen(soap *ctx, void *handle)
 {
     const bool is_file = std::any_of(outgoing_.begin(), outgoing_.end(),
                                      [handle](const outgoing &o) { return &o.file == handle; });
-    return is_file ? handle : nullptr;
+    return is_file ? handle : soap_attachment_in_memory(ctx);
 }
 
 std::size_t enclosures::read(void *handle, char *buffer, std::size_t length)
@@ -143,8 +143,9 @@ std::size_t enclosures::read(void *handle, char *buffer, std::size_t length)
 int enclosures::attach_all(soap *ctx)
 {
     for (outgoing &o : outgoing_) {
-        char *const handle = reinterpret_cast<char *>(&o.file);
         const auto size = static_cast<std::size_t>(o.file.size());
+        char *const handle =
+            size == 0 ? nullptr : reinterpret_cast<char *>(&o.file); // 0 is an unknown length
         const int result = (form_ & MODE_MIME) != 0
                                ? soap_mime_attach(ctx, handle, size, MIME_BINARY, MEDIA_TYPE,
                                                   o.bracketed_id.c_str(), nullptr, nullptr)

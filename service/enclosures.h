@@ -47,8 +47,8 @@ public:
     int write(void *handle, const char *data, std::size_t length);
     static void close(void *handle);
 
-    // For what goes out: the handle if it is one of a file, null for the bytes of a value.
-    void *reopen(void *handle);
+    // For what goes out: the handle if it is one of a file; the bytes of a value are left to the library.
+    void *reopen(soap *ctx, void *handle);
     static std::size_t read(void *handle, char *buffer, std::size_t length);
 
     bool too_large() const { return too_large_; }

@@ -92,8 +92,10 @@ void reception::install_attachment_hooks(soap *ctx)
         return self.enclosures_.write(handle, data, length);
     };
     ctx->dime_write_close = ctx->mime_write_close = [](soap *, void *handle) { enclosures::close(handle); };
-    ctx->dime_read_open = ctx->mime_read_open = [](soap *c, void *handle, const char *, const char *,
-                                                   const char *) { return of(c).enclosures_.reopen(handle); };
+    ctx->dime_read_open =
+        ctx->mime_read_open = [](soap *c, void *handle, const char *, const char *, const char *) {
+            return of(c).enclosures_.reopen(c, handle);
+        };
     ctx->dime_read = ctx->mime_read = [](soap *, void *handle, char *buffer, std::size_t length) {
         return enclosures::read(handle, buffer, length);
     };

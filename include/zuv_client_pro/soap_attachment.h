@@ -22,32 +22,59 @@ enum soap_mime_encoding : int {
 
 // One attachment, for DIME and MIME alike; the record is managed memory. Those received hang in
 // ctx->dime.list and ctx->mime.list, in order. Contents are never decoded: `encoding` only tells what the
-// sender says.
+// sender says, and a host that wants them decoded does so in its write callback or afterwards.
 struct soap_attachment {
     soap_attachment *next;
     char *content;        // the bytes (with a zero byte behind them on input), or a stream handle of the host
     std::size_t size;     // bytes; 0 with a handle to be sent: unknown
     const char *id;       // DIME id, or MIME Content-ID with its angle brackets
     const char *type;     // media type
-    const char *options;  // DIME: type (2 bytes), length of the text (2 bytes), both big-endian, text
+    const char *options;  // DIME: type (2 bytes), length of the text (2 bytes), both big-endian, text of any
+                          // bytes. Sent as they are up to that length
     int encoding;         // soap_mime_encoding
     const char *location; // Content-Location
     const char *description; // Content-Description
 };
 
+// --- callbacks of the host ---
+//
+// With dime_read_open or mime_read_open set, every attachment is asked about when it is sent, binary values
+// of the message among them; with dime_write_open or mime_write_open, every one that is received. The open
+// callback returns
+//   a handle: the bytes go through the read or write callback, and `close` ends it, whatever happens then;
+//   soap_attachment_in_memory(ctx): the attachment is left to the library, `content` holds the bytes to send,
+//     or what is received is gathered in memory;
+//   null: it failed, and the call ends with the code that it has put in ctx->error, or else with 10,
+//     SOAP_USER_ERROR. Only an attachment to be sent that has neither content nor size is empty then.
+// A read callback returns the number of bytes that it has stored, 0 at the end. The call ends with -1 if they
+// are fewer than the size told, and with 21 if they are more than asked for. A write callback returns 0 or
+// the code that ends the call. When mime_write_close is called, ctx->mime.last is the part: content and size
+// that the callback puts there are those that its values get, and a code that it puts in ctx->error ends the
+// call. The codes 10, 21 and -1 come with a fault text that names the attachment.
+
+// No handle of a host has this address.
+inline void *soap_attachment_in_memory(soap *ctx)
+{
+    return &ctx->dime;
+}
+
 // --- attachments to send ---
 
 // Adds a DIME record to the next message sent; the host sets MODE_DIME in ctx->output_mode.
-//   content, size  the bytes, or a handle for dime_read_open with the stream's length, 0 if that is unknown
-//                  (in chunked or stored messages). What is longer than a record can be goes out in chunks
-//   type, id       may be null; texts over 65535 bytes are cut on the wire
+//   content, size  the bytes, or a handle for dime_read_open with the stream's length, 0 if that is unknown.
+//                  In a message that is neither chunked nor stored an unknown length is error 10 when it is
+//                  sent; an attachment without bytes has null content and size 0. What is longer than a
+//                  record can be goes out in chunks
+//   type, id       may be null; texts over 65535 bytes are cut on the wire. No two attachments of a message
+//                  may have one id: see soap_dime_attachments_write
 //   option_text    null for no options
 //   0, 20
 ZUV_API int soap_dime_attach(soap *ctx, char *content, std::size_t size, const char *type, const char *id,
                              unsigned short option_type, const char *option_text);
 
 // Adds a MIME part to the next message sent; soap_mime_start makes that a MIME message. `encoding` is a
-// soap_mime_encoding that tells how the content is encoded already. Null texts give no field. 0, 20.
+// soap_mime_encoding that tells how the content is encoded already. Null texts give no field. content, size
+// and id as above. 0, 20.
 ZUV_API int soap_mime_attach(soap *ctx, char *content, std::size_t size, int encoding, const char *type,
                              const char *id, const char *location, const char *description);
 
@@ -79,7 +106,8 @@ ZUV_API std::uint64_t soap_attachments_length(soap *ctx);
 // Writes the reference in place of a value's bytes, and adds the bytes to the attachments.
 //   id                   number of the element; above 0 it goes into a generated attachment id
 //   address, holder      the bytes; the record that begins with their address and their number (an int)
-//   id_text, type        attachment id ("cid:...") and media type; both null: no attachment
+//   id_text, type        attachment id ("cid:...") and media type; both null: no attachment. Values that are
+//                        alike in bytes (their address and number), id, type and options are one attachment
 //   type_text, type_id   XML type and type id of the element
 // Result: -1 if the element stands (or failed: ctx->error). Otherwise the value is to be written in place
 // under the element id returned, 0 for none.
@@ -114,12 +142,11 @@ ZUV_API int soap_dime_header_write(soap *ctx);
 // takes MODE_DIME out of ctx->mode. 0; 35 if the message has ended; 34; 32 if the options' length is not
 // theirs; 20; -1.
 ZUV_API int soap_dime_header_read(soap *ctx);
-// All DIME records of a message in DIME mode; nothing otherwise. With dime_read_open set, a content for which
-// it gives a handle is read through dime_read; for others it is memory.
+// All DIME records of a message in DIME mode; nothing otherwise. 0, an error of sending or of a callback, or
+// 32 for two attachments of one id, which a message that is counted tells before anything is sent.
 ZUV_API int soap_dime_attachments_write(soap *ctx);
-// The rest of the message's record and all records behind it. With dime_write_open set, records for which it
-// gives a handle go through dime_write. 0, 20, 34, -1, the error of a callback, or 32: a record where it
-// can't stand, a chunk without its record, two records of one id.
+// The rest of the message's record and all records behind it. 0, 20, 34, -1, the error of a callback, or 32:
+// a record where it can't stand, a chunk without its record, two records of one id.
 ZUV_API int soap_dime_attachments_read(soap *ctx);
 // Delimiter and head of a part.
 ZUV_API int soap_mime_part_header_write(soap *ctx, const soap_attachment *part);
@@ -127,8 +154,8 @@ ZUV_API int soap_mime_part_header_write(soap *ctx, const soap_attachment *part);
 // into a new record, ctx->mime.last. 0, 20, 22 for a line over 1023 characters, 36 if the boundary isn't the
 // announced one, -1.
 ZUV_API int soap_mime_part_header_read(soap *ctx);
-// All MIME parts and the end of a message in MIME mode; nothing otherwise. mime_read_open as dime_read_open
-// above.
+// All MIME parts and the end of a message in MIME mode; nothing otherwise. As above, with 36 for two parts of
+// one id, that of the message's own part included; angle brackets around an id make no difference.
 ZUV_API int soap_mime_attachments_write(soap *ctx);
 // Reads the content of the part whose head was read, and the head of the next. `handle` goes to
 // mime_write_open, which is asked about all parts but the one that holds the message. The rest of that one is

@@ -7,6 +7,7 @@
 
 #include "binding/class_rules.h"
 #include "binding/law_binary.h"
+#include "codec/attachment_value.h"
 
 namespace binding {
 
@@ -89,8 +90,10 @@ void xsd__base64Binary::soap_default(struct soap *ctx)
 
 void xsd__base64Binary::soap_serialize(struct soap *ctx) const
 {
-    if (soap_array_mark_pointer(ctx, content, &content, 1, BINARY_ID) == 0 && (id || type))
-        ctx->mode |= MODE_DIME;
+    if (content && (id || type))
+        attachment_value_mark(ctx, &content, id, type, options);
+    else
+        soap_array_mark_pointer(ctx, content, &content, 1, BINARY_ID);
 }
 
 int xsd__base64Binary::soap_put(struct soap *ctx, const char *tag, const char *xml_type) const

@@ -3,7 +3,8 @@
 // Elsewhere: how they go out and come in (dime.cpp, mime.cpp), values that refer to one (attachment_refs.cpp,
 // attachment_value.cpp).
 #include <algorithm>
-#include <cstring>
+#include <cstdarg>
+#include <cstdio>
 
 #include <zuv_client_pro/soap_attachment.h>
 #include <zuv_client_pro/soap_error.h>
@@ -12,6 +13,8 @@
 #include "codec/attachment_list.h"
 #include "codec/dime.h"
 #include "codec/mime.h"
+
+static constexpr std::size_t ID_SHOWN = 400; // characters of an id in a text
 
 soap_attachment *soap_attachment_add(soap *ctx, soap_attachment **first, soap_attachment **last,
                                      char *content, std::size_t size)
@@ -62,27 +65,57 @@ int soap_mime_attach(soap *ctx, char *content, std::size_t size, int encoding, c
     return SOAP_OK;
 }
 
-int attachment_ids_check(soap *ctx, const soap_attachment *list, int error)
+std::string_view attachment_bare_id(const char *id)
 {
-    std::size_t count = 0;
+    const std::string_view text(id);
+    if (!text.starts_with('<'))
+        return text;
+    return text.substr(1, text.size() < 2 ? 0 : text.size() - 2);
+}
+
+int attachment_ids_check(soap *ctx, const soap_attachment *list, const char *message_id, int error)
+{
+    std::size_t count = message_id != nullptr;
     for (const soap_attachment *record = list; record != nullptr; record = record->next)
         count += record->id != nullptr;
     if (count < 2)
         return SOAP_OK;
-    auto **const ids = static_cast<const char **>(SOAP_MALLOC(ctx, count * sizeof(const char *)));
+    auto *const ids = static_cast<std::string_view *>(SOAP_MALLOC(ctx, count * sizeof(std::string_view)));
     if (ids == nullptr)
         return ctx->error = SOAP_OUT_OF_MEMORY;
-    const char **end = ids;
+    std::string_view *end = ids;
+    if (message_id != nullptr)
+        *end++ = attachment_bare_id(message_id);
     for (const soap_attachment *record = list; record != nullptr; record = record->next) {
         if (record->id != nullptr)
-            *end++ = record->id;
+            *end++ = attachment_bare_id(record->id);
     }
-    std::sort(ids, end, [](const char *one, const char *other) { return std::strcmp(one, other) < 0; });
-    const bool twice = std::adjacent_find(ids, end, [](const char *one, const char *other) {
-                           return std::strcmp(one, other) == 0;
-                       }) != end;
+    std::sort(ids, end);
+    const std::string_view *const twice = std::adjacent_find(ids, end);
+    if (twice != end)
+        attachment_fail(ctx, error, "Two attachments have the id \"%.*s\"",
+                        static_cast<int>(std::min(twice->size(), ID_SHOWN)), twice->data());
     SOAP_FREE(ctx, ids);
-    return twice ? ctx->error = error : SOAP_OK;
+    return ctx->error;
+}
+
+int attachment_ids_check_out(soap *ctx)
+{
+    if (dime_is_written(ctx) &&
+        attachment_ids_check(ctx, ctx->dime.first, nullptr, SOAP_DIME_ERROR) != SOAP_OK)
+        return ctx->error;
+    return mime_is_written(ctx) ? attachment_ids_check(ctx, ctx->mime.first, ctx->mime.start, SOAP_MIME_ERROR)
+                                : static_cast<int>(SOAP_OK);
+}
+
+int attachment_fail(soap *ctx, int error, const char *format, ...)
+{
+    char text[SOAP_TEXT_SIZE];
+    std::va_list values;
+    va_start(values, format);
+    std::vsnprintf(text, sizeof text, format, values);
+    va_end(values);
+    return soap_fault_sender(ctx, soap_string_dup(ctx, text), nullptr, error);
 }
 
 std::uint64_t soap_attachments_length(soap *ctx)

@@ -1,8 +1,27 @@
-// attachment_list.h - what the readers of attachments check about all of them.
+// attachment_list.h - what holds of all attachments of a message, and what is told of one that is wrong.
 #pragma once
+
+#include <string_view>
 
 #include <zuv_client_pro/soap_attachment.h>
 
-// Two attachments of one id leave open which of them a reference means, and two receivers may decide
-// differently: `error` for such a list. 0, `error` or 20.
-int attachment_ids_check(soap *ctx, const soap_attachment *list, int error);
+// Empties the lists of attachments to send. The records are managed memory.
+inline void attachments_forget(soap *ctx)
+{
+    ctx->dime.first = ctx->dime.last = nullptr;
+    ctx->mime.first = ctx->mime.last = nullptr;
+}
+
+// Two attachments of one id, or one with that of the message's own part (null: none), leave open which of
+// them a reference means, and two receivers may decide differently: `error` for such a list. 0, `error`
+// or 20.
+int attachment_ids_check(soap *ctx, const soap_attachment *list, const char *message_id, int error);
+
+// The same for the attachments that go out with the message under way: 0, 20, 32 or 36.
+int attachment_ids_check_out(soap *ctx);
+
+// An id without the angle brackets around it.
+std::string_view attachment_bare_id(const char *id);
+
+// Makes a fault with a text of its own for an error, which it returns.
+[[gnu::format(printf, 3, 4)]] int attachment_fail(soap *ctx, int error, const char *format, ...);

@@ -12,6 +12,7 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_memory.h>
 
+#include "codec/attachment_list.h"
 #include "codec/attachment_refs.h"
 
 struct soap_attachment_index {
@@ -80,13 +81,10 @@ id_view whole(const char *text, bool decodes)
     return {text, std::strlen(text), decodes};
 }
 
-// An id without the angle brackets around it.
 id_view bare_id(const char *id, bool decodes)
 {
-    const std::size_t length = std::strlen(id);
-    if (*id == '<')
-        return {id + 1, length < 2 ? 0 : length - 2, decodes};
-    return {id, length, decodes};
+    const std::string_view bare = attachment_bare_id(id);
+    return {bare.data(), bare.size(), decodes};
 }
 
 std::uint64_t hash(id_view text, std::uint64_t seed)

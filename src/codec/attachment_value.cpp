@@ -4,6 +4,7 @@
 // attachments (attachment_refs.cpp).
 #include <cstdio>
 #include <cstring>
+#include <string_view>
 
 #include <zuv_client_pro/soap_attachment.h>
 #include <zuv_client_pro/soap_error.h>
@@ -12,12 +13,17 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "codec/attachment_refs.h"
+#include "codec/attachment_value.h"
+#include "codec/dime.h"
+#include "codec/identity_value.h"
 #include "codec/xml_input.h"
 
 namespace {
 
 constexpr int ALL_WRITTEN = -1;  // result: the element stands, or ctx->error tells why not
 constexpr int AS_ATTACHMENT = 3; // mark of a value that goes out as an attachment
+constexpr int ATTACHMENT_TYPE =
+    -1; // type of such a value in the pointer table: none of an object's, nor that of bytes in place
 #define XOP_URI "http://www.w3.org/2004/08/xop/include"
 constexpr const char *XOP_TAG = "xop:Include";
 // One attribute carries both: the writer sends a name as it stands.
@@ -30,24 +36,73 @@ struct byte_holder {
     std::int32_t size;
 };
 
-soap_pointer_record *find_or_add(soap *ctx, const void *address, const void *holder, int dimensions,
-                                 int type_id)
+// What makes an attachment of its own: not the bytes alone, but also under which id and as what they go out.
+struct outgoing_value {
+    byte_holder bytes;
+    const char *id_text, *type, *options; // of the first value that goes out as this attachment
+    const char *href;                     // null until it is written
+};
+
+bool same_text(const char *one, const char *other)
 {
-    soap_pointer_record *record = nullptr;
-    if (soap_array_pointer_find(ctx, address, holder, dimensions, type_id, &record) == 0 &&
-        soap_pointer_add(ctx, address, holder, dimensions, type_id, &record) == 0)
-        return nullptr;
-    return record;
+    return one == other || (one != nullptr && other != nullptr && std::strcmp(one, other) == 0);
 }
 
-// The id given, or one made of the element's or the table's number.
-const char *reference_text(soap *ctx, const char *id_text, int id, const soap_pointer_record *record)
+// MIME has no place for options.
+bool same_options(const soap *ctx, const char *one, const char *other)
 {
-    if (id_text != nullptr)
-        return id_text;
+    if (one == other || (ctx->output_mode & MODE_MTOM) != 0)
+        return true;
+    const std::size_t length = dime_options_length(one);
+    return length == dime_options_length(other) && (length == 0 || std::memcmp(one, other, length) == 0);
+}
+
+bool same_value(soap *ctx, const void *one, const void *other)
+{
+    const auto &a = *static_cast<const outgoing_value *>(one),
+               &b = *static_cast<const outgoing_value *>(other);
+    return a.bytes.content == b.bytes.content && a.bytes.size == b.bytes.size &&
+           same_text(a.id_text, b.id_text) && same_text(a.type, b.type) &&
+           same_options(ctx, a.options, b.options);
+}
+
+std::uint32_t hash_of(const outgoing_value &value)
+{
+    std::uint64_t hash = reinterpret_cast<std::uintptr_t>(value.bytes.content) ^
+                         static_cast<std::uint64_t>(value.bytes.size) << 32;
+    for (const char *text : {value.id_text, value.type})
+        for (const char c : std::string_view(text == nullptr ? "" : text))
+            hash = (hash ^ static_cast<unsigned char>(c)) * 0x9E3779B97F4A7C15;
+    return static_cast<std::uint32_t>(hash >> 32 ^ hash);
+}
+
+// The entry of the attachment that a value goes out as. Null with error 20.
+soap_pointer_record *find_or_add(soap *ctx, const outgoing_value &value)
+{
+    const std::uint32_t hash = hash_of(value);
+    if (soap_pointer_record *const found =
+            soap_pointer_find_value(ctx, hash, ATTACHMENT_TYPE, same_value, &value))
+        return found;
+    auto *const entered = static_cast<outgoing_value *>(soap_block_alloc(ctx, sizeof(outgoing_value)));
+    if (entered == nullptr)
+        return nullptr;
+    *entered = value;
+    return soap_pointer_add_value(ctx, hash, ATTACHMENT_TYPE, entered);
+}
+
+outgoing_value value_of(const void *holder, const char *id_text, const char *type, const char *options)
+{
+    return {*static_cast<const byte_holder *>(holder), id_text, type, options, nullptr};
+}
+
+// The id given, or one made of the first element's or the table's number, which then stays.
+const char *reference_text(soap *ctx, int id, const soap_pointer_record *record, outgoing_value &value)
+{
+    if (value.id_text != nullptr || value.href != nullptr)
+        return value.id_text != nullptr ? value.id_text : value.href;
     char text[SOAP_TEXT_SIZE];
     std::snprintf(text, sizeof text, ctx->dime_id_format, id > 0 ? id : record->id);
-    return soap_string_dup(ctx, text);
+    return value.href = soap_string_dup(ctx, text);
 }
 
 // The prefix is in no row of the table, so where prefixes follow rules of their own it is declared by them.
@@ -88,9 +143,9 @@ const char *attachment_id(soap *ctx, const char *href, bool bracketed)
     return id;
 }
 
-int add_attachment(soap *ctx, const byte_holder &bytes, const char *href, const char *type,
-                   const char *options)
+int add_attachment(soap *ctx, const outgoing_value &value, const char *href)
 {
+    const byte_holder &bytes = value.bytes;
     const bool mtom = (ctx->mode & MODE_MTOM) != 0;
     const char *const id = attachment_id(ctx, href, mtom);
     if (id == nullptr)
@@ -101,13 +156,20 @@ int add_attachment(soap *ctx, const byte_holder &bytes, const char *href, const 
     if (record == nullptr)
         return ctx->error;
     record->id = id;
-    record->type = type;
-    record->options = options;
+    record->type = value.type;
+    record->options = value.options;
     record->encoding = MIME_BINARY;
     return SOAP_OK;
 }
 
 } // namespace
+
+void attachment_value_mark(soap *ctx, const void *holder, const char *id_text, const char *type,
+                           const char *options)
+{
+    ctx->mode |= MODE_DIME;
+    find_or_add(ctx, value_of(holder, id_text, type, options));
+}
 
 int soap_attachment_ref_out(soap *ctx, const char *tag, int id, const void *address, const void *holder,
                             const char *id_text, const char *type, const char *options, int dimensions,
@@ -117,10 +179,11 @@ int soap_attachment_ref_out(soap *ctx, const char *tag, int id, const void *addr
     if (address == nullptr || bytes == nullptr || bytes->content == nullptr ||
         (id_text == nullptr && type == nullptr))
         return soap_element_ref(ctx, tag, id, address, holder, dimensions, type_text, type_id);
-    soap_pointer_record *const record = find_or_add(ctx, address, holder, dimensions, type_id);
+    soap_pointer_record *const record = find_or_add(ctx, value_of(holder, id_text, type, options));
     if (record == nullptr)
         return ALL_WRITTEN;
-    const char *const href = reference_text(ctx, id_text, id, record);
+    auto &value = *static_cast<outgoing_value *>(const_cast<void *>(record->ptr));
+    const char *const href = reference_text(ctx, id, record, value);
     if (href == nullptr || write_reference(ctx, tag, href, type_text) != SOAP_OK)
         return ALL_WRITTEN;
     if ((ctx->mode & MODE_COUNTING) == 0)
@@ -128,7 +191,7 @@ int soap_attachment_ref_out(soap *ctx, const char *tag, int id, const void *addr
     // A message that was not counted adds its attachments as it goes out.
     if (record->count_mark != AS_ATTACHMENT) {
         record->count_mark = AS_ATTACHMENT;
-        add_attachment(ctx, *bytes, href, type, options);
+        add_attachment(ctx, value, href);
     }
     return ALL_WRITTEN;
 }

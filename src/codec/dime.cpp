@@ -18,6 +18,7 @@
 #include "codec/attachment_sink.h"
 #include "codec/attachment_stream.h"
 #include "codec/dime.h"
+#include "codec/mime.h"
 #include "engine/dime_chunks.h"
 
 namespace {
@@ -25,6 +26,7 @@ namespace {
 constexpr std::size_t HEADER = 12;        // bytes
 constexpr std::size_t OPTIONS_HEADER = 4; // bytes ahead of the options' text
 constexpr std::size_t FIELD_MAX = 65535;  // bytes of options, id and type
+constexpr std::size_t OPTIONS_TEXT_MAX = FIELD_MAX - OPTIONS_HEADER;
 constexpr std::uint64_t DATA_MAX = 0xFFFFFFFF;
 constexpr std::uint64_t RECORD_MAX = 0xFFFFFFFC; // bytes of data; what is longer goes out in chunks of this
 constexpr unsigned VERSION_MASK = 0xF8;
@@ -66,18 +68,6 @@ std::size_t field_length(const char *text)
     return length < FIELD_MAX ? length : FIELD_MAX;
 }
 
-// A value read from a MIME part has the part's description in place of options. It is no options block, so
-// what stands where the length would be isn't believed beyond the end of the text.
-std::size_t options_length(const char *options)
-{
-    if (options == nullptr)
-        return 0;
-    std::size_t length = number(options + 2, 2);
-    if (length > FIELD_MAX - OPTIONS_HEADER)
-        length = FIELD_MAX - OPTIONS_HEADER;
-    return strnlen(options + OPTIONS_HEADER, length) == length ? OPTIONS_HEADER + length : 0;
-}
-
 // --- out ---
 
 void describe(soap *ctx, const soap_attachment &record)
@@ -111,12 +101,12 @@ int send_chunk(soap *ctx, const char *data, std::size_t length)
 }
 
 // A stream of unknown length goes out in chunks; one that isn't full is the last.
-int send_in_chunks(soap *ctx, const attachment_stream &stream, bool last_record)
+int send_in_chunks(soap *ctx, attachment_stream &stream, bool last_record)
 {
     char data[ATTACHMENT_PIECE];
     for (;;) {
         std::size_t length = 0;
-        if (stream.read_full(ctx, data, length) != SOAP_OK)
+        if (stream.read_full(data, length) != SOAP_OK)
             return ctx->error;
         const bool more = length == sizeof data;
         mark(ctx, more, last_record);
@@ -126,9 +116,9 @@ int send_in_chunks(soap *ctx, const attachment_stream &stream, bool last_record)
     }
 }
 
-// Data of known length, from the stream or, without one, from memory. One record, unless no header can tell
-// the length.
-int send_sized(soap *ctx, const soap_attachment &record, const attachment_stream *stream)
+// Data of known length, from the stream or, if none is open, from memory. One record, unless no header can
+// tell the length.
+int send_sized(soap *ctx, const soap_attachment &record, attachment_stream &stream)
 {
     const char *data = record.content;
     for (std::uint64_t left = record.size;;) {
@@ -137,10 +127,10 @@ int send_sized(soap *ctx, const soap_attachment &record, const attachment_stream
         ctx->dime.size = part;
         mark(ctx, left != 0, record.next == nullptr);
         if (soap_dime_header_write(ctx) != SOAP_OK ||
-            (stream != nullptr ? stream->copy(ctx, part) : soap_send_bytes(ctx, data, part)) != SOAP_OK ||
+            (stream.is_open() ? stream.copy(part) : soap_send_bytes(ctx, data, part)) != SOAP_OK ||
             soap_send_bytes(ctx, "\0\0\0", padding_of(part)) != SOAP_OK || left == 0)
             return ctx->error;
-        if (stream == nullptr)
+        if (!stream.is_open())
             data += part;
         describe_next_chunk(ctx);
     }
@@ -148,22 +138,12 @@ int send_sized(soap *ctx, const soap_attachment &record, const attachment_stream
 
 int send_record(soap *ctx, const soap_attachment &record)
 {
-    void *handle = nullptr;
+    attachment_stream stream(ctx, record, ctx->dime_read, ctx->dime_read_close);
     describe(ctx, record);
-    if (ctx->dime_read_open != nullptr) {
-        handle = ctx->dime_read_open(ctx, record.content, record.id, record.type, record.options);
-        if (handle == nullptr && ctx->error != SOAP_OK)
-            return ctx->error;
-    }
-    if (handle != nullptr) {
-        const attachment_stream stream = {handle, ctx->dime_read, ctx->dime_read_close};
-        const int result = record.size == 0 && output_length_is_open(ctx)
-                               ? send_in_chunks(ctx, stream, record.next == nullptr)
-                               : send_sized(ctx, record, &stream);
-        stream.end(ctx);
-        return result;
-    }
-    return send_sized(ctx, record, nullptr);
+    if (stream.open(ctx->dime_read_open, record.options) != SOAP_OK)
+        return ctx->error;
+    return stream.is_endless() ? send_in_chunks(ctx, stream, record.next == nullptr)
+                               : send_sized(ctx, record, stream);
 }
 
 // --- in ---
@@ -308,7 +288,7 @@ int receive_to_stream(soap *ctx, soap_attachment *record, void *handle)
         result = sink.finish(record);
     if (ctx->dime_write_close != nullptr)
         ctx->dime_write_close(ctx, handle);
-    return result;
+    return result != SOAP_OK ? result : ctx->error;
 }
 
 int receive_record(soap *ctx)
@@ -324,7 +304,7 @@ int receive_record(soap *ctx)
     void *handle = nullptr;
     if (ctx->dime_write_open != nullptr && ctx->dime_write != nullptr) {
         handle = ctx->dime_write_open(ctx, record->id, record->type, record->options);
-        if (handle == nullptr && ctx->error != SOAP_OK)
+        if (attachment_take_handle(ctx, record->id, ctx->dime_write_close, handle) != SOAP_OK)
             return ctx->error;
     }
     if ((handle != nullptr ? receive_to_stream(ctx, record, handle) : receive_to_memory(ctx, record)) !=
@@ -339,8 +319,8 @@ int receive_record(soap *ctx)
 char *soap_dime_options_make(soap *ctx, unsigned short type, const char *text)
 {
     std::size_t length = text == nullptr ? 0 : std::strlen(text);
-    if (length > FIELD_MAX - OPTIONS_HEADER)
-        length = FIELD_MAX - OPTIONS_HEADER;
+    if (length > OPTIONS_TEXT_MAX)
+        length = OPTIONS_TEXT_MAX;
     auto *options = static_cast<char *>(soap_block_alloc(ctx, OPTIONS_HEADER + length + 1));
     if (options == nullptr)
         return nullptr;
@@ -352,21 +332,29 @@ char *soap_dime_options_make(soap *ctx, unsigned short type, const char *text)
     return options;
 }
 
+std::size_t dime_options_length(const char *options)
+{
+    if (options == nullptr)
+        return 0;
+    const std::size_t length = OPTIONS_HEADER + number(options + 2, 2);
+    return mime_is_description(options, length) ? 0 : length;
+}
+
 std::uint64_t dime_record_length(const soap_attachment &record)
 {
     const std::uint64_t further = record.size == 0 ? 0 : (record.size - 1) / RECORD_MAX;
-    return HEADER * (1 + further) + padded(options_length(record.options)) + padded(field_length(record.id)) +
-           padded(field_length(record.type)) + padded(record.size);
+    return HEADER * (1 + further) + padded(dime_options_length(record.options)) +
+           padded(field_length(record.id)) + padded(field_length(record.type)) + padded(record.size);
 }
 
 int soap_dime_header_write(soap *ctx)
 {
     const soap_dime_state &dime = ctx->dime;
-    const std::size_t options = options_length(dime.options);
+    const std::size_t options = dime_options_length(dime.options);
     const std::size_t id = field_length(dime.id);
     const std::size_t type = field_length(dime.type);
     char header[HEADER];
-    if (dime.size > DATA_MAX)
+    if (dime.size > DATA_MAX || options > FIELD_MAX)
         return ctx->error = SOAP_DIME_ERROR;
     header[0] = static_cast<char>(VERSION | (dime.flags & MARKS));
     header[1] = static_cast<char>(dime.flags & 0xF0);
@@ -385,6 +373,8 @@ int soap_dime_attachments_write(soap *ctx)
 {
     if (!dime_is_written(ctx))
         return SOAP_OK;
+    if (attachment_ids_check_out(ctx) != SOAP_OK)
+        return ctx->error;
     for (const soap_attachment *record = ctx->dime.first; record != nullptr; record = record->next) {
         if (send_record(ctx, *record) != SOAP_OK)
             return ctx->error;
@@ -416,5 +406,5 @@ int soap_dime_attachments_read(soap *ctx)
         if (soap_dime_header_read(ctx) != SOAP_OK || receive_record(ctx) != SOAP_OK)
             return ctx->error;
     }
-    return attachment_ids_check(ctx, ctx->dime.list, SOAP_DIME_ERROR);
+    return attachment_ids_check(ctx, ctx->dime.list, nullptr, SOAP_DIME_ERROR);
 }

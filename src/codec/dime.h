@@ -10,5 +10,8 @@ inline bool dime_is_written(const soap *ctx)
     return (ctx->mode & MODE_DIME) != 0 && (ctx->mode & MODE_MTOM) == 0;
 }
 
+// Length of an options block, bytes; 0 for none and for the description of a MIME part in its place.
+std::size_t dime_options_length(const char *options);
+
 // Length of a record on the wire, header and padding included, bytes.
 std::uint64_t dime_record_length(const soap_attachment &record);

@@ -10,6 +10,7 @@
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "codec/attachment_list.h"
 #include "codec/namespace.h"
 #include "codec/xml_write.h"
 
@@ -115,7 +116,8 @@ int soap_envelope_out_end(soap *ctx)
     if (soap_element_out_end(ctx, "SOAP-ENV:Envelope") || xml_put(ctx, "\r\n") || finish_dime_record(ctx))
         return ctx->error;
     ctx->message_part = PART_AFTER_ENVELOPE;
-    return 0;
+    // All attachments are known: what is wrong with them is told before anything is sent, where that can be.
+    return (ctx->mode & MODE_COUNTING) ? attachment_ids_check_out(ctx) : 0;
 }
 
 int soap_body_out_begin(soap *ctx)

@@ -14,6 +14,8 @@
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "codec/identity_value.h"
+
 struct soap_pointer_block {
     soap_pointer_block *next;
     soap_pointer_record records[SOAP_POINTER_BLOCK_SIZE];
@@ -135,7 +137,8 @@ bool add_block(soap *ctx)
 }
 
 // A new record with both marks "met once", or null with error 20.
-soap_pointer_record *add_record(soap *ctx, const void *address, const void *array, int type)
+soap_pointer_record *add_record(soap *ctx, const void *address, const void *array, int type,
+                                std::uint32_t hash)
 {
     if (ctx->pointer_count == 0) {
         ctx->pointer_chains = ctx->pointer_table;
@@ -155,10 +158,16 @@ soap_pointer_record *add_record(soap *ctx, const void *address, const void *arra
     record->id = static_cast<std::int32_t>(++ctx->next_id);
     record->count_mark = MARK_ONCE;
     record->send_mark = MARK_ONCE;
-    record->hash = address_hash(array != nullptr ? array_content(array) : address);
+    record->hash = hash;
     ctx->pointer_count++;
     link_record(ctx, record);
     return record;
+}
+
+soap_pointer_record *add_record(soap *ctx, const void *address, const void *array, int type)
+{
+    return add_record(ctx, address, array, type,
+                      address_hash(array != nullptr ? array_content(array) : address));
 }
 
 void clear_heads_by_record(soap *ctx)
@@ -280,6 +289,24 @@ int soap_pointer_add(soap *ctx, const void *address, const void *array, int, int
                      soap_pointer_record **record)
 {
     return report(add_record(ctx, address, array, type), record);
+}
+
+soap_pointer_record *soap_pointer_find_value(soap *ctx, std::uint32_t hash, int type,
+                                             bool (*same)(soap *ctx, const void *one, const void *other),
+                                             const void *value)
+{
+    if (ctx->pointer_count == 0)
+        return nullptr;
+    soap_pointer_record *record = ctx->pointer_chains[chain_of(hash, ctx->pointer_chain_mask)];
+    while (record != nullptr &&
+           (record->hash != hash || record->type != type || !same(ctx, record->ptr, value)))
+        record = record->next;
+    return record;
+}
+
+soap_pointer_record *soap_pointer_add_value(soap *ctx, std::uint32_t hash, int type, const void *value)
+{
+    return add_record(ctx, value, nullptr, type, hash);
 }
 
 int soap_mark_pointer(soap *ctx, const void *address, int type)

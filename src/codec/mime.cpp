@@ -30,10 +30,14 @@ namespace {
 
 constexpr std::size_t BOUNDARY_MAX = 1020;   // characters that are compared
 constexpr std::size_t BOUNDARY_RANDOM = 32;  // characters of six random bits each
-constexpr std::size_t DIME_OPTIONS_MIN = 5;  // bytes of the smallest options block
 constexpr unsigned FIELDS_MAX = 1024;        // fields of one part head
 constexpr char BOUNDARY_PREFIX[] = "=_zuv_"; // "=_" can't come out of base64 or quoted-printable
 constexpr const char *ROOT_ID = "<message@zuv_client_pro>";
+
+// Stands behind a description. A value that the part answers takes the description in place of DIME options,
+// and whoever takes it for such a block reads as many bytes as its third and fourth say: this is how it is
+// known, and the zeros are there for descriptions of fewer characters.
+constexpr char DESCRIPTION_END[] = "\0\0\0\0\0\x9DMIME description";
 
 struct encoding_row {
     int code;
@@ -131,19 +135,12 @@ void put_end(const soap *ctx, head_writer &out)
 
 int send_content(soap *ctx, const soap_attachment &part)
 {
-    void *handle = nullptr;
-    if (ctx->mime_read_open != nullptr) {
-        handle = ctx->mime_read_open(ctx, part.content, part.id, part.type, part.description);
-        if (handle == nullptr && ctx->error != SOAP_OK)
-            return ctx->error;
-    }
-    if (handle == nullptr)
+    attachment_stream stream(ctx, part, ctx->mime_read, ctx->mime_read_close);
+    if (stream.open(ctx->mime_read_open, part.description) != SOAP_OK)
+        return ctx->error;
+    if (!stream.is_open())
         return soap_send_bytes(ctx, part.content, part.size);
-    const attachment_stream stream = {handle, ctx->mime_read, ctx->mime_read_close};
-    const bool to_its_end = part.size == 0 && output_length_is_open(ctx);
-    const int result = to_its_end ? stream.copy_to_end(ctx) : stream.copy(ctx, part.size);
-    stream.end(ctx);
-    return result;
+    return stream.is_endless() ? stream.copy_to_end() : stream.copy(part.size);
 }
 
 // Random characters for a boundary. False if the system has no randomness to give.
@@ -181,16 +178,14 @@ int store_copy(soap *ctx, const char *text, const char *&field)
     return text != nullptr && field == nullptr ? ctx->error : SOAP_OK;
 }
 
-// A value that the part answers takes the description in place of DIME options, of which every reader may
-// look at the first bytes.
 int store_description(soap *ctx, const char *text, const char *&field)
 {
     const std::size_t length = std::strlen(text);
-    auto *const copy = static_cast<char *>(soap_block_alloc(ctx, length + DIME_OPTIONS_MIN));
+    auto *const copy = static_cast<char *>(soap_block_alloc(ctx, length + sizeof DESCRIPTION_END));
     if (copy == nullptr)
         return ctx->error;
-    std::memcpy(copy, text, length + 1);
-    std::memset(copy + length + 1, 0, DIME_OPTIONS_MIN - 1);
+    std::memcpy(copy, text, length);
+    std::memcpy(copy + length, DESCRIPTION_END, sizeof DESCRIPTION_END);
     field = copy;
     return SOAP_OK;
 }
@@ -378,7 +373,7 @@ int receive_part(soap *ctx, soap_attachment *part, void *handle)
     const bool streams = may_stream(ctx, part);
     if (streams) {
         handle = ctx->mime_write_open(ctx, handle, part->id, part->type, part->description, part->encoding);
-        if (handle == nullptr && ctx->error != SOAP_OK)
+        if (attachment_take_handle(ctx, part->id, ctx->mime_write_close, handle) != SOAP_OK)
             return ctx->error;
     }
     if (!streams || handle == nullptr) {
@@ -389,7 +384,7 @@ int receive_part(soap *ctx, soap_attachment *part, void *handle)
     const int result = receive_content(ctx, part, &sink);
     if (ctx->mime_write_close != nullptr)
         ctx->mime_write_close(ctx, handle);
-    return result;
+    return result != SOAP_OK ? result : ctx->error;
 }
 
 // The message had no references yet when the parts ahead of it were read.
@@ -407,10 +402,17 @@ int end_of_parts(soap *ctx)
     ctx->mode &= ~MODE_MIME;
     ctx->mime.boundary = nullptr; // a message to be sent draws its own
     ctx->mime.start = nullptr;
-    return form ? SOAP_OK : attachment_ids_check(ctx, ctx->mime.list, SOAP_MIME_ERROR);
+    return form ? SOAP_OK : attachment_ids_check(ctx, ctx->mime.list, nullptr, SOAP_MIME_ERROR);
 }
 
 } // namespace
+
+bool mime_is_description(const char *options, std::size_t length)
+{
+    const std::size_t end = strnlen(options, length);
+    return length - end >= sizeof DESCRIPTION_END &&
+           std::memcmp(options + end, DESCRIPTION_END, sizeof DESCRIPTION_END) == 0;
+}
 
 std::uint64_t mime_part_length(soap *ctx, const soap_attachment &part)
 {
@@ -461,6 +463,8 @@ int soap_mime_attachments_write(soap *ctx)
 {
     if (!mime_is_written(ctx))
         return SOAP_OK;
+    if (attachment_ids_check_out(ctx) != SOAP_OK)
+        return ctx->error;
     for (const soap_attachment *part = ctx->mime.first; part != nullptr; part = part->next) {
         if (soap_mime_part_header_write(ctx, part) != SOAP_OK || send_content(ctx, *part) != SOAP_OK)
             return ctx->error;

@@ -9,6 +9,10 @@ inline bool mime_is_written(const soap *ctx)
     return (ctx->mode & MODE_MIME) != 0 && ctx->mime.boundary != nullptr;
 }
 
+// True for the description of a received part, which a value has in place of DIME options; `length` bytes
+// are what it has if it is a block of options.
+bool mime_is_description(const char *options, std::size_t length);
+
 // Length of a part on the wire, its head and the delimiter ahead of it included, bytes.
 std::uint64_t mime_part_length(soap *ctx, const soap_attachment &part);
 

@@ -13,6 +13,8 @@
 #include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "codec/attachment_list.h"
+
 namespace proxies {
 
 namespace {
@@ -96,8 +98,10 @@ int call(soap *ctx, const char *&proxy_endpoint, const char *default_endpoint, c
     soap_reset_call(ctx);
     soap_mark_header(ctx);
     binding::class_pointer_mark(ctx, *op.request, request);
-    if (count_message(ctx, op, request))
+    if (count_message(ctx, op, request)) {
+        attachments_forget(ctx); // they belong to this call, as they do when it fails later
         return ctx->error;
+    }
     if (send_message(ctx, proxy_endpoint, action ? action : "", op, request) || !result)
         return soap_socket_release(ctx);
     *result = nullptr;

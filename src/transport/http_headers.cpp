@@ -77,6 +77,8 @@ int parse_content_type(soap *ctx, const char *value)
             store_copy(ctx, soap_attr_value(ctx, type, "start"), ctx->mime.start) != SOAP_OK)
             return ctx->error;
         ctx->input_mode |= MODE_MIME;
+        if (soap_tag_match(soap_attr_value(ctx, type, "type"), "application/xop+xml") == 0)
+            ctx->input_mode |= MODE_MTOM; // whatever the first part says of itself
     }
     const char *const action = soap_attr_value(ctx, type, "action");
     return action == nullptr ? SOAP_OK : store_action(ctx, action);

@@ -1,5 +1,4 @@
-// attachment_exchange.h - small SOAP messages with binary values beside them, written and read without a
-// binding.
+// attachment_exchange.h - small SOAP messages with binary values beside them, written and read.
 //
 // A message is an Envelope whose Body holds elements "data". For tests and fuzz targets of attachments; the
 // expectations of the tests are in attachment_checks.h.
@@ -12,10 +11,9 @@
 #include <vector>
 
 #include <zuv_client_pro/soap_attachment.h>
+#include <zuv_client_pro/soap_binary.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_identity.h>
-#include <zuv_client_pro/soap_primitive.h>
 #include <zuv_client_pro/soap_xml.h>
 
 #include "support/memory_wire.h"
@@ -33,12 +31,7 @@ inline std::string envelope(const std::string &body)
            "</SOAP-ENV:Body></SOAP-ENV:Envelope>\r\n";
 }
 
-// Begins as every holder of bytes does.
-struct value {
-    unsigned char *content;
-    int size;
-    char *id, *type, *options;
-
+struct value : xsd__base64Binary {
     std::string bytes() const
     {
         return content == nullptr
@@ -56,21 +49,13 @@ inline std::string text(const char *text)
 inline value make_value(const std::string &bytes, const char *id, const char *type,
                         const char *options = nullptr)
 {
-    return {reinterpret_cast<unsigned char *>(const_cast<char *>(bytes.data())),
-            static_cast<int>(bytes.size()), const_cast<char *>(id), const_cast<char *>(type),
-            const_cast<char *>(options)};
-}
-
-inline int write_value(soap *ctx, const value &v)
-{
-    const int id = soap_attachment_ref_out(ctx, "data", 0, v.content, &v, v.id, v.type, v.options, 1, nullptr,
-                                           VALUE_TYPE);
-    if (id < 0)
-        return ctx->error;
-    if (soap_element_out_begin(ctx, "data", id, nullptr) != 0 ||
-        soap_base64_write(ctx, v.content, static_cast<std::size_t>(v.size)) != 0)
-        return ctx->error;
-    return soap_element_out_end(ctx, "data");
+    value v;
+    v.content = reinterpret_cast<unsigned char *>(const_cast<char *>(bytes.data()));
+    v.size = static_cast<int>(bytes.size());
+    v.id = const_cast<char *>(id);
+    v.type = const_cast<char *>(type);
+    v.options = const_cast<char *>(options);
+    return v;
 }
 
 inline int write_message(soap *ctx, const std::deque<value> &values)
@@ -78,7 +63,7 @@ inline int write_message(soap *ctx, const std::deque<value> &values)
     if (soap_envelope_out_begin(ctx) != 0 || soap_body_out_begin(ctx) != 0)
         return ctx->error;
     for (const value &v : values) {
-        if (write_value(ctx, v) != 0)
+        if (v.soap_out(ctx, "data", 0, nullptr) != 0)
             return ctx->error;
     }
     if (soap_body_out_end(ctx) != 0)
@@ -91,10 +76,8 @@ inline int send(memory_wire &wire, const std::deque<value> &values, bool length_
 {
     wire.encoding_style = nullptr;
     soap_reset_call(&wire);
-    for (const value &v : values) {
-        if (v.id != nullptr || v.type != nullptr)
-            wire.mode |= MODE_DIME; // as the mark pass does
-    }
+    for (const value &v : values)
+        v.soap_serialize(&wire);
     if (soap_count_begin(&wire) != 0)
         return wire.error;
     const bool counts = (wire.mode & MODE_COUNTING) != 0;
@@ -114,7 +97,8 @@ inline int send_request(memory_wire &wire, const std::deque<value> &values)
     wire.on_open = [](soap *, const char *, const char *, int) { return -1; };
     wire.encoding_style = nullptr;
     soap_reset_call(&wire);
-    wire.mode |= MODE_DIME;
+    for (const value &v : values)
+        v.soap_serialize(&wire);
     if (soap_count_begin(&wire) != 0 ||
         ((wire.mode & MODE_COUNTING) != 0 && write_message(&wire, values) != 0) ||
         soap_count_end(&wire) != 0 || soap_server_connect(&wire, "http://host/path", "") != 0 ||
@@ -123,32 +107,14 @@ inline int send_request(memory_wire &wire, const std::deque<value> &values)
     return soap_send_finish(&wire);
 }
 
-inline int read_value(soap *ctx, value &v)
-{
-    const bool has_body = ctx->has_body != 0;
-    v = {};
-    if (ctx->element_href[0] != '\0') {
-        if (soap_attachment_ref_in(ctx, &v.content, &v.size, &v.id, &v.type, &v.options) != 0)
-            return ctx->error;
-    } else if (has_body) {
-        const bool refers = (ctx->mode & MODE_MTOM) != 0 &&
-                            soap_xop_include_in(ctx, &v.content, &v.size, &v.id, &v.type, &v.options) == 0;
-        if (ctx->error != 0)
-            return ctx->error;
-        if (!refers)
-            v.content = soap_base64_inline_read(ctx, &v.size);
-    }
-    return has_body ? soap_element_in_end(ctx, "data") : 0;
-}
-
 inline int read_values(soap *ctx, std::deque<value> &values)
 {
-    while (soap_element_in_begin(ctx, "data", 1, nullptr) == 0) {
-        values.emplace_back();
-        if (read_value(ctx, values.back()) != 0)
-            return ctx->error;
+    while (values.emplace_back().soap_in(ctx, "data", nullptr) != nullptr) {
     }
-    return ctx->error == SOAP_NO_TAG ? ctx->error = 0 : ctx->error;
+    if (ctx->error != SOAP_NO_TAG)
+        return ctx->error;
+    values.pop_back();
+    return ctx->error = 0;
 }
 
 // One reception of a message. The values lie in a deque, as references keep their addresses.

@@ -7,7 +7,7 @@
 #include <string>
 #include <utility>
 
-#include <zuv_client_pro/soap.h>
+#include <zuv_client_pro/soap_attachment.h>
 
 // A stream with its bytes. Its address is the handle of an attachment to send.
 struct host_stream {
@@ -60,9 +60,9 @@ private:
     {
         return id != nullptr && std::strstr(id, "memory") != nullptr;
     }
-    static void *open_read(soap *, void *handle, const char *id, const char *, const char *)
+    static void *open_read(soap *ctx, void *handle, const char *id, const char *, const char *)
     {
-        return is_for_memory(id) ? nullptr : handle;
+        return is_for_memory(id) ? soap_attachment_in_memory(ctx) : handle;
     }
     static std::size_t read(soap *, void *handle, char *buffer, std::size_t length)
     {
@@ -75,7 +75,7 @@ private:
     static void *take(soap *ctx, const char *id)
     {
         auto &taken = static_cast<stream_host *>(ctx->user)->taken;
-        return is_for_memory(id) ? nullptr
+        return is_for_memory(id) ? soap_attachment_in_memory(ctx)
                                  : &taken.emplace_back(id == nullptr ? "" : id, host_stream{}).second;
     }
     static int write(soap *ctx, void *handle, const char *data, std::size_t length)

@@ -8,6 +8,7 @@
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
 #include <zuv_client_pro/protocol.h>
 #include <zuv_client_pro/protocolProfile.h>
+#include <zuv_client_pro/soap_attachment.h>
 #include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/type_ids.h>
@@ -223,6 +224,19 @@ TEST_F(CallCycle, a_cyclic_document_ends_the_count_before_anything_is_sent)
     EXPECT_EQ(SOAP_LENGTH, proxy.set(&document, set));
     EXPECT_EQ(0, wire.opened);
     EXPECT_TRUE(wire.sent.empty());
+}
+
+// As after any other failure: attachments belong to one call.
+TEST_F(CallCycle, attachments_that_are_refused_are_gone_for_the_next_call)
+{
+    proxy.output_mode = MODE_DIME;
+    for (int i = 0; i < 2; ++i)
+        ASSERT_EQ(0, soap_dime_attach(&proxy, const_cast<char *>("x"), 1, "a/b", "one", 0, nullptr));
+    EXPECT_EQ(SOAP_DIME_ERROR, proxy.get(&request, response));
+    EXPECT_STREQ("Two attachments have the id \"one\"", proxy.soap_fault_string());
+    EXPECT_EQ(0, wire.opened);
+    EXPECT_EQ(0, get(OK));
+    EXPECT_EQ(std::string::npos, wire.sent.find("one"));
 }
 
 TEST(Proxy, takes_endpoint_and_modes_and_is_a_copy_of_an_engine)

@@ -19,6 +19,7 @@ TEST(dime_out, is_one_record_for_the_message_and_one_for_each_attachment)
     const std::string second = "second!!";
     memory_wire wire(0, SENDING);
     char *options = soap_dime_options_make(&wire, 7, "opt");
+    options[5] = '\0'; // the length tells where they end
     ASSERT_EQ(soap_dime_attach(&wire, const_cast<char *>("host's"), 6, nullptr, "own", 0, nullptr), 0);
     ASSERT_EQ(
         send(wire, {make_value(first, nullptr, "image/png"), make_value(second, "cid:two", nullptr, options),
@@ -36,7 +37,7 @@ TEST(dime_out, is_one_record_for_the_message_and_one_for_each_attachment)
     EXPECT_EQ(xml.substr(xml.size() - 2), "\r\n");
     EXPECT_EQ(sent, record(MB, URI, "cid:id0", ENVELOPE_URI, xml) + record(0, MEDIA, "own", "", "host's") +
                         record(0, MEDIA, "id1", "image/png", first) +
-                        record(ME, MEDIA, "two", "", second, std::string("\0\7\0\3opt", 7)));
+                        record(ME, MEDIA, "two", "", second, std::string("\0\7\0\3o\0t", 7)));
     expect_same_at_every_split(sent,
                                "[cid:id1 image/png first][cid:two (null) second!!][(null) (null) first]");
 }

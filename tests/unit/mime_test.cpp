@@ -1,6 +1,7 @@
 // MIME and MTOM messages on the wire and back: delimiters at every place, heads, lazy reading, references.
 #include "support/attachment_checks.h"
 
+#include <algorithm>
 #include <chrono>
 #include <regex>
 #include <set>
@@ -233,7 +234,7 @@ TEST(mime_in, reports_what_is_wrong_with_a_message)
     EXPECT_EQ(reception(root("") + part(fields, "x") + END).run(), SOAP_MIME_ERROR);
 }
 
-TEST(mime_in, mtom_needs_no_mode_of_the_host_when_the_part_says_so)
+TEST(mime_in, mtom_needs_no_mode_of_the_host_when_the_part_or_the_message_says_so)
 {
     const auto message = [](const std::string &element) {
         return "--bb\r\nContent-Type: application/xop+xml; type=\"text/xml\"\r\n\r\n" + envelope(element) +
@@ -251,6 +252,13 @@ TEST(mime_in, mtom_needs_no_mode_of_the_host_when_the_part_says_so)
     };
     for (const auto &[element, summary] : cases)
         EXPECT_EQ(reception(message(element)).summary(), summary) << element;
+    const std::string by_its_head = root(cases[0].first) + part("Content-ID: <a b>\r\n", "x") + END;
+    for (const char *type : {"application/xop+xml", "\"application/XOP+xml\"", "\"text/xml\""})
+        EXPECT_EQ(reception(std::string("HTTP/1.1 200 OK\r\nContent-Type: multipart/related; type=") + type +
+                            "; boundary=bb\r\n\r\n" + by_its_head)
+                          .summary() == cases[0].second,
+                  std::strstr(type, "text") == nullptr)
+            << type;
 }
 
 // The parts come as they are asked for, out of a compressed stream too and whatever carries it, and the
@@ -418,6 +426,198 @@ TEST(references, answered_by_a_part_go_out_in_a_record)
         memory_wire wire(0, SENDING);
         ASSERT_EQ(send(wire, read.values), 0);
         EXPECT_EQ(reception(wire.sent()).summary(), "[cid:a (null) A]");
+    }
+}
+
+// --- DIME and MIME alike ---
+
+constexpr std::uint32_t FORMS[] = {0, MTOM}; // of values: DIME, MTOM
+
+// The bytes are one buffer, the values are not one attachment: each goes out under its own id, type and
+// options, or in place. What is alike in all of them goes once.
+TEST(values, over_one_buffer_go_out_each_in_its_form)
+{
+    const std::string bytes = "one buffer";
+    memory_wire keeper;
+    char *const some = soap_dime_options_make(&keeper, 7, "opt"), *const same = soap_dime_options_make(
+                                                                      &keeper, 7, "opt");
+    const struct {
+        const char *id, *type;
+        char *options;
+        int size;
+        int attachment; // 0 in place
+    } forms[] = {{nullptr, nullptr, nullptr, 10, 0}, {nullptr, "a/b", nullptr, 10, 1},
+                 {nullptr, "c/d", nullptr, 10, 2},   {"cid:x", nullptr, nullptr, 10, 3},
+                 {"cid:y", "a/b", some, 10, 4},      {"cid:y", "a/b", same, 10, 4},
+                 {"cid:z", "a/b", nullptr, 4, 5},    {nullptr, nullptr, nullptr, 4, 0},
+                 {nullptr, "a/b", some, 10, 6}};
+    for (const std::uint32_t mode :
+         {FORMS[0], FORMS[1], FORMS[0] | SOAP_XML_GRAPH, FORMS[1] | SOAP_XML_GRAPH})
+        for (const auto &one : forms)
+            for (const auto &other : forms) {
+                std::deque<value> values;
+                std::set<int> attachments;
+                for (const auto *form : {&one, &other, &one}) {
+                    values.push_back(make_value(bytes, form->id, form->type, form->options));
+                    values.back().size = form->size;
+                    const bool alike = (mode & MODE_MTOM) != 0 && form->attachment == 6; // no options in MIME
+                    attachments.insert(alike ? 1 : form->attachment);
+                }
+                memory_wire wire(0, SENDING | mode);
+                ASSERT_EQ(send(wire, values), 0);
+                reception read(wire.sent(), mode & MODE_MTOM);
+                ASSERT_EQ(read.run(), 0) << wire.sent();
+                ASSERT_EQ(read.values.size(), 3U);
+                for (std::size_t i = 0; i < 3; ++i) {
+                    const value &sent = values[i], &got = read.values[i];
+                    EXPECT_EQ(got.bytes(), sent.bytes()) << wire.sent();
+                    EXPECT_EQ(text(got.type), text(sent.type)) << wire.sent();
+                    EXPECT_EQ(got.id != nullptr, sent.id != nullptr || sent.type != nullptr) << wire.sent();
+                    EXPECT_TRUE(sent.id == nullptr || text(sent.id) == got.id) << wire.sent();
+                    EXPECT_EQ(got.options != nullptr, sent.options != nullptr && (mode & MODE_MTOM) == 0);
+                }
+                attachments.erase(0);
+                std::size_t count = 0;
+                for (const soap_attachment *list : {read.wire->dime.list, read.wire->mime.list})
+                    for (; list != nullptr; list = list->next)
+                        count += list != read.wire->mime.root;
+                EXPECT_EQ(count, attachments.size()) << wire.sent();
+            }
+}
+
+// As the reader would: no receiver could tell which of them a reference means.
+TEST(attachments, of_one_id_are_refused_by_the_writer)
+{
+    const std::string bytes = "some", others = "more";
+    const auto attach = [](soap &ctx, std::uint32_t form, const char *id) {
+        char *const content = const_cast<char *>("host's");
+        if ((form & MODE_MIME) != 0)
+            soap_mime_attach(&ctx, content, 6, MIME_BINARY, "a/b", id, nullptr, nullptr);
+        else
+            soap_dime_attach(&ctx, content, 6, "a/b", id, 0, nullptr);
+    };
+    const value a = make_value(bytes, "cid:a", "a/b"), typed = make_value(bytes, "cid:a", "c/d"),
+                elsewhere = make_value(others, "cid:a", "a/b"), b = make_value(others, "cid:b", "a/b");
+    const struct {
+        const char *rule;
+        std::deque<value> values;
+        std::vector<const char *> ids; // of the host's own
+        std::uint32_t form;
+        int error;
+    } cases[] = {
+        {"different", {a, b}, {"c", nullptr, nullptr}, 0, 0},
+        {"different parts", {a, b}, {"<c>", nullptr, nullptr}, MTOM, 0},
+        {"one value twice", {a, a}, {}, 0, 0},
+        {"two types", {a, typed}, {}, 0, SOAP_DIME_ERROR},
+        {"two types in parts", {a, typed}, {}, MTOM, SOAP_MIME_ERROR},
+        {"two buffers", {a, elsewhere}, {}, MTOM, SOAP_MIME_ERROR},
+        {"a value's and the host's", {a, b}, {"b"}, 0, SOAP_DIME_ERROR},
+        {"a value's and the host's part", {a, b}, {"<b>"}, MTOM, SOAP_MIME_ERROR},
+        {"without the brackets", {a, b}, {"b"}, MTOM, SOAP_MIME_ERROR},
+        {"two of the host's", {a}, {"c", "c"}, 0, SOAP_DIME_ERROR},
+        {"the message's part", {a}, {"<root>"}, MTOM, SOAP_MIME_ERROR},
+    };
+    for (const auto &c : cases)
+        for (const std::uint32_t framing : {MODE_BUFFERED, MODE_STORE, MODE_CHUNKED}) {
+            memory_wire wire(0, framing | MODE_BARE_XML | c.form);
+            if (c.form != 0)
+                soap_mime_start(&wire, "bb", "<root>");
+            for (const char *id : c.ids)
+                attach(wire, c.form, id);
+            EXPECT_EQ(send(wire, c.values, framing != MODE_CHUNKED), c.error) << c.rule;
+            EXPECT_TRUE(c.error == 0 || framing == MODE_CHUNKED || wire.sent().empty()) << c.rule;
+        }
+}
+
+// What the callbacks of the host do wrong, and that a stream once opened is closed.
+TEST(streams, of_the_host_that_misbehave_are_told_apart)
+{
+    struct stream {
+        std::string data;
+        std::size_t excess;
+        int opened, closed;
+    };
+    static const auto open = [](soap *ctx, void *handle, const char *id, const char *,
+                                const char *) -> void * {
+        if (std::strstr(id, "memory") != nullptr)
+            return soap_attachment_in_memory(ctx);
+        if (std::strstr(id, "refused") != nullptr)
+            ctx->error = 55;
+        if (std::strstr(id, "null") != nullptr || ctx->error != 0)
+            return nullptr;
+        static_cast<stream *>(handle)->opened++;
+        return handle;
+    };
+    static const auto read = [](soap *, void *handle, char *buffer, std::size_t length) {
+        auto &source = *static_cast<stream *>(handle);
+        const std::size_t part = std::min(length, source.data.size());
+        std::memcpy(buffer, source.data.data(), part);
+        source.data.erase(0, part);
+        return part + source.excess;
+    };
+    static const auto close = [](soap *, void *handle) { static_cast<stream *>(handle)->closed++; };
+    const struct {
+        const char *id;
+        std::size_t has, excess, size; // bytes: in the stream, more than asked for, as told
+        std::uint32_t framing;
+        int error;
+        const char *text; // in the fault
+    } cases[] = {
+        {"fine", 3000, 0, 3000, MODE_BUFFERED, 0, ""},
+        {"unknown", 3000, 0, 0, MODE_CHUNKED, 0, ""},
+        {"memory", 0, 0, sizeof(stream), MODE_BUFFERED, 0, ""},
+        {"no content, null", 0, 0, 0, MODE_BUFFERED, 0, ""}, // an empty attachment
+        {"no content, memory", 0, 0, 1, MODE_BUFFERED, SOAP_USER_ERROR, "has a length and no content"},
+        {"null", 0, 0, 3000, MODE_BUFFERED, SOAP_USER_ERROR, "open callback gave null for \"null\""},
+        {"refused", 0, 0, 3000, MODE_STORE, 55, ""},
+        {"short", 2999, 0, 3000, MODE_BUFFERED, SOAP_EOF, "\"short\" ended after 2999 of 3000 bytes"},
+        {"greedy", 3000, 1, 3000, MODE_BUFFERED, SOAP_CORRUPTION,
+         "gave 1025 bytes where 1024 were asked for"},
+        {"greedy", 1024, 1, 0, MODE_CHUNKED, SOAP_CORRUPTION, "gave 1025 bytes where 1024 were asked for"},
+        {"unknown", 3000, 0, 0, MODE_BUFFERED, SOAP_USER_ERROR,
+         "\"unknown\" was attached without its length"},
+    };
+    for (const std::uint32_t form : {MODE_DIME, MTOM, MODE_MIME})
+        for (const auto &c : cases) {
+            SCOPED_TRACE(std::string(c.id) + " " + std::to_string(form));
+            stream source = {std::string(c.has, 'x'), c.excess, 0, 0};
+            memory_wire wire(0, c.framing | MODE_BARE_XML | form);
+            wire.dime_read_open = wire.mime_read_open = open;
+            wire.dime_read = wire.mime_read = read;
+            wire.dime_read_close = wire.mime_read_close = close;
+            const bool has_content = std::strstr(c.id, "no content") == nullptr;
+            char *const handle = has_content ? reinterpret_cast<char *>(&source) : nullptr;
+            if (form == MODE_DIME)
+                soap_dime_attach(&wire, handle, c.size, "a/b", c.id, 0, nullptr);
+            else
+                soap_mime_attach(&wire, handle, c.size, MIME_BINARY, "a/b", c.id, nullptr, nullptr);
+            EXPECT_EQ(send(wire, {}, false), c.error);
+            EXPECT_EQ(source.closed, source.opened);
+            char told[1024] = "";
+            soap_fault_print_text(&wire, told, sizeof told);
+            EXPECT_NE(std::string(told).find(c.text), std::string::npos) << told;
+            EXPECT_TRUE(c.error != 0 || std::ranges::count(wire.sent(), 'x') >= static_cast<long>(c.has));
+        }
+}
+
+TEST(streams, of_the_host_that_does_not_take_an_attachment_are_an_error)
+{
+    const std::string bytes = "some bytes";
+    for (const std::uint32_t form : FORMS) {
+        memory_wire wire(0, SENDING | form);
+        ASSERT_EQ(send(wire, {make_value(bytes, "cid:a", "a/b")}), 0);
+        reception read(wire.sent(), form & MODE_MTOM);
+        stream_host host;
+        host.serve(*read.wire);
+        read.wire->dime_write_open = [](soap *, const char *, const char *, const char *) -> void * {
+            return nullptr;
+        };
+        read.wire->mime_write_open = [](soap *, void *, const char *, const char *, const char *,
+                                        int) -> void * { return nullptr; };
+        EXPECT_EQ(read.run(), SOAP_USER_ERROR);
+        char told[1024] = "";
+        soap_fault_print_text(read.wire.get(), told, sizeof told);
+        EXPECT_NE(std::string(told).find("open callback gave null for \""), std::string::npos) << told;
     }
 }
 
