@@ -134,9 +134,19 @@ void time_limits()
     proxy.connect_timeout = 10;    // seconds, for each address that the host's name has
     proxy.send_timeout = 30;       // seconds of silence while sending
     proxy.recv_timeout = -500'000; // negative: microseconds, here half a second
+    proxy.call_timeout = 120;      // seconds for the whole call
     protocolProfile__ProfileContent profile;
     __protocolProfile__createResponse created;
     expect(proxy.create(&profile, created) == 0, "the service answers in time");
+}
+
+void older_behaviour()
+{
+    ProfileSoapBindingProxy proxy(endpoint);
+    proxy.legacy = LEGACY_FIRST_ADDRESS; // as version 1.5.1 did
+    protocolProfile__ProfileContent profile;
+    __protocolProfile__createResponse created;
+    expect(proxy.create(&profile, created) == 0, "the service answers at its first address");
 }
 
 void several_endpoints()
@@ -293,6 +303,7 @@ int main(int argc, char **argv)
     one_context_for_each_thread();
     errors_and_faults();
     time_limits();
+    older_behaviour();
     several_endpoints();
     tls(nullptr);
     tls("/no/such/bundle.pem");
