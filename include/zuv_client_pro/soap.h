@@ -480,25 +480,28 @@ ZUV_API soap *soap_context_create(std::uint32_t input_mode, std::uint32_t output
 // soap_context_copy, which mends that; the virtual table of the target stays.
 ZUV_API void soap_context_assign(soap *target, const soap *source);
 
-// Makes `target` (a record with no contents of its own to lose) an independent copy of `source`, with
-// state 2. All settings and callbacks come along, and scratch texts as they stand. Everything that is freed
-// with a call or a context starts anew: managed memory and the fields that live in it, received namespaces,
-// attachments, trace files (on the same paths), compression. Shared by bytes: `user`, the streams, the number
-// of the socket (who keeps using it sets it to -1 in the other one), data of plug-ins without a copy hook,
-// and the TLS context, which only the original frees: it must outlive its copies' TLS connections.
+// Makes `target` an independent copy of `source`, with state 2. All settings and callbacks come along, and
+// scratch texts as they stand. Everything that is freed with a call or a context starts anew: managed memory
+// and the fields that live in it, received namespaces, attachments, trace files (on the same paths),
+// compression. Shared: `user`, the streams, data of plug-ins without a copy hook, the listening socket, which
+// only the source closes, and the TLS context, which lives as long as the last of them.
+//   target  a context, which is ended first, or memory of zeros only
+//
+// A copy starts without a connection: `socket` -1, keep_alive 0, no MODE_TLS. The one exception serves a
+// service with a thread for each client: a connection that the source has from soap_accept, before a TLS
+// handshake on it, is the copy's, and the source sets its own `socket` to -1. Constructors make no exception.
 //   target, also when both are the same
 //   null  an argument is null or `source` has ended: target is untouched
 //         a plug-in refuses (target->error is its answer) or memory runs out (20): what was built stays in
-//         target until its end
+//         target until its end, without a connection
 ZUV_API soap *soap_context_copy(soap *target, const soap *source);
 
 // The same into a record from plain memory, which the caller ends by soap_context_free. Null on failure;
-// nothing is left behind. The copy constructor does the same in place: a failure shows as state 0 or as a
-// non-zero error.
+// nothing is left behind. Of a copy constructor a failure shows as state 0 or as a non-zero error.
 ZUV_API soap *soap_context_copy(const soap *source);
 
-// Clears the per-message state ahead of an exchange, the error too; managed objects, soap_version and a kept
-// connection with its unread bytes stay.
+// Clears the per-message state ahead of an exchange, the error and the fault too; managed objects, the
+// header, soap_version and a kept connection with its unread bytes stay.
 ZUV_API void soap_reset_call(soap *ctx);
 
 // Frees what a message left in the working tables (prefixes, attributes, block stacks, namespaces,

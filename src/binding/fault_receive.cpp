@@ -42,9 +42,12 @@ bool may_be_fault(const soap *ctx)
     return ctx->error == SOAP_NO_TAG || (ctx->error == SOAP_TAG_MISMATCH && ctx->nesting_level == 2);
 }
 
-// No fault could be read: the error of the response stands, told as a fault of the sender.
+// No fault could be read: the error of the response stands, told as a fault of the sender. Only lack of
+// memory says nothing of what was there.
 int keep_error(soap *ctx, int error)
 {
+    if (ctx->error == SOAP_OUT_OF_MEMORY)
+        error = SOAP_OUT_OF_MEMORY;
     *soap_fault_code_field(ctx) = ctx->soap_version == 2 ? "SOAP-ENV:Sender" : "SOAP-ENV:Client";
     ctx->error = error;
     soap_fault_text_fill(ctx);

@@ -72,8 +72,10 @@ void *soap_block_alloc(soap *ctx, std::size_t size)
         return const_cast<char *>("");
     if (ctx == nullptr)
         return SOAP_MALLOC(ctx, size);
-    if (ctx->on_malloc != nullptr)
-        return ctx->on_malloc(ctx, size);
+    if (ctx->on_malloc != nullptr) {
+        void *block = ctx->on_malloc(ctx, size);
+        return block != nullptr ? block : out_of_memory(ctx);
+    }
     if (size > SIZE_MAX - BLOCK_OVERHEAD)
         return out_of_memory(ctx);
     const std::size_t span = (size + sizeof CANARY + 7) & ~std::size_t{7};

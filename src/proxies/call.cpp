@@ -110,6 +110,11 @@ int call(soap *ctx, const char *&proxy_endpoint, const char *default_endpoint, c
     return soap_socket_release(ctx);
 }
 
+void *record_or(void *record, void *stand_in)
+{
+    return record ? record : stand_in;
+}
+
 int init(soap *ctx, int input_mode, int output_mode, const soap_namespace *namespaces)
 {
     ctx->input_mode = static_cast<std::uint32_t>(input_mode);

@@ -96,13 +96,15 @@
 #define PROXY_DEFINE_CALL(P, name, Request, Record, request_element, Result, response_element, record_id)    \
     int P::name(Request *request, Record &response)                                                          \
     {                                                                                                        \
-        return _##name(nullptr, nullptr, request, response);                                                 \
+        return _##name(nullptr, nullptr, request,                                                            \
+                       *static_cast<Record *>(proxies::record_or(&response, &proxies::no_record<Record>)));  \
     }                                                                                                        \
     int P::_##name(const char *url, const char *soap_action, Request *request, Record &response)             \
     {                                                                                                        \
         static constexpr proxies::operation operation = {request_element, &binding::ops_of<Request>,         \
                                                          response_element, &binding::ops_of<Result>,         \
                                                          record_id};                                         \
+        const bool one_way = &response == &proxies::no_record<Record>;                                       \
         return proxies::call(this, endpoint, default_endpoint, operation, url, soap_action, request,         \
-                             reinterpret_cast<void **>(&response));                                          \
+                             one_way ? nullptr : reinterpret_cast<void **>(&response));                      \
     }
