@@ -18,6 +18,13 @@ constexpr int STATUS_STOP = 1000; // no head to write, end of this exchange
 
 // --- connecting ---
 
+// Looks whether a call may go to an endpoint: one URL, or several with blanks between. Each has no scheme, or
+// one of http, https (in any case), httpg and soap.udp followed by "://"; a host, which an IPv6 address is in
+// brackets; a port from 1 to 65535 or none; no user and no character below 33. Calls of proxies ask this
+// first, unless LEGACY_ANY_ENDPOINT is set. 0, 20, or 28 with a fault whose text quotes what is refused,
+// without a user's part.
+ZUV_API int soap_endpoint_check(soap *ctx, const char *endpoints);
+
 // Connects and writes the head of a POST.
 //   endpoints  one URL, or several with blanks between them: the next is tried when a connection fails with
 //   error 28 action     SOAPAction, copied; null for none

@@ -94,6 +94,8 @@ int call(soap *ctx, const char *&proxy_endpoint, const char *default_endpoint, c
         proxy_endpoint = default_endpoint;
     ctx->encoding_style = nullptr;
     soap_reset_call(ctx);
+    if (soap_endpoint_check(ctx, proxy_endpoint))
+        return ctx->error;
     soap_mark_header(ctx);
     binding::class_pointer_mark(ctx, *op.request, request);
     if (count_message(ctx, op, request))

@@ -84,6 +84,115 @@ TEST_F(CallCycle, tries_the_endpoints_of_a_list_in_turn_on_connection_errors_onl
     EXPECT_EQ(SOAP_TCP_ERROR, proxy._get("http://down/ http://down/", nullptr, &request, response));
 }
 
+TEST_F(CallCycle, refuses_an_endpoint_that_leads_nowhere_before_anything_is_sent)
+{
+    static const char *const taken[] = {"http://h/",
+                                        "HTTPS://h",
+                                        "httpg://h:1/x",
+                                        "http://h:65535/a:b@c?d#e",
+                                        "http://[::1]:8080/a",
+                                        "http://[fe80::1%eth0]/",
+                                        "http://h_x-1.example",
+                                        " http://h/  http://i/ ",
+                                        "h:80/x",
+                                        "h/x//y"}; // no scheme, which is plain XML without HTTP
+    static const char *const refused[] = {"",
+                                          " ",
+                                          "http:",
+                                          "http:h/x",
+                                          "https:443/",
+                                          "http://",
+                                          "http:///x",
+                                          "https://:443/",
+                                          "http://[]/",
+                                          "http://[::1",
+                                          "http://[::1]x/",
+                                          "http://h:/",
+                                          "http://h:0/",
+                                          "http://h:65536/",
+                                          "http://h:4294967376/",
+                                          "http://h:-1/",
+                                          "http://h:+80/",
+                                          "http://h:8x/",
+                                          "http://h:80?q",
+                                          "http://h?q=http://i/",
+                                          "http://h#f",
+                                          "http://h\\i/",
+                                          "htps://h/",
+                                          "ftp://h/",
+                                          "HTTPG://h/",
+                                          "h/x?q=http://i/"};
+    static const struct {
+        const char *endpoint, *quoted;
+    } told_otherwise[] = {{"http://h/ htps://i/ http://j/", "htps://i/"},
+                          {"http://h/a\tb", "http://h/a?b"},
+                          {"http://h\r\nX: y/", "http://h??X:"},
+                          {"http://u:pw@h/", "http://...@h/"},
+                          {"https://u:p@w@h:443/x@y", "https://...@h:443/x@y"}};
+    const auto call_at = [this](const char *endpoint) {
+        wire.opened = 0;
+        wire.sent.clear();
+        wire.answers = {http_answer(envelope(OK))};
+        return proxy._get(endpoint, nullptr, &request, response);
+    };
+    const auto refuses = [&](const char *endpoint, const std::string &quoted) {
+        EXPECT_EQ(SOAP_TCP_ERROR, call_at(endpoint)) << endpoint;
+        const std::string text = proxy.soap_fault_string() ? proxy.soap_fault_string() : "";
+        EXPECT_EQ(0u, text.find("No call can go to \"" + quoted + "\": ")) << text;
+        EXPECT_EQ(0, wire.opened) << endpoint;
+        EXPECT_EQ("", wire.sent) << endpoint;
+    };
+    for (const char *endpoint : taken)
+        EXPECT_EQ(0, call_at(endpoint)) << endpoint;
+    for (const char *endpoint : refused)
+        refuses(endpoint, endpoint);
+    for (const auto &c : told_otherwise)
+        refuses(c.endpoint, c.quoted);
+    proxy.legacy = LEGACY_ANY_ENDPOINT;
+    EXPECT_EQ(0, call_at("htps://h:99999/"));
+    EXPECT_EQ(0, call_at("")) << "by descriptor, or the hooks in its place";
+}
+
+TEST_F(CallCycle, a_failure_is_never_told_by_the_fault_of_an_earlier_call)
+{
+    static const struct {
+        const char *rule;
+        void (*fail)(ProfileSoapBindingProxy &failing);
+        const char *text;
+    } cases[] = {
+        {"no answer", [](ProfileSoapBindingProxy &) {},
+         "End of file or no input: Operation interrupted or timed out"},
+        {"not sent",
+         [](ProfileSoapBindingProxy &failing) {
+             failing.on_send = [](soap *, const char *, std::size_t) { return -1; };
+         },
+         "End of file or no input: Operation interrupted or timed out"},
+        {"refused by a hook",
+         [](ProfileSoapBindingProxy &failing) {
+             failing.on_connect = [](soap *, const char *, const char *, int) { return 99; };
+         },
+         "Error 99"},
+        {"not counted",
+         [](ProfileSoapBindingProxy &failing) {
+             failing.on_send_prepare_begin = [](soap *ctx) { return ctx->error = SOAP_USER_ERROR; };
+         },
+         "User data error"},
+    };
+    for (const auto &c : cases) {
+        ASSERT_EQ(SOAP_CLIENT_FAULT, get(fault_11("E:Client", "<detail><x/></detail>"))) << c.rule;
+        c.fail(proxy);
+        EXPECT_NE(0, proxy.get(&request, response)) << c.rule;
+        std::ostringstream printed;
+        proxy.soap_stream_fault(printed);
+        EXPECT_EQ("SOAP-ENV:Client [no subcode]\n\"" + std::string(c.text) + "\"\nDetail: [no detail]\n",
+                  printed.str().substr(printed.str().find("SOAP-ENV")))
+            << c.rule;
+        proxy.on_connect = nullptr;
+        proxy.on_send_prepare_begin = nullptr;
+        wire.carry(proxy);
+    }
+}
+
 TEST_F(CallCycle, keeps_a_connection_when_asked_and_only_after_a_whole_answer)
 {
     proxy.input_mode = proxy.output_mode = MODE_KEEP_ALIVE;
