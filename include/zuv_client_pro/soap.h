@@ -224,6 +224,19 @@ struct soap_mime_state {
     char *start;                   // Content-ID of the SOAP part; managed memory; null for the first part
 };
 
+// Where the connection of a client leads and under which rules it was made: what the next call must want
+// alike to be carried by it. Set when the connection is opened, private to the transport.
+struct soap_route {
+    bool known;          // false: no connection, or one that was not opened for a call
+    bool secure;         // TLS
+    bool datagrams;      // UDP
+    std::uint16_t rules; // tls_flags when it was made
+    int port, proxy_port;
+    char host[SOAP_TEXT_SIZE];
+    char proxy_host[SOAP_TEXT_SIZE]; // empty: direct. A copy, as the host's text may change in place; a
+                                     // longer one is cut and so equals none
+};
+
 // ---------------------------------------------------------------------------------------------
 // The context.
 
@@ -274,8 +287,11 @@ struct ZUV_CLASS soap {
     std::uint32_t next_id;              // last number given to a marked object
     void *user;                         // free for the application
     soap_plugin_record *plugin_list;    // newest first
-    const char *auth_user, *auth_password; // HTTP Basic credentials; managed memory or the host's
-    const char *auth_realm;                // from a received challenge; managed
+    const char *auth_user, *auth_password; // HTTP Basic credentials; managed memory, which is wiped when it
+                                           // is freed, or the host's
+    bool credentials_passed; // some lie in `buffer` and the scratch texts, which soap_block_free with null
+                             // wipes
+    const char *auth_realm;  // from a received challenge; managed
 
     // Callbacks. All take the context first. A null entry is skipped.
     int (*on_post)(soap *ctx, const char *endpoint, const char *host, int port, const char *path,
@@ -333,6 +349,9 @@ struct ZUV_CLASS soap {
     bool socket_abandoned;    // soap_force_close closed `socket`: the number is neither used nor closed again
     bool response_unfinished; // the last response was not read to its end: the connection carries no other
                               // call
+    bool socket_accepted;     // `socket` is of soap_accept
+    bool master_shared;       // master_socket is that of the context that this is a copy of: not closed here
+    soap_route route;         // of `socket`
     std::ostream *output_stream; // borrowed; in place of the socket
     std::istream *input_stream;  // borrowed; in place of the socket
     int send_fd;                 // used for output when there is no socket
@@ -433,11 +452,12 @@ struct ZUV_CLASS soap {
     int (*tls_verify)(int result, x509_store_ctx_st *store);
     bio_st *tls_bio;
     ssl_st *tls_connection;
-    ssl_ctx_st *tls_context; // shared with copies; freed by the original
+    ssl_ctx_st *tls_context; // one reference, the context's own; a copy gets another to the same
     ssl_session_st *tls_session;
     const char *tls_dh_file, *tls_random_file;                                     // borrowed
     std::uint16_t tls_flags;                                                       // TLS_... of soap_tls.h
     const char *tls_key_file, *tls_password, *tls_ca_file, *tls_ca_path, *tls_crl; // borrowed
+    ssl_ctx_st *session_rules;         // one reference to the TLS context that tls_session was made under
     char session_host[SOAP_TEXT_SIZE]; // where tls_session came from
     int session_port;
     z_stream_s *zlib_stream; // owned
@@ -454,7 +474,12 @@ struct ZUV_CLASS soap {
     soap();                            // both modes 0
     explicit soap(std::uint32_t mode); // one mode for both ways
     soap(std::uint32_t input_mode, std::uint32_t output_mode);
-    soap(const soap &other); // soap_context_copy
+    soap(const soap &other); // as soap_context_copy, and never with a connection
+    // Takes over all that `other` has but its connection, which is closed by the rules of
+    // soap_socket_release: settings, managed memory, plug-ins, log channels, a listening socket. `other` is
+    // left as `soap()` makes it. Addresses of the context that hosts keep elsewhere (data of a plug-in,
+    // `soap` of a data object) still name `other`. Does nothing if `other` has ended: state is 0.
+    soap(soap &&other) noexcept;
     soap &operator=(const soap &) = delete;
     virtual ~soap(); // discards all and ends the engine
 };

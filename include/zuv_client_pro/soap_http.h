@@ -32,8 +32,10 @@ ZUV_API int soap_endpoint_check(soap *ctx, const char *endpoints);
 ZUV_API int soap_server_connect(soap *ctx, const char *endpoints, const char *action);
 
 // The same for one endpoint and the kind of request in `status` (STATUS_...). A kept connection is used again
-// if it goes to the same host and port with the same security, still lives, and its last response was read to
-// the end. STATUS_GET ends the request.
+// if it goes to the same host and port with the same security, through the same HTTP proxy and under the same
+// TLS rules (the last two don't count with LEGACY_ANY_ROUTE), still lives, and its last response was read to
+// the end. A null or empty endpoint connects to nothing: what is sent goes where tcp_send sends it without a
+// socket. STATUS_GET ends the request.
 ZUV_API int soap_connect_one(soap *ctx, int status, const char *endpoint, const char *action);
 
 // Splits a URL into endpoint, host, port (80, or 443 for https) and path of the context. Parts over 1023
@@ -46,6 +48,8 @@ ZUV_API void soap_parse_endpoint(soap *ctx, const char *url);
 //   path    one slash at its head is dropped, as the request line has its own; null is empty
 //   action  SOAPAction; null for none; over 1020 bytes it goes out empty
 //   count   Content-Length, bytes
+// Authorization is for the service and not in a CONNECT (LEGACY_TUNNEL_CREDENTIALS: there too), and
+// Proxy-Authorization for the HTTP proxy alone: in a CONNECT, and in what it passes on by plain HTTP.
 // 0, 20 for an endpoint and version of more than 944 bytes, or an error of sending.
 ZUV_API int http_write_request(soap *ctx, const char *endpoint, const char *host, int port, const char *path,
                                const char *action, std::uint64_t count);
@@ -74,8 +78,9 @@ ZUV_API const char *http_reason(int status);
 // status, with a fault: text "HTTP Error" and the start line as detail, or the start line and the error body.
 ZUV_API int http_read_head(soap *ctx);
 
-// Default of on_parse_header: takes one header over into the context. Unknown ones are dropped. 0, 20, or an
-// error of sending the answer to "Expect".
+// Default of on_parse_header: takes one header over into the context. Unknown ones are dropped, and so is
+// Authorization in a response, unless LEGACY_ANSWER_CREDENTIALS is set. 0, 20, or an error of sending the
+// answer to "Expect".
 ZUV_API int http_parse_header(soap *ctx, const char *key, const char *value);
 
 ZUV_API int http_get_default(soap *ctx); // default of on_get: error 15

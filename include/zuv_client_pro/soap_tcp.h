@@ -31,8 +31,10 @@ ZUV_API int tcp_wait(soap *ctx, int socket, int flags, int timeout);
 // Limits: connect_timeout, for each attempt to connect and, counted anew, for the handshake. With a limit,
 // only an address that refuses at once is followed by the next one. Returns the socket, which also stands in
 // ctx->socket and belongs to the context; or -1, with ctx->socket -1 and ctx->error 28 (network), 30 (TLS),
-// 46 (too many descriptors) or what the proxy answered to CONNECT. With MODE_UDP in output_mode nothing is
-// connected: the address is kept in ctx->peer.
+// 46 (too many descriptors), or for a CONNECT that did not lead to a tunnel its HTTP status (200 with a body
+// among them), 29 (the answer is not HTTP) or -1 (none), with a fault that says so; an answer to CONNECT
+// leaves nothing else behind. With MODE_UDP in output_mode nothing is connected: the address is kept in
+// ctx->peer.
 ZUV_API int tcp_connect(soap *ctx, const char *endpoint, const char *host, int port);
 
 // Sends all bytes (default of on_send): to output_stream if set, else to the socket, else to send_fd.
@@ -82,6 +84,7 @@ ZUV_API int tcp_accept_socket(soap *ctx, int socket, void *address, int *length)
 ZUV_API int soap_bind(soap *ctx, const char *host, int port, int backlog);
 
 // Waits for a client, at most accept_timeout. Its socket is kept in ctx->socket (which is not closed before:
-// it may serve another context by now); host, port and peer_address take the client's. With MODE_UDP: the
-// master socket. Returns the socket; or -1 with a fault, error 28 or 46, and ctx->socket -1.
+// it may serve a copy of the context by now, see soap_context_copy); host, port and peer_address take the
+// client's. With MODE_UDP: the master socket. Returns the socket; or -1 with a fault, error 28 or 46, and
+// ctx->socket -1.
 ZUV_API int soap_accept(soap *ctx);

@@ -19,9 +19,12 @@ constexpr std::uint16_t TLS_NO_SSLV3 = 128;          // SSL 3.0 off
 constexpr std::uint16_t TLS_CLIENT_SIDE = 256;       // set by the client set-up and by a TLS connect
 constexpr std::uint16_t TLS_STRICT_HOST_CHECK = 512; // the certificate must name the host by RFC 6125
 
-// Stores its arguments and builds the TLS context (tls_setup). Without a call of it the first https
-// connection builds one from the fields' defaults. A TLS context that exists is kept and added to, also for
-// the contexts that share it; a session kept under the former rules is dropped.
+// Stores its arguments and builds a new TLS context (tls_setup) in the place of the one there was. Without a
+// call of it the first https connection builds one from the fields' defaults. New rules are in force at once:
+// a TLS connection that is open is closed (so don't call it within an exchange), and no session made before
+// is resumed. What a host did to the former tls_context itself is to be done again. Copies made before keep
+// the rules that they were made with. After a failure no former rules are left: each https connection tries
+// to build the TLS context from the fields, and fails alike until that succeeds.
 //   flags        TLS_...
 //   key_file     PEM: certificate chain and private key of this side; null: none
 //   password     of the private key; null: none (nobody is prompted)
@@ -47,8 +50,9 @@ ZUV_API int soap_ssl_server_context(soap *ctx, std::uint16_t flags, const char *
 // two stretches. Returns 0; or error 30 with a fault, and the socket closed.
 ZUV_API int soap_ssl_accept(soap *ctx);
 
-// Builds tls_context from the fields, or adds to one that exists; the default of tls_setup. A context that it
-// could not finish building is freed. Returns 0, or error 30.
+// Builds tls_context from the fields, with the same effect on former rules; the default of tls_setup. A
+// set-up of the host's own puts an SSL_CTX there with a reference that the context frees. Returns 0, or error
+// 30 with tls_context null.
 ZUV_API int tls_context_setup(soap *ctx);
 
 // Verify callbacks for OpenSSL. The first passes on OpenSSL's own verdict; the second takes an expired

@@ -94,7 +94,7 @@ static soap_track_entry *entry_for(soap *ctx, void *address)
     soap_memory_pools *pools = ctx->pools;
     soap_track_entry *entry = find_entry(ctx, address);
     if (entry != nullptr) {
-        if (entry->dead_slot != TRACK_LIVE)
+        if (!track_is_live(entry))
             pools->dead[entry->dead_slot] = nullptr;
         return entry;
     }
@@ -150,9 +150,17 @@ void track_free(soap *ctx, soap_track_entry *entry)
     std::free(address);
 }
 
+void track_secret(soap *ctx, const void *address)
+{
+    soap_track_entry *entry = find_entry(ctx, address);
+    if (entry != nullptr && track_is_live(entry))
+        entry->dead_slot = TRACK_SECRET;
+}
+
 soap_track_entry *track_move(soap *source, soap *target, soap_track_entry *entry)
 {
     soap_track_entry *moved = enter(target, entry->source_file, entry->source_line, entry->address);
+    moved->dead_slot = entry->dead_slot;
     drop_entry(source, entry);
     return moved;
 }
@@ -174,7 +182,7 @@ void tracked_free(soap *ctx, const char *source_file, int source_line, void *add
     soap_track_entry *entry = find_entry(ctx, address);
     if (entry == nullptr)
         std::fprintf(stderr, "%s(%d): free(%p) pointer not malloced\n", source_file, source_line, address);
-    else if (entry->dead_slot != TRACK_LIVE)
+    else if (!track_is_live(entry))
         std::fprintf(stderr, "%s(%d): free(%p) double free of pointer malloced at %s(%d)\n", source_file,
                      source_line, address, entry->source_file, entry->source_line);
     else
@@ -185,7 +193,7 @@ void track_end(soap *ctx)
 {
     for (std::size_t i = 0; i <= ctx->track_chain_mask; ++i) {
         for (const soap_track_entry *entry = ctx->track_chains[i]; entry != nullptr; entry = entry->next) {
-            if (entry->dead_slot == TRACK_LIVE)
+            if (track_is_live(entry))
                 std::fprintf(stderr,
                              "%s(%d): malloc() = %p not freed (memory leak or forgot to call soap_end()?)\n",
                              entry->source_file, entry->source_line, entry->address);

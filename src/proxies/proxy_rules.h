@@ -35,6 +35,12 @@
         endpoint = url;                                                                                      \
     }                                                                                                        \
     P::P(const soap &other) : soap(other) {}                                                                 \
+    P::P(const P &other) : soap(other) {}                                                                    \
+    P::P(P &&other) noexcept : soap(static_cast<soap &&>(other)), endpoint(other.endpoint)                   \
+    {                                                                                                        \
+        if (other.state != 0) /* else it was no context any more */                                          \
+            other.P::P##_init(0, 0);                                                                         \
+    }                                                                                                        \
     P::~P() = default;                                                                                       \
     int P::P##_init(int imode, int omode)                                                                    \
     {                                                                                                        \

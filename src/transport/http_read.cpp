@@ -8,6 +8,8 @@
 #include <cstdlib>
 #include <cstring>
 
+#include <openssl/crypto.h>
+
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_io.h>
@@ -111,7 +113,10 @@ int take_header(soap *ctx, head_state &head, char *line)
     *colon = '\0';
     if (ctx->on_parse_header == nullptr)
         return SOAP_OK;
-    const int result = ctx->on_parse_header(ctx, line, trimmed_value(colon + 1));
+    char *const value = trimmed_value(colon + 1);
+    const int result = ctx->on_parse_header(ctx, line, value);
+    if (ctx->auth_password != nullptr) // it may have come with this line
+        OPENSSL_cleanse(value, std::strlen(value));
     ctx->error = result < SOAP_STOP ? result : SOAP_OK;
     if (result >= SOAP_STOP)
         head.deferred = result;

@@ -17,6 +17,7 @@
 #include <zuv_client_pro/soap_io.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "engine/tracking.h"
 #include "transport/tcp_socket.h"
 #include "transport/tls_connection.h"
 
@@ -230,9 +231,11 @@ int write_host(soap *ctx, const char *host, int port)
     return line(ctx, "Host", value.text);
 }
 
-// Credentials that don't fit are left out; no copy of them stays behind.
+// Credentials that don't fit are left out; no copy of them stays behind but in the buffer, on its way out.
 int write_credentials(soap *ctx, const char *key, const char *user, const char *password)
 {
+    track_secret(ctx, user);
+    track_secret(ctx, password);
     if (user == nullptr || password == nullptr ||
         std::strlen(user) + std::strlen(password) >= CREDENTIALS_LIMIT)
         return SOAP_OK;
@@ -244,13 +247,31 @@ int write_credentials(soap *ctx, const char *key, const char *user, const char *
     const int result = line(ctx, key, value);
     OPENSSL_cleanse(pair, sizeof pair);
     OPENSSL_cleanse(value, sizeof value);
+    ctx->credentials_passed = true;
     return result;
 }
 
-// They are for the proxy alone: what goes through a tunnel is read by the host behind it.
-int write_proxy_credentials(soap *ctx)
+// They are for the service alone: the head of a CONNECT is read by the HTTP proxy.
+int write_service_credentials(soap *ctx)
 {
-    if (ctx->proxy_host != nullptr && tls_active(ctx))
+    if (ctx->status == STATUS_CONNECT && (ctx->legacy & LEGACY_TUNNEL_CREDENTIALS) == 0)
+        return SOAP_OK;
+    return write_credentials(ctx, "Authorization", ctx->auth_user, ctx->auth_password);
+}
+
+// True if an HTTP proxy reads the head: not if the connection goes past it, or through it to an https
+// endpoint.
+bool is_read_by_proxy(const soap *ctx, const char *endpoint)
+{
+    if (ctx->proxy_host == nullptr || ctx->status == STATUS_CONNECT)
+        return ctx->proxy_host != nullptr;
+    return soap_tag_match(endpoint, "https:*") != 0 &&
+           (!ctx->route.known || ctx->route.proxy_host[0] != '\0');
+}
+
+int write_proxy_credentials(soap *ctx, const char *endpoint)
+{
+    if (!is_read_by_proxy(ctx, endpoint))
         return SOAP_OK;
     return write_credentials(ctx, "Proxy-Authorization", ctx->proxy_user, ctx->proxy_password);
 }
@@ -354,9 +375,8 @@ int http_write_request(soap *ctx, const char *endpoint, const char *host, int po
     if (write_request_line(ctx, endpoint, host, port, path) != SOAP_OK ||
         write_host(ctx, host, port) != SOAP_OK || line(ctx, "User-Agent", PRODUCT) != SOAP_OK ||
         http_write_entity_headers(ctx, 0, count) != SOAP_OK ||
-        line(ctx, "Accept-Encoding", "deflate") != SOAP_OK ||
-        write_credentials(ctx, "Authorization", ctx->auth_user, ctx->auth_password) != SOAP_OK ||
-        write_proxy_credentials(ctx) != SOAP_OK || write_action(ctx, action) != SOAP_OK)
+        line(ctx, "Accept-Encoding", "deflate") != SOAP_OK || write_service_credentials(ctx) != SOAP_OK ||
+        write_proxy_credentials(ctx, endpoint) != SOAP_OK || write_action(ctx, action) != SOAP_OK)
         return ctx->error;
     return line(ctx, nullptr, nullptr);
 }

@@ -9,6 +9,7 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_tcp.h>
 
+#include "engine/context_state.h"
 #include "transport/tcp_socket.h"
 #include "transport/tls_connection.h"
 
@@ -63,7 +64,7 @@ int peek_master(soap *ctx)
 int tcp_disconnect(soap *ctx)
 {
     const int tls_result = tls_close(ctx);
-    if (tcp_is_udp(ctx) && soap_socket_open(ctx))
+    if ((tcp_is_udp(ctx) || context_shares_socket(ctx)) && soap_socket_open(ctx))
         return tls_result;
     if (tls_result == 0 && soap_socket_open(ctx) && ctx->on_shutdown_socket)
         ctx->on_shutdown_socket(ctx, ctx->socket, SHUT_RDWR);
@@ -102,6 +103,7 @@ int soap_socket_release(soap *ctx)
         closed = ctx->on_close ? ctx->on_close(ctx) : 0;
         ctx->keep_alive = 0;
         ctx->response_unfinished = false;
+        ctx->route.known = false;
     }
     end_compression(ctx);
     return ctx->error = closed != 0 ? closed : error;
@@ -113,6 +115,8 @@ int soap_force_close(soap *ctx)
     if (!soap_socket_open(ctx))
         return 0;
     ctx->socket_abandoned = true;
+    if (context_shares_socket(ctx))
+        return 0;
     if (ctx->master_socket == ctx->socket) // a UDP service has one socket in both fields
         ctx->master_socket = -1;
     return close(ctx->socket);

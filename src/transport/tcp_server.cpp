@@ -24,10 +24,11 @@ bool asks_keep_alive(const soap *ctx)
 
 void close_master(soap *ctx)
 {
-    const int master = ctx->master_socket;
-    if (master != -1 && master == ctx->socket)
+    const int master = ctx->master_shared ? -1 : ctx->master_socket;
+    if (ctx->master_socket != -1 && ctx->master_socket == ctx->socket)
         ctx->socket = -1;
     ctx->master_socket = -1;
+    ctx->master_shared = false;
     tcp_close_through_hook(ctx, master);
 }
 
@@ -53,6 +54,13 @@ const char *prepare_listener(const soap *ctx, int socket, const addrinfo *addres
     if (!udp && listen(socket, backlog) != 0)
         return "listen failed in soap_bind()";
     return nullptr;
+}
+
+// The connection is a client's who came here: a copy of the context may serve it.
+void store_accepted(soap *ctx, int socket)
+{
+    tcp_store_socket(ctx, socket);
+    ctx->socket_accepted = true;
 }
 
 int fail_accept(soap *ctx, const char *text = nullptr)
@@ -161,7 +169,7 @@ int soap_bind(soap *ctx, const char *host, int port, int backlog)
     }
     ctx->master_socket = master;
     if (tcp_is_udp(ctx))
-        tcp_store_socket(ctx, master);
+        store_accepted(ctx, master);
     return master;
 }
 
@@ -174,7 +182,7 @@ int soap_accept(soap *ctx)
     if (ctx->master_socket == -1)
         return tcp_fail(ctx, -1, "no master socket in soap_accept()");
     if (tcp_is_udp(ctx)) {
-        tcp_store_socket(ctx, ctx->master_socket);
+        store_accepted(ctx, ctx->master_socket);
         return ctx->socket;
     }
     tcp_set_blocking(ctx->master_socket, ctx->accept_timeout == 0);
@@ -188,6 +196,6 @@ int soap_accept(soap *ctx)
     }
     ctx->keep_alive = asks_keep_alive(ctx) ? 1 : 0;
     tcp_settle_blocking(ctx, client);
-    tcp_store_socket(ctx, client);
+    store_accepted(ctx, client);
     return client;
 }

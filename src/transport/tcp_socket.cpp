@@ -14,6 +14,7 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_tcp.h>
 
+#include "engine/context_state.h"
 #include "transport/tls_connection.h"
 
 namespace {
@@ -104,17 +105,19 @@ void tcp_store_socket(soap *ctx, int socket)
 {
     ctx->socket = socket;
     ctx->socket_abandoned = false;
+    ctx->socket_accepted = false;
     ctx->response_unfinished = false;
+    ctx->route.known = false;
 }
 
 void tcp_drop_socket(soap *ctx)
 {
-    const int open_socket = soap_socket_open(ctx) ? ctx->socket : -1;
+    const bool is_own = soap_socket_open(ctx) && !context_shares_socket(ctx);
+    const int open_socket = is_own ? ctx->socket : -1;
     if (open_socket == ctx->master_socket) // a UDP service has one socket in both fields
         ctx->master_socket = -1;
     tls_detach(ctx);
-    ctx->socket = -1;
-    ctx->socket_abandoned = false;
+    tcp_store_socket(ctx, -1);
     tcp_close_through_hook(ctx, open_socket);
 }
 

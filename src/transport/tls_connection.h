@@ -16,6 +16,12 @@
 // calls.
 bool tls_active(const soap *ctx);
 
+// True if a handshake on ctx->socket has come to its end, and TLS is still in force there.
+bool tls_established(const soap *ctx);
+
+// True if there is a tls_connection, and tls_context is the one that it was made from.
+bool tls_has_own_rules(const soap *ctx);
+
 // --- tls_handshake.cpp ---
 // Client side on ctx->socket: handshake and check of the peer. 0, or -1 with error 28 or 30 and, save for a
 // lack of memory, a fault; the socket stays open then.
@@ -28,8 +34,10 @@ int tls_close(soap *ctx);
 void tls_detach(soap *ctx);
 // Frees tls_connection without a word to the peer.
 void tls_discard(soap *ctx);
-// Offers the kept session if it came from this host and port, and forgets it. Notes host and port for the
-// session that this connection will leave.
+// Forgets the kept session.
+void tls_session_drop(soap *ctx);
+// Offers the kept session if it came from this host and port under the present rules, and forgets it. Notes
+// host and port for the session that this connection will leave.
 void tls_session_offer(soap *ctx, const char *host, int port);
 
 // --- tls_bio.cpp ---

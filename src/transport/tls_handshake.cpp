@@ -70,7 +70,7 @@ handshake run_handshake(soap *ctx, int (*step)(SSL *), int timeout, int *result)
 int renew_connection(soap *ctx)
 {
     tls_detach(ctx);
-    if (ctx->tls_connection && SSL_clear(ctx->tls_connection) == 1 &&
+    if (tls_has_own_rules(ctx) && SSL_clear(ctx->tls_connection) == 1 &&
         SSL_set_session(ctx->tls_connection, nullptr) == 1)
         return 0;
     SSL_free(ctx->tls_connection);

@@ -81,6 +81,16 @@ bool tls_active(const soap *ctx)
     return ctx->tls_connection && SSL_get_rbio(ctx->tls_connection);
 }
 
+bool tls_established(const soap *ctx)
+{
+    return tls_active(ctx) && SSL_is_init_finished(ctx->tls_connection);
+}
+
+bool tls_has_own_rules(const soap *ctx)
+{
+    return ctx->tls_connection && SSL_get_SSL_CTX(ctx->tls_connection) == ctx->tls_context;
+}
+
 int tls_write(soap *ctx, const char *data, std::size_t length, int *wait_for)
 {
     ERR_clear_error();

@@ -7,7 +7,9 @@
 #include <functional>
 #include <netinet/tcp.h>
 #include <string>
+#include <thread>
 #include <utility>
+#include <vector>
 
 #include "support/tls_peer.h"
 
@@ -123,10 +125,26 @@ inline void serve_well(line &client)
 // The first connection goes as `first` has it, all later ones well.
 class server {
 public:
-    explicit server(std::function<void(line &)> first, bool tls = false)
+    // One connection after the other, or `at_once`, each on a thread of its own.
+    explicit server(std::function<void(line &)> first, bool tls = false, bool at_once = false)
         : context_(tls ? tls_peers::server_for({"peer.test", ""}) : nullptr),
-          peer_([this, first = std::move(first)](int client) { serve(client, first); }, 1000000)
+          peer_(
+              [this, first = std::move(first), at_once](int client) {
+                  if (at_once)
+                      threads_.emplace_back([this, first, own = dup(client)] {
+                          serve(own, first);
+                          close(own);
+                      });
+                  else
+                      serve(client, first);
+              },
+              1000000)
     {}
+    ~server()
+    {
+        for (std::thread &one : threads_)
+            one.join();
+    }
     int port() const { return peer_.port(); }
     std::string endpoint() const
     {
@@ -151,6 +169,7 @@ private:
     inline static const std::function<void(line &)> WELL = serve_well;
     bool is_first_ = true;
     tls_peers::server_context context_;
+    std::vector<std::thread> threads_;
     loopback::peer peer_;
 };
 

@@ -34,11 +34,10 @@ class hostile_server : public tls_peers::tls_test {};
 // A client that keeps its connection and counts those it needed.
 class client {
 public:
-    explicit client(const server &to) : endpoint_(to.endpoint())
+    explicit client(const server &to) : endpoint(to.endpoint())
     {
         soap_log_set_received(&proxy, nullptr);
         soap_log_set_sent(&proxy, nullptr);
-        proxy.endpoint = endpoint_.c_str();
         proxy.input_mode = proxy.output_mode = MODE_KEEP_ALIVE;
         proxy.connect_timeout = proxy.send_timeout = proxy.recv_timeout = GUARD_S;
         proxy.user = this;
@@ -48,7 +47,7 @@ public:
             ++self.connections;
             return self.open_(ctx, url, host, port);
         };
-        if (endpoint_.starts_with("https")) {
+        if (endpoint.starts_with("https")) {
             const std::string &trusted = ca_file();
             EXPECT_EQ(soap_ssl_client_context(&proxy, tls_peers::VERIFIED, nullptr, nullptr, trusted.c_str(),
                                               nullptr, nullptr),
@@ -58,8 +57,9 @@ public:
     client(const client &) = delete;
     client &operator=(const client &) = delete;
 
-    // The code of one call. `padding`: bytes of text besides.
-    int call(std::size_t padding = 0)
+    // The code of one call, of this client or through a copy of its proxy. `padding`: bytes of text besides.
+    int call(std::size_t padding = 0) { return call_through(proxy, padding); }
+    int call_through(ProfileSoapBindingProxy &any, std::size_t padding = 0)
     {
         using namespace std::chrono;
         std::string name = "call-" + std::to_string(++calls_), text(padding, 'p');
@@ -69,9 +69,10 @@ public:
         request.identity = &identity;
         request.profileAuthority = &text;
         __protocolProfile__createResponse response{};
-        proxy.destroy();
+        any.destroy();
+        any.endpoint = endpoint.c_str();
         const auto began = steady_clock::now();
-        const int code = proxy.create(&request, response);
+        const int code = any.create(&request, response);
         milliseconds =
             static_cast<int>(duration_cast<std::chrono::milliseconds>(steady_clock::now() - began).count());
         if (code != 0)
@@ -81,6 +82,7 @@ public:
         return own ? 0 : OTHERS_ANSWER;
     }
 
+    std::string endpoint;
     ProfileSoapBindingProxy proxy;
     int connections = 0, milliseconds = 0;
 
@@ -90,7 +92,6 @@ private:
         static const std::string path = tls_peers::ca().ca_file();
         return path;
     }
-    std::string endpoint_;
     int (*open_)(soap *, const char *, const char *, int) = nullptr;
     int calls_ = 0;
 };
@@ -428,8 +429,7 @@ TEST_F(hostile_server, meets_a_call_before_its_answer)
         client caller(well);
         const std::string endpoint =
             (o.tls ? "https://peer.test:" : "http://peer.test:") + std::to_string(peer.port()) + "/";
-        const char *const good = caller.proxy.endpoint;
-        caller.proxy.endpoint = endpoint.c_str();
+        const std::string good = std::exchange(caller.endpoint, endpoint);
         caller.proxy.connect_timeout = 1;
         caller.proxy.send_timeout = BRIEF_US;
         const int code = caller.call(o.padding);
@@ -443,7 +443,7 @@ TEST_F(hostile_server, meets_a_call_before_its_answer)
         }
         EXPECT_GE(milliseconds, o.least_ms) << o.name;
         EXPECT_LT(milliseconds, o.least_ms + SLACK_MS) << o.name;
-        caller.proxy.endpoint = good;
+        caller.endpoint = good;
         EXPECT_EQ(caller.call(), 0) << o.name;
     }
 }
@@ -460,6 +460,29 @@ TEST_F(hostile_server, is_called_again_after_a_forced_close)
         EXPECT_EQ(caller.proxy.soap_force_close_socket(), 0) << "and is not closed again";
         EXPECT_EQ(caller.call(), 0);
         EXPECT_EQ(caller.connections, 2);
+    }
+}
+
+TEST_F(hostile_server, is_none_to_the_copies_of_a_connected_proxy)
+{
+    for (const bool tls : {false, true}) {
+        const std::string where = "tls " + std::to_string(tls);
+        const server one(serve_well, tls, true);
+        client caller(one);
+        ASSERT_EQ(caller.call(), 0) << where;
+        const int socket = caller.proxy.socket;
+        {
+            const ProfileSoapBindingProxy idle(caller.proxy);
+        }
+        std::vector<ProfileSoapBindingProxy> copies;
+        copies.emplace_back(static_cast<const soap &>(caller.proxy));
+        EXPECT_EQ(caller.call_through(copies.front()), 0) << where;
+        copies.emplace_back(caller.proxy); // grows: the first one moves and ends its connection
+        for (ProfileSoapBindingProxy &copy : copies)
+            EXPECT_EQ(caller.call_through(copy), 0) << where;
+        EXPECT_EQ(caller.call(), 0) << where;
+        EXPECT_EQ(caller.proxy.socket, socket) << where;
+        EXPECT_EQ(caller.connections, 4) << where;
     }
 }
 

@@ -11,6 +11,7 @@
 
 #include <gtest/gtest.h>
 #include <openssl/ssl.h>
+#include <zuv_client_pro/soap_attachment.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_tcp.h>
@@ -114,10 +115,16 @@ TEST_F(tls, a_tunnel_through_a_proxy_leads_to_the_host_behind_it)
     ctx->auth_user = "user";
     ctx->proxy_user = ctx->proxy_password = "p";
     ctx->mode = ctx->output_mode = MODE_STORE | MODE_KEEP_ALIVE | MODE_INDENT;
+    ctx->mode |= MODE_DIME;
     ctx->message_count = 42;
+    char content[] = "attached";
+    ASSERT_EQ(soap_dime_attach(ctx.get(), content, sizeof content, "text/plain", "cid:id1", 0, nullptr), 0);
+    soap_mime_start(ctx.get(), "boundary", nullptr);
+    ctx->mime.first = ctx->mime.last = ctx->dime.first;
     const auto settings = [&] {
-        return std::tuple(ctx->status, ctx->keep_alive, std::string(ctx->action), std::string(ctx->auth_user),
-                          ctx->http_content, ctx->mode, ctx->output_mode & ~MODE_TLS, ctx->message_count);
+        return std::tuple(ctx->dime.first, ctx->mime.first, ctx->mime.boundary, ctx->status, ctx->keep_alive,
+                          std::string(ctx->action), std::string(ctx->auth_user), ctx->http_content, ctx->mode,
+                          ctx->output_mode & ~MODE_TLS, ctx->message_count);
     };
     const auto before = settings();
     ASSERT_GE(tcp_connect(ctx.get(), "https://far.example/service", "far.example", 443), 0)
