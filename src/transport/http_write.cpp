@@ -196,13 +196,22 @@ bool is_http_scheme(const char *endpoint)
            std::strncmp(endpoint, "httpg:", 6) == 0;
 }
 
+// A host as URLs have it: an IPv6 address in brackets.
+void put_host(bounded_text &out, const char *host)
+{
+    const bool needs_brackets = *host != '[' && std::strchr(host, ':') != nullptr;
+    out.put(needs_brackets ? "[" : "");
+    out.put(host);
+    out.put(needs_brackets ? "]" : "");
+}
+
 int write_request_line(soap *ctx, const char *endpoint, const char *host, int port, const char *path)
 {
     bounded_text text;
     text.put(method_text(ctx->status));
     text.put(" ");
     if (ctx->status == STATUS_CONNECT) {
-        text.put(host);
+        put_host(text, host);
         text.put(":");
         text.put_number(port);
     } else if (ctx->proxy_host != nullptr) {
@@ -219,14 +228,12 @@ int write_request_line(soap *ctx, const char *endpoint, const char *host, int po
 int write_host(soap *ctx, const char *host, int port)
 {
     const int default_port = tls_active(ctx) ? 443 : 80;
-    if (port == default_port)
-        return line(ctx, "Host", host);
-    const bool needs_brackets = *host != '[' && std::strchr(host, ':') != nullptr;
     bounded_text value;
-    value.put(needs_brackets ? "[" : "");
-    value.put(host);
-    value.put(needs_brackets ? "]:" : ":");
-    value.put_number(port);
+    put_host(value, host);
+    if (port != default_port) {
+        value.put(":");
+        value.put_number(port);
+    }
     return line(ctx, "Host", value.text);
 }
 

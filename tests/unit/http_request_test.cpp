@@ -140,6 +140,13 @@ const request_case REQUESTS[] = {
      "https://host/path", nullptr,
      "CONNECT host:443 HTTP/1.1\r\nHost: host:443\r\n" + AGENT + "Connection: keep-alive\r\n" + ACCEPT +
          "\r\n"},
+    {"CONNECT to an address",
+     [](request_wire &wire) {
+         wire.status = STATUS_CONNECT;
+         wire.proxy_host = "proxy";
+     },
+     "https://[::1]/path", nullptr,
+     "CONNECT [::1]:443 HTTP/1.1\r\nHost: [::1]:443\r\n" + AGENT + CLOSE + ACCEPT + "\r\n"},
     {"a proxy gets the whole URL", [](request_wire &wire) { wire.proxy_host = "proxy"; },
      "http://[::1]:81/path", nullptr,
      "POST http://[::1]:81/path HTTP/1.1\r\nHost: [::1]:81\r\n" + AGENT + XML + LENGTH + CLOSE + ACCEPT +
@@ -180,6 +187,8 @@ TEST(request_head, names_the_host_by_the_connection_that_carries_it)
         {"https://host/", true, "host"},
         {"https://host:80/", true, "host:80"},
         {"http://[fe80::1]:8080/", false, "[fe80::1]:8080"},
+        {"http://[fe80::1]/", false, "[fe80::1]"},
+        {"https://[fe80::1]/", true, "[fe80::1]"},
     };
     for (const auto &c : cases) {
         request_wire wire;

@@ -254,8 +254,9 @@ TEST(response_head, decides_by_the_status)
         {"503 Busy\r\nTransfer-Encoding: chunked\r\n\r\n", "3\r\nbus\r\n1\r\ny\r\n0\r\n\r\n", 503,
          "HTTP/1.1 503 Busy", "busy"},
         {"503 Busy\r\nTransfer-Encoding: chunked\r\n\r\n", "", 503, "HTTP Error", "HTTP/1.1 503 Busy"},
-        {"199 Odd\r\nContent-Length: 1\r\n\r\n", "x", 199, "HTTP/1.1 199 Odd", "x"},
-        {"65735 Huge\r\n\r\n", "", 199, "HTTP Error", "HTTP/1.1 65735 Huge"}, // the number is kept to 16 bits
+        {"101 Other\r\nUpgrade: x\r\n\r\n", "never read", 101, "HTTP Error", "HTTP/1.1 101 Other"},
+        {"101 Other\r\nContent-Length: 1\r\n\r\n", "x", 101, "HTTP Error", "HTTP/1.1 101 Other"},
+        {"65936 Huge\r\n\r\n", "", 400, "HTTP Error", "HTTP/1.1 65936 Huge"}, // the number is kept to 16 bits
         {"7 Fake\r\n\r\n", "", SOAP_HTTP_ERROR, "HTTP Error", "HTTP/1.1 7 Fake"}, // not the engine's 7
         {"20 Fake\r\nContent-Length: 1\r\n\r\n", "x", SOAP_HTTP_ERROR, "HTTP Error", "HTTP/1.1 20 Fake"},
         {"1000 Fake\r\n\r\n", "", SOAP_HTTP_ERROR, "HTTP Error", "HTTP/1.1 1000 Fake"},
@@ -321,17 +322,27 @@ TEST(response_head, keeps_the_connection_by_version_and_consent)
 
 TEST(response_head, drops_interim_heads_up_to_a_limit)
 {
-    const std::string interim = "HTTP/1.1 100 Continue\r\nContent-Length: 7\r\n\r\n";
-    const std::string last = std::string(OK_HEAD) + "\r\n<a/>";
-    std::string hundred;
-    for (int i = 0; i < 100; ++i)
-        hundred += interim;
-    read_wire one(interim + last);
-    EXPECT_EQ(one.result, 0);
-    EXPECT_EQ(one.status, 200);
-    EXPECT_EQ(one.content_length, 0U);
-    EXPECT_EQ(read_wire(hundred + last).result, 0);
-    EXPECT_EQ(read_wire(hundred + interim + last).result, SOAP_HEADER_LINE);
+    const std::string last = std::string(OK_HEAD) + "Content-Length: 4\r\n\r\n<a/>";
+    for (const char *status : {"100 Continue", "102 Processing", "103 Early Hints", "199 Odd"}) {
+        const std::string interim =
+            std::string("HTTP/1.1 ") + status +
+            "\r\nContent-Length: 7\r\nContent-Type: multipart/related; boundary=b\r\nContent-Encoding: "
+            "gzip\r\n"
+            "Transfer-Encoding: chunked\r\nConnection: close\r\nLocation: http://elsewhere/\r\n\r\n";
+        std::string hundred;
+        for (int i = 0; i < 100; ++i)
+            hundred += interim;
+        for (const std::string &heads : {interim, hundred}) {
+            read_wire wire(heads + last, MODE_KEEP_ALIVE);
+            EXPECT_EQ(wire.result, 0) << status;
+            EXPECT_EQ(wire.status, 200);
+            EXPECT_EQ(wire.content_length, 4U);
+            EXPECT_EQ(wire.keep_alive, 1);
+            EXPECT_STREQ(wire.endpoint, "");
+            EXPECT_EQ(wire.read_all(), "<a/>") << status;
+        }
+        EXPECT_EQ(read_wire(hundred + interim + last).result, SOAP_HEADER_LINE);
+    }
 }
 
 TEST(response_head, has_limits)
