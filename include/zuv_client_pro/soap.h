@@ -9,7 +9,7 @@
 // Arguments are needed only during a call unless a function says otherwise; text fields marked
 // "borrowed" keep the pointer, so the caller's text must outlive its use. Operations return 0 or an
 // error code of soap_error.h, which also stands in `error`. Time limits: 0 none, positive seconds,
-// negative microseconds.
+// negative microseconds; they run on the system's monotonic clock, whatever signals arrive.
 #pragma once
 
 #include <cstddef>
@@ -242,8 +242,11 @@ struct ZUV_CLASS soap {
     const char *actor;          // borrowed; actor or role to send, and the one this receiver plays
     const char *language;       // borrowed; xml:lang of fault texts
     int recv_timeout, send_timeout, connect_timeout, accept_timeout; // 0 none, > 0 s, < 0 us
-    int call_timeout;          // the same for a whole exchange, from connecting to the response's last byte
-    std::uint32_t legacy;      // LEGACY_...
+    int call_timeout;           // the same for a whole exchange, from connecting to the response's last byte
+    std::int64_t call_deadline; // when call_timeout ends the exchange under way; microseconds of the
+                                // monotonic clock; 0 none
+    bool call_expired;          // call_timeout has ended the exchange, and so is what error texts name
+    std::uint32_t legacy;       // LEGACY_...
     std::uint64_t max_message; // most bytes of one message's XML, both ways, as plain text: after framing and
                                // decompression, attachments through callbacks not counted; 0 no limit
     std::uint64_t max_memory;  // most bytes held for one message in objects, texts, blocks and attachments; 0
@@ -429,6 +432,7 @@ struct ZUV_CLASS soap {
     std::uint8_t ipv4_multicast_ttl;
     alignas(8) char peer[128]; // socket address of the last UDP or accepted peer
     std::size_t peer_length;
+    bool peer_fixed; // UDP: datagrams from any other address than `peer` are dropped
     int (*tls_setup)(soap *ctx);
     int (*tls_verify)(int result, x509_store_ctx_st *store);
     bio_st *tls_bio;

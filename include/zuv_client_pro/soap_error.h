@@ -117,8 +117,8 @@ ZUV_API void soap_fault_location_print(soap *ctx, std::FILE *file);
 // if there is one. The text, in message_text, cut to its size; neither argument may lie there.
 ZUV_API const char *soap_constraint_text(soap *ctx, const char *text, const char *argument);
 
-// Text of an end of input: that of ctx->errno_value, or of a timeout with the time limits that are set. In
-// message_text.
+// Text of an end of input: that of ctx->errno_value, or of a timeout with the time limits that are set, or with
+// call_timeout alone if that has passed. In message_text.
 ZUV_API const char *soap_eof_text(soap *ctx);
 
 // Takes a fault out of a response that did not read as expected, ends the message and releases the

@@ -18,7 +18,7 @@ constexpr int STATUS_STOP = 1000; // no head to write, end of this exchange
 
 // --- connecting ---
 
-// Connects and writes the head of a POST.
+// Connects and writes the head of a POST. The time of call_timeout begins here, once for all endpoints.
 //   endpoints  one URL, or several with blanks between them: the next is tried when a connection fails with
 //   error 28 action     SOAPAction, copied; null for none
 // Returns ctx->error: 0, 20, 28 or 30 with a fault, an HTTP status from a proxy, or an error of sending.
@@ -63,8 +63,9 @@ ZUV_API const char *http_reason(int status);
 // Default of on_read_head. Leaves the context's fields as the head says, and the start line in message_text.
 // 0: a body follows that is to be parsed (200, other 2xx, 400, 500 with a body, or a request). 1000: the
 // request was dealt with. -1: end of input. 414: start line over 1023 bytes. 22: a line over 8191 bytes, more
-// than 1024 lines, 1 MB, or 100 heads of status 100. 15, 16, 405: a request that nobody serves. Any other
-// status, with a fault: text "HTTP Error" and the start line as detail, or the start line and the error body.
+// than 1024 lines, 1 MB, or 100 interim heads (1xx but 101, whose headers are not looked at). 15, 16, 405: a
+// request that nobody serves. Any other status, with a fault: text "HTTP Error" and the start line as detail,
+// or the start line and the error body.
 ZUV_API int http_read_head(soap *ctx);
 
 // Default of on_parse_header: takes one header over into the context. Unknown ones are dropped. 0, 20, or an

@@ -82,6 +82,7 @@ static void forget_resources(soap *ctx)
         ctx->log_paths[channel] = nullptr;
         ctx->log_streams[channel] = nullptr;
     }
+    ctx->call_deadline = 0;
     ctx->tls_bio = nullptr;
     ctx->tls_connection = nullptr;
     ctx->tls_session = nullptr;

@@ -16,6 +16,7 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "transport/tcp_socket.h"
+#include "transport/tcp_wait.h"
 
 namespace {
 
@@ -98,7 +99,7 @@ int provide_connection(soap *ctx, const previous_peer &previous, const char *end
             ctx->output_mode &= ~MODE_UDP;
             ctx->keep_alive = 0;
         }
-        if (soap_socket_release(ctx) != SOAP_OK)
+        if (tcp_release(ctx) != SOAP_OK)
             return ctx->error;
     }
     if (ctx->keep_alive == 0 || !soap_socket_open(ctx))
@@ -144,7 +145,8 @@ void soap_parse_endpoint(soap *ctx, const char *url)
         split_url(ctx, url);
 }
 
-int soap_connect_one(soap *ctx, int status, const char *endpoint, const char *action)
+// soap_connect_one within the time of a call that has begun.
+static int connect_one(soap *ctx, int status, const char *endpoint, const char *action)
 {
     previous_peer previous;
     ctx->error = SOAP_OK;
@@ -174,10 +176,17 @@ int soap_connect_one(soap *ctx, int status, const char *endpoint, const char *ac
     return status == STATUS_GET ? soap_send_finish(ctx) : SOAP_OK;
 }
 
+int soap_connect_one(soap *ctx, int status, const char *endpoint, const char *action)
+{
+    tcp_call_begin(ctx);
+    return connect_one(ctx, status, endpoint, action);
+}
+
 int soap_server_connect(soap *ctx, const char *endpoints, const char *action)
 {
+    tcp_call_begin(ctx);
     if (endpoints == nullptr || std::strchr(endpoints, ' ') == nullptr)
-        return soap_connect_one(ctx, STATUS_POST, endpoints, action), ctx->error;
+        return connect_one(ctx, STATUS_POST, endpoints, action), ctx->error;
     const std::size_t bytes = std::strlen(endpoints) + 1;
     char *const list = static_cast<char *>(SOAP_MALLOC(ctx, bytes));
     if (list == nullptr)
@@ -188,7 +197,7 @@ int soap_server_connect(soap *ctx, const char *endpoints, const char *action)
         char *end = item + std::strcspn(item, " ");
         char *next = end + std::strspn(end, " ");
         *end = '\0';
-        if (soap_connect_one(ctx, STATUS_POST, item, action) != SOAP_TCP_ERROR || *next == '\0')
+        if (connect_one(ctx, STATUS_POST, item, action) != SOAP_TCP_ERROR || *next == '\0')
             break;
         ctx->error = SOAP_OK;
         ctx->fault = nullptr; // what the dead endpoint left must not explain a later failure

@@ -89,7 +89,7 @@ int tcp_peek(soap *ctx)
     return tls_active(ctx) ? tls_peek(ctx) : -1;
 }
 
-int soap_socket_release(soap *ctx)
+int tcp_release(soap *ctx)
 {
     const int error = ctx->error;
     if (error != 0)
@@ -105,6 +105,14 @@ int soap_socket_release(soap *ctx)
     }
     end_compression(ctx);
     return ctx->error = closed != 0 ? closed : error;
+}
+
+int soap_socket_release(soap *ctx)
+{
+    const int result = tcp_release(ctx);
+    if (!reads_on(ctx))
+        ctx->call_deadline = 0;
+    return result;
 }
 
 int soap_force_close(soap *ctx)

@@ -11,11 +11,10 @@
 #include <zuv_client_pro/soap_tcp.h>
 
 #include "transport/tcp_socket.h"
+#include "transport/tcp_wait.h"
 #include "transport/tls_connection.h"
 
 namespace {
-
-constexpr int ACCEPT_WAIT_S = 60; // one round of waiting for a client without an accept_timeout, seconds
 
 bool asks_keep_alive(const soap *ctx)
 {
@@ -61,20 +60,14 @@ int fail_accept(soap *ctx, const char *text = nullptr)
 }
 
 // Waits for a client if any time limit is set. 0, or -1 with a fault.
-int await_client(soap *ctx)
+int await_client(soap *ctx, tcp_deadline deadline)
 {
     if (ctx->accept_timeout == 0 && ctx->recv_timeout == 0 && ctx->send_timeout == 0)
         return 0;
-    const int limit = ctx->accept_timeout != 0 ? ctx->accept_timeout : ACCEPT_WAIT_S;
-    for (;;) {
-        const int ready = tcp_wait(ctx, ctx->master_socket, WAIT_ALL, limit);
-        if (ready > 0)
-            return 0;
-        if (ready == 0 && ctx->accept_timeout != 0)
-            return fail_accept(ctx, "Timeout");
-        if (ready < 0 && ctx->errno_value != EINTR)
-            return fail_accept(ctx);
-    }
+    const int ready = tcp_wait_until(ctx, ctx->master_socket, WAIT_ALL, deadline);
+    if (ready == 0)
+        return fail_accept(ctx, "Timeout");
+    return ready < 0 ? fail_accept(ctx) : 0;
 }
 
 // host, port and peer_address take the client's.
@@ -118,8 +111,9 @@ const char *set_client_options(const soap *ctx, int socket)
 // The next client's socket, or -1 with a fault.
 int accept_client(soap *ctx)
 {
+    const tcp_deadline deadline = tcp_deadline_of(ctx, ctx->accept_timeout);
     for (;;) {
-        if (await_client(ctx) != 0)
+        if (await_client(ctx, deadline) != 0)
             return -1;
         int length = sizeof ctx->peer;
         errno = ctx->on_accept ? 0 : ENOSYS;
@@ -133,6 +127,8 @@ int accept_client(soap *ctx)
         tcp_save_errno(ctx);
         if (ctx->errno_value != EINTR && ctx->errno_value != EAGAIN)
             return fail_accept(ctx);
+        if (tcp_is_over(ctx, deadline)) // clients that come and go
+            return fail_accept(ctx, "Timeout");
     }
 }
 
@@ -160,6 +156,7 @@ int soap_bind(soap *ctx, const char *host, int port, int backlog)
         return tcp_fail(ctx, master, failure);
     }
     ctx->master_socket = master;
+    ctx->peer_fixed = false;
     if (tcp_is_udp(ctx))
         tcp_store_socket(ctx, master);
     return master;
@@ -171,6 +168,8 @@ int soap_accept(soap *ctx)
     ctx->errno_value = 0;
     tls_detach(ctx); // a former client's; its socket may serve a copy of this context by now
     ctx->socket = -1;
+    ctx->call_deadline = 0; // of a call that this context made
+    ctx->call_expired = false;
     if (ctx->master_socket == -1)
         return tcp_fail(ctx, -1, "no master socket in soap_accept()");
     if (tcp_is_udp(ctx)) {

@@ -1,7 +1,7 @@
-// tcp_socket.cpp - one socket: wait for it, set its options and mode, close it, put its errors into words.
+// tcp_socket.cpp - one socket: set its options and mode, close it, put its errors into words.
 //
-// Elsewhere: how it comes to be (tcp_connect.cpp, tcp_server.cpp), its bytes (tcp_transfer.cpp), the end of a
-// connection and of a transaction (tcp_close.cpp).
+// Elsewhere: waiting for it (tcp_wait.cpp), how it comes to be (tcp_connect.cpp, tcp_server.cpp), its bytes
+// (tcp_transfer.cpp), the end of a connection and of a transaction (tcp_close.cpp).
 #include "transport/tcp_socket.h"
 
 #include <cerrno>
@@ -19,60 +19,8 @@
 namespace {
 
 constexpr int PORT_MAX = 65535;
-constexpr long MICROSECONDS = 1000000; // in a second
-
-timeval time_limit(int timeout)
-{
-    const long limit = timeout;
-    timeval value{};
-    value.tv_sec = limit >= 0 ? limit : -limit / MICROSECONDS;
-    value.tv_usec = limit >= 0 ? 0 : -limit % MICROSECONDS;
-    return value;
-}
-
-// One set of a select call: null for a way that nobody asked about.
-class wait_set {
-public:
-    wait_set(bool wanted, int socket) : wanted_(wanted), socket_(socket)
-    {
-        FD_ZERO(&set_);
-        if (wanted_)
-            FD_SET(socket_, &set_);
-    }
-    fd_set *get() { return wanted_ ? &set_ : nullptr; }
-    bool ready() const { return wanted_ && FD_ISSET(socket_, &set_); }
-
-private:
-    bool wanted_;
-    int socket_;
-    fd_set set_;
-};
 
 } // namespace
-
-int tcp_wait(soap *ctx, int socket, int flags, int timeout)
-{
-    ctx->errno_value = 0;
-    if (socket >= FD_SETSIZE) {
-        ctx->error = SOAP_FD_EXCEEDED;
-        return -1;
-    }
-    if (socket < 0) {
-        ctx->errno_value = EBADF;
-        return -1;
-    }
-    wait_set readable((flags & WAIT_RECV) != 0, socket);
-    wait_set writable((flags & WAIT_SEND) != 0, socket);
-    wait_set exceptional((flags & WAIT_ERROR) != 0, socket);
-    timeval limit = time_limit(timeout);
-    const int count = select(socket + 1, readable.get(), writable.get(), exceptional.get(), &limit);
-    if (count < 0)
-        tcp_save_errno(ctx);
-    if (count <= 0)
-        return count;
-    return (readable.ready() ? WAIT_RECV : 0) | (writable.ready() ? WAIT_SEND : 0) |
-           (exceptional.ready() ? WAIT_ERROR : 0);
-}
 
 tcp_address_list tcp_resolve(soap *ctx, const char *host, int port, int flags, const char *failure)
 {
@@ -82,6 +30,7 @@ tcp_address_list tcp_resolve(soap *ctx, const char *host, int port, int flags, c
     char service[16];
     std::snprintf(service, sizeof service, "%d", port);
     ctx->errno_value = 0;
+    ctx->call_expired = false;
     ctx->error_mode = 2;
     addrinfo *list = nullptr;
     // The resolver itself would take a larger number modulo 65536.
@@ -134,7 +83,7 @@ void tcp_set_blocking(int socket, bool blocking)
 
 void tcp_settle_blocking(const soap *ctx, int socket)
 {
-    tcp_set_blocking(socket, ctx->recv_timeout == 0 && ctx->send_timeout == 0);
+    tcp_set_blocking(socket, ctx->recv_timeout == 0 && ctx->send_timeout == 0 && ctx->call_timeout == 0);
 }
 
 void tcp_save_errno(soap *ctx)

@@ -7,6 +7,7 @@
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 
 #include <openssl/types.h>
 
@@ -36,14 +37,19 @@ void tls_session_offer(soap *ctx, const char *host, int port);
 // A BIO on ctx->socket, for its whole life, by send and recv with socket_flags and without SIGPIPE. Null if
 // memory runs out. It follows ctx->socket: with no open socket each transfer fails with EBADF.
 BIO *tls_bio_new(soap *ctx);
-// Never block from now on (or again as the socket's mode says).
+// Never block from now on (or again as the socket's mode says). Each transfer says anew what it wants.
 void tls_bio_set_nonblocking(BIO *bio, bool nonblocking);
 
 // --- tls_transfer.cpp ---
-// One SSL_write or SSL_read. Above 0: bytes. Otherwise *wait_for is the WAIT_ flag to wait for ahead of a
-// retry, or 0 if no retry helps; errno tells the system's reason, 0 for none.
-int tls_write(soap *ctx, const char *data, std::size_t length, int *wait_for);
-int tls_read(soap *ctx, char *buffer, std::size_t length, int *wait_for);
+// One SSL_write or SSL_read, which doesn't block if it is limited in time. Above 0: bytes. Otherwise
+// *wait_for is the WAIT_ flag to wait for before a retry, or 0 if no retry helps; errno tells the system's
+// reason, 0 for none.
+int tls_write(soap *ctx, const char *data, std::size_t length, bool limited, int *wait_for);
+int tls_read(soap *ctx, char *buffer, std::size_t length, bool limited, int *wait_for);
+// Bytes that the TLS connection has received and sent on the socket so far, also of records that aren't
+// complete; 0 without TLS.
+std::uint64_t tls_bytes_in(const soap *ctx);
+std::uint64_t tls_bytes_out(const soap *ctx);
 // True if received bytes wait inside OpenSSL, where select doesn't see them.
 bool tls_has_pending(const soap *ctx);
 // Looks at what has arrived, without blocking: 0 if no byte of data and no end is there, else -1.

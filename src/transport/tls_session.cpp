@@ -14,11 +14,12 @@
 #include <zuv_client_pro/soap_tcp.h>
 
 #include "transport/tcp_socket.h"
+#include "transport/tcp_wait.h"
 #include "transport/tls_connection.h"
 
 namespace {
 
-constexpr int CLOSE_WAIT_S = 5; // wait for the peer's end after ours, seconds
+constexpr int CLOSE_WAIT_S = 5; // wait for the peer's end after ours under LEGACY_CLOSE_WAIT, seconds
 
 void keep_session(soap *ctx)
 {
@@ -53,7 +54,8 @@ void half_close(soap *ctx)
 {
     if (!ctx->on_shutdown_socket || ctx->on_shutdown_socket(ctx, ctx->socket, SHUT_WR) != 0)
         return;
-    if (tcp_wait(ctx, ctx->socket, WAIT_RECV | WAIT_ERROR, CLOSE_WAIT_S) < 0 && ctx->errno_value != EINTR) {
+    const tcp_deadline deadline = tcp_deadline_of(ctx, CLOSE_WAIT_S);
+    if (tcp_wait_until(ctx, ctx->socket, WAIT_RECV | WAIT_ERROR, deadline) < 0) {
         ctx->errno_value = 0;
         tcp_drop_socket(ctx);
     }
@@ -84,7 +86,7 @@ int tls_close(soap *ctx)
     int finished = SSL_shutdown(ssl);
     if (finished == 0)
         finished = look_for_peer_alert(ssl);
-    if (finished == 0)
+    if (finished == 0 && (ctx->legacy & LEGACY_CLOSE_WAIT) != 0)
         half_close(ctx);
     const bool failed = finished != 1 && ERR_peek_error() != 0;
     ERR_clear_error();

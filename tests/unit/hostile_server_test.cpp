@@ -448,6 +448,63 @@ TEST_F(hostile_server, meets_a_call_before_its_answer)
     }
 }
 
+// A call whose peer's bytes come one by one, each taking seconds by the clock.
+struct drip_case {
+    const char *rule;
+    const char *scheme; // of the endpoint
+    bool kept;          // drips only on a kept connection
+    bool proxy;         // between
+    int call_limit;     // seconds; no limit of a single step is met by drops
+    int code;
+    const char *text; // of the fault; null: none
+};
+
+constexpr const char *CALL_OVER =
+    "End of file or no input: Operation interrupted or timed out (5 s call limit)";
+constexpr const char *CONNECT_OVER = "Operation interrupted or timed out (5 s call limit)";
+
+const drip_case DRIPS[] = {
+    {"answer, no limit", "http", true, false, 0, 0, nullptr},
+    {"answer", "http", true, false, 5, SOAP_EOF, CALL_OVER},
+    {"answer, TLS, no limit", "https", true, false, 0, 0, nullptr},
+    {"answer, TLS", "https", true, false, 5, SOAP_EOF, CALL_OVER},
+    {"handshake", "https", false, false, 0, SOAP_TCP_ERROR, "Timeout"},
+    {"handshake within a call", "https", false, false, 5, SOAP_TCP_ERROR, CONNECT_OVER},
+    {"CONNECT", "https", false, true, 0, SOAP_TCP_ERROR, "Timeout"},
+    {"CONNECT within a call", "https", false, true, 5, SOAP_TCP_ERROR, CONNECT_OVER},
+};
+
+TEST_F(hostile_server, is_left_in_time_though_it_drips)
+{
+    for (const drip_case &c : DRIPS) {
+        const loopback::peer proxy([](int socket) {
+            loopback::read_head(socket);
+            loopback::write_text(socket, "HTTP/1.1 200 OK\r\nX: " + std::string(500, 'x') + "\r\n\r\n");
+            loopback::read_head(socket);
+        });
+        const server one(serve_well, c.scheme == std::string("https"));
+        client caller(one);
+        caller.proxy.call_timeout = c.call_limit;
+        if (c.proxy) {
+            caller.proxy.proxy_host = "127.0.0.1";
+            caller.proxy.proxy_port = proxy.port();
+        }
+        if (c.kept) {
+            EXPECT_EQ(caller.call(), 0) << c.rule;
+        }
+        EXPECT_EQ(caller.proxy.call_deadline, 0) << "the time between calls is nobody's";
+        socket_calls::drips = true;
+        socket_calls::call_takes_us = 1000000;
+        EXPECT_EQ(caller.call(), c.code) << c.rule;
+        socket_calls::reset();
+        soap_fault_text_fill(&caller.proxy);
+        EXPECT_STREQ(c.text ? caller.proxy.soap_fault_string() : nullptr, c.text) << c.rule;
+        std::printf("%-25s code %2d, %3d s\n", c.rule, caller.proxy.error, caller.milliseconds / 1000);
+        caller.proxy.proxy_host = nullptr;
+        EXPECT_EQ(caller.call(), 0) << c.rule;
+    }
+}
+
 TEST_F(hostile_server, is_called_again_after_a_forced_close)
 {
     for (const bool tls : {false, true}) {

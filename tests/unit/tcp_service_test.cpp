@@ -46,6 +46,42 @@ TEST_F(tcp_service, datagrams_go_to_the_address_and_come_from_the_peer)
     EXPECT_EQ(ctx->socket, socket) << "a datagram socket outlives the exchange";
 }
 
+TEST_F(tcp_service, a_stray_datagram_is_no_answer_unless_many_were_asked)
+{
+    static const struct {
+        const char *rule, *asked;
+        int flags;
+        const char *received[2];
+        bool keeps_peer;
+    } cases[] = {{"one host", "127.0.0.1", 0, {"answer", ""}, true},
+                 {"a group", "239.255.0.1", 0, {"stray", "answer"}, false},
+                 {"all hosts", "127.255.255.255", SO_BROADCAST, {"stray", "answer"}, false}};
+    for (const auto &c : cases) {
+        const bound_socket service(SOCK_DGRAM), another_port(SOCK_DGRAM);
+        const bound_socket another_host(SOCK_DGRAM, 0, "127.0.0.2", service.port());
+        context ctx(MODE_UDP);
+        ctx->connect_flags = c.flags;
+        ctx->recv_timeout = -20000;
+        ASSERT_GE(tcp_connect(ctx.get(), "soap.udp://x/", c.asked, service.port()), 0);
+        sockaddr_in own{};
+        own.sin_family = AF_INET;
+        own.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+        ASSERT_EQ(bind(ctx->socket, reinterpret_cast<sockaddr *>(&own), sizeof own), 0);
+        own.sin_port = htons(static_cast<std::uint16_t>(loopback::port_of(ctx->socket)));
+        const std::string asked(ctx->peer, ctx->peer_length);
+        const auto *const to = reinterpret_cast<sockaddr *>(&own);
+        for (int i = 0; i < (c.keeps_peer ? 110 : 1); ++i) // also more than a receive's attempts
+            EXPECT_EQ(
+                sendto((i % 2 == 0 ? another_port : another_host).socket(), "stray", 5, 0, to, sizeof own),
+                5);
+        EXPECT_EQ(sendto(service.socket(), "answer", 6, 0, to, sizeof own), 6);
+        for (const char *received : c.received)
+            EXPECT_EQ(receive(ctx), received) << c.rule;
+        EXPECT_EQ(ctx->errno_value, 0) << c.rule;
+        EXPECT_EQ(std::string(ctx->peer, ctx->peer_length) == asked, c.keeps_peer) << c.rule;
+    }
+}
+
 TEST_F(tcp_service, a_refused_datagram_is_sent_once_or_twice_more)
 {
     static const struct {
