@@ -160,6 +160,9 @@ void set_protocol_options(const soap *ctx, SSL_CTX *context)
         SSL_CTX_set_options(context, SSL_OP_NO_SSLv3);
     if (has_flag(ctx, TLS_NO_TLSV1))
         SSL_CTX_set_options(context, SSL_OP_NO_TLSv1);
+    // Whatever OpenSSL's security level and configuration would allow. A stricter one of theirs stays.
+    if (SSL_CTX_get_min_proto_version(context) < TLS1_2_VERSION)
+        SSL_CTX_set_min_proto_version(context, TLS1_2_VERSION);
 }
 
 void set_verification(const soap *ctx, SSL_CTX *context)

@@ -3,7 +3,6 @@
 // Elsewhere: what the SSL_CTX allows (tls_context.cpp), who the peer is (tls_verify.cpp).
 //
 // Always: a handshake as a whole has a time limit, and the socket's mode doesn't matter to it.
-#include <arpa/inet.h>
 #include <cerrno>
 
 #include <openssl/err.h>
@@ -39,7 +38,7 @@ int wait_flag(const SSL *ssl, int result)
 }
 
 // Runs SSL_connect or SSL_accept to its end. *result is what it returned last.
-handshake run_handshake(soap *ctx, int (*step)(SSL *), int timeout, int *result)
+handshake take_steps(soap *ctx, int (*step)(SSL *), int timeout, int *result)
 {
     const tcp_deadline deadline = tcp_deadline_of(ctx, timeout != 0 ? timeout : HANDSHAKE_S);
     tls_bio_set_nonblocking(SSL_get_rbio(ctx->tls_connection), true);
@@ -59,6 +58,15 @@ handshake run_handshake(soap *ctx, int (*step)(SSL *), int timeout, int *result)
         if (ready == 0 || tcp_is_over(ctx, deadline))
             return handshake::out_of_time;
     }
+}
+
+// The same; `verdict` takes what becomes of the peer's certificates.
+handshake run_handshake(soap *ctx, int (*step)(SSL *), int timeout, int *result, tls_verdict *verdict)
+{
+    tls_watch_verdict(ctx, verdict);
+    const handshake outcome = take_steps(ctx, step, timeout, result);
+    tls_watch_verdict(ctx, nullptr);
+    return outcome;
 }
 
 // An SSL without contents of its own, new or from an earlier connection. 0, or -1 if there is none to be had.
@@ -99,16 +107,16 @@ int ensure_context(soap *ctx)
 // Servers of many names choose their certificate by it. Addresses are no names.
 int name_server(SSL *ssl, const char *host)
 {
-    unsigned char address[sizeof(in6_addr)];
-    const bool named =
-        *host != '\0' && inet_pton(AF_INET, host, address) != 1 && inet_pton(AF_INET6, host, address) != 1;
+    unsigned char address[16];
+    const bool named = *host != '\0' && tls_address_of(host, address) == 0;
     return static_cast<int>(SSL_set_tlsext_host_name(ssl, const_cast<char *>(named ? host : nullptr)));
 }
 
-int fail_connect(soap *ctx, handshake outcome, int result)
+int fail_connect(soap *ctx, handshake outcome, int result, const tls_verdict &verdict)
 {
     if (outcome == handshake::refused)
-        soap_fault_sender(ctx, tls_error_text(ctx, result), "SSL_connect error in tcp_connect()",
+        soap_fault_sender(ctx, tls_error_text(ctx, result),
+                          tls_with_reason(ctx, "SSL_connect error in tcp_connect()", verdict),
                           SOAP_TLS_ERROR);
     else
         soap_fault_sender(
@@ -160,9 +168,10 @@ int tls_connect(soap *ctx, const char *host, int port)
         return lack_of_memory(ctx);
     SSL_set_connect_state(ctx->tls_connection);
     int result;
-    const handshake outcome = run_handshake(ctx, SSL_connect, ctx->connect_timeout, &result);
+    tls_verdict verdict;
+    const handshake outcome = run_handshake(ctx, SSL_connect, ctx->connect_timeout, &result, &verdict);
     if (outcome != handshake::done)
-        return fail_connect(ctx, outcome, result);
+        return fail_connect(ctx, outcome, result, verdict);
     if ((ctx->tls_flags & TLS_VERIFY_PEER) == 0)
         return 0;
     return tls_check_peer(ctx, host) == 0 ? 0 : -1;
@@ -184,9 +193,10 @@ int soap_ssl_accept(soap *ctx)
     }
     SSL_set_accept_state(ctx->tls_connection);
     int result;
-    const handshake outcome = run_handshake(ctx, SSL_accept, ctx->accept_timeout, &result);
+    tls_verdict verdict;
+    const handshake outcome = run_handshake(ctx, SSL_accept, ctx->accept_timeout, &result, &verdict);
     if (outcome != handshake::done)
-        return fail_accept(ctx, "SSL_accept() failed in soap_ssl_accept()",
+        return fail_accept(ctx, tls_with_reason(ctx, "SSL_accept() failed in soap_ssl_accept()", verdict),
                            outcome == handshake::out_of_time ? "Timeout" : tls_error_text(ctx, result));
     if ((ctx->tls_flags & TLS_REQUIRE_CLIENT_CERT) != 0)
         if (const int error = check_client(ctx))

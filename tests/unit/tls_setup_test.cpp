@@ -3,6 +3,7 @@
 #include <string>
 
 #include <gtest/gtest.h>
+#include <openssl/err.h>
 #include <openssl/ssl.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
@@ -69,6 +70,69 @@ TEST_F(tls_setup, a_second_set_up_adds_to_the_context)
     EXPECT_EQ(SSL_CTX_get_verify_mode(first), SSL_VERIFY_NONE);
 }
 
+// A handshake in memory, as far as it goes.
+bool come_together(SSL_CTX *one, SSL_CTX *other)
+{
+    SSL_CTX_set_cipher_list(one, "ALL:@SECLEVEL=0"); // OpenSSL's level alone would refuse the older versions
+    SSL_CTX_set_cipher_list(other, "ALL:@SECLEVEL=0");
+    const server_connection client(SSL_new(one)), server(SSL_new(other));
+    BIO *near = nullptr, *far = nullptr;
+    BIO_new_bio_pair(&near, 0, &far, 0);
+    SSL_set_bio(client.get(), near, near);
+    SSL_set_bio(server.get(), far, far);
+    SSL_set_connect_state(client.get());
+    SSL_set_accept_state(server.get());
+    for (int i = 0; i < 10; ++i) {
+        SSL_do_handshake(client.get());
+        SSL_do_handshake(server.get());
+    }
+    ERR_clear_error();
+    return SSL_is_init_finished(client.get()) && SSL_is_init_finished(server.get());
+}
+
+TEST_F(tls_setup, versions_before_1_2_are_spoken_only_if_the_host_lowers_the_least)
+{
+    const std::string pair =
+        ca().write_pair("old.pem", ca().issue(BY_NAME, server_key()).get(), server_key());
+    constexpr unsigned FLAGS[] = {VERIFIED, VERIFIED | TLS_STRICT_HOST_CHECK, TLS_NO_DEFAULT_CA};
+    for (const unsigned flags : FLAGS) {
+        for (const int version : {TLS1_VERSION, TLS1_1_VERSION, TLS1_2_VERSION, TLS1_3_VERSION}) {
+            const auto other = [version](const SSL_METHOD *method) {
+                server_context made(SSL_CTX_new(method));
+                SSL_CTX_set_min_proto_version(made.get(), TLS1_VERSION);
+                SSL_CTX_set_max_proto_version(made.get(), version);
+                return made;
+            };
+            const server_context server = other(TLS_server_method()), client = other(TLS_client_method());
+            SSL_CTX_use_certificate(server.get(), ca().issue(BY_NAME, server_key()).get());
+            SSL_CTX_use_PrivateKey(server.get(), server_key());
+            context ctx, service;
+            ASSERT_EQ(set_up_client(ctx, flags), 0);
+            ASSERT_EQ(soap_ssl_server_context(service.get(), static_cast<std::uint16_t>(flags), pair.c_str(),
+                                              nullptr, ca().ca_file().c_str(), nullptr, nullptr, nullptr,
+                                              nullptr),
+                      0);
+            SSL_CTX_set_verify(service->tls_context, SSL_VERIFY_NONE, nullptr);
+            const bool recent = version >= TLS1_2_VERSION;
+            EXPECT_EQ(come_together(ctx->tls_context, server.get()), recent) << version;
+            EXPECT_EQ(come_together(client.get(), service->tls_context), recent) << version;
+            SSL_CTX_set_min_proto_version(ctx->tls_context, TLS1_VERSION);
+            EXPECT_TRUE(come_together(ctx->tls_context, server.get())) << version;
+            ASSERT_EQ(set_up_client(ctx, flags), 0);
+            EXPECT_EQ(come_together(ctx->tls_context, server.get()), recent) << "a new set-up, " << version;
+        }
+    }
+}
+
+TEST_F(tls_setup, a_stricter_least_version_of_the_host_stays)
+{
+    context ctx;
+    ASSERT_EQ(set_up_client(ctx), 0);
+    SSL_CTX_set_min_proto_version(ctx->tls_context, TLS1_3_VERSION);
+    ASSERT_EQ(set_up_client(ctx), 0);
+    EXPECT_EQ(SSL_CTX_get_min_proto_version(ctx->tls_context), TLS1_3_VERSION);
+}
+
 TEST_F(tls_setup, the_password_callback_needs_room_for_the_terminator)
 {
     char buffer[5];
@@ -121,8 +185,12 @@ TEST_F(tls_setup, a_client_certificate_is_asked_for_and_verified)
     const struct {
         const char *pair, *password;
         bool accepted;
-    } cases[] = {
-        {good.c_str(), "secret", true}, {unknown.c_str(), nullptr, false}, {nullptr, nullptr, false}};
+        const char *detail; // of the fault
+    } cases[] = {{good.c_str(), "secret", true, nullptr},
+                 {unknown.c_str(), nullptr, false,
+                  "SSL_accept() failed in soap_ssl_accept(): self-signed certificate (at depth 0: "
+                  "CN=somebody,O=Test)"},
+                 {nullptr, nullptr, false, "SSL_accept() failed in soap_ssl_accept()"}};
     for (const auto &c : cases) {
         context service, client;
         service->accept_timeout = 10;
@@ -143,7 +211,7 @@ TEST_F(tls_setup, a_client_certificate_is_asked_for_and_verified)
         EXPECT_EQ(end.result, c.accepted ? 0 : SOAP_TLS_ERROR) << end.text;
         EXPECT_EQ(end.closed, !c.accepted);
         if (!c.accepted) {
-            EXPECT_EQ(end.detail, "SSL_accept() failed in soap_ssl_accept()");
+            EXPECT_EQ(end.detail, c.detail);
         }
     }
     context wrong;
