@@ -20,11 +20,11 @@
 namespace service {
 
 // What a handler works with. Requests and answers belong to the context `ctx`, documents read from the store
-// to the codec; both live until the answer is sent.
+// to the codec; both live until the answer is sent. Documents read by `trial` live until it forgets them.
 struct call {
     soap *ctx;
     store &documents;
-    document_codec &codec;
+    document_codec &codec, &trial;
     const settings &config;
     const protocol__Header *header; // null if the request has none
     std::string root;   // URL of this service as the client named it, "http://host:9080"; may be empty

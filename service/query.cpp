@@ -42,24 +42,37 @@ constexpr country_row COUNTRIES[] = {{"AT", "Austria"}, {"CH", "Switzerland"},  
 
 // --- reports ---
 
-void add_report(call &c, std::vector<report *> &found, const protocolPRFilter__Filter *filter,
-                report *candidate)
+bool passes_filter(call &c, const protocolPRFilter__Filter *filter, const report &candidate)
 {
-    if (filter != nullptr && !filter_holds(*filter, facts_of(c.ctx, *candidate)))
-        return;
+    return filter == nullptr || filter_holds(*filter, facts_of(c.ctx, candidate));
+}
+
+void add_report(call &c, std::vector<report *> &found, report *passed)
+{
     if (found.size() == REPORTS_MAX) {
         auto *const fault =
             make_fault<protocol__Server_x002eDataTooLarge>(c.ctx, "The filter lets too many reports pass.");
         refuse(fault);
     }
-    found.push_back(candidate);
+    found.push_back(passed);
+}
+
+// Documents that don't pass are not kept in memory, whatever their number.
+bool passes_filter(call &c, const protocolPRFilter__Filter *filter, std::string_view xml)
+{
+    if (filter == nullptr)
+        return true;
+    const bool passes = passes_filter(c, filter, *c.trial.read<report>(xml));
+    c.trial.forget();
+    return passes;
 }
 
 protocol__QueryResponse *query_reports(call &c, const protocolProblemReport__QueryReportsRequest &request)
 {
     auto *const response = make<protocolProblemReport__QueryReportsResponse>(c.ctx);
     c.documents.each(problem_report_port.name, [&](std::string_view xml) {
-        add_report(c, response->problemReport, request.inclusionFilter, c.codec.read<report>(xml));
+        if (passes_filter(c, request.inclusionFilter, xml))
+            add_report(c, response->problemReport, c.codec.read<report>(xml));
         return true;
     });
     return response;
@@ -72,8 +85,9 @@ protocol__QueryResponse *query_patterns(call &c,
     auto *const response = make<protocolProblemReport__QueryPatternReportsResponse>(c.ctx);
     for (const update_record *update : the_catalogue().all())
         for (const protocolUpdateOrder__Corrected *corrected : update->corrected)
-            if (corrected->problemReport != nullptr)
-                add_report(c, response->problemReport, request.inclusionFilter, corrected->problemReport);
+            if (corrected->problemReport != nullptr &&
+                passes_filter(c, request.inclusionFilter, *corrected->problemReport))
+                add_report(c, response->problemReport, corrected->problemReport);
     return response;
 }
 

@@ -183,6 +183,7 @@ int reception::settle_request(soap *ctx)
     url.remove_prefix(path);
     path_ = url.substr(0, url.find('?'));
     target_ = find_port(path_);
+    ctx->max_message = data_name().empty() ? config_.message_limit() : 0; // data goes to a file
     if (!knows_sender(ctx)) {
         ctx->auth_realm = REALM;
         return UNAUTHORIZED;

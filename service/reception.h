@@ -40,6 +40,10 @@ public:
     const std::string &root() const { return root_; }
     enclosures &enclosed() { return enclosures_; }
 
+    // What the exchange held in its context, beside the documents that were read for it.
+    void note_memory(std::int64_t bytes) { memory_ = bytes + static_cast<std::int64_t>(lent_.codec.held()); }
+    std::int64_t memory() const { return memory_; }
+
 private:
     // Bytes of a body that belong to no file; all of the data that comes to a data port does. Bytes that
     // just came into the buffer are counted before it shows whether they are an attachment's.
@@ -68,6 +72,7 @@ private:
     session &lent_;
     bool started_ = false, too_slow_ = false;
     std::uint64_t body_bytes_ = 0;
+    std::int64_t memory_ = 0;
     std::chrono::steady_clock::time_point deadline_;
     const port *target_ = nullptr;
     std::string root_, path_;

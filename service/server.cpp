@@ -60,6 +60,8 @@ server::server(const settings &config, database &place)
                [&documents](std::string_view name) { return documents.data_size(name).has_value(); });
     master_.bind_flags = SO_REUSEADDR;
     master_.max_depth = config.depth_limit;
+    master_.max_message = config.message_limit();
+    master_.max_memory = config.memory_limit();
     master_.recv_timeout = master_.send_timeout = config.idle_seconds;
     if (!config.trace.empty()) {
         soap_log_set_received(&master_, config.trace.c_str());

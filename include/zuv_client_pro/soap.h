@@ -146,7 +146,9 @@ struct soap_prefix_cache {
 // Attribute of the current element (writer and reader); records and value buffers are reused within a call.
 // Each record is one block of SOAP_MALLOC (soap_memory.h).
 struct soap_attribute {
-    soap_attribute *next;
+    soap_attribute *next;      // in soap::attribute_list, which holds the visible ones
+    soap_attribute *chain;     // next record of the same hash chain, visible or idle
+    std::uint32_t hash;        // of the name
     std::int16_t escape;       // flag handed to soap_text_write for the value
     char *value;               // owned buffer (another block of SOAP_MALLOC), or null
     std::size_t size;          // capacity of `value`, bytes
@@ -244,10 +246,12 @@ struct ZUV_CLASS soap {
     int recv_timeout, send_timeout, connect_timeout, accept_timeout; // 0 none, > 0 s, < 0 us
     int call_timeout;          // the same for a whole exchange, from connecting to the response's last byte
     std::uint32_t legacy;      // LEGACY_...
-    std::uint64_t max_message; // most bytes of one message's XML, both ways, as plain text: after framing and
-                               // decompression, attachments through callbacks not counted; 0 no limit
-    std::uint64_t max_memory;  // most bytes held for one message in objects, texts, blocks and attachments; 0
-                               // no limit
+    std::uint64_t max_message; // most bytes of one message's XML, both ways, as plain text: framing and
+                               // compression undone, attachments not counted; 0 no limit. Beyond: error 45,
+                               // and the connection is closed
+    std::uint64_t max_memory;  // most bytes held for one received message in objects, texts, blocks and
+                               // attachments, and for one to be sent that is stored; 0 no limit. Beyond: as
+                               // above. Looked at after each buffer of input and at the message's end
     int socket_flags;          // flags for send and recv
     int connect_flags;         // SOL_SOCKET option to set on a client socket, or SO_LINGER; 0 none
     int bind_flags, accept_flags;          // the same for a listening and an accepted socket
@@ -382,7 +386,7 @@ struct ZUV_CLASS soap {
     std::int16_t message_part;    // PART_...
     std::uint64_t chunk_size;     // input: bytes left in the chunk; output: total sent in chunks
     std::size_t chunk_buffer_length; // bytes of `buffer` that the chunk parser owns
-    std::uint64_t body_received;     // input: raw bytes of the body received since the head
+    std::uint64_t body_received;     // input: raw bytes received since the head, or with none the start
     std::size_t raw_index;           // input: next raw byte in zlib_buffer while raw_aside is set
     bool raw_aside;            // input: raw bytes lie in zlib_buffer, and `buffer` holds what is made of them
     bool content_length_given; // input: the head held a Content-Length; set by the head reader
@@ -390,6 +394,15 @@ struct ZUV_CLASS soap {
     bool body_ended;           // input: the last chunk and what follows it were read, or framing broke
     bool prepare_held;         // input: on_recv_prepare sees nothing yet, as the body has not been found
     bool framing_doubtful;     // input: framing was broken or something stood behind the message
+    std::uint64_t plain_received;    // input: bytes of the body, framing and compression undone
+    std::uint64_t attached_received; // input: those of them that went to attachments
+    std::uint64_t bytes_copied;      // input: what references and QNames have added by copying
+    std::int64_t memory_held;      // bytes taken since the received message began, less bytes freed; below 0
+                                   // when blocks from before it are freed
+    std::uint64_t plain_sent;      // output: bytes of the message that have left the buffer
+    std::uint64_t xml_end_max;     // output: place in the message where its XML meets max_message; 0: none
+    const char *exceeded;          // name of the limit that the message went beyond; null: none
+    std::uint64_t exceeded_value;  // that limit, bytes
     char endpoint[SOAP_TEXT_SIZE]; // URL of the exchange; after a redirect its target
     char path[SOAP_TEXT_SIZE];
     char host[SOAP_TEXT_SIZE];  // an IPv6 literal without its brackets

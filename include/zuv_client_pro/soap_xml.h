@@ -189,7 +189,7 @@ ZUV_API const char *soap_namespace_of(soap *ctx, const char *name);
 // byte and becomes "?": it is lost. A zero byte becomes "?" in text of every kind. SOAP_EOF stands for the
 // end of input inside a message; where the transport left an error of its own, that is returned in its place.
 
-// Most attributes of one element; protects the look-up of attributes by name. Reading more is
+// Most attributes of one element; protects questions about them, which go through all. Reading more is
 // SOAP_SYNTAX_ERROR.
 constexpr int SOAP_ATTRIBUTES_MAX = 1000;
 
@@ -244,7 +244,8 @@ ZUV_API int soap_element_in_begin(soap *ctx, const char *tag, int nil_allowed, c
 // Drops what is left of an open element, a held tag included, and reads its end tag, whose name is in `tag`
 // then.
 //   tag  name to compare with in strict mode, or null; a name that begins with "-" does nothing
-//   0; SOAP_SYNTAX_ERROR (a broken end tag, in strict mode another name); SOAP_EOF
+//   0; SOAP_SYNTAX_ERROR (a broken end tag, in strict mode another name); SOAP_LENGTH (more than max_depth
+//   open elements in what is dropped); SOAP_EOF
 ZUV_API int soap_element_in_end(soap *ctx, const char *tag);
 
 // Drops an element that nobody knows, with all that it holds.

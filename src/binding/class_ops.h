@@ -96,6 +96,10 @@ int class_pointer_out(soap *ctx, const class_ops &ops, const char *tag, int id, 
                       const char *type);
 void class_pointer_mark(soap *ctx, const class_ops &ops, const void *object);
 
+// A reference is to be filled by a copy of an object of `size` bytes with `content` bytes beside it. False
+// with error 45.
+bool object_copy_allowed(soap *ctx, std::size_t size, std::size_t content);
+
 // Makes a managed object of the class, or of the derived class that xsi_type names. Null with error 20.
 void *class_instantiate(soap *ctx, const class_ops &ops, int count, const char *xsi_type, std::size_t *size,
                         const class_ops **made);

@@ -57,9 +57,13 @@ int soap_fault_receive(soap *ctx, int check)
 {
     int result = ctx->error;
     if (!check && !may_be_fault(ctx))
-        return result;
+        return ctx->exceeded != nullptr ? soap_socket_release(ctx) : result;
     ctx->error = 0;
     if (soap_fault_read(ctx)) {
+        if (ctx->exceeded != nullptr) {
+            ctx->error = SOAP_LENGTH;
+            return soap_socket_release(ctx);
+        }
         if (check && ctx->error == SOAP_TAG_MISMATCH && ctx->nesting_level == 2)
             return ctx->error = 0;
         result = keep_error(ctx, result);

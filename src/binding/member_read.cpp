@@ -14,6 +14,7 @@
 
 #include "binding/registry.h"
 #include "codec/xml_text.h"
+#include "engine/limits.h"
 
 namespace binding {
 
@@ -21,6 +22,8 @@ namespace {
 
 constexpr int TEXT_TYPE_ID = 8; // all texts held by pointer are of one type to the identity tables
 constexpr int BOOLEAN_TYPE_ID = 13;
+constexpr std::size_t TEXT_IN_PLACE =
+    std::string().capacity(); // characters that a text holds without a block
 
 bool ends(soap *ctx, const char *tag, bool body)
 {
@@ -41,6 +44,8 @@ std::string *new_text(soap *ctx, std::string_view content = {})
         return nullptr;
     try {
         auto *text = new std::string(content);
+        memory_charge(ctx, sizeof *text);
+        text_charge(ctx, content.size(), TEXT_IN_PLACE);
         instance->object = text;
         return text;
     } catch (const std::bad_alloc &) {
@@ -51,6 +56,8 @@ std::string *new_text(soap *ctx, std::string_view content = {})
 
 bool append_text(soap *ctx, std::vector<std::string> &vector, std::string_view content)
 {
+    vector_charge(ctx, vector);
+    text_charge(ctx, content.size(), TEXT_IN_PLACE);
     try {
         vector.emplace_back(content);
         return true;
@@ -181,6 +188,7 @@ bool read_text_content(soap *ctx, std::string &text)
     std::string_view content;
     if (!read_characters(ctx, content))
         return false;
+    text_charge(ctx, content.size(), text.capacity());
     try {
         text.assign(content);
     } catch (const std::bad_alloc &) {
@@ -232,8 +240,8 @@ bool read_vector_item_text(soap *ctx, const char *tag, std::vector<std::string> 
         return append_text(ctx, vector, content);
     if (soap_element_in_begin(ctx, tag, 1, nullptr))
         return false;
-    if (!vector_append<std::string>(&vector, nullptr))
-        return out_of_memory(ctx);
+    if (!append_item<std::string>(ctx, vector, nullptr))
+        return false;
     if (is_reference(ctx))
         return refers_item(ctx, tag, &vector, vector.size() - 1, TEXT_TYPE_ID, sizeof(std::string),
                            vector_type);
@@ -253,6 +261,9 @@ bool read_vector_item_text(soap *ctx, const char *tag, std::vector<std::string> 
 
 bool copy_text(soap *ctx, std::string &target, const std::string &source)
 {
+    if (copy_charge(ctx, source.size()) != 0)
+        return false;
+    text_charge(ctx, source.size(), target.capacity());
     try {
         target = source;
     } catch (const std::bad_alloc &) {

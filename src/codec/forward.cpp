@@ -13,6 +13,8 @@
 
 #include <zuv_client_pro/soap_memory.h>
 
+#include "engine/limits.h"
+
 namespace {
 
 // --- records ---
@@ -57,10 +59,12 @@ int run_hook(soap *ctx, const soap_id_record *record, const soap_forward_record 
              std::size_t available)
 {
     const bool bytes = forward->hook == soap_copy_bytes;
+    const std::size_t size = bytes ? std::min(forward->size, available) : record->size;
+    if (bytes && copy_charge(ctx, size) != SOAP_OK)
+        return ctx->error;
     const int error_before = ctx->error;
     ctx->error = SOAP_OK;
-    forward->hook(ctx, record->type, forward->type, forward->place, forward->length, source,
-                  bytes ? std::min(forward->size, available) : record->size);
+    forward->hook(ctx, record->type, forward->type, forward->place, forward->length, source, size);
     const int error = ctx->error;
     if (error == SOAP_OK)
         ctx->error = error_before;
@@ -253,6 +257,8 @@ private:
     {
         for (void *place = record->copy, *next = nullptr; place != nullptr; place = next) {
             next = load_place(place);
+            if (copy_charge(ctx, record->size) != SOAP_OK)
+                return ctx->error;
             std::memmove(place, record->ptr, record->size);
             filled(place);
         }

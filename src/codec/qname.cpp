@@ -13,6 +13,7 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "codec/namespace.h"
+#include "engine/limits.h"
 
 namespace {
 
@@ -93,9 +94,13 @@ bool put_mapped(soap *ctx, std::string_view word, bool last, text_sink *out)
     return true;
 }
 
+// A list grows by a URI for each word; one that grows too much isn't even measured to its end.
 bool put_list(soap *ctx, const char *text, text_sink *out)
 {
+    const bool measures = out->target == nullptr;
     for (std::string_view word = next_word(&text); !word.empty();) {
+        if (measures && !copy_allowed(ctx, out->length))
+            break;
         const std::string_view next = next_word(&text);
         if (!put_mapped(ctx, word, next.empty(), out))
             return false;
@@ -189,6 +194,8 @@ int soap_qname_read_map(soap *ctx, const char *text, char **target, long minimum
     text_sink measure = {nullptr, 0};
     if (!put_list(ctx, text, &measure))
         return ctx->error = SOAP_NAMESPACE_ERROR;
+    if (copy_charge(ctx, measure.length) != SOAP_OK)
+        return ctx->error;
     auto *mapped = static_cast<char *>(soap_block_alloc(ctx, measure.length + 1));
     if (mapped == nullptr)
         return ctx->error = SOAP_OUT_OF_MEMORY;

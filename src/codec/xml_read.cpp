@@ -11,6 +11,7 @@
 #include <cstring>
 #include <string_view>
 
+#include "codec/attributes.h"
 #include "codec/namespace.h"
 
 namespace {
@@ -26,7 +27,7 @@ int no_tag(soap *ctx, int error)
 // A code left by a search that found nothing says nothing about the input; any other tells why it ended.
 int end_of_input(soap *ctx)
 {
-    const int error = ctx->error;
+    const int error = ctx->exceeded != nullptr ? static_cast<int>(SOAP_LENGTH) : ctx->error;
     return error == 0 || error == SOAP_TAG_MISMATCH || error == SOAP_NO_TAG ? SOAP_EOF : error;
 }
 
@@ -413,11 +414,10 @@ int soap_element_skip(soap *ctx)
     if ((ctx->mode & MODE_STRICT) != 0 && ctx->message_part != PART_HEADER)
         return ctx->error = SOAP_TAG_MISMATCH;
     ctx->peeked = 0;
-    ctx->error = 0;
-    if (ctx->has_body == 0)
-        return 0;
-    ctx->nesting_level++; // the end of the element takes it back
-    return soap_element_in_end(ctx, nullptr);
+    ctx->error = enter_element(ctx);
+    if (ctx->error != 0 || ctx->has_body == 0)
+        return ctx->error;
+    return soap_element_in_end(ctx, nullptr); // which takes the level back
 }
 
 void soap_tag_unread(soap *ctx)

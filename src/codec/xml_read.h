@@ -18,9 +18,6 @@ int xml_attributes_read(soap *ctx);
 // Sets the context's fields from the attributes that the engine itself understands. Clears the error.
 void xml_attributes_apply(soap *ctx);
 
-// Makes all records of the attribute table idle.
-void xml_attributes_hide(soap *ctx);
-
 // Reads a name up to a byte of the class Stop, which stays unread. Keeps what fits `name` (SOAP_TEXT_SIZE
 // bytes), terminated; the rest is dropped. The kept length.
 template <class Stop> std::size_t xml_name_read(soap *ctx, char *name)

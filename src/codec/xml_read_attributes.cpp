@@ -3,11 +3,11 @@
 // Here: the attribute loop, values of any size, and the attributes of SOAP and XSI. Elsewhere: the records
 // themselves (attributes.cpp), the tag (xml_read.cpp), the prefix stack (namespace_prefix.cpp).
 //
-// Always: records and their value buffers are kept for the next element. The table holds no more than
-// RECORDS_KEPT of them, or as many as one element needs, so that a message of ever new names can't make it
-// grow.
+// Always: an attribute costs the same however many the element has.
 #include <algorithm>
+#include <array>
 #include <cstring>
+#include <string_view>
 
 #include <zuv_client_pro/soap_primitive.h>
 
@@ -17,65 +17,30 @@
 
 namespace {
 
-constexpr int RECORDS_KEPT = 256; // beyond that an idle record makes room for a new one
-constexpr std::size_t VALUE_BYTES_MIN = 256;
+constexpr std::size_t VALUE_BYTES_MIN = 64;
 
 constexpr char NEXT_ACTOR[] = "http://schemas.xmlsoap.org/soap/actor/next";
 constexpr char NEXT_ROLE[] = "http://www.w3.org/2003/05/soap-envelope/role/next";
 
 // ------------------------------------------------------------------------------------------ records
 
-struct record_search {
-    soap_attribute *found = nullptr;
-    soap_attribute **idle = nullptr; // link to some idle record
-    int count = 0;
-};
+// Where the attributes of an element go in the list: plain names and declarations come first, so that they
+// are understood first.
+struct attribute_order {
+    soap *ctx;
+    soap_attribute **end; // behind the last one
 
-record_search find_record(soap *ctx, std::string_view name)
-{
-    record_search search;
-    for (soap_attribute **link = &ctx->attribute_list; *link != nullptr; link = &(*link)->next) {
-        if (xml_attribute_name(*link) == name) {
-            search.found = *link;
-            break;
-        }
-        if ((*link)->visible == 0)
-            search.idle = link;
-        ++search.count;
+    explicit attribute_order(soap *context) : ctx(context), end(&context->attribute_list) {}
+
+    void put(soap_attribute *record)
+    {
+        const bool prefixed = std::memchr(record->name, ':', record->name_length) != nullptr;
+        const bool moves_end = prefixed || end == &ctx->attribute_list;
+        xml_attribute_show(ctx, prefixed ? end : &ctx->attribute_list, record, 1);
+        if (moves_end)
+            end = &record->next;
     }
-    return search;
-}
-
-void free_record(soap *ctx, soap_attribute **link)
-{
-    soap_attribute *record = *link;
-    *link = record->next;
-    xml_attribute_drop(ctx, record);
-}
-
-// Plain names and declarations stay ahead of names with a prefix, so that they are understood first.
-void move_to_end(soap *ctx, soap_attribute *record)
-{
-    ctx->attribute_list = record->next;
-    soap_attribute **end = &ctx->attribute_list;
-    while (*end != nullptr)
-        end = &(*end)->next;
-    record->next = nullptr;
-    *end = record;
-}
-
-soap_attribute *record_for(soap *ctx, const char *name, std::size_t length)
-{
-    const record_search search = find_record(ctx, {name, length});
-    if (search.found != nullptr)
-        return search.found;
-    if (search.count >= RECORDS_KEPT && search.idle != nullptr)
-        free_record(ctx, search.idle);
-    soap_attribute *record = xml_attribute_make(ctx, {name, length});
-    if (record != nullptr && std::memchr(name, ':', length) != nullptr)
-        move_to_end(ctx, record);
-    return record;
-}
+};
 
 int store_value(soap *ctx, soap_attribute *record, const char *text, std::size_t length)
 {
@@ -166,25 +131,28 @@ int read_unquoted(soap *ctx, soap_attribute *record)
 
 // ------------------------------------------------------------------------------------------ the loop
 
-// The prefix that an attribute of this name declares, or null.
-const char *declared_prefix(const char *name)
+// The prefix that an attribute declares, or null.
+const char *declared_prefix(const soap_attribute *record)
 {
-    if (std::strncmp(name, "xmlns", 5) != 0)
+    const std::string_view name = xml_attribute_name(record);
+    if (!name.starts_with("xmlns"))
         return nullptr;
-    return name[5] == '\0' ? name + 5 : name[5] == ':' ? name + 6 : nullptr;
+    return name.size() == 5 ? record->name + 5 : record->name[5] == ':' ? record->name + 6 : nullptr;
 }
 
-int read_attribute(soap *ctx)
+int read_attribute(soap *ctx, attribute_order &order)
 {
     char *name = ctx->scratch_text;
     const std::size_t length = xml_name_read<attribute_name_stop>(ctx, name);
     if (length == 0)
         return SOAP_SYNTAX_ERROR;
-    soap_attribute *record = record_for(ctx, name, length);
+    soap_attribute *record = xml_attribute_record(ctx, {name, length});
     if (record == nullptr)
         return ctx->error;
     ctx->attributes_set = 1;
-    record->visible = 1;
+    if (record->visible == 0)
+        order.put(record);
+    record->visible = 1; // the last of one name counts
     if (input_skip_blanks(ctx) != '=')
         return 0;
     ctx->buffer_index++;
@@ -195,7 +163,7 @@ int read_attribute(soap *ctx)
                                                     : read_unquoted(ctx, record);
     if (error != 0)
         return error;
-    const char *prefix = declared_prefix(record->name);
+    const char *prefix = declared_prefix(record);
     if (prefix == nullptr)
         return 0;
     return soap_prefix_push_in(ctx, prefix, record->value) != nullptr ? 0 : ctx->error;
@@ -251,20 +219,18 @@ void check_actor(soap *ctx, const char *value, const char *next)
 }
 
 // An attribute without a prefix that is known by its plain name.
-bool apply_plain(soap *ctx, const char *name, const char *value)
+bool apply_plain(soap *ctx, std::string_view name, const char *value)
 {
     const bool graph = (ctx->mode & SOAP_XML_GRAPH) != 0;
-    if (std::strcmp(name, "id") == 0 &&
-        (graph || (ctx->soap_version > 0 && (ctx->mode & SOAP_XML_TREE) == 0))) {
+    if (name == "id" && (graph || (ctx->soap_version > 0 && (ctx->mode & SOAP_XML_TREE) == 0))) {
         keep_reference(ctx->element_id, value);
         return true;
     }
-    if (std::strcmp(name, "href") == 0 &&
-        (graph || ctx->soap_version == 1 || (ctx->mode & (MODE_DIME | MODE_MTOM)) != 0)) {
+    if (name == "href" && (graph || ctx->soap_version == 1 || (ctx->mode & (MODE_DIME | MODE_MTOM)) != 0)) {
         keep_text(ctx->element_href, value);
         return true;
     }
-    if (std::strcmp(name, "ref") == 0 && ctx->soap_version == 2) {
+    if (name == "ref" && ctx->soap_version == 2) {
         keep_reference(ctx->element_href, value);
         return true;
     }
@@ -338,15 +304,39 @@ constexpr attribute_rule rules[] = {
      }},
 };
 
-void apply_attribute(soap *ctx, const char *name, const char *value)
+// By first letter: bit n tells that some name which is understood has a local part of n bytes.
+constexpr std::size_t LETTERS = 32;
+constexpr auto KNOWN_LENGTHS = [] {
+    std::array<std::uint32_t, LETTERS> lengths{};
+    const auto add = [&lengths](std::string_view local) {
+        lengths[static_cast<unsigned char>(local[0]) % LETTERS] |= 1U << local.size();
+    };
+    for (const std::string_view plain : {"id", "href", "ref"})
+        add(plain);
+    for (const attribute_rule &rule : rules)
+        add(rule.local);
+    return lengths;
+}();
+
+bool may_be_known(std::string_view local)
 {
-    if (declared_prefix(name) != nullptr || apply_plain(ctx, name, value))
-        return;
+    return !local.empty() && local.size() < 32 &&
+           (KNOWN_LENGTHS[static_cast<unsigned char>(local[0]) % LETTERS] >> local.size() & 1) != 0;
+}
+
+void apply_attribute(soap *ctx, const soap_attribute *record)
+{
+    const std::string_view name = xml_attribute_name(record);
     const std::string_view local = xml_local_part(name);
+    if (!may_be_known(local))
+        return;
+    const bool prefixed = local.size() != name.size();
+    if (prefixed ? declared_prefix(record) != nullptr : apply_plain(ctx, name, record->value))
+        return;
     const int version = 1 << ctx->soap_version;
     for (const attribute_rule &rule : rules) {
-        if ((rule.versions & version) != 0 && rule.local == local &&
-            soap_tag_compare(ctx, name, rule.name) == 0 && rule.apply(ctx, value))
+        if (rule.local == local && (rule.versions & version) != 0 &&
+            soap_tag_compare(ctx, record->name, rule.name) == 0 && rule.apply(ctx, record->value))
             return;
     }
 }
@@ -355,11 +345,14 @@ void apply_attribute(soap *ctx, const char *name, const char *value)
 
 int xml_attributes_read(soap *ctx)
 {
+    if (ctx->attribute_list != nullptr)
+        xml_attributes_hide(ctx);
+    attribute_order order(ctx);
     for (int count = 0;; ++count) {
         const std::int32_t byte = input_skip_blanks(ctx);
         if (byte == XML_EOF || byte == '>' || byte == '/')
             return 0;
-        const int error = count < SOAP_ATTRIBUTES_MAX ? read_attribute(ctx) : SOAP_SYNTAX_ERROR;
+        const int error = count < SOAP_ATTRIBUTES_MAX ? read_attribute(ctx, order) : SOAP_SYNTAX_ERROR;
         if (error != 0)
             return error;
     }
@@ -369,14 +362,7 @@ void xml_attributes_apply(soap *ctx)
 {
     for (const soap_attribute *p = ctx->attribute_list; p != nullptr; p = p->next) {
         if (p->visible == 2 && p->value != nullptr)
-            apply_attribute(ctx, p->name, p->value);
+            apply_attribute(ctx, p);
     }
     ctx->error = 0;
-}
-
-void xml_attributes_hide(soap *ctx)
-{
-    for (soap_attribute *p = ctx->attribute_list; p != nullptr; p = p->next)
-        p->visible = 0;
-    ctx->attributes_set = 0;
 }

@@ -8,6 +8,8 @@
 
 #include <cstring>
 
+#include <zuv_client_pro/soap_error.h>
+
 #include "codec/xml_scan.h"
 
 namespace {
@@ -244,11 +246,23 @@ int xml_skip_tag(soap *ctx)
     return XML_EOF;
 }
 
+// An element begins, with content, within `depth` others that are skipped: true if it is one too many.
+static bool skips_too_deep(soap *ctx, std::uint64_t depth)
+{
+    if (ctx->max_depth == 0 || ctx->nesting_level + depth < ctx->max_depth)
+        return false;
+    ctx->error = SOAP_LENGTH;
+    return true;
+}
+
 int xml_skip_content(soap *ctx, std::uint64_t depth)
 {
+    bool too_deep = depth != 0 && skips_too_deep(ctx, depth - 1);
     for (;;) {
         std::int32_t token;
-        if (ctx->look_ahead != 0 || ctx->in_cdata != CDATA_OUTSIDE)
+        if (too_deep)
+            token = XML_EOF;
+        else if (ctx->look_ahead != 0 || ctx->in_cdata != CDATA_OUTSIDE)
             token = soap_char_next(ctx);
         else if (skip_past(ctx, '<') != XML_EOF)
             token = xml_markup_next(ctx);
@@ -258,8 +272,7 @@ int xml_skip_content(soap *ctx, std::uint64_t depth)
             return 0;
         if (token == XML_START) {
             token = xml_skip_tag(ctx);
-            if (token == 0)
-                ++depth;
+            too_deep = token == 0 && skips_too_deep(ctx, depth++);
         }
         if (token == XML_EOF) {
             ctx->look_ahead = XML_EOF;

@@ -26,7 +26,7 @@ std::int32_t xml_markup_next(soap *ctx);
 int xml_skip_tag(soap *ctx);
 
 // Drops content up to and including the "</" that closes `depth` elements and the one around them; bounded in
-// memory whatever the nesting. 0 or XML_EOF.
+// memory whatever the nesting. 0, or XML_EOF with SOAP_LENGTH in ctx->error past max_depth open elements.
 int xml_skip_content(soap *ctx, std::uint64_t depth);
 
 // Truth: the token is a character that came from a reference.

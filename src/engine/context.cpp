@@ -153,6 +153,7 @@ void soap_reset_call(soap *ctx)
     ctx->content_length = 0;
     ctx->look_ahead = 0;
     ctx->error = SOAP_OK;
+    ctx->exceeded = nullptr;
     ctx->endpoint[0] = '\0';
     ctx->dime.count = 0;
     ctx->dime.chunk_size = 0;

@@ -104,6 +104,14 @@ static const char *unlisted_text(soap *ctx)
     return ctx->message_text;
 }
 
+// "max_memory: more than 1000 bytes".
+static const char *limit_text(soap *ctx)
+{
+    std::snprintf(ctx->message_text, sizeof ctx->message_text, "%s: more than %llu bytes", ctx->exceeded,
+                  static_cast<unsigned long long>(ctx->exceeded_value));
+    return ctx->message_text;
+}
+
 const char *error_text(soap *ctx)
 {
     const char *text = listed_text(ctx->error);
@@ -116,8 +124,9 @@ const char *error_text(soap *ctx)
     case SOAP_REQUIRED:
     case SOAP_PROHIBITED:
     case SOAP_OCCURS:
-    case SOAP_LENGTH:
         return soap_constraint_text(ctx, text, nullptr);
+    case SOAP_LENGTH:
+        return ctx->exceeded != nullptr ? limit_text(ctx) : soap_constraint_text(ctx, text, nullptr);
     case SOAP_TYPE_MISMATCH:
         return soap_constraint_text(ctx, text, ctx->element_type);
     case SOAP_DUPLICATE_ID:

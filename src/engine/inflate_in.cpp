@@ -123,6 +123,7 @@ int soap_inflate_begin(soap *ctx, int window_bits)
     ctx->zlib_state = ZLIB_INFLATING;
     ctx->mode |= MODE_DEFLATE;
     ctx->zlib_crc = crc32(0, nullptr, 0);
+    ctx->plain_received = 0;
     soap_raw_move_aside(ctx);
     take_raw_as_input(ctx);
     stream->next_out = zlib_bytes(ctx->buffer);
@@ -169,5 +170,7 @@ int soap_inflate_finish(soap *ctx)
         (result == STREAM_ENDED && gzip && !trailer_is_right(ctx, plain_length)))
         result = fail(ctx);
     ctx->zlib_in = 0;
+    if (ctx->exceeded != nullptr) // what the stream lacks is what nobody wanted to receive
+        return ctx->error = SOAP_LENGTH;
     return result == STREAM_ENDED ? SOAP_OK : ctx->error = result;
 }

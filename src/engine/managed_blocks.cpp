@@ -11,6 +11,7 @@
 #include <zuv_client_pro/soap_memory.h>
 
 #include "engine/context_state.h"
+#include "engine/limits.h"
 #include "engine/tracking.h"
 
 struct soap_block_trailer {
@@ -49,7 +50,7 @@ static int check_canary(soap *ctx, soap_block_trailer *trailer)
 // False for a block that was given to tracked_free behind the list's back.
 static bool entry_is_live(soap_block_trailer *trailer)
 {
-    return trailer->entry->address == block_start(trailer) && trailer->entry->dead_slot == TRACK_LIVE;
+    return trailer->entry->address == block_start(trailer) && track_is_live(trailer->entry);
 }
 
 static void free_block(soap *ctx, soap_block_trailer *trailer)
@@ -72,8 +73,10 @@ void *soap_block_alloc(soap *ctx, std::size_t size)
         return const_cast<char *>("");
     if (ctx == nullptr)
         return SOAP_MALLOC(ctx, size);
-    if (ctx->on_malloc != nullptr)
+    if (ctx->on_malloc != nullptr) {
+        memory_charge(ctx, size);
         return ctx->on_malloc(ctx, size);
+    }
     if (size > SIZE_MAX - BLOCK_OVERHEAD)
         return out_of_memory(ctx);
     const std::size_t span = (size + sizeof CANARY + 7) & ~std::size_t{7};

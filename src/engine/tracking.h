@@ -13,11 +13,17 @@ struct soap_track_entry {
     void *address;
     const char *source_file; // borrowed
     std::int32_t source_line;
-    std::int32_t dead_slot; // place in soap_memory_pools::dead; TRACK_LIVE while the block is in use
+    std::uint32_t life; // live: what the block counts in soap::memory_held, in units of ALLOCATION_UNIT;
+                        // dead: TRACK_DEAD and its place in soap_memory_pools::dead
 };
 
-constexpr std::int32_t TRACK_LIVE = -1;
+constexpr std::uint32_t TRACK_DEAD = 0x80000000;
 constexpr std::size_t TRACK_DEAD_MAX = 4096; // freed blocks that a context remembers
+
+inline bool track_is_live(const soap_track_entry *entry)
+{
+    return (entry->life & TRACK_DEAD) == 0;
+}
 
 // Made at the first allocation, gone with soap_engine_done.
 struct soap_memory_pools {

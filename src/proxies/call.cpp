@@ -1,7 +1,7 @@
 // call.cpp - the cycle of an operation: mark, count, connect, send, receive, release.
 //
-// Always: until the connection is asked for, a failure returns at once and leaves a kept connection alone;
-// from there on every way out releases the connection.
+// Always: until the connection is asked for, a failure returns at once and leaves a kept connection alone,
+// but for a message that is too large; from there on every way out releases the connection.
 #include "proxies/call.h"
 
 #include <zuv_client_pro/soap_envelope.h>
@@ -97,7 +97,7 @@ int call(soap *ctx, const char *&proxy_endpoint, const char *default_endpoint, c
     soap_mark_header(ctx);
     binding::class_pointer_mark(ctx, *op.request, request);
     if (count_message(ctx, op, request))
-        return ctx->error;
+        return ctx->exceeded != nullptr ? soap_socket_release(ctx) : ctx->error;
     if (send_message(ctx, proxy_endpoint, action ? action : "", op, request) || !result)
         return soap_socket_release(ctx);
     *result = nullptr;

@@ -35,6 +35,7 @@ public:
     int port() const { return port_; } // 0: it did not start
     std::string url(const char *port_name) const;
     bool running();
+    pid_t pid() const { return pid_; }
 
     // Ends it in an orderly way. Its exit status, or minus the signal that ended it.
     int stop();

@@ -188,6 +188,17 @@ TEST_F(Binding, references_forward_and_back_share_one_object)
     }
 }
 
+TEST_F(Binding, strict_reading_takes_no_object_with_wanted_members_by_reference)
+{
+    const auto code_of = [this]<class T>(const T &) {
+        EXPECT_EQ(nullptr, read<T>("<f href=\"#f\"/>", MODE_STRICT));
+        return ctx.error;
+    };
+    EXPECT_EQ(SOAP_OCCURS, code_of(protocolPRFilter__And())) << "a vector with a minimum";
+    EXPECT_EQ(SOAP_OCCURS, code_of(protocolPRFilter__Not())) << "a required member";
+    EXPECT_EQ(SOAP_MISSING_ID, code_of(protocol__Contact())) << "neither";
+}
+
 TEST_F(Binding, graph_mode_writes_shared_objects_once_and_literal_mode_each_time)
 {
     std::string name = "Ada";

@@ -15,6 +15,7 @@
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_log.h>
 #include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_xml.h>
 
 #include "support/failing_malloc.h"
 
@@ -128,10 +129,7 @@ TEST(Context, TheScratchOfACallIsFreedWhole)
     CaptureStderr();
     {
         soap ctx;
-        auto *attribute = static_cast<soap_attribute *>(SOAP_MALLOC(&ctx, sizeof(soap_attribute)));
-        *attribute = {};
-        attribute->value = static_cast<char *>(SOAP_MALLOC(&ctx, 8));
-        ctx.attribute_list = attribute;
+        ASSERT_EQ(soap_attr_set(&ctx, "a", "value", 1), 0);
         auto *reference = static_cast<soap_attachment_ref *>(SOAP_MALLOC(&ctx, sizeof(soap_attachment_ref)));
         *reference = {};
         ctx.mtom_list = reference;
