@@ -47,7 +47,8 @@ constexpr std::uint64_t SOAP_MAX_MESSAGE = std::uint64_t{1} << 30;  // bytes; de
 constexpr std::uint64_t SOAP_MAX_MEMORY = std::uint64_t{512} << 20; // bytes; default of soap::max_memory
 
 // ---------------------------------------------------------------------------------------------
-// Mode flags: the same values serve `mode`, `input_mode` and `output_mode`.
+// Mode flags: the same values serve `mode`, `input_mode` and `output_mode`. 0x100000 and 0x200000 are the
+// reader's own: further encodings of received text.
 
 constexpr std::uint32_t MODE_IO_MASK = 0x3;     // the two bits that choose how bytes leave
 constexpr std::uint32_t MODE_DIRECT = 0x0;      // no buffering: each write goes out

@@ -25,6 +25,7 @@
 #include "engine/inflate_in.h"
 #include "engine/raw_in.h"
 #include "engine/scratch.h"
+#include "engine/text_encoding.h"
 #include "engine/zlib_common.h"
 
 namespace {
@@ -140,7 +141,7 @@ std::int32_t skip_utf8_mark(soap *ctx)
         return END;
     if (third != 0xBF)
         return third | HIGH_OF_TRUNCATED_MARK;
-    ctx->mode &= ~MODE_LATIN1;
+    ctx->mode &= ~ENCODING_MODES;
     return skip_blanks(ctx, soap_recv_byte(ctx));
 }
 
@@ -176,18 +177,20 @@ int read_head(soap *ctx)
     return ctx->on_read_head != nullptr ? ctx->on_read_head(ctx) : SOAP_OK;
 }
 
+// There is a first byte.
 int begin_announced_compression(soap *ctx)
 {
-    if (ctx->zlib_in == ENCODING_GZIP) {
-        if (peek_byte(ctx) == GZIP_FIRST_BYTE) {
-            soap_recv_byte(ctx);
-            if (soap_gzip_skip_header(ctx) != SOAP_OK)
-                return ctx->error;
-            return soap_inflate_begin(ctx, ZLIB_RAW);
-        }
-        ctx->zlib_in = ENCODING_DEFLATE; // some peers name one and send the other
+    if (ctx->zlib_in == 0)
+        return SOAP_OK;
+    const std::int32_t first = soap_recv_byte(ctx);
+    if (ctx->zlib_in == ENCODING_GZIP && first == GZIP_FIRST_BYTE) {
+        if (soap_gzip_skip_header(ctx) != SOAP_OK)
+            return ctx->error;
+        return soap_inflate_begin(ctx, ZLIB_RAW);
     }
-    return ctx->zlib_in != 0 ? soap_inflate_begin(ctx, ZLIB_WRAPPED) : SOAP_OK;
+    ctx->zlib_in = ENCODING_DEFLATE; // some peers name one and send the other
+    peek_byte(ctx);                  // the second byte is looked at too
+    return soap_inflate_begin_deflate(ctx, static_cast<std::uint8_t>(first));
 }
 
 int no_body(soap *ctx)
@@ -275,6 +278,7 @@ int begin_mime(soap *ctx)
         ctx->mode |= MODE_DIME;
     if (type != nullptr && soap_attr_value(ctx, type, "application/xop+xml") != nullptr)
         ctx->mode |= MODE_MTOM;
+    text_encoding_by_type(ctx, type, ctx->mode);
     return SOAP_OK;
 }
 

@@ -133,6 +133,22 @@ int soap_inflate_begin(soap *ctx, int window_bits)
     return SOAP_OK;
 }
 
+int soap_inflate_begin_deflate(soap *ctx, std::uint8_t first)
+{
+    // The second byte is looked at where it stands; the first, which a refill may have taken away, is handed
+    // on by itself.
+    const bool has_second = ctx->look_ahead == 0 && ctx->buffer_index < ctx->buffer_length;
+    const auto second = static_cast<unsigned char>(has_second ? ctx->buffer[ctx->buffer_index] : 0);
+    const bool has_zlib_head =
+        (first & 0x0F) == Z_DEFLATED && first >> 4 <= 7 && (first << 8 | second) % 31 == 0;
+    if (soap_inflate_begin(ctx, has_zlib_head ? ZLIB_WRAPPED : ZLIB_RAW) != SOAP_OK)
+        return ctx->error;
+    if (inflatePrime(ctx->zlib_stream, 8, first) != Z_OK)
+        return fail(ctx);
+    ctx->zlib_stream->total_in = 1;
+    return SOAP_OK;
+}
+
 int soap_inflate_refill(soap *ctx)
 {
     z_stream *stream = ctx->zlib_stream;

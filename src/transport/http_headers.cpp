@@ -14,6 +14,8 @@
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "engine/text_encoding.h"
+
 namespace {
 
 constexpr std::size_t SCHEME_LENGTH = 6; // of "Basic ": where the parameters of a challenge are looked for
@@ -67,8 +69,10 @@ int parse_content_type(soap *ctx, const char *value)
 {
     if (store_copy(ctx, value, ctx->http_content) != SOAP_OK)
         return ctx->error;
-    if (is_simple_type(value))
+    if (is_simple_type(value)) {
+        text_encoding_by_type(ctx, value, ctx->input_mode);
         return SOAP_OK;
+    }
     const char *const type = ctx->http_content;
     if (has_item(ctx, type, "application/dime"))
         ctx->input_mode |= MODE_DIME;
@@ -77,6 +81,8 @@ int parse_content_type(soap *ctx, const char *value)
             store_copy(ctx, soap_attr_value(ctx, type, "start"), ctx->mime.start) != SOAP_OK)
             return ctx->error;
         ctx->input_mode |= MODE_MIME;
+    } else { // the parts of a multipart body have a type of their own
+        text_encoding_by_type(ctx, type, ctx->input_mode);
     }
     const char *const action = soap_attr_value(ctx, type, "action");
     return action == nullptr ? SOAP_OK : store_action(ctx, action);

@@ -215,14 +215,25 @@ TEST_F(CallCycle, answers_outlive_later_calls_until_destroy)
     EXPECT_EQ("urn:2", response.result->thisURI.at(0));
 }
 
-TEST_F(CallCycle, a_cyclic_document_ends_the_count_before_anything_is_sent)
+TEST_F(CallCycle, what_cannot_be_written_is_refused_before_anything_is_sent)
 {
-    protocolProfile__ProfileContent document;
-    document.profile = {&document};
+    protocolProfile__ProfileContent cyclic, unspeakable;
+    cyclic.profile = {&cyclic};
+    unspeakable.thisURI = {"urn:\x01"};
     __protocolProfile__setResponse set;
-    EXPECT_EQ(SOAP_LENGTH, proxy.set(&document, set));
-    EXPECT_EQ(0, wire.opened);
-    EXPECT_TRUE(wire.sent.empty());
+    for (const std::uint32_t mode : {MODE_DIRECT, MODE_BUFFERED, MODE_STORE, MODE_CHUNKED}) {
+        proxy.output_mode = mode;
+        EXPECT_EQ(SOAP_LENGTH, proxy.set(&cyclic, set));
+        EXPECT_EQ(mode == MODE_CHUNKED, wire.sent.size() > SOAP_BUFFER_SIZE);
+        wire.sent.clear();
+        EXPECT_EQ(SOAP_UTF_ERROR, proxy.set(&unspeakable, set));
+        EXPECT_NE(std::string::npos, std::string(proxy.soap_fault_string()).find("U+0001"));
+        EXPECT_EQ(mode < MODE_STORE ? 0 : wire.closed, wire.opened);
+        // In chunks the head is gone by then, and the body stays without an end.
+        EXPECT_EQ(mode == MODE_CHUNKED ? "\r\n\r\n" : "",
+                  wire.sent.substr(std::max<std::size_t>(wire.sent.size(), 4) - 4));
+        EXPECT_EQ(std::string::npos, wire.sent.find("Envelope"));
+    }
 }
 
 TEST(Proxy, takes_endpoint_and_modes_and_is_a_copy_of_an_engine)

@@ -229,6 +229,51 @@ TEST(response_head, settles_the_framing_of_the_body)
     EXPECT_EQ(wire.input_mode & (MODE_IO_MASK | MODE_MIME), MODE_MIME);
 }
 
+TEST(response_head, names_the_encoding_where_neither_the_document_nor_the_host_does)
+{
+    const std::string LATIN = "<?xml version='1.0' encoding='ISO-8859-1'?>",
+                      UTF8 = "<?xml encoding=\"UTF-8\"?>";
+    static const char MULTIPART[] = "multipart/related; charset=iso-8859-1; boundary=b";
+    const std::string ROOT = "--b\r\nContent-Type: text/xml; charset=windows-1252\r\n\r\n";
+    const struct {
+        const char *type;
+        std::string before; // the envelope
+        const char *bytes, *read;
+        std::uint32_t mode = 0;
+    } cases[] = {
+        {"text/xml", "", "\xC3\xA9", "\xC3\xA9"},
+        {"text/xml; charset=utf-8", "", "\xC3\xA9", "\xC3\xA9"},
+        {"text/xml; charset=ISO-8859-1", "", "\xE9", "\xC3\xA9"},
+        {"text/xml;action=x;charset=\"windows-1252\"", "", "\x80", "\xE2\x82\xAC"},
+        {"text/xml; charset=ISO-8859-1", UTF8, "\xC3\xA9", "\xC3\xA9"},
+        {"text/xml; charset=utf-8", LATIN, "\xE9", "\xC3\xA9"},
+        {"text/xml; charset=ISO-8859-1", "\xEF\xBB\xBF", "\xC3\xA9", "\xC3\xA9"},
+        {"text/xml; charset=koi8-r", "", "x", "!47 'koi8-r'"},
+        {"text/xml; charset=koi8-r", UTF8, "\xC3\xA9", "\xC3\xA9"},
+        {"text/xml; charset=", "", "\xC3\xA9", "\xC3\xA9"},
+        {"text/xml; charset=utf-8", "", "\xE9", "\xC3\xA9", MODE_LATIN1},
+        {MULTIPART, "--b\r\n\r\n", "\xC3\xA9", "\xC3\xA9"},
+        {MULTIPART, ROOT, "\x80", "\xE2\x82\xAC"},
+        {MULTIPART, ROOT + LATIN, "\x80", "\xC2\x80"},
+    };
+    for (const auto &c : cases) {
+        read_wire wire("HTTP/1.1 200 OK\r\nContent-Type: " + std::string(c.type) + "\r\n\r\n" + c.before +
+                           "<E:Envelope xmlns:E='http://schemas.xmlsoap.org/soap/envelope/'><a>" + c.bytes +
+                           "</a>",
+                       c.mode | MODE_UTF_STRINGS);
+        ASSERT_EQ(wire.result, 0) << c.type;
+        std::string text;
+        char *place = nullptr;
+        if (soap_envelope_in_begin(&wire) == 0 &&
+            soap_string_element_in(&wire, "a", &place, nullptr, 4, 1, -1, -1) != nullptr)
+            text = place;
+        else
+            text = "!" + std::to_string(wire.error) + " " + text_of(*soap_fault_string_field(&wire));
+        EXPECT_NE(text.find(c.read + (*c.read == '!' ? 4 : 0)), std::string::npos) << c.type << ": " << text;
+        EXPECT_EQ(text.substr(0, 3), std::string(c.read).substr(0, 3)) << c.type;
+    }
+}
+
 TEST(response_head, decides_by_the_status)
 {
     static const struct {
