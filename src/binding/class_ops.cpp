@@ -52,11 +52,23 @@ void *class_instantiate(soap *ctx, const class_ops &ops, int count, const char *
 
 // --- writing ---
 
+namespace {
+
+bool is_empty_text(const class_ops &ops, const void *object)
+{
+    const std::string *const text = ops.text(const_cast<void *>(object));
+    return text && text->empty();
+}
+
+} // namespace
+
 int class_out(soap *ctx, const class_ops &ops, const void *object, const char *tag, int id, const char *type)
 {
     if (ops.write_attributes && ops.write_attributes(ctx, object))
         return ctx->error;
     const int element_id = soap_element_id(ctx, id, object, ops.type_id);
+    if ((ctx->mode & MODE_NULL_STRINGS) && is_empty_text(ops, object))
+        return soap_element_null(ctx, tag, element_id, ops.base ? ops.xml_type : type);
     if (soap_element_out_begin(ctx, tag, element_id, ops.base ? ops.xml_type : type))
         return ctx->error;
     if (ops.write_content(ctx, object, tag))

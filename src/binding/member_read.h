@@ -37,8 +37,9 @@ bool read_code_attribute(soap *ctx, const char *name, bool required, const enum_
 bool read_vector_item_text(soap *ctx, const char *tag, std::vector<std::string> &vector, int vector_type);
 bool read_vector_item_object(soap *ctx, const class_ops &ops, const char *tag, void *vector,
                              std::size_t index, int vector_type, void **object);
-bool read_vector_item_code(soap *ctx, const char *tag, std::int32_t *code, const enum_table &names,
-                           void *vector, std::size_t index, int vector_type);
+// `present` is set to false for a nil item, for which there is no code: the vector goes without it.
+bool read_vector_item_code(soap *ctx, const char *tag, std::int32_t *code, bool *present,
+                           const enum_table &names, void *vector, std::size_t index, int vector_type);
 bool copy_text(soap *ctx, std::string &target, const std::string &source);
 bool out_of_memory(soap *ctx); // error 20; false
 
@@ -86,8 +87,12 @@ template <class V> bool read_value(soap *ctx, const char *tag, std::vector<V> &m
         return vector_append<V>(&member, object) || out_of_memory(ctx);
     } else {
         std::int32_t code = 0;
-        if (!read_vector_item_code(ctx, tag, &code, enum_of<V>, &member, member.size(), vector_type))
+        bool present = true;
+        if (!read_vector_item_code(ctx, tag, &code, &present, enum_of<V>, &member, member.size(),
+                                   vector_type))
             return false;
+        if (!present)
+            return true;
         const V item = static_cast<V>(code);
         return vector_append<V>(&member, &item) || out_of_memory(ctx);
     }

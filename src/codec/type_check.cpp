@@ -8,6 +8,17 @@
 #include <zuv_client_pro/soap_primitive.h>
 #include <zuv_client_pro/soap_xml.h>
 
+bool type_says_nothing(soap *ctx)
+{
+    if (ctx->element_type[0] == '\0')
+        return false;
+    const int error_before = ctx->error;
+    const bool known = soap_tag_compare(ctx, ctx->element_type, "xsd:") == 0 ||
+                       soap_tag_compare(ctx, ctx->element_type, "SOAP-ENC:") == 0;
+    ctx->error = error_before;
+    return known;
+}
+
 int type_accept(soap *ctx, const char *type, const char *const *also)
 {
     const char *received = ctx->element_type;
