@@ -8,13 +8,17 @@
 #include <zuv_client_pro/soap_primitive.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "codec/namespace.h"
+
 bool type_says_nothing(soap *ctx)
 {
-    if (ctx->element_type[0] == '\0')
+    const char *const type = ctx->element_type;
+    if (*type == '\0')
         return false;
+    const std::size_t prefix = xml_prefix_of(type).size(); // 0: the default namespace
     const int error_before = ctx->error;
-    const bool known = soap_tag_compare(ctx, ctx->element_type, "xsd:") == 0 ||
-                       soap_tag_compare(ctx, ctx->element_type, "SOAP-ENC:") == 0;
+    const bool known = soap_prefix_compare(ctx, type, "xsd", prefix, 3) == 0 ||
+                       soap_prefix_compare(ctx, type, "SOAP-ENC", prefix, 8) == 0;
     ctx->error = error_before;
     return known;
 }

@@ -190,6 +190,10 @@ TEST_F(Binding, a_type_of_the_schema_or_the_encoding_tells_a_simple_value_nothin
                                 MODE_STRICT);
     ASSERT_NE(nullptr, preferences);
     EXPECT_EQ(protocol__ContactPreference::fax, preferences->contactPreference.at(0));
+    EXPECT_NE(nullptr,
+              read<protocol__Contact>("<c><protocol:contactPreference xsi:type=\"string\" xmlns=\"http://"
+                                      "www.w3.org/2001/XMLSchema\">fax</protocol:contactPreference></c>"))
+        << "by the default namespace";
     read<protocol__Contact>("<c><protocol:contactPreference xsi:type=\"xsd:string\">telegraph"
                             "</protocol:contactPreference></c>");
     EXPECT_EQ(SOAP_TYPE_MISMATCH, ctx.error) << "the text decides";
