@@ -214,6 +214,11 @@ void *read_members(soap *ctx, const class_ops &ops, const char *tag, void *objec
         return nullptr;
     if (!ctx->has_body || ctx->element_href[0])
         return read_by_reference(ctx, ops, tag, object);
+    return read_further_members(ctx, ops, tag, object);
+}
+
+void *read_further_members(soap *ctx, const class_ops &ops, const char *tag, void *object)
+{
     std::uint64_t spent = 0;
     if (!read_elements(ctx, *ops.members, object, spent) || soap_element_in_end(ctx, tag))
         return nullptr;

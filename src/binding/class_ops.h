@@ -86,6 +86,8 @@ bool independents_read(soap *ctx);
 
 // The content readers: elements, and text with attributes.
 void *read_members(soap *ctx, const class_ops &ops, const char *tag, void *object);
+// Goes on with the elements of an object behind a value that was refused and dropped.
+void *read_further_members(soap *ctx, const class_ops &ops, const char *tag, void *object);
 void *read_simple_content(soap *ctx, const class_ops &ops, const char *tag, void *object);
 
 // Pointer forms. The reader takes the element `tag`, nil and references included, and fills the place.

@@ -4,9 +4,13 @@
 
 #include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_identity.h>
 #include <zuv_client_pro/soap_io.h>
+#include <zuv_client_pro/soap_registry.h>
 #include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_xml.h>
+
+#include "binding/envelope.h"
 
 namespace {
 
@@ -51,6 +55,17 @@ int keep_error(soap *ctx, int error)
     return error;
 }
 
+// What stands behind the fault: it may refer to it.
+void read_rest_of_body(soap *ctx)
+{
+    const std::uint32_t level = ctx->nesting_level;
+    do {
+        int type = 0;
+        if (soap_read_element(ctx, &type) == nullptr && ctx->error == 0)
+            ctx->error = SOAP_TAG_MISMATCH; // nothing that could be read
+    } while (ctx->error == 0 || binding::drop_bad_value(ctx, level));
+}
+
 } // namespace
 
 int soap_fault_receive(soap *ctx, int check)
@@ -64,6 +79,8 @@ int soap_fault_receive(soap *ctx, int check)
             return ctx->error = 0;
         result = keep_error(ctx, result);
     } else {
+        read_rest_of_body(ctx);
+        soap_forward_resolve(ctx); // the code may be a reference, and its prefix is known up to the end
         result = error_of_fault(ctx);
         ctx->error = 0;
         if (soap_body_in_end(ctx) == 0)

@@ -37,18 +37,20 @@ void fill_link_chain(soap_id_record *record)
 }
 
 // Fills pointer places. An id without "#" stands for something outside the message: what waits for it stays
-// null.
+// null. So does what waits for an id that is missing, and all else is filled none the less.
 int fill_addresses(soap *ctx)
 {
-    return for_each_record(ctx, [ctx](soap_id_record *record) {
+    int error = SOAP_OK;
+    for_each_record(ctx, [ctx, &error](soap_id_record *record) {
         if (record->ptr != nullptr)
             fill_link_chain(record);
-        else if (record->id[0] == '#')
-            return id_failure(ctx, record->id + 1, SOAP_MISSING_ID);
         else
             clear_place_chain(&record->link);
+        if (record->ptr == nullptr && record->id[0] == '#' && error == SOAP_OK)
+            error = id_failure(ctx, record->id + 1, SOAP_MISSING_ID);
         return static_cast<int>(SOAP_OK);
     });
+    return error;
 }
 
 // --- forward records ---

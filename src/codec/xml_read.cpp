@@ -318,7 +318,7 @@ bool has_undeclared_type(const soap *ctx)
     ctx->error = soap_tag_compare(ctx, ctx->tag, tag);
     if (ctx->error != 0)
         return ctx->error;
-    ctx->peeked = 0;
+    // Refused tags stay held, so that nesting_level still tells where the reader is.
     if (type != nullptr && ctx->element_type[0] != '\0' &&
         soap_tag_compare(ctx, ctx->element_type, type) != 0)
         return ctx->error = SOAP_TYPE_MISMATCH;
@@ -328,7 +328,10 @@ bool has_undeclared_type(const soap *ctx)
         if (nil_allowed == 0 && ctx->null_flag != 0)
             return ctx->error = SOAP_NIL;
     }
-    return ctx->error = enter_element(ctx);
+    ctx->error = enter_element(ctx);
+    if (ctx->error == 0)
+        ctx->peeked = 0;
+    return ctx->error;
 }
 
 [[gnu::noinline]] int end_after_content(soap *ctx, const char *tag, bool any_name)

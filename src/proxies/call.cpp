@@ -13,6 +13,7 @@
 #include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "binding/envelope.h"
 #include "codec/attachment_list.h"
 
 namespace proxies {
@@ -45,10 +46,25 @@ int send_message(soap *ctx, const char *endpoint, const char *action, const oper
     return soap_send_finish(ctx);
 }
 
+// A value of the header is wrong. That must not hide a fault, which the Body may hold; what else it may hold
+// is not looked at.
+int look_for_fault(soap *ctx, std::uint32_t envelope_level)
+{
+    const int error = ctx->error;
+    const bool at_fault = error != SOAP_MUST_UNDERSTAND && binding::drop_bad_value(ctx, envelope_level) &&
+                          soap_body_in_begin(ctx) == 0 && soap_element_head_read(ctx) == 0 &&
+                          soap_tag_compare(ctx, ctx->tag, "SOAP-ENV:Fault") == 0;
+    ctx->error = error;
+    return at_fault ? soap_fault_receive(ctx, 1) : error;
+}
+
 int begin_response(soap *ctx)
 {
-    if (soap_receive_begin(ctx) || soap_envelope_in_begin(ctx) || soap_header_get(ctx))
+    if (soap_receive_begin(ctx) || soap_envelope_in_begin(ctx))
         return ctx->error;
+    const std::uint32_t level = ctx->nesting_level;
+    if (soap_header_get(ctx))
+        return ctx->message_part == PART_HEADER ? look_for_fault(ctx, level) : ctx->error;
     return soap_body_in_begin(ctx);
 }
 
