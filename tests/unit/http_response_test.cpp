@@ -213,6 +213,27 @@ TEST(response_head, takes_each_header_over)
         EXPECT_EQ(http_read_head(&wire), 0) << c.line;
         EXPECT_EQ(taken(wire), c.taken) << c.line;
         EXPECT_EQ(wire.status, 200);
+        soap_discard_all(&wire); // and with it the memory of all texts
+        for (const char *const text :
+             {wire.http_content, wire.action, static_cast<const char *>(wire.mime.boundary),
+              static_cast<const char *>(wire.mime.start), wire.auth_realm, wire.auth_user, wire.auth_password,
+              wire.forwarded_for})
+            EXPECT_EQ(text, nullptr) << c.line;
+    }
+}
+
+// What stands behind the buffer of their text stays as it was.
+TEST(request_head, cuts_credentials_at_the_end_of_their_buffer)
+{
+    for (const std::size_t groups : {340U, 341U, 342U, 2000U}) {
+        std::string value = "Basic dTpw"; // "u:p"
+        for (std::size_t i = 1; i < groups; ++i)
+            value += "cHBw";
+        memory_wire wire;
+        std::memset(wire.tag, 't', sizeof wire.tag);
+        EXPECT_EQ(http_parse_header(&wire, "Authorization", value.c_str()), 0);
+        EXPECT_EQ(text_of(wire.auth_password), std::string(std::min<std::size_t>(3 * groups, 1023) - 2, 'p'));
+        EXPECT_EQ(std::string(wire.tag, sizeof wire.tag), std::string(sizeof wire.tag, 't'));
     }
 }
 
