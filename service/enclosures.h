@@ -7,6 +7,8 @@
 
 #include <cstdint>
 #include <list>
+#include <memory>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -15,11 +17,12 @@
 
 #include "data_files.h"
 #include "settings.h"
+#include "transfer_encoding.h"
 
 namespace service {
 
-// An attachment that came with the request: in a file, or in memory if it stood ahead of the message or is
-// the value of an element.
+// An attachment that came with the request, out of its transfer encoding: in a file, or in memory if it stood
+// ahead of the message or is the value of an element.
 struct enclosed_data {
     arriving_file *file; // null: in memory
     const char *content;
@@ -35,17 +38,23 @@ public:
     // Forgets the exchange before; files that nobody has kept go.
     void expect_next();
     // Such files go now, since the request is refused.
-    void discard_arrived() { files_.clear(); }
+    void discard_arrived() { arrived_parts_.clear(); }
 
     // The form that a request's head tells (MODE_DIME, MODE_MIME), and the message itself (MODE_MTOM).
     void set_form(std::uint32_t form) { form_ = form; }
     void add_form(std::uint32_t form) { form_ |= form; }
     bool has_form() const { return form_ != 0; }
 
-    // The callbacks for what arrives, in the forms of DIME and MIME. `write` returns 0 or an HTTP status.
-    void *open(soap *ctx, const char *id);
-    int write(void *handle, const char *data, std::size_t length);
-    static void close(void *handle);
+    // The callbacks for what arrives, in the forms of DIME and MIME. `write` returns 0 or the code that ends
+    // the request, an HTTP status or one of the library's with a fault's text. `encoding` is a
+    // soap_mime_encoding.
+    void *open(soap *ctx, const char *id, int encoding);
+    int write(soap *ctx, void *handle, const char *data, std::size_t length);
+    static void close(soap *ctx, void *handle);
+    static bool is_in_file(const void *handle)
+    {
+        return static_cast<const arriving_part *>(handle)->file.has_value();
+    }
 
     // For what goes out: the handle if it is one of a file; the bytes of a value are left to the library.
     void *reopen(soap *ctx, void *handle);
@@ -70,6 +79,11 @@ public:
     const std::string &directory() const { return directory_; }
 
 private:
+    struct arriving_part {
+        std::unique_ptr<transfer_decoder> decoder; // null: the bytes stay as they are
+        std::optional<arriving_file> file;
+        std::string memory; // without a file; between calls only, with one
+    };
     struct outgoing {
         outgoing(const std::string &directory, const std::string &name)
             : id(name), bracketed_id("<" + name + ">"), file(directory, name)
@@ -78,13 +92,15 @@ private:
         kept_file file;
     };
 
+    static void end_decoding(soap *ctx, arriving_part &part);
+
     const settings &config_;
     std::string directory_;
     std::uint32_t form_ = 0;
     std::uint64_t arrived_bytes_ = 0;
     std::size_t arrived_ = 0; // attachments, in memory or in files
     bool too_large_ = false;
-    std::list<arriving_file> files_;
+    std::list<arriving_part> arrived_parts_;
     std::list<outgoing> outgoing_;
 };
 

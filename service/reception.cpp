@@ -9,6 +9,7 @@
 
 #include <openssl/crypto.h>
 
+#include <zuv_client_pro/soap_attachment.h>
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_tcp.h>
 
@@ -80,18 +81,20 @@ reception::reception(soap *ctx, const settings &config, session &lent)
 void reception::install_attachment_hooks(soap *ctx)
 {
     ctx->dime_write_open = [](soap *c, const char *id, const char *, const char *) {
-        return of(c).enclosures_.open(c, id);
+        return of(c).enclosures_.open(c, id, MIME_NONE);
     };
-    ctx->mime_write_open = [](soap *c, void *, const char *id, const char *, const char *, int) {
-        return of(c).enclosures_.open(c, id);
+    ctx->mime_write_open = [](soap *c, void *, const char *id, const char *, const char *, int encoding) {
+        return of(c).enclosures_.open(c, id, encoding);
     };
     ctx->dime_write = ctx->mime_write = [](soap *c, void *handle, const char *data, std::size_t length) {
         reception &self = of(c);
-        self.body_bytes_ -= std::min<std::uint64_t>(length, self.body_bytes_); // it stays in no memory
-        self.deadline_ += ATTACHED_BYTE_TIME * static_cast<long>(length);
-        return self.enclosures_.write(handle, data, length);
+        if (enclosures::is_in_file(handle)) {
+            self.body_bytes_ -= std::min<std::uint64_t>(length, self.body_bytes_); // it stays in no memory
+            self.deadline_ += ATTACHED_BYTE_TIME * static_cast<long>(length);
+        }
+        return self.enclosures_.write(c, handle, data, length);
     };
-    ctx->dime_write_close = ctx->mime_write_close = [](soap *, void *handle) { enclosures::close(handle); };
+    ctx->dime_write_close = ctx->mime_write_close = enclosures::close;
     ctx->dime_read_open =
         ctx->mime_read_open = [](soap *c, void *handle, const char *, const char *, const char *) {
             return of(c).enclosures_.reopen(c, handle);
