@@ -90,9 +90,7 @@ void xsd__base64Binary::soap_default(struct soap *ctx)
 
 void xsd__base64Binary::soap_serialize(struct soap *ctx) const
 {
-    if (content && (id || type))
-        attachment_value_mark(ctx, &content, id, type, options);
-    else
+    if (!attachment_value_mark(ctx, &content, id, type, options))
         soap_array_mark_pointer(ctx, content, &content, 1, BINARY_ID);
 }
 
