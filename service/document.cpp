@@ -35,12 +35,10 @@ document_codec::document_codec(std::uint64_t byte_limit, std::uint32_t depth_lim
     context_.on_recv = give_input;
 }
 
-// A request may refer to one object from many places, and a document written from it holds the object that
-// often. The limit keeps a small request from becoming a document of any size.
 int document_codec::take_output(soap *ctx, const char *data, std::size_t length)
 {
     auto *const self = static_cast<document_codec *>(ctx->user);
-    self->too_large_ = self->output_.size() + length > self->byte_limit_;
+    self->too_large_ = self->output_.size() + length > self->write_limit_;
     if (self->too_large_)
         return SOAP_LENGTH;
     try {
@@ -81,7 +79,7 @@ std::string document_codec::write_with(int (*put)(soap *ctx, const void *object)
         soap_send_begin(&context_) != SOAP_OK || put(&context_, object) != SOAP_OK || refers_beside() ||
         soap_send_finish(&context_) != SOAP_OK) {
         if (too_large_)
-            throw document_error("the document is too large", 0);
+            throw document_error("the document is too large", 0, write_limit_);
         fail(context_);
     }
     return std::exchange(output_, {});

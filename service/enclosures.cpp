@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <cstdio>
 #include <exception>
+#include <utility>
 
 #include <zuv_client_pro/soap_attachment.h>
 #include <zuv_client_pro/soap_error.h>
@@ -14,6 +15,7 @@ namespace {
 
 constexpr int TOO_LARGE = 413, INTERNAL_ERROR = 500;
 constexpr std::size_t ATTACHMENTS_MAX = 1000; // of one request
+constexpr std::size_t ENCLOSED_MAX = 100;     // of one answer: each is an open file until it is sent
 constexpr std::size_t VALUES_MAX =
     64; // elements that wait for their bytes; beyond, all attachments go to memory
 constexpr char MEDIA_TYPE[] = "application/octet-stream";
@@ -43,7 +45,15 @@ void enclosures::expect_next()
     arrived_ = 0;
     too_large_ = false;
     files_.clear();
+    kept_.clear();
     outgoing_.clear();
+}
+
+void enclosures::discard_arrived()
+{
+    files_.clear();
+    for (const std::string &name : std::exchange(kept_, {}))
+        remove_data(directory_, name);
 }
 
 // ---------------------------------------------------------------------------------------------
@@ -110,6 +120,7 @@ bool enclosures::find(soap *ctx, const std::string &reference, enclosed_data &fo
 
 void enclosures::keep(const enclosed_data &data, std::string_view name)
 {
+    kept_.emplace_back(name);
     if (data.file != nullptr) {
         data.file->keep_as(name);
         return;
@@ -122,10 +133,15 @@ void enclosures::keep(const enclosed_data &data, std::string_view name)
 // ---------------------------------------------------------------------------------------------
 // Out.
 
-void enclosures::enclose(const std::string &name)
+bool enclosures::enclose(const std::string &name)
 {
-    if (has_form())
-        outgoing_.emplace_back(directory_, name);
+    const auto has_name = [&](const outgoing &o) { return o.id == name; };
+    if (std::any_of(outgoing_.begin(), outgoing_.end(), has_name))
+        return true;
+    if (!has_form() || outgoing_.size() == ENCLOSED_MAX)
+        return false;
+    outgoing_.emplace_back(directory_, name);
+    return true;
 }
 
 void *enclosures::reopen(void *handle)

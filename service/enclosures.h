@@ -10,6 +10,7 @@
 #include <string>
 #include <string_view>
 #include <utility>
+#include <vector>
 
 #include <zuv_client_pro/soap.h>
 
@@ -34,8 +35,10 @@ public:
 
     // Forgets the exchange before; files that nobody has kept go.
     void expect_next();
-    // Such files go now, since the request is refused.
-    void discard_arrived() { files_.clear(); }
+    // Such files go now, and those that were kept meanwhile, since the request is refused.
+    void discard_arrived();
+    // What was kept stays: what refers to it is on the disk.
+    void confirm_kept() { kept_.clear(); }
 
     // The form that a request's head tells (MODE_DIME, MODE_MIME), and the message itself (MODE_MTOM).
     void set_form(std::uint32_t form) { form_ = form; }
@@ -59,8 +62,9 @@ public:
     // Keeps it under a name.
     void keep(const enclosed_data &data, std::string_view name);
 
-    // A kept file goes with the answer, under the id of its name. Nothing happens for a request without form.
-    void enclose(const std::string &name);
+    // A kept file goes with the answer, once, under the id of its name. False for a request without form, and
+    // if too many files go already.
+    bool enclose(const std::string &name);
 
     // The modes of the answer, 0 without enclosures; adds the files to a message about to be counted. 0
     // or 20.
@@ -85,6 +89,7 @@ private:
     std::size_t arrived_ = 0; // attachments, in memory or in files
     bool too_large_ = false;
     std::list<arriving_file> files_;
+    std::vector<std::string> kept_; // names
     std::list<outgoing> outgoing_;
 };
 

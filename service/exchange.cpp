@@ -204,13 +204,13 @@ void answer_failure(soap *ctx, const char *what)
 }
 
 // A document that can't be kept: too large, or nested without end.
-[[noreturn]] void refuse_document(soap *ctx, const document_error &error, std::uint64_t limit)
+[[noreturn]] void refuse_document(soap *ctx, const document_error &error)
 {
     if (error.error != 0)
         refuse<protocol__Client_x002eInvalidInformation>(ctx, error.what());
     auto *const fault =
         make_fault<protocol__Server_x002eDataTooLarge>(ctx, "The document is larger than the service keeps.");
-    fault->maxSize = make_text(ctx, std::to_string(limit));
+    fault->maxSize = make_text(ctx, std::to_string(error.limit));
     refuse(fault);
 }
 
@@ -218,12 +218,21 @@ const void *run(soap *ctx, const request &asked, reception &received)
 {
     const protocol__Header *const header = header_of(ctx);
     check_credentials(ctx, header);
-    call c{ctx,    received.lent().documents, received.lent().codec, received.config(),
-           header, received.root(),           received.enclosed()};
+    session &lent = received.lent();
+    call c{ctx,
+           lent.documents,
+           lent.codec,
+           received.config(),
+           header,
+           received.root(),
+           received.enclosed(),
+           lent.judged,
+           received.message_bytes(),
+           {{ctx}}};
     try {
         return asked.op->run(c, asked.object);
     } catch (const document_error &error) {
-        refuse_document(ctx, error, received.config().body_limit);
+        refuse_document(ctx, error);
     }
 }
 
@@ -262,6 +271,7 @@ void serve(soap *ctx, reception &received)
         received.enclosed().discard_arrived();
         answer_unreadable(ctx, received);
     } catch (const std::exception &failure) {
+        received.enclosed().discard_arrived();
         answer_failure(ctx, failure.what());
     }
 }
@@ -278,6 +288,7 @@ bool serve_exchange(soap *ctx, reception &received)
         ctx->keep_alive = 0;
     }
     received.lent().codec.forget();
+    received.lent().judged.forget();
     received.enclosed().expect_next();
     if (!received.started() || (ctx->error != SOAP_OK && ctx->error != SOAP_STOP))
         ctx->keep_alive = 0;

@@ -14,6 +14,7 @@
 
 #include "enclosures.h"
 #include "port.h"
+#include "request_target.h"
 #include "session.h"
 #include "settings.h"
 
@@ -35,9 +36,10 @@ public:
     bool started() const { return started_; } // some byte has arrived
     bool too_large() const { return body_bytes_ > body_limit() || enclosures_.too_large(); }
     bool too_slow() const { return too_slow_; }
-    const port *target() const { return target_; } // null if no head was read, or none of a call
-    std::string_view data_name() const;            // below the path of data; empty for another path
-    const std::string &root() const { return root_; }
+    std::uint64_t message_bytes() const { return body_bytes_; } // that came and belong to no file
+    const port *target() const { return target_; }              // null if no head was read, or none of a call
+    std::string_view data_name() const; // below the path of data; empty for another path
+    const std::string &root() const { return where_.root; }
     enclosures &enclosed() { return enclosures_; }
 
 private:
@@ -70,7 +72,7 @@ private:
     std::uint64_t body_bytes_ = 0;
     std::chrono::steady_clock::time_point deadline_;
     const port *target_ = nullptr;
-    std::string root_, path_;
+    request_target where_;
     enclosures enclosures_;
 };
 

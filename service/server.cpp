@@ -6,7 +6,6 @@
 #include <cstdio>
 #include <stdexcept>
 
-#include <netinet/in.h>
 #include <sys/socket.h>
 
 #include <zuv_client_pro/soap_error.h>
@@ -15,6 +14,7 @@
 
 #include "connection.h"
 #include "data_files.h"
+#include "request_target.h"
 
 namespace service {
 
@@ -37,17 +37,6 @@ std::string error_text(soap *ctx)
     return soap_fault_print_text(ctx, text, sizeof text);
 }
 
-int bound_port(int socket)
-{
-    sockaddr_storage address{};
-    socklen_t length = sizeof address;
-    if (getsockname(socket, reinterpret_cast<sockaddr *>(&address), &length) != 0)
-        throw std::runtime_error("cannot tell the port");
-    if (address.ss_family == AF_INET6)
-        return ntohs(reinterpret_cast<const sockaddr_in6 &>(address).sin6_port);
-    return ntohs(reinterpret_cast<const sockaddr_in &>(address).sin_port);
-}
-
 } // namespace
 
 server::server(const settings &config, database &place)
@@ -67,7 +56,7 @@ server::server(const settings &config, database &place)
     }
     if (soap_bind(&master_, config.host.c_str(), config.port, BACKLOG) < 0)
         throw std::runtime_error(error_text(&master_));
-    port_ = bound_port(master_.master_socket);
+    port_ = port_of(master_.master_socket);
 }
 
 server::~server()

@@ -1,4 +1,5 @@
 // attachments_test.cpp - data that travels beside the messages: kept as files, given back, forgotten.
+#include <algorithm>
 #include <filesystem>
 #include <fstream>
 #include <string>
@@ -77,6 +78,15 @@ std::size_t files_in(const std::string &directory)
     return static_cast<std::size_t>(std::distance(begin(all), end(all)));
 }
 
+// What nobody wanted is gone only after the answer.
+std::size_t kept_in(const std::string &directory)
+{
+    const std::filesystem::directory_iterator all(directory);
+    return static_cast<std::size_t>(std::count_if(begin(all), end(all), [](const auto &entry) {
+        return !entry.path().filename().string().starts_with("arriving-");
+    }));
+}
+
 std::string contents(const std::filesystem::path &path)
 {
     std::ifstream file(path, std::ios::binary);
@@ -95,11 +105,16 @@ std::string mime_post(const char *port, const std::string &message, const std::v
                            "multipart/related; boundary=edge; type=\"text/xml\"; start=\"<root>\"");
 }
 
-// A problem report, and a request to add to one; each with an attachment that refers to data.
-std::string report_with(const std::string &reference)
+// A problem report, and a request to add to one; each with an attachment that refers to data, or with
+// several.
+std::string report_with(const std::string &reference, int count = 1)
 {
-    return "<protocolProblemReport:submitRequest><protocol:attachment><protocol:dataHandler>" + reference +
-           "</protocol:dataHandler></protocol:attachment></protocolProblemReport:submitRequest>";
+    std::string report = "<protocolProblemReport:submitRequest>";
+    for (int i = 0; i < count; ++i)
+        report += "<protocol:attachment><protocol:dataHandler>" + reference +
+                  (count > 1 && reference.back() == '-' ? std::to_string(i) : "") +
+                  "</protocol:dataHandler></protocol:attachment>";
+    return report + "</protocolProblemReport:submitRequest>";
 }
 
 std::string addition_of(const std::string &reference)
@@ -231,6 +246,9 @@ TEST(Attachments, LeaveNothingWhenTheRequestIsRefused)
          mime_post("ProblemReport", message, {"data|" + some_bytes(60000), "x|" + some_bytes(60000)}), 413},
         {"too many", mime_post("ProblemReport", message, crowd), 413},
         {"two of one id", mime_post("ProblemReport", message, {"data|1", "data|2"}), 400},
+        {"nothing has the second id",
+         mime_post("ProblemReport", soap11(report_with("cid:data-", 2)), {"data-0|" + some_bytes(50000)}),
+         500},
         {"a document that is too long",
          mime_post("ProblemReport",
                    soap11("<protocolProblemReport:submitRequest><protocolProblemReport:title>" +
@@ -253,6 +271,43 @@ TEST(Attachments, LeaveNothingWhenTheRequestIsRefused)
     }
     EXPECT_EQ(exchange(service.port(), whole).status, 200) << "the limits are those of refused ones";
     EXPECT_EQ(files_in(directory), 1u);
+}
+
+// Many references to one thing are no many things, and many things are no many open files.
+TEST(Attachments, AreKeptAndSentOnce)
+{
+    scratch_directory place;
+    service_process service({"--database", place.file("documents.db")});
+    const std::string directory = place.file("documents.db-data");
+    std::vector<std::string> parts;
+    for (int i = 0; i < 120; ++i)
+        parts.push_back("part-" + std::to_string(i) + "|x");
+    const struct {
+        const char *what, *reference;
+        int count, status;
+        std::size_t kept, sent; // files, and parts of the answer to get
+    } rows[] = {
+        {"one part, again and again", "cid:part-7", 120, 200, 1, 1},
+        {"as many parts as an answer may hold, and more", "cid:part-", 120, 200, 120, 100},
+        {"too many references", "cid:part-7", 1001, 500, 0, 0},
+    };
+    for (const auto &r : rows) {
+        const std::size_t before = kept_in(directory);
+        raw_answer answer = exchange(
+            service.port(), mime_post("ProblemReport", soap11(report_with(r.reference, r.count)), parts));
+        ASSERT_EQ(answer.status, r.status) << r.what << answer.body;
+        EXPECT_EQ(kept_in(directory) - before, r.kept) << r.what;
+        const std::string uri = element_text(answer.body, "thisURI");
+        answer =
+            exchange(service.port(), mime_post("ProblemReport",
+                                               soap11("<protocolProblemReport:getRequest/>",
+                                                      "<protocol:targetURI>" + uri + "</protocol:targetURI>"),
+                                               {}));
+        std::size_t sent = 0;
+        for (std::size_t at = 0; (at = answer.body.find("\r\n\r\nx\r\n--", at)) != std::string::npos; ++at)
+            ++sent;
+        EXPECT_EQ(sent, r.sent) << r.what;
+    }
 }
 
 TEST(Attachments, OutliveTheProcessThatKeptThem)

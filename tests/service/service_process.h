@@ -35,6 +35,7 @@ public:
     int port() const { return port_; } // 0: it did not start
     std::string url(const char *port_name) const;
     bool running();
+    long peak_memory() const; // kilobytes that it held at most so far
 
     // Ends it in an orderly way. Its exit status, or minus the signal that ended it.
     int stop();
