@@ -6,7 +6,8 @@
 // descriptors of 1024 and over are refused with error 46. Sockets that the library makes are closed on exec,
 // and writing to one whose peer is gone raises no SIGPIPE. A failure that names error 28 has filled the fault
 // record: its text is that of tcp_error_text, "Timeout" or the resolver's, its detail says what failed.
-// Descriptors are closed through on_close_socket, exactly once.
+// Descriptors are closed through on_close_socket, exactly once. A connection belongs to the process that
+// opened it for a call: a child of that process closes its own descriptor alone, without a word to the peer.
 #pragma once
 
 #include <zuv_client_pro/soap.h>
@@ -47,9 +48,7 @@ ZUV_API int tcp_send(soap *ctx, const char *data, std::size_t length);
 ZUV_API std::size_t tcp_recv(soap *ctx, char *buffer, std::size_t length);
 
 // Closes the TLS layer, whose session is kept for the next connection to the same host and port, and the
-// socket (default of on_close). A UDP socket stays open. What a parent process connected is its connection:
-// a child closes its own descriptor alone, and says nothing on it. Returns 0, or 30 if TLS did not close
-// properly.
+// socket (default of on_close). A UDP socket stays open. Returns 0, or 30 if TLS did not close properly.
 ZUV_API int tcp_disconnect(soap *ctx);
 
 // Asks whether a kept connection may carry another call (default of on_poll): 0 if it may. Otherwise -1, or

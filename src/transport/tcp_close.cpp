@@ -2,6 +2,8 @@
 //
 // Elsewhere: closing TLS (tls_session.cpp).
 #include <cerrno>
+#include <cstdint>
+#include <pthread.h>
 #include <unistd.h>
 
 #include <zlib.h>
@@ -58,7 +60,28 @@ int peek_master(soap *ctx)
     return ready < 0 && ctx->errno_value != EINTR ? fail_peek(ctx) : -1;
 }
 
+std::uint16_t process = 1;
+
+void note_fork()
+{
+    process = process == UINT16_MAX ? 1 : static_cast<std::uint16_t>(process + 1);
+}
+
 } // namespace
+
+// Counted by forks and not asked of the system, which would be a call for each use of a kept connection.
+// Forks before the first connection don't matter, so they go uncounted.
+std::uint16_t tcp_process()
+{
+    static const int counting = pthread_atfork(nullptr, nullptr, note_fork);
+    static_cast<void>(counting); // with no memory for the hook a fork goes unnoticed, as it would without it
+    return process;
+}
+
+bool tcp_inherited(const soap *ctx)
+{
+    return ctx->opened_by != 0 && ctx->opened_by != process;
+}
 
 int tcp_disconnect(soap *ctx)
 {

@@ -5,11 +5,9 @@
 #include "transport/tcp_socket.h"
 
 #include <cerrno>
-#include <cstdint>
 #include <cstdio>
 #include <cstring>
 #include <fcntl.h>
-#include <pthread.h>
 #include <sys/select.h>
 #include <unistd.h>
 
@@ -50,28 +48,7 @@ private:
     fd_set set_;
 };
 
-std::uint16_t process = 1;
-
-void note_fork()
-{
-    process = process == UINT16_MAX ? 1 : static_cast<std::uint16_t>(process + 1);
-}
-
 } // namespace
-
-// Counted by forks and not asked of the system, which would be a call for each use of a kept connection.
-// Forks before the first connection don't matter, so they go uncounted.
-std::uint16_t tcp_process()
-{
-    static const int counting = pthread_atfork(nullptr, nullptr, note_fork);
-    static_cast<void>(counting); // with no memory for the hook a fork goes unnoticed, as it would without it
-    return process;
-}
-
-bool tcp_inherited(const soap *ctx)
-{
-    return ctx->opened_by != 0 && ctx->opened_by != process;
-}
 
 int tcp_wait(soap *ctx, int socket, int flags, int timeout)
 {
