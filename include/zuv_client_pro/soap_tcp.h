@@ -6,8 +6,7 @@
 // descriptors of 1024 and over are refused with error 46. Sockets that the library makes are closed on exec,
 // and writing to one whose peer is gone raises no SIGPIPE. A failure that names error 28 has filled the fault
 // record: its text is that of tcp_error_text, "Timeout" or the resolver's, its detail says what failed.
-// Descriptors are closed through on_close_socket, exactly once. A connection belongs to the process that
-// opened it for a call: a child of that process closes its own descriptor alone, without a word to the peer.
+// Descriptors are closed through on_close_socket, exactly once.
 #pragma once
 
 #include <zuv_client_pro/soap.h>
@@ -53,7 +52,8 @@ ZUV_API int tcp_disconnect(soap *ctx);
 
 // Asks whether a kept connection may carry another call (default of on_poll): 0 if it may. Otherwise -1, or
 // 28 with a fault if it can't be asked. Bytes that nobody asked for make a connection unusable, and so does a
-// fork since it was made. Never blocks.
+// fork since it was opened for a call: it stays the parent's, and the child's tcp_disconnect closes the
+// child's descriptor alone, without a word to the peer. Never blocks.
 ZUV_API int tcp_peek(soap *ctx);
 
 // Ends a transaction: closes the connection (on_close) after an end of input, a network or TLS failure, a
