@@ -43,6 +43,7 @@ const port &port_of(const operation &op)
 // An address with the port's usual path where it has none.
 std::string full_address(const std::string &address, const port &of)
 {
+    refuse_user(address);
     const std::size_t scheme = address.find("://");
     if ((!address.starts_with("http://") && !address.starts_with("https://")) ||
         address.find_first_of(" \t\r\n") != std::string::npos)

@@ -36,6 +36,8 @@ int call(soap *ctx, const char *endpoints, const char *action, const message_par
     *response = nullptr;
     ctx->encoding_style = nullptr;
     soap_reset_call(ctx);
+    if (soap_endpoint_check(ctx, endpoints))
+        return ctx->error;
     soap_mark_header(ctx);
     parts.mark(ctx, request);
     if (count_message(ctx, parts, request))

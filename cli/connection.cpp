@@ -105,6 +105,15 @@ void connection::renew(soap *ctx) const
     ctx->auth_password = options_.user.empty() ? nullptr : password_.c_str();
 }
 
+void refuse_user(const std::string &address)
+{
+    const std::size_t scheme = address.find("://");
+    const std::size_t start = scheme == std::string::npos ? 0 : scheme + 3;
+    if (address.find('@', start) < address.find('/', start))
+        throw failure(EXIT_USAGE, "an address has no user: give one by --user, and the password by "
+                                  "--password-file or ZUV_PASSWORD");
+}
+
 void prepare_message(soap *ctx, const message_options &options, std::vector<soap_namespace> &rows)
 {
     const std::uint32_t mode = MODE_UTF_STRINGS | (options.keep_alive ? MODE_KEEP_ALIVE : 0);

@@ -32,6 +32,9 @@ private:
     int proxy_port_ = 0;
 };
 
+// Throws a failure for an address that names a user, whose password nobody should read on.
+void refuse_user(const std::string &address);
+
 // The modes of a message. `rows` takes the namespaces of SOAP 1.2, which the context borrows.
 void prepare_message(soap *ctx, const message_options &options, std::vector<soap_namespace> &rows);
 

@@ -35,6 +35,7 @@ public:
     explicit transfer(const data_options &options)
         : options_(options), connection_(options.connection), context_(std::make_unique<soap>(MODE_BUFFERED))
     {
+        refuse_user(options.address);
         if (!options.address.starts_with("http://") && !options.address.starts_with("https://"))
             throw failure(EXIT_USAGE,
                           "http://... or https://... is wanted, not \"" + printable(options.address) + "\"");
@@ -82,7 +83,7 @@ private:
     {
         soap *const ctx = context_.get();
         soap_reset_call(ctx);
-        if (soap_count_begin(ctx) != SOAP_OK)
+        if (soap_endpoint_check(ctx, options_.address.c_str()) != SOAP_OK || soap_count_begin(ctx) != SOAP_OK)
             return ctx->error;
         ctx->message_count = size;
         if (soap_count_end(ctx) != SOAP_OK)

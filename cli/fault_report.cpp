@@ -168,7 +168,7 @@ std::string fault_report(soap *ctx, const std::string &what, const std::string &
         advice = words_of(EXIT_FAULT).advice;
     lines.add("who", words_of(kind).who);
     lines.add("where", printable(where));
-    if (kind == EXIT_HTTP && ctx->error < 400 && ctx->endpoint[0] != '\0')
+    if (kind == EXIT_HTTP && ctx->error < 400 && ctx->error == ctx->status && ctx->endpoint[0] != '\0')
         lines.add("moved to", printable(ctx->endpoint));
     for (const typed_fault &fault : faults)
         lines.add_all("detail", detail_lines(fault));

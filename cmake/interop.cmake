@@ -17,6 +17,7 @@ function(zuv_add_interop name)
     set_tests_properties(interop_${name} PROPERTIES LABELS interop TIMEOUT 300)
 endfunction()
 zuv_add_interop(zeep_ports $<TARGET_FILE:zuv-service>)
+zuv_add_interop(contract_handed_out $<TARGET_FILE:zuv-service>)
 zuv_add_interop(client_ports $<TARGET_FILE:zuv> $<TARGET_FILE:care_host> $<TARGET_FILE:problem_report_host>
     $<TARGET_FILE:zuv-service> ${NPM_SERVICE})
 zuv_add_interop(nginx_profile $<TARGET_FILE:zuv> $<TARGET_FILE:zuv-service> ${NPM_SERVICE})

@@ -89,6 +89,7 @@ void one_context_for_each_thread()
     for (int i = 0; i < 4; ++i)
         threads.emplace_back([&settings] {
             ProfileSoapBindingProxy proxy(settings); // modes, limits, callbacks, TLS as in `settings`
+            proxy.endpoint = endpoint;               // but neither its endpoint nor its connection
             protocolProfile__ProfileContent profile;
             __protocolProfile__createResponse created;
             expect(proxy.create(&profile, created) == 0, "every thread's call is answered");

@@ -32,8 +32,10 @@ bare_root() {
     if [ ! -f "$archive" ]; then
         rm -rf --one-file-system "$root"
         eval "$(apt-config shell proxy Acquire::http::Proxy)"
-        http_proxy=${http_proxy:-$proxy} debootstrap --variant=minbase ${*:+--include="$(IFS=,; echo "$*")"} bookworm "$root" \
-            "$(bare_root_mirror)" >"$archive.log" 2>&1 || { tail -20 "$archive.log" >&2; return 1; }
+        # What it mounts is seen by nobody else and goes with it, and it goes with us.
+        http_proxy=${http_proxy:-$proxy} setpriv --pdeathsig KILL unshare --mount debootstrap --variant=minbase \
+            ${*:+--include="$(IFS=,; echo "$*")"} bookworm "$root" "$(bare_root_mirror)" >"$archive.log" 2>&1 ||
+            { tail -20 "$archive.log" >&2; return 1; }
         # The way of this machine to its mirror, and whom it trusts.
         apt-config dump Acquire::http Acquire::https | grep '::' >"$root/etc/apt/apt.conf.d/90machine" || true
         if [ -d "$root/usr/share/ca-certificates" ] && [ -d /usr/local/share/ca-certificates ]; then

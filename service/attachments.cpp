@@ -2,6 +2,7 @@
 #include "attachments.h"
 
 #include <algorithm>
+#include <map>
 #include <set>
 
 #include <zuv_client_pro/protocolHTTP.h>
@@ -16,7 +17,8 @@ namespace {
 
 using state = protocol__AttachmentState;
 
-constexpr double ALL = 100; // per cent
+constexpr double ALL = 100;                  // per cent
+constexpr std::size_t REFERENCES_MAX = 1000; // attachments of one request that refer to data beside it
 
 template <class T> bool admits(const std::vector<T> &wanted, std::initializer_list<T> offered)
 {
@@ -71,13 +73,19 @@ std::string name_of(const std::string *reference)
     return text.starts_with(SCHEME) ? text.substr(SCHEME.size()) : std::string();
 }
 
+// Attachments of a request may refer to each other: in a ring, in chains of any length, or from many places.
+// Each is used once.
 template <class Use> void each_attachment(const attachments &list, const Use &use)
 {
-    for (protocol__Attachment *attachment : list) {
-        if (attachment == nullptr)
+    std::set<const protocol__Attachment *> used;
+    attachments waiting(list.rbegin(), list.rend());
+    while (!waiting.empty()) {
+        protocol__Attachment *const next = waiting.back();
+        waiting.pop_back();
+        if (next == nullptr || !used.insert(next).second)
             continue;
-        use(*attachment);
-        each_attachment(attachment->attachment, use);
+        use(*next);
+        waiting.insert(waiting.end(), next->attachment.rbegin(), next->attachment.rend());
     }
 }
 
@@ -99,21 +107,31 @@ std::set<std::string> names_in(const attachments &list)
     return names;
 }
 
-// Keeps data that came beside the message, and lets the attachment refer to it.
-void keep_reference(call &c, protocol__Attachment &attachment)
+struct kept_data {
+    std::string name;
+    std::uint64_t size;
+};
+
+// Keeps data that came beside the message under a fresh name.
+kept_data keep_enclosed(call &c, const std::string &reference)
 {
     enclosed_data data{};
-    if (!c.beside.find(c.ctx, *attachment.dataHandler, data))
+    if (!c.beside.find(c.ctx, reference, data))
         refuse<protocol__Client_x002eInvalidInformation>(
-            c.ctx, "Nothing came with the message under the reference " + *attachment.dataHandler + ".");
-    const std::string name = fresh_uuid();
-    c.documents.expect_data(name);
-    c.documents.note_data(name, data.size);
-    c.beside.keep(data, name);
-    attachment.dataHandler = make_text(c.ctx, std::string(SCHEME) + name);
-    attachment.size = make_text(c.ctx, std::to_string(data.size));
+            c.ctx, "Nothing came with the message under the reference " + reference + ".");
+    kept_data kept{fresh_uuid(), data.size};
+    c.documents.expect_data(kept.name);
+    c.documents.note_data(kept.name, data.size);
+    c.beside.keep(data, kept.name);
+    return kept;
+}
+
+void refer_to(call &c, protocol__Attachment &attachment, const kept_data &kept)
+{
+    attachment.dataHandler = make_text(c.ctx, std::string(SCHEME) + kept.name);
+    attachment.size = make_text(c.ctx, std::to_string(kept.size));
     attachment.state = make_value(c.ctx, state::complete);
-    attachment.dataPort = {make_data_port(c, protocol__Direction::out, name)};
+    attachment.dataPort = {make_data_port(c, protocol__Direction::out, kept.name)};
     attachment.dataPort.front()->attachmentURI = attachment.thisURI;
 }
 
@@ -170,13 +188,18 @@ protocol__DataPort *make_data_port(const call &c, protocol__Direction direction,
     return port;
 }
 
+bool serves(const call &c, const protocol__DataPortPreference *wish, protocol__Direction direction)
+{
+    return wish == nullptr || (admits_uri(wish->dataURIType) &&
+                               admits(wish->direction, {direction, protocol__Direction::inout}) &&
+                               admits(wish->transport, {protocol__Transport::HTTP}) &&
+                               admits(wish->authentication, {authentication_of(c)}));
+}
+
 protocol__Client_x002eDataPortIncompatibility *
 incompatibility(const call &c, const protocol__DataPortPreference *wish, protocol__Direction direction)
 {
-    if (wish == nullptr ||
-        (admits_uri(wish->dataURIType) && admits(wish->direction, {direction, protocol__Direction::inout}) &&
-         admits(wish->transport, {protocol__Transport::HTTP}) &&
-         admits(wish->authentication, {authentication_of(c)})))
+    if (serves(c, wish, direction))
         return nullptr;
     auto *const fault = make_fault<protocol__Client_x002eDataPortIncompatibility>(
         c.ctx, "The service has no data port of the kind preferred.");
@@ -225,10 +248,20 @@ protocol__Attachment &find_attachment(call &c, const attachments &held,
 void take_references(call &c, attachments &given, const attachments *held)
 {
     const std::set<std::string> known = held == nullptr ? std::set<std::string>() : names_in(*held);
+    std::map<std::string, kept_data> kept; // by reference: data is kept once, however many refer to it
+    std::size_t references = 0;
     each_attachment(given, [&](protocol__Attachment &attachment) {
         put_values_in_place(attachment);
-        if (attachment.dataHandler != nullptr && known.count(name_of(attachment.dataHandler)) == 0)
-            keep_reference(c, attachment);
+        if (attachment.dataHandler == nullptr || known.count(name_of(attachment.dataHandler)) != 0)
+            return;
+        if (++references > REFERENCES_MAX)
+            refuse<protocol__Client_x002eInvalidInformation>(
+                c.ctx, "Too many attachments of the request refer to data beside it.");
+        const std::string &reference = *attachment.dataHandler;
+        auto place = kept.find(reference);
+        if (place == kept.end())
+            place = kept.emplace(reference, keep_enclosed(c, reference)).first;
+        refer_to(c, attachment, place->second);
     });
 }
 
@@ -237,9 +270,9 @@ void settle_references(call &c, attachments &answered,
 {
     each_attachment(answered, [&](protocol__Attachment &attachment) {
         const std::string name = name_of(attachment.dataHandler);
-        if (!name.empty() && c.beside.has_form() && goes(attachment) && c.documents.data_size(name))
-            c.beside.enclose(name);
-        else
+        const bool enclosed = !name.empty() && c.beside.has_form() && goes(attachment) &&
+                              c.documents.data_size(name) && c.beside.enclose(name);
+        if (!enclosed)
             attachment.dataHandler = nullptr;
     });
 }

@@ -22,8 +22,9 @@ constexpr std::string_view UPDATE_DATA = "update/"; // names of the data of upda
 // An open data port for a name below DATA_PATH.
 protocol__DataPort *make_data_port(const call &c, protocol__Direction direction, const std::string &name);
 
-// Null if the service can serve the wish with a data port of the direction; otherwise a fault that says what
-// it has.
+// True if the service can serve the wish with a data port of the direction. Otherwise `incompatibility` makes
+// the fault that says what it has; null if it can.
+bool serves(const call &c, const protocol__DataPortPreference *wish, protocol__Direction direction);
 protocol__Client_x002eDataPortIncompatibility *
 incompatibility(const call &c, const protocol__DataPortPreference *wish, protocol__Direction direction);
 

@@ -12,9 +12,10 @@ namespace {
 using request = protocolUpdateOrder__AuthenticateRequest;
 using response = protocolUpdateOrder__AuthenticateResponse;
 
-// Requests may refer to each other: nested ones may be more than there are in the message, or without end.
+// Requests may refer to each other: nested ones may be more than there are in the message, or without end,
+// and their answers name the same user again and again.
 constexpr unsigned DEPTH_MAX = 100;
-constexpr unsigned REQUESTS_MAX = 10000;
+constexpr std::uint64_t ANSWER_BYTES = 1000; // of one nested answer, the user's name left out
 
 bool same_secret(const std::string &given, const std::string &expected)
 {
@@ -60,10 +61,14 @@ protocol__Credentials *without_secret(call &c, const protocol__Credentials *give
     return told;
 }
 
-response *answer(call &c, const request &asked, unsigned depth, unsigned &left)
+// `left`: bytes that the answers may still come to.
+response *answer(call &c, const request &asked, unsigned depth, std::uint64_t &left)
 {
-    if (depth > DEPTH_MAX || left-- == 0)
+    const std::uint64_t bytes =
+        ANSWER_BYTES + (asked.credentials == nullptr ? 0 : text_of(asked.credentials->username).size());
+    if (depth > DEPTH_MAX || bytes > left)
         refuse<protocol__Client_x002eInvalidRequest>(c.ctx, "The request nests too many requests.");
+    left -= bytes;
     auto *const made = make<response>(c.ctx);
     protocol__Fault *const fault = fault_with(c, asked.credentials);
     made->success = fault == nullptr;
@@ -80,7 +85,7 @@ response *answer(call &c, const request &asked, unsigned depth, unsigned &left)
 
 response *authenticate(call &c, request &asked)
 {
-    unsigned left = REQUESTS_MAX;
+    std::uint64_t left = grown(c.bytes);
     return answer(c, asked, 0, left);
 }
 

@@ -3,7 +3,9 @@
 
 #include <algorithm>
 #include <cctype>
+#include <cstring>
 #include <string>
+#include <utility>
 
 namespace service {
 
@@ -33,27 +35,54 @@ int compare_numbers(std::string_view one, std::string_view other)
     return one.compare(other);
 }
 
+bool is_ascii(char c)
+{
+    return static_cast<unsigned char>(c) < 128;
+}
+
 // Letters, digits and all bytes of letters beyond ASCII.
 bool is_word_byte(char c)
 {
-    const auto byte = static_cast<unsigned char>(c);
-    return byte >= 128 || std::isalnum(byte) != 0;
+    return !is_ascii(c) || std::isalnum(static_cast<unsigned char>(c)) != 0;
 }
 
-std::vector<std::string> words_of(std::string_view text, bool case_sensitive)
+// The words of a text in turn, with blanks ahead of, between and behind them; empty without a word.
+std::string words_of(std::string_view text, bool case_sensitive)
 {
-    std::vector<std::string> words;
+    std::string words;
     bool inside = false;
     for (const char c : text) {
-        if (is_word_byte(c)) {
-            if (!inside)
-                words.emplace_back();
-            const bool ascii = static_cast<unsigned char>(c) < 128;
-            words.back().push_back(case_sensitive || !ascii ? c : static_cast<char>(std::tolower(c)));
-        }
-        inside = is_word_byte(c);
+        const bool was_inside = std::exchange(inside, is_word_byte(c));
+        if (inside ? words.empty() : was_inside)
+            words += ' ';
+        if (inside)
+            words += case_sensitive || !is_ascii(c) ? c : static_cast<char>(std::tolower(c));
     }
+    if (inside)
+        words += ' ';
     return words;
+}
+
+// Takes the first word off what words_of made; empty at the end.
+std::string_view take_word(std::string_view &words)
+{
+    words.remove_prefix(std::min<std::size_t>(words.size(), 1));
+    const std::string_view word = words.substr(0, words.find(' '));
+    words.remove_prefix(word.size());
+    return word;
+}
+
+// In time that grows with the sum of the lengths, whatever the texts are, which std::string_view::find
+// doesn't promise.
+bool contains(std::string_view text, std::string_view part)
+{
+    return part.empty() || memmem(text.data(), text.size(), part.data(), part.size()) != nullptr;
+}
+
+bool is_word_search(text_operator op)
+{
+    return op == text_operator::contains_phrase || op == text_operator::contains_all_words ||
+           op == text_operator::contains_some_word;
 }
 
 bool one_text_holds(text_operator op, std::string_view held, std::string_view wanted)
@@ -71,7 +100,7 @@ bool one_text_holds(text_operator op, std::string_view held, std::string_view wa
     case text_operator::greater_or_equal:
         return compare_naturally(held, wanted) >= 0;
     case text_operator::contains:
-        return held.find(wanted) != std::string_view::npos;
+        return contains(held, wanted);
     case text_operator::starts_with:
         return held.starts_with(wanted);
     case text_operator::ends_with:
@@ -79,7 +108,7 @@ bool one_text_holds(text_operator op, std::string_view held, std::string_view wa
     case text_operator::contains_phrase:
     case text_operator::contains_all_words:
     case text_operator::contains_some_word:
-        return words_hold(op, held, wanted, false);
+        return false; // not here
     }
     return false;
 }
@@ -127,23 +156,49 @@ int compare_naturally(std::string_view one, std::string_view other)
 
 bool text_holds(text_operator op, const values &held, std::string_view wanted)
 {
+    if (is_word_search(op)) {
+        const word_search search(op, wanted, false);
+        return std::any_of(held.begin(), held.end(),
+                           [&](std::string_view one) { return search.found_in(one); });
+    }
     const bool found = std::any_of(held.begin(), held.end(),
                                    [&](std::string_view one) { return one_text_holds(op, one, wanted); });
     return op == text_operator::not_equal ? !found : found;
 }
 
-bool words_hold(text_operator op, std::string_view text, std::string_view wanted, bool case_sensitive)
+word_search::word_search(text_operator op, std::string_view wanted, bool case_sensitive)
+    : op_(op), case_sensitive_(case_sensitive), asked_(words_of(wanted, case_sensitive))
 {
-    const std::vector<std::string> held = words_of(text, case_sensitive),
-                                   asked = words_of(wanted, case_sensitive);
-    if (asked.empty())
+    std::string_view rest = asked_;
+    for (std::string_view word = take_word(rest); !word.empty(); word = take_word(rest))
+        words_.push_back(word);
+    std::sort(words_.begin(), words_.end());
+    words_.erase(std::unique(words_.begin(), words_.end()), words_.end());
+}
+
+bool word_search::found_in(std::string_view text) const
+{
+    const std::string held = words_of(text, case_sensitive_);
+    if (op_ == text_operator::contains_phrase)
+        return !asked_.empty() && contains(held, asked_);
+    const bool all = op_ == text_operator::contains_all_words;
+    if (words_.empty() ||
+        (all && held.size() / 2 < words_.size())) // a word takes two bytes at least, with its blank
         return false;
-    if (op == text_operator::contains_phrase)
-        return std::search(held.begin(), held.end(), asked.begin(), asked.end()) != held.end();
-    const std::set<std::string> known(held.begin(), held.end());
-    const auto is_known = [&](const std::string &word) { return known.contains(word); };
-    return op == text_operator::contains_all_words ? std::all_of(asked.begin(), asked.end(), is_known)
-                                                   : std::any_of(asked.begin(), asked.end(), is_known);
+    std::vector<bool> found(all ? words_.size() : 0);
+    std::size_t missing = words_.size();
+    std::string_view rest = held;
+    for (std::string_view word = take_word(rest); !word.empty() && missing != 0; word = take_word(rest)) {
+        const auto place = std::lower_bound(words_.begin(), words_.end(), word);
+        if (place == words_.end() || *place != word)
+            continue;
+        if (!all)
+            return true;
+        std::vector<bool>::reference known = found[static_cast<std::size_t>(place - words_.begin())];
+        missing -= known ? 0 : 1;
+        known = true;
+    }
+    return missing == 0;
 }
 
 bool truth_holds(bool equal, bool held, bool wanted)

@@ -8,6 +8,7 @@
 
 #include <ctime>
 #include <set>
+#include <string>
 #include <string_view>
 #include <vector>
 
@@ -39,8 +40,22 @@ int compare_naturally(std::string_view one, std::string_view other);
 // Searches for words take no account of the case of ASCII letters; all else does.
 bool text_holds(text_operator op, const values &held, std::string_view wanted);
 
-// The three searches for words in running text.
-bool words_hold(text_operator op, std::string_view text, std::string_view wanted, bool case_sensitive);
+// One of the three searches for words in running text. What it searches for is taken apart once.
+class word_search {
+public:
+    word_search(text_operator op, std::string_view wanted, bool case_sensitive);
+    word_search(const word_search &) = delete;
+    word_search &operator=(const word_search &) = delete;
+
+    // Never if no word was wanted.
+    bool found_in(std::string_view text) const;
+
+private:
+    text_operator op_;
+    bool case_sensitive_;
+    std::string asked_;                   // the words in turn, with blanks ahead of, between and behind them
+    std::vector<std::string_view> words_; // within asked_, each once, in order
+};
 
 // An absent truth value counts as false.
 bool truth_holds(bool equal, bool held, bool wanted);

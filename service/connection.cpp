@@ -3,6 +3,7 @@
 
 #include <chrono>
 
+#include <malloc.h>
 #include <poll.h>
 #include <sys/socket.h>
 
@@ -12,6 +13,7 @@ namespace service {
 
 namespace {
 
+constexpr std::int64_t LARGE = std::int64_t{8} << 20;   // bytes that an exchange held
 constexpr std::chrono::milliseconds LINGER_LIMIT(5000); // time that a peer gets to read the last answer
 
 // A connection closed with unread input is reset, and the peer may lose the answer. What it still sends is
@@ -32,10 +34,14 @@ void let_peer_read(int socket)
     }
 }
 
-void free_objects(soap *ctx)
+// A large exchange leaves its memory to the system and not to the next ones, which are small as a rule.
+void free_memory(soap *ctx, const reception &received)
 {
     soap_discard_objects(ctx, nullptr);
-    soap_discard_all(ctx);
+    soap_block_free(ctx, nullptr);
+    soap_call_scratch_free(ctx);
+    if (received.memory() > LARGE)
+        malloc_trim(0);
 }
 
 } // namespace
@@ -43,11 +49,16 @@ void free_objects(soap *ctx)
 void serve_connection(soap *ctx, const settings &config, session &lent)
 {
     reception received(ctx, config, lent);
-    while (serve_exchange(ctx, received))
-        free_objects(ctx);
+    bool more = true;
+    while (more) {
+        more = serve_exchange(ctx, received);
+        free_memory(ctx, received);
+        if (more)
+            soap_discard_all(ctx);
+    }
     let_peer_read(ctx->socket);
     ctx->keep_alive = 0;
-    free_objects(ctx);
+    soap_discard_all(ctx);
 }
 
 } // namespace service

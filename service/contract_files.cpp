@@ -2,7 +2,9 @@
 #include "contract_files.h"
 
 #include <algorithm>
-#include <cctype>
+#include <filesystem>
+
+#include <strings.h>
 
 #include "port.h"
 
@@ -11,50 +13,111 @@ namespace service {
 namespace {
 
 constexpr std::string_view USUAL_ROOT = "http://127.0.0.1:9080"; // as the contract has it
-constexpr std::string_view LOCATION = "schemaLocation=\"";
+constexpr std::string_view LOCATION = "schemaLocation=\"", NAMESPACE = "targetNamespace=\"";
 
-// The root comes from the client, and must not become anything but an address in the document.
-bool is_plain_url(std::string_view root)
+// The text of an attribute that begins there.
+std::string_view value_at(std::string_view text, std::size_t at)
 {
-    return root.starts_with("http") && std::ranges::all_of(root, [](unsigned char c) {
-               return std::isalnum(c) != 0 ||
-                      std::string_view("-._~:/[]").find(static_cast<char>(c)) != std::string_view::npos;
-           });
+    return text.substr(at, text.find('"', at) - at);
 }
 
-// The text with `added` behind each `mark`, or in its place.
-std::string rewritten(std::string_view text, std::string_view mark, std::string_view added, bool in_its_place)
+// The file with links and addresses below the root.
+std::string handed_out(const contract_file &file, const std::string &root)
 {
-    std::string result;
-    for (std::size_t at; (at = text.find(mark)) != std::string_view::npos;) {
-        result.append(text.substr(0, in_its_place ? at : at + mark.size())).append(added);
-        text.remove_prefix(at + mark.size());
+    const std::filesystem::path folder = std::filesystem::path(CONTRACT_PATH) / file.name;
+    std::string result(file.text);
+    for (std::size_t at = 0; (at = result.find(LOCATION, at)) != std::string::npos;) {
+        at += LOCATION.size();
+        const std::string_view location = value_at(result, at);
+        const std::string link = root + folder.parent_path().append(location).lexically_normal().string();
+        result.replace(at, location.size(), link);
     }
-    return result.append(text);
+    for (std::size_t at = 0; (at = result.find(USUAL_ROOT, at)) != std::string::npos; at += root.size())
+        result.replace(at, USUAL_ROOT.size(), root);
+    return result;
 }
 
-// At the port's address the schemas are further away than at the file's own place.
-std::string wsdl_of(const contract_file &file, std::string_view root)
+const contract_file *wsdl_of(const port &described)
 {
-    const std::string_view folder = file.name.substr(0, file.name.find('/') + 1);
-    const std::string text = rewritten(file.text, LOCATION, std::string(CONTRACT_PATH).append(folder), false);
-    return is_plain_url(root) ? rewritten(text, USUAL_ROOT, root, true) : text;
+    const std::string name = "/" + std::string(described.name) + ".wsdl";
+    const auto files = contract_files();
+    const auto found =
+        std::find_if(files.begin(), files.end(), [&](const auto &f) { return f.name.ends_with(name); });
+    return found == files.end() ? nullptr : &*found;
+}
+
+std::string wsdl_url(const port &described, const std::string &root)
+{
+    return root + std::string(SERVICES_PATH).append(described.name) + "?wsdl";
+}
+
+// Hands each port that has a WSDL to `use`, with it.
+template <class Use> void each_wsdl(const Use &use)
+{
+    for (const port *described : all_ports())
+        if (const contract_file *const file = wsdl_of(*described))
+            use(*described, *file);
+}
+
+// The part of a text from one mark to another, both included.
+std::string_view part_of(std::string_view text, std::string_view first, std::string_view last)
+{
+    text.remove_prefix(text.find(first));
+    return text.substr(0, text.find(last) + last.size());
+}
+
+// A WSDL of all ports: it imports theirs, and offers their services, which toolkits don't look for in what is
+// imported.
+std::string all_wsdls(const std::string &root)
+{
+    std::string prefixes, imports, services;
+    each_wsdl([&](const port &described, const contract_file &file) {
+        const std::string_view uri = value_at(file.text, file.text.find(NAMESPACE) + NAMESPACE.size());
+        prefixes.append("\n  xmlns:protocol").append(described.name).append("=\"").append(uri).append("\"");
+        imports.append("  <wsdl:import namespace=\"").append(uri);
+        imports.append("\" location=\"").append(wsdl_url(described, root)).append("\"/>\n");
+        services.append("  ")
+            .append(part_of(handed_out(file, root), "<wsdl:service", "</wsdl:service>"))
+            .append("\n");
+    });
+    return "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<wsdl:definitions name=\"zuv\" "
+           "targetNamespace=\"urn:zuv:ports\"\n"
+           "  xmlns:wsdl=\"http://schemas.xmlsoap.org/wsdl/\" "
+           "xmlns:soap=\"http://schemas.xmlsoap.org/wsdl/soap/\"\n"
+           "  xmlns:soap12=\"http://schemas.xmlsoap.org/wsdl/soap12/\"" +
+           prefixes + ">\n" + imports + services + "</wsdl:definitions>\n";
 }
 
 } // namespace
 
-std::string contract_document(std::string_view path_and_query, std::string_view root)
+std::string contract_document(const request_target &target)
 {
-    const std::size_t mark = std::min(path_and_query.find('?'), path_and_query.size());
-    const std::string_view path = path_and_query.substr(0, mark), query = path_and_query.substr(mark);
-    const port *const asked = query == "?wsdl" || query == "?WSDL" ? find_port(path) : nullptr;
-    for (const contract_file &file : contract_files()) {
-        if (path.starts_with(CONTRACT_PATH) && path.substr(CONTRACT_PATH.size()) == file.name)
-            return std::string(file.text);
-        if (asked != nullptr && file.name.ends_with("/" + std::string(asked->name) + ".wsdl"))
-            return wsdl_of(file, root);
-    }
+    const bool asks_wsdl = strcasecmp(target.query.c_str(), "wsdl") == 0;
+    if (target.path == "/" && asks_wsdl)
+        return all_wsdls(target.root);
+    const port *const asked = asks_wsdl || target.query.empty() ? find_port(target.path) : nullptr;
+    if (const contract_file *const file = asked == nullptr ? nullptr : wsdl_of(*asked))
+        return handed_out(*file, target.root);
+    for (const contract_file &file : contract_files())
+        if (target.path == std::string(CONTRACT_PATH).append(file.name))
+            return handed_out(file, target.root);
     return {};
+}
+
+std::string contract_page(const request_target &target)
+{
+    std::string html = "<!DOCTYPE html><html><head><title>zuv-service</title></head><body>";
+    const auto item = [&](const std::string &url, std::string_view text) {
+        html.append("<li><a href=\"").append(url).append("\">").append(text).append("</a></li>");
+    };
+    html += "<p>Ports:</p><ul>";
+    each_wsdl([&](const port &described, const contract_file &) {
+        item(wsdl_url(described, target.root), std::string(SERVICES_PATH).append(described.name));
+    });
+    html += "</ul><p>Contract:</p><ul>";
+    for (const contract_file &file : contract_files())
+        item(target.root + std::string(CONTRACT_PATH).append(file.name), file.name);
+    return html + "</ul></body></html>\r\n";
 }
 
 } // namespace service

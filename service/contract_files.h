@@ -1,10 +1,13 @@
-// contract_files.h - the contract as the service hands it out: its files as they stand, and the WSDL of each
-// port at the port's own address, from where a toolkit finds all the rest.
+// contract_files.h - the contract as the service hands it out: its files, the WSDL of each port at the port's
+// own address, and one that leads to these at the service's. Each link in them is a whole URL of this
+// service, without dots for a toolkit to resolve, and so are the addresses of the ports.
 #pragma once
 
 #include <span>
 #include <string>
 #include <string_view>
+
+#include "request_target.h"
 
 namespace service {
 
@@ -18,9 +21,11 @@ struct contract_file {
 // All files of the contract, for ever; the build makes them part of the program.
 std::span<const contract_file> contract_files();
 
-// What stands at a path with its query: a file below CONTRACT_PATH, or the WSDL of a port, asked for by the
-// query "wsdl". Empty for anything else. In the WSDL the ports have addresses below `root`, the URL of this
-// service as the client named it, "http://host:9080"; one that is no plain URL is left out.
-std::string contract_document(std::string_view path_and_query, std::string_view root);
+// A document of XML: a file below CONTRACT_PATH; at the path of a port its WSDL, with the query "wsdl" in
+// capitals or small letters or with none; at "/" with that query what leads to all. Empty for anything else.
+std::string contract_document(const request_target &target);
+
+// A page of HTML that leads to the documents.
+std::string contract_page(const request_target &target);
 
 } // namespace service

@@ -124,7 +124,8 @@ std::size_t kept_file::read(char *buffer, std::size_t length)
 
 void open_data_directory(const std::string &directory)
 {
-    std::filesystem::create_directory(directory);
+    if (mkdir(directory.c_str(), S_IRWXU) == 0 ? chmod(directory.c_str(), S_IRWXU) != 0 : errno != EEXIST)
+        fail(directory);
 }
 
 void remove_data(const std::string &directory, std::string_view name)

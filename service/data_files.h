@@ -54,7 +54,7 @@ private:
     std::uint64_t size_ = 0, position_ = 0;
 };
 
-// Makes the directory unless it is there.
+// Makes the directory unless it is there, for its owner alone (mode 0700) whatever the umask is.
 void open_data_directory(const std::string &directory);
 
 // Removes a file; nothing if it isn't there.

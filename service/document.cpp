@@ -26,21 +26,21 @@ constexpr std::size_t ERROR_TEXT_SIZE = 512; // bytes of an error's text that ar
 
 } // namespace
 
-document_codec::document_codec(std::uint64_t byte_limit, std::uint32_t depth_limit)
-    : context_(CODEC_MODE), byte_limit_(byte_limit)
+document_codec::document_codec(std::uint64_t byte_limit, std::uint32_t depth_limit,
+                               std::uint64_t memory_limit)
+    : context_(CODEC_MODE), byte_limit_(byte_limit), memory_limit_(memory_limit)
 {
     context_.max_depth = depth_limit;
+    context_.max_memory = memory_limit;
     context_.user = this;
     context_.on_send = take_output;
     context_.on_recv = give_input;
 }
 
-// A request may refer to one object from many places, and a document written from it holds the object that
-// often. The limit keeps a small request from becoming a document of any size.
 int document_codec::take_output(soap *ctx, const char *data, std::size_t length)
 {
     auto *const self = static_cast<document_codec *>(ctx->user);
-    self->too_large_ = self->output_.size() + length > self->byte_limit_;
+    self->too_large_ = self->output_.size() + length > self->write_limit_;
     if (self->too_large_)
         return SOAP_LENGTH;
     try {
@@ -81,7 +81,7 @@ std::string document_codec::write_with(int (*put)(soap *ctx, const void *object)
         soap_send_begin(&context_) != SOAP_OK || put(&context_, object) != SOAP_OK || refers_beside() ||
         soap_send_finish(&context_) != SOAP_OK) {
         if (too_large_)
-            throw document_error("the document is too large", 0);
+            throw document_error("The document is larger than the service keeps.", 0, write_limit_);
         fail(context_);
     }
     return std::exchange(output_, {});
@@ -90,8 +90,13 @@ std::string document_codec::write_with(int (*put)(soap *ctx, const void *object)
 void document_codec::read_with(bool (*get)(soap *ctx, void *object), void *object, std::string_view xml)
 {
     input_ = xml;
-    if (soap_receive_begin(&context_) != SOAP_OK || !get(&context_, object) ||
-        soap_receive_finish(&context_) != SOAP_OK)
+    const bool read = soap_receive_begin(&context_) == SOAP_OK && get(&context_, object) &&
+                      soap_receive_finish(&context_) == SOAP_OK;
+    soap_call_scratch_free(&context_); // what is left are the objects
+    held_ += static_cast<std::uint64_t>(std::max<std::int64_t>(context_.memory_held, 0));
+    if (memory_limit_ != 0 && held_ > memory_limit_)
+        throw document_error("The documents take more memory than the service gives.", 0, memory_limit_);
+    if (!read)
         fail(context_);
 }
 
@@ -99,6 +104,7 @@ void document_codec::forget()
 {
     soap_discard_objects(&context_, nullptr);
     soap_discard_all(&context_);
+    held_ = 0;
 }
 
 } // namespace service

@@ -4,7 +4,9 @@
 // port. Elsewhere: rows (store.h), what operations do with documents (the ports).
 #pragma once
 
+#include <algorithm>
 #include <cstddef>
+#include <cstdint>
 #include <stdexcept>
 #include <string>
 #include <string_view>
@@ -16,24 +18,36 @@
 
 namespace service {
 
-// A document that can't be written or read again; `error` is the engine's code, 0 for one over the size
-// limit.
+// A document that can't be written or read again; `error` is the engine's code, 0 for one over a limit of the
+// service, which is told by `limit`, bytes.
 struct document_error : std::runtime_error {
-    document_error(const std::string &text, int code) : std::runtime_error(text), error(code) {}
+    document_error(const std::string &text, int code, std::uint64_t bytes = 0)
+        : std::runtime_error(text), error(code), limit(bytes)
+    {}
     int error;
+    std::uint64_t limit;
 };
+
+// Objects may refer to one object from many places, and what is written of them holds it that often. So many
+// bytes may come of so many that arrived: enough for what the service adds, and for other names and prefixes.
+constexpr std::uint64_t grown(std::uint64_t bytes)
+{
+    return (1ULL << 20) + 8 * bytes;
+}
 
 // A context of its own, as the exchange's one buffer is busy with the exchange. Serves one thread at a time.
 class document_codec {
 public:
-    // Documents of more bytes, or of more open elements, are refused.
-    document_codec(std::uint64_t byte_limit, std::uint32_t depth_limit);
+    // Documents of more bytes, or of more open elements, are refused, and so are further ones once the
+    // objects read hold more than `memory_limit` bytes; 0: any number.
+    document_codec(std::uint64_t byte_limit, std::uint32_t depth_limit, std::uint64_t memory_limit = 0);
     document_codec(const document_codec &) = delete;
     document_codec &operator=(const document_codec &) = delete;
 
-    // XML of an object under its type's name.
-    template <class T> std::string write(const T &object)
+    // XML of an object under its type's name; at most grown(bytes).
+    template <class T> std::string write(const T &object, std::uint64_t bytes)
     {
+        write_limit_ = std::min(byte_limit_, grown(bytes));
         return write_with(
             [](soap *ctx, const void *o) { return static_cast<const T *>(o)->soap_put(ctx, nullptr, ""); },
             &object);
@@ -51,6 +65,7 @@ public:
 
     // Frees all objects read.
     void forget();
+    std::uint64_t held() const { return held_; } // bytes that they take
 
 private:
     std::string write_with(int (*put)(soap *ctx, const void *object), const void *object);
@@ -60,7 +75,8 @@ private:
     static std::size_t give_input(soap *ctx, char *buffer, std::size_t length);
 
     soap context_;
-    std::uint64_t byte_limit_;
+    std::uint64_t byte_limit_, memory_limit_, write_limit_ = 0;
+    std::uint64_t held_ = 0;
     std::string output_;
     std::string_view input_;
     bool too_large_ = false;

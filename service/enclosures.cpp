@@ -4,9 +4,11 @@
 #include <algorithm>
 #include <cstdio>
 #include <exception>
+#include <utility>
 
 #include <zuv_client_pro/soap_attachment.h>
 #include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_memory.h>
 
 namespace service {
 
@@ -14,6 +16,7 @@ namespace {
 
 constexpr int TOO_LARGE = 413, INTERNAL_ERROR = 500;
 constexpr std::size_t ATTACHMENTS_MAX = 1000; // of one request
+constexpr std::size_t ENCLOSED_MAX = 100;     // of one answer: each is an open file until it is sent
 constexpr std::size_t VALUES_MAX =
     64; // elements that wait for their bytes; beyond, all attachments go to memory
 constexpr char MEDIA_TYPE[] = "application/octet-stream";
@@ -34,6 +37,19 @@ bool message_is_known(const soap *ctx)
     return (ctx->mode & MODE_MIME) == 0 || ctx->mime.root != nullptr;
 }
 
+int failed(const std::exception &failure)
+{
+    std::fprintf(stderr, "zuv-service: %s\n", failure.what());
+    return INTERNAL_ERROR;
+}
+
+int refuse_encoding(soap *ctx, const transfer_decoder &decoder)
+{
+    const std::string text =
+        std::string("An attachment is not the ") + decoder.name() + " that its head announces.";
+    return soap_fault_sender(ctx, soap_string_dup(ctx, text.c_str()), nullptr, SOAP_MIME_ERROR);
+}
+
 } // namespace
 
 void enclosures::expect_next()
@@ -42,53 +58,99 @@ void enclosures::expect_next()
     arrived_bytes_ = 0;
     arrived_ = 0;
     too_large_ = false;
-    files_.clear();
+    arrived_parts_.clear();
+    kept_.clear();
     outgoing_.clear();
+}
+
+void enclosures::discard_arrived()
+{
+    arrived_parts_.clear();
+    for (const std::string &name : std::exchange(kept_, {}))
+        remove_data(directory_, name);
 }
 
 // ---------------------------------------------------------------------------------------------
 // In. The library calls these, and nothing may be thrown through it.
 
-void *enclosures::open(soap *ctx, const char *id)
+void *enclosures::open(soap *ctx, const char *id, int encoding)
 {
     if (++arrived_ > ATTACHMENTS_MAX) {
         too_large_ = true;
         ctx->error = TOO_LARGE;
         return nullptr;
     }
-    if (!message_is_known(ctx) || is_value(ctx, id))
-        return soap_attachment_in_memory(ctx);
     try {
-        return &files_.emplace_back(directory_);
+        const bool to_memory = !message_is_known(ctx) || is_value(ctx, id);
+        std::unique_ptr<transfer_decoder> decoder = transfer_decoder::of(encoding);
+        if (to_memory && decoder == nullptr)
+            return soap_attachment_in_memory(ctx);
+        arriving_part &part = arrived_parts_.emplace_back();
+        part.decoder = std::move(decoder);
+        if (!to_memory)
+            part.file.emplace(directory_);
+        return &part;
     } catch (const std::exception &failure) {
-        std::fprintf(stderr, "zuv-service: %s\n", failure.what());
-        ctx->error = INTERNAL_ERROR;
+        ctx->error = failed(failure);
         return nullptr;
     }
 }
 
-int enclosures::write(void *handle, const char *data, std::size_t length)
+int enclosures::write(soap *ctx, void *handle, const char *data, std::size_t length)
 {
-    arrived_bytes_ += length;
+    arriving_part &part = *static_cast<arriving_part *>(handle);
+    arrived_bytes_ += part.file ? length : 0; // what is in memory counts as the message does
     too_large_ = arrived_bytes_ > config_.attachment_limit;
     if (too_large_)
         return TOO_LARGE;
     try {
-        static_cast<arriving_file *>(handle)->write(data, length);
-        return 0;
+        if (part.decoder == nullptr) {
+            part.file->write(data, length);
+            return SOAP_OK;
+        }
+        if (!part.decoder->decode(data, length, part.memory))
+            return refuse_encoding(ctx, *part.decoder);
+        if (part.file) {
+            part.file->write(part.memory.data(), part.memory.size());
+            part.memory.clear();
+        }
+        return SOAP_OK;
     } catch (const std::exception &failure) {
-        std::fprintf(stderr, "zuv-service: %s\n", failure.what());
-        return INTERNAL_ERROR;
+        return failed(failure);
     }
 }
 
-void enclosures::close(void *handle)
+void enclosures::close(soap *ctx, void *handle)
 {
+    arriving_part &part = *static_cast<arriving_part *>(handle);
     try {
-        static_cast<arriving_file *>(handle)->flush(); // now, as nobody waits for this connection
+        if (part.decoder != nullptr && ctx->error == SOAP_OK)
+            end_decoding(ctx, part);
+        if (part.file)
+            part.file->flush(); // now, as nobody waits for this connection
     } catch (const std::exception &failure) {
-        std::fprintf(stderr, "zuv-service: %s\n", failure.what()); // whoever keeps it tries again
+        const int error = failed(failure);
+        ctx->error = ctx->error == SOAP_OK ? error : ctx->error;
     }
+}
+
+// The library has given the part what came; it gets what that means.
+void enclosures::end_decoding(soap *ctx, arriving_part &part)
+{
+    if (!part.decoder->finish(part.memory)) {
+        refuse_encoding(ctx, *part.decoder);
+        return;
+    }
+    soap_attachment &told = *ctx->mime.last;
+    told.encoding = MIME_BINARY;
+    if (part.file) {
+        part.file->write(part.memory.data(), part.memory.size());
+        told.size = static_cast<std::size_t>(part.file->size());
+        return;
+    }
+    told.size = part.memory.size();
+    told.content = soap_string_dup_n(ctx, part.memory.data(), part.memory.size()); // null: out of memory
+    part.memory = std::string();
 }
 
 bool enclosures::find(soap *ctx, const std::string &reference, enclosed_data &found)
@@ -98,10 +160,11 @@ bool enclosures::find(soap *ctx, const std::string &reference, enclosed_data &fo
             if (a == ctx->mime.root || a->content == nullptr ||
                 soap_cid_compare(ctx, reference.c_str(), a->id) != 0)
                 continue;
-            const auto file = std::find_if(files_.begin(), files_.end(), [a](const arriving_file &f) {
-                return static_cast<const void *>(&f) == a->content;
-            });
-            found = {file == files_.end() ? nullptr : &*file, a->content, a->size};
+            const auto part =
+                std::find_if(arrived_parts_.begin(), arrived_parts_.end(), [a](const arriving_part &p) {
+                    return static_cast<const void *>(&p) == a->content;
+                });
+            found = {part == arrived_parts_.end() ? nullptr : &*part->file, a->content, a->size};
             return true;
         }
     }
@@ -110,6 +173,7 @@ bool enclosures::find(soap *ctx, const std::string &reference, enclosed_data &fo
 
 void enclosures::keep(const enclosed_data &data, std::string_view name)
 {
+    kept_.emplace_back(name);
     if (data.file != nullptr) {
         data.file->keep_as(name);
         return;
@@ -122,10 +186,15 @@ void enclosures::keep(const enclosed_data &data, std::string_view name)
 // ---------------------------------------------------------------------------------------------
 // Out.
 
-void enclosures::enclose(const std::string &name)
+bool enclosures::enclose(const std::string &name)
 {
-    if (has_form())
-        outgoing_.emplace_back(directory_, name);
+    const auto has_name = [&](const outgoing &o) { return o.id == name; };
+    if (std::any_of(outgoing_.begin(), outgoing_.end(), has_name))
+        return true;
+    if (!has_form() || outgoing_.size() == ENCLOSED_MAX)
+        return false;
+    outgoing_.emplace_back(directory_, name);
+    return true;
 }
 
 void *enclosures::reopen(soap *ctx, void *handle)

@@ -7,19 +7,23 @@
 
 #include <cstdint>
 #include <list>
+#include <memory>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <utility>
+#include <vector>
 
 #include <zuv_client_pro/soap.h>
 
 #include "data_files.h"
 #include "settings.h"
+#include "transfer_encoding.h"
 
 namespace service {
 
-// An attachment that came with the request: in a file, or in memory if it stood ahead of the message or is
-// the value of an element.
+// An attachment that came with the request, out of its transfer encoding: in a file, or in memory if it stood
+// ahead of the message or is the value of an element.
 struct enclosed_data {
     arriving_file *file; // null: in memory
     const char *content;
@@ -34,18 +38,26 @@ public:
 
     // Forgets the exchange before; files that nobody has kept go.
     void expect_next();
-    // Such files go now, since the request is refused.
-    void discard_arrived() { files_.clear(); }
+    // Such files go now, and those that were kept meanwhile, since the request is refused.
+    void discard_arrived();
+    // What was kept stays: what refers to it is on the disk.
+    void confirm_kept() { kept_.clear(); }
 
     // The form that a request's head tells (MODE_DIME, MODE_MIME), and the message itself (MODE_MTOM).
     void set_form(std::uint32_t form) { form_ = form; }
     void add_form(std::uint32_t form) { form_ |= form; }
     bool has_form() const { return form_ != 0; }
 
-    // The callbacks for what arrives, in the forms of DIME and MIME. `write` returns 0 or an HTTP status.
-    void *open(soap *ctx, const char *id);
-    int write(void *handle, const char *data, std::size_t length);
-    static void close(void *handle);
+    // The callbacks for what arrives, in the forms of DIME and MIME. `write` returns 0 or the code that ends
+    // the request, an HTTP status or one of the library's with a fault's text. `encoding` is a
+    // soap_mime_encoding.
+    void *open(soap *ctx, const char *id, int encoding);
+    int write(soap *ctx, void *handle, const char *data, std::size_t length);
+    static void close(soap *ctx, void *handle);
+    static bool is_in_file(const void *handle)
+    {
+        return static_cast<const arriving_part *>(handle)->file.has_value();
+    }
 
     // For what goes out: the handle if it is one of a file; the bytes of a value are left to the library.
     void *reopen(soap *ctx, void *handle);
@@ -59,8 +71,9 @@ public:
     // Keeps it under a name.
     void keep(const enclosed_data &data, std::string_view name);
 
-    // A kept file goes with the answer, under the id of its name. Nothing happens for a request without form.
-    void enclose(const std::string &name);
+    // A kept file goes with the answer, once, under the id of its name. False for a request without form, and
+    // if too many files go already.
+    bool enclose(const std::string &name);
 
     // The modes of the answer, 0 without enclosures; adds the files to a message about to be counted. 0
     // or 20.
@@ -70,6 +83,11 @@ public:
     const std::string &directory() const { return directory_; }
 
 private:
+    struct arriving_part {
+        std::unique_ptr<transfer_decoder> decoder; // null: the bytes stay as they are
+        std::optional<arriving_file> file;
+        std::string memory; // without a file; between calls only, with one
+    };
     struct outgoing {
         outgoing(const std::string &directory, const std::string &name)
             : id(name), bracketed_id("<" + name + ">"), file(directory, name)
@@ -78,13 +96,16 @@ private:
         kept_file file;
     };
 
+    static void end_decoding(soap *ctx, arriving_part &part);
+
     const settings &config_;
     std::string directory_;
     std::uint32_t form_ = 0;
     std::uint64_t arrived_bytes_ = 0;
     std::size_t arrived_ = 0; // attachments, in memory or in files
     bool too_large_ = false;
-    std::list<arriving_file> files_;
+    std::list<arriving_part> arrived_parts_;
+    std::vector<std::string> kept_; // names
     std::list<outgoing> outgoing_;
 };
 

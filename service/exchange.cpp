@@ -132,7 +132,7 @@ void settle_header(soap *ctx)
 // The HTTP status for a request that could not be read.
 int status_of_error(const soap *ctx, const reception &received)
 {
-    if (received.too_large())
+    if (received.too_large() || ctx->exceeded != nullptr)
         return TOO_LARGE;
     if (received.too_slow())
         return REQUEST_TIMEOUT;
@@ -172,7 +172,7 @@ void answer_unreadable(soap *ctx, const reception &received)
     const int status = status_of_error(ctx, received);
     settle_version(ctx);
     settle_header(ctx);
-    if (status == INTERNAL_ERROR || status == BAD_REQUEST) {
+    if (status == INTERNAL_ERROR || status == BAD_REQUEST || ctx->exceeded != nullptr) {
         soap_fault_text_fill(ctx);
         if (status == BAD_REQUEST)
             describe_unreadable(ctx);
@@ -203,27 +203,56 @@ void answer_failure(soap *ctx, const char *what)
               }});
 }
 
-// A document that can't be kept: too large, or nested without end.
-[[noreturn]] void refuse_document(soap *ctx, const document_error &error, std::uint64_t limit)
+protocol__Server_x002eDataTooLarge *too_large(soap *ctx, const char *text, std::uint64_t limit)
+{
+    auto *const fault = make_fault<protocol__Server_x002eDataTooLarge>(ctx, text);
+    fault->maxSize = make_text(ctx, std::to_string(limit));
+    return fault;
+}
+
+// A document that can't be kept or shown: too large, or nested without end.
+[[noreturn]] void refuse_document(soap *ctx, const document_error &error)
 {
     if (error.error != 0)
         refuse<protocol__Client_x002eInvalidInformation>(ctx, error.what());
-    auto *const fault =
-        make_fault<protocol__Server_x002eDataTooLarge>(ctx, "The document is larger than the service keeps.");
-    fault->maxSize = make_text(ctx, std::to_string(limit));
-    refuse(fault);
+    refuse(too_large(ctx, error.what(), error.limit));
+}
+
+// The answer could not be sent. Where counting found it too large nothing has gone out yet, and the client
+// can be told.
+void answer_unsent(soap *ctx)
+{
+    const bool told = ctx->exceeded != nullptr && (ctx->mode & MODE_COUNTING) != 0;
+    const std::uint64_t limit = ctx->exceeded_value;
+    ctx->keep_alive = 0;
+    if (!told)
+        return;
+    ctx->error = SOAP_OK;
+    answer_refusal(ctx, {too_large(ctx, "The answer is larger than the service sends.", limit),
+                         [](SOAP_ENV__Detail &detail, protocol__Fault *fault) {
+                             place_fault(detail, static_cast<protocol__Server_x002eDataTooLarge *>(fault));
+                         }});
 }
 
 const void *run(soap *ctx, const request &asked, reception &received)
 {
     const protocol__Header *const header = header_of(ctx);
     check_credentials(ctx, header);
-    call c{ctx,    received.lent().documents, received.lent().codec, received.config(),
-           header, received.root(),           received.enclosed()};
+    session &lent = received.lent();
+    call c{ctx,
+           lent.documents,
+           lent.codec,
+           received.config(),
+           header,
+           received.root(),
+           received.enclosed(),
+           lent.judged,
+           received.message_bytes(),
+           {{ctx}}};
     try {
         return asked.op->run(c, asked.object);
     } catch (const document_error &error) {
-        refuse_document(ctx, error, received.config().body_limit);
+        refuse_document(ctx, error);
     }
 }
 
@@ -244,11 +273,12 @@ void receive_and_answer(soap *ctx, reception &received)
     received.enclosed().add_form(ctx->mode & MODE_MTOM);
     const request asked = read_request(ctx, *received.target());
     const void *const response = run(ctx, asked, received);
+    received.enclosed().confirm_kept();
     if (ctx->response_unfinished)
         ctx->keep_alive = 0; // something stands behind the request, which can't be told from a next one
     settle_header(ctx);
     if (send_response(ctx, *asked.op, response, received.enclosed()) != SOAP_OK)
-        ctx->keep_alive = 0;
+        answer_unsent(ctx);
 }
 
 void serve(soap *ctx, reception &received)
@@ -262,6 +292,7 @@ void serve(soap *ctx, reception &received)
         received.enclosed().discard_arrived();
         answer_unreadable(ctx, received);
     } catch (const std::exception &failure) {
+        received.enclosed().discard_arrived();
         answer_failure(ctx, failure.what());
     }
 }
@@ -277,7 +308,9 @@ bool serve_exchange(soap *ctx, reception &received)
         std::fprintf(stderr, "zuv-service: %s\n", failure.what());
         ctx->keep_alive = 0;
     }
+    received.note_memory(ctx->memory_held);
     received.lent().codec.forget();
+    received.lent().judged.forget();
     received.enclosed().expect_next();
     if (!received.started() || (ctx->error != SOAP_OK && ctx->error != SOAP_STOP))
         ctx->keep_alive = 0;

@@ -54,7 +54,9 @@ updates closure(const catalogue &offered, const update_record &start, step next)
 
 class expander {
 public:
-    expander(soap *ctx, const catalogue &offered, const order &o) : ctx_(ctx), offered_(offered), order_(o) {}
+    expander(filter_work &work, const catalogue &offered, const order &o)
+        : work_(work), offered_(offered), order_(o)
+    {}
 
     expansion run()
     {
@@ -103,12 +105,15 @@ private:
 
     bool passes_filters(const update_record &update, update_role role) const
     {
-        filter_facts facts = facts_of(ctx_, update);
+        filter_facts facts = facts_of(work_, update);
         facts.attachments.push_back(&update_package());
-        return std::all_of(
-            order_.inclusionFilter.begin(), order_.inclusionFilter.end(), [&](const auto *filter) {
-                return filter == nullptr || !concerns(*filter, role) || filter_holds(*filter, facts);
-            });
+        return std::all_of(order_.inclusionFilter.begin(), order_.inclusionFilter.end(),
+                           [&](const auto *filter) {
+                               if (filter == nullptr)
+                                   return true;
+                               work_.spend(filter->scope.size());
+                               return !concerns(*filter, role) || filter_holds(*filter, facts);
+                           });
     }
 
     void choose(const update_record *update, update_role role)
@@ -288,7 +293,7 @@ private:
             choose_stand_ins(offered_.required(*result_.chosen[i].update), update_role::requisite, how);
     }
 
-    soap *ctx_;
+    filter_work &work_;
     const catalogue &offered_;
     const order &order_;
     expansion result_;
@@ -304,9 +309,9 @@ bool names_updates(const order &o)
            !o.inclusionFilter.empty();
 }
 
-expansion expand(soap *ctx, const catalogue &offered, const order &o)
+expansion expand(filter_work &work, const catalogue &offered, const order &o)
 {
-    return expander(ctx, offered, o).run();
+    return expander(work, offered, o).run();
 }
 
 const protocol__Attachment &update_package()

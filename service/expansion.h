@@ -10,6 +10,7 @@
 #include <zuv_client_pro/protocolUpdateOrder.h>
 
 #include "catalogue.h"
+#include "filter_work.h"
 
 namespace service {
 
@@ -34,7 +35,8 @@ struct expansion {
 bool names_updates(const protocolUpdateOrder__UpdateOrderContent &order);
 
 // Throws filter_error.
-expansion expand(soap *ctx, const catalogue &offered, const protocolUpdateOrder__UpdateOrderContent &order);
+expansion expand(filter_work &work, const catalogue &offered,
+                 const protocolUpdateOrder__UpdateOrderContent &order);
 
 // What the data of updates is told as.
 const protocol__Attachment &update_package();

@@ -31,20 +31,22 @@ void append(std::string &text, const values &parts)
 
 } // namespace
 
-filter_facts facts_of(soap *ctx, const protocolUpdateOrder__UpdateMetaData &update)
+filter_facts facts_of(filter_work &work, const protocolUpdateOrder__UpdateMetaData &update)
 {
     filter_facts facts;
-    facts.ctx = ctx;
+    facts.work = &work;
     facts.update = &update;
     for (const protocol__Identity *subject : update.subject)
         add_subject(facts, subject);
     return facts;
 }
 
-filter_facts facts_of(soap *ctx, const protocolProblemReport__ProblemReportContent &report)
+filter_facts facts_of(filter_work &work, const protocolProblemReport__ProblemReportContent &report,
+                      std::size_t size)
 {
     filter_facts facts;
-    facts.ctx = ctx;
+    facts.work = &work;
+    facts.size = size;
     facts.report = &report;
     add_subject(facts, report.subject);
     return facts;

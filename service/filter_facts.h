@@ -12,20 +12,23 @@
 #include <zuv_client_pro/protocolUpdateOrder.h>
 
 #include "comparison.h"
+#include "filter_work.h"
 
 namespace service {
 
 // The item: an update, a problem report, or something smaller told as one of them. Absent parts are null.
 struct filter_facts {
-    soap *ctx = nullptr; // whose parser reads points in time
+    filter_work *work = nullptr; // of the request
+    std::size_t size = 0;        // bytes of the item's XML, if it isn't the service's own
     std::vector<const protocol__Identity *> subjects;
     const protocolUpdateOrder__UpdateMetaData *update = nullptr;
     const protocolProblemReport__ProblemReportContent *report = nullptr;
     std::vector<const protocol__Attachment *> attachments;
 };
 
-filter_facts facts_of(soap *ctx, const protocolUpdateOrder__UpdateMetaData &update);
-filter_facts facts_of(soap *ctx, const protocolProblemReport__ProblemReportContent &report);
+filter_facts facts_of(filter_work &work, const protocolUpdateOrder__UpdateMetaData &update);
+filter_facts facts_of(filter_work &work, const protocolProblemReport__ProblemReportContent &report,
+                      std::size_t size = 0);
 
 // --- gathering ---
 

@@ -13,6 +13,8 @@
 
 namespace service {
 
+constexpr std::size_t MEMBER_BYTES_MIN = 16; // of XML; so often at most a node looks for something in an item
+
 // A row: judges a node of one class.
 template <class Node> struct comparison_row {
     int type;
@@ -31,8 +33,9 @@ public:
     {
         if (expression == nullptr)
             throw filter_error("an expression or operand of the filter is missing", false);
-        if (depth > FILTER_DEPTH_MAX || ++nodes_ > FILTER_NODES_MAX)
-            throw filter_error("the filter is too complex", true);
+        if (depth > FILTER_DEPTH_MAX)
+            throw filter_error("the filter is nested too deeply", true);
+        facts_.work->spend(NODE_WORK + facts_.size / MEMBER_BYTES_MIN);
         const auto judge = [&](const node *operand) { return holds(operand, depth + 1); };
         if (const auto *const all = dynamic_cast<const typename L::and_node *>(expression))
             return std::all_of(all->operand.begin(), all->operand.end(), judge);
@@ -47,7 +50,6 @@ public:
 
 private:
     const filter_facts &facts_;
-    unsigned nodes_ = 0;
 };
 
 // The row of a type in a table, or null.
@@ -64,6 +66,34 @@ template <class T> const T &demand_operand(const T *operand)
     if (operand == nullptr)
         throw filter_error("a comparison of the filter lacks what it compares with", false);
     return *operand;
+}
+
+inline void spend_on(const filter_facts &facts, std::string_view text)
+{
+    facts.work->spend(VALUE_WORK + text.size());
+}
+
+// What a comparison compares with: not too long, and its bytes counted.
+inline const std::string &demand_text(const filter_facts &facts, const std::string *operand)
+{
+    const std::string &text = demand_operand(operand);
+    if (text.size() > FILTER_TEXT_MAX)
+        throw filter_error("a comparison of the filter compares with too long a text", true);
+    spend_on(facts, text);
+    return text;
+}
+
+template <class Texts> const Texts &spend_on_each(const filter_facts &facts, const Texts &texts)
+{
+    for (const std::string_view text : texts)
+        spend_on(facts, text);
+    return texts;
+}
+
+inline bool texts_hold(const filter_facts &facts, text_operator op, const values &held,
+                       const std::string *wanted)
+{
+    return text_holds(op, spend_on_each(facts, held), demand_text(facts, wanted));
 }
 
 // The operators of the languages on text. Their codes differ: here are the common operators in the order of
@@ -96,7 +126,7 @@ bool compare_texts(const Node &node, const filter_facts &facts)
     const auto &comparison = static_cast<const C &>(node);
     values held;
     Values(facts, held);
-    return text_holds(common_operator(comparison.compareOp), held, demand_operand(comparison.*Wanted));
+    return texts_hold(facts, common_operator(comparison.compareOp), held, comparison.*Wanted);
 }
 
 // Text picked by a name; Values(facts, name, out).
@@ -105,8 +135,8 @@ bool compare_named_texts(const Node &node, const filter_facts &facts)
 {
     const auto &comparison = static_cast<const C &>(node);
     values held;
-    Values(facts, demand_operand(comparison.name), held);
-    return text_holds(common_operator(comparison.compareOp), held, demand_operand(comparison.value));
+    Values(facts, demand_text(facts, comparison.name), held);
+    return texts_hold(facts, common_operator(comparison.compareOp), held, comparison.value);
 }
 
 template <class Meta> void restriction_pairs(const filter_facts &facts, const std::string &name, values &out)
@@ -153,17 +183,20 @@ bool compare_restrictions(const Node &node, const filter_facts &facts)
     values held;
     each_meta(facts, static_cast<Meta *>(nullptr),
               [&](const auto &meta) { gather_each<&protocol__Restriction::type>(held, meta.restriction); });
+    spend_on_each(facts, held);
+    spend_on_each(facts, comparison.restrictionType);
     return set_holds(static_cast<set_operator>(comparison.compareOp), {held.begin(), held.end()},
                      {comparison.restrictionType.begin(), comparison.restrictionType.end()});
 }
 
-inline bool moments_hold(soap *ctx, moment_operator op, const values &held, const std::string &wanted)
+inline bool moments_hold(const filter_facts &facts, moment_operator op, const values &held,
+                         const std::string *wanted)
 {
     std::vector<std::time_t> moments;
-    for (const std::string_view text : held)
-        if (const auto moment = moment_of(ctx, std::string(text)))
+    for (const std::string_view text : spend_on_each(facts, held))
+        if (const auto moment = moment_of(facts.work->ctx, std::string(text)))
             moments.push_back(*moment);
-    const auto limit = moment_of(ctx, wanted);
+    const auto limit = moment_of(facts.work->ctx, demand_text(facts, wanted));
     if (!limit)
         throw filter_error("a comparison of the filter holds no point in time", false);
     return moment_holds(op, moments, *limit);
@@ -175,8 +208,7 @@ bool compare_moments(const Node &node, const filter_facts &facts)
     const auto &comparison = static_cast<const C &>(node);
     values held;
     Values(facts, held);
-    return moments_hold(facts.ctx, static_cast<moment_operator>(comparison.compareOp), held,
-                        demand_operand(comparison.*Wanted));
+    return moments_hold(facts, static_cast<moment_operator>(comparison.compareOp), held, comparison.*Wanted);
 }
 
 template <class Node, class C, class Meta>
@@ -184,9 +216,8 @@ bool compare_named_moments(const Node &node, const filter_facts &facts)
 {
     const auto &comparison = static_cast<const C &>(node);
     values held;
-    named_moments<Meta>(facts, demand_operand(comparison.name), held);
-    return moments_hold(facts.ctx, static_cast<moment_operator>(comparison.compareOp), held,
-                        demand_operand(comparison.dateTime));
+    named_moments<Meta>(facts, demand_text(facts, comparison.name), held);
+    return moments_hold(facts, static_cast<moment_operator>(comparison.compareOp), held, comparison.dateTime);
 }
 
 // Words in the item's running text.
@@ -196,9 +227,13 @@ template <class Node, class C> bool compare_running_text(const Node &node, const
     constexpr text_operator OPERATORS[] = {text_operator::contains_phrase, text_operator::contains_all_words,
                                            text_operator::contains_some_word};
     const auto code = static_cast<std::size_t>(comparison.compareOp);
-    return code < std::size(OPERATORS) &&
-           words_hold(OPERATORS[code], running_text(facts), demand_operand(comparison.text),
-                      comparison.caseSensitive != nullptr && *comparison.caseSensitive);
+    if (code >= std::size(OPERATORS))
+        return false;
+    const word_search search(OPERATORS[code], demand_text(facts, comparison.text),
+                             comparison.caseSensitive != nullptr && *comparison.caseSensitive);
+    const std::string text = running_text(facts);
+    spend_on(facts, text);
+    return search.found_in(text);
 }
 
 // --- rows; SERVICE_FILTER(name) gives the language's class of that name, filter_node its base ---

@@ -16,7 +16,7 @@ bool compare_collections(const filter_node &node, const filter_facts &facts)
 {
     const auto &comparison =
         static_cast<const protocolUpdateOrderFilter__ProductCollectionHierarchicalComparison &>(node);
-    const std::string &wanted = demand_operand(comparison.productCollection);
+    const std::string &wanted = demand_text(facts, comparison.productCollection);
     values held;
     subject_texts<&protocol__Identity::productCollection>(facts, held);
     return std::any_of(held.begin(), held.end(), [&](std::string_view own) {
@@ -56,7 +56,8 @@ bool compare_language(const filter_node &node, const filter_facts &facts)
     const auto &comparison = static_cast<const protocolUpdateOrderFilter__LanguageComparison &>(node);
     values held;
     language_texts(facts, held);
-    return text_holds(common_operator(comparison.compareOp), held, demand_operand(comparison.language).value);
+    return texts_hold(facts, common_operator(comparison.compareOp), held,
+                      &demand_operand(comparison.language).value);
 }
 
 #define SERVICE_FILTER(name)      protocolUpdateOrderFilter__##name

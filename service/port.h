@@ -13,11 +13,19 @@
 
 #include "document.h"
 #include "enclosures.h"
+#include "filter_work.h"
 #include "make.h"
 #include "settings.h"
 #include "store.h"
 
 namespace service {
+
+// What a request may still make the service do, however small it is itself.
+struct request_work {
+    filter_work filters;
+    std::uint64_t read = 256ULL << 20; // bytes of documents that queries look through
+    std::uint64_t told = 16ULL << 20;  // bytes of documents in their answers
+};
 
 // What a handler works with. Requests and answers belong to the context `ctx`, documents read from the store
 // to the codec; both live until the answer is sent.
@@ -27,8 +35,11 @@ struct call {
     document_codec &codec;
     const settings &config;
     const protocol__Header *header; // null if the request has none
-    std::string root;   // URL of this service as the client named it, "http://host:9080"; may be empty
-    enclosures &beside; // attachments that came with the request, and those to go with the answer
+    std::string root;       // URL of this service as the client named it, "http://host:9080"; may be empty
+    enclosures &beside;     // attachments that came with the request, and those to go with the answer
+    document_codec &judged; // for documents that only a filter looks at; forgotten after each
+    std::uint64_t bytes;    // of the request, framing and compression undone, without what went to files
+    request_work work;
 };
 
 struct operation {

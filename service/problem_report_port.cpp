@@ -15,20 +15,27 @@ using acknowledgment = protocolProblemReport__Answer_x002eServer_x002eAdministra
 using action_answer = protocolProblemReport__Answer_x002eServer_x002eAction;
 using install = protocolProblemReport__Action_x002eUpdate_x002eInstall;
 
+constexpr std::size_t SEARCHED_MAX =
+    64 << 10; // bytes of a title and of a description that are searched for known problems
+
 report_rules<report> rules_of(call &c)
 {
     return {c, "ProblemReport", "problemreport"};
 }
 
-// How sure the service is that an update helps, in per cent; null if it doesn't.
-const char *confidence_of(const std::string &text, const update_record &update)
+bool finds(text_operator op, const std::string &wanted, std::string_view text)
 {
-    if (words_hold(text_operator::contains_phrase, text, text_of(update.updateId), false))
+    return word_search(op, wanted, false).found_in(text);
+}
+
+// How sure the service is that an update helps, in per cent; null if it doesn't.
+const char *confidence_of(std::string_view text, const update_record &update)
+{
+    if (finds(text_operator::contains_phrase, text_of(update.updateId), text))
         return "90";
     for (const protocolUpdateOrder__Corrected *corrected : update.corrected)
         if (corrected->problemReport != nullptr &&
-            words_hold(text_operator::contains_all_words, text, text_of(corrected->problemReport->title),
-                       false))
+            finds(text_operator::contains_all_words, text_of(corrected->problemReport->title), text))
             return "75";
     return nullptr;
 }
@@ -57,7 +64,8 @@ void give_answers(call &c, report &r)
     auto *const received = make<acknowledgment>(c.ctx);
     received->description = make_text(c.ctx, "The report was received and is being worked on.");
     r.answer = {received};
-    const std::string text = text_of(r.title) + "\n" + text_of(r.problemDescription);
+    std::string text = text_of(r.title).substr(0, SEARCHED_MAX) + "\n";
+    text.append(text_of(r.problemDescription), 0, SEARCHED_MAX);
     for (const update_record *update : the_catalogue().all())
         if (const char *const confidence = confidence_of(text, *update))
             r.answer.push_back(proposal(c, *update, confidence));

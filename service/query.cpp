@@ -42,24 +42,40 @@ constexpr country_row COUNTRIES[] = {{"AT", "Austria"}, {"CH", "Switzerland"},  
 
 // --- reports ---
 
-void add_report(call &c, std::vector<report *> &found, const protocolPRFilter__Filter *filter,
-                report *candidate)
+void add_report(call &c, std::vector<report *> &found, report *passing)
 {
-    if (filter != nullptr && !filter_holds(*filter, facts_of(c.ctx, *candidate)))
-        return;
-    if (found.size() == REPORTS_MAX) {
-        auto *const fault =
-            make_fault<protocol__Server_x002eDataTooLarge>(c.ctx, "The filter lets too many reports pass.");
-        refuse(fault);
-    }
-    found.push_back(candidate);
+    if (found.size() == REPORTS_MAX)
+        refuse<protocol__Server_x002eDataTooLarge>(c.ctx, "The filter lets too many reports pass.");
+    found.push_back(passing);
+}
+
+// A query looks through all documents, and each may be asked for by many queries of the request.
+void spend(call &c, std::uint64_t &left, std::size_t bytes, const char *refused)
+{
+    if (bytes > left)
+        refuse<protocol__Server_x002eDataTooLarge>(c.ctx, refused);
+    left -= bytes;
+}
+
+// Judges a document without keeping its objects.
+bool report_passes(call &c, const protocolPRFilter__Filter *filter, std::string_view xml)
+{
+    if (filter == nullptr)
+        return true;
+    c.judged.forget();
+    return filter_holds(*filter, facts_of(c.work.filters, *c.judged.read<report>(xml), xml.size()));
 }
 
 protocol__QueryResponse *query_reports(call &c, const protocolProblemReport__QueryReportsRequest &request)
 {
     auto *const response = make<protocolProblemReport__QueryReportsResponse>(c.ctx);
     c.documents.each(problem_report_port.name, [&](std::string_view xml) {
-        add_report(c, response->problemReport, request.inclusionFilter, c.codec.read<report>(xml));
+        spend(c, c.work.read, xml.size(),
+              "There are more reports than the queries of one request look through.");
+        if (report_passes(c, request.inclusionFilter, xml)) {
+            spend(c, c.work.told, xml.size(), "The reports that pass are too large for one answer.");
+            add_report(c, response->problemReport, c.codec.read<report>(xml));
+        }
         return true;
     });
     return response;
@@ -72,8 +88,10 @@ protocol__QueryResponse *query_patterns(call &c,
     auto *const response = make<protocolProblemReport__QueryPatternReportsResponse>(c.ctx);
     for (const update_record *update : the_catalogue().all())
         for (const protocolUpdateOrder__Corrected *corrected : update->corrected)
-            if (corrected->problemReport != nullptr)
-                add_report(c, response->problemReport, request.inclusionFilter, corrected->problemReport);
+            if (corrected->problemReport != nullptr &&
+                (request.inclusionFilter == nullptr ||
+                 filter_holds(*request.inclusionFilter, facts_of(c.work.filters, *corrected->problemReport))))
+                add_report(c, response->problemReport, corrected->problemReport);
     return response;
 }
 
@@ -82,10 +100,11 @@ protocol__QueryResponse *query_patterns(call &c,
 protocol__QueryResponse *query_subjects(call &c, const protocol__QueryRecognizedSubjectsRequest &request)
 {
     auto *const response = make<protocol__QueryRecognizedSubjectsResponse>(c.ctx);
+    const subject_properties wanted(request.includeSubjectProperty.begin(),
+                                    request.includeSubjectProperty.end());
     for (const protocol__Identity *subject : known_subjects(false))
-        if (subject_passes(c.ctx, request.inclusionFilter, *subject))
-            response->recognizedSubject.push_back(
-                recognized(c.ctx, *subject, request.includeSubjectProperty));
+        if (subject_passes(c.work.filters, request.inclusionFilter, *subject))
+            response->recognizedSubject.push_back(recognized(c.ctx, *subject, wanted));
     return response;
 }
 
@@ -97,7 +116,7 @@ protocol__QueryResponse *query_languages(call &c, const protocol__QueryRecognize
         for (protocol__LanguageDetail *detail : update->languageDetail) {
             update_record judged;
             judged.languageDetail.push_back(detail);
-            if (!passes(request.inclusionFilter, facts_of(c.ctx, judged)) ||
+            if (!passes(request.inclusionFilter, facts_of(c.work.filters, judged)) ||
                 !told.insert(detail->language->value).second)
                 continue;
             auto *const language = make<protocol__RecognizedLanguage>(c.ctx);
@@ -118,7 +137,7 @@ protocol__QueryResponse *query_countries(call &c, const protocol__QueryRecognize
         submitter.country = &code;
         report judged;
         judged.submitter = &submitter;
-        if (!passes(request.inclusionFilter, facts_of(c.ctx, judged)))
+        if (!passes(request.inclusionFilter, facts_of(c.work.filters, judged)))
             continue;
         auto *const country = make<protocol__RecognizedCountry>(c.ctx);
         country->country = make_text(c.ctx, row.code);
@@ -135,7 +154,7 @@ query_categories(call &c, const protocolUpdateOrder__QueryRecognizedCategoriesRe
     for (const category_row &row : CATEGORIES) {
         update_record judged;
         judged.category.emplace_back(row.name);
-        if (!passes(request.inclusionFilter, facts_of(c.ctx, judged)))
+        if (!passes(request.inclusionFilter, facts_of(c.work.filters, judged)))
             continue;
         auto *const category = make<protocolUpdateOrder__RecognizedCategory>(c.ctx);
         category->category = make_text(c.ctx, row.name);
@@ -153,7 +172,7 @@ query_attributes(call &c, const protocolUpdateOrder__QueryRecognizedAttributesRe
         for (attribute *known : update->attribute) {
             update_record judged;
             judged.attribute.push_back(known);
-            if (!passes(request.inclusionFilter, facts_of(c.ctx, judged)))
+            if (!passes(request.inclusionFilter, facts_of(c.work.filters, judged)))
                 continue;
             auto *const told = make<protocolUpdateOrder__RecognizedAttribute>(c.ctx);
             told->attribute = known;

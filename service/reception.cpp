@@ -9,6 +9,7 @@
 
 #include <openssl/crypto.h>
 
+#include <zuv_client_pro/soap_attachment.h>
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_tcp.h>
 
@@ -53,14 +54,6 @@ void settle_framing(soap *ctx, bool chunks_wanted)
         (ctx->output_mode & ~MODE_IO_MASK) | (chunks_wanted && !old ? MODE_CHUNKED : MODE_BUFFERED);
 }
 
-std::string page()
-{
-    std::string html = "<!DOCTYPE html><html><head><title>zuv-service</title></head><body><p>Ports:</p><ul>";
-    for (const port *p : all_ports())
-        html.append("<li>").append(SERVICES_PATH).append(p->name).append("</li>");
-    return html + "</ul></body></html>\r\n";
-}
-
 } // namespace
 
 reception::reception(soap *ctx, const settings &config, session &lent)
@@ -80,18 +73,20 @@ reception::reception(soap *ctx, const settings &config, session &lent)
 void reception::install_attachment_hooks(soap *ctx)
 {
     ctx->dime_write_open = [](soap *c, const char *id, const char *, const char *) {
-        return of(c).enclosures_.open(c, id);
+        return of(c).enclosures_.open(c, id, MIME_NONE);
     };
-    ctx->mime_write_open = [](soap *c, void *, const char *id, const char *, const char *, int) {
-        return of(c).enclosures_.open(c, id);
+    ctx->mime_write_open = [](soap *c, void *, const char *id, const char *, const char *, int encoding) {
+        return of(c).enclosures_.open(c, id, encoding);
     };
     ctx->dime_write = ctx->mime_write = [](soap *c, void *handle, const char *data, std::size_t length) {
         reception &self = of(c);
-        self.body_bytes_ -= std::min<std::uint64_t>(length, self.body_bytes_); // it stays in no memory
-        self.deadline_ += ATTACHED_BYTE_TIME * static_cast<long>(length);
-        return self.enclosures_.write(handle, data, length);
+        if (enclosures::is_in_file(handle)) {
+            self.body_bytes_ -= std::min<std::uint64_t>(length, self.body_bytes_); // it stays in no memory
+            self.deadline_ += ATTACHED_BYTE_TIME * static_cast<long>(length);
+        }
+        return self.enclosures_.write(c, handle, data, length);
     };
-    ctx->dime_write_close = ctx->mime_write_close = [](soap *, void *handle) { enclosures::close(handle); };
+    ctx->dime_write_close = ctx->mime_write_close = enclosures::close;
     ctx->dime_read_open =
         ctx->mime_read_open = [](soap *c, void *handle, const char *, const char *, const char *) {
             return of(c).enclosures_.reopen(c, handle);
@@ -106,8 +101,7 @@ void reception::expect_next()
     started_ = too_slow_ = false;
     body_bytes_ = 0;
     target_ = nullptr;
-    root_.clear();
-    path_.clear();
+    where_ = {};
     enclosures_.expect_next();
 }
 
@@ -149,6 +143,21 @@ int reception::count_body(soap *ctx, const char *, std::size_t length)
 // ---------------------------------------------------------------------------------------------
 // Heads.
 
+// Looks at what the request is for, then answers it. The library calls the hooks, and nothing may be thrown
+// through it.
+template <class Answer> int reception::answered(soap *ctx, Answer answer)
+{
+    reception &self = of(ctx);
+    try {
+        if (const int refused = self.settle_request(ctx))
+            return ctx->error = refused;
+        return answer(self);
+    } catch (const std::exception &failure) {
+        std::fprintf(stderr, "zuv-service: %s\n", failure.what());
+        return ctx->error = INTERNAL_ERROR;
+    }
+}
+
 int reception::read_head(soap *ctx)
 {
     reception &self = of(ctx);
@@ -159,9 +168,9 @@ int reception::read_head(soap *ctx)
         return result;
     if (std::string_view(ctx->message_text).find(" HTTP/1.") == std::string_view::npos)
         return ctx->error = BAD_REQUEST; // the library leaves what isn't HTTP to its caller
-    if (const int refused = self.settle_request(ctx))
-        return ctx->error = refused;
-    return self.target_ == nullptr && self.data_name().empty() ? ctx->error = NOT_FOUND : 0;
+    return answered(ctx, [ctx](const reception &known) {
+        return known.target_ == nullptr && known.data_name().empty() ? ctx->error = NOT_FOUND : 0;
+    });
 }
 
 bool reception::knows_sender(const soap *ctx) const
@@ -173,18 +182,13 @@ bool reception::knows_sender(const soap *ctx) const
     return user && password;
 }
 
-// Splits the URL that the request is for, and says what keeps the request from being looked at: 0 or an HTTP
+// Takes the URL that the request is for, and says what keeps the request from being looked at: 0 or an HTTP
 // status.
 int reception::settle_request(soap *ctx)
 {
-    std::string_view url = ctx->endpoint;
-    const std::size_t scheme = url.find("://");
-    const std::size_t path =
-        scheme == std::string_view::npos ? 0 : std::min(url.find('/', scheme + 3), url.size());
-    root_ = url.substr(0, path);
-    url.remove_prefix(path);
-    path_ = url.substr(0, url.find('?'));
-    target_ = find_port(path_);
+    where_ = parse_target(ctx->endpoint, ctx->socket);
+    target_ = find_port(where_.path);
+    ctx->max_message = data_name().empty() ? config_.message_limit() : 0; // data goes to a file
     if (!knows_sender(ctx)) {
         ctx->auth_realm = REALM;
         return UNAUTHORIZED;
@@ -195,8 +199,8 @@ int reception::settle_request(soap *ctx)
 
 std::string_view reception::data_name() const
 {
-    return path_.starts_with(DATA_PATH) ? std::string_view(path_).substr(DATA_PATH.size())
-                                        : std::string_view();
+    return where_.path.starts_with(DATA_PATH) ? std::string_view(where_.path).substr(DATA_PATH.size())
+                                              : std::string_view();
 }
 
 // An answer that refuses the method names the one that is served.
@@ -215,28 +219,14 @@ int reception::answer_get(soap *ctx)
 {
     if (!data_name().empty())
         return send_data(ctx, lent_.documents, data_name());
-    const std::string contract =
-        contract_document(std::string_view(ctx->endpoint).substr(root_.size()), root_);
+    const std::string contract = contract_document(where_);
     if (!contract.empty())
         return send_file(ctx, "text/xml; charset=utf-8", contract);
     if (target_ != nullptr)
         return ctx->error = METHOD_NOT_ALLOWED; // ports are called, not fetched
-    return path_ == "/" || path_ == SERVICES_PATH ? send_file(ctx, "text/html; charset=utf-8", page())
-                                                  : ctx->error = NOT_FOUND;
-}
-
-// Runs what answers a method. The library calls the hooks, and nothing may be thrown through it.
-template <class Answer> int reception::answered(soap *ctx, Answer answer)
-{
-    reception &self = of(ctx);
-    try {
-        if (const int refused = self.settle_request(ctx))
-            return ctx->error = refused;
-        return answer(self);
-    } catch (const std::exception &failure) {
-        std::fprintf(stderr, "zuv-service: %s\n", failure.what());
-        return ctx->error = INTERNAL_ERROR;
-    }
+    if (where_.path != "/" && where_.path != SERVICES_PATH && where_.path != CONTRACT_PATH)
+        return ctx->error = NOT_FOUND;
+    return send_file(ctx, "text/html; charset=utf-8", contract_page(where_));
 }
 
 int reception::get(soap *ctx)

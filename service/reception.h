@@ -14,6 +14,7 @@
 
 #include "enclosures.h"
 #include "port.h"
+#include "request_target.h"
 #include "session.h"
 #include "settings.h"
 
@@ -35,10 +36,15 @@ public:
     bool started() const { return started_; } // some byte has arrived
     bool too_large() const { return body_bytes_ > body_limit() || enclosures_.too_large(); }
     bool too_slow() const { return too_slow_; }
-    const port *target() const { return target_; } // null if no head was read, or none of a call
-    std::string_view data_name() const;            // below the path of data; empty for another path
-    const std::string &root() const { return root_; }
+    std::uint64_t message_bytes() const { return body_bytes_; } // that came and belong to no file
+    const port *target() const { return target_; }              // null if no head was read, or none of a call
+    std::string_view data_name() const; // below the path of data; empty for another path
+    const std::string &root() const { return where_.root; }
     enclosures &enclosed() { return enclosures_; }
+
+    // What the exchange held in its context, beside the documents that were read for it.
+    void note_memory(std::int64_t bytes) { memory_ = bytes + static_cast<std::int64_t>(lent_.codec.held()); }
+    std::int64_t memory() const { return memory_; }
 
 private:
     // Bytes of a body that belong to no file; all of the data that comes to a data port does. Bytes that
@@ -68,9 +74,10 @@ private:
     session &lent_;
     bool started_ = false, too_slow_ = false;
     std::uint64_t body_bytes_ = 0;
+    std::int64_t memory_ = 0;
     std::chrono::steady_clock::time_point deadline_;
     const port *target_ = nullptr;
-    std::string root_, path_;
+    request_target where_;
     enclosures enclosures_;
 };
 

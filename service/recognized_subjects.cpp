@@ -5,12 +5,15 @@
 #include <set>
 
 #include "catalogue.h"
+#include "faults.h"
 #include "filter.h"
 #include "make.h"
 
 namespace service {
 
 namespace {
+
+constexpr std::size_t ROOTS_MAX = 1000; // product collections that one query names
 
 using property = protocol__SubjectProperty;
 using collection = protocolUpdateOrder__RecognizedProductCollection;
@@ -64,7 +67,8 @@ bool is_true(const bool *member)
 class collection_lister {
 public:
     collection_lister(call &c, const collection_query &request)
-        : ctx_(c.ctx), request_(request),
+        : ctx_(c.ctx), work_(c.work.filters), request_(request),
+          wanted_(request.includeSubjectProperty.begin(), request.includeSubjectProperty.end()),
           subjects_(known_subjects(is_true(request.includeImplicitExclusions)))
     {}
 
@@ -114,7 +118,7 @@ private:
     {
         return std::any_of(subjects_.begin(), subjects_.end(), [&](const protocol__Identity *subject) {
             return text_of(subject->productCollection) == id &&
-                   subject_passes(ctx_, request_.subjectInclusionFilter, *subject);
+                   subject_passes(work_, request_.subjectInclusionFilter, *subject);
         });
     }
 
@@ -125,7 +129,7 @@ private:
         protocol__Identity judged;
         judged.productCollection = &id;
         judged.productCollectionName = &name;
-        if (!subject_passes(ctx_, request_.productCollectionInclusionFilter, judged))
+        if (!subject_passes(work_, request_.productCollectionInclusionFilter, judged))
             return nullptr;
         auto *const told = make<collection>(ctx_);
         told->productCollection = make_text(ctx_, id);
@@ -140,15 +144,16 @@ private:
         auto *const meta = make<protocolUpdateOrder__RecognizedProductCollectionMetaData>(ctx_);
         for (const protocol__Identity *subject : subjects_)
             if (text_of(subject->productCollection) == *told.productCollection &&
-                subject_passes(ctx_, request_.subjectInclusionFilter, *subject))
-                meta->recognizedSubject.push_back(
-                    recognized(ctx_, *subject, request_.includeSubjectProperty));
+                subject_passes(work_, request_.subjectInclusionFilter, *subject))
+                meta->recognizedSubject.push_back(recognized(ctx_, *subject, wanted_));
         if (!meta->recognizedSubject.empty())
             told.recognizedProductCollectionMetaData = meta;
     }
 
     soap *ctx_;
+    filter_work &work_;
     const collection_query &request_;
+    const subject_properties wanted_;
     std::vector<const protocol__Identity *> subjects_;
 };
 
@@ -177,16 +182,16 @@ bool passes(const protocol__Filter *filter, const filter_facts &facts)
     throw filter_error("the filter does not state its class", false);
 }
 
-bool subject_passes(soap *ctx, const protocol__Filter *filter, const protocol__Identity &subject)
+bool subject_passes(filter_work &work, const protocol__Filter *filter, const protocol__Identity &subject)
 {
     filter_facts facts;
-    facts.ctx = ctx;
+    facts.work = &work;
     facts.subjects.push_back(&subject);
     return passes(filter, facts);
 }
 
 protocol__RecognizedSubject *recognized(soap *ctx, const protocol__Identity &subject,
-                                        const std::vector<property> &wanted)
+                                        const subject_properties &wanted)
 {
     auto *const told = make<protocol__RecognizedSubject>(ctx);
     if (wanted.empty())
@@ -201,6 +206,8 @@ protocol__RecognizedSubject *recognized(soap *ctx, const protocol__Identity &sub
 
 protocol__QueryResponse *query_collections(call &c, const collection_query &request)
 {
+    if (request.productCollectionHierarchyRoot.size() > ROOTS_MAX)
+        refuse<protocol__Client_x002eInvalidRequest>(c.ctx, "The query names too many product collections.");
     auto *const response = make<protocolUpdateOrder__QueryRecognizedProductCollectionsResponse>(c.ctx);
     collection_lister lister(c, request);
     response->recognizedProductCollection =

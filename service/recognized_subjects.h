@@ -2,6 +2,7 @@
 // them.
 #pragma once
 
+#include <set>
 #include <vector>
 
 #include <zuv_client_pro/protocol.h>
@@ -19,11 +20,13 @@ std::vector<const protocol__Identity *> known_subjects(bool with_excluded);
 // True if an item passes a filter of either language, or if there is none. Throws filter_error, also for a
 // filter of neither language.
 bool passes(const protocol__Filter *filter, const filter_facts &facts);
-bool subject_passes(soap *ctx, const protocol__Filter *filter, const protocol__Identity &subject);
+bool subject_passes(filter_work &work, const protocol__Filter *filter, const protocol__Identity &subject);
+
+using subject_properties = std::set<protocol__SubjectProperty>;
 
 // A subject with the members asked for; with all of them if none is named.
 protocol__RecognizedSubject *recognized(soap *ctx, const protocol__Identity &subject,
-                                        const std::vector<protocol__SubjectProperty> &wanted);
+                                        const subject_properties &wanted);
 
 // The product collections, flat or nested.
 protocol__QueryResponse *

@@ -6,7 +6,6 @@
 #include <cstdio>
 #include <stdexcept>
 
-#include <netinet/in.h>
 #include <sys/socket.h>
 
 #include <zuv_client_pro/soap_error.h>
@@ -15,6 +14,7 @@
 
 #include "connection.h"
 #include "data_files.h"
+#include "request_target.h"
 
 namespace service {
 
@@ -37,17 +37,6 @@ std::string error_text(soap *ctx)
     return soap_fault_print_text(ctx, text, sizeof text);
 }
 
-int bound_port(int socket)
-{
-    sockaddr_storage address{};
-    socklen_t length = sizeof address;
-    if (getsockname(socket, reinterpret_cast<sockaddr *>(&address), &length) != 0)
-        throw std::runtime_error("cannot tell the port");
-    if (address.ss_family == AF_INET6)
-        return ntohs(reinterpret_cast<const sockaddr_in6 &>(address).sin6_port);
-    return ntohs(reinterpret_cast<const sockaddr_in &>(address).sin_port);
-}
-
 } // namespace
 
 server::server(const settings &config, database &place)
@@ -60,6 +49,8 @@ server::server(const settings &config, database &place)
                [&documents](std::string_view name) { return documents.data_size(name).has_value(); });
     master_.bind_flags = SO_REUSEADDR;
     master_.max_depth = config.depth_limit;
+    master_.max_message = config.message_limit();
+    master_.max_memory = config.memory_limit();
     master_.recv_timeout = master_.send_timeout = config.idle_seconds;
     if (!config.trace.empty()) {
         soap_log_set_received(&master_, config.trace.c_str());
@@ -67,7 +58,7 @@ server::server(const settings &config, database &place)
     }
     if (soap_bind(&master_, config.host.c_str(), config.port, BACKLOG) < 0)
         throw std::runtime_error(error_text(&master_));
-    port_ = bound_port(master_.master_socket);
+    port_ = port_of(master_.master_socket);
 }
 
 server::~server()

@@ -9,10 +9,11 @@ namespace service {
 
 struct session {
     session(database &place, const settings &config)
-        : documents(place), codec(config.body_limit, config.depth_limit)
+        : documents(place), codec(config.body_limit, config.depth_limit, config.memory_limit()),
+          judged(config.body_limit, config.depth_limit, config.memory_limit())
     {}
     store documents;
-    document_codec codec;
+    document_codec codec, judged;
 };
 
 } // namespace service

@@ -37,7 +37,7 @@ public:
         document.thisURI = {std::string("urn:zuv:") + kind_ + ":" + fresh_uuid()};
         store::writing transaction(call_.documents);
         prepare();
-        const std::string xml = call_.codec.write(document);
+        const std::string xml = call_.codec.write(document, call_.bytes);
         call_.documents.insert(port_, document.thisURI.front(), state_of(document), xml);
         transaction.commit();
     }
@@ -48,6 +48,7 @@ public:
         const std::optional<std::string> xml = call_.documents.find(port_, uri);
         if (!xml)
             refuse_not_found(call_.ctx, uri);
+        found_bytes_ = xml->size();
         try {
             return call_.codec.template read<Document>(*xml);
         } catch (const document_error &error) {
@@ -60,7 +61,8 @@ public:
     {
         store::writing transaction(call_.documents);
         Document *const changed = alter(find(uri));
-        call_.documents.replace(port_, uri, state_of(*changed), call_.codec.write(*changed));
+        call_.documents.replace(port_, uri, state_of(*changed),
+                                call_.codec.write(*changed, found_bytes_ + call_.bytes));
         transaction.commit();
         return changed;
     }
@@ -84,6 +86,7 @@ private:
     call &call_;
     const char *port_;
     const char *kind_;
+    std::uint64_t found_bytes_ = 0; // of the document found last
 };
 
 } // namespace service

@@ -1,7 +1,10 @@
 // store.cpp - see store.h.
 #include "store.h"
 
+#include <fcntl.h>
 #include <sqlite3.h>
+#include <sys/stat.h>
+#include <unistd.h>
 
 namespace service {
 
@@ -36,6 +39,18 @@ void bind_blob(sqlite3_stmt *prepared, int place, std::string_view bytes)
     sqlite3_bind_blob64(prepared, place, bytes.empty() ? "" : bytes.data(), bytes.size(), SQLITE_STATIC);
 }
 
+// Documents hold names and credentials: a new database is its owner's alone whatever the umask is, and so are
+// the files that SQLite keeps beside it, which take its mode. One that is there keeps the mode that it was
+// given.
+void create_private(const std::string &path)
+{
+    const int descriptor = open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, S_IRUSR | S_IWUSR);
+    if (descriptor < 0)
+        return; // it is there, or can't be had, of which SQLite tells
+    fchmod(descriptor, S_IRUSR | S_IWUSR);
+    close(descriptor);
+}
+
 // Gives the statement back for its next use, whatever happens.
 struct rewinder {
     sqlite3_stmt *prepared;
@@ -60,6 +75,7 @@ void store::closer::operator()(sqlite3_stmt *prepared) const
 
 store::store(database &place) : place_(place)
 {
+    create_private(place.path);
     sqlite3 *handle = nullptr;
     const int opened =
         sqlite3_open_v2(place.path.c_str(), &handle,

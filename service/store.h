@@ -34,7 +34,7 @@ struct database {
 
 class store {
 public:
-    // Opens the file; makes it and its table unless they are there.
+    // Opens the file; makes it, for its owner alone (mode 0600), and its tables unless they are there.
     explicit store(database &place);
     ~store();
     store(const store &) = delete;

@@ -16,6 +16,9 @@ using order = protocolUpdateOrder__UpdateOrderContent;
 using state = protocolUpdateOrder__UpdateOrderState;
 using detail = protocolUpdateOrder__UpdateIdExpansionDetail;
 
+constexpr std::size_t NAMES_MAX = 10000;    // identifiers and scopes of one order
+constexpr std::size_t DELIVERIES_MAX = 100; // delivery preferences of one order
+
 report_rules<order> rules_of(call &c)
 {
     return {c, "UpdateOrder", "updateorder"};
@@ -82,27 +85,30 @@ void tell_unknown(call &c, order &o, const unknown_update &unknown)
     o.updateIdExpansionDetail.push_back(told);
 }
 
-// Null if the service can deliver as one of the preferences asks.
+bool wants_physical(const protocolUpdateOrder__DeliveryPreference &wish)
+{
+    return wish.medium != nullptr && *wish.medium == protocol__Medium::physical;
+}
+
+// Null if the service can deliver as one of the preferences asks; otherwise what is wrong with the last.
 protocol__Fault *undeliverable(call &c, const order &o)
 {
-    protocol__Fault *fault = nullptr;
+    const protocolUpdateOrder__DeliveryPreference *last = nullptr;
     for (const protocolUpdateOrder__DeliveryPreference *wish : o.deliveryPreference) {
         if (wish == nullptr)
             continue;
-        if (wish->medium != nullptr && *wish->medium == protocol__Medium::physical) {
-            auto *const refused = make_fault<protocol__Client_x002eDeliveryIncompatibility>(
-                c.ctx, "The service delivers electronically only.");
-            refused->deliverySupported.push_back(make<protocol__DeliverySupported>(c.ctx));
-            refused->deliverySupported.back()->medium = make_value(c.ctx, protocol__Medium::electronic);
-            fault = refused;
-        } else if (protocol__Fault *const port =
-                       incompatibility(c, wish->dataPortPreference, protocol__Direction::out)) {
-            fault = port;
-        } else {
+        if (!wants_physical(*wish) && serves(c, wish->dataPortPreference, protocol__Direction::out))
             return nullptr;
-        }
+        last = wish;
     }
-    return fault;
+    if (last == nullptr || !wants_physical(*last))
+        return last == nullptr ? nullptr
+                               : incompatibility(c, last->dataPortPreference, protocol__Direction::out);
+    auto *const refused = make_fault<protocol__Client_x002eDeliveryIncompatibility>(
+        c.ctx, "The service delivers electronically only.");
+    refused->deliverySupported.push_back(make<protocol__DeliverySupported>(c.ctx));
+    refused->deliverySupported.back()->medium = make_value(c.ctx, protocol__Medium::electronic);
+    return refused;
 }
 
 protocol__Attachment *delivery_of(call &c, const update_record &update)
@@ -136,13 +142,23 @@ state deliver(call &c, order &o, const expansion &found)
                                  : state::complete_x002eavailable_x002epartial;
 }
 
+// Each name and each wish costs the service more than the client that repeats it.
+void refuse_endless(call &c, const order &o)
+{
+    if (o.updateId.size() + o.updateIdQualified.size() + o.updateScope.size() > NAMES_MAX)
+        refuse<protocol__Client_x002eInvalidRequest>(c.ctx, "The order names too many updates and scopes.");
+    if (o.deliveryPreference.size() > DELIVERIES_MAX)
+        refuse<protocol__Client_x002eInvalidRequest>(c.ctx, "The order holds too many delivery preferences.");
+}
+
 expansion expansion_of(call &c, const order &o)
 {
     if (!names_updates(o))
         refuse<protocol__Client_x002eInsufficientInformation>(
             c.ctx, "The order names no updates: neither identifiers nor a scope nor a filter.");
+    refuse_endless(c, o);
     try {
-        return expand(c.ctx, the_catalogue(), o);
+        return expand(c.work.filters, the_catalogue(), o);
     } catch (const filter_error &error) {
         refuse_filter(c.ctx, error);
     }

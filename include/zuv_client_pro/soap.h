@@ -9,7 +9,7 @@
 // Arguments are needed only during a call unless a function says otherwise; text fields marked
 // "borrowed" keep the pointer, so the caller's text must outlive its use. Operations return 0 or an
 // error code of soap_error.h, which also stands in `error`. Time limits: 0 none, positive seconds,
-// negative microseconds.
+// negative microseconds; they run on the system's monotonic clock, whatever signals arrive.
 #pragma once
 
 #include <cstddef>
@@ -47,7 +47,8 @@ constexpr std::uint64_t SOAP_MAX_MESSAGE = std::uint64_t{1} << 30;  // bytes; de
 constexpr std::uint64_t SOAP_MAX_MEMORY = std::uint64_t{512} << 20; // bytes; default of soap::max_memory
 
 // ---------------------------------------------------------------------------------------------
-// Mode flags: the same values serve `mode`, `input_mode` and `output_mode`.
+// Mode flags: the same values serve `mode`, `input_mode` and `output_mode`. 0x100000 and 0x200000 are the
+// reader's own: further encodings of received text.
 
 constexpr std::uint32_t MODE_IO_MASK = 0x3;     // the two bits that choose how bytes leave
 constexpr std::uint32_t MODE_DIRECT = 0x0;      // no buffering: each write goes out
@@ -146,7 +147,9 @@ struct soap_prefix_cache {
 // Attribute of the current element (writer and reader); records and value buffers are reused within a call.
 // Each record is one block of SOAP_MALLOC (soap_memory.h).
 struct soap_attribute {
-    soap_attribute *next;
+    soap_attribute *next;      // in soap::attribute_list, which holds the visible ones
+    soap_attribute *chain;     // next record of the same hash chain, visible or idle
+    std::uint32_t hash;        // of the name
     std::int16_t escape;       // flag handed to soap_text_write for the value
     char *value;               // owned buffer (another block of SOAP_MALLOC), or null
     std::size_t size;          // capacity of `value`, bytes
@@ -224,6 +227,19 @@ struct soap_mime_state {
     char *start;                   // Content-ID of the SOAP part; managed memory; null for the first part
 };
 
+// Where the connection of a client leads and under which rules it was made: what the next call must want
+// alike to be carried by it. Set when the connection is opened, private to the transport.
+struct soap_route {
+    bool known;          // false: no connection, or one that was not opened for a call
+    bool secure;         // TLS
+    bool datagrams;      // UDP
+    std::uint16_t rules; // tls_flags when it was made
+    int port, proxy_port;
+    char host[SOAP_TEXT_SIZE];
+    char proxy_host[SOAP_TEXT_SIZE]; // empty: direct. A copy, as the host's text may change in place; a
+                                     // longer one is cut and so equals none
+};
+
 // ---------------------------------------------------------------------------------------------
 // The context.
 
@@ -242,14 +258,19 @@ struct ZUV_CLASS soap {
     const char *actor;          // borrowed; actor or role to send, and the one this receiver plays
     const char *language;       // borrowed; xml:lang of fault texts
     int recv_timeout, send_timeout, connect_timeout, accept_timeout; // 0 none, > 0 s, < 0 us
-    int call_timeout;          // the same for a whole exchange, from connecting to the response's last byte
-    std::uint32_t legacy;      // LEGACY_...
-    std::uint64_t max_message; // most bytes of one message's XML, both ways, as plain text: after framing and
-                               // decompression, attachments through callbacks not counted; 0 no limit
-    std::uint64_t max_memory;  // most bytes held for one message in objects, texts, blocks and attachments; 0
-                               // no limit
-    int socket_flags;          // flags for send and recv
-    int connect_flags;         // SOL_SOCKET option to set on a client socket, or SO_LINGER; 0 none
+    int call_timeout;           // the same for a whole exchange, from connecting to the response's last byte
+    std::int64_t call_deadline; // when call_timeout ends the exchange under way; microseconds of the
+                                // monotonic clock; 0 none
+    bool call_expired;          // call_timeout has ended the exchange, and so is what error texts name
+    std::uint32_t legacy;       // LEGACY_...
+    std::uint64_t max_message;  // most bytes of one message's XML, both ways, as plain text: framing and
+                                // compression undone, attachments not counted; 0 no limit. Beyond: error 45,
+                                // and the connection is closed
+    std::uint64_t max_memory;   // most bytes held for one received message in objects, texts, blocks and
+                                // attachments, and for one to be sent that is stored; 0 no limit. Beyond: as
+                                // above. Looked at after each buffer of input and at the message's end
+    int socket_flags;           // flags for send and recv
+    int connect_flags;          // SOL_SOCKET option to set on a client socket, or SO_LINGER; 0 none
     int bind_flags, accept_flags;          // the same for a listening and an accepted socket
     std::uint16_t linger_seconds;          // l_linger when the option above is SO_LINGER
     const soap_namespace *namespaces;      // borrowed; static table
@@ -274,8 +295,11 @@ struct ZUV_CLASS soap {
     std::uint32_t next_id;              // last number given to a marked object
     void *user;                         // free for the application
     soap_plugin_record *plugin_list;    // newest first
-    const char *auth_user, *auth_password; // HTTP Basic credentials; managed memory or the host's
-    const char *auth_realm;                // from a received challenge; managed
+    const char *auth_user, *auth_password; // HTTP Basic credentials; managed memory, which is wiped when it
+                                           // is freed, or the host's
+    bool credentials_passed; // some lie in `buffer` and the scratch texts, which soap_block_free with null
+                             // wipes
+    const char *auth_realm;  // from a received challenge; managed
 
     // Callbacks. All take the context first. A null entry is skipped.
     int (*on_post)(soap *ctx, const char *endpoint, const char *host, int port, const char *path,
@@ -334,6 +358,9 @@ struct ZUV_CLASS soap {
     bool socket_abandoned;    // soap_force_close closed `socket`: the number is neither used nor closed again
     bool response_unfinished; // the last response was not read to its end: the connection carries no other
                               // call
+    bool socket_accepted;     // `socket` is of soap_accept
+    bool master_shared;       // master_socket is that of the context that this is a copy of: not closed here
+    soap_route route;         // of `socket`
     std::ostream *output_stream; // borrowed; in place of the socket
     std::istream *input_stream;  // borrowed; in place of the socket
     int send_fd;                 // used for output when there is no socket
@@ -383,7 +410,7 @@ struct ZUV_CLASS soap {
     std::int16_t message_part;    // PART_...
     std::uint64_t chunk_size;     // input: bytes left in the chunk; output: total sent in chunks
     std::size_t chunk_buffer_length; // bytes of `buffer` that the chunk parser owns
-    std::uint64_t body_received;     // input: raw bytes of the body received since the head
+    std::uint64_t body_received;     // input: raw bytes received since the head, or with none the start
     std::size_t raw_index;           // input: next raw byte in zlib_buffer while raw_aside is set
     bool raw_aside;            // input: raw bytes lie in zlib_buffer, and `buffer` holds what is made of them
     bool content_length_given; // input: the head held a Content-Length; set by the head reader
@@ -391,6 +418,15 @@ struct ZUV_CLASS soap {
     bool body_ended;           // input: the last chunk and what follows it were read, or framing broke
     bool prepare_held;         // input: on_recv_prepare sees nothing yet, as the body has not been found
     bool framing_doubtful;     // input: framing was broken or something stood behind the message
+    std::uint64_t plain_received;    // input: bytes of the body, framing and compression undone
+    std::uint64_t attached_received; // input: those of them that went to attachments
+    std::uint64_t bytes_copied;      // input: what references and QNames have added by copying
+    std::int64_t memory_held;      // bytes taken since the received message began, less bytes freed; below 0
+                                   // when blocks from before it are freed
+    std::uint64_t plain_sent;      // output: bytes of the message that have left the buffer
+    std::uint64_t xml_end_max;     // output: place in the message where its XML meets max_message; 0: none
+    const char *exceeded;          // name of the limit that the message went beyond; null: none
+    std::uint64_t exceeded_value;  // that limit, bytes
     char endpoint[SOAP_TEXT_SIZE]; // URL of the exchange; after a redirect its target
     char path[SOAP_TEXT_SIZE];
     char host[SOAP_TEXT_SIZE];  // an IPv6 literal without its brackets
@@ -430,15 +466,17 @@ struct ZUV_CLASS soap {
     std::uint8_t ipv4_multicast_ttl;
     alignas(8) char peer[128]; // socket address of the last UDP or accepted peer
     std::size_t peer_length;
+    bool peer_fixed; // UDP: datagrams from any other address than `peer` are dropped
     int (*tls_setup)(soap *ctx);
     int (*tls_verify)(int result, x509_store_ctx_st *store);
     bio_st *tls_bio;
     ssl_st *tls_connection;
-    ssl_ctx_st *tls_context; // shared with copies; freed by the original
+    ssl_ctx_st *tls_context; // one reference, the context's own; a copy gets another to the same
     ssl_session_st *tls_session;
     const char *tls_dh_file, *tls_random_file;                                     // borrowed
     std::uint16_t tls_flags;                                                       // TLS_... of soap_tls.h
     const char *tls_key_file, *tls_password, *tls_ca_file, *tls_ca_path, *tls_crl; // borrowed
+    ssl_ctx_st *session_rules;         // one reference to the TLS context that tls_session was made under
     char session_host[SOAP_TEXT_SIZE]; // where tls_session came from
     int session_port;
     z_stream_s *zlib_stream; // owned
@@ -455,7 +493,12 @@ struct ZUV_CLASS soap {
     soap();                            // both modes 0
     explicit soap(std::uint32_t mode); // one mode for both ways
     soap(std::uint32_t input_mode, std::uint32_t output_mode);
-    soap(const soap &other); // soap_context_copy
+    soap(const soap &other); // as soap_context_copy, and never with a connection
+    // Takes over all that `other` has but its connection, which is closed by the rules of
+    // soap_socket_release: settings, managed memory, plug-ins, log channels, a listening socket. `other` is
+    // left as `soap()` makes it. Addresses of the context that hosts keep elsewhere (data of a plug-in,
+    // `soap` of a data object) still name `other`. Does nothing if `other` has ended: state is 0.
+    soap(soap &&other) noexcept;
     soap &operator=(const soap &) = delete;
     virtual ~soap(); // discards all and ends the engine
 };
@@ -481,25 +524,28 @@ ZUV_API soap *soap_context_create(std::uint32_t input_mode, std::uint32_t output
 // soap_context_copy, which mends that; the virtual table of the target stays.
 ZUV_API void soap_context_assign(soap *target, const soap *source);
 
-// Makes `target` (a record with no contents of its own to lose) an independent copy of `source`, with
-// state 2. All settings and callbacks come along, and scratch texts as they stand. Everything that is freed
-// with a call or a context starts anew: managed memory and the fields that live in it, received namespaces,
-// attachments, trace files (on the same paths), compression. Shared by bytes: `user`, the streams, the number
-// of the socket (who keeps using it sets it to -1 in the other one), data of plug-ins without a copy hook,
-// and the TLS context, which only the original frees: it must outlive its copies' TLS connections.
+// Makes `target` an independent copy of `source`, with state 2. All settings and callbacks come along, and
+// scratch texts as they stand. Everything that is freed with a call or a context starts anew: managed memory
+// and the fields that live in it, received namespaces, attachments, trace files (on the same paths),
+// compression. Shared: `user`, the streams, data of plug-ins without a copy hook, the listening socket, which
+// only the source closes, and the TLS context, which lives as long as the last of them.
+//   target  a context, which is ended first, or memory of zeros only
+//
+// A copy starts without a connection: `socket` -1, keep_alive 0, no MODE_TLS. The one exception serves a
+// service with a thread for each client: a connection that the source has from soap_accept, before a TLS
+// handshake on it, is the copy's, and the source sets its own `socket` to -1. Constructors make no exception.
 //   target, also when both are the same
 //   null  an argument is null or `source` has ended: target is untouched
 //         a plug-in refuses (target->error is its answer) or memory runs out (20): what was built stays in
-//         target until its end
+//         target until its end, without a connection
 ZUV_API soap *soap_context_copy(soap *target, const soap *source);
 
 // The same into a record from plain memory, which the caller ends by soap_context_free. Null on failure;
-// nothing is left behind. The copy constructor does the same in place: a failure shows as state 0 or as a
-// non-zero error.
+// nothing is left behind. Of a copy constructor a failure shows as state 0 or as a non-zero error.
 ZUV_API soap *soap_context_copy(const soap *source);
 
-// Clears the per-message state ahead of an exchange, the error too; managed objects, soap_version and a kept
-// connection with its unread bytes stay.
+// Clears the per-message state ahead of an exchange, the error and the fault too; managed objects, the
+// header, soap_version and a kept connection with its unread bytes stay.
 ZUV_API void soap_reset_call(soap *ctx);
 
 // Frees what a message left in the working tables (prefixes, attributes, block stacks, namespaces,

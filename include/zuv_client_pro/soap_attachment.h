@@ -106,8 +106,9 @@ ZUV_API std::uint64_t soap_attachments_length(soap *ctx);
 // Writes the reference in place of a value's bytes, and adds the bytes to the attachments.
 //   id                   number of the element; above 0 it goes into a generated attachment id
 //   address, holder      the bytes; the record that begins with their address and their number (an int)
-//   id_text, type        attachment id ("cid:...") and media type; both null: no attachment. Values that are
-//                        alike in bytes (their address and number), id, type and options are one attachment
+//   id_text, type        attachment id ("cid:...") and media type; both null, or an empty id alone: no
+//                        attachment. Values that are alike in bytes (their address and number), id, type and
+//                        options are one attachment
 //   type_text, type_id   XML type and type id of the element
 // Result: -1 if the element stands (or failed: ctx->error). Otherwise the value is to be written in place
 // under the element id returned, 0 for none.
@@ -155,7 +156,8 @@ ZUV_API int soap_mime_part_header_write(soap *ctx, const soap_attachment *part);
 // announced one, -1.
 ZUV_API int soap_mime_part_header_read(soap *ctx);
 // All MIME parts and the end of a message in MIME mode; nothing otherwise. As above, with 36 for two parts of
-// one id, that of the message's own part included; angle brackets around an id make no difference.
+// one id, that of the message's own part included; ids that differ in angle brackets or percent-encoding
+// alone are one.
 ZUV_API int soap_mime_attachments_write(soap *ctx);
 // Reads the content of the part whose head was read, and the head of the next. `handle` goes to
 // mime_write_open, which is asked about all parts but the one that holds the message. The rest of that one is

@@ -71,8 +71,9 @@ enum soap_error_code : int {
 
 // Fills the fault record's code and text from ctx->error. The host's on_error_text is asked first. What is
 // set stays; a missing code becomes that of the sender, and a missing text that of the error, with the code
-// and, in SOAP 1.2, the subcode that the error calls for. Error 12 (a fault that was received or set) gets no
-// text. A composed text stands in message_text and lasts until the next one.
+// and, in SOAP 1.2, the subcode that the error calls for. Error 45 of a limit on bytes is told by the limit's
+// name and value, such as "max_memory: more than 536870912 bytes". Error 12 (a fault that was received or
+// set) gets no text. A composed text stands in message_text and lasts until the next one.
 ZUV_API void soap_fault_text_fill(soap *ctx);
 
 // Store a fault in the context's record and its error in ctx->error, replacing what was there.
@@ -117,8 +118,8 @@ ZUV_API void soap_fault_location_print(soap *ctx, std::FILE *file);
 // if there is one. The text, in message_text, cut to its size; neither argument may lie there.
 ZUV_API const char *soap_constraint_text(soap *ctx, const char *text, const char *argument);
 
-// Text of an end of input: that of ctx->errno_value, or of a timeout with the time limits that are set. In
-// message_text.
+// Text of an end of input: that of ctx->errno_value, or of a timeout with the time limits that are set, or
+// with call_timeout alone if that has passed. In message_text.
 ZUV_API const char *soap_eof_text(soap *ctx);
 
 // Takes a fault out of a response that did not read as expected, ends the message and releases the

@@ -18,15 +18,24 @@ constexpr int STATUS_STOP = 1000; // no head to write, end of this exchange
 
 // --- connecting ---
 
-// Connects and writes the head of a POST.
+// Looks whether a call may go to an endpoint: one URL, or several with blanks between. Each has no scheme, or
+// one of http, https (in any case), httpg and soap.udp followed by "://"; a host, which an IPv6 address is in
+// brackets; a port from 1 to 65535 or none; no user and no character below 33. Calls of proxies ask this
+// first, unless LEGACY_ANY_ENDPOINT is set. 0, 20, or 28 with a fault whose text quotes what is refused,
+// without a user's part.
+ZUV_API int soap_endpoint_check(soap *ctx, const char *endpoints);
+
+// Connects and writes the head of a POST. The time of call_timeout begins here, once for all endpoints.
 //   endpoints  one URL, or several with blanks between them: the next is tried when a connection fails with
 //   error 28 action     SOAPAction, copied; null for none
 // Returns ctx->error: 0, 20, 28 or 30 with a fault, an HTTP status from a proxy, or an error of sending.
 ZUV_API int soap_server_connect(soap *ctx, const char *endpoints, const char *action);
 
 // The same for one endpoint and the kind of request in `status` (STATUS_...). A kept connection is used again
-// if it goes to the same host and port with the same security, still lives, and its last response was read to
-// the end. STATUS_GET ends the request.
+// if it goes to the same host and port with the same security, through the same HTTP proxy and under the same
+// TLS rules (the last two don't count with LEGACY_ANY_ROUTE), still lives, and its last response was read to
+// the end. A null or empty endpoint connects to nothing: what is sent goes where tcp_send sends it without a
+// socket. STATUS_GET ends the request.
 ZUV_API int soap_connect_one(soap *ctx, int status, const char *endpoint, const char *action);
 
 // Splits a URL into endpoint, host, port (80, or 443 for https) and path of the context. Parts over 1023
@@ -39,6 +48,8 @@ ZUV_API void soap_parse_endpoint(soap *ctx, const char *url);
 //   path    one slash at its head is dropped, as the request line has its own; null is empty
 //   action  SOAPAction; null for none; over 1020 bytes it goes out empty
 //   count   Content-Length, bytes
+// Authorization is for the service and not in a CONNECT (LEGACY_TUNNEL_CREDENTIALS: there too), and
+// Proxy-Authorization for the HTTP proxy alone: in a CONNECT, and in what it passes on by plain HTTP.
 // 0, 20 for an endpoint and version of more than 944 bytes, or an error of sending.
 ZUV_API int http_write_request(soap *ctx, const char *endpoint, const char *host, int port, const char *path,
                                const char *action, std::uint64_t count);
@@ -63,12 +74,14 @@ ZUV_API const char *http_reason(int status);
 // Default of on_read_head. Leaves the context's fields as the head says, and the start line in message_text.
 // 0: a body follows that is to be parsed (200, other 2xx, 400, 500 with a body, or a request). 1000: the
 // request was dealt with. -1: end of input. 414: start line over 1023 bytes. 22: a line over 8191 bytes, more
-// than 1024 lines, 1 MB, or 100 heads of status 100. 15, 16, 405: a request that nobody serves. Any other
-// status, with a fault: text "HTTP Error" and the start line as detail, or the start line and the error body.
+// than 1024 lines, 1 MB, or 100 interim heads (1xx but 101, whose headers are not looked at). 15, 16, 405: a
+// request that nobody serves. Any other status, with a fault: text "HTTP Error" and the start line as detail,
+// or the start line and the error body.
 ZUV_API int http_read_head(soap *ctx);
 
-// Default of on_parse_header: takes one header over into the context. Unknown ones are dropped. 0, 20, or an
-// error of sending the answer to "Expect".
+// Default of on_parse_header: takes one header over into the context. Unknown ones are dropped, and so is
+// Authorization in a response, unless LEGACY_ANSWER_CREDENTIALS is set. 0, 20, or an error of sending the
+// answer to "Expect".
 ZUV_API int http_parse_header(soap *ctx, const char *key, const char *value);
 
 ZUV_API int http_get_default(soap *ctx); // default of on_get: error 15

@@ -10,6 +10,11 @@
 // A message goes out as: soap_count_begin, the writers (only if ctx->mode has MODE_COUNTING), soap_count_end,
 // soap_send_begin, the head, the writers, soap_send_finish. It comes in as: soap_receive_begin, the readers,
 // soap_receive_finish.
+//
+// Limits, each ending the message with 45 (SOAP_LENGTH) from whatever function finds out: max_message and
+// max_memory of the context; raw bytes without contents, which are 1 MB and 8 for each plain byte at most
+// (framing, flushes of a compressed stream). From there on the input is at its end, or nothing more is sent,
+// and the connection carries no other message. soap_fault_text_fill names the limit and its value.
 #pragma once
 
 #include <cstring>
@@ -23,7 +28,7 @@
 // Returns 0, 20, or the result of on_send_prepare_begin.
 ZUV_API int soap_count_begin(soap *ctx);
 
-// Ends the counting pass. Returns 0 or the result of on_send_prepare_end.
+// Ends the counting pass. Returns 0, 45, or the result of on_send_prepare_end.
 ZUV_API int soap_count_end(soap *ctx);
 
 // Settles ctx->mode for the real sending, empties the buffer and starts compression. From here on the
@@ -35,7 +40,7 @@ ZUV_API int soap_send_begin(soap *ctx);
 ZUV_API int soap_send_bytes_slow(soap *ctx, const char *data, std::size_t length);
 
 // The one entry for all output: counts, stores or sends. Returns 0, 20, 27 (UDP, more than 65536 bytes), 31,
-// the result of a hook, or that of on_send.
+// 45, the result of a hook, or that of on_send.
 inline int soap_send_bytes(soap *ctx, const char *data, std::size_t length)
 {
     if (length == 0)
@@ -85,8 +90,9 @@ ZUV_API std::uint64_t soap_message_length(soap *ctx);
 
 // Starts a message: forgets the one before (header, fault, ids, namespaces received), finds out whether it
 // has an HTTP head (read by on_read_head), and arms chunks, decompression and attachments. Returns 0; -1 with
-// no input; 14 with no body behind a status 200; another status with no body; 20; 31; 36; 47 (UTF-16); 1000
-// if the head was all there was (informative); or the result of on_read_head or of a hook.
+// no input; 14 with no body behind a status 200; another status with no body; 20; 22 (over 1 MB of blanks
+// ahead of the message); 31; 36; 45; 47 (UTF-16); 1000 if the head was all there was (informative); or the
+// result of on_read_head or of a hook.
 ZUV_API int soap_receive_begin(soap *ctx);
 
 // soap_recv_byte with a byte pushed back or an empty buffer.
@@ -103,7 +109,7 @@ inline std::int32_t soap_recv_byte(soap *ctx)
 
 // Drops what is left in the buffer and fills it once, with framing and compression undone. Returns 0 with at
 // least one byte at buffer_index; otherwise 1 or -1 at the end of input, 22 (chunk size line over 8192
-// bytes), 31, or the result of on_recv_prepare.
+// bytes), 31, 45, or the result of on_recv_prepare.
 ZUV_API int soap_recv_refill(soap *ctx);
 
 // As soap_recv_refill, with on_recv_filter and the chunks of a DIME record around it: what readers use.
@@ -127,6 +133,6 @@ ZUV_API char *soap_recv_bytes_block(soap *ctx, std::size_t length);
 // Ends the message: reads remaining attachments, ends decompression, checks the gzip trailer, reads to the
 // last chunk, resolves references. Clears ctx->response_unfinished only if the message was read exactly to
 // its end, by chunks or by Content-Length. With MODE_MIME_AFTER the remaining parts are left for
-// soap_mime_next_part. Returns 0, 22, 31 (also for a compressed stream cut short), 33, 37, an error of the
-// attachments or of the references, or the result of on_recv_prepare_end.
+// soap_mime_next_part. Returns 0, 22, 31 (also for a compressed stream cut short), 33, 37, 45, an error of
+// the attachments or of the references, or the result of on_recv_prepare_end.
 ZUV_API int soap_receive_finish(soap *ctx);

@@ -25,7 +25,8 @@ ZUV_API int soap_log_set(soap *ctx, int channel, const char *path);
 ZUV_API int soap_log_set_received(soap *ctx, const char *path);
 ZUV_API int soap_log_set_sent(soap *ctx, const char *path);
 
-// Opens the channel's file for appending if a path is set; the handle stays null on failure.
+// Opens the channel's file for appending if a path is set; the handle stays null on failure. A new file may
+// be read and written by its owner alone (mode 0600); one that exists keeps its mode.
 ZUV_API void soap_log_open(soap *ctx, int channel);
 // Closes the channel's file if it is open; the path stays.
 ZUV_API void soap_log_close(soap *ctx, int channel);

@@ -34,14 +34,15 @@ ZUV_API void tracked_free(soap *ctx, const char *source_file, int source_line, v
 // A block of `size` bytes, aligned to 8, and ctx->allocated set to 1.
 //   size  0 gives the shared empty text, which is read-only, no block, and leaves ctx->allocated alone
 //   ctx   null: a block that plain free ends
-//   With ctx->on_malloc set its result is returned as it is and not managed.
+//   With ctx->on_malloc set its result is returned as it is and not managed; null sets ctx->error to 20.
 ZUV_API void *soap_block_alloc(soap *ctx, std::size_t size);
 
 // Frees the managed block that starts at `address`, after a search from the newest on; an address that is no
 // block goes to soap_discard_objects. With null frees all blocks and forgets the fields that live in them:
-// http_content, action, fault, header, credentials, realm, forwarded_for, attachment lists; MODE_MIME leaves
-// output_mode. A block whose end was overwritten stops the release or the search: a line on standard error,
-// ctx->error 21 (SOAP_CORRUPTION); it and the older blocks stay. Does nothing on a context that has ended.
+// http_content, action, fault, header, credentials (wiped), realm, forwarded_for, attachment lists; MODE_MIME
+// leaves output_mode. A block whose end was overwritten stops the release or the search: a line on standard
+// error, ctx->error 21 (SOAP_CORRUPTION); it and the older blocks stay. Does nothing on a context that has
+// ended.
 ZUV_API void soap_block_free(soap *ctx, void *address);
 
 // Enters an object in the list of managed instances.

@@ -98,7 +98,7 @@ ZUV_API unsigned char *soap_hex_inline_read(soap *ctx, int *length);
 // Maps the words of a QName list just read to the namespace table: a prefix in scope becomes the table's, or
 // "URI" in quotes where the table has none. `target` receives a managed text. A null text returns ctx->error
 // and stores nothing. 0, 9 (a prefix without a URI), 20, or 45 (fewer than minimum or more than maximum
-// bytes; negative: no bound).
+// bytes; negative: no bound; or more than may be copied, see soap_forward_resolve).
 ZUV_API int soap_qname_read_map(soap *ctx, const char *text, char **target, long minimum, long maximum);
 
 // The way back, for the element about to be begun: words "URI":local get the table's prefix, or one of their

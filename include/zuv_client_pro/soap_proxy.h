@@ -17,11 +17,16 @@
 
 // Of a proxy class P:
 //   endpoint
-//       URL to which calls go. Borrowed, never copied: the text must outlive every call. Null: the port's
-//       default, which the next call stores here.
+//       URL to which calls go, or several with blanks between: the next is tried while connections fail.
+//       Borrowed, never copied: the text must outlive every call. Null: the port's default, which the next
+//       call stores here. One that soap_endpoint_check refuses ends a call with error 28 before anything is
+//       sent.
 //   constructors
 //       Modes for input and output, one for both, or none; the endpoint, or none. A proxy made from a context
-//       copies its modes and namespaces and starts with nothing else of it; its endpoint is null.
+//       or from another proxy copies its settings (soap_context_copy) and starts without a connection; its
+//       endpoint is null, so that the port's default holds until one is given. A proxy that is moved, as when
+//       a vector grows, keeps endpoint, settings and managed objects and loses its connection; what it came
+//       from is as P() makes it.
 //   P_init
 //       Replaces both modes, forgets the endpoint and installs the port's namespaces. 0, or error 20.
 //   destroy
@@ -50,6 +55,8 @@
     explicit P(const char *endpoint);                                                                        \
     P(const char *endpoint, int iomode);                                                                     \
     explicit P(const soap &other);                                                                           \
+    P(const P &other);                                                                                       \
+    P(P &&other) noexcept;                                                                                   \
     ~P() override;                                                                                           \
     virtual int P##_init(int imode, int omode);                                                              \
     virtual void destroy();                                                                                  \

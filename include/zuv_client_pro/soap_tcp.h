@@ -2,11 +2,15 @@
 //
 // Elsewhere: TLS (soap_tls.h), HTTP (soap_http.h).
 //
-// Always: time limits are 0 none, positive seconds, negative microseconds. Only select is used, so
-// descriptors of 1024 and over are refused with error 46. Sockets that the library makes are closed on exec,
-// and writing to one whose peer is gone raises no SIGPIPE. A failure that names error 28 has filled the fault
-// record: its text is that of tcp_error_text, "Timeout" or the resolver's, its detail says what failed.
-// Descriptors are closed through on_close_socket, exactly once.
+// Always: time limits are 0 none, positive seconds, negative microseconds. They run on the monotonic clock,
+// from the beginning of the step that they limit, and no signal begins them anew. call_timeout limits all
+// steps together, from soap_server_connect or soap_connect_one (soap_http.h) to soap_socket_release: whatever
+// waits then ends with it, errno_value 0, and error texts name it. The one thing that no limit ends is the
+// look-up of a name, which has those of the system's resolver. Only select is used, so descriptors of 1024
+// and over are refused with error 46. Sockets that the library makes are closed on exec, and writing to one
+// whose peer is gone raises no SIGPIPE. A failure that names error 28 has filled the fault record: its text
+// is that of tcp_error_text, "Timeout" or the resolver's, its detail says what failed. Descriptors are closed
+// through on_close_socket, exactly once.
 #pragma once
 
 #include <zuv_client_pro/soap.h>
@@ -28,38 +32,45 @@ ZUV_API int tcp_wait(soap *ctx, int socket, int flags, int timeout);
 // address list, tunnels through proxy_host and does the TLS handshake if `endpoint` is an https URL.
 //   endpoint  URL; only its scheme counts, and the proxy is told of it
 //   host      name or address, an IPv6 address without brackets; port 0 to 65535
-// Limits: connect_timeout, for each attempt to connect and, counted anew, for the handshake. With a limit,
-// only an address that refuses at once is followed by the next one. Returns the socket, which also stands in
-// ctx->socket and belongs to the context; or -1, with ctx->socket -1 and ctx->error 28 (network), 30 (TLS),
-// 46 (too many descriptors) or what the proxy answered to CONNECT. With MODE_UDP in output_mode nothing is
-// connected: the address is kept in ctx->peer.
+// Each address of the name is tried until one answers. Limits: connect_timeout, counted anew for each
+// address, for the proxy's answer to CONNECT and for the handshake, each as a whole; a handshake has 10 s
+// where connect_timeout is 0. LEGACY_FIRST_ADDRESS: with a limit, only an address that refuses at once is
+// followed by the next one. Returns the socket, which also stands in ctx->socket and belongs to the context;
+// or -1, with ctx->socket -1 and ctx->error 28 (network), 30 (TLS), 46 (too many descriptors), or for a
+// CONNECT that did not lead to a tunnel its HTTP status (200 with a body among them), 29 (the answer is not
+// HTTP) or -1 (none), with a fault that says so; an answer to CONNECT leaves nothing else behind. With
+// MODE_UDP in output_mode nothing is connected: the address is kept in ctx->peer. Datagrams from another
+// address or port are then dropped, unless the address is a multicast one or connect_flags is SO_BROADCAST:
+// then they come from anywhere, and ctx->peer takes the sender's address.
 ZUV_API int tcp_connect(soap *ctx, const char *endpoint, const char *host, int port);
 
 // Sends all bytes (default of on_send): to output_stream if set, else to the socket, else to send_fd.
-// Limit: send_timeout, for each stretch that the system takes. UDP sends one datagram, and once or twice more
-// if the system refuses it. Returns 0; -1 with errno_value (0: time is up); 46 for a descriptor that can't be
-// waited for.
+// Limit: send_timeout, of silence: it begins anew with each stretch that the system takes. UDP sends one
+// datagram, and once or twice more if the system refuses it. Returns 0; -1 with errno_value (0: time is up);
+// 46 for a descriptor that can't be waited for.
 ZUV_API int tcp_send(soap *ctx, const char *data, std::size_t length);
 
 // Receives what is there, at most `length` bytes (default of on_recv), from input_stream, the socket or
-// recv_fd. Limit: recv_timeout. Returns the number of bytes; 0 for the end or a failure: errno_value is 0 at
-// the end and when time is up, else the system's reason.
+// recv_fd. Limit: recv_timeout, of silence: under TLS it begins anew with each piece of an encrypted record.
+// Returns the number of bytes; 0 for the end or a failure: errno_value is 0 at the end and when time is up,
+// else the system's reason.
 ZUV_API std::size_t tcp_recv(soap *ctx, char *buffer, std::size_t length);
 
 // Closes the TLS layer, whose session is kept for the next connection to the same host and port, and the
-// socket (default of on_close). A UDP socket stays open. What a parent process connected is its connection:
-// a child closes its own descriptor alone, and says nothing on it. Returns 0, or 30 if TLS did not close
-// properly.
+// socket (default of on_close). The peer is told (close_notify) and not waited for; LEGACY_CLOSE_WAIT: for
+// its own end, at most 5 s. A UDP socket stays open. Returns 0, or 30 if TLS did not close properly.
 ZUV_API int tcp_disconnect(soap *ctx);
 
 // Asks whether a kept connection may carry another call (default of on_poll): 0 if it may. Otherwise -1, or
 // 28 with a fault if it can't be asked. Bytes that nobody asked for make a connection unusable, and so does a
-// fork since it was made. Never blocks.
+// fork since it was opened for a call: it stays the parent's, and the child's tcp_disconnect closes the
+// child's descriptor alone, without a word to the peer. Never blocks.
 ZUV_API int tcp_peek(soap *ctx);
 
 // Ends a transaction: closes the connection (on_close) after an end of input, a network or TLS failure, a
 // response that was not read to its end, or with keep_alive 0; keeps it otherwise. Ends compression under
-// way. Returns ctx->error, which stays as it was unless on_disconnect or on_close fails.
+// way, and the time of the call unless parts of its response are still to be read. Returns ctx->error, which
+// stays as it was unless on_disconnect or on_close fails.
 ZUV_API int soap_socket_release(soap *ctx);
 
 // Sets keep_alive to 0 and closes the socket, whose number stays in ctx->socket but is neither used nor
@@ -85,6 +96,7 @@ ZUV_API int tcp_accept_socket(soap *ctx, int socket, void *address, int *length)
 ZUV_API int soap_bind(soap *ctx, const char *host, int port, int backlog);
 
 // Waits for a client, at most accept_timeout. Its socket is kept in ctx->socket (which is not closed before:
-// it may serve another context by now); host, port and peer_address take the client's. With MODE_UDP: the
-// master socket. Returns the socket; or -1 with a fault, error 28 or 46, and ctx->socket -1.
+// it may serve a copy of the context by now, see soap_context_copy); host, port and peer_address take the
+// client's. With MODE_UDP: the master socket. Returns the socket; or -1 with a fault, error 28 or 46, and
+// ctx->socket -1.
 ZUV_API int soap_accept(soap *ctx);

@@ -14,16 +14,19 @@
 // end of the pass.
 //
 // Every operation returns 0, or the first error met, which then stands in ctx->error: what soap_send_bytes
-// gives, SOAP_OUT_OF_MEMORY (attribute records and prefixes), and from start tags SOAP_LENGTH for more than
-// ctx->max_depth open elements. After an error the message is to be given up. Names are written as they
-// stand, without a check.
+// gives, SOAP_OUT_OF_MEMORY (attribute records and prefixes), SOAP_UTF_ERROR for text that XML can't carry,
+// and from start tags SOAP_LENGTH for more than ctx->max_depth open elements. After an error the message is
+// to be given up. Names are written as they stand, without a check.
 //
 // Common arguments:
 //   tag    element name, "prefix:local"; one that begins with "-" stands for no element: only its content is
 //   written id     number for the attribute id="_N"; 0 or less writes none type   value of xsi:type; null or
 //   empty writes none, as do MODE_NO_TYPE and the Header flag   place of a text: 0 element content, 1
 //   attribute value, 2 as 1 with bytes from 128 passed on unchanged
-// Byte texts are Latin-1 unless ctx->mode has MODE_UTF_STRINGS; they go out as UTF-8 either way.
+// Byte texts are Latin-1 unless ctx->mode has MODE_UTF_STRINGS; they go out as UTF-8 either way. XML can't
+// carry control characters other than tab, line feed and carriage return, surrogates, U+FFFE, U+FFFF, numbers
+// above U+10FFFF, and bytes that should be UTF-8 and are not: the counting pass meets them before anything is
+// sent; a message that isn't counted (chunks, bare XML) breaks off there, and its connection is closed.
 
 // Envelope: with MODE_MIME the head of its part, with MODE_DIME the header of its record, then the start tag;
 // at the end the end tag, CR LF and the record's padding. The counting pass settles the record's size and
@@ -79,7 +82,7 @@ ZUV_API int soap_attr_set(soap *ctx, const char *name, const char *value, int es
 // Makes all attributes idle, at the start of a message; in canonical mode frees their records.
 ZUV_API void soap_attr_table_reset(soap *ctx);
 
-// Escaped text: terminated, by length (may hold any byte), of 32-bit characters (terminated).
+// Escaped text: terminated, by length, of 32-bit characters (terminated). Also SOAP_UTF_ERROR, see above.
 ZUV_API int soap_text_write(soap *ctx, const char *text, int flag);
 ZUV_API int soap_text_write_n(soap *ctx, const char *text, std::size_t length, int flag);
 ZUV_API int soap_wide_text_write(soap *ctx, const char32_t *text, int flag);
@@ -102,8 +105,9 @@ ZUV_API const char *soap_array_type_text(soap *ctx, const char *type, const int 
 // The element that names an operation's result, in encoded SOAP 1.2; otherwise nothing.
 ZUV_API int soap_result_out(soap *ctx, const char *name);
 
-// XML as it stands, under a tag of its own: null or one that begins with "-" writes the text alone; a
-// prefixed one makes its namespace the default one. A null text writes nothing. `type` is not used.
+// XML as it stands, in UTF-8 whatever the mode, under a tag of its own: null or one that begins with "-"
+// writes the text alone; a prefixed one makes its namespace the default one. A null text writes nothing.
+// `type` is not used. Also SOAP_UTF_ERROR, see above.
 ZUV_API int soap_literal_write(soap *ctx, const char *tag, char *const *text, const char *type);
 ZUV_API int soap_wide_literal_write(soap *ctx, const char *tag, char32_t *const *text, const char *type);
 
@@ -185,11 +189,25 @@ ZUV_API const char *soap_namespace_of(soap *ctx, const char *name);
 // whatever it is, time grows linearly with it, and stack and tables don't. White space in attributes and line
 // ends are kept as they are.
 //
-// Byte strings are Latin-1, or UTF-8 with MODE_UTF_STRINGS. Without that mode a character above 255 has no
-// byte and becomes "?": it is lost. A zero byte becomes "?" in text of every kind. SOAP_EOF stands for the
-// end of input inside a message; where the transport left an error of its own, that is returned in its place.
+// Encodings read are UTF-8 (and US-ASCII), ISO-8859-1 and windows-1252. A message is in the encoding of its
+// byte-order mark or XML declaration, whichever comes last; else in ISO-8859-1 with MODE_LATIN1; else in that
+// of the charset parameter in the Content-Type of its HTTP head or MIME part; else in UTF-8. The declaration
+// overrules the parameter because it comes from what wrote the document, and the parameter often from a
+// server's settings. Any other encoding, by declaration, by parameter where there is no declaration, or by
+// the mark of UTF-16, is refused by its name: SOAP_UTF_ERROR.
+//
+// Byte strings are Latin-1, or UTF-8 with MODE_UTF_STRINGS, whatever the message is encoded in; names, and
+// the names in element_type and array_type, are UTF-8 always. Without that mode a character above 255 has no
+// byte and becomes "?": it is lost. So does, in strings of every kind, a character that XML doesn't allow
+// (zero and other control characters, surrogates, U+FFFE, U+FFFF), by itself or as a number in a reference,
+// and each sequence of bytes that isn't UTF-8 where UTF-8 is read. In strict mode reading ends there: with
+// SOAP_SYNTAX_ERROR for a control character or a reference, with SOAP_UTF_ERROR for such bytes. Only a single
+// byte from 128 on, followed by one below, still stands for itself as Latin-1 where strings are Latin-1.
+//
+// SOAP_EOF stands for the end of input inside a message; where the transport left an error of its own, that
+// is returned in its place.
 
-// Most attributes of one element; protects the look-up of attributes by name. Reading more is
+// Most attributes of one element; protects questions about them, which go through all. Reading more is
 // SOAP_SYNTAX_ERROR.
 constexpr int SOAP_ATTRIBUTES_MAX = 1000;
 
@@ -207,26 +225,28 @@ constexpr std::uint32_t XML_REFERENCE = 0x80000000; // ORed to a character that 
 // CDATA section every byte is a character. XML_EOF at the end of input.
 ZUV_API std::int32_t soap_char_next(soap *ctx);
 
-// The same with UTF-8 decoded, unless the mode has MODE_LATIN1. A byte from 128 on that no such byte follows
-// stands for itself, as Latin-1. Continuation bytes aren't checked.
+// The same with bytes from 128 on decoded by the encoding of the message: a character, or "?" for bytes that
+// are none. XML_EOF in strict mode for the latter, with SOAP_UTF_ERROR.
 ZUV_API std::int32_t soap_char_next_utf8(soap *ctx);
 
-// Character of a reference whose "&" has been read; 127 for a name that isn't known, a number that is no
-// character, and an
-// "&" that begins no reference. Seven bytes of the name count. Markup ends a reference that has no ";" and
-// stays unread; so does whatever comes behind 64 bytes.
+// Character of a reference whose "&" has been read; "?" for a number that is no character of XML; 127 for a
+// name that isn't known, and for an "&" that begins no reference. Markup, blanks and bytes from 128 on end a
+// reference that has no ";" and stay unread; so does what comes behind 64 bytes. In strict mode XML_EOF, with
+// SOAP_SYNTAX_ERROR, for all but a character.
 ZUV_API std::int32_t soap_entity_read(soap *ctx);
 
-// Reads an instruction whose "<?" has been read, up to its first "?". The encoding in an XML declaration sets
-// MODE_LATIN1 (ISO-8859-1, Latin1) or clears it (UTF-8). The byte behind the "?", or XML_EOF.
+// Reads an instruction whose "<?" has been read, up to its first "?". The encoding in an XML declaration
+// comes into force: names in either case and either kind of quotes. The byte behind the "?", or XML_EOF; that
+// also for an encoding that isn't read, with SOAP_UTF_ERROR and a fault text that quotes it.
 ZUV_API std::int32_t soap_pi_read(soap *ctx);
 
 // Reads the next start tag, unless one is held, and holds it. Declarations of elements that have ended go out
 // of scope, those of the tag come into it at the current depth.
 //   0                    a tag is held
 //   SOAP_NO_TAG          something else comes next: text, or an end tag; it stays unread
-//   SOAP_SYNTAX_ERROR    no name, an attribute without a name, more than SOAP_ATTRIBUTES_MAX attributes
-//   SOAP_UTF_ERROR       the byte-order mark of a 16-bit encoding
+//   SOAP_SYNTAX_ERROR    no name, an attribute without a name, more than SOAP_ATTRIBUTES_MAX attributes; in
+//   strict mode a wrong character or reference
+//   SOAP_UTF_ERROR       an encoding that isn't read; in strict mode bytes that aren't UTF-8
 //   SOAP_LENGTH          more than SOAP_PREFIXES_MAX declarations in scope
 //   SOAP_OUT_OF_MEMORY, SOAP_EOF
 ZUV_API int soap_element_head_read(soap *ctx);
@@ -244,7 +264,8 @@ ZUV_API int soap_element_in_begin(soap *ctx, const char *tag, int nil_allowed, c
 // Drops what is left of an open element, a held tag included, and reads its end tag, whose name is in `tag`
 // then.
 //   tag  name to compare with in strict mode, or null; a name that begins with "-" does nothing
-//   0; SOAP_SYNTAX_ERROR (a broken end tag, in strict mode another name); SOAP_EOF
+//   0; SOAP_SYNTAX_ERROR (a broken end tag, in strict mode another name); SOAP_LENGTH (more than max_depth
+//   open elements in what is dropped); SOAP_EOF
 ZUV_API int soap_element_in_end(soap *ctx, const char *tag);
 
 // Drops an element that nobody knows, with all that it holds.
@@ -291,11 +312,12 @@ ZUV_API const char *soap_attr_get(soap *ctx, const char *name, int occurrence);
 //                     QNames with the table's prefixes (soap_qname_read_map)
 //   minimum, maximum  length in characters; no bound if negative
 //   Managed. Null on failure: SOAP_LENGTH (out of bounds), SOAP_OUT_OF_MEMORY, for form 2
-//   SOAP_NAMESPACE_ERROR
+//   SOAP_NAMESPACE_ERROR, in strict mode SOAP_SYNTAX_ERROR and SOAP_UTF_ERROR
 ZUV_API char *soap_string_read(soap *ctx, int form, long minimum, long maximum);
 
 // As soap_string_read with form 1 and no bounds, but leaves the text in label_buffer, terminated, and gives
-// its length in bytes; valid until the next use of the growing text. Null on failure: SOAP_OUT_OF_MEMORY.
+// its length in bytes; valid until the next use of the growing text. Null on failure: SOAP_OUT_OF_MEMORY, in
+// strict mode SOAP_SYNTAX_ERROR and SOAP_UTF_ERROR.
 ZUV_API const char *soap_text_read(soap *ctx, std::size_t *length);
 
 // As soap_string_read, as code points. Raw XML (form 0) is decoded and its special characters are escaped
@@ -303,8 +325,8 @@ ZUV_API const char *soap_text_read(soap *ctx, std::size_t *length);
 ZUV_API char32_t *soap_wide_string_read(soap *ctx, int form, long minimum, long maximum);
 
 // Text of the element last begun, up to the next tag, without white space around it and at most 1023 bytes;
-// "" for an empty element. In scratch_text, valid until its next use. Null in strict mode if there is more:
-// SOAP_LENGTH.
+// "" for an empty element. In scratch_text, valid until its next use. Null in strict mode if there is more
+// (SOAP_LENGTH), and for SOAP_SYNTAX_ERROR and SOAP_UTF_ERROR.
 ZUV_API const char *soap_simple_value_read(soap *ctx);
 
 // Read an element that holds a string.

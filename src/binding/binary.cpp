@@ -2,6 +2,7 @@
 #include <zuv_client_pro/soap_attachment.h>
 #include <zuv_client_pro/soap_binary.h>
 #include <zuv_client_pro/soap_identity.h>
+#include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_primitive.h>
 #include <zuv_client_pro/soap_xml.h>
 
@@ -36,6 +37,17 @@ bool read_bytes(soap *ctx, xsd__base64Binary &binary)
     return binary.content != nullptr || ctx->error == 0;
 }
 
+// Absent bytes and no bytes are told apart by the pointer alone.
+bool take_nothing(soap *ctx, xsd__base64Binary &binary)
+{
+    binary.content = static_cast<unsigned char *>(soap_block_alloc(ctx, 1));
+    if (!binary.content)
+        return false;
+    *binary.content = '\0';
+    binary.size = 0;
+    return true;
+}
+
 bool refer_to_attachment(soap *ctx, xsd__base64Binary &binary)
 {
     return soap_attachment_ref_in(ctx, &binary.content, &binary.size, &binary.id, &binary.type,
@@ -49,8 +61,9 @@ void *read_binary(soap *ctx, const class_ops &ops, const char *tag, void *object
     if (ctx->element_id[0] && !soap_object_register(ctx, ctx->element_id, object, BINARY_ID, ops.size, 0,
                                                     nullptr, nullptr, nullptr))
         return nullptr;
-    const bool taken =
-        ctx->element_href[0] ? refer_to_attachment(ctx, binary) : !body || read_bytes(ctx, binary);
+    const bool taken = ctx->element_href[0] ? refer_to_attachment(ctx, binary)
+                       : body               ? read_bytes(ctx, binary)
+                                            : ctx->null_flag != 0 || take_nothing(ctx, binary);
     if (!taken || (body && soap_element_in_end(ctx, tag)))
         return nullptr;
     return object;
@@ -90,9 +103,7 @@ void xsd__base64Binary::soap_default(struct soap *ctx)
 
 void xsd__base64Binary::soap_serialize(struct soap *ctx) const
 {
-    if (content && (id || type))
-        attachment_value_mark(ctx, &content, id, type, options);
-    else
+    if (!attachment_value_mark(ctx, &content, id, type, options))
         soap_array_mark_pointer(ctx, content, &content, 1, BINARY_ID);
 }
 

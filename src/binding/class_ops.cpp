@@ -15,6 +15,7 @@
 #include "codec/namespace_scope.h"
 #include "codec/tag_view.h"
 #include "codec/xml_scan.h"
+#include "engine/limits.h"
 
 namespace binding {
 
@@ -23,6 +24,12 @@ bool class_descends(const class_ops *derived, const class_ops *base)
     while (derived && derived != base)
         derived = derived->base;
     return derived != nullptr;
+}
+
+bool object_copy_allowed(soap *ctx, std::size_t size, std::size_t content)
+{
+    memory_charge(ctx, content);
+    return copy_charge(ctx, size + content) == SOAP_OK;
 }
 
 void *class_instantiate(soap *ctx, const class_ops &ops, int count, const char *xsi_type, std::size_t *size,
@@ -43,8 +50,10 @@ void *class_instantiate(soap *ctx, const class_ops &ops, int count, const char *
         ctx->error = SOAP_OUT_OF_MEMORY;
         return nullptr;
     }
+    const std::size_t bytes = actual->size * static_cast<std::size_t>(count < 0 ? 1 : count);
+    memory_charge(ctx, bytes);
     if (size)
-        *size = actual->size * static_cast<std::size_t>(count < 0 ? 1 : count);
+        *size = bytes;
     if (made)
         *made = actual;
     return entry->object;
@@ -52,11 +61,31 @@ void *class_instantiate(soap *ctx, const class_ops &ops, int count, const char *
 
 // --- writing ---
 
+namespace {
+
+bool is_empty_text(const class_ops &ops, const void *object)
+{
+    const std::string *const text = ops.text(const_cast<void *>(object));
+    return text && text->empty();
+}
+
+// Few objects that refer to each other may be written very often: the counting pass must not go on for ever.
+bool counted_too_much(const soap *ctx)
+{
+    return ctx->message_count > ctx->xml_end_max && ctx->xml_end_max != 0 && (ctx->mode & MODE_COUNTING) != 0;
+}
+
+} // namespace
+
 int class_out(soap *ctx, const class_ops &ops, const void *object, const char *tag, int id, const char *type)
 {
+    if (counted_too_much(ctx))
+        return limit_exceeded(ctx, "max_message", ctx->max_message);
     if (ops.write_attributes && ops.write_attributes(ctx, object))
         return ctx->error;
     const int element_id = soap_element_id(ctx, id, object, ops.type_id);
+    if ((ctx->mode & MODE_NULL_STRINGS) && is_empty_text(ops, object))
+        return soap_element_null(ctx, tag, element_id, ops.base ? ops.xml_type : type);
     if (soap_element_out_begin(ctx, tag, element_id, ops.base ? ops.xml_type : type))
         return ctx->error;
     if (ops.write_content(ctx, object, tag))
@@ -214,6 +243,11 @@ void *read_members(soap *ctx, const class_ops &ops, const char *tag, void *objec
         return nullptr;
     if (!ctx->has_body || ctx->element_href[0])
         return read_by_reference(ctx, ops, tag, object);
+    return read_further_members(ctx, ops, tag, object);
+}
+
+void *read_further_members(soap *ctx, const class_ops &ops, const char *tag, void *object)
+{
     std::uint64_t spent = 0;
     if (!read_elements(ctx, *ops.members, object, spent) || soap_element_in_end(ctx, tag))
         return nullptr;

@@ -86,6 +86,8 @@ bool independents_read(soap *ctx);
 
 // The content readers: elements, and text with attributes.
 void *read_members(soap *ctx, const class_ops &ops, const char *tag, void *object);
+// Goes on with the elements of an object behind a value that was refused and dropped.
+void *read_further_members(soap *ctx, const class_ops &ops, const char *tag, void *object);
 void *read_simple_content(soap *ctx, const class_ops &ops, const char *tag, void *object);
 
 // Pointer forms. The reader takes the element `tag`, nil and references included, and fills the place.
@@ -95,6 +97,10 @@ bool class_new_in(soap *ctx, const class_ops &ops, const char *tag, void **place
 int class_pointer_out(soap *ctx, const class_ops &ops, const char *tag, int id, const void *object,
                       const char *type);
 void class_pointer_mark(soap *ctx, const class_ops &ops, const void *object);
+
+// A reference is to be filled by a copy of an object of `size` bytes with `content` bytes beside it. False
+// with error 45.
+bool object_copy_allowed(soap *ctx, std::size_t size, std::size_t content);
 
 // Makes a managed object of the class, or of the derived class that xsi_type names. Null with error 20.
 void *class_instantiate(soap *ctx, const class_ops &ops, int count, const char *xsi_type, std::size_t *size,

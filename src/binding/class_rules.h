@@ -278,9 +278,44 @@ template <class T> void assign(void *target, const void *source)
     *static_cast<T *>(target) = *static_cast<const T *>(source);
 }
 
+// Bytes that a copy of a member takes besides its place in the object.
+template <class V> std::size_t content_of(const V &)
+{
+    return 0;
+}
+inline std::size_t content_of(const std::string &text)
+{
+    return text.size();
+}
+template <class V> std::size_t content_of(const std::vector<V> &items)
+{
+    std::size_t bytes = items.size() * sizeof(V);
+    if constexpr (std::is_same_v<V, std::string>) {
+        for (const std::string &text : items)
+            bytes += text.size();
+    }
+    return bytes;
+}
+
+template <class T> std::size_t content_bytes(const T &object)
+{
+    std::size_t bytes = 0;
+    if constexpr (!std::is_void_v<typename law<T>::base>)
+        bytes += content_bytes<bearer<typename law<T>::base>>(object);
+    if constexpr (law<T>::text != nullptr)
+        bytes += content_of(object.*law<T>::text);
+    any_element<T>([&](auto index) {
+        bytes += content_of(object.*std::get<index>(law<T>::elements).member);
+        return false;
+    });
+    return bytes;
+}
+
 template <class T>
 void copy_hook(soap *ctx, int, int, void *place, std::size_t, const void *source, std::size_t)
 {
+    if (!object_copy_allowed(ctx, sizeof(T), content_bytes<bearer<T>>(*static_cast<const T *>(source))))
+        return;
     try {
         assign<T>(place, source);
     } catch (const std::bad_alloc &) {

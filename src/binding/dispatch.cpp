@@ -15,6 +15,7 @@
 #include "binding/member_write.h"
 #include "binding/name_lookup.h"
 #include "binding/registry.h"
+#include "engine/limits.h"
 
 namespace binding {
 
@@ -51,6 +52,7 @@ void *read_vector(soap *ctx, const type_entry &entry, int type)
     void *item = vector ? read_by_type(ctx, item_type) : nullptr;
     if (!item)
         return nullptr;
+    memory_charge(ctx, SMALLEST_ALLOCATION);
     if (!entry.vector->append(vector, item)) {
         out_of_memory(ctx);
         return nullptr;

@@ -64,6 +64,31 @@ template <> constexpr int id_of<SOAP_ENV__Fault>()
     return SOAP_TYPE_SOAP_ENV__Fault;
 }
 
+// The error says that a value isn't what it should be, in XML that is sound. Characters that XML can't carry
+// are errors of strict mode alone, which holds the tags behind them to their names.
+bool is_bad_value(const soap *ctx)
+{
+    switch (ctx->error) {
+    case SOAP_TAG_MISMATCH:
+    case SOAP_TYPE_MISMATCH:
+    case SOAP_MUST_UNDERSTAND:
+    case SOAP_NAMESPACE_ERROR:
+    case SOAP_NIL:
+    case SOAP_DUPLICATE_ID:
+    case SOAP_MISSING_ID:
+    case SOAP_ID_CONFLICT:
+    case SOAP_REQUIRED:
+    case SOAP_PROHIBITED:
+    case SOAP_OCCURS:
+        return true;
+    case SOAP_SYNTAX_ERROR:
+    case SOAP_UTF_ERROR:
+        return (ctx->mode & MODE_STRICT) != 0;
+    default:
+        return false;
+    }
+}
+
 template <class R> R *make(soap *ctx)
 {
     return static_cast<R *>(soap_instantiate(ctx, id_of<R>(), nullptr, nullptr, nullptr));
@@ -96,6 +121,29 @@ bool chars_in(soap *ctx, const char *tag, char **place, int form)
            nullptr;
 }
 
+// A fault of the detail. What is wrong with one of its values costs that value alone.
+bool fault_in(soap *ctx, const class_ops &ops, const char *tag, void **place)
+{
+    if (soap_element_in_begin(ctx, tag, 1, nullptr))
+        return false;
+    soap_tag_unread(ctx);
+    if (ctx->null_flag || ctx->element_href[0] == '#')
+        return class_pointer_in(ctx, ops, tag, place);
+    const class_ops *actual = &ops;
+    *place = class_instantiate(ctx, ops, -1, ctx->element_type, nullptr, &actual);
+    if (*place == nullptr || soap_element_in_begin(ctx, tag, 1, nullptr))
+        return false;
+    const std::uint32_t level = ctx->nesting_level;
+    const bool body = ctx->has_body != 0;
+    void *read = actual->read(ctx, *actual, tag, *place);
+    while (read == nullptr && drop_bad_value(ctx, level)) {
+        if (!body || ctx->nesting_level < level)
+            return true;
+        read = read_further_members(ctx, *actual, tag, *place);
+    }
+    return read != nullptr;
+}
+
 template <class R> bool record_in(soap *ctx, const char *tag, R **place);
 
 void try_members(record_reader &r, SOAP_ENV__Header &header)
@@ -121,8 +169,8 @@ void try_members(record_reader &r, SOAP_ENV__Detail &detail)
 {
 #define TRY_FAULT(name)                                                                                      \
     r.member([&] {                                                                                           \
-        return class_pointer_in(r.ctx, ops_of<protocol__##name>, law<protocol__##name>::xml_type,            \
-                                reinterpret_cast<void **>(&detail.name));                                    \
+        return fault_in(r.ctx, ops_of<protocol__##name>, law<protocol__##name>::xml_type,                    \
+                        reinterpret_cast<void **>(&detail.name));                                            \
     });
     SOAP_DETAIL_FAULTS(TRY_FAULT)
 #undef TRY_FAULT
@@ -130,6 +178,8 @@ void try_members(record_reader &r, SOAP_ENV__Detail &detail)
         if (r.ctx->error != SOAP_TAG_MISMATCH)
             return false;
         detail.fault = soap_read_element(r.ctx, &detail.__type);
+        if (detail.fault == nullptr)
+            detail.__type = 0;
         return detail.fault != nullptr;
     });
     r.member([&] { return soap_raw_element_in(r.ctx, "-any", &detail.__any) != nullptr; });
@@ -148,9 +198,13 @@ void try_members(record_reader &r, SOAP_ENV__Fault &fault)
     r.member([&] { return record_in(r.ctx, "SOAP-ENV:Detail", &fault.Detail); });
 }
 
+// A bad value in a fault must not hide the fault. A header is as good as its values.
+template <class R> constexpr bool is_of_fault = !std::is_same_v<R, SOAP_ENV__Header>;
+
 template <class R> bool read_members_of(soap *ctx, R &record)
 {
     record_reader reader{ctx};
+    const std::uint32_t level = ctx->nesting_level;
     for (;;) {
         ctx->error = SOAP_TAG_MISMATCH;
         reader.next = 0;
@@ -162,31 +216,50 @@ template <class R> bool read_members_of(soap *ctx, R &record)
             ctx->error = soap_element_skip(ctx);
         if (ctx->error == SOAP_NO_TAG)
             return true;
-        if (ctx->error)
+        if (ctx->error && (!is_of_fault<R> || !drop_bad_value(ctx, level)))
             return false;
     }
 }
 
 template <class R> R *record_content_in(soap *ctx, const char *tag, R *record)
 {
-    if (!ctx->has_body)
-        return record;
-    if (!read_members_of(ctx, *record) || soap_element_in_end(ctx, tag))
+    const bool body = ctx->has_body != 0;
+    if (ctx->element_id[0] && !soap_object_register(ctx, ctx->element_id, record, id_of<R>(), sizeof *record,
+                                                    0, nullptr, nullptr, nullptr))
+        return nullptr;
+    if (body && (!read_members_of(ctx, *record) || soap_element_in_end(ctx, tag)))
         return nullptr;
     return record;
 }
 
+// Behind the start tag; nil gives null.
+template <class R> bool record_new_in(soap *ctx, const char *tag, R **place)
+{
+    *place = nullptr;
+    if (ctx->null_flag)
+        return !ctx->has_body || soap_element_in_end(ctx, tag) == 0;
+    *place = make<R>(ctx);
+    return *place && record_content_in(ctx, tag, *place);
+}
+
+// A member of a record: `place` stays where it is until the message ends, so it may wait for a reference.
 template <class R> bool record_in(soap *ctx, const char *tag, R **place)
 {
     if (soap_element_in_begin(ctx, tag, 1, nullptr))
         return false;
-    if (ctx->null_flag) {
-        *place = nullptr;
-        return !ctx->has_body || soap_element_in_end(ctx, tag) == 0;
-    }
-    R *record = make<R>(ctx);
-    *place = record;
-    return record && record_content_in(ctx, tag, record);
+    if (ctx->null_flag || ctx->element_href[0] != '#')
+        return record_new_in(ctx, tag, place);
+    const bool body = ctx->has_body != 0;
+    *place = nullptr;
+    return soap_object_forward_ptr(ctx, ctx->element_href, reinterpret_cast<void **>(place), id_of<R>(),
+                                   sizeof **place, 0) &&
+           (!body || soap_element_in_end(ctx, tag) == 0);
+}
+
+// A record by itself.
+template <class R> bool lone_record_in(soap *ctx, const char *tag, R **place)
+{
+    return soap_element_in_begin(ctx, tag, 1, nullptr) == 0 && record_new_in(ctx, tag, place);
 }
 
 // --- writing ---
@@ -297,6 +370,25 @@ void mark_record(soap *ctx, const SOAP_ENV__Fault &fault)
 
 } // namespace
 
+bool drop_bad_value(soap *ctx, std::uint32_t level)
+{
+    const int error = ctx->error;
+    if (!is_bad_value(ctx))
+        return false;
+    ctx->error = 0;
+    if (ctx->peeked && ctx->tag[0] && ctx->nesting_level == level) { // refused before it was entered
+        ctx->peeked = 0;
+        ctx->nesting_level += ctx->has_body != 0;
+    }
+    while (ctx->nesting_level > level) {
+        if (soap_element_in_end(ctx, nullptr)) {
+            ctx->error = error;
+            return false;
+        }
+    }
+    return true;
+}
+
 std::size_t envelope_size(int type_id)
 {
     return with_record(type_id, [](auto *r) { return sizeof *r; });
@@ -328,9 +420,8 @@ void *envelope_in(soap *ctx, int type_id, const char *tag, void *record)
     return with_record(type_id, [=](auto *r) -> void * {
         using R = std::remove_pointer_t<decltype(r)>;
         R *made = static_cast<R *>(record);
-        if (!made) {
-            return record_in(ctx, tag, &made) ? made : nullptr;
-        }
+        if (!made)
+            return lone_record_in(ctx, tag, &made) ? made : nullptr;
         return soap_element_in_begin(ctx, tag, 0, nullptr) ? nullptr : record_content_in(ctx, tag, made);
     });
 }
@@ -383,14 +474,17 @@ int soap_header_put(soap *ctx)
 
 int soap_header_get(soap *ctx)
 {
+    const std::uint32_t level = ctx->nesting_level;
     ctx->message_part = PART_HEADER;
     SOAP_ENV__Header *header = nullptr;
-    if (!record_in(ctx, "SOAP-ENV:Header", &header)) {
+    if (!lone_record_in(ctx, "SOAP-ENV:Header", &header)) {
         header = nullptr;
-        if (ctx->error == SOAP_TAG_MISMATCH)
+        if (ctx->error == SOAP_TAG_MISMATCH && ctx->nesting_level == level)
             ctx->error = 0;
     }
     ctx->header = header;
+    if (ctx->error)
+        return ctx->error;
     ctx->message_part = PART_AFTER_HEADER;
     if (ctx->error == 0 && ctx->on_soap_header)
         ctx->error = ctx->on_soap_header(ctx);
@@ -414,7 +508,7 @@ int soap_fault_put(soap *ctx)
 int soap_fault_read(soap *ctx)
 {
     SOAP_ENV__Fault *fault = nullptr;
-    if (record_in(ctx, "SOAP-ENV:Fault", &fault))
+    if (lone_record_in(ctx, "SOAP-ENV:Fault", &fault))
         ctx->error = 0;
     else
         fault = nullptr;

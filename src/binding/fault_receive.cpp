@@ -4,9 +4,13 @@
 
 #include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_identity.h>
 #include <zuv_client_pro/soap_io.h>
+#include <zuv_client_pro/soap_registry.h>
 #include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_xml.h>
+
+#include "binding/envelope.h"
 
 namespace {
 
@@ -42,13 +46,27 @@ bool may_be_fault(const soap *ctx)
     return ctx->error == SOAP_NO_TAG || (ctx->error == SOAP_TAG_MISMATCH && ctx->nesting_level == 2);
 }
 
-// No fault could be read: the error of the response stands, told as a fault of the sender.
+// No fault could be read: the error of the response stands, told as a fault of the sender. Only lack of
+// memory says nothing of what was there.
 int keep_error(soap *ctx, int error)
 {
+    if (ctx->error == SOAP_OUT_OF_MEMORY)
+        error = SOAP_OUT_OF_MEMORY;
     *soap_fault_code_field(ctx) = ctx->soap_version == 2 ? "SOAP-ENV:Sender" : "SOAP-ENV:Client";
     ctx->error = error;
     soap_fault_text_fill(ctx);
     return error;
+}
+
+// What stands behind the fault: it may refer to it.
+void read_rest_of_body(soap *ctx)
+{
+    const std::uint32_t level = ctx->nesting_level;
+    do {
+        int type = 0;
+        if (soap_read_element(ctx, &type) == nullptr && ctx->error == 0)
+            ctx->error = SOAP_TAG_MISMATCH; // nothing that could be read
+    } while (ctx->error == 0 || binding::drop_bad_value(ctx, level));
 }
 
 } // namespace
@@ -57,13 +75,19 @@ int soap_fault_receive(soap *ctx, int check)
 {
     int result = ctx->error;
     if (!check && !may_be_fault(ctx))
-        return result;
+        return soap_socket_release(ctx); // what broke off or went beyond a limit ends the connection now
     ctx->error = 0;
     if (soap_fault_read(ctx)) {
+        if (ctx->exceeded != nullptr) {
+            ctx->error = SOAP_LENGTH;
+            return soap_socket_release(ctx);
+        }
         if (check && ctx->error == SOAP_TAG_MISMATCH && ctx->nesting_level == 2)
             return ctx->error = 0;
         result = keep_error(ctx, result);
     } else {
+        read_rest_of_body(ctx);
+        soap_forward_resolve(ctx); // the code may be a reference, and its prefix is known up to the end
         result = error_of_fault(ctx);
         ctx->error = 0;
         if (soap_body_in_end(ctx) == 0)

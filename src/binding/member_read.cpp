@@ -13,7 +13,9 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "binding/registry.h"
+#include "codec/type_check.h"
 #include "codec/xml_text.h"
+#include "engine/limits.h"
 
 namespace binding {
 
@@ -21,6 +23,12 @@ namespace {
 
 constexpr int TEXT_TYPE_ID = 8; // all texts held by pointer are of one type to the identity tables
 constexpr int BOOLEAN_TYPE_ID = 13;
+
+// Characters that a text holds without a block of its own.
+std::size_t text_in_place()
+{
+    return std::string().capacity();
+}
 
 bool ends(soap *ctx, const char *tag, bool body)
 {
@@ -41,6 +49,8 @@ std::string *new_text(soap *ctx, std::string_view content = {})
         return nullptr;
     try {
         auto *text = new std::string(content);
+        memory_charge(ctx, sizeof *text);
+        text_charge(ctx, content.size(), text_in_place());
         instance->object = text;
         return text;
     } catch (const std::bad_alloc &) {
@@ -51,6 +61,8 @@ std::string *new_text(soap *ctx, std::string_view content = {})
 
 bool append_text(soap *ctx, std::vector<std::string> &vector, std::string_view content)
 {
+    vector_charge(ctx, vector);
+    text_charge(ctx, content.size(), text_in_place());
     try {
         vector.emplace_back(content);
         return true;
@@ -93,12 +105,12 @@ bool parse_code(soap *ctx, const char *text, const enum_table &names, std::int32
         *code = static_cast<std::int32_t>(row->code);
         return true;
     }
-    std::int64_t number = 0;
-    if (soap_long_parse(ctx, text, &number))
+    std::int32_t number = 0;
+    if (soap_int_parse(ctx, text, &number))
         return false;
-    if (strict(ctx) && static_cast<std::uint64_t>(number) >= names.count)
+    if (strict(ctx) && static_cast<std::uint32_t>(number) >= names.count)
         return mismatch(ctx);
-    *code = static_cast<std::int32_t>(number);
+    *code = number;
     return true;
 }
 
@@ -126,9 +138,35 @@ template <class Parse> bool read_simple(soap *ctx, const char *tag, Parse parse)
     return text && parse(text) && ends(ctx, tag, body);
 }
 
-bool begins(soap *ctx, const char *tag, const char *type)
+bool holds_tag(soap *ctx)
 {
-    return soap_element_in_begin(ctx, tag, 0, type) == 0;
+    return ctx->peeked != 0 || soap_element_head_read(ctx) == 0;
+}
+
+// The XML type to ask for of the simple value whose tag is held: null, for any, where that of the element
+// says nothing.
+const char *type_asked(soap *ctx, const char *type)
+{
+    return !strict(ctx) && type_says_nothing(ctx) ? nullptr : type;
+}
+
+bool begins(soap *ctx, const char *tag, int nil_allowed, const char *type)
+{
+    if (!holds_tag(ctx))
+        return false;
+    if (ctx->attributes_set != 0)
+        type = type_asked(ctx, type);
+    return soap_element_in_begin(ctx, tag, nil_allowed, type) == 0;
+}
+
+// The element just begun is nil, where there is no pointer to be null: what it was to be stays as it is.
+// `done` is the result of reading it.
+bool is_nil(soap *ctx, const char *tag, bool *done)
+{
+    if (ctx->null_flag == 0)
+        return false;
+    *done = ends(ctx, tag, ctx->has_body != 0);
+    return true;
 }
 
 bool refers(soap *ctx, const char *tag, void *place, std::size_t size, int type_id, bool body)
@@ -181,6 +219,7 @@ bool read_text_content(soap *ctx, std::string &text)
     std::string_view content;
     if (!read_characters(ctx, content))
         return false;
+    text_charge(ctx, content.size(), text.capacity());
     try {
         text.assign(content);
     } catch (const std::bad_alloc &) {
@@ -232,8 +271,8 @@ bool read_vector_item_text(soap *ctx, const char *tag, std::vector<std::string> 
         return append_text(ctx, vector, content);
     if (soap_element_in_begin(ctx, tag, 1, nullptr))
         return false;
-    if (!vector_append<std::string>(&vector, nullptr))
-        return out_of_memory(ctx);
+    if (!append_item<std::string>(ctx, vector, nullptr))
+        return false;
     if (is_reference(ctx))
         return refers_item(ctx, tag, &vector, vector.size() - 1, TEXT_TYPE_ID, sizeof(std::string),
                            vector_type);
@@ -253,6 +292,9 @@ bool read_vector_item_text(soap *ctx, const char *tag, std::vector<std::string> 
 
 bool copy_text(soap *ctx, std::string &target, const std::string &source)
 {
+    if (copy_charge(ctx, source.size()) != 0)
+        return false;
+    text_charge(ctx, source.size(), target.capacity());
     try {
         target = source;
     } catch (const std::bad_alloc &) {
@@ -265,8 +307,11 @@ bool copy_text(soap *ctx, std::string &target, const std::string &source)
 
 bool read_code_value(soap *ctx, const char *tag, std::int32_t *place, const enum_table &names)
 {
-    if (!begins(ctx, tag, names.xml_type) || !registers(ctx, place, names.type_id, sizeof *place))
+    bool done = false;
+    if (!begins(ctx, tag, 0, names.xml_type) || !registers(ctx, place, names.type_id, sizeof *place))
         return false;
+    if (is_nil(ctx, tag, &done))
+        return done;
     if (is_reference(ctx))
         return refers(ctx, tag, place, sizeof *place, names.type_id, ctx->has_body != 0);
     return read_simple(ctx, tag, [&](const char *text) { return parse_code(ctx, text, names, place); });
@@ -274,7 +319,7 @@ bool read_code_value(soap *ctx, const char *tag, std::int32_t *place, const enum
 
 bool read_code_pointer(soap *ctx, const char *tag, void **place, const enum_table &names)
 {
-    if (soap_element_in_begin(ctx, tag, 1, names.xml_type))
+    if (!begins(ctx, tag, 1, names.xml_type))
         return false;
     *place = nullptr;
     if (ctx->null_flag || is_reference(ctx))
@@ -289,11 +334,17 @@ bool read_code_pointer(soap *ctx, const char *tag, void **place, const enum_tabl
     return true;
 }
 
-bool read_vector_item_code(soap *ctx, const char *tag, std::int32_t *code, const enum_table &names,
-                           void *vector, std::size_t index, int vector_type)
+bool read_vector_item_code(soap *ctx, const char *tag, std::int32_t *code, bool *present,
+                           const enum_table &names, void *vector, std::size_t index, int vector_type)
 {
-    if (!begins(ctx, tag, names.xml_type))
+    bool done = false;
+    *present = true;
+    if (!begins(ctx, tag, 0, names.xml_type))
         return false;
+    if (is_nil(ctx, tag, &done)) {
+        *present = false;
+        return done;
+    }
     *code = 0;
     if (is_reference(ctx))
         return refers_item(ctx, tag, vector, index, names.type_id, sizeof *code, vector_type);
@@ -324,8 +375,11 @@ bool read_code_attribute(soap *ctx, const char *name, bool required, const enum_
 
 bool read_boolean_value(soap *ctx, const char *tag, bool *place)
 {
-    if (!begins(ctx, tag, "xsd:boolean") || !registers(ctx, place, BOOLEAN_TYPE_ID, sizeof *place))
+    bool done = false;
+    if (!begins(ctx, tag, 0, "xsd:boolean") || !registers(ctx, place, BOOLEAN_TYPE_ID, sizeof *place))
         return false;
+    if (is_nil(ctx, tag, &done))
+        return done;
     if (is_reference(ctx)) {
         const bool body = ctx->has_body != 0;
         return soap_object_forward(ctx, ctx->element_href, place, 0, BOOLEAN_TYPE_ID, 0, sizeof *place, 0,
@@ -344,14 +398,14 @@ bool read_number_pointer(soap *ctx, const char *tag, void **place, int type_id)
     if (ctx->null_flag || is_reference(ctx))
         return refers_pointer(ctx, tag, place, type_id, ops.size);
     soap_tag_unread(ctx);
-    *place = ops.in(ctx, tag, nullptr, ops.xml_type);
+    *place = ops.in(ctx, tag, nullptr, type_asked(ctx, ops.xml_type));
     return *place != nullptr;
 }
 
 bool read_number_value(soap *ctx, const char *tag, void *place, int type_id)
 {
     const simple_ops &ops = *type_entries[type_id].simple;
-    return ops.in(ctx, tag, place, ops.xml_type) != nullptr;
+    return holds_tag(ctx) && ops.in(ctx, tag, place, type_asked(ctx, ops.xml_type)) != nullptr;
 }
 
 } // namespace binding

@@ -6,6 +6,7 @@
 // Always: a reader that finds another element leaves it held and gives false with error 3 (or 6 at the end).
 #pragma once
 
+#include <algorithm>
 #include <new>
 #include <string>
 #include <type_traits>
@@ -17,6 +18,7 @@
 #include "binding/class_ops.h"
 #include "binding/law.h"
 #include "binding/vector_forms.h"
+#include "engine/limits.h"
 
 namespace binding {
 
@@ -37,10 +39,25 @@ bool read_code_attribute(soap *ctx, const char *name, bool required, const enum_
 bool read_vector_item_text(soap *ctx, const char *tag, std::vector<std::string> &vector, int vector_type);
 bool read_vector_item_object(soap *ctx, const class_ops &ops, const char *tag, void *vector,
                              std::size_t index, int vector_type, void **object);
-bool read_vector_item_code(soap *ctx, const char *tag, std::int32_t *code, const enum_table &names,
-                           void *vector, std::size_t index, int vector_type);
-bool copy_text(soap *ctx, std::string &target, const std::string &source);
-bool out_of_memory(soap *ctx); // error 20; false
+// `present` is set to false for a nil item, for which there is no code: the vector goes without it.
+bool read_vector_item_code(soap *ctx, const char *tag, std::int32_t *code, bool *present,
+                           const enum_table &names, void *vector, std::size_t index, int vector_type);
+bool copy_text(soap *ctx, std::string &target, const std::string &source); // false with error 20 or 45
+bool out_of_memory(soap *ctx);                                             // error 20; false
+
+// What the next item makes a vector grow by counts in max_memory.
+template <class V> void vector_charge(soap *ctx, const std::vector<V> &vector)
+{
+    if (vector.size() == vector.capacity())
+        memory_charge(ctx, std::max(vector.capacity() * sizeof(V), SMALLEST_ALLOCATION));
+}
+
+// One more item, a copy of what `item` points to, or empty. False with error 20.
+template <class V> bool append_item(soap *ctx, std::vector<V> &vector, const void *item)
+{
+    vector_charge(ctx, vector);
+    return vector_append<V>(&vector, item) || out_of_memory(ctx);
+}
 
 // --- by member type ---
 
@@ -83,13 +100,17 @@ template <class V> bool read_value(soap *ctx, const char *tag, std::vector<V> &m
         if (!read_vector_item_object(ctx, ops_of<std::remove_pointer_t<V>>, tag, &member, member.size(),
                                      vector_type, &object))
             return false;
-        return vector_append<V>(&member, object) || out_of_memory(ctx);
+        return append_item<V>(ctx, member, object);
     } else {
         std::int32_t code = 0;
-        if (!read_vector_item_code(ctx, tag, &code, enum_of<V>, &member, member.size(), vector_type))
+        bool present = true;
+        if (!read_vector_item_code(ctx, tag, &code, &present, enum_of<V>, &member, member.size(),
+                                   vector_type))
             return false;
+        if (!present)
+            return true;
         const V item = static_cast<V>(code);
-        return vector_append<V>(&member, &item) || out_of_memory(ctx);
+        return append_item<V>(ctx, member, &item);
     }
 }
 

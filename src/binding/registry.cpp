@@ -15,6 +15,7 @@
 #include "binding/envelope.h"
 #include "binding/name_lookup.h"
 #include "codec/tag_view.h"
+#include "engine/limits.h"
 
 namespace binding {
 
@@ -168,6 +169,7 @@ void *make_instance(soap *ctx, const type_entry &entry, int type, int count)
     instance->object = make(entry, count);
     if (!instance->object)
         ctx->error = SOAP_OUT_OF_MEMORY;
+    memory_charge(ctx, plain_size(entry) * static_cast<std::size_t>(count < 0 ? 1 : count));
     return instance->object;
 }
 
@@ -239,6 +241,12 @@ void soap_insert_into_vector(soap *ctx, int, int place_type, void *vector, std::
     const type_entry *entry = type_entry_of(place_type);
     if (!entry || !entry->vector)
         return;
+    if (entry->kind == type_kind::text_vector) {
+        const std::size_t length = static_cast<const std::string *>(source)->size();
+        if (copy_charge(ctx, length) != SOAP_OK)
+            return;
+        memory_charge(ctx, length);
+    }
     try {
         entry->vector->store(vector, index, source);
     } catch (const std::bad_alloc &) {

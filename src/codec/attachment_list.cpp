@@ -10,11 +10,28 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_memory.h>
 
+#include "codec/attachment_id.h"
 #include "codec/attachment_list.h"
 #include "codec/dime.h"
 #include "codec/mime.h"
 
-static constexpr std::size_t ID_SHOWN = 400; // characters of an id in a text
+namespace {
+
+// In the spelling that counts; long ids are compared where their hashes are the same.
+struct hashed_id {
+    std::uint64_t hash;
+    const char *id;
+
+    static hashed_id of(const char *id) { return {id_hash(bare_id(id, true), 0), id}; }
+    int order(const hashed_id &other) const
+    {
+        if (hash != other.hash)
+            return hash < other.hash ? -1 : 1;
+        return id_compare(bare_id(id, true), bare_id(other.id, true));
+    }
+};
+
+} // namespace
 
 soap_attachment *soap_attachment_add(soap *ctx, soap_attachment **first, soap_attachment **last,
                                      char *content, std::size_t size)
@@ -65,14 +82,6 @@ int soap_mime_attach(soap *ctx, char *content, std::size_t size, int encoding, c
     return SOAP_OK;
 }
 
-std::string_view attachment_bare_id(const char *id)
-{
-    const std::string_view text(id);
-    if (!text.starts_with('<'))
-        return text;
-    return text.substr(1, text.size() < 2 ? 0 : text.size() - 2);
-}
-
 int attachment_ids_check(soap *ctx, const soap_attachment *list, const char *message_id, int error)
 {
     std::size_t count = message_id != nullptr;
@@ -80,21 +89,21 @@ int attachment_ids_check(soap *ctx, const soap_attachment *list, const char *mes
         count += record->id != nullptr;
     if (count < 2)
         return SOAP_OK;
-    auto *const ids = static_cast<std::string_view *>(SOAP_MALLOC(ctx, count * sizeof(std::string_view)));
+    auto *const ids = static_cast<hashed_id *>(SOAP_MALLOC(ctx, count * sizeof(hashed_id)));
     if (ids == nullptr)
         return ctx->error = SOAP_OUT_OF_MEMORY;
-    std::string_view *end = ids;
+    hashed_id *end = ids;
     if (message_id != nullptr)
-        *end++ = attachment_bare_id(message_id);
+        *end++ = hashed_id::of(message_id);
     for (const soap_attachment *record = list; record != nullptr; record = record->next) {
         if (record->id != nullptr)
-            *end++ = attachment_bare_id(record->id);
+            *end++ = hashed_id::of(record->id);
     }
-    std::sort(ids, end);
-    const std::string_view *const twice = std::adjacent_find(ids, end);
+    std::sort(ids, end, [](const hashed_id &a, const hashed_id &b) { return a.order(b) < 0; });
+    const hashed_id *const twice =
+        std::adjacent_find(ids, end, [](const hashed_id &a, const hashed_id &b) { return a.order(b) == 0; });
     if (twice != end)
-        attachment_fail(ctx, error, "Two attachments have the id \"%.*s\"",
-                        static_cast<int>(std::min(twice->size(), ID_SHOWN)), twice->data());
+        attachment_fail(ctx, error, "Two attachments have the id \"%.400s\"", twice->id);
     SOAP_FREE(ctx, ids);
     return ctx->error;
 }

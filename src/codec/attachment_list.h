@@ -1,8 +1,6 @@
 // attachment_list.h - what holds of all attachments of a message, and what is told of one that is wrong.
 #pragma once
 
-#include <string_view>
-
 #include <zuv_client_pro/soap_attachment.h>
 
 // Empties the lists of attachments to send. The records are managed memory.
@@ -19,9 +17,6 @@ int attachment_ids_check(soap *ctx, const soap_attachment *list, const char *mes
 
 // The same for the attachments that go out with the message under way: 0, 20, 32 or 36.
 int attachment_ids_check_out(soap *ctx);
-
-// An id without the angle brackets around it.
-std::string_view attachment_bare_id(const char *id);
 
 // Makes a fault with a text of its own for an error, which it returns.
 [[gnu::format(printf, 3, 4)]] int attachment_fail(soap *ctx, int error, const char *format, ...);

@@ -12,7 +12,7 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_memory.h>
 
-#include "codec/attachment_list.h"
+#include "codec/attachment_id.h"
 #include "codec/attachment_refs.h"
 
 struct soap_attachment_index {
@@ -27,48 +27,9 @@ namespace {
 constexpr std::size_t SHORT_LIST = 32; // references that are simply walked through
 constexpr std::size_t FIRST_CHAINS = 256;
 
-bool is_hex(char c)
-{
-    return (c >= '0' && c <= '9') || (c >= 'A' && c <= 'F') || (c >= 'a' && c <= 'f');
-}
-unsigned hex_value(char c)
-{
-    return c <= '9' ? static_cast<unsigned>(c - '0') : (c & 7U) + 9U;
-}
-
-// A piece of text read as it stands or percent-decoded, character by character.
-class id_view {
-public:
-    id_view(const char *text, std::size_t length, bool decodes)
-        : at_(text), end_(text + length), decodes_(decodes)
-    {}
-    // The next character, or -1.
-    int next()
-    {
-        if (at_ == end_)
-            return -1;
-        if (decodes_ && *at_ == '%' && end_ - at_ > 2 && is_hex(at_[1]) && is_hex(at_[2])) {
-            const unsigned value = hex_value(at_[1]) << 4 | hex_value(at_[2]);
-            at_ += 3;
-            return static_cast<int>(value & 0xFF);
-        }
-        return static_cast<unsigned char>(*at_++);
-    }
-
-private:
-    const char *at_, *end_;
-    bool decodes_;
-};
-
 bool equal(id_view one, id_view other)
 {
-    for (;;) {
-        const int c = one.next();
-        if (c != other.next())
-            return false;
-        if (c == -1)
-            return true;
-    }
+    return id_compare(one, other) == 0;
 }
 
 const char *without_scheme(const char *href)
@@ -79,23 +40,6 @@ const char *without_scheme(const char *href)
 id_view whole(const char *text, bool decodes)
 {
     return {text, std::strlen(text), decodes};
-}
-
-id_view bare_id(const char *id, bool decodes)
-{
-    const std::string_view bare = attachment_bare_id(id);
-    return {bare.data(), bare.size(), decodes};
-}
-
-std::uint64_t hash(id_view text, std::uint64_t seed)
-{
-    std::uint64_t value = seed;
-    for (int c = text.next(); c != -1; c = text.next()) {
-        value ^= static_cast<std::uint64_t>(c) + 1;
-        value *= 0x9E3779B97F4A7C15;
-        value ^= value >> 29;
-    }
-    return value;
 }
 
 void hang(soap_attachment_index &index, soap_attachment_ref *reference)
@@ -201,7 +145,7 @@ int attachment_ref_queue(soap *ctx, const soap_attachment_ref &wanted)
         return ctx->error = SOAP_OUT_OF_MEMORY;
     }
     *reference = wanted;
-    reference->hash = hash(whole(without_scheme(wanted.id), true), index->seed);
+    reference->hash = id_hash(whole(without_scheme(wanted.id), true), index->seed);
     reference->previous = nullptr;
     reference->next = ctx->mtom_list;
     if (reference->next != nullptr)
@@ -237,9 +181,9 @@ void soap_attachment_bind(soap *ctx, soap_attachment *attachment)
     // A reference hangs under its decoded text without scheme; an id answers as it stands, without brackets,
     // or decoded.
     const std::uint64_t seed = ctx->mtom_index->seed;
-    const std::uint64_t keys[] = {hash(bare_id(attachment->id, false), seed),
-                                  hash(bare_id(attachment->id, true), seed),
-                                  hash(whole(without_scheme(attachment->id), true), seed)};
+    const std::uint64_t keys[] = {id_hash(bare_id(attachment->id, false), seed),
+                                  id_hash(bare_id(attachment->id, true), seed),
+                                  id_hash(whole(without_scheme(attachment->id), true), seed)};
     for (const std::uint64_t key : keys)
         answer_in_chain(ctx, attachment, key);
 }

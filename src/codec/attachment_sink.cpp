@@ -38,6 +38,7 @@ int attachment_sink::put(const char *data, std::size_t length)
 {
     if (length == 0)
         return SOAP_OK;
+    ctx_->attached_received += length;
     if (write_ != nullptr) {
         size_ += length;
         ctx_->error = write_(ctx_, handle_, data, length);

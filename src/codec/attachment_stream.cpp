@@ -27,14 +27,15 @@ bool length_is_open(const soap *ctx)
 
 int attachment_take_handle(soap *ctx, const char *id, attachment_close close, void *&handle)
 {
+    const bool refused = ctx->error != SOAP_OK;
     if (handle == soap_attachment_in_memory(ctx))
         handle = nullptr;
-    else if (handle == nullptr && ctx->error == SOAP_OK)
+    else if (handle == nullptr && !refused)
         return attachment_fail(
             ctx, SOAP_USER_ERROR,
             "The open callback gave null for \"%.400s\", neither a handle nor soap_attachment_in_memory()",
             name_of(id));
-    if (ctx->error != SOAP_OK && handle != nullptr && close != nullptr)
+    if (refused && handle != nullptr && close != nullptr)
         close(ctx, handle);
     return ctx->error;
 }
@@ -48,14 +49,14 @@ attachment_stream::~attachment_stream()
 int attachment_stream::open(open_callback ask, const char *about)
 {
     const bool has_bytes = record_.content != nullptr || record_.size != 0;
-    void *handle = soap_attachment_in_memory(ctx_);
-    if (ask != nullptr)
-        handle = ask(ctx_, record_.content, record_.id, record_.type, about);
-    if (handle == nullptr && !has_bytes)
-        return ctx_->error;
-    if (attachment_take_handle(ctx_, record_.id, close_, handle) != SOAP_OK)
-        return ctx_->error;
-    handle_ = handle;
+    if (ask != nullptr) {
+        void *handle = ask(ctx_, record_.content, record_.id, record_.type, about);
+        if (handle == nullptr && !has_bytes)
+            return ctx_->error;
+        if (attachment_take_handle(ctx_, record_.id, close_, handle) != SOAP_OK)
+            return ctx_->error;
+        handle_ = handle;
+    }
     if (!is_open() && record_.content == nullptr && has_bytes)
         return attachment_fail(ctx_, SOAP_USER_ERROR, "Attachment \"%.400s\" has a length and no content",
                                name_of(record_.id));

@@ -90,6 +90,12 @@ soap_pointer_record *find_or_add(soap *ctx, const outgoing_value &value)
     return soap_pointer_add_value(ctx, hash, ATTACHMENT_TYPE, entered);
 }
 
+// An empty reference would be none to the reader.
+const char *given_id(const char *id_text)
+{
+    return id_text != nullptr && *id_text != '\0' ? id_text : nullptr;
+}
+
 outgoing_value value_of(const void *holder, const char *id_text, const char *type, const char *options)
 {
     return {*static_cast<const byte_holder *>(holder), id_text, type, options, nullptr};
@@ -164,11 +170,16 @@ int add_attachment(soap *ctx, const outgoing_value &value, const char *href)
 
 } // namespace
 
-void attachment_value_mark(soap *ctx, const void *holder, const char *id_text, const char *type,
+bool attachment_value_mark(soap *ctx, const void *holder, const char *id_text, const char *type,
                            const char *options)
 {
+    id_text = given_id(id_text);
+    if (static_cast<const byte_holder *>(holder)->content == nullptr ||
+        (id_text == nullptr && type == nullptr))
+        return false;
     ctx->mode |= MODE_DIME;
     find_or_add(ctx, value_of(holder, id_text, type, options));
+    return true;
 }
 
 int soap_attachment_ref_out(soap *ctx, const char *tag, int id, const void *address, const void *holder,
@@ -176,6 +187,7 @@ int soap_attachment_ref_out(soap *ctx, const char *tag, int id, const void *addr
                             const char *type_text, int type_id)
 {
     const auto *bytes = static_cast<const byte_holder *>(holder);
+    id_text = given_id(id_text);
     if (address == nullptr || bytes == nullptr || bytes->content == nullptr ||
         (id_text == nullptr && type == nullptr))
         return soap_element_ref(ctx, tag, id, address, holder, dimensions, type_text, type_id);

@@ -1,7 +1,9 @@
 // attributes.h - the context's attribute records, shared by writer and reader.
 //
-// Always: a record holds its name; records and value buffers stay in the list until the call's scratch memory
-// is freed, and a bounded number of them beyond that, for the next call.
+// Always: a record holds its name. Those that the element has are visible and stand in soap::attribute_list;
+// all stand in hash chains (namespace_scope.h), where an idle one waits for its name to come again. Records
+// and value buffers stay until the call's scratch memory is freed, and a bounded number of them beyond that,
+// for the next call.
 #pragma once
 
 #include <cstddef>
@@ -14,8 +16,16 @@ inline std::string_view xml_attribute_name(const soap_attribute *record)
     return {record->name, record->name_length};
 }
 
-// A new record at the head of the list, idle and without a value. Null if memory runs out, with error 20.
-soap_attribute *xml_attribute_make(soap *ctx, std::string_view name);
+// The record of this name, visible or idle; a new one is idle and may still have the value buffer of another
+// name. The cost does not depend on how many there are. Null if memory runs out, with error 20.
+soap_attribute *xml_attribute_record(soap *ctx, std::string_view name);
+
+// Puts an idle record into the attribute list, in the place that a link leads to. `visible`: 1 without a
+// value, 2 with one.
+void xml_attribute_show(soap *ctx, soap_attribute **link, soap_attribute *record, int visible);
+
+// Makes all records idle.
+void xml_attributes_hide(soap *ctx);
 
 // Makes the record's value buffer hold at least `size` bytes; its contents are lost if it grows. 0 or
 // SOAP_OUT_OF_MEMORY.
@@ -24,9 +34,7 @@ int xml_attribute_room(soap *ctx, soap_attribute *record, std::size_t size);
 // Copies a text to the record's value and terminates it. 0 or SOAP_OUT_OF_MEMORY.
 int xml_attribute_store(soap *ctx, soap_attribute *record, std::string_view value);
 
-// Ends a record that was taken out of the list: it is kept for reuse or freed.
-void xml_attribute_drop(soap *ctx, soap_attribute *record);
 void xml_attribute_free(soap *ctx, soap_attribute *record);
 
-// Drops all records.
+// Drops all records; some are kept as spare ones.
 void xml_attributes_drop(soap *ctx);

@@ -1,15 +1,19 @@
 // entities.cpp - references in XML text: "&lt;", "&#65;", "&eacute;".
 //
 // Here: their names and numbers. Elsewhere: where a reference may stand (xml_token.cpp).
+#include <algorithm>
 #include <cstring>
+#include <string_view>
 
 #include "codec/xml_token.h"
+#include "engine/utf8.h"
 
 namespace {
 
-constexpr std::size_t NAME_MAX_KEPT = 7;    // bytes; longer names are cut, and are unknown by then
-constexpr std::size_t REFERENCE_BYTES = 64; // an "&" with no ";" within this many bytes swallows no more
+constexpr std::size_t REFERENCE_BYTES = sizeof xml_reference::text; // an "&" with no ";" swallows no more
+constexpr std::size_t NAME_MAX_KEPT = 7; // bytes; longer names are cut, and are unknown by then
 constexpr std::int32_t UNKNOWN = 127;
+constexpr std::uint32_t NO_CODE = 0x110000; // numbers that are too large count as this one
 
 // The Latin-1 set of HTML 4, code 160 and on.
 constexpr const char *latin1_names[] = {
@@ -53,42 +57,62 @@ int digit_value(char c)
     return lower >= 'a' && lower <= 'f' ? lower - 'a' + 10 : 16;
 }
 
-// At most six digits stand here, so the value stays far below the bit that marks references. Zero can't
-// be a character.
-std::int32_t numbered_code(const char *digits)
+std::int32_t unknown(soap *ctx)
 {
-    const bool hexadecimal = *digits == 'x' || *digits == 'X';
-    const int base = hexadecimal ? 16 : 10;
-    std::int32_t code = 0;
-    for (const char *p = digits + hexadecimal; digit_value(*p) < base; ++p)
-        code = code * base + digit_value(*p);
-    return code == 0 ? UNKNOWN : code;
+    return (ctx->mode & MODE_STRICT) != 0 ? xml_refuse(ctx, SOAP_SYNTAX_ERROR) : UNKNOWN;
 }
 
-// Markup can't stand in a reference: the "&" was a stray one.
+// What stands behind the "#". The digits end where they end, which strict reading demands to be the end.
+std::int32_t numbered_code(soap *ctx, std::string_view text)
+{
+    const bool hexadecimal = !text.empty() && (text[0] == 'x' || text[0] == 'X');
+    const int base = hexadecimal ? 16 : 10;
+    std::uint32_t code = 0;
+    std::size_t at = hexadecimal ? 1 : 0;
+    const std::size_t first = at;
+    for (; at < text.size() && digit_value(text[at]) < base; ++at)
+        code = std::min(code * static_cast<std::uint32_t>(base) +
+                            static_cast<std::uint32_t>(digit_value(text[at])),
+                        NO_CODE);
+    if (at == first || (at != text.size() && (ctx->mode & MODE_STRICT) != 0))
+        return unknown(ctx);
+    return xml_carries(code) ? static_cast<std::int32_t>(code) : xml_no_character(ctx, SOAP_SYNTAX_ERROR);
+}
+
+// Markup, blanks and bytes that may be part of a character can't stand in a reference: the "&" was a stray
+// one.
 bool ends_stray_reference(std::int32_t byte)
 {
-    return byte == XML_EOF || byte == '<' || byte == '>' || byte == '&' || byte == '"' || byte == '\'';
+    return byte <= ' ' || byte >= 0x80 || byte == '<' || byte == '>' || byte == '&' || byte == '"' ||
+           byte == '\'';
 }
 
 } // namespace
 
-std::int32_t soap_entity_read(soap *ctx)
+std::int32_t xml_reference_read(soap *ctx, xml_reference &reference)
 {
-    char name[NAME_MAX_KEPT + 1];
-    std::size_t kept = 0;
-    for (std::size_t count = 0; count < REFERENCE_BYTES; ++count) {
+    while (reference.length < REFERENCE_BYTES) {
         const std::int32_t byte = soap_recv_byte(ctx);
-        if (byte == ';') {
-            name[kept] = '\0';
-            return name[0] == '#' ? numbered_code(name + 1) : named_code(name);
-        }
         if (ends_stray_reference(byte)) {
             input_unread(ctx, byte);
-            return UNKNOWN;
+            return byte == XML_EOF && (ctx->mode & MODE_STRICT) != 0 ? XML_EOF : unknown(ctx);
         }
-        if (kept < NAME_MAX_KEPT)
-            name[kept++] = static_cast<char>(byte);
+        reference.text[reference.length++] = static_cast<char>(byte);
+        if (byte != ';')
+            continue;
+        const std::string_view text(reference.text, reference.length - 1);
+        if (text.starts_with('#'))
+            return numbered_code(ctx, text.substr(1));
+        char name[NAME_MAX_KEPT + 1] = "";
+        text.copy(name, NAME_MAX_KEPT);
+        const std::int32_t code = named_code(name);
+        return code == UNKNOWN ? unknown(ctx) : code;
     }
-    return UNKNOWN;
+    return unknown(ctx);
+}
+
+std::int32_t soap_entity_read(soap *ctx)
+{
+    xml_reference reference;
+    return xml_reference_read(ctx, reference);
 }

@@ -3,10 +3,13 @@
 // Elsewhere: Header and Fault records (the binding), HTTP and framing (soap_receive_begin).
 #include <cstring>
 
+#include <zuv_client_pro/soap_attachment.h>
 #include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_xml.h>
 
 #include "codec/namespace.h"
+#include "engine/text_encoding.h"
 
 namespace {
 
@@ -57,6 +60,15 @@ int settle_version(soap *ctx)
     return 0;
 }
 
+// A head names an encoding that isn't read, and no declaration has said better.
+int refuse_charset(soap *ctx)
+{
+    const soap_attachment *const root = ctx->mime.root;
+    const char *const type = root != nullptr && (ctx->mode & MODE_MIME) != 0 ? root->type : ctx->http_content;
+    const char *const name = soap_attr_value(ctx, type, "charset");
+    return text_encoding_refuse(ctx, name != nullptr ? name : "");
+}
+
 } // namespace
 
 int soap_envelope_in_begin(soap *ctx)
@@ -64,6 +76,8 @@ int soap_envelope_in_begin(soap *ctx)
     ctx->message_part = PART_ENVELOPE;
     if (soap_element_in_begin(ctx, "SOAP-ENV:Envelope", 0, nullptr) != 0)
         return failed_envelope(ctx);
+    if ((ctx->mode & MODE_UNREAD_ENCODING) != 0)
+        return refuse_charset(ctx);
     return settle_version(ctx);
 }
 

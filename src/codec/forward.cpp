@@ -13,6 +13,8 @@
 
 #include <zuv_client_pro/soap_memory.h>
 
+#include "engine/limits.h"
+
 namespace {
 
 // --- records ---
@@ -37,18 +39,20 @@ void fill_link_chain(soap_id_record *record)
 }
 
 // Fills pointer places. An id without "#" stands for something outside the message: what waits for it stays
-// null.
+// null. So does what waits for an id that is missing, and all else is filled none the less.
 int fill_addresses(soap *ctx)
 {
-    return for_each_record(ctx, [ctx](soap_id_record *record) {
+    int error = SOAP_OK;
+    for_each_record(ctx, [ctx, &error](soap_id_record *record) {
         if (record->ptr != nullptr)
             fill_link_chain(record);
-        else if (record->id[0] == '#')
-            return id_failure(ctx, record->id + 1, SOAP_MISSING_ID);
         else
             clear_place_chain(&record->link);
+        if (record->ptr == nullptr && record->id[0] == '#' && error == SOAP_OK)
+            error = id_failure(ctx, record->id + 1, SOAP_MISSING_ID);
         return static_cast<int>(SOAP_OK);
     });
+    return error;
 }
 
 // --- forward records ---
@@ -57,10 +61,12 @@ int run_hook(soap *ctx, const soap_id_record *record, const soap_forward_record 
              std::size_t available)
 {
     const bool bytes = forward->hook == soap_copy_bytes;
+    const std::size_t size = bytes ? std::min(forward->size, available) : record->size;
+    if (bytes && copy_charge(ctx, size) != SOAP_OK)
+        return ctx->error;
     const int error_before = ctx->error;
     ctx->error = SOAP_OK;
-    forward->hook(ctx, record->type, forward->type, forward->place, forward->length, source,
-                  bytes ? std::min(forward->size, available) : record->size);
+    forward->hook(ctx, record->type, forward->type, forward->place, forward->length, source, size);
     const int error = ctx->error;
     if (error == SOAP_OK)
         ctx->error = error_before;
@@ -253,6 +259,8 @@ private:
     {
         for (void *place = record->copy, *next = nullptr; place != nullptr; place = next) {
             next = load_place(place);
+            if (copy_charge(ctx, record->size) != SOAP_OK)
+                return ctx->error;
             std::memmove(place, record->ptr, record->size);
             filled(place);
         }

@@ -10,7 +10,8 @@
 
 constexpr const char *XML_NAMESPACE_URI = "http://www.w3.org/XML/1998/namespace";
 
-// The innermost record of a prefix in scope, or null. Cost does not depend on how many are in scope.
+// The innermost record of a prefix in scope, or null: as it stands, or where strings are Latin-1 in that too.
+// Cost does not depend on how many are in scope.
 soap_prefix *xml_prefix_find(const soap *ctx, std::string_view prefix);
 
 // Keeps a copy of `uri` as the one received for a row of the working copy; "" of encoding_style is renewed
@@ -39,6 +40,9 @@ void xml_prefix_declared(soap *ctx, soap_prefix *record);
 
 // True if the blank-separated list names the prefix: by itself, or followed by a colon.
 bool xml_list_names(const char *list, std::string_view prefix);
+
+// As soap_qname_read_map without bounds, but the text is UTF-8 whatever the strings of the mode are.
+int xml_qname_map_utf8(soap *ctx, const char *text, char **target);
 
 // Prefix of a QName, empty without a colon.
 inline std::string_view xml_prefix_of(std::string_view name)

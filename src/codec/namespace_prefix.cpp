@@ -15,6 +15,7 @@
 #include "codec/namespace.h"
 #include "codec/namespace_scope.h"
 #include "codec/tag_view.h"
+#include "engine/utf8.h"
 
 namespace {
 
@@ -182,6 +183,32 @@ bool bind_uri(soap *ctx, const char *uri, std::int16_t *index)
     return true;
 }
 
+soap_prefix *find(const soap *ctx, std::string_view prefix)
+{
+    soap_prefix *record = ctx->namespace_scope->chains[chain_of(ctx->namespace_scope, prefix)];
+    while (record && text_of(record) != prefix)
+        record = record->chain;
+    return record;
+}
+
+// The record of a prefix out of a text of Latin-1; declared ones are UTF-8.
+soap_prefix *find_latin1(const soap *ctx, std::string_view prefix)
+{
+    char text[SOAP_TEXT_SIZE];
+    std::size_t length = 0;
+    bool is_ascii = true;
+    for (const char c : prefix) {
+        char bytes[6];
+        const std::size_t size = utf8_encode(static_cast<unsigned char>(c), bytes);
+        if (size > sizeof text - length)
+            return nullptr;
+        std::memcpy(text + length, bytes, size);
+        length += size;
+        is_ascii = is_ascii && size == 1;
+    }
+    return is_ascii ? nullptr : find(ctx, {text, length});
+}
+
 } // namespace
 
 bool xml_list_names(const char *list, std::string_view prefix)
@@ -203,10 +230,8 @@ soap_prefix *xml_prefix_find(const soap *ctx, std::string_view prefix)
 {
     if (!ctx->prefix_list)
         return nullptr;
-    soap_prefix *record = ctx->namespace_scope->chains[chain_of(ctx->namespace_scope, prefix)];
-    while (record && text_of(record) != prefix)
-        record = record->chain;
-    return record;
+    soap_prefix *const record = find(ctx, prefix);
+    return record || (ctx->mode & MODE_UTF_STRINGS) ? record : find_latin1(ctx, prefix);
 }
 
 std::size_t xml_prefixes_waiting(const soap *ctx)

@@ -16,6 +16,7 @@
 constexpr std::size_t PREFIX_CHAINS = 256;      // power of two
 constexpr std::size_t SPARE_PREFIXES_MAX = 256; // records kept for reuse
 constexpr std::size_t SPARE_PREFIX_SIZE = 1024; // bytes of text; larger records are freed at once
+constexpr std::size_t ATTRIBUTE_CHAINS = 128;   // power of two
 constexpr std::size_t SPARE_ATTRIBUTES_MAX = 64;
 constexpr std::size_t SPARE_ATTRIBUTE_SIZE =
     1024; // bytes of value; a record with a larger one is freed at once
@@ -33,6 +34,10 @@ struct soap_namespace_scope {
     std::uint32_t hash_factor;          // odd, not known to a peer
     soap_prefix *spare;                 // linked by next
     std::size_t spare_count;
+    soap_attribute *attribute_chains[ATTRIBUTE_CHAINS]; // the attribute table, by name
+    std::size_t attribute_count;                        // records in the chains
+    std::size_t attributes_visible;                     // of these, those in soap::attribute_list
+    std::size_t attribute_reuse;      // chain where an idle record to rename is looked for next
     soap_attribute *spare_attributes; // linked by next
     std::size_t spare_attribute_count;
     soap_namespace *spare_table; // room for row_count rows and their end; null while it is the working copy

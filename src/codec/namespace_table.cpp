@@ -158,6 +158,7 @@ void soap_namespace_scope_free(soap *ctx)
         SOAP_FREE(ctx, scope->spare);
         scope->spare = next;
     }
+    xml_attributes_drop(ctx);
     while (scope->spare_attributes) {
         soap_attribute *next = scope->spare_attributes->next;
         xml_attribute_free(ctx, scope->spare_attributes);

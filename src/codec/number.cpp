@@ -170,6 +170,7 @@ const char *floating_text(soap *ctx, double value, const char *format)
         return "NaN";
     if (std::isinf(value))
         return value > 0 ? "INF" : "-INF";
+    const c_locale_scope scope;
     std::snprintf(ctx->scratch_text, sizeof ctx->scratch_text, format, value);
     if (char *comma = std::strchr(ctx->scratch_text, ','))
         *comma = '.';

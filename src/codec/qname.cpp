@@ -13,6 +13,8 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "codec/namespace.h"
+#include "engine/limits.h"
+#include "engine/utf8.h"
 
 namespace {
 
@@ -38,12 +40,21 @@ std::string_view next_word(const char **text)
 struct text_sink {
     char *target;
     std::size_t length;
+    bool narrows; // words are UTF-8, and what is written is Latin-1
 
     void put(std::string_view text)
     {
         if (target != nullptr)
             std::memcpy(target + length, text.data(), text.size());
         length += text.size();
+    }
+    // A word of the message, or its local part. Measured for what it takes up until it is narrowed.
+    void put_word(std::string_view text)
+    {
+        const std::size_t start = length;
+        put(text);
+        if (target != nullptr && narrows)
+            length = start + utf8_to_latin1(target + start, text.size());
     }
     void put_quoted(std::string_view text)
     {
@@ -81,7 +92,7 @@ bool put_mapped(soap *ctx, std::string_view word, bool last, text_sink *out)
     if (mapped)
         record = xml_prefix_find(ctx, xml_prefix_of(word));
     if (!mapped || (record == nullptr && !last)) {
-        out->put(word);
+        out->put_word(word);
         return true;
     }
     if (record == nullptr)
@@ -89,13 +100,17 @@ bool put_mapped(soap *ctx, std::string_view word, bool last, text_sink *out)
     else if (!put_namespace(ctx, record, out))
         return false;
     out->put(":");
-    out->put(xml_local_part(word));
+    out->put_word(xml_local_part(word));
     return true;
 }
 
+// A list grows by a URI for each word; one that grows too much isn't even measured to its end.
 bool put_list(soap *ctx, const char *text, text_sink *out)
 {
+    const bool measures = out->target == nullptr;
     for (std::string_view word = next_word(&text); !word.empty();) {
+        if (measures && !copy_allowed(ctx, out->length))
+            break;
         const std::string_view next = next_word(&text);
         if (!put_mapped(ctx, word, next.empty(), out))
             return false;
@@ -104,6 +119,24 @@ bool put_list(soap *ctx, const char *text, text_sink *out)
         word = next;
     }
     return true;
+}
+
+// A managed text of what the list stands for. 0, 9, 20 or 45.
+int map_list(soap *ctx, const char *text, char **target, bool narrows)
+{
+    text_sink measure = {nullptr, 0, narrows};
+    if (!put_list(ctx, text, &measure))
+        return ctx->error = SOAP_NAMESPACE_ERROR;
+    if (copy_charge(ctx, measure.length) != SOAP_OK)
+        return ctx->error;
+    auto *mapped = static_cast<char *>(soap_block_alloc(ctx, measure.length + 1));
+    if (mapped == nullptr)
+        return ctx->error = SOAP_OUT_OF_MEMORY;
+    text_sink out = {mapped, 0, narrows};
+    put_list(ctx, text, &out);
+    mapped[out.length] = '\0';
+    *target = mapped;
+    return SOAP_OK;
 }
 
 bool length_allowed(std::size_t length, long minimum, long maximum)
@@ -186,17 +219,12 @@ int soap_qname_read_map(soap *ctx, const char *text, char **target, long minimum
         return ctx->error;
     if (!length_allowed(std::strlen(text), minimum, maximum))
         return ctx->error = SOAP_LENGTH;
-    text_sink measure = {nullptr, 0};
-    if (!put_list(ctx, text, &measure))
-        return ctx->error = SOAP_NAMESPACE_ERROR;
-    auto *mapped = static_cast<char *>(soap_block_alloc(ctx, measure.length + 1));
-    if (mapped == nullptr)
-        return ctx->error = SOAP_OUT_OF_MEMORY;
-    text_sink out = {mapped, 0};
-    put_list(ctx, text, &out);
-    mapped[out.length] = '\0';
-    *target = mapped;
-    return SOAP_OK;
+    return map_list(ctx, text, target, false);
+}
+
+int xml_qname_map_utf8(soap *ctx, const char *text, char **target)
+{
+    return map_list(ctx, text, target, (ctx->mode & MODE_UTF_STRINGS) == 0);
 }
 
 const char *soap_qname_write_map(soap *ctx, const char *text)

@@ -8,6 +8,21 @@
 #include <zuv_client_pro/soap_primitive.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "codec/namespace.h"
+
+bool type_says_nothing(soap *ctx)
+{
+    const char *const type = ctx->element_type;
+    if (*type == '\0')
+        return false;
+    const std::size_t prefix = xml_prefix_of(type).size(); // 0: the default namespace
+    const int error_before = ctx->error;
+    const bool known = soap_prefix_compare(ctx, type, "xsd", prefix, 3) == 0 ||
+                       soap_prefix_compare(ctx, type, "SOAP-ENC", prefix, 8) == 0;
+    ctx->error = error_before;
+    return known;
+}
+
 int type_accept(soap *ctx, const char *type, const char *const *also)
 {
     const char *received = ctx->element_type;

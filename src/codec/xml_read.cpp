@@ -11,6 +11,7 @@
 #include <cstring>
 #include <string_view>
 
+#include "codec/attributes.h"
 #include "codec/namespace.h"
 
 namespace {
@@ -26,7 +27,7 @@ int no_tag(soap *ctx, int error)
 // A code left by a search that found nothing says nothing about the input; any other tells why it ended.
 int end_of_input(soap *ctx)
 {
-    const int error = ctx->error;
+    const int error = ctx->exceeded != nullptr ? static_cast<int>(SOAP_LENGTH) : ctx->error;
     return error == 0 || error == SOAP_TAG_MISMATCH || error == SOAP_NO_TAG ? SOAP_EOF : error;
 }
 
@@ -67,7 +68,7 @@ int pass_byte_order_mark(soap *ctx)
     if (first == 0xEF && second == 0xBB) {
         const std::int32_t third = soap_recv_byte(ctx);
         if (third == 0xBF) {
-            ctx->mode &= ~MODE_LATIN1;
+            ctx->mode &= ~ENCODING_MODES;
             return 0;
         }
         // U+FEC0 and the following: pushed back as the one character that the three bytes are
@@ -127,9 +128,9 @@ int find_start_tag(soap *ctx)
 
 // Takes the name at `name` and the ">" behind it, which most tags are, if it is short. False: nothing was
 // consumed. The buffer must hold SHORT_NAME bytes there.
-template <class Stop> bool take_plain_name(soap *ctx, const char *name)
+template <template <bool> class Stop> bool take_plain_name(soap *ctx, const char *name)
 {
-    const char *stop = Stop::find(name, name + SHORT_NAME);
+    const char *stop = Stop<true>::find(name, name + SHORT_NAME);
     if (stop == name + SHORT_NAME || *stop != '>')
         return false;
     std::memcpy(ctx->tag, name, SHORT_NAME);
@@ -162,7 +163,9 @@ int read_tag_name(soap *ctx)
     if (input_skip_blanks(ctx) == XML_EOF)
         return no_tag(ctx, end_of_input(ctx));
     ctx->tag_length = static_cast<std::uint16_t>(xml_name_read<tag_name_stop>(ctx, ctx->tag));
-    return ctx->tag_length == 0 ? no_tag(ctx, SOAP_SYNTAX_ERROR) : 0;
+    if (ctx->tag_length != 0)
+        return 0;
+    return no_tag(ctx, xml_is_refused(ctx) ? ctx->error : static_cast<int>(SOAP_SYNTAX_ERROR));
 }
 
 // The innermost declaration is of an element that has ended.
@@ -212,13 +215,14 @@ int read_tag_end(soap *ctx)
         ctx->has_body = 1;
         return ctx->error = 0;
     }
-    const int error = xml_attributes_read(ctx);
+    bool names_wide = false;
+    const int error = xml_attributes_read(ctx, &names_wide);
     if (error != 0)
         return no_tag(ctx, error == SOAP_EOF ? end_of_input(ctx) : error);
     if (read_tag_end(ctx) != 0)
         return ctx->error;
     if (ctx->attributes_set != 0)
-        xml_attributes_apply(ctx);
+        xml_attributes_apply(ctx, names_wide);
     return ctx->error = 0;
 }
 
@@ -318,7 +322,7 @@ bool has_undeclared_type(const soap *ctx)
     ctx->error = soap_tag_compare(ctx, ctx->tag, tag);
     if (ctx->error != 0)
         return ctx->error;
-    ctx->peeked = 0;
+    // Refused tags stay held, so that nesting_level still tells where the reader is.
     if (type != nullptr && ctx->element_type[0] != '\0' &&
         soap_tag_compare(ctx, ctx->element_type, type) != 0)
         return ctx->error = SOAP_TYPE_MISMATCH;
@@ -328,7 +332,10 @@ bool has_undeclared_type(const soap *ctx)
         if (nil_allowed == 0 && ctx->null_flag != 0)
             return ctx->error = SOAP_NIL;
     }
-    return ctx->error = enter_element(ctx);
+    ctx->error = enter_element(ctx);
+    if (ctx->error == 0)
+        ctx->peeked = 0;
+    return ctx->error;
 }
 
 [[gnu::noinline]] int end_after_content(soap *ctx, const char *tag, bool any_name)
@@ -352,6 +359,17 @@ bool has_undeclared_type(const soap *ctx)
 }
 
 } // namespace
+
+void xml_name_character(soap *ctx, char *name, std::size_t &kept)
+{
+    char bytes[6];
+    const std::int32_t token = soap_char_next_utf8(ctx);
+    const std::size_t size = token == XML_EOF ? 0 : utf8_encode(token_code(token), bytes);
+    if (size > SOAP_TEXT_SIZE - 1 - kept)
+        return;
+    std::memcpy(name + kept, bytes, size);
+    kept += size;
+}
 
 int soap_element_head_read(soap *ctx)
 {
@@ -413,11 +431,10 @@ int soap_element_skip(soap *ctx)
     if ((ctx->mode & MODE_STRICT) != 0 && ctx->message_part != PART_HEADER)
         return ctx->error = SOAP_TAG_MISMATCH;
     ctx->peeked = 0;
-    ctx->error = 0;
-    if (ctx->has_body == 0)
-        return 0;
-    ctx->nesting_level++; // the end of the element takes it back
-    return soap_element_in_end(ctx, nullptr);
+    ctx->error = enter_element(ctx);
+    if (ctx->error != 0 || ctx->has_body == 0)
+        return ctx->error;
+    return soap_element_in_end(ctx, nullptr); // which takes the level back
 }
 
 void soap_tag_unread(soap *ctx)

@@ -12,26 +12,28 @@
 constexpr std::size_t SHORT_NAME = 64;
 
 // Reads the attributes behind a tag's name up to the ">" or "/" that ends them, which stays unread: records
-// in the attribute table, declarations on the prefix stack. 0, -1, 5 or 20.
-int xml_attributes_read(soap *ctx);
+// in the attribute table, declarations on the prefix stack. 0, -1, 5, 20 or 47. `names_wide` is set if values
+// that are names are UTF-8 though strings are Latin-1, until they have been applied.
+int xml_attributes_read(soap *ctx, bool *names_wide);
 
-// Sets the context's fields from the attributes that the engine itself understands. Clears the error.
-void xml_attributes_apply(soap *ctx);
+// Sets the context's fields from the attributes that the engine itself understands, white space around them
+// apart. Clears the error.
+void xml_attributes_apply(soap *ctx, bool names_wide);
 
-// Makes all records of the attribute table idle.
-void xml_attributes_hide(soap *ctx);
+// Reads a character of a name from 128 on, and appends it to the `kept` bytes of `name` if it fits.
+void xml_name_character(soap *ctx, char *name, std::size_t &kept);
 
 // Reads a name up to a byte of the class Stop, which stays unread. Keeps what fits `name` (SOAP_TEXT_SIZE
-// bytes), terminated; the rest is dropped. The kept length.
-template <class Stop> std::size_t xml_name_read(soap *ctx, char *name)
+// bytes), in UTF-8, terminated; the rest is dropped. The kept length.
+template <template <bool> class Stop> std::size_t xml_name_read(soap *ctx, char *name)
 {
     std::size_t kept = 0;
     while (input_ready(ctx)) {
         const char *here = input_here(ctx);
-        const char *stop = Stop::find(here, input_end(ctx));
+        const char *stop = Stop<true>::find(here, input_end(ctx));
         const auto found = static_cast<std::size_t>(stop - here);
         if (kept == 0 && found < SHORT_NAME &&
-            input_end(ctx) - here >= static_cast<std::ptrdiff_t>(SHORT_NAME)) {
+            input_end(ctx) - here >= static_cast<std::ptrdiff_t>(SHORT_NAME) && !is_high(*stop)) {
             std::memcpy(name, here, SHORT_NAME);
             name[found] = '\0';
             input_consume(ctx, stop);
@@ -42,8 +44,11 @@ template <class Stop> std::size_t xml_name_read(soap *ctx, char *name)
         std::memcpy(name + kept, here, taken);
         kept += taken;
         input_consume(ctx, stop);
-        if (stop != input_end(ctx))
+        if (stop == input_end(ctx))
+            continue;
+        if (!is_high(*stop))
             break;
+        xml_name_character(ctx, name, kept);
     }
     name[kept] = '\0';
     return kept;

@@ -3,11 +3,11 @@
 // Here: the attribute loop, values of any size, and the attributes of SOAP and XSI. Elsewhere: the records
 // themselves (attributes.cpp), the tag (xml_read.cpp), the prefix stack (namespace_prefix.cpp).
 //
-// Always: records and their value buffers are kept for the next element. The table holds no more than
-// RECORDS_KEPT of them, or as many as one element needs, so that a message of ever new names can't make it
-// grow.
+// Always: an attribute costs the same however many the element has.
 #include <algorithm>
+#include <array>
 #include <cstring>
+#include <string_view>
 
 #include <zuv_client_pro/soap_primitive.h>
 
@@ -17,65 +17,30 @@
 
 namespace {
 
-constexpr int RECORDS_KEPT = 256; // beyond that an idle record makes room for a new one
-constexpr std::size_t VALUE_BYTES_MIN = 256;
+constexpr std::size_t VALUE_BYTES_MIN = 64;
 
 constexpr char NEXT_ACTOR[] = "http://schemas.xmlsoap.org/soap/actor/next";
 constexpr char NEXT_ROLE[] = "http://www.w3.org/2003/05/soap-envelope/role/next";
 
 // ------------------------------------------------------------------------------------------ records
 
-struct record_search {
-    soap_attribute *found = nullptr;
-    soap_attribute **idle = nullptr; // link to some idle record
-    int count = 0;
-};
+// Where the attributes of an element go in the list: plain names and declarations come first, so that they
+// are understood first.
+struct attribute_order {
+    soap *ctx;
+    soap_attribute **end; // behind the last one
 
-record_search find_record(soap *ctx, std::string_view name)
-{
-    record_search search;
-    for (soap_attribute **link = &ctx->attribute_list; *link != nullptr; link = &(*link)->next) {
-        if (xml_attribute_name(*link) == name) {
-            search.found = *link;
-            break;
-        }
-        if ((*link)->visible == 0)
-            search.idle = link;
-        ++search.count;
+    explicit attribute_order(soap *context) : ctx(context), end(&context->attribute_list) {}
+
+    void put(soap_attribute *record)
+    {
+        const bool prefixed = std::memchr(record->name, ':', record->name_length) != nullptr;
+        const bool moves_end = prefixed || end == &ctx->attribute_list;
+        xml_attribute_show(ctx, prefixed ? end : &ctx->attribute_list, record, 1);
+        if (moves_end)
+            end = &record->next;
     }
-    return search;
-}
-
-void free_record(soap *ctx, soap_attribute **link)
-{
-    soap_attribute *record = *link;
-    *link = record->next;
-    xml_attribute_drop(ctx, record);
-}
-
-// Plain names and declarations stay ahead of names with a prefix, so that they are understood first.
-void move_to_end(soap *ctx, soap_attribute *record)
-{
-    ctx->attribute_list = record->next;
-    soap_attribute **end = &ctx->attribute_list;
-    while (*end != nullptr)
-        end = &(*end)->next;
-    record->next = nullptr;
-    *end = record;
-}
-
-soap_attribute *record_for(soap *ctx, const char *name, std::size_t length)
-{
-    const record_search search = find_record(ctx, {name, length});
-    if (search.found != nullptr)
-        return search.found;
-    if (search.count >= RECORDS_KEPT && search.idle != nullptr)
-        free_record(ctx, search.idle);
-    soap_attribute *record = xml_attribute_make(ctx, {name, length});
-    if (record != nullptr && std::memchr(name, ':', length) != nullptr)
-        move_to_end(ctx, record);
-    return record;
-}
+};
 
 int store_value(soap *ctx, soap_attribute *record, const char *text, std::size_t length)
 {
@@ -92,28 +57,43 @@ int store_value(soap *ctx, soap_attribute *record, const char *text, std::size_t
 // A byte that a value goes on behind, but not as it stands.
 bool is_special(char c)
 {
-    return c == '&' || c == '\0' || static_cast<unsigned char>(c) >= 0x80;
+    return c == '&' || is_high(c) || is_control(c);
 }
 
-// A reference, the start of a sequence to decode, or a zero byte.
+// A reference, the start of a character to decode, or a control character, as UTF-8.
 int gather_special(soap *ctx)
 {
-    if (*input_here(ctx) != '&')
-        return text_put_token(ctx, text_token(ctx));
-    ctx->buffer_index++;
-    const auto code = static_cast<std::uint32_t>(soap_entity_read(ctx));
-    return text_put_code(ctx, code);
+    std::int32_t token;
+    if (*input_here(ctx) == '&') {
+        ctx->buffer_index++;
+        token = soap_entity_read(ctx);
+    } else {
+        token = text_token(ctx);
+    }
+    if (token == XML_EOF)
+        return SOAP_EOF;
+    char bytes[6];
+    return text_put(ctx, bytes, utf8_encode(token_code(token), bytes));
+}
+
+// The end of what may be taken as it stands for UTF-8.
+template <template <bool> class Stop>
+const char *value_end(const soap *ctx, const char *here, const char *end)
+{
+    const char *const stop = Stop<true>::find(here, end);
+    const bool is_utf8 = (ctx->mode & BYTE_MODES) == MODE_UTF_STRINGS;
+    return is_utf8 && stop != end && is_high(*stop) ? utf8_stretch_end<Stop>(stop, end) : stop;
 }
 
 // Gathers a value in the growing text, over refills and references, up to a byte of Stop that is no special
 // one.
-template <class Stop> int gather_value(soap *ctx)
+template <template <bool> class Stop> int gather_value(soap *ctx)
 {
     for (;;) {
         if (!input_ready(ctx))
             return SOAP_EOF;
         const char *here = input_here(ctx);
-        const char *stop = Stop::find(here, input_end(ctx));
+        const char *stop = value_end<Stop>(ctx, here, input_end(ctx));
         if (text_put(ctx, here, static_cast<std::size_t>(stop - here)) != 0)
             return ctx->error;
         input_consume(ctx, stop);
@@ -121,81 +101,96 @@ template <class Stop> int gather_value(soap *ctx)
             continue;
         if (!is_special(*stop))
             return 0;
-        if (gather_special(ctx) != 0)
-            return ctx->error;
+        const int error = gather_special(ctx);
+        if (error != 0)
+            return error;
     }
 }
 
-// A value that stands whole and plain in the buffer is copied once; any other is gathered first.
-template <class Stop> int read_value(soap *ctx, soap_attribute *record)
+// Values of these names are names themselves, which stay UTF-8 until their prefixes have been looked up.
+bool holds_name(const soap_attribute *record)
+{
+    const std::string_view local = xml_local_part(xml_attribute_name(record));
+    return local == "type" || local == "arrayType" || local == "itemType";
+}
+
+// Makes a value of UTF-8 one of Latin-1.
+void narrow_value(soap_attribute *record)
+{
+    record->value[utf8_to_latin1(record->value, std::strlen(record->value))] = '\0';
+}
+
+// A value that stands whole and plain in the buffer is copied once; any other is gathered first. `names_wide`
+// is set if that leaves a name that is UTF-8 where strings are Latin-1.
+template <template <bool> class Stop> int read_value(soap *ctx, soap_attribute *record, bool *names_wide)
 {
     const char *here = input_here(ctx);
-    const char *stop = Stop::find(here, input_end(ctx));
+    const char *stop = value_end<Stop>(ctx, here, input_end(ctx));
     if (stop != input_end(ctx) && !is_special(*stop)) {
         input_consume(ctx, stop);
         return store_value(ctx, record, here, static_cast<std::size_t>(stop - here));
     }
     ctx->label_index = 0;
-    const int error = gather_value<Stop>(ctx);
-    if (error != 0)
+    int error = gather_value<Stop>(ctx);
+    if (error == 0)
+        error = store_value(ctx, record, ctx->label_index != 0 ? ctx->label_buffer : "", ctx->label_index);
+    if (error != 0 || (ctx->mode & MODE_UTF_STRINGS) != 0)
         return error;
-    return store_value(ctx, record, ctx->label_index != 0 ? ctx->label_buffer : "", ctx->label_index);
+    if (holds_name(record))
+        *names_wide = true;
+    else
+        narrow_value(record);
+    return 0;
 }
 
-int read_quoted(soap *ctx, soap_attribute *record, char quote)
+int read_quoted(soap *ctx, soap_attribute *record, char quote, bool *names_wide)
 {
     ctx->buffer_index++;
     if (!input_ready(ctx))
         return SOAP_EOF;
-    const bool decode = text_needs_decoding(ctx);
-    int error;
-    if (quote == '"')
-        error = decode ? read_value<quoted_decode_stop>(ctx, record) : read_value<quoted_stop>(ctx, record);
-    else
-        error = decode ? read_value<apos_decode_stop>(ctx, record) : read_value<apos_stop>(ctx, record);
+    const int error = quote == '"' ? read_value<quoted_stop>(ctx, record, names_wide)
+                                   : read_value<apos_stop>(ctx, record, names_wide);
     if (error == 0)
         ctx->buffer_index++;
     return error;
 }
 
-int read_unquoted(soap *ctx, soap_attribute *record)
-{
-    return text_needs_decoding(ctx) ? read_value<unquoted_decode_stop>(ctx, record)
-                                    : read_value<unquoted_stop>(ctx, record);
-}
-
 // ------------------------------------------------------------------------------------------ the loop
 
-// The prefix that an attribute of this name declares, or null.
-const char *declared_prefix(const char *name)
+// The prefix that an attribute declares, or null.
+const char *declared_prefix(const soap_attribute *record)
 {
-    if (std::strncmp(name, "xmlns", 5) != 0)
+    const std::string_view name = xml_attribute_name(record);
+    if (!name.starts_with("xmlns"))
         return nullptr;
-    return name[5] == '\0' ? name + 5 : name[5] == ':' ? name + 6 : nullptr;
+    return name.size() == 5 ? record->name + 5 : record->name[5] == ':' ? record->name + 6 : nullptr;
 }
 
-int read_attribute(soap *ctx)
+int read_attribute(soap *ctx, attribute_order &order, bool *names_wide)
 {
     char *name = ctx->scratch_text;
     const std::size_t length = xml_name_read<attribute_name_stop>(ctx, name);
     if (length == 0)
-        return SOAP_SYNTAX_ERROR;
-    soap_attribute *record = record_for(ctx, name, length);
+        return xml_is_refused(ctx) ? ctx->error : static_cast<int>(SOAP_SYNTAX_ERROR);
+    soap_attribute *record = xml_attribute_record(ctx, {name, length});
     if (record == nullptr)
         return ctx->error;
     ctx->attributes_set = 1;
-    record->visible = 1;
+    if (record->visible == 0)
+        order.put(record);
+    record->visible = 1; // the last of one name counts
     if (input_skip_blanks(ctx) != '=')
         return 0;
     ctx->buffer_index++;
     const std::int32_t first = input_skip_blanks(ctx);
     if (first == XML_EOF)
         return SOAP_EOF;
-    const int error = first == '"' || first == '\'' ? read_quoted(ctx, record, static_cast<char>(first))
-                                                    : read_unquoted(ctx, record);
+    const bool is_quoted = first == '"' || first == '\'';
+    const int error = is_quoted ? read_quoted(ctx, record, static_cast<char>(first), names_wide)
+                                : read_value<unquoted_stop>(ctx, record, names_wide);
     if (error != 0)
         return error;
-    const char *prefix = declared_prefix(record->name);
+    const char *prefix = declared_prefix(record);
     if (prefix == nullptr)
         return 0;
     return soap_prefix_push_in(ctx, prefix, record->value) != nullptr ? 0 : ctx->error;
@@ -203,68 +198,60 @@ int read_attribute(soap *ctx)
 
 // ------------------------------------------------------------------------------------------ meaning
 
-bool is_true(const char *value)
+bool is_true(std::string_view value)
 {
-    return std::strcmp(value, "1") == 0 || std::strcmp(value, "true") == 0;
+    return value == "1" || value == "true";
 }
 
-// Copies what fits a text buffer of the context.
-void keep_text(char *target, const char *text)
+// Copies what fits a text buffer of the context, from its first `used` bytes on.
+void keep_text(char *target, std::string_view text, std::size_t used = 0)
 {
-    std::size_t length = std::strlen(text);
-    if (length > SOAP_TEXT_SIZE - 1)
-        length = SOAP_TEXT_SIZE - 1;
-    std::memcpy(target, text, length);
-    target[length] = '\0';
+    std::size_t length = text.size();
+    if (length > SOAP_TEXT_SIZE - 1 - used)
+        length = utf8_whole(text.data(), SOAP_TEXT_SIZE - 1 - used);
+    std::memcpy(target + used, text.data(), length);
+    target[used + length] = '\0';
 }
 
 // "#" and a name, as references are entered in the id table.
-void keep_reference(char *target, const char *name)
+void keep_reference(char *target, std::string_view name)
 {
     target[0] = '#';
-    std::size_t length = std::strlen(name);
-    if (length > SOAP_TEXT_SIZE - 2)
-        length = SOAP_TEXT_SIZE - 2;
-    std::memcpy(target + 1, name, length);
-    target[length + 1] = '\0';
+    keep_text(target, name, 1);
 }
 
-void keep_array_type(soap *ctx, const char *value)
+void keep_array_type(soap *ctx, std::string_view value)
 {
-    const char *bracket = std::strrchr(value, '[');
-    if (bracket == nullptr || bracket - value > static_cast<std::ptrdiff_t>(SOAP_TEXT_SIZE - 1)) {
+    const std::size_t bracket = value.rfind('[');
+    if (bracket == std::string_view::npos || bracket > SOAP_TEXT_SIZE - 1) {
         keep_text(ctx->array_type, value);
         return;
     }
-    const auto length = static_cast<std::size_t>(bracket - value);
-    std::memcpy(ctx->array_type, value, length);
-    ctx->array_type[length] = '\0';
-    keep_text(ctx->array_size, bracket);
+    keep_text(ctx->array_type, value.substr(0, bracket));
+    keep_text(ctx->array_size, value.substr(bracket));
 }
 
 // The element is for another actor unless it names this receiver or whoever comes next.
-void check_actor(soap *ctx, const char *value, const char *next)
+void check_actor(soap *ctx, std::string_view value, const char *next)
 {
-    const bool own = ctx->actor != nullptr && std::strcmp(value, ctx->actor) == 0;
-    if (!own && std::strcmp(value, next) != 0)
+    const bool own = ctx->actor != nullptr && value == ctx->actor;
+    if (!own && value != next)
         ctx->other_flag = 1;
 }
 
 // An attribute without a prefix that is known by its plain name.
-bool apply_plain(soap *ctx, const char *name, const char *value)
+bool apply_plain(soap *ctx, std::string_view name, std::string_view value)
 {
     const bool graph = (ctx->mode & SOAP_XML_GRAPH) != 0;
-    if (std::strcmp(name, "id") == 0 &&
-        (graph || (ctx->soap_version > 0 && (ctx->mode & SOAP_XML_TREE) == 0))) {
+    if (name == "id" && (graph || (ctx->soap_version > 0 && (ctx->mode & SOAP_XML_TREE) == 0))) {
         keep_reference(ctx->element_id, value);
         return true;
     }
-    if (std::strcmp(name, "href") == 0 &&
-        (graph || ctx->soap_version == 1 || (ctx->mode & (MODE_DIME | MODE_MTOM)) != 0)) {
+    if (name == "href" && (graph || ctx->soap_version == 1 || (ctx->mode & (MODE_DIME | MODE_MTOM)) != 0)) {
         keep_text(ctx->element_href, value);
         return true;
     }
-    if (std::strcmp(name, "ref") == 0 && ctx->soap_version == 2) {
+    if (name == "ref" && ctx->soap_version == 2) {
         keep_reference(ctx->element_href, value);
         return true;
     }
@@ -272,7 +259,7 @@ bool apply_plain(soap *ctx, const char *name, const char *value)
 }
 
 // What an attribute with a known qualified name does. False: it goes on to the rows below.
-using attribute_action = bool (*)(soap *ctx, const char *value);
+using attribute_action = bool (*)(soap *ctx, std::string_view value);
 
 struct attribute_rule {
     constexpr attribute_rule(const char *rule_name, int applies_in, attribute_action action)
@@ -287,7 +274,7 @@ struct attribute_rule {
 
 constexpr int ANY_VERSION = 7, NO_VERSION = 1, SOAP_1_1 = 2, SOAP_1_2 = 4;
 
-bool apply_nil(soap *ctx, const char *value)
+bool apply_nil(soap *ctx, std::string_view value)
 {
     if (!is_true(value))
         return false;
@@ -297,86 +284,121 @@ bool apply_nil(soap *ctx, const char *value)
 
 constexpr attribute_rule rules[] = {
     {"xsi:type", ANY_VERSION,
-     [](soap *ctx, const char *value) { return keep_text(ctx->element_type, value), true; }},
+     [](soap *ctx, std::string_view value) { return keep_text(ctx->element_type, value), true; }},
     {"xsi:null", ANY_VERSION, apply_nil},
     {"xsi:nil", ANY_VERSION, apply_nil},
     {"SOAP-ENC:arrayType", SOAP_1_1,
-     [](soap *ctx, const char *value) { return keep_array_type(ctx, value), true; }},
+     [](soap *ctx, std::string_view value) { return keep_array_type(ctx, value), true; }},
     {"SOAP-ENC:offset", SOAP_1_1,
-     [](soap *ctx, const char *value) { return keep_text(ctx->array_offset, value), true; }},
+     [](soap *ctx, std::string_view value) { return keep_text(ctx->array_offset, value), true; }},
     {"SOAP-ENC:position", SOAP_1_1,
-     [](soap *ctx, const char *value) {
-         ctx->position_count = static_cast<std::int16_t>(soap_position_parse(value, ctx->positions));
+     [](soap *ctx, std::string_view value) {
+         ctx->position_count = static_cast<std::int16_t>(soap_position_parse(value.data(), ctx->positions));
          return true;
      }},
     {"SOAP-ENC:root", SOAP_1_1,
-     [](soap *ctx, const char *value) {
+     [](soap *ctx, std::string_view value) {
          ctx->root_flag = is_true(value) ? 1 : 0;
          return true;
      }},
     {"SOAP-ENV:mustUnderstand", SOAP_1_1 | SOAP_1_2,
-     [](soap *ctx, const char *value) {
+     [](soap *ctx, std::string_view value) {
          if (is_true(value))
              ctx->must_understand = 1;
          return true;
      }},
     {"SOAP-ENV:actor", SOAP_1_1,
-     [](soap *ctx, const char *value) { return check_actor(ctx, value, NEXT_ACTOR), true; }},
+     [](soap *ctx, std::string_view value) { return check_actor(ctx, value, NEXT_ACTOR), true; }},
     {"SOAP-ENC:ref", SOAP_1_2,
-     [](soap *ctx, const char *value) { return keep_reference(ctx->element_href, value), true; }},
+     [](soap *ctx, std::string_view value) { return keep_reference(ctx->element_href, value), true; }},
     {"SOAP-ENC:itemType", SOAP_1_2,
-     [](soap *ctx, const char *value) { return keep_text(ctx->array_type, value), true; }},
+     [](soap *ctx, std::string_view value) { return keep_text(ctx->array_type, value), true; }},
     {"SOAP-ENC:arraySize", SOAP_1_2,
-     [](soap *ctx, const char *value) { return keep_text(ctx->array_size, value), true; }},
+     [](soap *ctx, std::string_view value) { return keep_text(ctx->array_size, value), true; }},
     {"SOAP-ENV:role", SOAP_1_2,
-     [](soap *ctx, const char *value) { return check_actor(ctx, value, NEXT_ROLE), true; }},
+     [](soap *ctx, std::string_view value) { return check_actor(ctx, value, NEXT_ROLE), true; }},
     {"wsdl:required", NO_VERSION,
-     [](soap *ctx, const char *value) {
-         if (std::strcmp(value, "true") == 0)
+     [](soap *ctx, std::string_view value) {
+         if (value == "true")
              ctx->must_understand = 1;
          return true;
      }},
 };
 
-void apply_attribute(soap *ctx, const char *name, const char *value)
+// The types of these values leave white space around them out of account.
+std::string_view without_blanks(std::string_view value)
 {
-    if (declared_prefix(name) != nullptr || apply_plain(ctx, name, value))
-        return;
+    while (!value.empty() && is_blank(static_cast<unsigned char>(value.front())))
+        value.remove_prefix(1);
+    while (!value.empty() && is_blank(static_cast<unsigned char>(value.back())))
+        value.remove_suffix(1);
+    return value;
+}
+
+// By first letter: bit n tells that some name which is understood has a local part of n bytes.
+constexpr std::size_t LETTERS = 32;
+constexpr auto KNOWN_LENGTHS = [] {
+    std::array<std::uint32_t, LETTERS> lengths{};
+    const auto add = [&lengths](std::string_view local) {
+        lengths[static_cast<unsigned char>(local[0]) % LETTERS] |= 1U << local.size();
+    };
+    for (const std::string_view plain : {"id", "href", "ref"})
+        add(plain);
+    for (const attribute_rule &rule : rules)
+        add(rule.local);
+    return lengths;
+}();
+
+bool may_be_known(std::string_view local)
+{
+    return !local.empty() && local.size() < 32 &&
+           (KNOWN_LENGTHS[static_cast<unsigned char>(local[0]) % LETTERS] >> local.size() & 1) != 0;
+}
+
+void apply_attribute(soap *ctx, const soap_attribute *record)
+{
+    const std::string_view name = xml_attribute_name(record);
     const std::string_view local = xml_local_part(name);
+    if (!may_be_known(local))
+        return;
+    const bool prefixed = local.size() != name.size();
+    const std::string_view value = without_blanks(record->value);
+    if (prefixed ? declared_prefix(record) != nullptr : apply_plain(ctx, name, value))
+        return;
     const int version = 1 << ctx->soap_version;
     for (const attribute_rule &rule : rules) {
-        if ((rule.versions & version) != 0 && rule.local == local &&
-            soap_tag_compare(ctx, name, rule.name) == 0 && rule.apply(ctx, value))
+        if (rule.local == local && (rule.versions & version) != 0 &&
+            soap_tag_compare(ctx, record->name, rule.name) == 0 && rule.apply(ctx, value))
             return;
     }
 }
 
 } // namespace
 
-int xml_attributes_read(soap *ctx)
+int xml_attributes_read(soap *ctx, bool *names_wide)
 {
+    if (ctx->attribute_list != nullptr)
+        xml_attributes_hide(ctx);
+    attribute_order order(ctx);
     for (int count = 0;; ++count) {
         const std::int32_t byte = input_skip_blanks(ctx);
         if (byte == XML_EOF || byte == '>' || byte == '/')
             return 0;
-        const int error = count < SOAP_ATTRIBUTES_MAX ? read_attribute(ctx) : SOAP_SYNTAX_ERROR;
+        const int error =
+            count < SOAP_ATTRIBUTES_MAX ? read_attribute(ctx, order, names_wide) : SOAP_SYNTAX_ERROR;
         if (error != 0)
             return error;
     }
 }
 
-void xml_attributes_apply(soap *ctx)
+void xml_attributes_apply(soap *ctx, bool names_wide)
 {
-    for (const soap_attribute *p = ctx->attribute_list; p != nullptr; p = p->next) {
-        if (p->visible == 2 && p->value != nullptr)
-            apply_attribute(ctx, p->name, p->value);
+    for (soap_attribute *p = ctx->attribute_list; p != nullptr; p = p->next) {
+        if (p->visible != 2 || p->value == nullptr)
+            continue;
+        apply_attribute(ctx, p);
+        if (names_wide && holds_name(p))
+            narrow_value(p);
     }
     ctx->error = 0;
-}
-
-void xml_attributes_hide(soap *ctx)
-{
-    for (soap_attribute *p = ctx->attribute_list; p != nullptr; p = p->next)
-        p->visible = 0;
-    ctx->attributes_set = 0;
 }

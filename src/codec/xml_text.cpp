@@ -12,6 +12,7 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_primitive.h>
 
+#include "codec/namespace.h"
 #include "codec/xml_scan.h"
 
 namespace {
@@ -21,9 +22,8 @@ constexpr std::size_t SIMPLE_BYTES_MAX = SOAP_TEXT_SIZE - 1;
 // The end of the plain stretch at the read position.
 const char *plain_end(const soap *ctx, const char *here, const char *end)
 {
-    if (ctx->in_cdata == CDATA_OUTSIDE)
-        return text_end(ctx, here, end);
-    return text_needs_decoding(ctx) ? cdata_decode_stop::find(here, end) : cdata_stop::find(here, end);
+    return ctx->in_cdata == CDATA_OUTSIDE ? text_end(ctx, here, end)
+                                          : stretch_end<cdata_stop>(ctx, here, end);
 }
 
 // Copies what needs no look at single bytes.
@@ -51,7 +51,7 @@ int gather_text(soap *ctx, text_limits &limits)
         const std::int32_t token = text_token(ctx);
         if (depth.ends_at(token)) {
             ctx->look_ahead = token;
-            return text_limits_finish(ctx, limits);
+            return xml_is_refused(ctx) ? ctx->error : text_limits_finish(ctx, limits);
         }
         if (text_put_token(ctx, token) != 0 || text_limits_check(ctx, limits) != 0)
             return ctx->error;
@@ -93,18 +93,12 @@ const char *simple_value_done(soap *ctx, std::size_t length, bool cut)
     return ctx->scratch_text;
 }
 
-bool has_byte(std::uint32_t code)
+// The bytes of a character in a byte string; `target` has room for six.
+std::size_t code_bytes(const soap *ctx, std::uint32_t code, char *target)
 {
-    return code != 0 && code <= 0xFF;
-}
-
-// The bytes of a token in a byte string; `target` has room for six.
-std::size_t token_bytes(const soap *ctx, std::int32_t token, char *target)
-{
-    const std::uint32_t code = token_code(token);
-    if ((ctx->mode & MODE_UTF_STRINGS) != 0 && (code > 0xFF || is_reference(token)))
+    if ((ctx->mode & MODE_UTF_STRINGS) != 0)
         return utf8_encode(code, target);
-    *target = has_byte(code) ? static_cast<char>(code) : '?';
+    *target = code <= 0xFF ? static_cast<char>(code) : '?';
     return 1;
 }
 
@@ -112,12 +106,12 @@ const char *simple_value_by_tokens(soap *ctx)
 {
     std::int32_t token;
     do
-        token = text_token(ctx);
+        token = soap_char_next_utf8(ctx);
     while (is_blank(token));
     std::size_t length = 0;
     char bytes[6];
     while (!ends_simple_value(token)) {
-        const std::size_t size = token_bytes(ctx, token, bytes);
+        const std::size_t size = code_bytes(ctx, token_code(token), bytes);
         if (size > SIMPLE_BYTES_MAX - length)
             break;
         std::memcpy(ctx->scratch_text + length, bytes, size);
@@ -125,7 +119,24 @@ const char *simple_value_by_tokens(soap *ctx)
         token = text_token(ctx);
     }
     token_push_back(ctx, token);
-    return simple_value_done(ctx, length, !ends_simple_value(token));
+    return xml_is_refused(ctx) ? nullptr : simple_value_done(ctx, length, !ends_simple_value(token));
+}
+
+// Form 0 or 1 of a string, in place or in the growing text. Null on failure.
+const char *string_text(soap *ctx, int form, long minimum, long maximum, std::size_t *length)
+{
+    const char *text;
+    if (form != 0 && xml_text_in_place(ctx, &text, length)) {
+        if (fits(ctx, text, *length, minimum, maximum))
+            return text;
+        ctx->error = SOAP_LENGTH;
+        return nullptr;
+    }
+    text_limits limits{minimum, maximum};
+    if ((form == 0 ? text_gather_raw(ctx, limits) : gather_text(ctx, limits)) != 0)
+        return nullptr;
+    *length = ctx->label_index;
+    return ctx->label_index != 0 ? ctx->label_buffer : "";
 }
 
 } // namespace
@@ -141,32 +152,10 @@ int text_put(soap *ctx, const char *text, std::size_t length)
     return 0;
 }
 
-std::size_t utf8_encode(std::uint32_t code, char target[6])
-{
-    if (code < 0x80) {
-        target[0] = static_cast<char>(code);
-        return 1;
-    }
-    const std::size_t size = code < 0x800       ? 2
-                             : code < 0x10000   ? 3
-                             : code < 0x200000  ? 4
-                             : code < 0x4000000 ? 5
-                                                : 6;
-    for (std::size_t i = size - 1; i != 0; --i, code >>= 6)
-        target[i] = static_cast<char>(0x80 | (code & 0x3F));
-    target[0] = static_cast<char>((0xFF00u >> size) | code);
-    return size;
-}
-
 int text_put_code(soap *ctx, std::uint32_t code)
 {
     char bytes[6];
-    std::size_t size = 1;
-    if ((ctx->mode & MODE_UTF_STRINGS) != 0)
-        size = utf8_encode(code, bytes);
-    else
-        bytes[0] = has_byte(code) ? static_cast<char>(code) : '?';
-    return text_put(ctx, bytes, size);
+    return text_put(ctx, bytes, code_bytes(ctx, code, bytes));
 }
 
 int text_put_token(soap *ctx, std::int32_t token)
@@ -175,8 +164,7 @@ int text_put_token(soap *ctx, std::int32_t token)
         return text_put(ctx, "<", 1);
     if (token == XML_END)
         return text_put(ctx, "</", 2);
-    char bytes[6];
-    return text_put(ctx, bytes, token_bytes(ctx, token, bytes));
+    return text_put_code(ctx, token_code(token));
 }
 
 bool xml_text_in_place(soap *ctx, const char **text, std::size_t *length)
@@ -205,25 +193,19 @@ const char *soap_text_read(soap *ctx, std::size_t *length)
 
 char *soap_string_read(soap *ctx, int form, long minimum, long maximum)
 {
-    const char *text;
     std::size_t length;
-    if (form != 0 && xml_text_in_place(ctx, &text, &length)) {
-        if (!fits(ctx, text, length, minimum, maximum)) {
-            ctx->error = SOAP_LENGTH;
-            return nullptr;
-        }
-    } else {
-        text_limits limits{minimum, maximum};
-        if ((form == 0 ? text_gather_raw(ctx, limits) : gather_text(ctx, limits)) != 0)
-            return nullptr;
-        text = ctx->label_index != 0 ? ctx->label_buffer : "";
-        length = ctx->label_index;
+    if (form != 2) {
+        const char *const text = string_text(ctx, form, minimum, maximum, &length);
+        return text != nullptr ? soap_string_dup_n(ctx, text, length) : nullptr;
     }
-    char *result = soap_string_dup_n(ctx, text, length);
-    if (result == nullptr || form != 2)
-        return result;
+    // Prefixes are declared in UTF-8 and have to be looked up in it.
+    const std::uint32_t strings = ctx->mode & MODE_UTF_STRINGS;
+    ctx->mode |= MODE_UTF_STRINGS;
+    const char *text = string_text(ctx, 1, minimum, maximum, &length);
+    text = text != nullptr ? soap_string_dup_n(ctx, text, length) : nullptr;
+    ctx->mode = (ctx->mode & ~MODE_UTF_STRINGS) | strings;
     char *mapped = nullptr;
-    return soap_qname_read_map(ctx, result, &mapped, minimum, maximum) == 0 ? mapped : nullptr;
+    return text != nullptr && xml_qname_map_utf8(ctx, text, &mapped) == 0 ? mapped : nullptr;
 }
 
 const char *soap_simple_value_read(soap *ctx)
@@ -240,7 +222,9 @@ const char *soap_simple_value_read(soap *ctx)
         --length;
     }
     const bool cut = length > SIMPLE_BYTES_MAX;
-    const std::size_t kept = cut ? SIMPLE_BYTES_MAX : length;
+    const std::size_t kept = !cut                                  ? length
+                             : (ctx->mode & MODE_UTF_STRINGS) != 0 ? utf8_whole(text, SIMPLE_BYTES_MAX)
+                                                                   : SIMPLE_BYTES_MAX;
     std::memcpy(ctx->scratch_text, text, kept);
     return simple_value_done(ctx, kept, cut);
 }

@@ -10,6 +10,7 @@
 
 #include "codec/xml_scan.h"
 #include "codec/xml_token.h"
+#include "engine/text_encoding.h"
 
 // When the whole text up to "</" stands in the buffer as it is to be (no child, no reference, no CDATA
 // section, nothing to decode), consumes it and gives its place and length; else false, with nothing consumed.
@@ -21,36 +22,51 @@ bool xml_text_in_place(soap *ctx, const char **text, std::size_t *length);
 // strict mode.
 bool xml_leaf_in_place(soap *ctx, std::string_view *text);
 
-// Truth: bytes from 128 on have to be decoded before they become characters of a byte string.
-inline bool text_needs_decoding(const soap *ctx)
+// What the message and its strings are made of, as far as bytes from 128 on go.
+constexpr std::uint32_t BYTE_MODES = MODE_LATIN1 | MODE_WINDOWS_1252 | MODE_UTF_STRINGS;
+
+// The rest of stretch_end from a byte of 128 or above on. From Latin-1 to Latin-1 all stay as they stand,
+// from UTF-8 to UTF-8 what is well-formed; else none.
+template <template <bool> class Stop>
+[[gnu::noinline]] const char *high_stretch_end(const soap *ctx, const char *here, const char *end)
 {
-    return (ctx->mode & (MODE_LATIN1 | MODE_UTF_STRINGS)) == 0;
+    const std::uint32_t bytes = ctx->mode & BYTE_MODES;
+    if (bytes == MODE_UTF_STRINGS)
+        return utf8_stretch_end<Stop>(here, end);
+    return bytes == MODE_LATIN1 ? Stop<false>::find(here, end) : here;
 }
 
-// The first byte of [here, end) that isn't text as it stands.
-inline const char *text_end(const soap *ctx, const char *here, const char *end)
+// The first byte of [here, end) that isn't part of a string as it stands: one of the class Stop, or one from
+// 128 on that has to be decoded.
+template <template <bool> class Stop>
+[[gnu::always_inline]] inline const char *stretch_end(const soap *ctx, const char *here, const char *end)
 {
-    return text_needs_decoding(ctx) ? text_decode_stop::find(here, end) : text_stop::find(here, end);
+    const char *const stop = Stop<true>::find(here, end);
+    return stop != end && is_high(*stop) ? high_stretch_end<Stop>(ctx, stop, end) : stop;
 }
 
-// The next token of a byte string: a byte of UTF-8 if strings are kept so, else a decoded character.
+[[gnu::always_inline]] inline const char *text_end(const soap *ctx, const char *here, const char *end)
+{
+    return stretch_end<text_stop>(ctx, here, end);
+}
+
+// The next token of a string, decoded. A control character stands for no character.
 inline std::int32_t text_token(soap *ctx)
 {
-    return (ctx->mode & MODE_UTF_STRINGS) != 0 ? soap_char_next(ctx) : soap_char_next_utf8(ctx);
+    const std::int32_t token = soap_char_next_utf8(ctx);
+    return token >= 0 && token < ' ' && is_control(static_cast<char>(token))
+               ? xml_no_character(ctx, SOAP_SYNTAX_ERROR)
+               : token;
 }
 
 // Appends to the growing text. 0 or error 20.
 int text_put(soap *ctx, const char *text, std::size_t length);
 
-// Appends a decoded character. In a string of UTF-8 it takes up to six bytes. In any other string a character
-// has one byte: those above 255 become "?", and so does zero, in text of any kind.
+// Appends a decoded character: as UTF-8 in a string of UTF-8; else as one byte, those above 255 as "?".
 int text_put_code(soap *ctx, std::uint32_t code);
 
-// Appends the character of a token of text_token. Bytes of UTF-8 pass as they are.
+// Appends the character of a token of text_token.
 int text_put_token(soap *ctx, std::int32_t token);
-
-// Writes a code point as UTF-8, one to six bytes. The number of bytes.
-std::size_t utf8_encode(std::uint32_t code, char target[6]);
 
 // Bounds of a text in characters, and what has been counted of it in the growing text.
 struct text_limits {
@@ -93,7 +109,7 @@ private:
 };
 
 // Gives up a held tag: its text is rebuilt in scratch_text (a managed text has it first), empty if none is
-// held.
+// held, as a string of the mode.
 text_depth text_take_held_tag(soap *ctx, std::size_t *length);
 
 // Form 0 of soap_string_read, gathered in the growing text. 0 or an error.

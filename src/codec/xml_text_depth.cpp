@@ -3,6 +3,7 @@
 // Here: what the forms of text have in common. Elsewhere: the forms (xml_text.cpp, xml_text_raw.cpp,
 // xml_text_wide.cpp).
 #include <cstring>
+#include <string_view>
 
 #include <zuv_client_pro/soap_error.h>
 
@@ -11,26 +12,38 @@
 namespace {
 
 // Appends to scratch_text as long as two bytes stay free for the end of the tag.
-void append(soap *ctx, std::size_t *length, const char *text)
+void append(soap *ctx, std::size_t *length, std::string_view text)
 {
     const std::size_t room = SOAP_TEXT_SIZE - 3 - *length;
-    const std::size_t size = std::strlen(text);
-    const std::size_t taken = size < room ? size : room;
-    std::memcpy(ctx->scratch_text + *length, text, taken);
+    std::size_t taken = text.size();
+    if (taken > room)
+        taken = (ctx->mode & MODE_UTF_STRINGS) != 0 ? utf8_whole(text.data(), room) : room;
+    std::memcpy(ctx->scratch_text + *length, text.data(), taken);
     *length += taken;
+}
+
+// Names are UTF-8 in every mode.
+void append_name(soap *ctx, std::size_t *length, const char *name)
+{
+    char text[SOAP_TEXT_SIZE];
+    const std::size_t size = std::strlen(name);
+    if ((ctx->mode & MODE_UTF_STRINGS) != 0)
+        return append(ctx, length, {name, size});
+    std::memcpy(text, name, size);
+    append(ctx, length, {text, utf8_to_latin1(text, size)});
 }
 
 std::size_t rebuild_tag(soap *ctx)
 {
     std::size_t length = 0;
     append(ctx, &length, "<");
-    append(ctx, &length, ctx->tag);
+    append_name(ctx, &length, ctx->tag);
     const soap_attribute *first = ctx->attributes_set != 0 ? ctx->attribute_list : nullptr;
     for (const soap_attribute *p = first; p != nullptr; p = p->next) {
         if (p->visible == 0)
             continue;
         append(ctx, &length, " ");
-        append(ctx, &length, p->name);
+        append_name(ctx, &length, p->name);
         if (p->visible != 2 || p->value == nullptr)
             continue;
         append(ctx, &length, "=\"");

@@ -3,7 +3,8 @@
 // Here: the states that tell text from CDATA sections, comments and instructions. Elsewhere: decoded text
 // (xml_text.cpp).
 //
-// Always: references stay references; bytes from 128 on are decoded, but not inside CDATA.
+// Always: references stay references, but for those of no character; bytes from 128 on are decoded, but
+// inside CDATA only if they would not be of the string's encoding otherwise.
 #include <cstring>
 
 #include "codec/xml_scan.h"
@@ -61,10 +62,10 @@ int put_text(soap *ctx, const char *text)
     return text_put(ctx, text, std::strlen(text));
 }
 
-int put_byte(soap *ctx, std::int32_t byte)
+// A character, unless reading has come to its end.
+int put_token(soap *ctx, std::int32_t token)
 {
-    const char c = byte != 0 ? static_cast<char>(byte) : '?';
-    return text_put(ctx, &c, 1);
+    return token == XML_EOF ? ctx->error : text_put_code(ctx, token_code(token));
 }
 
 // A character from a reference or a decoded sequence: markup goes back to a reference.
@@ -84,13 +85,29 @@ int put_decoded(soap *ctx, std::uint32_t code)
     }
 }
 
-// A byte inside text, a tag or a construct.
+// A byte inside text, a tag or a construct. Only the last one read is given back, so that it is still there.
 int put_raw(soap *ctx, raw_state state, std::int32_t byte)
 {
-    if (byte < 0x80 || (ctx->mode & MODE_LATIN1) != 0 || in_cdata(state))
-        return put_byte(ctx, byte);
+    const std::uint32_t bytes = ctx->mode & BYTE_MODES;
+    const char c = static_cast<char>(byte);
+    if (is_control(c))
+        return put_token(ctx, xml_no_character(ctx, SOAP_SYNTAX_ERROR));
+    if (byte < 0x80 || bytes == MODE_LATIN1 || (bytes == 0 && in_cdata(state)))
+        return text_put(ctx, &c, 1);
     ctx->look_ahead = byte;
-    return text_put_code(ctx, token_code(soap_char_next_utf8(ctx)));
+    return put_token(ctx, soap_char_next_utf8(ctx));
+}
+
+// What stands behind an "&" is copied, unless it is a number that stands for no character.
+int copy_reference(soap *ctx)
+{
+    xml_reference reference;
+    const std::int32_t code = xml_reference_read(ctx, reference);
+    if (xml_is_refused(ctx))
+        return ctx->error;
+    if (code == '?')
+        return text_put(ctx, "?", 1);
+    return text_put(ctx, "&", 1) != 0 ? ctx->error : text_put(ctx, reference.text, reference.length);
 }
 
 std::int32_t skip_to_bracket(soap *ctx)
@@ -125,9 +142,9 @@ int open_declaration(soap *ctx, raw_state &state)
     return put_text(ctx, "<!--");
 }
 
-// The token of a byte or pushed-back token of the content state; a construct's head is copied and gives
-// XML_SKIPPED.
-std::int32_t content_token(soap *ctx, std::int32_t byte, bool in_quotes, raw_state &state)
+// The token of a byte or pushed-back token of the content state; a construct's head and a reference are
+// copied and give XML_SKIPPED.
+std::int32_t content_token(soap *ctx, std::int32_t byte, bool in_quotes, raw_state &state, int *error)
 {
     switch (byte) {
     case '>':
@@ -136,6 +153,9 @@ std::int32_t content_token(soap *ctx, std::int32_t byte, bool in_quotes, raw_sta
         return XML_QUOTE;
     case '\'':
         return XML_APOS;
+    case '&':
+        *error = copy_reference(ctx);
+        return XML_SKIPPED;
     case '<':
         break;
     default:
@@ -151,10 +171,12 @@ std::int32_t content_token(soap *ctx, std::int32_t byte, bool in_quotes, raw_sta
     case '/':
         return XML_END;
     case '!':
-        return open_declaration(ctx, state) == 0 ? XML_SKIPPED : XML_EOF;
+        *error = open_declaration(ctx, state);
+        return XML_SKIPPED;
     case '?':
         state = raw_state::instruction;
-        return put_text(ctx, "<?") == 0 ? XML_SKIPPED : XML_EOF;
+        *error = put_text(ctx, "<?");
+        return XML_SKIPPED;
     default:
         input_unread(ctx, next);
         return XML_START;
@@ -166,9 +188,7 @@ int gather_plain(soap *ctx)
     if (ctx->look_ahead != 0 || !input_ready(ctx))
         return 0;
     const char *here = input_here(ctx);
-    const char *end = input_end(ctx);
-    const bool decode = (ctx->mode & MODE_LATIN1) == 0;
-    const char *stop = decode ? markup_decode_stop::find(here, end) : markup_stop::find(here, end);
+    const char *stop = stretch_end<markup_stop>(ctx, here, input_end(ctx));
     input_consume(ctx, stop);
     return text_put(ctx, here, static_cast<std::size_t>(stop - here));
 }
@@ -191,7 +211,7 @@ int resume_cdata(soap *ctx, raw_state &state)
     if (ctx->look_ahead < 0 && ctx->look_ahead != XML_EOF) {
         const std::uint32_t code = token_code(ctx->look_ahead);
         ctx->look_ahead = 0;
-        if ((code < 0x80 ? put_byte(ctx, static_cast<std::int32_t>(code)) : text_put_code(ctx, code)) != 0)
+        if (text_put_code(ctx, code) != 0)
             return ctx->error;
     }
     if (ctx->in_cdata == CDATA_BRACKET_DUE) {
@@ -220,9 +240,10 @@ int gather_content(soap *ctx, text_depth &depth, raw_state &state, bool *end)
 {
     if (!depth.in_tag() && gather_plain(ctx) != 0)
         return ctx->error;
-    const std::int32_t token = content_token(ctx, soap_recv_byte(ctx), depth.in_quotes(), state);
+    int error = 0;
+    const std::int32_t token = content_token(ctx, soap_recv_byte(ctx), depth.in_quotes(), state, &error);
     if (token == XML_SKIPPED)
-        return 0;
+        return error;
     *end = depth.ends_at(token);
     if (*end) {
         ctx->look_ahead = token;

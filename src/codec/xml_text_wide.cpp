@@ -37,10 +37,13 @@ struct wide_sink {
         return put(character);
     }
 
+    // A string of the mode.
     int put_text(const char *text, std::size_t length)
     {
-        for (std::size_t i = 0; i < length; ++i) {
-            if (put_counted(static_cast<unsigned char>(text[i])) != 0)
+        const bool is_utf8 = (ctx->mode & MODE_UTF_STRINGS) != 0;
+        for (const char *p = text; p < text + length;) {
+            const std::uint32_t code = is_utf8 ? utf8_decode(p) : static_cast<unsigned char>(*p++);
+            if (put_counted(static_cast<char32_t>(code)) != 0)
                 return ctx->error;
         }
         return 0;
@@ -75,7 +78,7 @@ int put_token(wide_sink &sink, std::int32_t token, bool raw)
     const char *escaped = raw && !markup ? escape(code) : nullptr;
     if (escaped != nullptr)
         return sink.put_text(escaped, code == '"' ? 6 : code == '&' ? 5 : 4);
-    return sink.put_counted(code != 0 ? static_cast<char32_t>(code) : U'?');
+    return sink.put_counted(static_cast<char32_t>(code));
 }
 
 int gather_wide(soap *ctx, wide_sink &sink, bool raw)
@@ -85,10 +88,10 @@ int gather_wide(soap *ctx, wide_sink &sink, bool raw)
     if (sink.put_text(ctx->scratch_text, length) != 0)
         return ctx->error;
     for (;;) {
-        const std::int32_t token = soap_char_next_utf8(ctx);
+        const std::int32_t token = text_token(ctx);
         if (depth.ends_at(token)) {
             ctx->look_ahead = token;
-            return 0;
+            return xml_is_refused(ctx) ? ctx->error : 0;
         }
         if (put_token(sink, token, raw) != 0)
             return ctx->error;

@@ -7,12 +7,24 @@
 #include "codec/xml_token.h"
 
 #include <cstring>
+#include <string_view>
+
+#include <zuv_client_pro/soap_error.h>
 
 #include "codec/xml_scan.h"
+#include "engine/text_encoding.h"
+#include "engine/utf8.h"
 
 namespace {
 
-constexpr std::size_t INSTRUCTION_TEXT_MAX = 63; // bytes kept of "<?...": enough for the XML declaration
+constexpr std::size_t INSTRUCTION_TEXT_MAX = 255; // bytes kept of "<?...": enough for the XML declaration
+
+// The characters of windows-1252 from 0x80 on that aren't those of ISO-8859-1; 0 for bytes that are none.
+constexpr char16_t WINDOWS_1252[] = {0x20AC, 0,      0x201A, 0x0192, 0x201E, 0x2026, 0x2020, 0x2021,
+                                     0x02C6, 0x2030, 0x0160, 0x2039, 0x0152, 0,      0x017D, 0,
+                                     0,      0x2018, 0x2019, 0x201C, 0x201D, 0x2022, 0x2013, 0x2014,
+                                     0x02DC, 0x2122, 0x0161, 0x203A, 0x0153, 0,      0x017E, 0x0178};
+static_assert(sizeof WINDOWS_1252 / sizeof *WINDOWS_1252 == 32);
 
 // Drops bytes up to and including `mark`, which is the result; XML_EOF if it doesn't come.
 std::int32_t skip_past(soap *ctx, char mark)
@@ -124,26 +136,66 @@ std::int32_t content_next(soap *ctx)
     }
 }
 
-// Continuation bytes are taken as they come; one that the end of input swallowed counts as all ones.
-std::uint32_t continuation(soap *ctx)
+// The byte that comes next and stays unread, or XML_EOF.
+std::int32_t next_byte(soap *ctx)
 {
-    const std::int32_t byte = soap_recv_byte(ctx);
-    if (byte == XML_EOF)
-        ctx->look_ahead = XML_EOF;
-    return static_cast<std::uint32_t>(byte) & 0x3F;
+    return input_ready(ctx) ? static_cast<unsigned char>(*input_here(ctx)) : XML_EOF;
 }
 
-void apply_declared_encoding(soap *ctx, const char *text)
+// Takes the rest of a character of UTF-8, as many bytes as its lead byte calls for and belong to it.
+std::int32_t utf8_rest(soap *ctx, std::uint32_t lead)
 {
-    constexpr char key[] = " encoding=";
-    const char *encoding = std::strncmp(text, "xml ", 4) == 0 ? std::strstr(text, key) : nullptr;
-    if (encoding == nullptr || encoding[sizeof key - 1] == '\0')
-        return;
-    const char *value = encoding + sizeof key; // behind the quote
-    if (soap_tag_match(value, "iso-8859-1*") == 0 || soap_tag_match(value, "latin1*") == 0)
-        ctx->mode |= MODE_LATIN1;
-    else if (soap_tag_match(value, "utf-8*") == 0)
-        ctx->mode &= ~MODE_LATIN1;
+    static constexpr std::uint32_t least[] = {0, 0x80, 0x800, 0x10000, 0x200000, 0x4000000};
+    const unsigned more = lead < 0xC0   ? 0
+                          : lead < 0xE0 ? 1
+                          : lead < 0xF0 ? 2
+                          : lead < 0xF8 ? 3
+                          : lead < 0xFC ? 4
+                                        : 5;
+    std::uint32_t code = lead & (0x3FU >> more);
+    unsigned taken = 0;
+    std::int32_t next = next_byte(ctx);
+    for (; taken < more && next >= 0x80 && next < 0xC0; ++taken) {
+        code = code << 6 | (static_cast<std::uint32_t>(next) & 0x3F);
+        ctx->buffer_index++;
+        next = taken + 1 < more ? next_byte(ctx) : XML_EOF;
+    }
+    if (taken == 0 && next < 0x80 && (ctx->mode & MODE_UTF_STRINGS) == 0)
+        return static_cast<std::int32_t>(lead); // a sender of Latin-1 that doesn't say so
+    if (taken < more && ctx->look_ahead == XML_EOF && (ctx->mode & MODE_STRICT) != 0)
+        return XML_EOF; // cut by the end of input, which has an error of its own
+    if (taken != more || more == 0 || code < least[more] || !xml_carries(code))
+        return xml_no_character(ctx, SOAP_UTF_ERROR);
+    return static_cast<std::int32_t>(code);
+}
+
+std::int32_t windows_1252(soap *ctx, std::int32_t byte)
+{
+    if (byte >= 0xA0)
+        return byte;
+    const char16_t code = WINDOWS_1252[byte - 0x80];
+    return code != 0 ? static_cast<std::int32_t>(code) : xml_no_character(ctx, SOAP_UTF_ERROR);
+}
+
+const char *behind_blanks(const char *text)
+{
+    while (*text == ' ')
+        ++text;
+    return text;
+}
+
+// The name in an XML declaration, without its quotes; empty if there is none.
+std::string_view declared_encoding(const char *instruction)
+{
+    constexpr std::string_view key = " encoding";
+    const char *text =
+        std::strncmp(instruction, "xml ", 4) == 0 ? std::strstr(instruction, key.data()) : nullptr;
+    if (text == nullptr || *(text = behind_blanks(text + key.size())) != '=')
+        return {};
+    text = behind_blanks(text + 1);
+    const char *end = *text == '"' || *text == '\'' ? std::strchr(text + 1, *text) : nullptr;
+    return end != nullptr ? std::string_view(text + 1, static_cast<std::size_t>(end - text - 1))
+                          : std::string_view();
 }
 
 } // namespace
@@ -184,22 +236,11 @@ std::int32_t soap_char_next(soap *ctx)
 std::int32_t soap_char_next_utf8(soap *ctx)
 {
     const std::int32_t token = soap_char_next(ctx);
-    if (token < 0x80 || token > 0xFF || (ctx->mode & MODE_LATIN1) != 0)
+    if (token < 0x80 || token > 0xFF)
         return token;
-    const std::int32_t second = soap_recv_byte(ctx);
-    if (second < 0x80 && second != XML_EOF) {
-        input_unread(ctx, second);
-        return token;
-    }
-    if (second == XML_EOF)
-        ctx->look_ahead = XML_EOF;
-    const auto lead = static_cast<std::uint32_t>(token);
-    const int more = lead < 0xE0 ? 1 : lead < 0xF0 ? 2 : lead < 0xF8 ? 3 : lead < 0xFC ? 4 : 5;
-    std::uint32_t code = lead & (more == 5 ? 0x01u : 0x3Fu >> more);
-    code = (code << 6) | (static_cast<std::uint32_t>(second) & 0x3F);
-    for (int i = 1; i < more; ++i)
-        code = (code << 6) | continuation(ctx);
-    return static_cast<std::int32_t>(code);
+    if ((ctx->mode & MODE_LATIN1) == 0)
+        return utf8_rest(ctx, static_cast<std::uint32_t>(token));
+    return (ctx->mode & MODE_WINDOWS_1252) != 0 ? windows_1252(ctx, token) : token;
 }
 
 std::int32_t soap_pi_read(soap *ctx)
@@ -212,7 +253,9 @@ std::int32_t soap_pi_read(soap *ctx)
             text[kept++] = static_cast<char>(byte < ' ' ? ' ' : byte);
     }
     text[kept] = '\0';
-    apply_declared_encoding(ctx, text);
+    const std::string_view encoding = declared_encoding(text);
+    if (!encoding.empty() && !text_encoding_set(ctx->mode, encoding))
+        return xml_refuse(ctx, text_encoding_refuse(ctx, encoding));
     if (byte != XML_EOF)
         byte = soap_recv_byte(ctx);
     if (byte == XML_EOF)
@@ -244,11 +287,23 @@ int xml_skip_tag(soap *ctx)
     return XML_EOF;
 }
 
+// An element begins, with content, within `depth` others that are skipped: true if it is one too many.
+static bool skips_too_deep(soap *ctx, std::uint64_t depth)
+{
+    if (ctx->max_depth == 0 || ctx->nesting_level + depth < ctx->max_depth)
+        return false;
+    ctx->error = SOAP_LENGTH;
+    return true;
+}
+
 int xml_skip_content(soap *ctx, std::uint64_t depth)
 {
+    bool too_deep = depth != 0 && skips_too_deep(ctx, depth - 1);
     for (;;) {
         std::int32_t token;
-        if (ctx->look_ahead != 0 || ctx->in_cdata != CDATA_OUTSIDE)
+        if (too_deep)
+            token = XML_EOF;
+        else if (ctx->look_ahead != 0 || ctx->in_cdata != CDATA_OUTSIDE)
             token = soap_char_next(ctx);
         else if (skip_past(ctx, '<') != XML_EOF)
             token = xml_markup_next(ctx);
@@ -258,8 +313,7 @@ int xml_skip_content(soap *ctx, std::uint64_t depth)
             return 0;
         if (token == XML_START) {
             token = xml_skip_tag(ctx);
-            if (token == 0)
-                ++depth;
+            too_deep = token == 0 && skips_too_deep(ctx, depth++);
         }
         if (token == XML_EOF) {
             ctx->look_ahead = XML_EOF;

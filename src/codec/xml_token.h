@@ -6,6 +6,8 @@
 
 #include <cstdint>
 
+#include <zuv_client_pro/soap_error.h>
+
 #include "codec/xml_input.h"
 
 // Result of xml_markup_next for a construct that no caller sees: reading goes on behind it. No character has
@@ -18,6 +20,34 @@ constexpr std::int16_t CDATA_OUTSIDE = 0;
 constexpr std::int16_t CDATA_INSIDE = 1;
 constexpr std::int16_t CDATA_BRACKET_DUE = 2;
 
+// Ends the input for what stands in it: every later read gives XML_EOF, and the error tells why.
+inline std::int32_t xml_refuse(soap *ctx, int error)
+{
+    ctx->error = error;
+    return ctx->look_ahead = XML_EOF;
+}
+
+// Truth: the input has ended so.
+inline bool xml_is_refused(const soap *ctx)
+{
+    return ctx->look_ahead == XML_EOF && (ctx->error == SOAP_SYNTAX_ERROR || ctx->error == SOAP_UTF_ERROR);
+}
+
+// What becomes of a character that no string may hold: "?", or in strict mode the end with an error.
+inline std::int32_t xml_no_character(soap *ctx, int error)
+{
+    return (ctx->mode & MODE_STRICT) != 0 ? xml_refuse(ctx, error) : '?';
+}
+
+// A reference as it stands, from behind its "&" up to the ";" if there is one.
+struct xml_reference {
+    char text[64];
+    std::size_t length = 0;
+};
+
+// Reads a reference whose "&" has been read. Results as soap_entity_read.
+std::int32_t xml_reference_read(soap *ctx, xml_reference &reference);
+
 // Goes on behind a "<": XML_START (the byte after it is unread), XML_END, XML_EOF, or XML_SKIPPED after a
 // comment, declaration or instruction, or at the start of a CDATA section.
 std::int32_t xml_markup_next(soap *ctx);
@@ -26,7 +56,7 @@ std::int32_t xml_markup_next(soap *ctx);
 int xml_skip_tag(soap *ctx);
 
 // Drops content up to and including the "</" that closes `depth` elements and the one around them; bounded in
-// memory whatever the nesting. 0 or XML_EOF.
+// memory whatever the nesting. 0, or XML_EOF with SOAP_LENGTH in ctx->error past max_depth open elements.
 int xml_skip_content(soap *ctx, std::uint64_t depth);
 
 // Truth: the token is a character that came from a reference.

@@ -15,9 +15,11 @@
 #include <zuv_client_pro/soap_io.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "codec/attributes.h"
 #include "codec/namespace.h"
 #include "codec/xml_write.h"
 #include "codec/xml_write_fast.h"
+#include "engine/limits.h"
 
 namespace {
 
@@ -179,18 +181,15 @@ int put_waiting_attributes(soap *ctx)
 {
     for (soap_attribute *record = ctx->attribute_list; record && ctx->attributes_set > 0;
          record = record->next) {
-        if (record->visible == 0)
-            continue;
-        std::string_view name(record->name);
+        std::string_view name = xml_attribute_name(record);
         if (drops_prefix(ctx, name) && is_default_prefix(ctx, xml_prefix_of(name)))
             name = xml_local_part(name);
         const char *value = record->visible == 2 ? record->value : nullptr;
         if (xml_put_attribute(ctx, name, value, record->escape))
             return ctx->error;
-        record->visible = 0;
         --ctx->attributes_set;
     }
-    ctx->attributes_set = 0;
+    xml_attributes_hide(ctx);
     return 0;
 }
 
@@ -240,6 +239,8 @@ int soap_element_open(soap *ctx, const char *tag, int id, const char *type)
     if (xml_enter(ctx))
         return ctx->error;
     const bool is_first = ctx->namespace_state == 0;
+    if (is_first)
+        output_xml_begin(ctx);
     if (is_first && !has_mode(ctx, MODE_CANONICAL) && put_prolog(ctx))
         return ctx->error;
     if (!is_first && has_mode(ctx, MODE_INDENT)) {

@@ -1,21 +1,27 @@
-// xml_write_text.cpp - text out: escapes, Latin-1 and wide characters as UTF-8.
+// xml_write_text.cpp - text out: escapes, Latin-1 and wide characters as UTF-8, refusal of what XML can't
+// carry.
 //
-// Here: which bytes need an escape, and finding them sixteen at a time. Elsewhere: who writes text
-// (xml_write.cpp).
+// Here: which bytes need a closer look, and finding them sixteen at a time. Elsewhere: who writes text
+// (xml_write.cpp), well-formed UTF-8 (engine/utf8.h).
 //
 // Always: stretches that need no escape go out in one piece; in a counting pass they are only measured.
 #include <algorithm>
 #include <array>
 #include <cstdint>
+#include <cstdio>
 #include <cstring>
 #include <string_view>
+#include <utility>
 #ifdef __SSE2__
 #include <emmintrin.h>
 #endif
 
+#include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "codec/xml_scan.h"
 #include "codec/xml_write.h"
 
 namespace {
@@ -23,20 +29,18 @@ namespace {
 // Where a text stands decides what its characters become.
 enum class place : std::uint8_t { element = 1, canonical_element = 2, attribute = 4 };
 
-// How bytes of 128 and above are meant.
-enum class charset : std::uint8_t { utf8, latin1 };
-
 constexpr std::uint8_t HIGH_BYTE = 8;
+constexpr std::ptrdiff_t STRETCH = 16384; // bytes looked at before they are sent: still in the cache then
 
-constexpr std::array<std::uint8_t, 256> escape_table()
+// What a byte needs, by place. Control characters need to be refused, and white space is looked at with them.
+constexpr std::array<std::uint8_t, 256> special_table()
 {
     constexpr auto element = static_cast<std::uint8_t>(place::element);
     constexpr auto canonical = static_cast<std::uint8_t>(place::canonical_element);
     constexpr auto attribute = static_cast<std::uint8_t>(place::attribute);
     std::array<std::uint8_t, 256> table{};
-    table['\t'] = attribute;
-    table['\n'] = element | attribute;
-    table['\r'] = element | canonical | attribute;
+    for (std::size_t i = 0; i < ' '; ++i)
+        table[i] = element | canonical | attribute;
     table['"'] = attribute;
     table['&'] = element | canonical | attribute;
     table['<'] = element | canonical | attribute;
@@ -45,15 +49,16 @@ constexpr std::array<std::uint8_t, 256> escape_table()
         table[i] = HIGH_BYTE;
     return table;
 }
-constexpr std::array<std::uint8_t, 256> ESCAPES = escape_table();
+constexpr std::array<std::uint8_t, 256> SPECIAL = special_table();
 
-constexpr std::string_view escape_of(unsigned char c)
+// What a special byte below 128 becomes; empty for what XML can't carry.
+template <place P> constexpr std::string_view escape_of(unsigned char c)
 {
     switch (c) {
     case '\t':
-        return "&#x9;";
+        return P == place::attribute ? "&#x9;" : "\t";
     case '\n':
-        return "&#xA;";
+        return P == place::canonical_element ? "\n" : "&#xA;";
     case '\r':
         return "&#xD;";
     case '"':
@@ -62,37 +67,34 @@ constexpr std::string_view escape_of(unsigned char c)
         return "&amp;";
     case '<':
         return "&lt;";
-    default:
+    case '>':
         return "&gt;";
+    default:
+        return {};
     }
 }
 
-template <place P, charset C> bool needs_escape(char c)
+template <place P> bool is_special(char c)
 {
-    constexpr auto mask = static_cast<std::uint8_t>(P) | (C == charset::latin1 ? HIGH_BYTE : 0);
-    return (ESCAPES[static_cast<unsigned char>(c)] & mask) != 0;
+    return (SPECIAL[static_cast<unsigned char>(c)] & (static_cast<std::uint8_t>(P) | HIGH_BYTE)) != 0;
 }
 
 #ifdef __SSE2__
 
-// Bit i is set if byte i needs an escape. Pairs of characters that differ in one bit are found together.
-template <place P, charset C> unsigned escape_mask(__m128i bytes)
+// Bit i is set if byte i is special. Pairs of characters that differ in one bit are found together.
+template <place P> unsigned special_mask(__m128i bytes)
 {
     const auto is = [](__m128i text, char c) { return _mm_cmpeq_epi8(text, _mm_set1_epi8(c)); };
-    __m128i found = is(bytes, '\r');
+    __m128i found = _mm_cmpeq_epi8(_mm_min_epu8(bytes, _mm_set1_epi8(' ' - 1)), bytes);
     if constexpr (P == place::attribute) {
         const __m128i without_4 = _mm_and_si128(bytes, _mm_set1_epi8(static_cast<char>(~4)));
-        found = _mm_or_si128(is(without_4, '\t'), is(without_4, '"')); // CR and "&" too
-        found = _mm_or_si128(found, _mm_or_si128(is(bytes, '<'), is(bytes, '\n')));
+        found = _mm_or_si128(found, _mm_or_si128(is(without_4, '"'), is(bytes, '<'))); // "&" too
     } else {
         const __m128i with_2 = _mm_or_si128(bytes, _mm_set1_epi8(2));
         found = _mm_or_si128(found, _mm_or_si128(is(with_2, '>'), is(bytes, '&'))); // "<" too
-        if constexpr (P == place::element)
-            found = _mm_or_si128(found, is(bytes, '\n'));
     }
-    if constexpr (C == charset::latin1)
-        found = _mm_or_si128(found, bytes); // of which the top bits count
-    return static_cast<unsigned>(_mm_movemask_epi8(found));
+    // Of bytes from 128 on the top bits count.
+    return static_cast<unsigned>(_mm_movemask_epi8(_mm_or_si128(found, bytes)));
 }
 
 std::size_t first_bit(unsigned mask)
@@ -113,9 +115,10 @@ template <class Half> __m128i both_ends(const char *text, std::size_t length)
         return _mm_set_epi32(0, 0, last, first);
 }
 
-template <place P, charset C, class Half> std::size_t clean_short(const char *text, std::size_t length)
+template <place P, class Half>
+[[gnu::always_inline]] inline std::size_t clean_short(const char *text, std::size_t length)
 {
-    const unsigned mask = escape_mask<P, C>(both_ends<Half>(text, length));
+    const unsigned mask = special_mask<P>(both_ends<Half>(text, length));
     if (mask == 0)
         return length;
     const std::size_t bit = first_bit(mask);
@@ -124,8 +127,9 @@ template <place P, charset C, class Half> std::size_t clean_short(const char *te
 
 #endif
 
-// Bytes up to the first that needs an escape.
-template <place P, charset C> std::size_t clean_length(const char *text, std::size_t length)
+// Bytes up to the first special one.
+template <place P>
+[[gnu::always_inline]] inline std::size_t clean_length(const char *text, std::size_t length)
 {
     std::size_t done = 0;
 #ifdef __SSE2__
@@ -133,78 +137,103 @@ template <place P, charset C> std::size_t clean_length(const char *text, std::si
         return _mm_loadu_si128(reinterpret_cast<const __m128i *>(text + at));
     };
     for (; done + 16 <= length; done += 16) {
-        if (const unsigned mask = escape_mask<P, C>(load(done)))
+        if (const unsigned mask = special_mask<P>(load(done)))
             return done + first_bit(mask);
     }
     if (done == length)
         return length;
     if (length > 16) {
-        const unsigned mask = escape_mask<P, C>(load(length - 16));
+        const unsigned mask = special_mask<P>(load(length - 16));
         return mask ? length - 16 + first_bit(mask) : length;
     }
     if (length >= 8)
-        return clean_short<P, C, long long>(text, length);
+        return clean_short<P, long long>(text, length);
     if (length >= 4)
-        return clean_short<P, C, int>(text, length);
+        return clean_short<P, int>(text, length);
 #endif
-    while (done < length && !needs_escape<P, C>(text[done]))
+    while (done < length && !is_special<P>(text[done]))
         ++done;
     return done;
 }
 
-int put_latin1(soap *ctx, unsigned char c)
+// A text that is refused before it is sent: its host is told what stands in it.
+[[gnu::cold]] int refuse(soap *ctx, const char *format, unsigned value)
 {
-    const char bytes[2] = {static_cast<char>(0xC0 | c >> 6), static_cast<char>(0x80 | (c & 0x3F))};
-    return soap_send_bytes(ctx, bytes, 2);
+    char text[96];
+    std::snprintf(text, sizeof text, format, value);
+    if (ctx->fault == nullptr) { // which may be what is being written
+        if (const char *const copy = soap_string_dup(ctx, text))
+            soap_fault_sender(ctx, copy, nullptr, SOAP_UTF_ERROR);
+    }
+    return ctx->error = SOAP_UTF_ERROR;
 }
 
-template <place P, charset C> int write_text(soap *ctx, const char *text, std::size_t length)
+int refuse_character(soap *ctx, std::uint32_t code)
 {
-    constexpr std::size_t STRETCH = 16384; // bytes looked at before they are sent: still in the cache then
+    return refuse(ctx, "A text to be sent holds U+%04X, which XML cannot carry", code);
+}
+
+int refuse_bytes(soap *ctx, char byte)
+{
+    return refuse(ctx, "A text to be sent should be UTF-8 and is not, from a byte 0x%02X on",
+                  static_cast<unsigned char>(byte));
+}
+
+// What may stand between bytes from 128 on, by place.
+template <bool High> using element_stop = byte_class<false, High, '<', '>', '&', '\n', '\r'>;
+template <bool High> using attribute_stop = byte_class<false, High, '<', '"', '&', '\t', '\n', '\r'>;
+
+// From a byte of 128 or above on, sends what is of UTF-8 and needs no escape. `text` goes on to behind it.
+template <place P> int put_utf8(soap *ctx, const char *&text, const char *end)
+{
+    const char *stop = end - text > STRETCH ? text + STRETCH : end;
+    if constexpr (P == place::attribute)
+        stop = utf8_stretch_end<attribute_stop>(text, stop);
+    else
+        stop = utf8_stretch_end<element_stop>(text, stop);
+    if (stop == text)
+        return refuse_bytes(ctx, *text);
+    const char *const start = std::exchange(text, stop);
+    return soap_send_bytes(ctx, start, static_cast<std::size_t>(stop - start));
+}
+
+int put_latin1(soap *ctx, const char *&text)
+{
+    char bytes[6];
+    return soap_send_bytes(ctx, bytes, utf8_encode(static_cast<unsigned char>(*text++), bytes));
+}
+
+template <place P> int put_escape(soap *ctx, const char *&text)
+{
+    const std::string_view escape = escape_of<P>(static_cast<unsigned char>(*text));
+    if (escape.empty())
+        return refuse_character(ctx, static_cast<unsigned char>(*text));
+    ++text;
+    return xml_put(ctx, escape);
+}
+
+template <place P> [[gnu::noinline]] int put_high(soap *ctx, int flag, const char *&text, const char *end)
+{
+    const bool is_utf8 = flag == 2 || (ctx->mode & MODE_UTF_STRINGS);
+    return is_utf8 ? put_utf8<P>(ctx, text, end) : put_latin1(ctx, text);
+}
+
+template <place P>
+[[gnu::always_inline]] inline int write_text(soap *ctx, const char *text, std::size_t length, int flag)
+{
     const char *const end = text + length;
     while (text != end) {
         const std::size_t clean =
-            clean_length<P, C>(text, std::min(static_cast<std::size_t>(end - text), STRETCH));
+            clean_length<P>(text, static_cast<std::size_t>(std::min(end - text, STRETCH)));
         if (clean > 0 && soap_send_bytes(ctx, text, clean))
             return ctx->error;
         text += clean;
-        for (; text != end && needs_escape<P, C>(*text); ++text) {
-            const auto c = static_cast<unsigned char>(*text);
-            if (C == charset::latin1 && c >= 128 ? put_latin1(ctx, c) : xml_put(ctx, escape_of(c)))
+        while (text != end && is_special<P>(*text)) {
+            if (is_high(*text) ? put_high<P>(ctx, flag, text, end) : put_escape<P>(ctx, text))
                 return ctx->error;
         }
     }
     return 0;
-}
-
-template <charset C> int write_text(soap *ctx, const char *text, std::size_t length, int flag)
-{
-    if (flag != 0)
-        return write_text<place::attribute, C>(ctx, text, length);
-    if (ctx->mode & MODE_CANONICAL)
-        return write_text<place::canonical_element, C>(ctx, text, length);
-    return write_text<place::element, C>(ctx, text, length);
-}
-
-// Bytes of a code point's UTF-8 form, at most 6.
-std::size_t encode(std::uint32_t code, char *bytes)
-{
-    if (code < 0x80) {
-        bytes[0] = static_cast<char>(code);
-        return 1;
-    }
-    static constexpr std::uint32_t beyond[] = {0x800, 0x10000, 0x200000, 0x4000000};
-    static constexpr std::uint32_t lead[] = {0xC0, 0xE0, 0xF0, 0xF8, 0xFC};
-    std::size_t form = 0;
-    while (form < 4 && code >= beyond[form])
-        ++form;
-    const std::size_t length = form + 2;
-    for (std::size_t i = length - 1; i > 0; --i) {
-        bytes[i] = static_cast<char>(0x80 | (code & 0x3F));
-        code >>= 6;
-    }
-    bytes[0] = static_cast<char>(lead[form] | (form == 4 ? code & 1 : code)); // the sixth form holds 31 bits
-    return length;
 }
 
 // Gathers the bytes of single characters.
@@ -222,7 +251,7 @@ public:
     int put(std::uint32_t code)
     {
         char bytes[6];
-        return put(std::string_view(bytes, encode(code, bytes)));
+        return put(std::string_view(bytes, utf8_encode(code, bytes)));
     }
     int flush()
     {
@@ -237,13 +266,29 @@ private:
     char buffer[256];
 };
 
+template <place P> int write_wide(soap *ctx, const char32_t *text)
+{
+    gathered_output output(ctx);
+    for (; *text; ++text) {
+        const auto code = static_cast<std::uint32_t>(*text);
+        if (!xml_carries(code))
+            return refuse_character(ctx, code);
+        const bool is_escaped = code < 128 && is_special<P>(static_cast<char>(code));
+        if (is_escaped ? output.put(escape_of<P>(static_cast<unsigned char>(code))) : output.put(code))
+            return ctx->error;
+    }
+    return output.flush();
+}
+
 } // namespace
 
 int soap_text_write_n(soap *ctx, const char *text, std::size_t length, int flag)
 {
-    if (flag == 2 || (ctx->mode & MODE_UTF_STRINGS))
-        return write_text<charset::utf8>(ctx, text, length, flag);
-    return write_text<charset::latin1>(ctx, text, length, flag);
+    if (flag != 0)
+        return write_text<place::attribute>(ctx, text, length, flag);
+    if (ctx->mode & MODE_CANONICAL)
+        return write_text<place::canonical_element>(ctx, text, length, flag);
+    return write_text<place::element>(ctx, text, length, 0);
 }
 
 int soap_text_write(soap *ctx, const char *text, int flag)
@@ -253,30 +298,40 @@ int soap_text_write(soap *ctx, const char *text, int flag)
 
 int soap_wide_text_write(soap *ctx, const char32_t *text, int flag)
 {
-    const place where = flag != 0                    ? place::attribute
-                        : ctx->mode & MODE_CANONICAL ? place::canonical_element
-                                                     : place::element;
-    gathered_output output(ctx);
-    for (; *text; ++text) {
-        const auto code = static_cast<std::uint32_t>(*text);
-        const bool is_escaped = code < 128 && (ESCAPES[code] & static_cast<std::uint8_t>(where));
-        if (is_escaped ? output.put(escape_of(static_cast<unsigned char>(code))) : output.put(code))
-            return ctx->error;
-    }
-    return output.flush();
+    if (flag != 0)
+        return write_wide<place::attribute>(ctx, text);
+    if (ctx->mode & MODE_CANONICAL)
+        return write_wide<place::canonical_element>(ctx, text);
+    return write_wide<place::element>(ctx, text);
 }
 
 int soap_char_write(soap *ctx, std::uint32_t code)
 {
     char bytes[6];
-    return soap_send_bytes(ctx, bytes, encode(code, bytes));
+    return soap_send_bytes(ctx, bytes, utf8_encode(code, bytes));
+}
+
+int xml_put_literal(soap *ctx, std::string_view text)
+{
+    const char *const end = text.data() + text.size();
+    for (const char *p = text.data(); p != end;) {
+        const char *stop = literal_stop<true>::find(p, end);
+        p = stop != end && is_high(*stop) ? utf8_stretch_end<literal_stop>(stop, end) : stop;
+        if (stop != end && p == stop)
+            return is_high(*p) ? refuse_bytes(ctx, *p)
+                               : refuse_character(ctx, static_cast<unsigned char>(*p));
+    }
+    return xml_put(ctx, text);
 }
 
 int xml_put_wide(soap *ctx, const char32_t *text)
 {
     gathered_output output(ctx);
     for (; *text; ++text) {
-        if (output.put(static_cast<std::uint32_t>(*text)))
+        const auto code = static_cast<std::uint32_t>(*text);
+        if (!xml_carries(code))
+            return refuse_character(ctx, code);
+        if (output.put(code))
             return ctx->error;
     }
     return output.flush();

@@ -173,7 +173,7 @@ int soap_literal_write(soap *ctx, const char *tag, char *const *text, const char
 {
     if (!text || !*text)
         return 0;
-    if (open_literal(ctx, tag) || xml_put(ctx, std::string_view(*text)))
+    if (open_literal(ctx, tag) || xml_put_literal(ctx, *text))
         return ctx->error;
     return close_literal(ctx, tag);
 }

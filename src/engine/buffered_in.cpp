@@ -23,17 +23,20 @@
 #include "engine/buffered_in.h"
 #include "engine/dime_chunks.h"
 #include "engine/inflate_in.h"
+#include "engine/limits.h"
 #include "engine/raw_in.h"
 #include "engine/scratch.h"
+#include "engine/text_encoding.h"
 #include "engine/zlib_common.h"
 
 namespace {
 
 constexpr std::int32_t END = -1;
 constexpr std::int32_t GZIP_FIRST_BYTE = 0x1F;
-constexpr std::size_t GZIP_HEAD_REST = 9;  // bytes behind the first
-constexpr std::size_t BLOCK_STEP = 65536;  // bytes by which a block of announced size grows
-constexpr unsigned DIME_MESSAGE_BEGIN = 4; // flag of a message's first record
+constexpr std::size_t GZIP_HEAD_REST = 9;                    // bytes behind the first
+constexpr std::size_t BLOCK_STEP = 65536;                    // bytes by which a block of announced size grows
+constexpr std::size_t BLANKS_MAX = std::size_t{1024} * 1024; // ahead of a head or a bare message
+constexpr unsigned DIME_MESSAGE_BEGIN = 4;                   // flag of a message's first record
 constexpr std::int32_t HIGH_OF_TRUNCATED_MARK = 0xFEC0;
 
 // The next byte without using it, or -1.
@@ -73,6 +76,7 @@ int prepare_start(soap *ctx)
     ctx->error = SOAP_OK;
     ctx->filter_stop = 0;
     soap_call_scratch_free(ctx);
+    limits_reset(ctx);
     if (soap_namespace_table_copy(ctx) != SOAP_OK)
         return ctx->error;
     ctx->soap_version = 0;
@@ -92,6 +96,7 @@ int prepare_start(soap *ctx)
     ctx->status = 0;
     ctx->message_count = 0;
     soap_raw_reset(ctx);
+    ctx->plain_received = ctx->buffer_length - ctx->buffer_index;
     soap_element_state_reset(ctx);
     forget_attachments(ctx);
     ctx->zlib_in = ctx->zlib_out = 0;
@@ -120,11 +125,16 @@ bool begins_dime(soap *ctx, std::int32_t first)
     return first >= 12 && first <= 15 && (peek_byte(ctx) & 0xF0) == 0x20;
 }
 
-// The byte c, or if it is blank the first behind it that isn't.
+// The byte c, or if it is blank the first behind it that isn't. Blanks without end are refused like a head
+// without end.
 std::int32_t skip_blanks(soap *ctx, std::int32_t c)
 {
-    while (c >= 0 && c <= ' ')
-        c = soap_recv_byte(ctx);
+    for (std::size_t left = BLANKS_MAX; c >= 0 && c <= ' '; c = soap_recv_byte(ctx)) {
+        if (left-- == 0) {
+            ctx->error = SOAP_HEADER_LINE;
+            return END;
+        }
+    }
     return c;
 }
 
@@ -140,7 +150,7 @@ std::int32_t skip_utf8_mark(soap *ctx)
         return END;
     if (third != 0xBF)
         return third | HIGH_OF_TRUNCATED_MARK;
-    ctx->mode &= ~MODE_LATIN1;
+    ctx->mode &= ~ENCODING_MODES;
     return skip_blanks(ctx, soap_recv_byte(ctx));
 }
 
@@ -176,18 +186,20 @@ int read_head(soap *ctx)
     return ctx->on_read_head != nullptr ? ctx->on_read_head(ctx) : SOAP_OK;
 }
 
+// There is a first byte.
 int begin_announced_compression(soap *ctx)
 {
-    if (ctx->zlib_in == ENCODING_GZIP) {
-        if (peek_byte(ctx) == GZIP_FIRST_BYTE) {
-            soap_recv_byte(ctx);
-            if (soap_gzip_skip_header(ctx) != SOAP_OK)
-                return ctx->error;
-            return soap_inflate_begin(ctx, ZLIB_RAW);
-        }
-        ctx->zlib_in = ENCODING_DEFLATE; // some peers name one and send the other
+    if (ctx->zlib_in == 0)
+        return SOAP_OK;
+    const std::int32_t first = soap_recv_byte(ctx);
+    if (ctx->zlib_in == ENCODING_GZIP && first == GZIP_FIRST_BYTE) {
+        if (soap_gzip_skip_header(ctx) != SOAP_OK)
+            return ctx->error;
+        return soap_inflate_begin(ctx, ZLIB_RAW);
     }
-    return ctx->zlib_in != 0 ? soap_inflate_begin(ctx, ZLIB_WRAPPED) : SOAP_OK;
+    ctx->zlib_in = ENCODING_DEFLATE; // some peers name one and send the other
+    peek_byte(ctx);                  // the second byte is looked at too
+    return soap_inflate_begin_deflate(ctx, static_cast<std::uint8_t>(first));
 }
 
 int no_body(soap *ctx)
@@ -275,6 +287,7 @@ int begin_mime(soap *ctx)
         ctx->mode |= MODE_DIME;
     if (type != nullptr && soap_attr_value(ctx, type, "application/xop+xml") != nullptr)
         ctx->mode |= MODE_MTOM;
+    text_encoding_by_type(ctx, type, ctx->mode);
     return SOAP_OK;
 }
 
@@ -303,16 +316,23 @@ int finish_framing(soap *ctx)
         if (result > 1)
             return ctx->error = result;
     }
-    if (soap_raw_consumed(ctx)) {
+    if (ctx->exceeded == nullptr && soap_raw_consumed(ctx)) {
         ctx->buffer_index = ctx->buffer_length = 0;
         ctx->response_unfinished = false;
     }
     return SOAP_OK;
 }
 
+// The last chance to find the message too large: what the references led to counts too.
+int resolve(soap *ctx)
+{
+    const int result = soap_forward_resolve(ctx);
+    return result != SOAP_OK ? result : input_limits_check(ctx);
+}
+
 int finish_references(soap *ctx)
 {
-    if (soap_forward_resolve(ctx) != SOAP_OK)
+    if (resolve(ctx) != SOAP_OK)
         return ctx->error;
     if (ctx->mtom_list != nullptr)
         return ctx->error = (ctx->mode & MODE_MTOM) != 0 ? SOAP_MIME_HREF : SOAP_DIME_HREF;
@@ -341,6 +361,8 @@ int soap_receive_begin(soap *ctx)
         return ctx->error;
     if (informative != SOAP_OK)
         return end_informatively(ctx, informative);
+    if (input_limits_check(ctx) != SOAP_OK) // of the bytes that came with the head
+        return ctx->error;
     if ((ctx->mode & MODE_MIME) != 0 && begin_mime(ctx) != SOAP_OK)
         return ctx->error;
     if ((ctx->mode & MODE_DIME) != 0 && begin_dime(ctx) != SOAP_OK)
@@ -374,19 +396,29 @@ std::int32_t soap_recv_byte_slow(soap *ctx)
 
 int soap_recv_deliver(soap *ctx)
 {
-    ctx->message_count += ctx->buffer_length - ctx->buffer_index;
+    const std::size_t fresh = ctx->buffer_length - ctx->buffer_index;
+    ctx->message_count += fresh;
     const bool plain = (ctx->mode & MODE_DEFLATE) != 0 || ctx->zlib_in == 0;
+    if (plain)
+        ctx->plain_received += fresh;
     if ((ctx->mode & MODE_DEFLATE) != 0)
         soap_log_write(ctx, SOAP_LOG_RECEIVED, ctx->buffer, ctx->buffer_length);
+    if (!ctx->prepare_held && input_limits_check(ctx) != SOAP_OK) {
+        ctx->buffer_index = ctx->buffer_length = 0;
+        return ctx->error;
+    }
     if (ctx->on_recv_prepare == nullptr || ctx->prepare_held || !plain)
         return SOAP_OK;
-    const int result =
-        ctx->on_recv_prepare(ctx, ctx->buffer + ctx->buffer_index, ctx->buffer_length - ctx->buffer_index);
+    const int result = ctx->on_recv_prepare(ctx, ctx->buffer + ctx->buffer_index, fresh);
     return result == SOAP_OK ? SOAP_OK : ctx->error = result;
 }
 
 int soap_recv_refill(soap *ctx)
 {
+    if (ctx->exceeded != nullptr) {
+        ctx->buffer_index = ctx->buffer_length = 0;
+        return ctx->error = SOAP_LENGTH;
+    }
     if ((ctx->mode & MODE_DEFLATE) != 0)
         return soap_inflate_refill(ctx);
     const int result = soap_raw_fill(ctx);
@@ -545,7 +577,7 @@ int soap_receive_finish(soap *ctx)
     if ((ctx->mode & MODE_MIME) != 0 && (ctx->mode & MODE_MIME_AFTER) != 0) {
         if (ctx->keep_alive == 0)
             ctx->keep_alive = -1; // the parts to come need the connection
-        return soap_forward_resolve(ctx);
+        return resolve(ctx);
     }
     if ((ctx->mode & MODE_MIME) != 0 && soap_mime_parts_read_all(ctx) != SOAP_OK)
         return ctx->error;

@@ -21,6 +21,7 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "engine/deflate_out.h"
+#include "engine/limits.h"
 #include "engine/raw_in.h"
 #include "engine/scratch.h"
 #include "engine/zlib_common.h"
@@ -139,6 +140,8 @@ int store(soap *ctx, const char *data, std::size_t length)
     if (place == nullptr)
         return ctx->error = SOAP_OUT_OF_MEMORY;
     std::memcpy(place, data, length);
+    if (ctx->max_memory != 0 && ctx->block_stack->total_size > ctx->max_memory)
+        return limit_exceeded(ctx, "max_memory", ctx->max_memory);
     return SOAP_OK;
 }
 
@@ -247,6 +250,13 @@ int send_rest(soap *ctx)
     return SOAP_OK;
 }
 
+void forget_output(soap *ctx)
+{
+    ctx->plain_sent = 0;
+    ctx->xml_end_max = 0;
+    ctx->exceeded = nullptr;
+}
+
 int give_up_sending(soap *ctx)
 {
     const int error = ctx->error;
@@ -269,6 +279,7 @@ int soap_count_begin(soap *ctx)
     if (make_boundary(ctx) != SOAP_OK)
         return ctx->error;
     ctx->message_count = 0;
+    forget_output(ctx);
     soap_element_state_reset(ctx);
     soap_attr_table_reset(ctx);
     if (soap_namespace_table_copy(ctx) != SOAP_OK)
@@ -282,6 +293,8 @@ int soap_count_begin(soap *ctx)
 
 int soap_count_end(soap *ctx)
 {
+    if (output_xml_end(ctx) != SOAP_OK)
+        return ctx->error;
     // A stored message shows itself to the hooks when it leaves the buffer.
     if ((ctx->mode & MODE_COUNTING) != 0 && io_bits(ctx->mode) != MODE_STORE &&
         ctx->on_send_prepare_end != nullptr)
@@ -313,6 +326,7 @@ int soap_send_begin(soap *ctx)
     if (io_bits(ctx->mode) != MODE_DIRECT)
         ctx->buffer_index = ctx->buffer_length = 0;
     soap_raw_reset(ctx);
+    forget_output(ctx);
     soap_element_state_reset(ctx);
     if (ctx->status >= STATUS_POST)
         ctx->response_unfinished = true; // the connection owes a response from here on
@@ -347,7 +361,7 @@ int soap_send_bytes_slow(soap *ctx, const char *data, std::size_t length)
         return SOAP_OK;
     }
     if (io_bits(ctx->mode) == MODE_DIRECT)
-        return soap_send_through(ctx, data, length);
+        return output_limit_check(ctx, length) == SOAP_OK ? soap_send_through(ctx, data, length) : ctx->error;
     if ((ctx->mode & MODE_UDP) != 0)
         return buffer_datagram(ctx, data, length);
     return buffer_bytes(ctx, data, length);
@@ -365,6 +379,8 @@ int soap_send_flush(soap *ctx)
     const std::size_t length = ctx->buffer_index;
     if (length == 0)
         return SOAP_OK;
+    if (output_limit_check(ctx, length) != SOAP_OK)
+        return ctx->error;
     if (io_bits(ctx->mode) == MODE_STORE && ctx->on_send_prepare != nullptr) {
         ctx->error = ctx->on_send_prepare(ctx, ctx->buffer, length);
         if (ctx->error != SOAP_OK)
@@ -389,7 +405,7 @@ int soap_send_through(soap *ctx, const char *data, std::size_t length)
 
 int soap_send_finish(soap *ctx)
 {
-    if (send_attachments(ctx) != SOAP_OK)
+    if (output_xml_end(ctx) != SOAP_OK || send_attachments(ctx) != SOAP_OK)
         return give_up_sending(ctx);
     if (io_bits(ctx->mode) != MODE_DIRECT && send_rest(ctx) != SOAP_OK)
         return give_up_sending(ctx);

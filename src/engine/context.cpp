@@ -3,10 +3,12 @@
 // Elsewhere: copies (context_copy.cpp), the list of callbacks (callbacks.cpp), the release of each kind of
 // memory (managed_blocks.cpp, instances.cpp, tracking.cpp). Always: every release operation does nothing on a
 // context that has ended.
+#include <algorithm>
 #include <cstdlib>
 #include <cstring>
 #include <new>
 
+#include <openssl/crypto.h>
 #include <openssl/err.h>
 #include <openssl/ssl.h>
 #include <zlib.h>
@@ -63,6 +65,20 @@ void context_zlib_make(soap *ctx)
     ctx->zlib_stream = static_cast<z_stream *>(SOAP_MALLOC(ctx, sizeof(z_stream)));
     if (ctx->zlib_stream != nullptr)
         std::memset(ctx->zlib_stream, 0, sizeof(z_stream));
+}
+
+void context_credentials_wipe(soap *ctx)
+{
+    if (!ctx->credentials_passed)
+        return;
+    ctx->credentials_passed = false;
+    OPENSSL_cleanse(ctx->scratch_text, sizeof ctx->scratch_text);
+    const bool sending = ctx->buffer_index > ctx->buffer_length;
+    const std::size_t kept_from = sending ? 0 : ctx->buffer_index;
+    const std::size_t filled = sending ? ctx->buffer_index : ctx->buffer_length;
+    const std::size_t kept_to = std::max(filled, ctx->chunk_buffer_length);
+    OPENSSL_cleanse(ctx->buffer, kept_from);
+    OPENSSL_cleanse(ctx->buffer + kept_to, sizeof ctx->buffer - kept_to);
 }
 
 // The fields whose default is not zero, null or empty.
@@ -153,6 +169,8 @@ void soap_reset_call(soap *ctx)
     ctx->content_length = 0;
     ctx->look_ahead = 0;
     ctx->error = SOAP_OK;
+    ctx->fault = nullptr; // it told of an earlier exchange
+    ctx->exceeded = nullptr;
     ctx->endpoint[0] = '\0';
     ctx->dime.count = 0;
     ctx->dime.chunk_size = 0;
@@ -220,21 +238,21 @@ static void end_plugins(soap *ctx)
 
 static void close_master_socket(soap *ctx)
 {
-    if (ctx->state == 1 && ctx->master_socket != -1) {
+    if (!ctx->master_shared && ctx->master_socket != -1)
         ctx->on_close_socket(ctx, ctx->master_socket);
-        ctx->master_socket = -1;
-    }
+    ctx->master_socket = -1;
 }
 
 static void end_tls(soap *ctx)
 {
     SSL_SESSION_free(ctx->tls_session);
     ctx->tls_session = nullptr;
+    SSL_CTX_free(ctx->session_rules);
+    ctx->session_rules = nullptr;
     SSL_free(ctx->tls_connection); // with its BIO
     ctx->tls_connection = nullptr;
     ctx->tls_bio = nullptr;
-    if (ctx->state == 1)
-        SSL_CTX_free(ctx->tls_context);
+    SSL_CTX_free(ctx->tls_context);
     ctx->tls_context = nullptr;
     ERR_clear_error(); // OpenSSL frees the thread's error state itself when the thread ends
 }
@@ -256,7 +274,7 @@ void soap_engine_done(soap *ctx)
     SOAP_FREE(ctx, ctx->pointer_blocks); // the one that stays from message to message
     ctx->pointer_blocks = nullptr;
     instance_records_release(ctx);
-    if (ctx->state == 1)
+    if (!context_shares_socket(ctx))
         ctx->output_mode &= ~MODE_UDP; // else the socket would stay open
     ctx->keep_alive = 0;
     soap_socket_release(ctx);
@@ -265,6 +283,7 @@ void soap_engine_done(soap *ctx)
     close_master_socket(ctx);
     end_tls(ctx);
     end_compression(ctx);
+    context_credentials_wipe(ctx);
     trace_log_end(ctx);
     ctx->state = 0;
     track_end(ctx);

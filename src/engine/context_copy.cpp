@@ -1,15 +1,20 @@
-// context_copy.cpp - copies of a context: what they share with their source and what starts anew.
+// context_copy.cpp - copies of a context, and its move to another place.
 //
-// Shared by bytes: settings, callbacks, scratch texts, the socket's number, the TLS context, streams.
-// Never shared: what the engine frees at the end of a call or of a context.
+// A copy takes by bytes: settings, callbacks, scratch texts, streams. It gets a reference of its own to the
+// TLS context. Never shared: what the engine frees at the end of a call or of a context, and a client's
+// connection: two contexts on one socket would take each other's answers and close each other's descriptors.
 #include <cstdlib>
 #include <cstring>
 #include <new>
 
+#include <openssl/ssl.h>
+
+#include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_log.h>
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_plugin.h>
+#include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_xml.h>
 
 #include "engine/context_fields.h"
@@ -72,6 +77,21 @@ static void forget_message(soap *ctx)
     context_tables_clear(ctx);
 }
 
+static void forget_connection(soap *ctx)
+{
+    ctx->socket = -1;
+    ctx->socket_abandoned = false;
+    ctx->socket_accepted = false;
+    ctx->response_unfinished = false;
+    ctx->route.known = false;
+    ctx->keep_alive = 0;
+    ctx->input_mode &= ~MODE_TLS;
+    ctx->output_mode &= ~MODE_TLS;
+    ctx->filter_stop = 0;
+    ctx->look_ahead = 0;
+    ctx->buffer_index = ctx->buffer_length = ctx->chunk_buffer_length = 0;
+}
+
 static void forget_resources(soap *ctx)
 {
     ctx->plugin_list = nullptr;
@@ -82,9 +102,13 @@ static void forget_resources(soap *ctx)
         ctx->log_paths[channel] = nullptr;
         ctx->log_streams[channel] = nullptr;
     }
+    ctx->call_deadline = 0;
     ctx->tls_bio = nullptr;
     ctx->tls_connection = nullptr;
     ctx->tls_session = nullptr;
+    ctx->session_rules = nullptr;
+    if (ctx->tls_context != nullptr)
+        SSL_CTX_up_ref(ctx->tls_context);
     ctx->zlib_stream = nullptr;
     ctx->zlib_state = 0;
     ctx->zlib_buffer = nullptr;
@@ -132,17 +156,19 @@ static int copy_plugins(soap *target, const soap *source)
     return SOAP_OK;
 }
 
-soap *soap_context_copy(soap *target, const soap *source)
+// A copy without a connection, in a record that holds nothing. Null if `source` has ended, or as the error in
+// the copy tells.
+static soap *copy_settings(soap *target, const soap *source)
 {
-    if (target == source)
-        return target;
-    if (target == nullptr || !context_is_alive(source))
+    if (!context_is_alive(source))
         return nullptr;
     soap_context_assign(target, source);
     target->state = 2;
+    target->master_shared = true;
     if (style_is_received(source))
         target->encoding_style = "";
     forget_message(target);
+    forget_connection(target);
     forget_resources(target);
     soap_log_set_received(target,
                           source->log_paths[SOAP_LOG_RECEIVED]); // a copy without memory for it goes unlogged
@@ -154,11 +180,37 @@ soap *soap_context_copy(soap *target, const soap *source)
     return target;
 }
 
+// What soap_accept has stored is the copy's to serve, unless TLS is on it, which can't be shared.
+static soap *hand_over_accepted(soap *target, const soap *source)
+{
+    if (!source->socket_accepted || source->socket == -1 || source->socket_abandoned ||
+        source->tls_bio != nullptr)
+        return target;
+    target->socket = source->socket;
+    target->socket_accepted = true;
+    target->keep_alive = source->keep_alive;
+    target->buffer_index = source->buffer_index;
+    target->buffer_length = source->buffer_length;
+    return target;
+}
+
+soap *soap_context_copy(soap *target, const soap *source)
+{
+    if (target == source)
+        return target;
+    if (target == nullptr || !context_is_alive(source))
+        return nullptr;
+    soap_discard_objects(target, nullptr);
+    soap_discard_all(target);
+    soap_engine_done(target);
+    return copy_settings(target, source) == nullptr ? nullptr : hand_over_accepted(target, source);
+}
+
 // A failed copy shows as state 0 or as an error in the new context.
 soap::soap(const soap &other)
 {
     context_fields_clear(this);
-    soap_context_copy(this, &other);
+    copy_settings(this, &other);
 }
 
 soap *soap_context_copy(const soap *source)
@@ -168,8 +220,44 @@ soap *soap_context_copy(const soap *source)
         return nullptr;
     auto *target = new (memory) soap(*source);
     if (target->error == SOAP_OK)
-        return target;
+        return hand_over_accepted(target, source);
     target->~soap();
     std::free(memory);
     return nullptr;
+}
+
+// ---------------------------------------------------------------------------------------------
+// Moving.
+
+// Ends the connection for good, whatever hooks say. A listening socket is none.
+static void hang_up(soap *ctx)
+{
+    const int error = ctx->error;
+    const std::uint32_t output_mode = ctx->output_mode;
+    ctx->error = SOAP_OK;
+    ctx->keep_alive = 0;
+    if (ctx->socket == ctx->master_socket)
+        ctx->socket = -1;
+    ctx->output_mode &= ~MODE_UDP; // else the socket would stay open
+    soap_socket_release(ctx);
+    if (ctx->socket != -1)
+        soap_force_close(ctx);
+    SSL_free(ctx->tls_connection); // with its BIO
+    ctx->tls_connection = nullptr;
+    ctx->tls_bio = nullptr;
+    ctx->output_mode = output_mode;
+    forget_connection(ctx);
+    ctx->error = error;
+}
+
+soap::soap(soap &&other) noexcept
+{
+    context_fields_clear(this);
+    if (!context_is_alive(&other))
+        return;
+    hang_up(&other);
+    soap_context_assign(this, &other);
+    if (fault != nullptr && *soap_fault_string_field(this) == other.message_text)
+        *soap_fault_string_field(this) = message_text;
+    soap_context_init(&other);
 }

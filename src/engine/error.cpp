@@ -57,28 +57,31 @@ const char *soap_constraint_text(soap *ctx, const char *text, const char *argume
     return compose(ctx, {violation, text, argument, " in element '", ctx->tag, "'"});
 }
 
-// "u" for microseconds, blank for seconds.
-static std::size_t append_delay(char *text, std::size_t size, const char *direction, int timeout)
+// What a time limit adds to a text: "u" for microseconds, blank for seconds.
+static std::size_t append_limit(char *text, std::size_t size, const char *what, int timeout)
 {
     if (timeout == 0)
         return 0;
     const long amount = timeout < 0 ? -static_cast<long>(timeout) : timeout;
-    const int written =
-        std::snprintf(text, size, " (%ld%cs %s delay)", amount, timeout < 0 ? 'u' : ' ', direction);
+    const int written = std::snprintf(text, size, " (%ld%cs %s)", amount, timeout < 0 ? 'u' : ' ', what);
     return static_cast<std::size_t>(written);
 }
 
 const char *soap_eof_text(soap *ctx)
 {
-    if (ctx->errno_value != 0) {
+    if (ctx->errno_value != 0 && !ctx->call_expired) {
         char own[SOAP_TEXT_SIZE];
         return compose(ctx, {strerror_r(ctx->errno_value, own, sizeof own)});
     }
     char *text = ctx->message_text;
     const std::size_t size = sizeof ctx->message_text;
     auto length = static_cast<std::size_t>(std::snprintf(text, size, "Operation interrupted or timed out"));
-    length += append_delay(text + length, size - length, "receive", ctx->recv_timeout);
-    append_delay(text + length, size - length, "send", ctx->send_timeout);
+    if (ctx->call_expired) {
+        append_limit(text + length, size - length, "call limit", ctx->call_timeout);
+        return text;
+    }
+    length += append_limit(text + length, size - length, "receive delay", ctx->recv_timeout);
+    append_limit(text + length, size - length, "send delay", ctx->send_timeout);
     return text;
 }
 
@@ -104,6 +107,14 @@ static const char *unlisted_text(soap *ctx)
     return ctx->message_text;
 }
 
+// "max_memory: more than 1000 bytes".
+static const char *limit_text(soap *ctx)
+{
+    std::snprintf(ctx->message_text, sizeof ctx->message_text, "%s: more than %llu bytes", ctx->exceeded,
+                  static_cast<unsigned long long>(ctx->exceeded_value));
+    return ctx->message_text;
+}
+
 const char *error_text(soap *ctx)
 {
     const char *text = listed_text(ctx->error);
@@ -116,8 +127,9 @@ const char *error_text(soap *ctx)
     case SOAP_REQUIRED:
     case SOAP_PROHIBITED:
     case SOAP_OCCURS:
-    case SOAP_LENGTH:
         return soap_constraint_text(ctx, text, nullptr);
+    case SOAP_LENGTH:
+        return ctx->exceeded != nullptr ? limit_text(ctx) : soap_constraint_text(ctx, text, nullptr);
     case SOAP_TYPE_MISMATCH:
         return soap_constraint_text(ctx, text, ctx->element_type);
     case SOAP_DUPLICATE_ID:

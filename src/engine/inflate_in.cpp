@@ -123,6 +123,7 @@ int soap_inflate_begin(soap *ctx, int window_bits)
     ctx->zlib_state = ZLIB_INFLATING;
     ctx->mode |= MODE_DEFLATE;
     ctx->zlib_crc = crc32(0, nullptr, 0);
+    ctx->plain_received = 0;
     soap_raw_move_aside(ctx);
     take_raw_as_input(ctx);
     stream->next_out = zlib_bytes(ctx->buffer);
@@ -130,6 +131,22 @@ int soap_inflate_begin(soap *ctx, int window_bits)
     // A stream with a zlib head asks for its dictionary; a raw one cannot.
     if (window_bits < 0 && ctx->zlib_dictionary != nullptr && set_dictionary(ctx) != Z_OK)
         return fail(ctx);
+    return SOAP_OK;
+}
+
+int soap_inflate_begin_deflate(soap *ctx, std::uint8_t first)
+{
+    // The second byte is looked at where it stands; the first, which a refill may have taken away, is handed
+    // on by itself.
+    const bool has_second = ctx->look_ahead == 0 && ctx->buffer_index < ctx->buffer_length;
+    const auto second = static_cast<unsigned char>(has_second ? ctx->buffer[ctx->buffer_index] : 0);
+    const bool has_zlib_head =
+        (first & 0x0F) == Z_DEFLATED && first >> 4 <= 7 && (first << 8 | second) % 31 == 0;
+    if (soap_inflate_begin(ctx, has_zlib_head ? ZLIB_WRAPPED : ZLIB_RAW) != SOAP_OK)
+        return ctx->error;
+    if (inflatePrime(ctx->zlib_stream, 8, first) != Z_OK)
+        return fail(ctx);
+    ctx->zlib_stream->total_in = 1;
     return SOAP_OK;
 }
 
@@ -169,5 +186,7 @@ int soap_inflate_finish(soap *ctx)
         (result == STREAM_ENDED && gzip && !trailer_is_right(ctx, plain_length)))
         result = fail(ctx);
     ctx->zlib_in = 0;
+    if (ctx->exceeded != nullptr) // what the stream lacks is what nobody wanted to receive
+        return ctx->error = SOAP_LENGTH;
     return result == STREAM_ENDED ? SOAP_OK : ctx->error = result;
 }

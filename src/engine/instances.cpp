@@ -9,6 +9,7 @@
 #include <zuv_client_pro/soap_memory.h>
 
 #include "engine/context_state.h"
+#include "engine/limits.h"
 #include "engine/tracking.h"
 
 static soap_instance *enter_instance(soap *ctx, void *object, int type_id, int array_size,
@@ -17,6 +18,7 @@ static soap_instance *enter_instance(soap *ctx, void *object, int type_id, int a
     soap_instance *instance = ctx->pools->instances.take();
     *instance = {ctx->instance_list, object, type_id, array_size, hook};
     ctx->instance_list = instance;
+    memory_charge(ctx, sizeof *instance);
     return instance;
 }
 

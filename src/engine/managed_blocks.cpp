@@ -7,10 +7,14 @@
 #include <cstdio>
 #include <cstring>
 
+#include <openssl/crypto.h>
+
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_memory.h>
 
+#include "engine/context_fields.h"
 #include "engine/context_state.h"
+#include "engine/limits.h"
 #include "engine/tracking.h"
 
 struct soap_block_trailer {
@@ -49,14 +53,16 @@ static int check_canary(soap *ctx, soap_block_trailer *trailer)
 // False for a block that was given to tracked_free behind the list's back.
 static bool entry_is_live(soap_block_trailer *trailer)
 {
-    return trailer->entry->address == block_start(trailer) && trailer->entry->dead_slot == TRACK_LIVE;
+    return trailer->entry->address == block_start(trailer) && track_is_live(trailer->entry);
 }
 
 static void free_block(soap *ctx, soap_block_trailer *trailer)
 {
-    if (entry_is_live(trailer))
+    if (entry_is_live(trailer)) {
+        if (track_is_secret(trailer->entry))
+            OPENSSL_cleanse(block_start(trailer), trailer->span - sizeof CANARY);
         track_free(ctx, trailer->entry);
-    else // let the table name it
+    } else // let the table name it
         SOAP_FREE(ctx, block_start(trailer));
 }
 
@@ -72,8 +78,11 @@ void *soap_block_alloc(soap *ctx, std::size_t size)
         return const_cast<char *>("");
     if (ctx == nullptr)
         return SOAP_MALLOC(ctx, size);
-    if (ctx->on_malloc != nullptr)
-        return ctx->on_malloc(ctx, size);
+    if (ctx->on_malloc != nullptr) {
+        memory_charge(ctx, size);
+        void *block = ctx->on_malloc(ctx, size);
+        return block != nullptr ? block : out_of_memory(ctx);
+    }
     if (size > SIZE_MAX - BLOCK_OVERHEAD)
         return out_of_memory(ctx);
     const std::size_t span = (size + sizeof CANARY + 7) & ~std::size_t{7};
@@ -114,6 +123,7 @@ static void free_all_blocks(soap *ctx)
         __builtin_prefetch(trailer->next); // blocks are scattered: the next one comes while this one goes
         free_block(ctx, trailer);
     }
+    context_credentials_wipe(ctx);
     forget_managed_fields(ctx); // after a damaged block too: what they point to may be gone
 }
 
@@ -121,6 +131,8 @@ void soap_block_free(soap *ctx, void *address)
 {
     if (!context_is_alive(ctx))
         return;
+    track_secret(ctx, ctx->auth_user); // also what was set and never sent
+    track_secret(ctx, ctx->auth_password);
     if (address == nullptr) {
         free_all_blocks(ctx);
         return;

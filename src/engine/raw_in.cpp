@@ -14,6 +14,8 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_log.h>
 
+#include "engine/limits.h"
+
 namespace {
 
 constexpr int DIGITS_MAX = 16;
@@ -60,9 +62,8 @@ std::size_t receive(soap *ctx, char *bytes, std::size_t length)
     if (received == 0 || received > length) // a hook's -1 is no length
         return 0;
     soap_log_write(ctx, SOAP_LOG_RECEIVED, bytes, received);
-    if (ctx->body_open)
-        ctx->body_received += received;
-    return received;
+    ctx->body_received += received;
+    return raw_bytes_check(ctx) == SOAP_OK ? received : 0;
 }
 
 // ---------------------------------------------------------------------------------------------
@@ -278,12 +279,19 @@ void soap_raw_move_back(soap *ctx)
 void soap_raw_open_body(soap *ctx)
 {
     ctx->body_open = true;
-    ctx->body_received = ctx->buffer_length - ctx->buffer_index;
+    ctx->body_received = ctx->plain_received = ctx->buffer_length - ctx->buffer_index;
     if (!soap_input_is_chunked(ctx))
         return;
+    ctx->plain_received = 0;
     ctx->chunk_size = 0;
     ctx->chunk_buffer_length = ctx->buffer_length;
     ctx->buffer_length = ctx->buffer_index;
+}
+
+std::uint64_t soap_raw_surplus(const soap *ctx)
+{
+    const bool surplus = length_is_known(ctx) && !ctx->raw_aside && ctx->body_received > ctx->content_length;
+    return surplus ? ctx->body_received - ctx->content_length : 0;
 }
 
 bool soap_raw_consumed(soap *ctx)

@@ -20,7 +20,7 @@ constexpr std::size_t DROP_MAX = 65536; // bytes read beyond what the reader wan
 void soap_raw_reset(soap *ctx);
 
 // The next stretch of the body's raw bytes, once the one before was used. 0 with at least one byte, 1 at the
-// end of input, 22 if a chunk's size line is too long.
+// end of input or past a limit (limits.h), 22 if a chunk's size line is too long.
 int soap_raw_fill(soap *ctx);
 
 // From here on raw bytes are received into zlib_buffer. What `buffer` still holds moves there, and `buffer`
@@ -36,6 +36,9 @@ void soap_raw_open_body(soap *ctx);
 // True if the message was read to its end, by chunks or by Content-Length, with nothing behind it. Reads and
 // drops up to DROP_MAX bytes that Content-Length still promises if the connection is to be kept.
 bool soap_raw_consumed(soap *ctx);
+
+// Bytes received behind the length that the head told.
+std::uint64_t soap_raw_surplus(const soap *ctx);
 
 inline bool soap_input_is_chunked(const soap *ctx)
 {

@@ -5,7 +5,9 @@
 #include "engine/trace_log.h"
 
 #include <cstring>
+#include <fcntl.h>
 #include <new>
+#include <unistd.h>
 
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_log.h>
@@ -14,6 +16,7 @@
 char g_TraceLogFile[SOAP_LOG_PATH_SIZE] = "wsTrace.log";
 char soapEnableDebug = 1;
 
+static constexpr mode_t NEW_FILE_MODE = 0600; // messages hold personal data and credentials
 static constexpr int CHANNELS = static_cast<int>(SOAP_LOG_CHANNELS);
 
 static bool is_channel(int channel)
@@ -70,7 +73,12 @@ void soap_log_open(soap *ctx, int channel)
     if (!is_channel(channel) || ctx->log_paths[channel] == nullptr)
         return;
     soap_log_close(ctx, channel);
-    ctx->log_streams[channel] = std::fopen(ctx->log_paths[channel], channel == SOAP_LOG_THIRD ? "a" : "ab");
+    const int file = open(ctx->log_paths[channel], O_WRONLY | O_CREAT | O_APPEND | O_CLOEXEC, NEW_FILE_MODE);
+    if (file < 0)
+        return;
+    ctx->log_streams[channel] = fdopen(file, "a");
+    if (ctx->log_streams[channel] == nullptr)
+        close(file);
 }
 
 void soap_log_close(soap *ctx, int channel)

@@ -5,13 +5,31 @@
 // Always: one look-up costs a constant on average, however many blocks live; the table doubles with its load.
 #include "engine/tracking.h"
 
+#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
 #include <new>
 
 #include <zuv_client_pro/soap_memory.h>
 
+#include "engine/limits.h"
+
 static constexpr std::size_t LOAD_MAX = 1; // entries for each chain before the table doubles
+// Book-keeping of a block: its entry, and its part of the table.
+static constexpr std::size_t BOOK_UNITS = (sizeof(soap_track_entry) + 2 * sizeof(void *)) / ALLOCATION_UNIT;
+
+static std::int64_t bytes_held(const soap_track_entry *entry)
+{
+    return static_cast<std::int64_t>(entry->life & ~TRACK_SECRET) *
+           static_cast<std::int64_t>(ALLOCATION_UNIT);
+}
+
+static void set_live(soap *ctx, soap_track_entry *entry, std::size_t size)
+{
+    const std::size_t units = allocation_size(size) / ALLOCATION_UNIT + BOOK_UNITS;
+    entry->life = static_cast<std::uint32_t>(std::min<std::size_t>(units, TRACK_SECRET - 1));
+    ctx->memory_held += bytes_held(entry);
+}
 
 soap_memory_pools *memory_pools_make(soap *ctx)
 {
@@ -94,8 +112,10 @@ static soap_track_entry *entry_for(soap *ctx, void *address)
     soap_memory_pools *pools = ctx->pools;
     soap_track_entry *entry = find_entry(ctx, address);
     if (entry != nullptr) {
-        if (entry->dead_slot != TRACK_LIVE)
-            pools->dead[entry->dead_slot] = nullptr;
+        if (!track_is_live(entry))
+            pools->dead[entry->life - TRACK_DEAD] = nullptr;
+        else // freed behind our back
+            ctx->memory_held -= bytes_held(entry);
         return entry;
     }
     entry = pools->entries.take();
@@ -114,7 +134,6 @@ static soap_track_entry *enter(soap *ctx, const char *source_file, int source_li
     if (entry != nullptr) {
         entry->source_file = source_file;
         entry->source_line = source_line;
-        entry->dead_slot = TRACK_LIVE;
     }
     return entry;
 }
@@ -129,6 +148,8 @@ soap_track_entry *track_alloc(soap *ctx, const char *source_file, int source_lin
     soap_track_entry *entry = enter(ctx, source_file, source_line, address);
     if (entry == nullptr)
         std::free(address);
+    else
+        set_live(ctx, entry, size);
     return entry;
 }
 
@@ -139,7 +160,8 @@ void track_forget(soap *ctx, soap_track_entry *entry)
     if (slot != nullptr)
         drop_entry(ctx, slot);
     slot = entry;
-    entry->dead_slot = static_cast<std::int32_t>(pools->dead_next);
+    ctx->memory_held -= bytes_held(entry);
+    entry->life = TRACK_DEAD | static_cast<std::uint32_t>(pools->dead_next);
     pools->dead_next = (pools->dead_next + 1) % TRACK_DEAD_MAX;
 }
 
@@ -150,9 +172,19 @@ void track_free(soap *ctx, soap_track_entry *entry)
     std::free(address);
 }
 
+void track_secret(soap *ctx, const void *address)
+{
+    soap_track_entry *entry = find_entry(ctx, address);
+    if (entry != nullptr && track_is_live(entry))
+        entry->life |= TRACK_SECRET;
+}
+
 soap_track_entry *track_move(soap *source, soap *target, soap_track_entry *entry)
 {
     soap_track_entry *moved = enter(target, entry->source_file, entry->source_line, entry->address);
+    moved->life = entry->life;
+    source->memory_held -= bytes_held(entry);
+    target->memory_held += bytes_held(entry);
     drop_entry(source, entry);
     return moved;
 }
@@ -174,7 +206,7 @@ void tracked_free(soap *ctx, const char *source_file, int source_line, void *add
     soap_track_entry *entry = find_entry(ctx, address);
     if (entry == nullptr)
         std::fprintf(stderr, "%s(%d): free(%p) pointer not malloced\n", source_file, source_line, address);
-    else if (entry->dead_slot != TRACK_LIVE)
+    else if (!track_is_live(entry))
         std::fprintf(stderr, "%s(%d): free(%p) double free of pointer malloced at %s(%d)\n", source_file,
                      source_line, address, entry->source_file, entry->source_line);
     else
@@ -185,7 +217,7 @@ void track_end(soap *ctx)
 {
     for (std::size_t i = 0; i <= ctx->track_chain_mask; ++i) {
         for (const soap_track_entry *entry = ctx->track_chains[i]; entry != nullptr; entry = entry->next) {
-            if (entry->dead_slot == TRACK_LIVE)
+            if (track_is_live(entry))
                 std::fprintf(stderr,
                              "%s(%d): malloc() = %p not freed (memory leak or forgot to call soap_end()?)\n",
                              entry->source_file, entry->source_line, entry->address);

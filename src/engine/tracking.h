@@ -13,11 +13,22 @@ struct soap_track_entry {
     void *address;
     const char *source_file; // borrowed
     std::int32_t source_line;
-    std::int32_t dead_slot; // place in soap_memory_pools::dead; TRACK_LIVE while the block is in use
+    std::uint32_t life; // live: what the block counts in soap::memory_held, in units of ALLOCATION_UNIT, and
+                        // TRACK_SECRET; dead: TRACK_DEAD and its place in soap_memory_pools::dead
 };
 
-constexpr std::int32_t TRACK_LIVE = -1;
-constexpr std::size_t TRACK_DEAD_MAX = 4096; // freed blocks that a context remembers
+constexpr std::uint32_t TRACK_DEAD = 0x80000000;
+constexpr std::uint32_t TRACK_SECRET = 0x40000000; // a managed block of it is wiped when it is freed
+constexpr std::size_t TRACK_DEAD_MAX = 4096;       // freed blocks that a context remembers
+
+inline bool track_is_live(const soap_track_entry *entry)
+{
+    return (entry->life & TRACK_DEAD) == 0;
+}
+inline bool track_is_secret(const soap_track_entry *entry)
+{
+    return track_is_live(entry) && (entry->life & TRACK_SECRET) != 0;
+}
 
 // Made at the first allocation, gone with soap_engine_done.
 struct soap_memory_pools {
@@ -46,6 +57,10 @@ soap_track_entry *track_alloc(soap *ctx, const char *source_file, int source_lin
 // else.
 void track_free(soap *ctx, soap_track_entry *entry);
 void track_forget(soap *ctx, soap_track_entry *entry);
+
+// Makes the live block that starts at `address` a secret. Other addresses, such as a text of the host's, are
+// ignored.
+void track_secret(soap *ctx, const void *address);
 
 // Moves a live entry to the table of another context, whose pool must have an idle entry; returns the new
 // one.

@@ -1,7 +1,7 @@
 // call.cpp - the cycle of an operation: mark, count, connect, send, receive, release.
 //
-// Always: until the connection is asked for, a failure returns at once and leaves a kept connection alone;
-// from there on every way out releases the connection.
+// Always: until the connection is asked for, a failure returns at once and leaves a kept connection alone,
+// but for a message that is too large; from there on every way out releases the connection.
 #include "proxies/call.h"
 
 #include <zuv_client_pro/soap_envelope.h>
@@ -13,6 +13,7 @@
 #include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "binding/envelope.h"
 #include "codec/attachment_list.h"
 
 namespace proxies {
@@ -45,10 +46,25 @@ int send_message(soap *ctx, const char *endpoint, const char *action, const oper
     return soap_send_finish(ctx);
 }
 
+// A value of the header is wrong. That must not hide a fault, which the Body may hold; what else it may hold
+// is not looked at.
+int look_for_fault(soap *ctx, std::uint32_t envelope_level)
+{
+    const int error = ctx->error;
+    const bool at_fault = error != SOAP_MUST_UNDERSTAND && binding::drop_bad_value(ctx, envelope_level) &&
+                          soap_body_in_begin(ctx) == 0 && soap_element_head_read(ctx) == 0 &&
+                          soap_tag_compare(ctx, ctx->tag, "SOAP-ENV:Fault") == 0;
+    ctx->error = error;
+    return at_fault ? soap_fault_receive(ctx, 1) : error;
+}
+
 int begin_response(soap *ctx)
 {
-    if (soap_receive_begin(ctx) || soap_envelope_in_begin(ctx) || soap_header_get(ctx))
+    if (soap_receive_begin(ctx) || soap_envelope_in_begin(ctx))
         return ctx->error;
+    const std::uint32_t level = ctx->nesting_level;
+    if (soap_header_get(ctx))
+        return ctx->message_part == PART_HEADER ? look_for_fault(ctx, level) : ctx->error;
     return soap_body_in_begin(ctx);
 }
 
@@ -96,11 +112,13 @@ int call(soap *ctx, const char *&proxy_endpoint, const char *default_endpoint, c
         proxy_endpoint = default_endpoint;
     ctx->encoding_style = nullptr;
     soap_reset_call(ctx);
+    if (soap_endpoint_check(ctx, proxy_endpoint))
+        return ctx->error;
     soap_mark_header(ctx);
     binding::class_pointer_mark(ctx, *op.request, request);
     if (count_message(ctx, op, request)) {
         attachments_forget(ctx); // they belong to this call, as they do when it fails later
-        return ctx->error;
+        return ctx->exceeded != nullptr ? soap_socket_release(ctx) : ctx->error;
     }
     if (send_message(ctx, proxy_endpoint, action ? action : "", op, request) || !result)
         return soap_socket_release(ctx);
@@ -112,6 +130,11 @@ int call(soap *ctx, const char *&proxy_endpoint, const char *default_endpoint, c
         return soap_fault_receive(ctx, 0);
     end_response(ctx);
     return soap_socket_release(ctx);
+}
+
+void *record_or(void *record, void *stand_in)
+{
+    return record ? record : stand_in;
 }
 
 int init(soap *ctx, int input_mode, int output_mode, const soap_namespace *namespaces)

@@ -29,6 +29,14 @@ struct operation {
 int call(soap *ctx, const char *&proxy_endpoint, const char *default_endpoint, const operation &op,
          const char *endpoint, const char *action, const void *request, void **result);
 
+// Stands for the response record of a call that has none: a null reference, which the host's one-way call is
+// told by, can't be handed on as a reference. Never written.
+template <class Record> inline Record no_record{};
+
+// The address of a record, or of its stand-in if that is null. Not in a header, as a compiler takes it for
+// granted that what is referred to has an address.
+void *record_or(void *record, void *stand_in);
+
 // Operations of all proxies other than calls. `init` replaces the modes and installs the port's namespaces: 0
 // or 20.
 int init(soap *ctx, int input_mode, int output_mode, const soap_namespace *namespaces);

@@ -35,6 +35,12 @@
         endpoint = url;                                                                                      \
     }                                                                                                        \
     P::P(const soap &other) : soap(other) {}                                                                 \
+    P::P(const P &other) : soap(other) {}                                                                    \
+    P::P(P &&other) noexcept : soap(static_cast<soap &&>(other)), endpoint(other.endpoint)                   \
+    {                                                                                                        \
+        if (other.state != 0) /* else it was no context any more */                                          \
+            other.P::P##_init(0, 0);                                                                         \
+    }                                                                                                        \
     P::~P() = default;                                                                                       \
     int P::P##_init(int imode, int omode)                                                                    \
     {                                                                                                        \
@@ -96,13 +102,15 @@
 #define PROXY_DEFINE_CALL(P, name, Request, Record, request_element, Result, response_element, record_id)    \
     int P::name(Request *request, Record &response)                                                          \
     {                                                                                                        \
-        return _##name(nullptr, nullptr, request, response);                                                 \
+        return _##name(nullptr, nullptr, request,                                                            \
+                       *static_cast<Record *>(proxies::record_or(&response, &proxies::no_record<Record>)));  \
     }                                                                                                        \
     int P::_##name(const char *url, const char *soap_action, Request *request, Record &response)             \
     {                                                                                                        \
         static constexpr proxies::operation operation = {request_element, &binding::ops_of<Request>,         \
                                                          response_element, &binding::ops_of<Result>,         \
                                                          record_id};                                         \
+        const bool one_way = &response == &proxies::no_record<Record>;                                       \
         return proxies::call(this, endpoint, default_endpoint, operation, url, soap_action, request,         \
-                             reinterpret_cast<void **>(&response));                                          \
+                             one_way ? nullptr : reinterpret_cast<void **>(&response));                      \
     }

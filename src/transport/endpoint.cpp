@@ -13,9 +13,12 @@
 #include <zuv_client_pro/soap_io.h>
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_tcp.h>
+#include <zuv_client_pro/soap_tls.h>
 #include <zuv_client_pro/soap_xml.h>
 
 #include "transport/tcp_socket.h"
+#include "transport/tcp_wait.h"
+#include "transport/tls_connection.h"
 
 namespace {
 
@@ -55,56 +58,107 @@ void split_url(soap *ctx, const char *url)
         copy_field(ctx->path, path, std::strlen(path));
 }
 
-// A connection must not be taken over by an endpoint of other security: an https call never rides on a plain
-// socket.
-bool same_security(const soap *ctx, const char *endpoint)
+// --- the route of a connection ---
+
+bool is_secure(const char *endpoint)
 {
-    return (soap_tag_match(endpoint, "https:*") == 0) == ((ctx->output_mode & MODE_TLS) != 0);
+    return soap_tag_match(endpoint, "https:*") == 0;
 }
 
-// Where the last exchange went, and how.
-struct previous_peer {
-    char host[SOAP_TEXT_SIZE];
-    int port;
-};
-
-bool connection_is_reusable(soap *ctx, const previous_peer &previous, const char *endpoint)
+bool is_datagrams(const char *endpoint)
 {
+    return std::strncmp(endpoint, "soap.udp:", 9) == 0;
+}
+
+std::uint16_t tls_rules(const soap *ctx)
+{
+    return static_cast<std::uint16_t>(ctx->tls_flags & ~TLS_CLIENT_SIDE); // set on the way
+}
+
+const char *http_proxy(const soap *ctx)
+{
+    return ctx->proxy_host == nullptr ? "" : ctx->proxy_host;
+}
+
+void note_route(soap *ctx, const char *endpoint)
+{
+    soap_route &route = ctx->route;
+    route.known = true;
+    route.secure = is_secure(endpoint);
+    route.datagrams = is_datagrams(endpoint);
+    route.rules = tls_rules(ctx);
+    route.port = ctx->port;
+    route.proxy_port = ctx->proxy_port;
+    copy_field(route.host, ctx->host, std::strlen(ctx->host));
+    copy_field(route.proxy_host, http_proxy(ctx), std::strlen(http_proxy(ctx)));
+}
+
+// An https call never rides on a plain socket, whatever the mode flags say, nor a plain one on TLS.
+bool leads_to(const soap *ctx, const char *endpoint)
+{
+    const soap_route &route = ctx->route;
+    return route.known && route.port == ctx->port && std::strcmp(route.host, ctx->host) == 0 &&
+           route.datagrams == is_datagrams(endpoint) && route.secure == is_secure(endpoint) &&
+           (route.secure ? tls_established(ctx) : !tls_active(ctx));
+}
+
+bool has_same_proxy(const soap *ctx)
+{
+    const soap_route &route = ctx->route;
+    return std::strcmp(route.proxy_host, http_proxy(ctx)) == 0 &&
+           (route.proxy_host[0] == '\0' || route.proxy_port == ctx->proxy_port);
+}
+
+bool has_same_rules(const soap *ctx)
+{
+    return !ctx->route.secure || (ctx->route.rules == tls_rules(ctx) && tls_has_own_rules(ctx));
+}
+
+bool connection_is_reusable(soap *ctx, const char *endpoint)
+{
+    const bool any_route = (ctx->legacy & LEGACY_ANY_ROUTE) != 0;
     return ctx->keep_alive != 0 && soap_socket_open(ctx) && !ctx->response_unfinished &&
-           ctx->port == previous.port && std::strcmp(ctx->host, previous.host) == 0 &&
-           same_security(ctx, endpoint) && ctx->on_poll != nullptr && ctx->on_poll(ctx) == 0;
+           leads_to(ctx, endpoint) && (any_route || (has_same_proxy(ctx) && has_same_rules(ctx))) &&
+           ctx->on_poll != nullptr && ctx->on_poll(ctx) == 0;
 }
 
-int open_connection(soap *ctx, const char *endpoint)
+int end_connection(soap *ctx)
 {
+    ctx->error = SOAP_OK;
+    ctx->keep_alive = 0;
+    return tcp_release(ctx);
+}
+
+// Keeps the connection of an earlier exchange if it serves this endpoint too; otherwise closes it and opens a
+// new one.
+int provide_connection(soap *ctx, const char *endpoint)
+{
+    if (connection_is_reusable(ctx, endpoint))
+        return SOAP_OK;
+    if (is_datagrams(endpoint))
+        ctx->output_mode |= MODE_UDP;
+    else
+        ctx->output_mode &= ~MODE_UDP;
+    if (end_connection(ctx) != SOAP_OK)
+        return ctx->error;
     ctx->socket = ctx->on_open(ctx, endpoint, ctx->host, ctx->port);
     ctx->socket_abandoned = false;
     ctx->opened_by = tcp_process();
+    ctx->socket_accepted = false;
     ctx->response_unfinished = false;
     if (ctx->error != SOAP_OK)
         return ctx->error;
+    note_route(ctx, endpoint);
     ctx->keep_alive = (ctx->output_mode & MODE_KEEP_ALIVE) != 0 ? 1 : 0;
     return SOAP_OK;
 }
 
-// Keeps the connection of the last exchange if it serves this endpoint too; otherwise closes it and opens a
-// new one.
-int provide_connection(soap *ctx, const previous_peer &previous, const char *endpoint)
+// What is meant for nobody in particular doesn't go to whoever was called before.
+int connect_by_endpoint(soap *ctx, const char *endpoint)
 {
-    if (!connection_is_reusable(ctx, previous, endpoint)) {
-        ctx->error = SOAP_OK;
-        if (std::strncmp(endpoint, "soap.udp:", 9) == 0) {
-            ctx->output_mode |= MODE_UDP;
-        } else {
-            ctx->output_mode &= ~MODE_UDP;
-            ctx->keep_alive = 0;
-        }
-        if (soap_socket_release(ctx) != SOAP_OK)
-            return ctx->error;
-    }
-    if (ctx->keep_alive == 0 || !soap_socket_open(ctx))
-        return open_connection(ctx, endpoint);
-    return SOAP_OK;
+    if (ctx->on_open != nullptr && endpoint != nullptr && ctx->host[0] != '\0')
+        return provide_connection(ctx, endpoint);
+    return ctx->route.known && ctx->on_connect == nullptr ? end_connection(ctx) : SOAP_OK;
 }
 
 // The head goes out as it is, neither chunked nor compressed; a stored message gets its head when its size is
@@ -145,12 +199,11 @@ void soap_parse_endpoint(soap *ctx, const char *url)
         split_url(ctx, url);
 }
 
-int soap_connect_one(soap *ctx, int status, const char *endpoint, const char *action)
+// soap_connect_one within the time of a call that has begun.
+static int connect_one(soap *ctx, int status, const char *endpoint, const char *action)
 {
-    previous_peer previous;
     ctx->error = SOAP_OK;
-    copy_field(previous.host, ctx->host, std::strlen(ctx->host));
-    previous.port = ctx->port;
+    ctx->fault = nullptr; // what an earlier attempt left must not explain a later failure
     ctx->status = status;
     soap_parse_endpoint(ctx, endpoint);
     if (ctx->on_connect != nullptr) {
@@ -162,8 +215,7 @@ int soap_connect_one(soap *ctx, int status, const char *endpoint, const char *ac
         if (action != nullptr && ctx->action == nullptr)
             return ctx->error;
     }
-    if (ctx->on_open != nullptr && ctx->host[0] != '\0' &&
-        provide_connection(ctx, previous, endpoint) != SOAP_OK)
+    if (connect_by_endpoint(ctx, endpoint) != SOAP_OK)
         return ctx->error;
     const std::uint64_t count = soap_message_length(ctx);
     if (soap_send_begin(ctx) != SOAP_OK)
@@ -175,10 +227,17 @@ int soap_connect_one(soap *ctx, int status, const char *endpoint, const char *ac
     return status == STATUS_GET ? soap_send_finish(ctx) : SOAP_OK;
 }
 
+int soap_connect_one(soap *ctx, int status, const char *endpoint, const char *action)
+{
+    tcp_call_begin(ctx);
+    return connect_one(ctx, status, endpoint, action);
+}
+
 int soap_server_connect(soap *ctx, const char *endpoints, const char *action)
 {
+    tcp_call_begin(ctx);
     if (endpoints == nullptr || std::strchr(endpoints, ' ') == nullptr)
-        return soap_connect_one(ctx, STATUS_POST, endpoints, action), ctx->error;
+        return connect_one(ctx, STATUS_POST, endpoints, action), ctx->error;
     const std::size_t bytes = std::strlen(endpoints) + 1;
     char *const list = static_cast<char *>(SOAP_MALLOC(ctx, bytes));
     if (list == nullptr)
@@ -189,10 +248,8 @@ int soap_server_connect(soap *ctx, const char *endpoints, const char *action)
         char *end = item + std::strcspn(item, " ");
         char *next = end + std::strspn(end, " ");
         *end = '\0';
-        if (soap_connect_one(ctx, STATUS_POST, item, action) != SOAP_TCP_ERROR || *next == '\0')
+        if (connect_one(ctx, STATUS_POST, item, action) != SOAP_TCP_ERROR || *next == '\0')
             break;
-        ctx->error = SOAP_OK;
-        ctx->fault = nullptr; // what the dead endpoint left must not explain a later failure
         item = next;
     }
     SOAP_FREE(ctx, list);

@@ -7,12 +7,16 @@
 #include <cstring>
 #include <string_view>
 
+#include <openssl/crypto.h>
 #include <openssl/evp.h>
 
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_xml.h>
+
+#include "engine/text_encoding.h"
+#include "engine/tracking.h"
 
 namespace {
 
@@ -67,8 +71,10 @@ int parse_content_type(soap *ctx, const char *value)
 {
     if (store_copy(ctx, value, ctx->http_content) != SOAP_OK)
         return ctx->error;
-    if (is_simple_type(value))
+    if (is_simple_type(value)) {
+        text_encoding_by_type(ctx, value, ctx->input_mode);
         return SOAP_OK;
+    }
     const char *const type = ctx->http_content;
     if (has_item(ctx, type, "application/dime"))
         ctx->input_mode |= MODE_DIME;
@@ -79,6 +85,8 @@ int parse_content_type(soap *ctx, const char *value)
         ctx->input_mode |= MODE_MIME;
         if (soap_tag_match(soap_attr_value(ctx, type, "type"), "application/xop+xml") == 0)
             ctx->input_mode |= MODE_MTOM; // whatever the first part says of itself
+    } else {                              // the parts of a multipart body have a type of their own
+        text_encoding_by_type(ctx, type, ctx->input_mode);
     }
     const char *const action = soap_attr_value(ctx, type, "action");
     return action == nullptr ? SOAP_OK : store_action(ctx, action);
@@ -146,17 +154,43 @@ bool decode_to_scratch(soap *ctx, const char *text)
     return true;
 }
 
-int parse_authorization(soap *ctx, const char *value)
+// Whatever comes on a connection that was opened for a call answers that call, whether it tells a status or
+// not.
+bool is_answer(const soap *ctx)
 {
-    if (soap_tag_match(value, "Basic *") != 0 || !decode_to_scratch(ctx, value + SCHEME_LENGTH))
-        return SOAP_OK;
+    return ctx->status != 0 || ctx->route.known;
+}
+
+int store_secret(soap *ctx, const char *text, const char *&field)
+{
+    if (store_copy(ctx, text, field) != SOAP_OK)
+        return ctx->error;
+    track_secret(ctx, field);
+    return SOAP_OK;
+}
+
+int store_credentials(soap *ctx)
+{
     char *const colon = std::strchr(ctx->scratch_text, ':');
     if (colon == nullptr)
         return SOAP_OK;
     *colon = '\0';
-    if (store_copy(ctx, ctx->scratch_text, ctx->auth_user) != SOAP_OK)
+    if (store_secret(ctx, ctx->scratch_text, ctx->auth_user) != SOAP_OK)
         return ctx->error;
-    return store_copy(ctx, colon + 1, ctx->auth_password);
+    return store_secret(ctx, colon + 1, ctx->auth_password);
+}
+
+// A request tells who sends it. In an answer the peer would choose in whose name the next call is made.
+int parse_authorization(soap *ctx, const char *value)
+{
+    if (is_answer(ctx) && (ctx->legacy & LEGACY_ANSWER_CREDENTIALS) == 0)
+        return SOAP_OK;
+    if (soap_tag_match(value, "Basic *") != 0 || !decode_to_scratch(ctx, value + SCHEME_LENGTH))
+        return SOAP_OK;
+    const int result = store_credentials(ctx);
+    OPENSSL_cleanse(ctx->scratch_text, sizeof ctx->scratch_text);
+    ctx->credentials_passed = true;
+    return result;
 }
 
 int parse_challenge(soap *ctx, const char *value)

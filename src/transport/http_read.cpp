@@ -8,6 +8,8 @@
 #include <cstdlib>
 #include <cstring>
 
+#include <openssl/crypto.h>
+
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_io.h>
@@ -21,9 +23,9 @@ namespace {
 constexpr std::size_t LINE_SIZE = 8192; // bytes of a header line, terminator included
 constexpr unsigned LINES_MAX = 1024;    // header lines of one message
 constexpr std::size_t HEAD_BYTES_MAX = std::size_t{1024} * 1024; // all header lines of one message
-constexpr unsigned INTERIM_HEADS_MAX = 100; // heads of status 100 ahead of the one that counts
+constexpr unsigned INTERIM_HEADS_MAX = 100;                      // interim heads before the one that counts
 constexpr std::uint64_t ERROR_BODY_MAX = std::uint64_t{1024} * 1024; // bytes of an error body that are kept
-constexpr int STATUS_CONTINUE = 100;
+constexpr int STATUS_SWITCHING = 101;                                // to a protocol that nobody asked for
 constexpr int STATUS_MIN = 100, STATUS_MAX = 999; // other numbers could pass for codes of the engine
 constexpr int STATUS_URI_TOO_LARGE = 414;
 constexpr int STATUS_NO_METHOD = 405;
@@ -111,11 +113,19 @@ int take_header(soap *ctx, head_state &head, char *line)
     *colon = '\0';
     if (ctx->on_parse_header == nullptr)
         return SOAP_OK;
-    const int result = ctx->on_parse_header(ctx, line, trimmed_value(colon + 1));
+    char *const value = trimmed_value(colon + 1);
+    const int result = ctx->on_parse_header(ctx, line, value);
+    if (ctx->auth_password != nullptr) // it may have come with this line
+        OPENSSL_cleanse(value, std::strlen(value));
     ctx->error = result < SOAP_STOP ? result : SOAP_OK;
     if (result >= SOAP_STOP)
         head.deferred = result;
     return ctx->error;
+}
+
+bool is_interim(int status)
+{
+    return status >= 100 && status < 200 && status != STATUS_SWITCHING;
 }
 
 int read_headers(soap *ctx, head_state &head)
@@ -130,19 +140,19 @@ int read_headers(soap *ctx, head_state &head)
         head.bytes += std::strlen(line);
         if (++head.lines > LINES_MAX || head.bytes > HEAD_BYTES_MAX)
             return ctx->error = SOAP_HEADER_LINE;
-        if (take_header(ctx, head, line) != SOAP_OK)
+        if (!is_interim(ctx->status) && take_header(ctx, head, line) != SOAP_OK)
             return ctx->error;
     }
 }
 
-// A 100 only says that the body may come: the head that counts follows.
+// The head that counts follows those that only tell how the request gets on.
 int read_final_head(soap *ctx, head_state &head)
 {
     for (unsigned heads = 0; heads <= INTERIM_HEADS_MAX; ++heads) {
         reset_head_fields(ctx);
         if (read_start_line(ctx) != SOAP_OK || read_headers(ctx, head) != SOAP_OK)
             return ctx->error;
-        if (ctx->status != STATUS_CONTINUE)
+        if (!is_interim(ctx->status))
             return SOAP_OK;
     }
     return ctx->error = SOAP_HEADER_LINE;
@@ -245,9 +255,9 @@ int take_response(soap *ctx)
     const int status = ctx->status;
     if (status == 200)
         return SOAP_OK;
-    if (status < STATUS_MIN || status > STATUS_MAX) {
+    if (status < STATUS_MIN || status > STATUS_MAX || status == STATUS_SWITCHING) {
         ctx->keep_alive = 0;
-        return fail_with(ctx, SOAP_HTTP_ERROR, nullptr);
+        return fail_with(ctx, status == STATUS_SWITCHING ? status : SOAP_HTTP_ERROR, nullptr);
     }
     if (ctx->content_length == 0 && (ctx->http_content == nullptr || ctx->recv_timeout == 0) &&
         !is_chunked(ctx)) {

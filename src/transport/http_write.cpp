@@ -17,6 +17,7 @@
 #include <zuv_client_pro/soap_io.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "engine/tracking.h"
 #include "transport/tcp_socket.h"
 #include "transport/tls_connection.h"
 
@@ -196,13 +197,22 @@ bool is_http_scheme(const char *endpoint)
            std::strncmp(endpoint, "httpg:", 6) == 0;
 }
 
+// A host as URLs have it: an IPv6 address in brackets.
+void put_host(bounded_text &out, const char *host)
+{
+    const bool needs_brackets = *host != '[' && std::strchr(host, ':') != nullptr;
+    out.put(needs_brackets ? "[" : "");
+    out.put(host);
+    out.put(needs_brackets ? "]" : "");
+}
+
 int write_request_line(soap *ctx, const char *endpoint, const char *host, int port, const char *path)
 {
     bounded_text text;
     text.put(method_text(ctx->status));
     text.put(" ");
     if (ctx->status == STATUS_CONNECT) {
-        text.put(host);
+        put_host(text, host);
         text.put(":");
         text.put_number(port);
     } else if (ctx->proxy_host != nullptr) {
@@ -219,20 +229,20 @@ int write_request_line(soap *ctx, const char *endpoint, const char *host, int po
 int write_host(soap *ctx, const char *host, int port)
 {
     const int default_port = tls_active(ctx) ? 443 : 80;
-    if (port == default_port)
-        return line(ctx, "Host", host);
-    const bool needs_brackets = *host != '[' && std::strchr(host, ':') != nullptr;
     bounded_text value;
-    value.put(needs_brackets ? "[" : "");
-    value.put(host);
-    value.put(needs_brackets ? "]:" : ":");
-    value.put_number(port);
+    put_host(value, host);
+    if (port != default_port) {
+        value.put(":");
+        value.put_number(port);
+    }
     return line(ctx, "Host", value.text);
 }
 
-// Credentials that don't fit are left out; no copy of them stays behind.
+// Credentials that don't fit are left out; no copy of them stays behind but in the buffer, on its way out.
 int write_credentials(soap *ctx, const char *key, const char *user, const char *password)
 {
+    track_secret(ctx, user);
+    track_secret(ctx, password);
     if (user == nullptr || password == nullptr ||
         std::strlen(user) + std::strlen(password) >= CREDENTIALS_LIMIT)
         return SOAP_OK;
@@ -244,13 +254,31 @@ int write_credentials(soap *ctx, const char *key, const char *user, const char *
     const int result = line(ctx, key, value);
     OPENSSL_cleanse(pair, sizeof pair);
     OPENSSL_cleanse(value, sizeof value);
+    ctx->credentials_passed = true;
     return result;
 }
 
-// They are for the proxy alone: what goes through a tunnel is read by the host behind it.
-int write_proxy_credentials(soap *ctx)
+// They are for the service alone: the head of a CONNECT is read by the HTTP proxy.
+int write_service_credentials(soap *ctx)
 {
-    if (ctx->proxy_host != nullptr && tls_active(ctx))
+    if (ctx->status == STATUS_CONNECT && (ctx->legacy & LEGACY_TUNNEL_CREDENTIALS) == 0)
+        return SOAP_OK;
+    return write_credentials(ctx, "Authorization", ctx->auth_user, ctx->auth_password);
+}
+
+// True if an HTTP proxy reads the head: not if the connection goes past it, or through it to an https
+// endpoint.
+bool is_read_by_proxy(const soap *ctx, const char *endpoint)
+{
+    if (ctx->proxy_host == nullptr || ctx->status == STATUS_CONNECT)
+        return ctx->proxy_host != nullptr;
+    return soap_tag_match(endpoint, "https:*") != 0 &&
+           (!ctx->route.known || ctx->route.proxy_host[0] != '\0');
+}
+
+int write_proxy_credentials(soap *ctx, const char *endpoint)
+{
+    if (!is_read_by_proxy(ctx, endpoint))
         return SOAP_OK;
     return write_credentials(ctx, "Proxy-Authorization", ctx->proxy_user, ctx->proxy_password);
 }
@@ -354,9 +382,8 @@ int http_write_request(soap *ctx, const char *endpoint, const char *host, int po
     if (write_request_line(ctx, endpoint, host, port, path) != SOAP_OK ||
         write_host(ctx, host, port) != SOAP_OK || line(ctx, "User-Agent", PRODUCT) != SOAP_OK ||
         http_write_entity_headers(ctx, 0, count) != SOAP_OK ||
-        line(ctx, "Accept-Encoding", "deflate") != SOAP_OK ||
-        write_credentials(ctx, "Authorization", ctx->auth_user, ctx->auth_password) != SOAP_OK ||
-        write_proxy_credentials(ctx) != SOAP_OK || write_action(ctx, action) != SOAP_OK)
+        line(ctx, "Accept-Encoding", "deflate") != SOAP_OK || write_service_credentials(ctx) != SOAP_OK ||
+        write_proxy_credentials(ctx, endpoint) != SOAP_OK || write_action(ctx, action) != SOAP_OK)
         return ctx->error;
     return line(ctx, nullptr, nullptr);
 }

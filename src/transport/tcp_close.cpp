@@ -2,6 +2,8 @@
 //
 // Elsewhere: closing TLS (tls_session.cpp).
 #include <cerrno>
+#include <cstdint>
+#include <pthread.h>
 #include <unistd.h>
 
 #include <zlib.h>
@@ -9,6 +11,7 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_tcp.h>
 
+#include "engine/context_state.h"
 #include "transport/tcp_socket.h"
 #include "transport/tls_connection.h"
 
@@ -58,7 +61,28 @@ int peek_master(soap *ctx)
     return ready < 0 && ctx->errno_value != EINTR ? fail_peek(ctx) : -1;
 }
 
+std::uint16_t process = 1;
+
+void note_fork()
+{
+    process = process == UINT16_MAX ? 1 : static_cast<std::uint16_t>(process + 1);
+}
+
 } // namespace
+
+// Counted by forks and not asked of the system, which would be a call for each use of a kept connection.
+// Forks before the first connection don't matter, so they go uncounted.
+std::uint16_t tcp_process()
+{
+    static const int counting = pthread_atfork(nullptr, nullptr, note_fork);
+    static_cast<void>(counting); // with no memory for the hook a fork goes unnoticed, as it would without it
+    return process;
+}
+
+bool tcp_inherited(const soap *ctx)
+{
+    return ctx->opened_by != 0 && ctx->opened_by != process;
+}
 
 int tcp_disconnect(soap *ctx)
 {
@@ -68,7 +92,7 @@ int tcp_disconnect(soap *ctx)
         return 0;
     }
     const int tls_result = tls_close(ctx);
-    if (tcp_is_udp(ctx) && soap_socket_open(ctx))
+    if ((tcp_is_udp(ctx) || context_shares_socket(ctx)) && soap_socket_open(ctx))
         return tls_result;
     if (tls_result == 0 && soap_socket_open(ctx) && ctx->on_shutdown_socket)
         ctx->on_shutdown_socket(ctx, ctx->socket, SHUT_RDWR);
@@ -96,7 +120,7 @@ int tcp_peek(soap *ctx)
     return tls_active(ctx) ? tls_peek(ctx) : -1;
 }
 
-int soap_socket_release(soap *ctx)
+int tcp_release(soap *ctx)
 {
     const int error = ctx->error;
     if (error != 0)
@@ -109,9 +133,18 @@ int soap_socket_release(soap *ctx)
         closed = ctx->on_close ? ctx->on_close(ctx) : 0;
         ctx->keep_alive = 0;
         ctx->response_unfinished = false;
+        ctx->route.known = false;
     }
     end_compression(ctx);
     return ctx->error = closed != 0 ? closed : error;
+}
+
+int soap_socket_release(soap *ctx)
+{
+    const int result = tcp_release(ctx);
+    if (!reads_on(ctx))
+        ctx->call_deadline = 0;
+    return result;
 }
 
 int soap_force_close(soap *ctx)
@@ -120,6 +153,8 @@ int soap_force_close(soap *ctx)
     if (!soap_socket_open(ctx))
         return 0;
     ctx->socket_abandoned = true;
+    if (context_shares_socket(ctx))
+        return 0;
     if (ctx->master_socket == ctx->socket) // a UDP service has one socket in both fields
         ctx->master_socket = -1;
     return close(ctx->socket);

@@ -1,5 +1,5 @@
 // tcp_connect.cpp - opens the connection of an exchange: resolve, walk the addresses, set options, connect in
-// time.
+// time. The resolver alone keeps to its own time limits: nothing here can end it.
 //
 // Elsewhere: the tunnel through a proxy (tcp_tunnel.cpp), TLS (tls_handshake.cpp).
 #include <cerrno>
@@ -14,6 +14,7 @@
 
 #include "transport/tcp_socket.h"
 #include "transport/tcp_tunnel.h"
+#include "transport/tcp_wait.h"
 #include "transport/tls_connection.h"
 
 namespace {
@@ -80,11 +81,17 @@ const char *set_multicast_options(const soap *ctx, int socket, addrinfo *address
                   "setsockopt IP_MULTICAST_IF failed in tcp_connect()"}});
 }
 
+// Connecting has a time limit, of its own or that of the call.
+bool is_limited(const soap *ctx)
+{
+    return ctx->connect_timeout != 0 || ctx->call_deadline != 0;
+}
+
 // A socket for the address with all options set, or -1 with a fault; *made tells whether there was a socket
 // at all.
 int open_socket(soap *ctx, addrinfo *address, bool *made)
 {
-    const int mode = SOCK_CLOEXEC | (!tcp_is_udp(ctx) && ctx->connect_timeout != 0 ? SOCK_NONBLOCK : 0);
+    const int mode = SOCK_CLOEXEC | (!tcp_is_udp(ctx) && is_limited(ctx) ? SOCK_NONBLOCK : 0);
     const int fresh = socket(address->ai_family, address->ai_socktype | mode, address->ai_protocol);
     ctx->error_mode = 0;
     *made = fresh >= 0;
@@ -103,73 +110,78 @@ int open_socket(soap *ctx, addrinfo *address, bool *made)
     return tcp_fail(ctx, fresh, failure);
 }
 
-// Waits for a connection under way. 0, or -1 with a fault; closes the socket then.
-int await_connection(soap *ctx, int socket)
+enum class attempt { connected, address_in_use, refused, refused_late, out_of_time };
+
+// Waits for a connection under way.
+attempt await_connection(soap *ctx, int socket)
 {
-    int ready;
-    do
-        ready = tcp_wait(ctx, socket, WAIT_SEND, ctx->connect_timeout);
-    while (ready < 0 && ctx->errno_value == EINTR);
-    if (ready == 0)
-        return tcp_fail(ctx, socket, "connect failed in tcp_connect()", "Timeout");
-    if (ready < 0)
-        return tcp_fail(ctx, socket, "connect failed in tcp_connect()");
+    const int ready = tcp_wait_until(ctx, socket, WAIT_SEND, tcp_deadline_of(ctx, ctx->connect_timeout));
+    if (ready <= 0)
+        return ready == 0 ? attempt::out_of_time : attempt::refused_late;
     socklen_t size = sizeof ctx->errno_value;
     if (getsockopt(socket, SOL_SOCKET, SO_ERROR, &ctx->errno_value, &size) == 0 && ctx->errno_value == 0)
-        return 0;
+        return attempt::connected;
     if (ctx->errno_value == 0)
         tcp_save_errno(ctx);
-    return tcp_fail(ctx, socket, "connect failed in tcp_connect()");
+    return attempt::refused_late;
 }
 
-enum class attempt { connected, pending, address_in_use, refused };
-
-attempt try_connect(const soap *ctx, int socket, const addrinfo *address)
+attempt try_connect(soap *ctx, int socket, const addrinfo *address)
 {
-    for (;;) {
+    int result;
+    do {
         errno = 0;
-        if (connect(socket, address->ai_addr, address->ai_addrlen) == 0)
-            return attempt::connected;
-        if (errno == EADDRINUSE)
-            return attempt::address_in_use;
-        if (ctx->connect_timeout != 0 && (errno == EINPROGRESS || errno == EAGAIN))
-            return attempt::pending;
-        if (address->ai_next || (errno != 0 && errno != EINTR))
-            return attempt::refused;
-    }
+        result = connect(socket, address->ai_addr, address->ai_addrlen);
+    } while (result != 0 && (errno == 0 || errno == EINTR)); // goes on with the attempt under way
+    tcp_save_errno(ctx);
+    if (result == 0)
+        return attempt::connected;
+    if (is_limited(ctx) && (errno == EINPROGRESS || errno == EAGAIN))
+        return await_connection(ctx, socket);
+    return errno == EADDRINUSE ? attempt::address_in_use : attempt::refused;
 }
 
-// Connects to the first address of the list that answers. The socket, or -1 with a fault.
+// The next address won't be tried.
+bool is_final(soap *ctx, attempt outcome)
+{
+    const bool late = outcome == attempt::refused_late || outcome == attempt::out_of_time;
+    return tcp_call_is_over(ctx) || (late && (ctx->legacy & LEGACY_FIRST_ADDRESS) != 0);
+}
+
+// Connects to the first address of the list that answers. The socket, or -1 with the fault of the last one
+// tried.
 int connect_to_list(soap *ctx, addrinfo *address)
 {
     int reuse_tries = ADDRESS_IN_USE_TRIES;
-    while (address) {
+    for (;;) {
         bool made;
         const int socket = open_socket(ctx, address, &made);
-        if (!made) {
-            address = address->ai_next;
-            if (!address)
-                return tcp_fail(ctx, -1, "socket failed in tcp_connect()");
-            continue;
-        }
-        if (socket < 0)
+        if (made && socket < 0)
             return -1;
-        const attempt outcome = try_connect(ctx, socket, address);
-        tcp_save_errno(ctx);
+        const attempt outcome = made ? try_connect(ctx, socket, address) : attempt::refused;
         if (outcome == attempt::connected)
             return socket;
-        if (outcome == attempt::pending)
-            return await_connection(ctx, socket) == 0 ? socket : -1;
-        const bool same_again = outcome == attempt::address_in_use && --reuse_tries > 0;
-        if (!same_again && !address->ai_next)
-            return tcp_fail(ctx, socket, "connect failed in tcp_connect()");
-        tcp_close_through_hook(ctx, socket);
-        if (!same_again) {
-            address = address->ai_next;
-            reuse_tries = ADDRESS_IN_USE_TRIES;
+        if (outcome == attempt::address_in_use && --reuse_tries > 0) {
+            tcp_close_through_hook(ctx, socket);
+            continue;
         }
+        if (!address->ai_next || is_final(ctx, outcome))
+            return tcp_fail(ctx, socket,
+                            made ? "connect failed in tcp_connect()" : "socket failed in tcp_connect()",
+                            outcome == attempt::out_of_time ? tcp_timeout_text(ctx) : nullptr);
+        tcp_close_through_hook(ctx, socket);
+        address = address->ai_next;
+        reuse_tries = ADDRESS_IN_USE_TRIES;
     }
-    return -1; // a list is never empty
+}
+
+// Answers come from the address asked; from any if the datagram goes to many.
+bool asks_one_host(const soap *ctx, const addrinfo *address)
+{
+    if (address->ai_family == AF_INET6)
+        return !IN6_IS_ADDR_MULTICAST(&reinterpret_cast<const sockaddr_in6 *>(address->ai_addr)->sin6_addr);
+    const in_addr_t host = ntohl(reinterpret_cast<const sockaddr_in *>(address->ai_addr)->sin_addr.s_addr);
+    return !IN_MULTICAST(host) && ctx->connect_flags != SO_BROADCAST;
 }
 
 int open_datagram_socket(soap *ctx, addrinfo *address)
@@ -181,10 +193,25 @@ int open_datagram_socket(soap *ctx, addrinfo *address)
             return -1;
         if (made) {
             tcp_keep_peer(ctx, address);
+            ctx->peer_fixed = asks_one_host(ctx, address);
             return socket;
         }
     }
     return tcp_fail(ctx, -1, "socket failed in tcp_connect()");
+}
+
+// The proxy has connect_timeout to answer, as a whole and counted anew. 0, or -1 with ctx->error.
+int open_tunnel(soap *ctx, const char *endpoint, const char *host, int port)
+{
+    const tcp_deadline call = ctx->call_deadline;
+    ctx->call_deadline = tcp_deadline_of(ctx, ctx->connect_timeout);
+    const int error = tcp_open_tunnel(ctx, endpoint, host, port);
+    const bool late = error == SOAP_EOF && ctx->call_expired;
+    ctx->call_deadline = call;
+    tcp_call_is_over(ctx); // if so, that is what the fault tells
+    if (late)
+        return tcp_fail(ctx, -1, "CONNECT failed in tcp_connect()", tcp_timeout_text(ctx));
+    return error == 0 ? 0 : -1;
 }
 
 } // namespace
@@ -208,7 +235,7 @@ int tcp_connect(soap *ctx, const char *endpoint, const char *host, int port)
     ctx->output_mode &= ~MODE_TLS;
     if (!endpoint || soap_tag_match(endpoint, "https:*") != 0) {
         tls_discard(ctx);
-    } else if ((ctx->proxy_host && tcp_open_tunnel(ctx, endpoint, host, port) != 0) ||
+    } else if ((ctx->proxy_host && open_tunnel(ctx, endpoint, host, port) != 0) ||
                tls_connect(ctx, host, port) != 0) {
         tcp_drop_socket(ctx);
         return -1;

@@ -11,11 +11,10 @@
 #include <zuv_client_pro/soap_tcp.h>
 
 #include "transport/tcp_socket.h"
+#include "transport/tcp_wait.h"
 #include "transport/tls_connection.h"
 
 namespace {
-
-constexpr int ACCEPT_WAIT_S = 60; // one round of waiting for a client without an accept_timeout, seconds
 
 bool asks_keep_alive(const soap *ctx)
 {
@@ -24,10 +23,11 @@ bool asks_keep_alive(const soap *ctx)
 
 void close_master(soap *ctx)
 {
-    const int master = ctx->master_socket;
-    if (master != -1 && master == ctx->socket)
+    const int master = ctx->master_shared ? -1 : ctx->master_socket;
+    if (ctx->master_socket != -1 && ctx->master_socket == ctx->socket)
         ctx->socket = -1;
     ctx->master_socket = -1;
+    ctx->master_shared = false;
     tcp_close_through_hook(ctx, master);
 }
 
@@ -55,26 +55,27 @@ const char *prepare_listener(const soap *ctx, int socket, const addrinfo *addres
     return nullptr;
 }
 
+// The connection is a client's who came here: a copy of the context may serve it.
+void store_accepted(soap *ctx, int socket)
+{
+    tcp_store_socket(ctx, socket);
+    ctx->socket_accepted = true;
+}
+
 int fail_accept(soap *ctx, const char *text = nullptr)
 {
     return tcp_fail(ctx, -1, "accept failed in soap_accept()", text);
 }
 
 // Waits for a client if any time limit is set. 0, or -1 with a fault.
-int await_client(soap *ctx)
+int await_client(soap *ctx, tcp_deadline deadline)
 {
     if (ctx->accept_timeout == 0 && ctx->recv_timeout == 0 && ctx->send_timeout == 0)
         return 0;
-    const int limit = ctx->accept_timeout != 0 ? ctx->accept_timeout : ACCEPT_WAIT_S;
-    for (;;) {
-        const int ready = tcp_wait(ctx, ctx->master_socket, WAIT_ALL, limit);
-        if (ready > 0)
-            return 0;
-        if (ready == 0 && ctx->accept_timeout != 0)
-            return fail_accept(ctx, "Timeout");
-        if (ready < 0 && ctx->errno_value != EINTR)
-            return fail_accept(ctx);
-    }
+    const int ready = tcp_wait_until(ctx, ctx->master_socket, WAIT_ALL, deadline);
+    if (ready == 0)
+        return fail_accept(ctx, "Timeout");
+    return ready < 0 ? fail_accept(ctx) : 0;
 }
 
 // host, port and peer_address take the client's.
@@ -118,8 +119,9 @@ const char *set_client_options(const soap *ctx, int socket)
 // The next client's socket, or -1 with a fault.
 int accept_client(soap *ctx)
 {
+    const tcp_deadline deadline = tcp_deadline_of(ctx, ctx->accept_timeout);
     for (;;) {
-        if (await_client(ctx) != 0)
+        if (await_client(ctx, deadline) != 0)
             return -1;
         int length = sizeof ctx->peer;
         errno = ctx->on_accept ? 0 : ENOSYS;
@@ -133,6 +135,8 @@ int accept_client(soap *ctx)
         tcp_save_errno(ctx);
         if (ctx->errno_value != EINTR && ctx->errno_value != EAGAIN)
             return fail_accept(ctx);
+        if (tcp_is_over(ctx, deadline)) // clients that come and go
+            return fail_accept(ctx, "Timeout");
     }
 }
 
@@ -160,8 +164,9 @@ int soap_bind(soap *ctx, const char *host, int port, int backlog)
         return tcp_fail(ctx, master, failure);
     }
     ctx->master_socket = master;
+    ctx->peer_fixed = false;
     if (tcp_is_udp(ctx))
-        tcp_store_socket(ctx, master);
+        store_accepted(ctx, master);
     return master;
 }
 
@@ -171,10 +176,12 @@ int soap_accept(soap *ctx)
     ctx->errno_value = 0;
     tls_detach(ctx); // a former client's; its socket may serve a copy of this context by now
     ctx->socket = -1;
+    ctx->call_deadline = 0; // of a call that this context made
+    ctx->call_expired = false;
     if (ctx->master_socket == -1)
         return tcp_fail(ctx, -1, "no master socket in soap_accept()");
     if (tcp_is_udp(ctx)) {
-        tcp_store_socket(ctx, ctx->master_socket);
+        store_accepted(ctx, ctx->master_socket);
         return ctx->socket;
     }
     tcp_set_blocking(ctx->master_socket, ctx->accept_timeout == 0);
@@ -188,6 +195,6 @@ int soap_accept(soap *ctx)
     }
     ctx->keep_alive = asks_keep_alive(ctx) ? 1 : 0;
     tcp_settle_blocking(ctx, client);
-    tcp_store_socket(ctx, client);
+    store_accepted(ctx, client);
     return client;
 }

@@ -1,101 +1,27 @@
-// tcp_socket.cpp - one socket: wait for it, set its options and mode, close it, put its errors into words.
+// tcp_socket.cpp - one socket: set its options and mode, close it, put its errors into words.
 //
-// Elsewhere: how it comes to be (tcp_connect.cpp, tcp_server.cpp), its bytes (tcp_transfer.cpp), the end of a
-// connection and of a transaction (tcp_close.cpp).
+// Elsewhere: waiting for it (tcp_wait.cpp), how it comes to be (tcp_connect.cpp, tcp_server.cpp), its bytes
+// (tcp_transfer.cpp), the end of a connection and of a transaction (tcp_close.cpp).
 #include "transport/tcp_socket.h"
 
 #include <cerrno>
-#include <cstdint>
 #include <cstdio>
 #include <cstring>
 #include <fcntl.h>
-#include <pthread.h>
 #include <sys/select.h>
 #include <unistd.h>
 
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_tcp.h>
 
+#include "engine/context_state.h"
 #include "transport/tls_connection.h"
 
 namespace {
 
 constexpr int PORT_MAX = 65535;
-constexpr long MICROSECONDS = 1000000; // in a second
-
-timeval time_limit(int timeout)
-{
-    const long limit = timeout;
-    timeval value{};
-    value.tv_sec = limit >= 0 ? limit : -limit / MICROSECONDS;
-    value.tv_usec = limit >= 0 ? 0 : -limit % MICROSECONDS;
-    return value;
-}
-
-// One set of a select call: null for a way that nobody asked about.
-class wait_set {
-public:
-    wait_set(bool wanted, int socket) : wanted_(wanted), socket_(socket)
-    {
-        FD_ZERO(&set_);
-        if (wanted_)
-            FD_SET(socket_, &set_);
-    }
-    fd_set *get() { return wanted_ ? &set_ : nullptr; }
-    bool ready() const { return wanted_ && FD_ISSET(socket_, &set_); }
-
-private:
-    bool wanted_;
-    int socket_;
-    fd_set set_;
-};
-
-std::uint16_t process = 1;
-
-void note_fork()
-{
-    process = process == UINT16_MAX ? 1 : static_cast<std::uint16_t>(process + 1);
-}
 
 } // namespace
-
-// Counted by forks and not asked of the system, which would be a call for each use of a kept connection.
-// Forks before the first connection don't matter, so they go uncounted.
-std::uint16_t tcp_process()
-{
-    static const int counting = pthread_atfork(nullptr, nullptr, note_fork);
-    static_cast<void>(counting); // with no memory for the hook a fork goes unnoticed, as it would without it
-    return process;
-}
-
-bool tcp_inherited(const soap *ctx)
-{
-    return ctx->opened_by != 0 && ctx->opened_by != process;
-}
-
-int tcp_wait(soap *ctx, int socket, int flags, int timeout)
-{
-    ctx->errno_value = 0;
-    if (socket >= FD_SETSIZE) {
-        ctx->error = SOAP_FD_EXCEEDED;
-        return -1;
-    }
-    if (socket < 0) {
-        ctx->errno_value = EBADF;
-        return -1;
-    }
-    wait_set readable((flags & WAIT_RECV) != 0, socket);
-    wait_set writable((flags & WAIT_SEND) != 0, socket);
-    wait_set exceptional((flags & WAIT_ERROR) != 0, socket);
-    timeval limit = time_limit(timeout);
-    const int count = select(socket + 1, readable.get(), writable.get(), exceptional.get(), &limit);
-    if (count < 0)
-        tcp_save_errno(ctx);
-    if (count <= 0)
-        return count;
-    return (readable.ready() ? WAIT_RECV : 0) | (writable.ready() ? WAIT_SEND : 0) |
-           (exceptional.ready() ? WAIT_ERROR : 0);
-}
 
 tcp_address_list tcp_resolve(soap *ctx, const char *host, int port, int flags, const char *failure)
 {
@@ -105,6 +31,7 @@ tcp_address_list tcp_resolve(soap *ctx, const char *host, int port, int flags, c
     char service[16];
     std::snprintf(service, sizeof service, "%d", port);
     ctx->errno_value = 0;
+    ctx->call_expired = false;
     ctx->error_mode = 2;
     addrinfo *list = nullptr;
     // The resolver itself would take a larger number modulo 65536.
@@ -128,17 +55,19 @@ void tcp_store_socket(soap *ctx, int socket)
     ctx->socket = socket;
     ctx->socket_abandoned = false;
     ctx->opened_by = 0;
+    ctx->socket_accepted = false;
     ctx->response_unfinished = false;
+    ctx->route.known = false;
 }
 
 void tcp_drop_socket(soap *ctx)
 {
-    const int open_socket = soap_socket_open(ctx) ? ctx->socket : -1;
+    const bool is_own = soap_socket_open(ctx) && !context_shares_socket(ctx);
+    const int open_socket = is_own ? ctx->socket : -1;
     if (open_socket == ctx->master_socket) // a UDP service has one socket in both fields
         ctx->master_socket = -1;
     tls_detach(ctx);
-    ctx->socket = -1;
-    ctx->socket_abandoned = false;
+    tcp_store_socket(ctx, -1);
     tcp_close_through_hook(ctx, open_socket);
 }
 
@@ -158,7 +87,7 @@ void tcp_set_blocking(int socket, bool blocking)
 
 void tcp_settle_blocking(const soap *ctx, int socket)
 {
-    tcp_set_blocking(socket, ctx->recv_timeout == 0 && ctx->send_timeout == 0);
+    tcp_set_blocking(socket, ctx->recv_timeout == 0 && ctx->send_timeout == 0 && ctx->call_timeout == 0);
 }
 
 void tcp_save_errno(soap *ctx)

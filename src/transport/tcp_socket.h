@@ -50,13 +50,17 @@ void tcp_store_socket(soap *ctx, int socket);
 // Closes ctx->socket through on_close_socket if it is open, takes TLS off it, and leaves -1.
 void tcp_drop_socket(soap *ctx);
 
+// soap_socket_release in the midst of a call, whose time goes on.
+int tcp_release(soap *ctx);
+
 // Closes a descriptor that is not, or no longer, in ctx->socket; -1 is ignored.
 void tcp_close_through_hook(soap *ctx, int socket);
 
 // Sets or clears O_NONBLOCK; costs a second system call only if that changes anything.
 void tcp_set_blocking(int socket, bool blocking);
 
-// Final mode of a connected or accepted socket: blocking unless a transfer has a time limit.
+// Final mode of a connected or accepted socket: blocking unless a transfer has a time limit. The library's
+// own transfers don't depend on it: under a limit each is asked not to block.
 void tcp_settle_blocking(const soap *ctx, int socket);
 
 // errno_value takes errno.

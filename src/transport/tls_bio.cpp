@@ -12,6 +12,7 @@
 #include <openssl/crypto.h>
 
 #include "transport/tcp_socket.h"
+#include "transport/tcp_wait.h"
 #include "transport/tls_connection.h"
 
 namespace {
@@ -31,6 +32,16 @@ int transfer_flags(const bio_state *state)
     return state->ctx->socket_flags | MSG_NOSIGNAL | (state->nonblocking ? MSG_DONTWAIT : 0);
 }
 
+// Gives control back once the call's time is up: a peer that sends messages of the protocol itself without
+// end would keep OpenSSL from ever returning.
+bool is_held_up(const bio_state *state)
+{
+    if (!tcp_call_is_over(state->ctx))
+        return false;
+    errno = EAGAIN;
+    return true;
+}
+
 bool retry_helps(ssize_t count)
 {
     return count < 0 && (errno == EAGAIN || errno == EINTR);
@@ -44,8 +55,9 @@ int bio_write(BIO *bio, const char *data, int length)
         errno = EBADF;
         return -1;
     }
-    const ssize_t sent =
-        send(state->ctx->socket, data, static_cast<std::size_t>(length), transfer_flags(state));
+    const ssize_t sent = is_held_up(state) ? -1
+                                           : send(state->ctx->socket, data, static_cast<std::size_t>(length),
+                                                  transfer_flags(state));
     if (retry_helps(sent))
         BIO_set_retry_write(bio);
     return static_cast<int>(sent);
@@ -60,7 +72,9 @@ int bio_read(BIO *bio, char *buffer, int length)
         return -1;
     }
     const ssize_t received =
-        recv(state->ctx->socket, buffer, static_cast<std::size_t>(length), transfer_flags(state));
+        is_held_up(state)
+            ? -1
+            : recv(state->ctx->socket, buffer, static_cast<std::size_t>(length), transfer_flags(state));
     if (retry_helps(received))
         BIO_set_retry_read(bio);
     return static_cast<int>(received);

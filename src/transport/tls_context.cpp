@@ -14,6 +14,7 @@
 #include <openssl/ssl.h>
 
 #include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_tls.h>
 
 #include "transport/tls_connection.h"
@@ -160,6 +161,9 @@ void set_protocol_options(const soap *ctx, SSL_CTX *context)
         SSL_CTX_set_options(context, SSL_OP_NO_SSLv3);
     if (has_flag(ctx, TLS_NO_TLSV1))
         SSL_CTX_set_options(context, SSL_OP_NO_TLSv1);
+    // Whatever OpenSSL's security level and configuration would allow. A stricter one of theirs stays.
+    if (SSL_CTX_get_min_proto_version(context) < TLS1_2_VERSION)
+        SSL_CTX_set_min_proto_version(context, TLS1_2_VERSION);
 }
 
 void set_verification(const soap *ctx, SSL_CTX *context)
@@ -193,13 +197,22 @@ int fail_setup(soap *ctx, const char *detail)
     return soap_fault_receiver(ctx, "SSL/TLS error", detail, SOAP_TLS_ERROR);
 }
 
-// New rules are in force from here on: nothing that was made or accepted under the old ones may bypass them.
+// New rules are in force from here on: nothing that was made or accepted under the old ones may bypass them,
+// and a set-up that fails doesn't leave them in force.
 void forget_former_rules(soap *ctx)
 {
-    SSL_SESSION_free(ctx->tls_session);
-    ctx->tls_session = nullptr;
-    if (!tls_active(ctx))
+    if (tls_active(ctx)) {
+        const int error = ctx->error;
+        ctx->error = SOAP_OK;
+        ctx->keep_alive = 0;
+        soap_socket_release(ctx);
+        ctx->error = error;
+    } else {
         tls_discard(ctx);
+    }
+    tls_session_drop(ctx); // also the one that the connection has left
+    SSL_CTX_free(ctx->tls_context);
+    ctx->tls_context = nullptr;
 }
 
 void store_files(soap *ctx, const char *key_file, const char *password, const char *ca_file,
@@ -247,21 +260,21 @@ int soap_ssl_server_context(soap *ctx, std::uint16_t flags, const char *key_file
     if (SSL_CTX_set_session_id_context(ctx->tls_context, reinterpret_cast<const unsigned char *>(session_id),
                                        static_cast<unsigned>(std::strlen(session_id))) == 1)
         return 0;
+    forget_former_rules(ctx);
     return fail_setup(ctx, "Can't set session id");
 }
 
 int tls_context_setup(soap *ctx)
 {
     tls_global_init();
+    forget_former_rules(ctx);
     ERR_clear_error();
-    tls_context_owner fresh(ctx->tls_context ? nullptr : SSL_CTX_new(TLS_method()));
-    SSL_CTX *context = ctx->tls_context ? ctx->tls_context : fresh.get();
-    if (!context)
+    tls_context_owner fresh(SSL_CTX_new(TLS_method()));
+    if (!fresh)
         return fail_setup(ctx, "Can't setup context");
-    if (const char *failure = set_up(ctx, context))
+    if (const char *failure = set_up(ctx, fresh.get()))
         return fail_setup(ctx, failure);
-    ctx->tls_context = context;
-    static_cast<void>(fresh.release());
+    ctx->tls_context = fresh.release();
     return 0;
 }
 

@@ -2,8 +2,7 @@
 //
 // Elsewhere: what the SSL_CTX allows (tls_context.cpp), who the peer is (tls_verify.cpp).
 //
-// Always: a time limit counts in rounds of a tenth of a second in which the peer stays silent.
-#include <arpa/inet.h>
+// Always: a handshake as a whole has a time limit, and the socket's mode doesn't matter to it.
 #include <cerrno>
 
 #include <openssl/err.h>
@@ -15,20 +14,14 @@
 #include <zuv_client_pro/soap_tls.h>
 
 #include "transport/tcp_socket.h"
+#include "transport/tcp_wait.h"
 #include "transport/tls_connection.h"
 
 namespace {
 
-constexpr int ROUND_US = -100000; // as a time limit: microseconds
-constexpr long ROUNDS_IN_SECOND = 10;
-constexpr long DEFAULT_ROUNDS = 100;
+constexpr int HANDSHAKE_S = 10; // time limit where the host sets none, seconds
 
 enum class handshake { done, refused, wait_failed, out_of_time };
-
-long rounds_of(int timeout)
-{
-    return timeout > 0 ? timeout * ROUNDS_IN_SECOND : DEFAULT_ROUNDS;
-}
 
 int wait_flag(const SSL *ssl, int result)
 {
@@ -45,9 +38,10 @@ int wait_flag(const SSL *ssl, int result)
 }
 
 // Runs SSL_connect or SSL_accept to its end. *result is what it returned last.
-handshake run_handshake(soap *ctx, int (*step)(SSL *), int timeout, int *result)
+handshake take_steps(soap *ctx, int (*step)(SSL *), int timeout, int *result)
 {
-    long rounds = rounds_of(timeout);
+    const tcp_deadline deadline = tcp_deadline_of(ctx, timeout != 0 ? timeout : HANDSHAKE_S);
+    tls_bio_set_nonblocking(SSL_get_rbio(ctx->tls_connection), true);
     for (;;) {
         ERR_clear_error();
         errno = 0;
@@ -58,19 +52,28 @@ handshake run_handshake(soap *ctx, int (*step)(SSL *), int timeout, int *result)
         const int flag = wait_flag(ctx->tls_connection, *result);
         if (flag == 0)
             return handshake::refused;
-        const int ready = tcp_wait(ctx, ctx->socket, flag | WAIT_ERROR, ROUND_US);
-        if (ready < 0 && ctx->errno_value != EINTR)
+        const int ready = tcp_wait_until(ctx, ctx->socket, flag | WAIT_ERROR, deadline);
+        if (ready < 0)
             return handshake::wait_failed;
-        if (ready == 0 && rounds-- < 1)
+        if (ready == 0 || tcp_is_over(ctx, deadline))
             return handshake::out_of_time;
     }
+}
+
+// The same; `verdict` takes what becomes of the peer's certificates.
+handshake run_handshake(soap *ctx, int (*step)(SSL *), int timeout, int *result, tls_verdict *verdict)
+{
+    tls_watch_verdict(ctx, verdict);
+    const handshake outcome = take_steps(ctx, step, timeout, result);
+    tls_watch_verdict(ctx, nullptr);
+    return outcome;
 }
 
 // An SSL without contents of its own, new or from an earlier connection. 0, or -1 if there is none to be had.
 int renew_connection(soap *ctx)
 {
     tls_detach(ctx);
-    if (ctx->tls_connection && SSL_clear(ctx->tls_connection) == 1 &&
+    if (tls_has_own_rules(ctx) && SSL_clear(ctx->tls_connection) == 1 &&
         SSL_set_session(ctx->tls_connection, nullptr) == 1)
         return 0;
     SSL_free(ctx->tls_connection);
@@ -104,20 +107,21 @@ int ensure_context(soap *ctx)
 // Servers of many names choose their certificate by it. Addresses are no names.
 int name_server(SSL *ssl, const char *host)
 {
-    unsigned char address[sizeof(in6_addr)];
-    const bool named =
-        *host != '\0' && inet_pton(AF_INET, host, address) != 1 && inet_pton(AF_INET6, host, address) != 1;
+    unsigned char address[16];
+    const bool named = *host != '\0' && tls_address_of(host, address) == 0;
     return static_cast<int>(SSL_set_tlsext_host_name(ssl, const_cast<char *>(named ? host : nullptr)));
 }
 
-int fail_connect(soap *ctx, handshake outcome, int result)
+int fail_connect(soap *ctx, handshake outcome, int result, const tls_verdict &verdict)
 {
     if (outcome == handshake::refused)
-        soap_fault_sender(ctx, tls_error_text(ctx, result), "SSL_connect error in tcp_connect()",
+        soap_fault_sender(ctx, tls_error_text(ctx, result),
+                          tls_with_reason(ctx, "SSL_connect error in tcp_connect()", verdict),
                           SOAP_TLS_ERROR);
     else
-        soap_fault_sender(ctx, outcome == handshake::out_of_time ? "Timeout" : tls_error_text(ctx, result),
-                          "SSL_connect failed in tcp_connect()", SOAP_TCP_ERROR);
+        soap_fault_sender(
+            ctx, outcome == handshake::out_of_time ? tcp_timeout_text(ctx) : tls_error_text(ctx, result),
+            "SSL_connect failed in tcp_connect()", SOAP_TCP_ERROR);
     return -1;
 }
 
@@ -163,11 +167,11 @@ int tls_connect(soap *ctx, const char *host, int port)
     if (name_server(ctx->tls_connection, host) != 1 || attach(ctx) != 0)
         return lack_of_memory(ctx);
     SSL_set_connect_state(ctx->tls_connection);
-    tcp_set_blocking(ctx->socket, ctx->connect_timeout == 0);
     int result;
-    const handshake outcome = run_handshake(ctx, SSL_connect, ctx->connect_timeout, &result);
+    tls_verdict verdict;
+    const handshake outcome = run_handshake(ctx, SSL_connect, ctx->connect_timeout, &result, &verdict);
     if (outcome != handshake::done)
-        return fail_connect(ctx, outcome, result);
+        return fail_connect(ctx, outcome, result, verdict);
     if ((ctx->tls_flags & TLS_VERIFY_PEER) == 0)
         return 0;
     return tls_check_peer(ctx, host) == 0 ? 0 : -1;
@@ -188,11 +192,12 @@ int soap_ssl_accept(soap *ctx)
                                    SOAP_TLS_ERROR);
     }
     SSL_set_accept_state(ctx->tls_connection);
-    tcp_set_blocking(ctx->socket, ctx->accept_timeout == 0);
     int result;
-    const handshake outcome = run_handshake(ctx, SSL_accept, ctx->accept_timeout, &result);
+    tls_verdict verdict;
+    const handshake outcome = run_handshake(ctx, SSL_accept, ctx->accept_timeout, &result, &verdict);
     if (outcome != handshake::done)
-        return fail_accept(ctx, "SSL_accept() failed in soap_ssl_accept()", tls_error_text(ctx, result));
+        return fail_accept(ctx, tls_with_reason(ctx, "SSL_accept() failed in soap_ssl_accept()", verdict),
+                           outcome == handshake::out_of_time ? "Timeout" : tls_error_text(ctx, result));
     if ((ctx->tls_flags & TLS_REQUIRE_CLIENT_CERT) != 0)
         if (const int error = check_client(ctx))
             return error;

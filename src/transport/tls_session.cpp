@@ -1,8 +1,8 @@
 // tls_session.cpp - what connects one TLS connection with the next: sessions, and the orderly end.
 //
 // Always: the kept session belongs to session_host and session_port, which are noted when its connection is
-// made: at its end the context may already hold another host. A session is offered once, and to its own host
-// only.
+// made: at its end the context may already hold another host. A session is offered once, to its own host
+// only, and under the rules that it was made under: a peer that is resumed is not verified again.
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
@@ -14,23 +14,26 @@
 #include <zuv_client_pro/soap_tcp.h>
 
 #include "transport/tcp_socket.h"
+#include "transport/tcp_wait.h"
 #include "transport/tls_connection.h"
 
 namespace {
 
-constexpr int CLOSE_WAIT_S = 5; // wait for the peer's end after ours, seconds
+constexpr int CLOSE_WAIT_S = 5; // wait for the peer's end after ours under LEGACY_CLOSE_WAIT, seconds
 
 void keep_session(soap *ctx)
 {
-    SSL_SESSION_free(ctx->tls_session);
-    ctx->tls_session = nullptr;
+    tls_session_drop(ctx);
     if (SSL_is_server(ctx->tls_connection) || ctx->session_host[0] == '\0')
         return;
     SSL_SESSION *session = SSL_get1_session(ctx->tls_connection);
-    if (session && SSL_SESSION_is_resumable(session))
-        ctx->tls_session = session;
-    else
+    if (!session || !SSL_SESSION_is_resumable(session)) {
         SSL_SESSION_free(session);
+        return;
+    }
+    ctx->tls_session = session;
+    ctx->session_rules = SSL_get_SSL_CTX(ctx->tls_connection);
+    SSL_CTX_up_ref(ctx->session_rules);
 }
 
 // Our closing alert is out, the peer's hasn't been seen: looks for it among what has arrived. Data that
@@ -53,7 +56,8 @@ void half_close(soap *ctx)
 {
     if (!ctx->on_shutdown_socket || ctx->on_shutdown_socket(ctx, ctx->socket, SHUT_WR) != 0)
         return;
-    if (tcp_wait(ctx, ctx->socket, WAIT_RECV | WAIT_ERROR, CLOSE_WAIT_S) < 0 && ctx->errno_value != EINTR) {
+    const tcp_deadline deadline = tcp_deadline_of(ctx, CLOSE_WAIT_S);
+    if (tcp_wait_until(ctx, ctx->socket, WAIT_RECV | WAIT_ERROR, deadline) < 0) {
         ctx->errno_value = 0;
         tcp_drop_socket(ctx);
     }
@@ -61,12 +65,20 @@ void half_close(soap *ctx)
 
 } // namespace
 
-void tls_session_offer(soap *ctx, const char *host, int port)
+void tls_session_drop(soap *ctx)
 {
-    if (ctx->tls_session && ctx->session_port == port && std::strcmp(ctx->session_host, host) == 0)
-        SSL_set_session(ctx->tls_connection, ctx->tls_session);
     SSL_SESSION_free(ctx->tls_session);
     ctx->tls_session = nullptr;
+    SSL_CTX_free(ctx->session_rules);
+    ctx->session_rules = nullptr;
+}
+
+void tls_session_offer(soap *ctx, const char *host, int port)
+{
+    if (ctx->tls_session && ctx->session_rules == ctx->tls_context && ctx->session_port == port &&
+        std::strcmp(ctx->session_host, host) == 0)
+        SSL_set_session(ctx->tls_connection, ctx->tls_session);
+    tls_session_drop(ctx);
     std::snprintf(ctx->session_host, sizeof ctx->session_host, "%s", host);
     ctx->session_port = port;
 }
@@ -84,7 +96,7 @@ int tls_close(soap *ctx)
     int finished = SSL_shutdown(ssl);
     if (finished == 0)
         finished = look_for_peer_alert(ssl);
-    if (finished == 0)
+    if (finished == 0 && (ctx->legacy & LEGACY_CLOSE_WAIT) != 0)
         half_close(ctx);
     const bool failed = finished != 1 && ERR_peek_error() != 0;
     ERR_clear_error();

@@ -81,22 +81,44 @@ bool tls_active(const soap *ctx)
     return ctx->tls_connection && SSL_get_rbio(ctx->tls_connection);
 }
 
-int tls_write(soap *ctx, const char *data, std::size_t length, int *wait_for)
+bool tls_established(const soap *ctx)
+{
+    return tls_active(ctx) && SSL_is_init_finished(ctx->tls_connection);
+}
+
+bool tls_has_own_rules(const soap *ctx)
+{
+    return ctx->tls_connection && SSL_get_SSL_CTX(ctx->tls_connection) == ctx->tls_context;
+}
+
+int tls_write(soap *ctx, const char *data, std::size_t length, bool limited, int *wait_for)
 {
     ERR_clear_error();
+    tls_bio_set_nonblocking(SSL_get_wbio(ctx->tls_connection), limited);
     errno = 0;
     const int result = SSL_write(ctx->tls_connection, data, capped(length));
     *wait_for = result > 0 ? 0 : wait_flag(ctx->tls_connection, result);
     return result;
 }
 
-int tls_read(soap *ctx, char *buffer, std::size_t length, int *wait_for)
+int tls_read(soap *ctx, char *buffer, std::size_t length, bool limited, int *wait_for)
 {
     ERR_clear_error();
+    tls_bio_set_nonblocking(SSL_get_rbio(ctx->tls_connection), limited);
     errno = 0;
     const int result = SSL_read(ctx->tls_connection, buffer, capped(length));
     *wait_for = result > 0 ? 0 : wait_flag(ctx->tls_connection, result);
     return result;
+}
+
+std::uint64_t tls_bytes_in(const soap *ctx)
+{
+    return tls_active(ctx) ? BIO_number_read(SSL_get_rbio(ctx->tls_connection)) : 0;
+}
+
+std::uint64_t tls_bytes_out(const soap *ctx)
+{
+    return tls_active(ctx) ? BIO_number_written(SSL_get_wbio(ctx->tls_connection)) : 0;
 }
 
 bool tls_has_pending(const soap *ctx)
@@ -111,9 +133,7 @@ int tls_peek(soap *ctx)
     ERR_clear_error();
     tls_bio_set_nonblocking(SSL_get_rbio(ssl), true);
     const int result = SSL_peek(ssl, &byte, 1);
-    const bool quiet = result <= 0 && wait_flag(ssl, result) == WAIT_RECV && !SSL_has_pending(ssl);
-    tls_bio_set_nonblocking(SSL_get_rbio(ssl), false);
-    return quiet ? 0 : -1;
+    return result <= 0 && wait_flag(ssl, result) == WAIT_RECV && !SSL_has_pending(ssl) ? 0 : -1;
 }
 
 const char *tls_error_text(soap *ctx, int result)

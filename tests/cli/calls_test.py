@@ -152,6 +152,10 @@ class calls(unittest.TestCase):
                 (11, "can't be attached", ["profile", "set", "--attach", self.folder]),
                 (5, "can't be set up", ["profile", "get", "--ca-file", wrong]),
                 (2, "--endpoint", ["profile", "get", "-e", "ftp://x"]),
+                (2, "--user", ["profile", "get", "-e", "http://u:p@x"]),
+                (4, 'No call can go to "http://:9/', ["profile", "get", "-e", "http://:9"]),
+                (4, 'No call can go to "https://x:65536/', ["problemreport", "get", "-e", "http://x", "-e", "https://x:65536"]),
+                (4, 'No call can go to "http://x:0/"', ["data", "get", "http://x:0/"]),
                 (2, "", ["profile", "nothing"]), (2, "", ["profile", "get", "--repeat", "0"]), (2, "", [])):
             with self.subTest(arguments=arguments):
                 self.expect(zuv.run(*arguments), code, words)

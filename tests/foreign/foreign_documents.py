@@ -225,20 +225,19 @@ def normal(text, kind):
 class Spelling:
     """One way to write documents down: prefixes, quotes, noise. Strict documents have no noise that changes names."""
 
-    def __init__(self, rng, strict, wide):
-        self.rng, self.strict, self.wide = rng, strict, wide
-        self.latin = not wide and rng.random() < 0.2
+    def __init__(self, rng, strict):
+        self.rng, self.strict = rng, strict
+        self.encoding = rng.choice(('ISO-8859-1', 'windows-1252')) if rng.random() < 0.3 else 'UTF-8'
 
     def document(self, node, root_type):
         self.scope = {}
-        encoding = 'iso-8859-1' if self.latin else 'utf-8'
         head = self.rng.choice(
             ('', '<?xml version="1.0"?>', "<?xml version='1.0' encoding='UTF-8' standalone='yes'?>\n"))
-        if self.latin:
-            head = '<?xml version="1.0" encoding="ISO-8859-1"?>'
-        mark = '\ufeff' if not self.latin and self.rng.random() < 0.1 else ''
+        if self.encoding != 'UTF-8':
+            head = '<?xml version="1.0" encoding="%s"?>' % self.encoding
+        mark = '\ufeff' if self.encoding == 'UTF-8' and self.rng.random() < 0.1 else ''
         text = mark + head + self.gap() + self.element(node, {}, root_type) + self.gap()
-        return text.encode(encoding, 'xmlcharrefreplace')
+        return text.encode(self.encoding, 'xmlcharrefreplace')
 
     def gap(self):
         return self.rng.choice(('', '', '', '\n', ' \t\r\n ', '<!-- <a> & -->', '<?pi <b>?>', '<!--x--> '))
@@ -249,7 +248,7 @@ class Spelling:
         if usable and self.rng.random() < 0.95:
             self.used.add(usable[0])
             return usable[0]
-        new = self.rng.choice(('', 'a', 'ns1', 'SOAP-ENV', 'protocol', 'x-y.z', '\u00e9' if self.wide else 'e',
+        new = self.rng.choice(('', 'a', 'ns1', 'SOAP-ENV', 'protocol', 'x-y.z', '\u00e9',
                                'n%d' % self.rng.randint(0, 99)))
         if new in declared or new in self.used or (new == '' and namespace == XSI):
             new = 'q%d' % len(scope)
@@ -278,13 +277,14 @@ class Spelling:
         if typed is None and actual and self.rng.random() < 0.1 and actual not in ELEMENTS and '-' not in actual:
             typed = actual
         if not actual and kind[1] != '}' and '-' not in kind and self.rng.random() < 0.05:
-            typed = kind  # of a simple value
+            typed = kind if self.strict else self.rng.choice((kind, XSD + 'string'))  # of a simple value
         written += [(n, v) for n, v in attributes.items()]
         tagname = self.name(tag, scope, declared)
         if typed:
             namespace, local = typed[1:].split('}')
             prefix = self.prefix(namespace, scope, declared)
             value = prefix + ':' + local if prefix else local
+            value = self.rng.choice(('', '', ' ', '\n')) + value + self.rng.choice(('', ' '))
             written.append((self.name('{%s}type' % XSI, scope, declared, True), value))
         if content is Nil:
             written.append((self.name('{%s}nil' % XSI, scope, declared, True), self.rng.choice(('true', '1'))))
@@ -362,7 +362,7 @@ class Spelling:
             length = self.rng.choice((1, 5, 50))
             part, i = text[i:i + length], i + length
             how = self.rng.random()
-            if how < 0.15 and not self.latin_lost(part):
+            if how < 0.15 and part.encode(self.encoding, 'ignore').decode(self.encoding) == part:
                 out.append('<![CDATA[' + part.replace(']]>', ']]]]><![CDATA[>') + ']]>')
             elif how < 0.3:
                 out.append(''.join(self.rng.choice(('&#%d;', '&#x%X;')) % ord(c) for c in part))
@@ -373,9 +373,6 @@ class Spelling:
             if self.rng.random() < 0.1:
                 out.append(self.rng.choice(('<!-- - -->', '<?pi?>')))
         return ''.join(out)
-
-    def latin_lost(self, part):
-        return self.latin and any(ord(c) > 255 for c in part)
 
 
 # ---- comparison
@@ -420,7 +417,7 @@ def roots():
 
 # ---- what strict reading refuses
 
-MISMATCH, TYPE_MISMATCH, REQUIRED, OCCURS = 3, 4, 42, 44
+MISMATCH, TYPE_MISMATCH, NIL, REQUIRED, OCCURS = 3, 4, 23, 42, 44
 BAD_VALUES = {'boolean': '2', 'int': '1x', 'double': 'one'}
 
 
@@ -461,6 +458,8 @@ def refusals(rng):
                 if value:
                     bad = [(m.tag, None, {}, value, '{}string')] * max(m.least, 1)
                     yield case('%r in %s' % (value, m.tag), strict, otherwise, others + bad)
+            if isinstance(words, list) and m.many:
+                yield case('nil in ' + m.tag, NIL, 0, others + [(m.tag, None, {}, Nil, m.kind)] * max(m.least, 1))
 
 
 def main():
@@ -479,7 +478,7 @@ def main():
             typed = node[1] or kind
         else:
             typed = node[1] if node[1] and node[1] != kind else None
-        document = Spelling(rng, strict, wide).document(node, typed)
+        document = Spelling(rng, strict).document(node, typed)
         etree.fromstring(document, etree.XMLParser(huge_tree=True))  # whatever else it is, it is XML
         mode = (STRICT if strict else 0) | (UTF_STRINGS if wide else 0)
         batch.append(b'%d %s %s %d\n' % (mode, asked.encode(), asked_tag.encode(), len(document)) + document)
@@ -489,7 +488,7 @@ def main():
     for name, wrong, node, *errors in refusals(rng):
         for mode, error in zip((STRICT, 0), errors):
             typed = name if name not in ELEMENTS and '-' not in name else None
-            document = Spelling(rng, True, False).document(node, typed)
+            document = Spelling(rng, True).document(node, typed)
             asked = '?' if name in ELEMENTS else spelled(name)
             batch.append(b'%d %s * %d\n' % (mode, asked.encode(), len(document)) + document)
             cases.append(('%s: %s' % (spelled(name), wrong), document, error))

@@ -5,10 +5,10 @@ set -u
 target=$1 corpus=$2 work=$3
 rm -rf "$work"
 mkdir -p "$work/corpus"
-fail() { cat "$work/said"; echo "fault_is_found.sh: $*"; exit 1; }
+fail() { tail -20 "$work/said"; echo "fault_is_found.sh: $*"; exit 1; }
 
 "$target" -runs=0 "$work/corpus" "$corpus" >"$work/said" 2>&1 || fail "the seeds alone end it"
-"$target" -max_total_time=60 -artifact_prefix="$work/" "$work/corpus" "$corpus" >"$work/said" 2>&1 && fail "nothing found"
+"$target" -max_total_time=60 -verbosity=0 -artifact_prefix="$work/" "$work/corpus" "$corpus" >"$work/said" 2>&1 && fail "nothing found"
 grep -q 'AddressSanitizer: heap-buffer-overflow' "$work/said" || fail "it ended otherwise"
 grep -q 'in keep_start_line' "$work/said" || fail "found elsewhere"
 "$target" "$work"/crash-* >"$work/said" 2>&1 && fail "the kept input doesn't show it again"

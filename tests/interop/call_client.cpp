@@ -27,7 +27,7 @@ constexpr std::size_t FAULT_LIMIT = 200; // bytes of a fault that are told
 struct options {
     std::string endpoint, ca, key, password, proxy, proxy_user, user;
     bool keep_alive = false, chunked = false, gzip = false, steps = false, forget_sessions = false;
-    int calls = 1, connect = 0, send = 0, recv = 0;
+    int calls = 1, connect = 0, send = 0, recv = 0, whole = 0;
     int proxy_port = 0;
     std::size_t size = 0;
     std::uint16_t tls_flags = TLS_VERIFY_PEER | TLS_NO_DEFAULT_CA;
@@ -44,6 +44,7 @@ struct options {
         app.add_option("--connect", connect, "Time limit of connecting");
         app.add_option("--send", send, "Time limit of sending");
         app.add_option("--recv", recv, "Time limit of receiving");
+        app.add_option("--whole", whole, "Time limit of a whole call");
         app.add_option("--ca", ca, "Certificates to trust");
         app.add_option("--key", key, "Own certificate and key");
         app.add_option("--password", password, "Of the key");
@@ -90,6 +91,7 @@ public:
         proxy_.connect_timeout = options_.connect;
         proxy_.send_timeout = options_.send;
         proxy_.recv_timeout = options_.recv;
+        proxy_.call_timeout = options_.whole;
         if (!options_.proxy.empty()) {
             proxy_.proxy_host = options_.proxy.c_str();
             proxy_.proxy_port = options_.proxy_port;

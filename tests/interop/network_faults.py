@@ -118,6 +118,8 @@ def silent_network(network, client, endpoint):
         expect("no cable, anew", steps.next(), TCP_ERROR, 1000)
     expect("the cable is back", steps.next(), 0, 0)
     steps.end()
+    caller.run("nobody there, and a brief whole", "http://%s:80/ %s" % (NOBODY, endpoint), "--connect", 30, "--whole", 1,
+               codes=TCP_ERROR, least_ms=1000, most_ms=1000 + SLACK_MS, ahead=network.in_near)
     steps = Steps(network.in_near, client, endpoint, "--connect", 1, "--send", 1, "--recv", 30, "--keep-alive", "--calls", 10,
                   "--size", 8_000_000)
     expect("a large message", steps.call(), 0, 0)

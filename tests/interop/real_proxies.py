@@ -22,6 +22,7 @@ cache deny all
 shutdown_lifetime 0 seconds
 pinger_enable off
 visible_hostname localhost
+hosts_file @folder@/hosts
 @access@
 http_access allow all
 """
@@ -74,6 +75,8 @@ def main():
         os.chmod(folder, 0o755)  # a proxy that gives up its privileges reads its files
         certificates(folder)
         password_file(os.path.join(folder, "users"))
+        with open(os.path.join(folder, "hosts"), "w", encoding="utf-8") as hosts:
+            hosts.write("127.0.0.1 localhost\n")  # Squid tries a name's first address only, which elsewhere is ::1
         words = {"zuv": zuv.removeprefix("http://"), "user": "cache_effective_user proxy" if os.geteuid() == 0 else ""}
         trust = ["--ca", os.path.join(folder, "ca.pem")]
         plain = zuv + messages.service_path("Profile")

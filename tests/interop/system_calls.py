@@ -1,9 +1,9 @@
 #!/usr/bin/python3
-"""Counts the system calls of a call on a kept connection without time limits, with strace.
+"""Counts the system calls of a call on a kept connection, without and with time limits, with strace.
 
 Usage: system_calls.py CALL_CLIENT ZUV_SERVICE. Skipped, with status 77, where no process may be traced. What a call costs is
 the difference between a run of many calls and one of few: one send, one receive and the question whether the connection
-still lives, and nothing else.
+still lives; with time limits a wait before each transfer; and nothing else.
 """
 import collections
 import os
@@ -17,7 +17,8 @@ import zuv_service
 from programs import Caller, certificates, stunnel
 
 FEW, MANY = 10, 110
-EXPECTED = {"sendto": 1, "recvfrom": 1, "pselect6": 1}
+TRANSFERS = {"sendto": 1, "recvfrom": 1}
+LIMITS = ["--connect", 10, "--send", 10, "--recv", 10, "--whole", 10]
 
 
 def counted(caller, folder, rule, endpoint, calls, *options):
@@ -41,8 +42,9 @@ def main():
         certificates(folder)
         with stunnel(folder, zuv) as (port,):
             secure = "https://localhost:%d%s" % (port, messages.service_path("Profile"))
-            for rule, endpoint, options in (("plain", zuv + messages.service_path("Profile"), []),
-                                            ("TLS", secure, ["--ca", os.path.join(folder, "ca.pem")])):
+            ways = (("plain", zuv + messages.service_path("Profile"), []),
+                    ("TLS", secure, ["--ca", os.path.join(folder, "ca.pem")]))
+            for rule, endpoint, options in [*ways, *((rule + ", limits", end, [*more, *LIMITS]) for rule, end, more in ways)]:
                 few = counted(caller, folder, rule, endpoint, FEW, *options)
                 many = counted(caller, folder, rule, endpoint, MANY, *options)
                 many.subtract(few)
@@ -50,7 +52,7 @@ def main():
                 found = {name: count / (MANY - FEW) for name, count in many.items()}
                 found = {name: round(each, 1) for name, each in found.items() if abs(each) >= 0.05}
                 print("%s: system calls of one call: %s" % (rule, found))
-                assert found == EXPECTED, found
+                assert found == {**TRANSFERS, "pselect6": 3 if "limits" in rule else 1}, found
 
 
 if __name__ == "__main__":

@@ -4,8 +4,6 @@ SOAP 1.2 what the service itself hands out at the address of the port, which tel
 
 Usage: zeep_ports.py ZUV_SERVICE SCHEMA_DIR. Every request and every answer is validated against the published schemas.
 """
-import glob
-import os
 import sys
 import urllib.request
 
@@ -180,19 +178,9 @@ WALKS = {"Profile": profile, "InventoryReport": inventory_report, "UpdateOrder":
          "StatusReport": status_report, "ProblemReport": problem_report}
 
 
-def check_files(schemas, address):
-    """The service hands out each file of the contract as it stands."""
-    names = glob.glob("*/*.xsd", root_dir=schemas) + glob.glob("*/*.wsdl", root_dir=schemas)
-    assert len(names) > 10, names
-    for name in names:
-        with open(os.path.join(schemas, name), "rb") as file, urllib.request.urlopen(address + "/zuv/v1.0/contract/" + name) as answer:
-            assert answer.read() == file.read(), name
-
-
 def main():
     program, schemas = sys.argv[1:]
     with zuv_service.running(program, "--account", "ada:sesame") as address:
-        check_files(schemas, address)
         for port in messages.PORTS:
             for soap12 in (False, True):
                 peer = Peer(schemas, port, address, soap12)

@@ -1,9 +1,11 @@
 // attachments_test.cpp - data that travels beside the messages: kept as files, given back, forgotten.
+#include <algorithm>
 #include <filesystem>
 #include <fstream>
 #include <string>
 
 #include <gtest/gtest.h>
+#include <openssl/evp.h>
 
 #include <zuv_client_pro/StatusReportSoapBindingProxy.h>
 #include <zuv_client_pro/soap_attachment.h>
@@ -71,10 +73,27 @@ private:
     std::uint32_t form_;
 };
 
+std::string base64(const std::string &bytes)
+{
+    std::string text((bytes.size() + 2) / 3 * 4, '\0');
+    EVP_EncodeBlock(reinterpret_cast<unsigned char *>(text.data()),
+                    reinterpret_cast<const unsigned char *>(bytes.data()), static_cast<int>(bytes.size()));
+    return text;
+}
+
 std::size_t files_in(const std::string &directory)
 {
     const std::filesystem::directory_iterator all(directory);
     return static_cast<std::size_t>(std::distance(begin(all), end(all)));
+}
+
+// What nobody wanted is gone only after the answer.
+std::size_t kept_in(const std::string &directory)
+{
+    const std::filesystem::directory_iterator all(directory);
+    return static_cast<std::size_t>(std::count_if(begin(all), end(all), [](const auto &entry) {
+        return !entry.path().filename().string().starts_with("arriving-");
+    }));
 }
 
 std::string contents(const std::filesystem::path &path)
@@ -83,23 +102,39 @@ std::string contents(const std::filesystem::path &path)
     return {std::istreambuf_iterator<char>(file), {}};
 }
 
-// A message of MIME parts as other toolkits write them. `parts`: each "CONTENT-ID|CONTENT".
-std::string mime_post(const char *port, const std::string &message, const std::vector<std::string> &parts)
+// A part of a MIME message, after its delimiter: "CONTENT-ID|CONTENT", or "CONTENT-ID;ENCODING|CONTENT".
+std::string mime_part(const std::string &part)
 {
-    std::string body = "--edge\r\nContent-Type: text/xml\r\nContent-ID: <root>\r\n\r\n" + message;
+    const std::string head = part.substr(0, part.find('|'));
+    std::string fields = "Content-ID: <" + head.substr(0, head.find(';')) + ">\r\n";
+    if (head.find(';') != head.npos)
+        fields += "Content-Transfer-Encoding: " + head.substr(head.find(';') + 1) + "\r\n";
+    return "\r\n--edge\r\n" + fields + "\r\n" + part.substr(part.find('|') + 1);
+}
+
+// A message of MIME parts as other toolkits write them. `ahead` stands in front of the message itself.
+std::string mime_post(const char *port, const std::string &message, const std::vector<std::string> &parts,
+                      const std::string &ahead = "")
+{
+    std::string body = ahead.empty() ? "" : mime_part(ahead);
+    body += "\r\n--edge\r\nContent-Type: text/xml\r\nContent-ID: <root>\r\n\r\n" + message;
     for (const std::string &part : parts)
-        body += "\r\n--edge\r\nContent-ID: <" + part.substr(0, part.find('|')) + ">\r\n\r\n" +
-                part.substr(part.find('|') + 1);
+        body += mime_part(part);
     std::string request = post(port, body + "\r\n--edge--\r\n");
     return request.replace(request.find("text/xml"), 8,
                            "multipart/related; boundary=edge; type=\"text/xml\"; start=\"<root>\"");
 }
 
-// A problem report, and a request to add to one; each with an attachment that refers to data.
-std::string report_with(const std::string &reference)
+// A problem report, and a request to add to one; each with an attachment that refers to data, or with
+// several.
+std::string report_with(const std::string &reference, int count = 1)
 {
-    return "<protocolProblemReport:submitRequest><protocol:attachment><protocol:dataHandler>" + reference +
-           "</protocol:dataHandler></protocol:attachment></protocolProblemReport:submitRequest>";
+    std::string report = "<protocolProblemReport:submitRequest>";
+    for (int i = 0; i < count; ++i)
+        report += "<protocol:attachment><protocol:dataHandler>" + reference +
+                  (count > 1 && reference.back() == '-' ? std::to_string(i) : "") +
+                  "</protocol:dataHandler></protocol:attachment>";
+    return report + "</protocolProblemReport:submitRequest>";
 }
 
 std::string addition_of(const std::string &reference)
@@ -204,6 +239,11 @@ TEST(Attachments, GoWithProblemReportsToo)
     EXPECT_NE(answer.body.find("\r\n\r\nmore\r\n--"), std::string::npos) << "sent once more: " << answer.body;
     EXPECT_EQ(answer.body.find("first line"), std::string::npos) << "the other one isn't";
     answer = exchange(service.port(),
+                      mime_post("ProblemReport", soap11(addition_of("cid:none"), target), {"none|"}));
+    answer = exchange(service.port(),
+                      mime_post("ProblemReport", soap11("<protocolProblemReport:getRequest/>", target), {}));
+    EXPECT_NE(answer.body.find(">\r\n\r\n\r\n--"), std::string::npos) << "an empty one: " << answer.body;
+    answer = exchange(service.port(),
                       post("ProblemReport", soap11("<protocolProblemReport:getRequest/>", target)));
     EXPECT_TRUE(answer.has("text/xml") && !answer.has("multipart")) << answer.head;
     EXPECT_TRUE(element_text(answer.body, "dataHandler").empty()) << "a reference to nothing";
@@ -231,6 +271,9 @@ TEST(Attachments, LeaveNothingWhenTheRequestIsRefused)
          mime_post("ProblemReport", message, {"data|" + some_bytes(60000), "x|" + some_bytes(60000)}), 413},
         {"too many", mime_post("ProblemReport", message, crowd), 413},
         {"two of one id", mime_post("ProblemReport", message, {"data|1", "data|2"}), 400},
+        {"nothing has the second id",
+         mime_post("ProblemReport", soap11(report_with("cid:data-", 2)), {"data-0|" + some_bytes(50000)}),
+         500},
         {"a document that is too long",
          mime_post("ProblemReport",
                    soap11("<protocolProblemReport:submitRequest><protocolProblemReport:title>" +
@@ -253,6 +296,121 @@ TEST(Attachments, LeaveNothingWhenTheRequestIsRefused)
     }
     EXPECT_EQ(exchange(service.port(), whole).status, 200) << "the limits are those of refused ones";
     EXPECT_EQ(files_in(directory), 1u);
+}
+
+// Wherever the library leaves them: in files, in memory ahead of the message, and as values of the message.
+TEST(Attachments, ComeOutOfTheirTransferEncoding)
+{
+    scratch_directory place;
+    service_process service({"--database", place.file("documents.db"), "--max-body", "200000"});
+    const std::string directory = place.file("documents.db-data");
+    const std::string bytes = some_bytes(70000);
+    std::string long_base64 = base64(bytes), escaped;
+    for (std::size_t at = 76; at < long_base64.size(); at += 78)
+        long_base64.insert(at, "\r\n");
+    for (const char c : bytes) {
+        char digits[4];
+        std::snprintf(digits, sizeof digits, "=%02X", static_cast<unsigned char>(c));
+        escaped += digits + std::string(escaped.size() % 73 > 69 ? "=\r\n" : "");
+    }
+    const struct {
+        std::string part, data;
+        bool refused = false;
+    } cases[] = {
+        {"|as it is=20", "as it is=20"},
+        {";binary|as it is=20", "as it is=20"},
+        {";uuencode|as it is=20", "as it is=20"},
+        {";base64|cGl4ZWxz", "pixels"},
+        {";BASE64|\r\ncGl4\r\n ZWw=\t\r\n\r\n", "pixel"},
+        {";Base64|", ""},
+        {";base64|" + long_base64, bytes},
+        {";quoted-printable|caf=C3=a9 =\r\nau lait \t\r\n=20end= ", "caf\xC3\xA9 au lait\r\n end"},
+        {";Quoted-Printable|a\rb =0D\n c \r", "a\rb \r\n c\r"},
+        {";quoted-printable|" + escaped, bytes},
+        {";base64|cGl4ZWxz!", "", true},
+        {";base64|cGl4ZWx", "", true},
+        {";base64|cGl4ZWw=cGl4", "", true},
+        {";base64|cGl4-ZWxz", "", true},
+        {";base64|" + std::string(4096, ' ') + "cGw=" + std::string(5000, '\n') + "cGl4", "", true},
+        {";quoted-printable|100 = 1", "", true},
+        {";quoted-printable|=4", "", true},
+        {";quoted-printable|=4x", "", true},
+        {";quoted-printable|=\rx", "", true},
+        {";quoted-printable|" + std::string(999, ' '), "", true},
+    };
+    for (const auto &c : cases)
+        for (const char *way : {"file", "ahead", "value"}) {
+            SCOPED_TRACE(way + c.part.substr(0, 60));
+            const bool ahead = way == std::string("ahead"), value = way == std::string("value");
+            const std::string message =
+                soap11(value ? "<protocolProblemReport:submitRequest><protocol:attachment><protocol:dataPort>"
+                               "<protocol:hash href=\"cid:data\"/></protocol:dataPort></protocol:attachment>"
+                               "</protocolProblemReport:submitRequest>"
+                             : report_with("cid:data"));
+            const std::string part = "data" + c.part;
+            const raw_answer answer =
+                exchange(service.port(), mime_post("ProblemReport", message,
+                                                   ahead ? std::vector<std::string>() : std::vector{part},
+                                                   ahead ? part : ""));
+            ASSERT_EQ(answer.status, c.refused ? 400 : 200) << answer.body;
+            if (c.refused) {
+                EXPECT_NE(
+                    element_text(answer.body, "faultstring").find(c.part.substr(1, c.part.find('|') - 1)),
+                    std::string::npos)
+                    << answer.body;
+                EXPECT_NE(answer.body.find("Client.MalformedRequest"), std::string::npos) << answer.body;
+            } else if (value) {
+                EXPECT_TRUE(element_text(answer.body, "hash") == base64(c.data)) << answer.body;
+            } else {
+                EXPECT_EQ(element_text(answer.body, "size"), std::to_string(c.data.size()));
+                const std::string uri = element_text(answer.body, "dataURI");
+                EXPECT_TRUE(contents(directory + uri.substr(uri.rfind('/'))) == c.data);
+            }
+            std::filesystem::remove_all(directory);
+            std::filesystem::create_directory(directory);
+        }
+    // Bytes that stay in memory are bounded as the message is, however they are encoded.
+    EXPECT_EQ(exchange(service.port(), mime_post("ProblemReport", soap11(report_with("cid:data")), {},
+                                                 "data;base64|" + base64(some_bytes(250000))))
+                  .status,
+              413);
+}
+
+// Many references to one thing are no many things, and many things are no many open files.
+TEST(Attachments, AreKeptAndSentOnce)
+{
+    scratch_directory place;
+    service_process service({"--database", place.file("documents.db")});
+    const std::string directory = place.file("documents.db-data");
+    std::vector<std::string> parts;
+    for (int i = 0; i < 120; ++i)
+        parts.push_back("part-" + std::to_string(i) + "|x");
+    const struct {
+        const char *what, *reference;
+        int count, status;
+        std::size_t kept, sent; // files, and parts of the answer to get
+    } rows[] = {
+        {"one part, again and again", "cid:part-7", 120, 200, 1, 1},
+        {"as many parts as an answer may hold, and more", "cid:part-", 120, 200, 120, 100},
+        {"too many references", "cid:part-7", 1001, 500, 0, 0},
+    };
+    for (const auto &r : rows) {
+        const std::size_t before = kept_in(directory);
+        raw_answer answer = exchange(
+            service.port(), mime_post("ProblemReport", soap11(report_with(r.reference, r.count)), parts));
+        ASSERT_EQ(answer.status, r.status) << r.what << answer.body;
+        EXPECT_EQ(kept_in(directory) - before, r.kept) << r.what;
+        const std::string uri = element_text(answer.body, "thisURI");
+        answer =
+            exchange(service.port(), mime_post("ProblemReport",
+                                               soap11("<protocolProblemReport:getRequest/>",
+                                                      "<protocol:targetURI>" + uri + "</protocol:targetURI>"),
+                                               {}));
+        std::size_t sent = 0;
+        for (std::size_t at = 0; (at = answer.body.find("\r\n\r\nx\r\n--", at)) != std::string::npos; ++at)
+            ++sent;
+        EXPECT_EQ(sent, r.sent) << r.what;
+    }
 }
 
 TEST(Attachments, OutliveTheProcessThatKeptThem)

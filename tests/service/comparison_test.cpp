@@ -54,8 +54,20 @@ TEST(Comparison, OfText)
     };
     for (const auto &r : rows)
         EXPECT_EQ(text_holds(r.how, r.held, r.wanted), r.holds) << r.rule;
-    EXPECT_FALSE(words_hold(op::contains_all_words, "Disk", "disk", true));
-    EXPECT_TRUE(words_hold(op::contains_all_words, "Disk", "disk", false));
+    // In time that grows with the lengths, however much of what is wanted is there.
+    const auto words = [](const char *word, std::size_t count) {
+        std::string text;
+        for (std::size_t i = 0; i < count; ++i)
+            text += word;
+        return text;
+    };
+    const std::string held = words("a ", 400000), letters = words("a", 400000);
+    for (const op how : {op::contains_phrase, op::contains_all_words})
+        EXPECT_FALSE(text_holds(how, {held, held}, words("a ", 200000) + "b"));
+    EXPECT_TRUE(text_holds(op::contains_phrase, {held}, words("A-", 200000)));
+    EXPECT_FALSE(text_holds(op::contains, {letters}, words("a", 200000) + "b"));
+    EXPECT_FALSE(word_search(op::contains_all_words, "disk", true).found_in("Disk"));
+    EXPECT_TRUE(word_search(op::contains_all_words, "disk", false).found_in("Disk"));
 }
 
 TEST(Comparison, OfSetsTruthAndTime)

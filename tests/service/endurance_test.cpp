@@ -121,6 +121,108 @@ TEST(Endurance, HostileMessagesEndNothing)
     EXPECT_EQ(service.stop(), 0);
 }
 
+// What references, filters and lists stand for is bounded by what arrived, not by what they could come to.
+TEST(Endurance, SmallRequestsMakeNoLargeWork)
+{
+    constexpr long MEMORY_MAX = 100000; // kilobytes
+    const auto times = [](int count, const std::string &text) {
+        std::string all;
+        for (int i = 0; i < count; ++i)
+            all += text;
+        return all;
+    };
+    // Objects that hold the next one twice, 2^depth in all.
+    const auto doubled = [](const std::string &tag, int depth, const std::string &content) {
+        std::string all = "<" + tag + " id=\"n0\">" + content + "</" + tag + ">";
+        for (int i = 1; i < depth; ++i) {
+            const std::string next = "<" + tag + " href=\"#n" + std::to_string(i - 1) + "\"/>";
+            all +=
+                "<" + tag + " id=\"n" + std::to_string(i) + "\">" + next + next + content + "</" + tag + ">";
+        }
+        return all;
+    };
+    const auto request = [](const std::string &name, const std::string &content) {
+        return "<" + name + ">" + content + "</" + name + ">";
+    };
+    const auto order = [&](const std::string &content) {
+        return request("protocolUpdateOrder:submitRequest", content);
+    };
+    const auto queries = [&](int count, const std::string &type, const std::string &content) {
+        const std::string one =
+            "<protocol:queryRequest xsi:type=\"" + type + "\">" + content + "</protocol:queryRequest>";
+        return request("protocol:QueryRequests", times(count, one));
+    };
+    const auto report = [&](const std::string &text) {
+        return request("protocolProblemReport:submitRequest",
+                       request("protocolProblemReport:problemDescription", text));
+    };
+    const std::string
+        attachment = "protocol:attachment",
+        reports = "protocolProblemReport:QueryReportsRequest",
+        nothing = "<protocolProblemReport:inclusionFilter><protocolPRFilter:expression "
+                  "xsi:type=\"protocolPRFilter:ReportTextComparison\" compareOp=\"containsPhrase\">"
+                  "<protocolPRFilter:text>nothing</protocolPRFilter:text></protocolPRFilter:expression>"
+                  "</protocolProblemReport:inclusionFilter>",
+        filter = "protocolUpdateOrder:inclusionFilter",
+        never =
+            "<protocolUpdateOrderFilter:expression compareOp=\"equal\" "
+            "xsi:type=\"protocolUpdateOrderFilter:CategoryComparison\"><protocolUpdateOrderFilter:category>"
+            "x</protocolUpdateOrderFilter:category></protocolUpdateOrderFilter:expression>",
+        user = "<protocolUpdateOrder:credentials id=\"c\"><protocol:username>" + std::string(100000, 'u') +
+               "</protocol:username></protocolUpdateOrder:credentials>";
+    const struct {
+        const char *what, *port;
+        std::string content;
+        const char *answered;
+    } rows[] = {
+        {"an attachment within itself", "StatusReport",
+         request("protocolStatusReport:createRequest",
+                 "<protocol:attachment id=\"a\"><protocol:attachment href=\"#a\"/></protocol:attachment>"),
+         "Client.InvalidInformation"},
+        {"attachments doubled", "StatusReport",
+         request("protocolStatusReport:createRequest", doubled(attachment, 40, "")), "Server.DataTooLarge"},
+        {"profiles doubled", "Profile",
+         request("protocolProfile:createRequest", doubled("protocolProfile:profile", 15, "")),
+         "Server.DataTooLarge"},
+        {"authentications doubled", "UpdateOrder",
+         request("protocolUpdateOrder:authenticateRequest",
+                 user + doubled("protocolUpdateOrder:authenticateRequest", 8,
+                                "<protocolUpdateOrder:credentials href=\"#c\"/>")),
+         "Client.InvalidRequest"},
+        {"updates that nobody knows", "UpdateOrder",
+         order(times(10001, "<protocolUpdateOrder:updateId>x</protocolUpdateOrder:updateId>")),
+         "Client.InvalidRequest"},
+        {"deliveries that nobody makes", "UpdateOrder",
+         order("<protocolUpdateOrder:updateId>FW-100</protocolUpdateOrder:updateId>" +
+               times(101, "<protocolUpdateOrder:deliveryPreference/>")),
+         "Client.InvalidRequest"},
+        {"one filter again and again", "UpdateOrder",
+         order("<" + filter + " id=\"f\">" +
+               times(10000, "<protocolUpdateOrderFilter:scope>requisite</protocolUpdateOrderFilter:scope>") +
+               never + "</" + filter + ">" + times(10000, "<" + filter + " href=\"#f\"/>")),
+         "FilterExpressionTooComplex"},
+        {"product collections that nobody knows", "Query",
+         queries(1, "protocolUpdateOrder:QueryRecognizedProductCollectionsRequest",
+                 times(1001, "<protocolUpdateOrder:productCollectionHierarchyRoot/>")),
+         "Client.InvalidRequest"},
+        {"a report of many words", "ProblemReport", report(times(2000000, "a b ")), "submitResponse"},
+        {"queries that look through it again and again", "Query", queries(20, reports, nothing),
+         "FilterExpressionTooComplex"},
+        {"queries for a report that is too large", "Query", queries(3, reports, ""),
+         "too large for one answer"},
+        {"a small report", "ProblemReport", report("nothing to report"), "submitResponse"},
+        {"a query that is wanted", "Query", queries(1, reports, nothing), "nothing to report"},
+    };
+    service_process service;
+    for (const auto &r : rows) {
+        const raw_answer answer = exchange(service.port(), post(r.port, soap11(r.content)));
+        EXPECT_NE(answer.body.find(r.answered), std::string::npos)
+            << r.what << ": " << answer.body.substr(0, 3000);
+    }
+    EXPECT_LT(service.peak_memory(), MEMORY_MAX);
+    EXPECT_EQ(service.stop(), 0);
+}
+
 TEST(Endurance, AcknowledgedDocumentsOutliveAKilledService)
 {
     scratch_directory directory;

@@ -84,14 +84,16 @@ TEST(Expansion, FollowsTheOrder)
     };
     for (const auto &r : rows) {
         soap ctx;
+        filter_work work{&ctx};
         const parsed<order> asked("protocolUpdateOrder:UpdateOrderContent", members(r.asked));
-        EXPECT_EQ(ids(expand(&ctx, the_catalogue(), *asked)), r.ids) << r.rule;
+        EXPECT_EQ(ids(expand(work, the_catalogue(), *asked)), r.ids) << r.rule;
     }
 }
 
 TEST(Expansion, FiltersByTheUpdatesRole)
 {
     soap ctx;
+    filter_work work{&ctx};
     std::string type = "driver";
     protocolUpdateOrderFilter__UpdateMetaDataTypeComparison drivers;
     drivers.type = &type;
@@ -100,14 +102,14 @@ TEST(Expansion, FiltersByTheUpdatesRole)
     order o;
     o.inclusionFilter.push_back(&filter);
     EXPECT_TRUE(names_updates(o));
-    EXPECT_EQ(ids(expand(&ctx, the_catalogue(), o)), "DRV-5") << "a filter alone is taken over all updates";
+    EXPECT_EQ(ids(expand(work, the_catalogue(), o)), "DRV-5") << "a filter alone is taken over all updates";
     o.updateId = {"FW-120"};
     o.includeRequisites = true;
-    EXPECT_EQ(ids(expand(&ctx, the_catalogue(), o)), "");
+    EXPECT_EQ(ids(expand(work, the_catalogue(), o)), "");
     filter.scope = {protocolUpdateOrderFilter__FilterScope::requisite};
-    EXPECT_EQ(ids(expand(&ctx, the_catalogue(), o)), "FW-120 DRV-5");
+    EXPECT_EQ(ids(expand(work, the_catalogue(), o)), "FW-120 DRV-5");
     filter.scope = {protocolUpdateOrderFilter__FilterScope::nonrequisite};
-    EXPECT_EQ(ids(expand(&ctx, the_catalogue(), o)), "");
+    EXPECT_EQ(ids(expand(work, the_catalogue(), o)), "");
     EXPECT_FALSE(names_updates(order()));
 }
 

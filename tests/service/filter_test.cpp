@@ -32,9 +32,10 @@ std::string passing(const std::string &expression)
 {
     const parsed<protocolUpdateOrderFilter__Filter> filter("protocolUpdateOrderFilter:Filter", expression);
     soap ctx;
+    filter_work work{&ctx};
     std::string ids;
     for (const update_record *update : the_catalogue().all())
-        if (filter_holds(*filter, facts_of(&ctx, *update)))
+        if (filter_holds(*filter, facts_of(work, *update)))
             ids += (ids.empty() ? "" : " ") + *update->updateId;
     return ids;
 }
@@ -167,7 +168,8 @@ TEST(UpdateFilter, GivesUpOnExpressionsThatGrowWithoutEnd)
     protocolUpdateOrderFilter__Filter filter;
     filter.expression = &cycle;
     soap ctx;
-    EXPECT_THROW(filter_holds(filter, facts_of(&ctx, *the_catalogue().all().front())), filter_error);
+    filter_work work{&ctx};
+    EXPECT_THROW(filter_holds(filter, facts_of(work, *the_catalogue().all().front())), filter_error);
     std::string category = "recommended";
     protocolUpdateOrderFilter__CategoryComparison leaf;
     leaf.category = &category;
@@ -176,13 +178,14 @@ TEST(UpdateFilter, GivesUpOnExpressionsThatGrowWithoutEnd)
         level[i].operand = {&level[i + 1], &level[i + 1]};
     level[39].operand = {&leaf, &leaf};
     filter.expression = &level[0];
-    EXPECT_THROW(filter_holds(filter, facts_of(&ctx, *the_catalogue().all().front())), filter_error);
+    EXPECT_THROW(filter_holds(filter, facts_of(work, *the_catalogue().all().front())), filter_error);
 }
 
 // Every comparison that can be sent has a row: none is taken for a node that does not state what it compares.
 TEST(Filters, JudgeEveryComparisonOfBothLanguages)
 {
     soap ctx;
+    filter_work work{&ctx};
     const update_record &update = *the_catalogue().all().front();
     const protocolProblemReport__ProblemReportContent report;
     const std::set<std::string> bases = {
@@ -203,10 +206,10 @@ TEST(Filters, JudgeEveryComparisonOfBothLanguages)
             ++judged;
             if (of_updates) {
                 update_filter.expression = static_cast<protocolUpdateOrderFilter__FilterNode *>(made);
-                filter_holds(update_filter, facts_of(&ctx, update));
+                filter_holds(update_filter, facts_of(work, update));
             } else {
                 report_filter.expression = static_cast<protocolPRFilter__FilterNode *>(made);
-                filter_holds(report_filter, facts_of(&ctx, report));
+                filter_holds(report_filter, facts_of(work, report));
             }
         } catch (const filter_error &error) { // an empty comparison lacks what it compares with
             EXPECT_EQ(std::string(error.what()).find("does not state"), std::string::npos) << name;
@@ -227,6 +230,7 @@ TEST(ReportFilter, ComparesWhatTheClassNames)
             text("problemDescription", "It hangs", "protocolProblemReport") +
             text("submitDateTime", "2024-02-03T04:05:06Z", "protocolProblemReport"));
     soap ctx;
+    filter_work work{&ctx};
     const struct {
         const char *type, *op;
         std::string content;
@@ -246,6 +250,6 @@ TEST(ReportFilter, ComparesWhatTheClassNames)
     for (const auto &r : rows) {
         const parsed<protocolPRFilter__Filter> filter(p + ":Filter",
                                                       node("expression", r.type, r.content, r.op, p));
-        EXPECT_EQ(filter_holds(*filter, facts_of(&ctx, *report)), r.holds) << r.type << ' ' << r.op;
+        EXPECT_EQ(filter_holds(*filter, facts_of(work, *report)), r.holds) << r.type << ' ' << r.op;
     }
 }

@@ -1,8 +1,10 @@
 // http_test.cpp - the service as an HTTP server: statuses, framings, versions, connections.
+#include <filesystem>
 #include <fstream>
 #include <string>
 
 #include <gtest/gtest.h>
+#include <sys/stat.h>
 
 #include "service/raw_client.h"
 #include "service/service_process.h"
@@ -22,7 +24,7 @@ struct status_row {
     const char *rule;
     std::string request;
     int status;
-    const char *text; // part of head or body; empty: not looked at
+    std::string text; // part of head or body; empty: not looked at
 };
 
 } // namespace
@@ -30,7 +32,10 @@ struct status_row {
 TEST(Http, StatusSaysWhatBecameOfARequest)
 {
     service_process service({"--max-body", "100000"});
-    const std::string big(100001, ' ');
+    const std::string big(100001, ' '),
+        own = "http://127.0.0.1:" + std::to_string(service.port()) + "/zuv/v1.0/";
+    const std::string own_address = "location=\"" + own + "services/Profile\"",
+                      own_link = "schemaLocation=\"" + own + "contract/common/swaref.xsd\"";
     const status_row rows[] = {
         {"a response", post("Profile", soap11(CREATE)), 200, "createResponse"},
         {"a response in SOAP 1.2", post("Profile", soap12(CREATE)), 200,
@@ -60,21 +65,35 @@ TEST(Http, StatusSaysWhatBecameOfARequest)
          "POST /zuv/v1.0/services/Profile?x=1 HTTP/1.1\r\nContent-Length: 4\r\n\r\n<a/>", 400, ""},
         {"an absolute target",
          "POST http://h/zuv/v1.0/services/Profile HTTP/1.1\r\nContent-Length: 4\r\n\r\n<a/>", 400, ""},
-        {"GET of a port", "GET /zuv/v1.0/services/Profile HTTP/1.1\r\nHost: x\r\n\r\n", 405, "Allow: POST"},
+        {"GET of a port", "GET /zuv/v1.0/services/Profile HTTP/1.1\r\nHost: x\r\n\r\n", 200,
+         "<wsdl:portType"},
+        {"GET of a port without a WSDL", "GET /zuv/v1.0/services/Query HTTP/1.1\r\nHost: x\r\n\r\n", 405,
+         "Allow: POST"},
+        {"GET of a port with some query", "GET /zuv/v1.0/services/Profile?x=1 HTTP/1.1\r\nHost: x\r\n\r\n",
+         405, "Allow: POST"},
         {"GET of the list", "GET / HTTP/1.1\r\nHost: x\r\n\r\n", 200, "/zuv/v1.0/services/Profile"},
         {"GET of a port's WSDL", "GET /zuv/v1.0/services/Profile?wsdl HTTP/1.1\r\nHost: [::1]:81\r\n\r\n",
          200, "location=\"http://[::1]:81/zuv/v1.0/services/Profile\""},
-        {"GET of a WSDL from nowhere", "GET /zuv/v1.0/services/Profile?WSDL HTTP/1.0\r\n\r\n", 200,
-         "location=\"http://127.0.0.1:9080/zuv"},
+        {"GET of a WSDL from nowhere", "GET /zuv/v1.0/services/Profile?wSdL HTTP/1.0\r\n\r\n", 200,
+         own_address},
         {"GET of a WSDL with markup for a host",
-         "GET /zuv/v1.0/services/Profile?wsdl HTTP/1.1\r\nHost: x\"><y\r\n\r\n", 200,
-         "location=\"http://127.0.0.1:9080/zuv"},
+         "GET /zuv/v1.0/services/Profile?wsdl HTTP/1.1\r\nHost: x\"><y\r\n\r\n", 200, own_address},
+        {"GET of a WSDL with a user for a host",
+         "GET /zuv/v1.0/services/Profile?wsdl HTTP/1.1\r\nHost: a@b\r\n\r\n", 200, own_address},
         {"GET of a WSDL that the contract doesn't have", "GET /zuv/v1.0/services/Query?wsdl HTTP/1.1\r\n\r\n",
          405, ""},
-        {"GET of a schema", "GET /zuv/v1.0/contract/common/common.xsd HTTP/1.1\r\n\r\n", 200,
-         "schemaLocation=\"swaref.xsd\""},
+        {"GET of a schema", "GET /zuv/v1.0/contract/common/common.xsd HTTP/1.1\r\n\r\n", 200, own_link},
+        {"GET of the same by dots",
+         "GET /zuv/x/../v1.0/contract/./profile/%2e%2E/common/c%6fmmon.xsd?x=../y HTTP/1.1\r\n\r\n", 200,
+         own_link},
+        {"GET by more dots than there are folders",
+         "GET /../../zuv/v1.0/contract/common/common.xsd HTTP/1.1\r\n\r\n", 200, own_link},
         {"GET of no file of the contract", "GET /zuv/v1.0/contract/../type_ids.txt HTTP/1.1\r\n\r\n", 404,
          ""},
+        {"GET with an encoded slash", "GET /zuv/v1.0/contract/common%2Fcommon.xsd HTTP/1.1\r\n\r\n", 404, ""},
+        {"GET of no data by dots", "GET /zuv/v1.0/data/../../../etc/passwd HTTP/1.1\r\n\r\n", 404, ""},
+        {"POST by dots",
+         "POST /zuv/v1.0/data/../services/./Profile HTTP/1.1\r\nContent-Length: 4\r\n\r\n<a/>", 400, ""},
         {"GET of nothing", "GET /x HTTP/1.1\r\nHost: x\r\n\r\n", 404, ""},
         {"HEAD", "HEAD /zuv/v1.0/services/Profile HTTP/1.1\r\nHost: x\r\n\r\n", 200, ""},
         {"PUT", "PUT /zuv/v1.0/services/Profile HTTP/1.1\r\nContent-Length: 1\r\n\r\nx", 405, ""},
@@ -203,6 +222,33 @@ TEST(Http, DoesNotStartWithoutWhatItNeeds)
     for (service_process *useless : {&no_port, &no_database}) {
         EXPECT_EQ(useless->port(), 0);
         EXPECT_EQ(useless->stop(), 1);
+    }
+}
+
+// Whatever the umask is; what was there before stays as it was.
+TEST(Http, KeepsItsFilesForTheirOwner)
+{
+    const auto mode_of = [](const std::string &path) {
+        struct stat about = {};
+        return stat(path.c_str(), &about) == 0 ? about.st_mode & 07777 : 0;
+    };
+    for (const mode_t mask : {0, 0277}) {
+        scratch_directory directory;
+        const std::string fresh = directory.file("fresh.db"), old = directory.file("old.db");
+        std::ofstream(old).close();
+        std::filesystem::create_directory(old + "-data");
+        chmod(old.c_str(), 0640);
+        chmod((old + "-data").c_str(), 0750);
+        const mode_t before = umask(mask);
+        service_process one({"--database", fresh}), other({"--database", old});
+        umask(before);
+        EXPECT_EQ(exchange(one.port(), post("Profile", soap11(CREATE))).status, 200);
+        for (const char *companion : {"", "-wal", "-shm"})
+            EXPECT_EQ(mode_of(fresh + companion), 0600u) << companion << " with umask " << mask;
+        EXPECT_EQ(mode_of(fresh + "-data"), 0700u) << mask;
+        EXPECT_EQ(exchange(other.port(), post("Profile", soap11(CREATE))).status, 200);
+        EXPECT_EQ(mode_of(old), 0640u) << mask;
+        EXPECT_EQ(mode_of(old + "-data"), 0750u) << mask;
     }
 }
 

@@ -23,7 +23,7 @@ std::string envelope(std::string_view uri, std::string_view content, std::string
     xml.append(uri).append("\"");
     for (const char *prefix :
          {"xsi", "protocol", "protocolProfile", "protocolStatusReport", "protocolInventoryReport",
-          "protocolUpdateOrder", "protocolUpdateOrderFilter", "protocolProblemReport"})
+          "protocolUpdateOrder", "protocolUpdateOrderFilter", "protocolProblemReport", "protocolPRFilter"})
         xml.append(" xmlns:").append(prefix).append("=\"").append(uri_of(prefix)).append("\"");
     xml.append(">");
     if (!header.empty())

@@ -5,6 +5,7 @@
 #include <csignal>
 #include <cstdlib>
 #include <cstring>
+#include <fstream>
 #include <stdexcept>
 
 #include <poll.h>
@@ -90,6 +91,15 @@ service_process::~service_process()
 std::string service_process::url(const char *port_name) const
 {
     return "http://127.0.0.1:" + std::to_string(port_) + "/zuv/v1.0/services/" + port_name;
+}
+
+long service_process::peak_memory() const
+{
+    std::ifstream status("/proc/" + std::to_string(pid_) + "/status");
+    for (std::string line; std::getline(status, line);)
+        if (line.starts_with("VmHWM:"))
+            return std::atol(line.c_str() + 6);
+    return -1;
 }
 
 bool service_process::running()

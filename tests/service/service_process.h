@@ -36,6 +36,7 @@ public:
     pid_t pid() const { return pid_; }
     std::string url(const char *port_name) const;
     bool running();
+    long peak_memory() const; // kilobytes that it held at most so far
 
     // Ends it in an orderly way. Its exit status, or minus the signal that ended it.
     int stop();

@@ -4,6 +4,7 @@
 #include "support/failing_malloc.h"
 
 #include <cerrno>
+#include <cstring>
 
 extern "C" {
 void *__libc_malloc(std::size_t size);
@@ -30,6 +31,9 @@ struct thread_state {
     std::size_t refuse_to = 0;   // number of the last one
     std::size_t refused = 0;
     std::ptrdiff_t held = 0; // blocks handed out and not freed
+    const void *watched = nullptr;
+    char *last_sight = nullptr;
+    std::size_t sight_length = 0;
 };
 
 constinit thread_local thread_state state;
@@ -82,6 +86,10 @@ extern "C" __attribute__((visibility("default"))) void *realloc(void *block, std
 extern "C" __attribute__((visibility("default"))) void free(void *block)
 {
     state.held -= block != nullptr;
+    if (block != nullptr && block == state.watched) {
+        std::memcpy(state.last_sight, block, state.sight_length);
+        state.watched = nullptr;
+    }
     if (__interceptor_free != nullptr)
         __interceptor_free(block);
     else
@@ -115,6 +123,13 @@ std::size_t allocations()
 std::ptrdiff_t held()
 {
     return state.held;
+}
+
+void watch_free(const void *block, char *copy, std::size_t length)
+{
+    state.watched = block;
+    state.last_sight = copy;
+    state.sight_length = length;
 }
 
 } // namespace failing_malloc

@@ -33,6 +33,9 @@ std::size_t allocations();
 // blocks are freed: only a difference tells something.
 std::ptrdiff_t held();
 
+// When this thread frees `block`, its first `length` bytes are copied to `copy` as they stand then.
+void watch_free(const void *block, char *copy, std::size_t length);
+
 // Runs `call` with allocation 1, 2, 3... refused, each followed by `check`, which may assert, until a run
 // needs no more allocations. `check` takes whether an allocation was refused. Returns the number of runs in
 // which one was refused.

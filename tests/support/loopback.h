@@ -47,15 +47,17 @@ inline int port_of(int socket)
     return ntohs(address.sin_port);
 }
 
-// A socket bound to a free port of 127.0.0.1.
+// A socket bound to 127.0.0.1 or another address of the loopback; port 0: a free one.
 class bound_socket {
 public:
-    explicit bound_socket(int type = SOCK_STREAM, int backlog = 16)
+    explicit bound_socket(int type = SOCK_STREAM, int backlog = 16, const char *host = "127.0.0.1",
+                          int port = 0)
         : socket_(::socket(AF_INET, type | SOCK_CLOEXEC, 0))
     {
         sockaddr_in address{};
         address.sin_family = AF_INET;
-        address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+        address.sin_addr.s_addr = inet_addr(host);
+        address.sin_port = htons(static_cast<std::uint16_t>(port));
         EXPECT_EQ(bind(socket_, reinterpret_cast<sockaddr *>(&address), sizeof address), 0);
         if (type == SOCK_STREAM) {
             EXPECT_EQ(listen(socket_, backlog), 0);

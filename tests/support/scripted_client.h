@@ -14,21 +14,21 @@
 
 namespace scripted {
 
-constexpr int GUARD_S = 10;         // time limit of transfers where none should be met
-constexpr int OTHERS_ANSWER = 9999; // in place of a code
+constexpr int GUARD_S = 10;                    // time limit of transfers where none should be met
+constexpr int OTHERS_ANSWER = 9999;            // in place of a code
+constexpr const char *A_NAME = "call-1000000"; // as long as those of all calls
 
 // A client that keeps its connection and counts those it needed.
 class client {
 public:
-    template <class Server> explicit client(const Server &to) : endpoint_(to.endpoint())
+    template <class Server> explicit client(const Server &to) : endpoint(to.endpoint())
     {
-        proxy.endpoint = endpoint_.c_str();
         proxy.input_mode = proxy.output_mode = MODE_KEEP_ALIVE;
         proxy.connect_timeout = proxy.send_timeout = proxy.recv_timeout = GUARD_S;
         open_ = proxy.on_open;
         proxy.on_open = count_and_open;
         be_own();
-        if (endpoint_.starts_with("https")) {
+        if (endpoint.starts_with("https")) {
             const std::string &trusted = ca_file();
             EXPECT_EQ(soap_ssl_client_context(&proxy, tls_peers::VERIFIED, nullptr, nullptr, trusted.c_str(),
                                               nullptr, nullptr),
@@ -37,16 +37,15 @@ public:
     }
     // A client of its own with the settings of another, as a host's threads have them.
     explicit client(const client &settings)
-        : proxy(static_cast<const soap &>(settings.proxy)), endpoint_(settings.endpoint_),
-          open_(settings.open_)
+        : endpoint(settings.endpoint), proxy(static_cast<const soap &>(settings.proxy)), open_(settings.open_)
     {
-        proxy.endpoint = endpoint_.c_str();
         be_own();
     }
     client &operator=(const client &) = delete;
 
-    // The code of one call. `padding`: bytes of text besides.
-    int call(std::size_t padding = 0)
+    // The code of one call, of this client or through a copy of its proxy. `padding`: bytes of text besides.
+    int call(std::size_t padding = 0) { return call_through(proxy, padding); }
+    int call_through(ProfileSoapBindingProxy &any, std::size_t padding = 0)
     {
         using namespace std::chrono;
         std::string name = "call-" + std::to_string(++names_), text(padding, 'p');
@@ -56,9 +55,10 @@ public:
         request.identity = &identity;
         request.profileAuthority = &text;
         __protocolProfile__createResponse response{};
-        proxy.destroy();
+        any.destroy();
+        any.endpoint = endpoint.c_str();
         const auto began = steady_clock::now();
-        const int code = proxy.create(&request, response);
+        const int code = any.create(&request, response);
         milliseconds =
             static_cast<int>(duration_cast<std::chrono::milliseconds>(steady_clock::now() - began).count());
         if (code != 0)
@@ -68,6 +68,7 @@ public:
         return own ? 0 : OTHERS_ANSWER;
     }
 
+    std::string endpoint;
     ProfileSoapBindingProxy proxy;
     int connections = 0, milliseconds = 0;
 
@@ -89,9 +90,8 @@ private:
         static const std::string path = tls_peers::ca().ca_file();
         return path;
     }
-    std::string endpoint_;
     int (*open_)(soap *, const char *, const char *, int) = nullptr;
-    inline static std::atomic<int> names_ = 0; // no two clients say the same
+    inline static std::atomic<int> names_ = 1000000; // no two clients say the same, and none says more
 };
 
 } // namespace scripted

@@ -12,12 +12,12 @@ namespace tcp_clients {
 
 using loopback::context;
 
-// A test that may have socket calls fail.
+// A test that may bend socket calls and the clock.
 class socket_test : public loopback::descriptor_test {
 protected:
     void TearDown() override
     {
-        socket_calls::fail_connect = socket_calls::fail_sendto = socket_calls::fail_recv = {};
+        socket_calls::reset();
         descriptor_test::TearDown();
     }
 };

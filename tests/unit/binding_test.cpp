@@ -35,6 +35,8 @@ protected:
         std::string declared = xml;
         const std::string name = xml.substr(1, xml.find_first_of(" />") - 1);
         std::string declarations = " xmlns:xsi=\"http://www.w3.org/2001/XMLSchema-instance\""
+                                   " xmlns:xsd=\"http://www.w3.org/2001/XMLSchema\""
+                                   " xmlns:SOAP-ENC=\"http://schemas.xmlsoap.org/soap/encoding/\""
                                    " xmlns:SOAP-ENV=\"http://schemas.xmlsoap.org/soap/envelope/\"";
         for (const soap_namespace *row = ctx.namespaces; row->prefix; ++row) {
             if (std::string(row->prefix).rfind("protocol", 0) == 0)
@@ -89,6 +91,27 @@ TEST_F(Binding, xsi_type_makes_the_derived_class_and_an_unknown_one_the_base)
     EXPECT_EQ("U1", *static_cast<protocolUpdateOrder__UpdateMetaData *>(query->metaData[0])->updateId);
     EXPECT_EQ(SOAP_TYPE_protocol__MetaData, query->metaData[1]->soap_type());
     EXPECT_EQ(SOAP_TYPE_protocol__MetaData, query->metaData[2]->soap_type()) << "a class outside the family";
+    // Among white space, and by prefixes that no string of Latin-1 may hold.
+    const struct {
+        const char *declared, *used;
+        std::uint32_t mode;
+    } prefixes[] = {{"p", "p", 0},
+                    {"\xC3\xA9", "\xC3\xA9", 0},
+                    {"\xC3\xA9", "&#xE9;", 0},
+                    {"\xE9", "\xE9", MODE_LATIN1},
+                    {"\xE9", "&#233;", MODE_LATIN1},
+                    {"\xD1\x82\xD0\xB8\xD0\xBF", "\xD1\x82\xD0\xB8\xD0\xBF", 0}};
+    for (const auto &c : prefixes)
+        for (const std::uint32_t strings : {0U, MODE_UTF_STRINGS}) {
+            const auto *derived = read<protocolUpdateOrder__UpdateIdExpansionDetail>(
+                std::string("<d><protocolUpdateOrder:metaData type='&#xE9;' xsi:type=' \n") + c.used +
+                    ":UpdateMetaData\t' xmlns:" + c.declared +
+                    "='http://www.zuv.example/xmlns/b2b/zuv/v1.0/UpdateOrder'/></d>",
+                c.mode | strings);
+            ASSERT_NE(nullptr, derived) << ctx.error << c.declared;
+            EXPECT_EQ(SOAP_TYPE_protocolUpdateOrder__UpdateMetaData, derived->metaData[0]->soap_type())
+                << c.declared << " in mode " << (c.mode | strings);
+        }
     const std::string undeclared = "<d><protocolUpdateOrder:metaData xsi:type=\"nobody:MetaData\"/></d>";
     EXPECT_NE(nullptr, read<protocolUpdateOrder__UpdateIdExpansionDetail>(undeclared));
     EXPECT_EQ(nullptr, read<protocolUpdateOrder__UpdateIdExpansionDetail>(undeclared, MODE_STRICT));
@@ -121,6 +144,61 @@ TEST_F(Binding, a_code_without_a_word_goes_out_as_its_number)
     EXPECT_EQ("<d><protocol:medium>99</protocol:medium></d>", write(supported, "d"));
 }
 
+TEST_F(Binding, codes_are_numbers_of_32_bits_and_in_strict_mode_those_of_words)
+{
+    const struct {
+        const char *text;
+        int lenient, strict;
+    } cases[] = {{"0", 0, 0},          {"5", 0, 0},           {"6", 0, 4},
+                 {"-1", 0, 4},         {"2147483647", 0, 4},  {"2147483648", 4, 4},
+                 {"4294967296", 4, 4}, {"-4294967295", 4, 4}, {"99999999999999999999", 4, 4}};
+    for (const auto &c : cases)
+        for (const std::uint32_t mode : {0U, MODE_STRICT}) {
+            read<protocol__Contact>(std::string("<c><protocol:contactPreference>") + c.text +
+                                        "</protocol:contactPreference></c>",
+                                    mode);
+            EXPECT_EQ(mode == 0 ? c.lenient : c.strict, ctx.error) << c.text;
+        }
+}
+
+TEST_F(Binding, a_type_of_the_schema_or_the_encoding_tells_a_simple_value_nothing_outside_strict_mode)
+{
+    const struct {
+        const char *type;
+        int lenient, strict; // errors
+    } types[] = {{"xsd:string", 0, 4},   {" xsd:string\n", 0, 4}, {"SOAP-ENC:string", 0, 4},
+                 {"xsd:int", 0, 4},      {"xsd:anyType", 0, 4},   {"protocol:Address", 4, 4},
+                 {"nobody:string", 4, 4}};
+    for (const auto &c : types)
+        for (const std::uint32_t mode : {0U, MODE_STRICT}) {
+            const std::string type = std::string(" xsi:type=\"") + c.type + "\">1</";
+            const int expected = mode == 0 ? c.lenient : c.strict;
+            read<protocol__Contact>(
+                "<c><protocol:contactPreference" + type + "protocol:contactPreference></c>", mode);
+            EXPECT_EQ(expected, ctx.error) << "a code from " << c.type << " mode " << mode;
+            read<protocol__ExtendedAttributes>(
+                "<e><protocol:containsData" + type + "protocol:containsData></e>", mode);
+            EXPECT_EQ(expected, ctx.error) << "a boolean from " << c.type << " mode " << mode;
+            read<protocol__AttachStatusRequest>(
+                "<a><protocol:percentComplete" + type + "protocol:percentComplete></a>", mode);
+            EXPECT_EQ(c.type == std::string("xsd:int") ? 0 : expected, ctx.error)
+                << "a number from " << c.type;
+        }
+    const auto *preferences =
+        read<protocol__Contact>("<c><protocol:contactPreference xsi:type=\" protocol:ContactPreference \">fax"
+                                "</protocol:contactPreference></c>",
+                                MODE_STRICT);
+    ASSERT_NE(nullptr, preferences);
+    EXPECT_EQ(protocol__ContactPreference::fax, preferences->contactPreference.at(0));
+    EXPECT_NE(nullptr,
+              read<protocol__Contact>("<c><protocol:contactPreference xsi:type=\"string\" xmlns=\"http://"
+                                      "www.w3.org/2001/XMLSchema\">fax</protocol:contactPreference></c>"))
+        << "by the default namespace";
+    read<protocol__Contact>("<c><protocol:contactPreference xsi:type=\"xsd:string\">telegraph"
+                            "</protocol:contactPreference></c>");
+    EXPECT_EQ(SOAP_TYPE_MISMATCH, ctx.error) << "the text decides";
+}
+
 TEST_F(Binding, required_members_are_nil_when_null_and_attributes_come_first)
 {
     protocolPRFilter__Not negation;
@@ -151,10 +229,56 @@ TEST_F(Binding, nil_is_a_null_pointer_and_nil_mode_writes_it_back)
     ASSERT_NE(nullptr, contact);
     EXPECT_TRUE(contact->name == nullptr && contact->nameDetails == nullptr);
     EXPECT_EQ("<c></c>", write(*contact, "c"));
+    // Where there is no pointer to be null, nil leaves a vector without the item and a member as it was.
+    const std::string codes = "<c><protocol:contactPreference xsi:nil=\"1\"/><protocol:contactPreference>fax"
+                              "</protocol:contactPreference><protocol:contactPreference xsi:nil=\"1\">"
+                              "</protocol:contactPreference></c>";
+    const auto *preferences = read<protocol__Contact>(codes);
+    ASSERT_NE(nullptr, preferences);
+    EXPECT_EQ(std::vector{protocol__ContactPreference::fax}, preferences->contactPreference);
+    const std::string
+        order = "<o><protocolUpdateOrder:includeData xsi:nil=\"true\"/></o>",
+        term = "<r><protocol:uri>u</protocol:uri><protocol:term xsi:nil=\"true\"></protocol:term></r>";
+    const auto *content = read<protocolUpdateOrder__UpdateOrderContent>(order);
+    ASSERT_NE(nullptr, content);
+    EXPECT_TRUE(content->includeData);
+    EXPECT_NE(nullptr, read<protocol__Server_x002eRedirection>(term));
+    EXPECT_EQ(nullptr, read<protocol__Contact>(codes, MODE_STRICT));
+    EXPECT_EQ(SOAP_NIL, ctx.error);
+    EXPECT_EQ(nullptr, read<protocolUpdateOrder__UpdateOrderContent>(order, MODE_STRICT));
+    EXPECT_EQ(nullptr, read<protocol__Server_x002eRedirection>(term, MODE_STRICT));
     const std::string nil = write(protocol__Function(), "c", MODE_NIL);
     EXPECT_EQ("<c><protocol:function xsi:nil=\"true\"/><protocol:functionName xsi:nil=\"true\"/>"
               "<protocol:description xsi:nil=\"true\"/></c>",
               nil);
+}
+
+TEST_F(Binding, empty_values_are_there_and_absent_ones_are_not)
+{
+    for (const char *form : {"<protocol:certificate/>", "<protocol:certificate></protocol:certificate>",
+                             "<protocol:certificate> </protocol:certificate>"}) {
+        const auto *read_back =
+            read<protocol__Credentials>(std::string("<c>") + form + "<protocol:token/></c>");
+        ASSERT_NE(nullptr, read_back) << form;
+        ASSERT_TRUE(read_back->certificate && read_back->certificate->content) << form;
+        EXPECT_EQ(0, read_back->certificate->size);
+        EXPECT_EQ("<c><protocol:certificate></protocol:certificate><protocol:token></protocol:token></c>",
+                  write(*read_back, "c"));
+    }
+    protocol__Data data;
+    EXPECT_EQ("<d></d>", write(data, "d"));
+    EXPECT_EQ("", write(data, "d", MODE_NULL_STRINGS));
+    EXPECT_EQ("<d xsi:nil=\"true\"/>", write(data, "d", MODE_NULL_STRINGS | MODE_NIL));
+    protocol__Encoding encoding = protocol__Encoding::base64;
+    data.encoding = &encoding;
+    EXPECT_EQ("<d encoding=\"base64\"/>", write(data, "d", MODE_NULL_STRINGS));
+    data.value = "x";
+    EXPECT_EQ("<d encoding=\"base64\">x</d>", write(data, "d", MODE_NULL_STRINGS));
+    const auto *nil =
+        read<protocol__Attachment>("<a><protocol:language xsi:nil=\"1\"/><protocol:language/></a>");
+    ASSERT_TRUE(nil && nil->language.size() == 2);
+    EXPECT_EQ("<a><protocol:language></protocol:language></a>", write(*nil, "a"));
+    EXPECT_EQ("<a></a>", write(*nil, "a", MODE_NULL_STRINGS));
 }
 
 TEST_F(Binding, references_forward_and_back_share_one_object)
@@ -186,6 +310,17 @@ TEST_F(Binding, references_forward_and_back_share_one_object)
         read<protocolProfile__ProfileContent>(std::string("<p>") + c.content + "</p>");
         EXPECT_EQ(c.error, ctx.error);
     }
+}
+
+TEST_F(Binding, strict_reading_takes_no_object_with_wanted_members_by_reference)
+{
+    const auto code_of = [this]<class T>(const T &) {
+        EXPECT_EQ(nullptr, read<T>("<f href=\"#f\"/>", MODE_STRICT));
+        return ctx.error;
+    };
+    EXPECT_EQ(SOAP_OCCURS, code_of(protocolPRFilter__And())) << "a vector with a minimum";
+    EXPECT_EQ(SOAP_OCCURS, code_of(protocolPRFilter__Not())) << "a required member";
+    EXPECT_EQ(SOAP_MISSING_ID, code_of(protocol__Contact())) << "neither";
 }
 
 TEST_F(Binding, graph_mode_writes_shared_objects_once_and_literal_mode_each_time)

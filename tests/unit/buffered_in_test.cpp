@@ -4,12 +4,12 @@
 #include <string>
 
 #include <gtest/gtest.h>
-#include <zlib.h>
 
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_io.h>
 
+#include "support/deflated.h"
 #include "support/memory_wire.h"
 
 namespace {
@@ -27,30 +27,6 @@ std::string chunk(const std::string &data)
     char size[32];
     std::snprintf(size, sizeof size, "%zX\r\n", data.size());
     return size + data + "\r\n";
-}
-
-std::string deflated(const std::string &text, int window_bits, const std::string &dictionary = {})
-{
-    z_stream stream{};
-    EXPECT_EQ(deflateInit2(&stream, 6, Z_DEFLATED, window_bits, 8, Z_DEFAULT_STRATEGY), Z_OK);
-    if (!dictionary.empty()) {
-        deflateSetDictionary(&stream, reinterpret_cast<const Bytef *>(dictionary.data()),
-                             static_cast<uInt>(dictionary.size()));
-    }
-    std::string out(deflateBound(&stream, text.size()) + 32, '\0');
-    stream.next_in = reinterpret_cast<Bytef *>(const_cast<char *>(text.data()));
-    stream.avail_in = static_cast<uInt>(text.size());
-    stream.next_out = reinterpret_cast<Bytef *>(out.data());
-    stream.avail_out = static_cast<uInt>(out.size());
-    EXPECT_EQ(deflate(&stream, Z_FINISH), Z_STREAM_END);
-    out.resize(stream.total_out);
-    deflateEnd(&stream);
-    return out;
-}
-
-std::string gzipped(const std::string &text)
-{
-    return deflated(text, 31);
 }
 
 struct outcome {
@@ -217,11 +193,18 @@ TEST(buffered_in, bodies_read_the_same_at_every_split)
     check_every_reading("a length", with_length("<a/>", 4), {0, "<a/>", 0, true});
 
     const std::string text = "<a>compressed compressed compressed</a>";
-    const std::string gzip = gzipped(text), deflate = deflated(text, 15);
-    std::string with_flags = gzip, small_chunks;
+    const std::string gzip = gzipped(text), deflate = deflated(text, 15), raw = deflated(text, -15);
+    // Five bytes of head and the text as it stands, in a block whose unused bits are those of a zlib head.
+    const std::string stored =
+        "\x78\x27" + std::string(1, '\0') + "\xD8\xFF" + text + "\x03" + std::string(1, '\0');
+    const auto in_small_chunks = [](const std::string &bytes) {
+        std::string chunks;
+        for (const char c : bytes)
+            chunks += chunk(std::string(1, c));
+        return chunks + "0\r\n\r\n";
+    };
+    std::string with_flags = gzip;
     with_flags[3] = 8; // a file name announced and not there: the flags are not looked at
-    for (const char c : gzip)
-        small_chunks += chunk(std::string(1, c));
     const struct {
         const char *rule, *head;
         std::string body;
@@ -232,8 +215,14 @@ TEST(buffered_in, bodies_read_the_same_at_every_split)
         {"gzip flags", "gzip\r\n\r\n", with_flags},
         {"gzip in two chunks", "gzip\r\nTransfer-Encoding: chunked\r\n\r\n",
          chunk(gzip.substr(0, 20)) + chunk(gzip.substr(20)) + "0\r\n\r\n"},
-        {"gzip in chunks of one byte", "gzip\r\nTransfer-Encoding: chunked\r\n\r\n",
-         small_chunks + "0\r\n\r\n"},
+        {"gzip in chunks of one byte", "gzip\r\nTransfer-Encoding: chunked\r\n\r\n", in_small_chunks(gzip)},
+        {"deflate in chunks of one byte", "deflate\r\nTransfer-Encoding: chunked\r\n\r\n",
+         in_small_chunks(deflate)},
+        {"deflate without its zlib head", "deflate\r\n\r\n", raw},
+        {"the same sent as gzip", "gzip\r\n\r\n", raw},
+        {"the same in chunks of one byte", "deflate\r\nTransfer-Encoding: chunked\r\n\r\n",
+         in_small_chunks(raw)},
+        {"stored", "deflate\r\n\r\n", stored},
     };
     for (const auto &row : compressed) {
         std::string head = OK_HEAD + "Content-Encoding: " + row.head;
@@ -337,13 +326,21 @@ TEST(buffered_in, no_more_is_asked_for_behind_the_end)
 TEST(buffered_in, a_preset_dictionary_must_be_the_right_one)
 {
     const std::string text = "<a>words of the dictionary words of the dictionary</a>";
-    const std::string body = deflated(text, 15, "words of the dictionary");
-    for (const std::string dictionary : {"words of the dictionary", "another dictionary", ""}) {
-        kept_wire wire(OK_HEAD + "Content-Encoding: deflate\r\n\r\n" + body);
-        wire.zlib_dictionary = dictionary.empty() ? nullptr : dictionary.data();
-        wire.zlib_dictionary_length = static_cast<unsigned>(dictionary.size());
-        EXPECT_EQ(read_message(wire).finished, dictionary[0] == 'w' ? 0 : SOAP_ZLIB_ERROR) << dictionary;
-    }
+    for (const int window_bits : {15, -15})
+        for (const std::string dictionary : {"words of the dictionary", "another dictionary", ""}) {
+            kept_wire wire(OK_HEAD + "Content-Encoding: deflate\r\n\r\n" +
+                           deflated(text, window_bits, "words of the dictionary"));
+            wire.zlib_dictionary = dictionary.empty() ? nullptr : dictionary.data();
+            wire.zlib_dictionary_length = static_cast<unsigned>(dictionary.size());
+            const outcome read = read_message(wire);
+            if (dictionary[0] == 'w') {
+                EXPECT_EQ(read, (outcome{0, text, 0, false})) << window_bits;
+            } else if (window_bits > 0) { // a raw stream doesn't know its dictionary
+                EXPECT_EQ(read.finished, SOAP_ZLIB_ERROR) << dictionary;
+            } else {
+                EXPECT_NE(read.body, text) << dictionary;
+            }
+        }
 }
 
 TEST(buffered_in, a_damaged_compressed_body_is_an_error_wherever_it_is_damaged)

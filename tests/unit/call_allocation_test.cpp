@@ -1,5 +1,8 @@
 // call_allocation_test.cpp - every allocation of a call refused once: a code comes back, and the next call
 // works.
+#include <cstdlib>
+#include <vector>
+
 #include <gtest/gtest.h>
 
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
@@ -74,6 +77,12 @@ struct trial {
     int get() { return proxy.get(&request, got); }
     int set() { return proxy.set(const_cast<protocolProfile__ProfileContent *>(rich_document()), held); }
     const protocolProfile__ProfileContent *result() const { return got.result ? got.result : held.result; }
+    // The text with an id and the reference to it are both there.
+    bool is_whole() const
+    {
+        return result() && result()->thisURI.size() == 2 && result()->thisURI[0] == result()->thisURI[1] &&
+               !result()->thisURI[0].empty();
+    }
 
     call_wire wire;
     ProfileSoapBindingProxy proxy;
@@ -106,7 +115,7 @@ bool refuse(const call_case &c, std::size_t nth, failing_malloc::refuse how)
     }
     // Some allocations only save work: without them the call goes on the long way.
     EXPECT_TRUE(error == c.usual || (refused != 0 && error != 0)) << error;
-    EXPECT_TRUE(error != 0 || t.result() != nullptr);
+    EXPECT_TRUE(error != 0 || t.is_whole());
     t.proxy.destroy();
     t.prepare();
     EXPECT_EQ(c.usual, (t.*c.call)()) << "the next call";
@@ -141,6 +150,56 @@ TEST(AllocationFailure, of_a_call_gives_a_code_and_leaves_nothing_behind)
         }
     }
     EXPECT_EQ("", testing::internal::GetCapturedStderr()) << "no leak is named";
+}
+
+// Managed memory of the host's own, of which one request is refused.
+struct host_memory {
+    std::vector<void *> blocks;
+    std::size_t refuse = 0; // counted from 1; 0 none
+    ~host_memory()
+    {
+        for (void *block : blocks)
+            std::free(block);
+    }
+    static host_memory *current;
+    static void *give(soap *, std::size_t size)
+    {
+        current->blocks.push_back(current->blocks.size() + 1 == current->refuse ? nullptr
+                                                                                : std::malloc(size));
+        return current->blocks.back();
+    }
+};
+host_memory *host_memory::current = nullptr;
+
+TEST(AllocationFailure, of_the_hosts_own_allocator_is_told_wherever_it_is_met)
+{
+    const call_case cases[] = {
+        {"get", &trial::get, rich_answer("get"), 0, 0},
+        {"set", &trial::set, rich_answer("set"), 0, 0},
+        {"fault", &trial::get, FAULT_11, 0, SOAP_CLIENT_FAULT},
+        {"fault of SOAP 1.2", &trial::get, FAULT_12, 0, SOAP_CLIENT_FAULT},
+        {"MIME", &trial::set, rich_answer("set"), MODE_MIME, 0},
+        {"DIME, which the answer is not", &trial::set, rich_answer("set"), MODE_DIME, SOAP_DIME_VERSION},
+    };
+    rich_document();
+    for (const call_case &c : cases) {
+        std::size_t refuse = 1, needed;
+        do {
+            SCOPED_TRACE(std::string(c.rule) + ", block " + std::to_string(refuse));
+            host_memory memory;
+            host_memory::current = &memory;
+            trial t(c.body, c.mode);
+            t.proxy.send_fd = t.proxy.recv_fd = -1;
+            t.proxy.on_malloc = host_memory::give;
+            memory.refuse = refuse;
+            const int error = (t.*c.call)();
+            needed = memory.blocks.size();
+            EXPECT_EQ(error, refuse <= needed ? static_cast<int>(SOAP_OUT_OF_MEMORY) : c.usual);
+            EXPECT_TRUE(t.wire.sent.empty() || t.wire.opened == 1);
+            t.proxy.destroy();
+        } while (refuse++ <= needed);
+        EXPECT_GT(refuse, 3U) << c.rule;
+    }
 }
 
 // Memory in use stays where it was, whatever the number of calls.

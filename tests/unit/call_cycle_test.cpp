@@ -85,6 +85,115 @@ TEST_F(CallCycle, tries_the_endpoints_of_a_list_in_turn_on_connection_errors_onl
     EXPECT_EQ(SOAP_TCP_ERROR, proxy._get("http://down/ http://down/", nullptr, &request, response));
 }
 
+TEST_F(CallCycle, refuses_an_endpoint_that_leads_nowhere_before_anything_is_sent)
+{
+    static const char *const taken[] = {"http://h/",
+                                        "HTTPS://h",
+                                        "httpg://h:1/x",
+                                        "http://h:65535/a:b@c?d#e",
+                                        "http://[::1]:8080/a",
+                                        "http://[fe80::1%eth0]/",
+                                        "http://h_x-1.example",
+                                        " http://h/  http://i/ ",
+                                        "h:80/x",
+                                        "h/x//y"}; // no scheme, which is plain XML without HTTP
+    static const char *const refused[] = {"",
+                                          " ",
+                                          "http:",
+                                          "http:h/x",
+                                          "https:443/",
+                                          "http://",
+                                          "http:///x",
+                                          "https://:443/",
+                                          "http://[]/",
+                                          "http://[::1",
+                                          "http://[::1]x/",
+                                          "http://h:/",
+                                          "http://h:0/",
+                                          "http://h:65536/",
+                                          "http://h:4294967376/",
+                                          "http://h:-1/",
+                                          "http://h:+80/",
+                                          "http://h:8x/",
+                                          "http://h:80?q",
+                                          "http://h?q=http://i/",
+                                          "http://h#f",
+                                          "http://h\\i/",
+                                          "htps://h/",
+                                          "ftp://h/",
+                                          "HTTPG://h/",
+                                          "h/x?q=http://i/"};
+    static const struct {
+        const char *endpoint, *quoted;
+    } told_otherwise[] = {{"http://h/ htps://i/ http://j/", "htps://i/"},
+                          {"http://h/a\tb", "http://h/a?b"},
+                          {"http://h\r\nX: y/", "http://h??X:"},
+                          {"http://u:pw@h/", "http://...@h/"},
+                          {"https://u:p@w@h:443/x@y", "https://...@h:443/x@y"}};
+    const auto call_at = [this](const char *endpoint) {
+        wire.opened = 0;
+        wire.sent.clear();
+        wire.answers = {http_answer(envelope(OK))};
+        return proxy._get(endpoint, nullptr, &request, response);
+    };
+    const auto refuses = [&](const char *endpoint, const std::string &quoted) {
+        EXPECT_EQ(SOAP_TCP_ERROR, call_at(endpoint)) << endpoint;
+        const std::string text = proxy.soap_fault_string() ? proxy.soap_fault_string() : "";
+        EXPECT_EQ(0u, text.find("No call can go to \"" + quoted + "\": ")) << text;
+        EXPECT_EQ(0, wire.opened) << endpoint;
+        EXPECT_EQ("", wire.sent) << endpoint;
+    };
+    for (const char *endpoint : taken)
+        EXPECT_EQ(0, call_at(endpoint)) << endpoint;
+    for (const char *endpoint : refused)
+        refuses(endpoint, endpoint);
+    for (const auto &c : told_otherwise)
+        refuses(c.endpoint, c.quoted);
+    proxy.legacy = LEGACY_ANY_ENDPOINT;
+    EXPECT_EQ(0, call_at("htps://h:99999/"));
+    EXPECT_EQ(0, call_at("")) << "by descriptor, or the hooks in its place";
+}
+
+TEST_F(CallCycle, a_failure_is_never_told_by_the_fault_of_an_earlier_call)
+{
+    static const struct {
+        const char *rule;
+        void (*fail)(ProfileSoapBindingProxy &failing);
+        const char *text;
+    } cases[] = {
+        {"no answer", [](ProfileSoapBindingProxy &) {},
+         "End of file or no input: Operation interrupted or timed out"},
+        {"not sent",
+         [](ProfileSoapBindingProxy &failing) {
+             failing.on_send = [](soap *, const char *, std::size_t) { return -1; };
+         },
+         "End of file or no input: Operation interrupted or timed out"},
+        {"refused by a hook",
+         [](ProfileSoapBindingProxy &failing) {
+             failing.on_connect = [](soap *, const char *, const char *, int) { return 99; };
+         },
+         "Error 99"},
+        {"not counted",
+         [](ProfileSoapBindingProxy &failing) {
+             failing.on_send_prepare_begin = [](soap *ctx) { return ctx->error = SOAP_USER_ERROR; };
+         },
+         "User data error"},
+    };
+    for (const auto &c : cases) {
+        ASSERT_EQ(SOAP_CLIENT_FAULT, get(fault_11("E:Client", "<detail><x/></detail>"))) << c.rule;
+        c.fail(proxy);
+        EXPECT_NE(0, proxy.get(&request, response)) << c.rule;
+        std::ostringstream printed;
+        proxy.soap_stream_fault(printed);
+        EXPECT_EQ("SOAP-ENV:Client [no subcode]\n\"" + std::string(c.text) + "\"\nDetail: [no detail]\n",
+                  printed.str().substr(printed.str().find("SOAP-ENV")))
+            << c.rule;
+        proxy.on_connect = nullptr;
+        proxy.on_send_prepare_begin = nullptr;
+        wire.carry(proxy);
+    }
+}
+
 TEST_F(CallCycle, keeps_a_connection_when_asked_and_only_after_a_whole_answer)
 {
     proxy.input_mode = proxy.output_mode = MODE_KEEP_ALIVE;
@@ -144,6 +253,137 @@ TEST_F(CallCycle, reads_the_detail_into_typed_members_then_an_object_then_raw_te
     EXPECT_EQ(0u,
               printed.str().find("SOAP 1.1 fault: SOAP-ENV:Client [no subcode]\n\"no such thing\"\nDetail: "))
         << printed.str();
+}
+
+// What could be read of a detail, as one text.
+std::string told_by(const SOAP_ENV__Detail *detail)
+{
+    if (!detail)
+        return "none";
+    std::string told;
+    if (const auto *port = detail->Client_x002eDataPortIncompatibility)
+        told += "port " + (port->description ? *port->description : "") + " " +
+                std::to_string(port->transport.size()) + ";";
+    if (const auto *lost = detail->Client_x002eObjectNotFound)
+        told += "lost " + (lost->uri.empty() ? "" : lost->uri[0]) + ";";
+    return told +
+           (detail->fault    ? "object;"
+            : detail->__type ? "a type of nothing;"
+                             : "") +
+           (detail->__any ? "raw" : "");
+}
+
+// Neither does it end the connection: the next call goes through it.
+TEST_F(CallCycle, a_bad_value_does_not_hide_the_fault)
+{
+    const std::string port = "<c:Client.DataPortIncompatibility><c:description>d</c:description>",
+                      port_end = "<c:transport>HTTP</c:transport></c:Client.DataPortIncompatibility>",
+                      bad = "<c:direction>sideways</c:direction>", lost = "<c:Client.ObjectNotFound>",
+                      found = "<c:uri>u</c:uri></c:Client.ObjectNotFound>",
+                      other = "<c:Attachment><c:state>odd</c:state></c:Attachment>";
+    const struct {
+        const char *rule;
+        std::string detail, told;
+        std::uint32_t mode = 0;
+        const char *header = "";
+    } cases[] = {
+        {"an enumeration", port + bad + port_end + lost + found, "port d 1;lost u;"},
+        {"several", port + bad + "<c:authentication/>" + bad + port_end, "port d 1;"},
+        {"deep within", lost + "<c:detail><c:fault>" + other + "</c:fault></c:detail>" + found, "lost u;"},
+        {"of an object of another class", other + lost + found, "lost u;"},
+        {"an object of another class and raw XML", other + "<x><y/></x>", "raw"},
+        {"unknown elements in strict mode", lost + "<c:x><y>1</y></c:x>" + found + "<x/><y/><z/>",
+         "lost u;raw", MODE_STRICT},
+        {"another type", port + "<c:direction xsi:type=\"c:Transport\">in<z/></c:direction>" + port_end,
+         "port d 1;"},
+        {"what must be understood", "<x/><y E:mustUnderstand=\"1\"><z/></y>" + lost + found, "lost u;raw"},
+        {"one id twice", "<x/>" + lost + "<c:detail id=\"i\"/><c:detail id=\"i\"><a>b</a></c:detail>" + found,
+         "lost u;raw"},
+        {"in the header", lost + found, "lost u;", 0,
+         "<E:Header><c:header><c:credentials><c:state>odd</c:state><c:x/></c:credentials></c:header></"
+         "E:Header>"},
+    };
+    proxy.output_mode = MODE_KEEP_ALIVE;
+    for (const char *version : {ENVELOPE_11, ENVELOPE_12})
+        for (const auto &c : cases) {
+            SCOPED_TRACE(c.rule);
+            const bool v12 = version == ENVELOPE_12;
+            proxy.input_mode = MODE_KEEP_ALIVE | c.mode;
+            std::string fault = v12 ? fault_12("E:Receiver") : fault_11("E:Server", "<detail></detail>");
+            const std::size_t start = fault.find(v12 ? "<E:Detail>" : "<detail>") + (v12 ? 10 : 8);
+            fault.replace(start, fault.find(v12 ? "</E:Detail>" : "</detail>") - start, c.detail);
+            wire.answers.push_back(http_answer(envelope(fault, version, c.header)));
+            EXPECT_EQ(SOAP_SERVER_FAULT, proxy.get(&request, response));
+            EXPECT_STREQ("no such thing", proxy.soap_fault_string());
+            ASSERT_NE(nullptr, proxy.soap_fault());
+            EXPECT_EQ(c.told, told_by(v12 ? proxy.soap_fault()->Detail : proxy.soap_fault()->detail));
+            EXPECT_EQ(0, get(OK, version));
+            EXPECT_EQ(1, wire.opened);
+        }
+    wire.answers.push_back(http_answer(envelope(OK, ENVELOPE_11, cases[std::size(cases) - 1].header)));
+    EXPECT_EQ(SOAP_TYPE_MISMATCH, proxy.get(&request, response)) << "without a fault it is the error";
+    EXPECT_EQ(SOAP_TAG_MISMATCH, get("<E:Fault><faultcode>E:Server</faultcode><detail></x"))
+        << "broken XML is no fault";
+}
+
+// Parts of a fault may stand behind it, as those of any object.
+TEST_F(CallCycle, the_references_of_a_fault_are_followed)
+{
+    const std::string detail = "<c:Client.ObjectNotFound><c:uri>u</c:uri></c:Client.ObjectNotFound>",
+                      code = "<faultcode>E:Server</faultcode>", text = "<faultstring>t</faultstring>";
+    const struct {
+        const char *rule, *version;
+        std::string body, string, told;
+        int error = SOAP_SERVER_FAULT;
+    } cases[] = {
+        {"the detail", ENVELOPE_11,
+         "<E:Fault>" + code + text + "<detail href=\"#d\"/></E:Fault><detail id=\"d\">" + detail +
+             "</detail>",
+         "t", "lost u;"},
+        {"the detail, with an end tag, and bad values behind the fault", ENVELOPE_11,
+         "<E:Fault>" + code + "<detail href=\"#d\"></detail>" + text +
+             "</E:Fault><c:Attachment><c:state>odd</c:state></c:Attachment><x/><m id=\"d\"><c:Attachment>"
+             "<c:state>odd</c:state></c:Attachment>" +
+             detail + "</m>",
+         "t", "lost u;"},
+        {"all parts", ENVELOPE_11,
+         "<E:Fault><faultcode href=\"#c\"/><faultstring href=\"#t\"/><detail href=\"#d\"/></E:Fault>"
+         "<m id=\"d\">" +
+             detail + "</m><m id=\"t\">t</m><m id=\"c\">E:Server</m>",
+         "t", "lost u;"},
+        {"what the detail holds", ENVELOPE_11,
+         "<E:Fault>" + code + text +
+             "<detail><c:Client.ObjectNotFound href=\"#o\"/></detail></E:Fault>"
+             "<m id=\"o\"><c:uri>u</c:uri></m>",
+         "t", "lost u;"},
+        {"to nothing, beside others", ENVELOPE_11,
+         "<E:Fault>" + code +
+             "<faultstring href=\"#t\"/><faultactor href=\"#a\"/><detail href=\"#d\"/></E:Fault>"
+             "<m id=\"d\">" +
+             detail + "</m><m id=\"t\">t</m>",
+         "t", "lost u;"},
+        {"nil, not a reference", ENVELOPE_11,
+         "<E:Fault>" + code + text + "<detail xsi:nil=\"true\"/></E:Fault>", "t", "none"},
+        {"in SOAP 1.2", ENVELOPE_12,
+         "<E:Fault xmlns:s=\"http://www.w3.org/2003/05/soap-encoding\"><E:Code><E:Value>E:Receiver</E:Value>"
+         "</E:Code><E:Reason s:ref=\"r\"/><E:Detail s:ref=\"d\"/></E:Fault>"
+         "<m xmlns:s=\"http://www.w3.org/2003/05/soap-encoding\" id=\"d\">" +
+             detail +
+             "</m><m xmlns:s=\"http://www.w3.org/2003/05/soap-encoding\" id=\"r\"><E:Text>t</E:Text></m>",
+         "t", "lost u;"},
+    };
+    proxy.input_mode = proxy.output_mode = MODE_KEEP_ALIVE;
+    for (const auto &c : cases) {
+        SCOPED_TRACE(c.rule);
+        EXPECT_EQ(c.error, get(c.body, c.version));
+        const SOAP_ENV__Fault *const fault = proxy.soap_fault();
+        ASSERT_NE(nullptr, fault);
+        EXPECT_EQ(c.string, std::string(proxy.soap_fault_string() ? proxy.soap_fault_string() : "(null)"));
+        EXPECT_EQ(c.told, told_by(fault->Code ? fault->Detail : fault->detail));
+        EXPECT_TRUE(!fault->faultactor || !*fault->faultactor);
+        EXPECT_EQ(0, get(OK, c.version));
+        EXPECT_EQ(1, wire.opened);
+    }
 }
 
 TEST_F(CallCycle, an_answer_without_the_response_ends_with_the_readers_error)
@@ -216,14 +456,25 @@ TEST_F(CallCycle, answers_outlive_later_calls_until_destroy)
     EXPECT_EQ("urn:2", response.result->thisURI.at(0));
 }
 
-TEST_F(CallCycle, a_cyclic_document_ends_the_count_before_anything_is_sent)
+TEST_F(CallCycle, what_cannot_be_written_is_refused_before_anything_is_sent)
 {
-    protocolProfile__ProfileContent document;
-    document.profile = {&document};
+    protocolProfile__ProfileContent cyclic, unspeakable;
+    cyclic.profile = {&cyclic};
+    unspeakable.thisURI = {"urn:\x01"};
     __protocolProfile__setResponse set;
-    EXPECT_EQ(SOAP_LENGTH, proxy.set(&document, set));
-    EXPECT_EQ(0, wire.opened);
-    EXPECT_TRUE(wire.sent.empty());
+    for (const std::uint32_t mode : {MODE_DIRECT, MODE_BUFFERED, MODE_STORE, MODE_CHUNKED}) {
+        proxy.output_mode = mode;
+        EXPECT_EQ(SOAP_LENGTH, proxy.set(&cyclic, set));
+        EXPECT_EQ(mode == MODE_CHUNKED, wire.sent.size() > SOAP_BUFFER_SIZE);
+        wire.sent.clear();
+        EXPECT_EQ(SOAP_UTF_ERROR, proxy.set(&unspeakable, set));
+        EXPECT_NE(std::string::npos, std::string(proxy.soap_fault_string()).find("U+0001"));
+        EXPECT_EQ(mode < MODE_STORE ? 0 : wire.closed, wire.opened);
+        // In chunks the head is gone by then, and the body stays without an end.
+        EXPECT_EQ(mode == MODE_CHUNKED ? "\r\n\r\n" : "",
+                  wire.sent.substr(std::max<std::size_t>(wire.sent.size(), 4) - 4));
+        EXPECT_EQ(std::string::npos, wire.sent.find("Envelope"));
+    }
 }
 
 // As after any other failure: attachments belong to one call.

@@ -2,19 +2,27 @@
 #include <zuv_client_pro/soap.h>
 
 #include <cstring>
+#include <functional>
 #include <memory>
 #include <string>
+#include <vector>
 
 #include <fcntl.h>
 #include <gtest/gtest.h>
+#include <netinet/in.h>
 #include <openssl/ssl.h>
 #include <sys/socket.h>
 #include <unistd.h>
 
+#include <zuv_client_pro/ProfileSoapBindingProxy.h>
+#include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_log.h>
 #include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_tcp.h>
+#include <zuv_client_pro/soap_tls.h>
+#include <zuv_client_pro/soap_xml.h>
 
 #include "support/failing_malloc.h"
 
@@ -128,10 +136,7 @@ TEST(Context, TheScratchOfACallIsFreedWhole)
     CaptureStderr();
     {
         soap ctx;
-        auto *attribute = static_cast<soap_attribute *>(SOAP_MALLOC(&ctx, sizeof(soap_attribute)));
-        *attribute = {};
-        attribute->value = static_cast<char *>(SOAP_MALLOC(&ctx, 8));
-        ctx.attribute_list = attribute;
+        ASSERT_EQ(soap_attr_set(&ctx, "a", "value", 1), 0);
         auto *reference = static_cast<soap_attachment_ref *>(SOAP_MALLOC(&ctx, sizeof(soap_attachment_ref)));
         *reference = {};
         ctx.mtom_list = reference;
@@ -238,17 +243,188 @@ TEST(ContextCopy, OutlivesItsSource)
     EXPECT_EQ(GetCapturedStderr(), "");
 }
 
-TEST(ContextCopy, LeavesTheTlsContextToItsSource)
+TEST(ContextCopy, SharesTheTlsContextWhicheverOfThemEndsFirst)
 {
-    soap source;
-    source.tls_context = SSL_CTX_new(TLS_client_method());
-    {
-        soap copy(source);
-        EXPECT_EQ(copy.tls_context, source.tls_context);
-    }
-    SSL *connection = SSL_new(source.tls_context);
+    auto source = std::make_unique<soap>();
+    source->tls_context = SSL_CTX_new(TLS_client_method());
+    soap copy(*source);
+    soap_context_free(soap_context_copy(&copy));
+    source.reset();
+    SSL *connection = SSL_new(copy.tls_context);
     EXPECT_NE(connection, nullptr);
     SSL_free(connection);
+}
+
+TEST(ContextCopy, FreesWhatItsTargetHeldAndTheTlsContextThatItMakes)
+{
+    const soap source;
+    const auto held_by = [](const std::function<void()> &round) {
+        round(); // what a process makes but once
+        const std::ptrdiff_t before = failing_malloc::held();
+        round();
+        return failing_malloc::held() - before;
+    };
+    EXPECT_EQ(held_by([&] {
+                  soap target;
+                  soap_string_dup(&target, "its own");
+                  soap_log_set_sent(&target, "sent.log");
+                  EXPECT_EQ(soap_context_copy(&target, &source), &target);
+                  EXPECT_EQ(soap_context_copy(&target, &source), &target);
+              }),
+              0);
+    EXPECT_EQ(held_by([&] {
+                  soap copy(source);
+                  EXPECT_EQ(soap_ssl_client_context(&copy, TLS_NO_DEFAULT_CA, nullptr, nullptr, nullptr,
+                                                    nullptr, nullptr),
+                            0);
+              }),
+              0);
+}
+
+// --- connections ---
+
+bool is_open(int descriptor)
+{
+    return fcntl(descriptor, F_GETFD) != -1;
+}
+
+// A proxy in the middle of its life: connected, the last answer's rest unread, with a fault and a header.
+struct busy_proxy {
+    busy_proxy() : proxy("http://host/", static_cast<int>(MODE_KEEP_ALIVE))
+    {
+        EXPECT_EQ(socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends), 0);
+        soap_log_set_sent(&proxy, "/dev/null");
+        proxy.socket = ends[0];
+        proxy.keep_alive = 1;
+        proxy.input_mode |= MODE_TLS;
+        proxy.output_mode |= MODE_TLS;
+        proxy.response_unfinished = true;
+        proxy.buffer_index = 2;
+        proxy.buffer_length = 9;
+        soap_fault_sender(&proxy, tcp_error_text(&proxy), "detail", 77);
+    }
+    ~busy_proxy() { close(ends[1]); }
+
+    int ends[2] = {};
+    ProfileSoapBindingProxy proxy;
+};
+
+void expect_no_connection(const soap &made, const char *how)
+{
+    EXPECT_EQ(made.socket, -1) << how;
+    EXPECT_EQ(made.keep_alive, 0) << how;
+    EXPECT_EQ(made.input_mode, MODE_KEEP_ALIVE) << how;
+    EXPECT_EQ(made.output_mode, MODE_KEEP_ALIVE) << how;
+    EXPECT_FALSE(made.response_unfinished) << how;
+    EXPECT_EQ(made.buffer_index + made.buffer_length, 0u) << how;
+    EXPECT_STREQ(made.log_paths[SOAP_LOG_SENT], "/dev/null") << how;
+}
+
+TEST(ContextCopy, StartsWithoutAConnectionHoweverItIsMade)
+{
+    static const struct {
+        const char *how;
+        std::unique_ptr<soap> (*make)(const ProfileSoapBindingProxy &source);
+    } cases[] = {
+        {"context of a proxy",
+         [](const ProfileSoapBindingProxy &source) { return std::make_unique<soap>(source); }},
+        {"proxy of a context",
+         [](const ProfileSoapBindingProxy &source) -> std::unique_ptr<soap> {
+             return std::make_unique<ProfileSoapBindingProxy>(static_cast<const soap &>(source));
+         }},
+        {"proxy of a proxy",
+         [](const ProfileSoapBindingProxy &source) -> std::unique_ptr<soap> {
+             auto made = std::make_unique<ProfileSoapBindingProxy>(source);
+             EXPECT_EQ(made->endpoint, nullptr);
+             return made;
+         }},
+        {"soap_context_copy",
+         [](const ProfileSoapBindingProxy &source) {
+             auto made = std::make_unique<soap>();
+             EXPECT_EQ(soap_context_copy(made.get(), &source), made.get());
+             return made;
+         }},
+    };
+    for (const auto &c : cases) {
+        busy_proxy busy;
+        {
+            const std::unique_ptr<soap> made = c.make(busy.proxy);
+            expect_no_connection(*made, c.how);
+            EXPECT_NE(made->log_paths[SOAP_LOG_SENT], busy.proxy.log_paths[SOAP_LOG_SENT]) << c.how;
+        }
+        EXPECT_TRUE(is_open(busy.ends[0])) << c.how;
+        EXPECT_EQ(busy.proxy.socket, busy.ends[0]) << c.how;
+    }
+}
+
+TEST(ContextMove, TakesAllButTheConnection)
+{
+    CaptureStderr();
+    static int closed;
+    closed = 0;
+    busy_proxy busy;
+    busy.proxy.on_close_socket = [](soap *, int socket) {
+        ++closed;
+        return close(socket);
+    };
+    const char *const text = soap_string_dup(&busy.proxy, "managed");
+    busy.proxy.auth_user = text;
+    std::vector<ProfileSoapBindingProxy> proxies;
+    proxies.push_back(std::move(busy.proxy));
+    EXPECT_EQ(closed, 1);
+    EXPECT_FALSE(is_open(busy.ends[0]));
+    for (int i = 0; i < 3; ++i)
+        proxies.emplace_back("http://other/"); // the vector grows
+    expect_no_connection(proxies.front(), "moved");
+    EXPECT_STREQ(proxies.front().endpoint, "http://host/");
+    EXPECT_EQ(proxies.front().state, 1) << "an original, not a copy";
+    EXPECT_EQ(proxies.front().auth_user, text);
+    EXPECT_STREQ(proxies.front().soap_fault_string(), "Operation interrupted or timed out");
+    EXPECT_STREQ(proxies.front().soap_fault_detail(), "detail");
+    EXPECT_EQ(busy.proxy.socket, -1); // NOLINT(bugprone-use-after-move): as a new one
+    EXPECT_EQ(busy.proxy.endpoint, nullptr);
+    EXPECT_STREQ(soap_string_dup(&busy.proxy, "serves on"), "serves on");
+    proxies.clear();
+    EXPECT_EQ(closed, 1);
+    EXPECT_EQ(GetCapturedStderr(), "") << "nothing leaks, nothing is freed twice";
+}
+
+TEST(ContextCopy, ServesTheConnectionThatItsSourceAcceptedAndClosesOnlyThat)
+{
+    soap service(MODE_KEEP_ALIVE), client;
+    ASSERT_GE(soap_bind(&service, "127.0.0.1", 0, 5), 0);
+    sockaddr_in address{};
+    socklen_t size = sizeof address;
+    getsockname(service.master_socket, reinterpret_cast<sockaddr *>(&address), &size);
+    for (const bool refused : {false, true}) {
+        ASSERT_GE(tcp_connect(&client, "http://x/", "127.0.0.1", ntohs(address.sin_port)), 0);
+        ASSERT_GE(soap_accept(&service), 0);
+        soap *copy = nullptr;
+        if (refused) {
+            const failing_malloc::scope armed(4, failing_malloc::refuse::all_from);
+            copy = soap_context_copy(&service);
+        } else {
+            copy = soap_context_copy(&service);
+            const ProfileSoapBindingProxy caller(service); // no service's copy
+            EXPECT_EQ(caller.socket, -1);
+        }
+        ASSERT_EQ(copy == nullptr, refused);
+        EXPECT_TRUE(is_open(service.socket));
+        if (refused) {
+            tcp_disconnect(&service);
+            continue;
+        }
+        EXPECT_EQ(copy->socket, service.socket);
+        EXPECT_EQ(copy->keep_alive, 1);
+        service.socket = -1;
+        ASSERT_GE(soap_bind(copy, "127.0.0.1", 0, 1), 0);
+        EXPECT_TRUE(is_open(service.master_socket)) << "a copy's own listening leaves the source's alone";
+        const int own = copy->master_socket, accepted = copy->socket;
+        soap_context_free(copy);
+        EXPECT_FALSE(is_open(own));
+        EXPECT_FALSE(is_open(accepted));
+    }
+    EXPECT_TRUE(is_open(service.master_socket));
 }
 
 TEST(ContextExhausted, StartAndCopySurviveEveryRefusal)

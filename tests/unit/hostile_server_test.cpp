@@ -280,19 +280,17 @@ TEST_F(hostile_server, costs_the_call_and_nothing_more)
 
 TEST_F(hostile_server, cuts_an_answer_at_every_byte)
 {
-    const std::string name = "call-1", body = answer_body(name);
-    const std::string wholes[] = {with_length(body), in_chunks(body)};
+    std::string (*const framings[])(const std::string &body) = {
+        with_length, [](const std::string &body) { return in_chunks(body); }};
     for (const bool tls : {false, true}) {
-        for (const std::string &whole : wholes) {
+        for (const auto framing : framings) {
+            const std::string whole = framing(answer_body(A_NAME));
             // From here on the answer is there; what lacks is white space and the end of the framing.
-            const std::size_t sufficient = whole.find("Envelope>", whole.find("</E:Body>")) + 9;
+            const std::size_t sufficient = whole.rfind('>') + 1;
             int early = 0, answered = 0;
             for (std::size_t cut = 0; cut < whole.size(); cut += tls ? 5 : 1) {
                 const server one(
-                    [&](line &end) {
-                        end.request();
-                        end.send(whole.substr(0, cut));
-                    },
+                    [&](line &end) { end.send(framing(answer_body(name_in(end.request()))).substr(0, cut)); },
                     tls);
                 client caller(one);
                 const int code = caller.call();
@@ -303,8 +301,8 @@ TEST_F(hostile_server, cuts_an_answer_at_every_byte)
                 ASSERT_EQ(caller.call(), 0) << cut;
                 ASSERT_EQ(caller.connections, 2) << "a cut answer ends the connection";
             }
-            std::printf("%s, %s: %d cuts are errors, %d behind the envelope aren't\n", tls ? "TLS" : "TCP",
-                        &whole == wholes ? "a length" : "chunks", early, answered);
+            std::printf("%s, %s: %d cuts are errors, %d after the envelope aren't\n", tls ? "TLS" : "TCP",
+                        framing == framings[0] ? "a length" : "chunks", early, answered);
         }
     }
 }
@@ -362,8 +360,7 @@ TEST_F(hostile_server, meets_a_call_before_its_answer)
         client caller(well);
         const std::string endpoint =
             (o.tls ? "https://peer.test:" : "http://peer.test:") + std::to_string(peer.port()) + "/";
-        const char *const good = caller.proxy.endpoint;
-        caller.proxy.endpoint = endpoint.c_str();
+        const std::string good = std::exchange(caller.endpoint, endpoint);
         caller.proxy.connect_timeout = 1;
         caller.proxy.send_timeout = BRIEF_US;
         const int code = caller.call(o.padding);
@@ -377,8 +374,65 @@ TEST_F(hostile_server, meets_a_call_before_its_answer)
         }
         EXPECT_GE(milliseconds, o.least_ms) << o.name;
         EXPECT_LT(milliseconds, o.least_ms + SLACK_MS) << o.name;
-        caller.proxy.endpoint = good;
+        caller.endpoint = good;
         EXPECT_EQ(caller.call(), 0) << o.name;
+    }
+}
+
+// A call whose peer's bytes come one by one, each taking seconds by the clock.
+struct drip_case {
+    const char *rule;
+    const char *scheme; // of the endpoint
+    bool kept;          // drips only on a kept connection
+    bool proxy;         // between
+    int call_limit;     // seconds; no limit of a single step is met by drops
+    int code;
+    const char *text; // of the fault; null: none
+};
+
+constexpr const char *CALL_OVER =
+    "End of file or no input: Operation interrupted or timed out (5 s call limit)";
+constexpr const char *CONNECT_OVER = "Operation interrupted or timed out (5 s call limit)";
+
+const drip_case DRIPS[] = {
+    {"answer, no limit", "http", true, false, 0, 0, nullptr},
+    {"answer", "http", true, false, 5, SOAP_EOF, CALL_OVER},
+    {"answer, TLS, no limit", "https", true, false, 0, 0, nullptr},
+    {"answer, TLS", "https", true, false, 5, SOAP_EOF, CALL_OVER},
+    {"handshake", "https", false, false, 0, SOAP_TCP_ERROR, "Timeout"},
+    {"handshake within a call", "https", false, false, 5, SOAP_TCP_ERROR, CONNECT_OVER},
+    {"CONNECT", "https", false, true, 0, SOAP_TCP_ERROR, "Timeout"},
+    {"CONNECT within a call", "https", false, true, 5, SOAP_TCP_ERROR, CONNECT_OVER},
+};
+
+TEST_F(hostile_server, is_left_in_time_though_it_drips)
+{
+    for (const drip_case &c : DRIPS) {
+        const loopback::peer proxy([](int socket) {
+            loopback::read_head(socket);
+            loopback::write_text(socket, "HTTP/1.1 200 OK\r\nX: " + std::string(500, 'x') + "\r\n\r\n");
+            loopback::read_head(socket);
+        });
+        const server one(serve_well, c.scheme == std::string("https"));
+        client caller(one);
+        caller.proxy.call_timeout = c.call_limit;
+        if (c.proxy) {
+            caller.proxy.proxy_host = "127.0.0.1";
+            caller.proxy.proxy_port = proxy.port();
+        }
+        if (c.kept) {
+            EXPECT_EQ(caller.call(), 0) << c.rule;
+        }
+        EXPECT_EQ(caller.proxy.call_deadline, 0) << "the time between calls is nobody's";
+        socket_calls::drips = true;
+        socket_calls::call_takes_us = 1000000;
+        EXPECT_EQ(caller.call(), c.code) << c.rule;
+        socket_calls::reset();
+        soap_fault_text_fill(&caller.proxy);
+        EXPECT_STREQ(c.text ? caller.proxy.soap_fault_string() : nullptr, c.text) << c.rule;
+        std::printf("%-25s code %2d, %3d s\n", c.rule, caller.proxy.error, caller.milliseconds / 1000);
+        caller.proxy.proxy_host = nullptr;
+        EXPECT_EQ(caller.call(), 0) << c.rule;
     }
 }
 
@@ -394,6 +448,29 @@ TEST_F(hostile_server, is_called_again_after_a_forced_close)
         EXPECT_EQ(caller.proxy.soap_force_close_socket(), 0) << "and is not closed again";
         EXPECT_EQ(caller.call(), 0);
         EXPECT_EQ(caller.connections, 2);
+    }
+}
+
+TEST_F(hostile_server, is_none_to_the_copies_of_a_connected_proxy)
+{
+    for (const bool tls : {false, true}) {
+        const std::string where = "tls " + std::to_string(tls);
+        const crowd_server one(tls);
+        client caller(one);
+        ASSERT_EQ(caller.call(), 0) << where;
+        const int socket = caller.proxy.socket;
+        {
+            const ProfileSoapBindingProxy idle(caller.proxy);
+        }
+        std::vector<ProfileSoapBindingProxy> copies;
+        copies.emplace_back(static_cast<const soap &>(caller.proxy));
+        EXPECT_EQ(caller.call_through(copies.front()), 0) << where;
+        copies.emplace_back(caller.proxy); // grows: the first one moves and ends its connection
+        for (ProfileSoapBindingProxy &copy : copies)
+            EXPECT_EQ(caller.call_through(copy), 0) << where;
+        EXPECT_EQ(caller.call(), 0) << where;
+        EXPECT_EQ(caller.proxy.socket, socket) << where;
+        EXPECT_EQ(caller.connections, 4) << where;
     }
 }
 

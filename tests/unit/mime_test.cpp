@@ -220,6 +220,7 @@ TEST(mime_in, reports_what_is_wrong_with_a_message)
         {"epilogue", a + END + "\r\nepilogue", 0},
         {"something behind the boundary", "\r\n--bbb\r\n\r\nx" + a + END, SOAP_MIME_ERROR},
         {"two of one id", a + a + END, SOAP_MIME_ERROR},
+        {"two of one id, spelled differently", a + part("Content-ID: %61\r\n", "y") + END, SOAP_MIME_ERROR},
         {"one dash", a + "\r\n--bb-\r\n", SOAP_MIME_ERROR},
         {"no end", a, SOAP_EOF},
         {"a line of a head too long", part("Content-ID: " + std::string(2000, 'i') + "\r\n", "x") + END,
@@ -246,7 +247,7 @@ TEST(mime_in, mtom_needs_no_mode_of_the_host_when_the_part_or_the_message_says_s
         {"<data>\r\n " + include + "/> </data>", "[cid:a%20b (null) x]"},
         {"<data>" + include + "> </xop:Include></data>", "[cid:a%20b (null) x]"},
         {"<data> eA== </data>", "[(null) (null) x]"},
-        {"<data/>", "[(null) (null) (null)]"},
+        {"<data/>", "[(null) (null) ]"},
         {"<data><xop:Include xmlns:xop=\"u\"/></data>", NO_REFERENCE},
         {"<data><xop:Include xmlns:xop=\"u\" href=\"cid:c\"/></data>", NO_REFERENCE},
     };
@@ -450,7 +451,8 @@ TEST(values, over_one_buffer_go_out_each_in_its_form)
                  {nullptr, "c/d", nullptr, 10, 2},   {"cid:x", nullptr, nullptr, 10, 3},
                  {"cid:y", "a/b", some, 10, 4},      {"cid:y", "a/b", same, 10, 4},
                  {"cid:z", "a/b", nullptr, 4, 5},    {nullptr, nullptr, nullptr, 4, 0},
-                 {nullptr, "a/b", some, 10, 6}};
+                 {nullptr, "a/b", some, 10, 6},      {"", "a/b", nullptr, 10, 1},
+                 {"", nullptr, nullptr, 10, 0}};
     for (const std::uint32_t mode :
          {FORMS[0], FORMS[1], FORMS[0] | SOAP_XML_GRAPH, FORMS[1] | SOAP_XML_GRAPH})
         for (const auto &one : forms)
@@ -472,8 +474,9 @@ TEST(values, over_one_buffer_go_out_each_in_its_form)
                     const value &sent = values[i], &got = read.values[i];
                     EXPECT_EQ(got.bytes(), sent.bytes()) << wire.sent();
                     EXPECT_EQ(text(got.type), text(sent.type)) << wire.sent();
-                    EXPECT_EQ(got.id != nullptr, sent.id != nullptr || sent.type != nullptr) << wire.sent();
-                    EXPECT_TRUE(sent.id == nullptr || text(sent.id) == got.id) << wire.sent();
+                    const bool has_id = sent.id != nullptr && *sent.id != '\0';
+                    EXPECT_EQ(got.id != nullptr, has_id || sent.type != nullptr) << wire.sent();
+                    EXPECT_TRUE(!has_id || text(sent.id) == got.id) << wire.sent();
                     EXPECT_EQ(got.options != nullptr, sent.options != nullptr && (mode & MODE_MTOM) == 0);
                 }
                 attachments.erase(0);
@@ -515,6 +518,7 @@ TEST(attachments, of_one_id_are_refused_by_the_writer)
         {"a value's and the host's part", {a, b}, {"<b>"}, MTOM, SOAP_MIME_ERROR},
         {"without the brackets", {a, b}, {"b"}, MTOM, SOAP_MIME_ERROR},
         {"two of the host's", {a}, {"c", "c"}, 0, SOAP_DIME_ERROR},
+        {"two spellings of one id", {a}, {"<x@y>", "<x%40y>"}, MTOM, SOAP_MIME_ERROR},
         {"the message's part", {a}, {"<root>"}, MTOM, SOAP_MIME_ERROR},
     };
     for (const auto &c : cases)

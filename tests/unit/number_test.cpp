@@ -7,10 +7,14 @@
 #include <cmath>
 #include <cstdlib>
 #include <cstring>
+#include <filesystem>
+#include <fstream>
 #include <memory>
 #include <random>
 #include <string>
 #include <vector>
+
+#include <unistd.h>
 
 #include <gtest/gtest.h>
 
@@ -119,19 +123,31 @@ TEST_F(Numbers, FloatingTextIsWhatTheCLibraryTakesAndNamesInAnyCase)
 
 TEST_F(Numbers, TheHostsLocaleDoesNotReachTheWire)
 {
-    const std::string before = std::setlocale(LC_ALL, nullptr);
-    const bool foreign = std::setlocale(LC_ALL, "de_DE.UTF-8") != nullptr;
+    // A locale of our own, as glibc keeps it, whose decimal point is "~": no machine need have it.
+    static const char CATEGORY[] =
+        "\x14\x11\x03\x20\x06\0\0\0\x20\0\0\0\x22\0\0\0\x23\0\0\0\x24\0\0\0\x28\0\0\0"
+        "\x2C\0\0\0~\0\0\0~\0\0\0\0\0\0\0ANSI_X3.4-1968";
+    const std::string place = testing::TempDir() + "number_test_" + std::to_string(::getpid());
+    std::filesystem::create_directories(place + "/zz_ZZ");
+    std::ofstream(place + "/zz_ZZ/LC_NUMERIC", std::ios::binary).write(CATEGORY, sizeof CATEGORY);
+    ::setenv("LOCPATH", place.c_str(), 1);
+    const bool foreign = std::setlocale(LC_NUMERIC, "zz_ZZ") != nullptr;
+    char shown[8] = "";
+    std::snprintf(shown, sizeof shown, "%.1f", 1.5);
     double plain = 0, by_library = 0;
     EXPECT_EQ(soap_double_parse(ctx.get(), "1.5", &plain), 0);
     EXPECT_EQ(soap_double_parse(ctx.get(), "+1.5 ", &by_library), 0);
-    const std::string text = soap_double_text(ctx.get(), 1.5);
-    std::setlocale(LC_ALL, before.c_str());
+    const std::string wide = soap_double_text(ctx.get(), 1.5), narrow = soap_float_text(ctx.get(), 0.25F);
+    std::setlocale(LC_NUMERIC, "C");
+    ::unsetenv("LOCPATH");
+    std::filesystem::remove_all(place);
+    ASSERT_TRUE(foreign && shown == std::string("1~5")) << shown;
     EXPECT_EQ(plain, 1.5);
     EXPECT_EQ(by_library, 1.5);
-    EXPECT_EQ(text, "1.5");
-    // Without that locale on the machine, a format with a comma stands for its printf.
-    ctx->double_format = "1,%.0f";
-    EXPECT_STREQ(soap_double_text(ctx.get(), 5), "1.5") << (foreign ? "" : "no German locale here");
+    EXPECT_EQ(wide, "1.5");
+    EXPECT_EQ(narrow, "0.25");
+    ctx->double_format = "1,%.0f"; // a host's own
+    EXPECT_STREQ(soap_double_text(ctx.get(), 5), "1.5");
 }
 
 TEST_F(Numbers, TextsGoThroughTheContextsFormats)

@@ -131,6 +131,15 @@ template <class S> void set_answer(operation &row, const std::shared_ptr<S> &res
     row.expect_answer = [response, ctx = row.ctx.get()] { expect_content(*response->result, *ctx); };
 }
 
+// The short form without a response: the null reference is the test's, which no sanitizer is to look at.
+template <class P, class R, class S>
+__attribute__((no_sanitize("undefined"))) int call_one_way(P &proxy, int (P::*short_form)(R *, S &),
+                                                           R *request)
+{
+    auto *nowhere = reinterpret_cast<S *>(static_cast<std::uintptr_t>(0));
+    return (proxy.*short_form)(request, *nowhere);
+}
+
 // An operation of a proxy.
 template <class P, class R, class S>
 operation proxy_row(operation row, int (P::*short_form)(R *, S &),
@@ -142,10 +151,9 @@ operation proxy_row(operation row, int (P::*short_form)(R *, S &),
     row.call = [=, p = proxy.get()](const operation &own, const char *action, bool reads) {
         R *const request = request_of<R>(own, p);
         response->result = nullptr;
-        auto *nowhere = reinterpret_cast<S *>(static_cast<std::uintptr_t>(0));
-        S &target = reads ? *response : *nowhere;
-        const int error = action ? (p->*full_form)(OTHER_PLACE, action, request, target)
-                                 : (p->*short_form)(request, target);
+        const int error = action  ? (p->*full_form)(OTHER_PLACE, action, request, *response)
+                          : reads ? (p->*short_form)(request, *response)
+                                  : call_one_way(*p, short_form, request);
         return outcome{error, response->result != nullptr};
     };
     set_answer(row, response);
@@ -289,12 +297,10 @@ TEST(Ports, send_the_golden_request_and_read_the_answer_into_its_class)
         ASSERT_TRUE(got.answered);
         row.expect_answer();
         EXPECT_EQ((row.ctx->output_mode & MODE_KEEP_ALIVE) ? 0 : 1, row.wire->closed);
-#ifndef ZUV_SANITIZED // the sanitizers don't let a null reference through
         row.connect("never read");
         EXPECT_EQ(0, row.call(row, nullptr, false).error) << "without a response record";
         EXPECT_EQ(request.whole(), row.wire->sent);
         EXPECT_EQ("never read", row.wire->answers.at(0));
-#endif
         // Full forms take an endpoint and an action, and change nothing else.
         row.connect(answer(row));
         EXPECT_EQ(0, row.call(row, "urn:act", true).error);

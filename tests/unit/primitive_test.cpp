@@ -173,14 +173,24 @@ TEST_F(Elements, QNamesAreMappedToTheTable)
         {"the predefined prefix", "xml:lang", "xml:lang"},
         {"a list, whatever parts it", " p:x\t\n u:y  p:z ", "a:x \"urn:u\":y a:z"},
         {"nothing", " ", ""},
+        {"a prefix of Latin-1", "\xE9:\xE9 u\xE9:x", "a:\xE9 \"urn:\xE9\":x"},
     };
+    const std::string declared =
+        " xmlns:p=\"urn:a\" xmlns:q=\"urn:b\" xmlns:u=\"urn:u\" xmlns:\xC3\xA9=\"urn:a\""
+        " xmlns:u\xC3\xA9=\"urn:\xC3\xA9\" xmlns:\xD0\xB6=\"urn:a\"";
     for (const auto &row : cases) {
-        receive("<e xmlns:p=\"urn:a\" xmlns:q=\"urn:b\" xmlns:u=\"urn:u\"></e>");
+        receive("<e" + declared + "></e>");
         ASSERT_EQ(soap_element_in_begin(&ctx, "e", 0, nullptr), 0);
         char *mapped = nullptr;
         EXPECT_EQ(soap_qname_read_map(&ctx, row.text, &mapped, -1, -1), 0);
         EXPECT_STREQ(mapped, row.mapped) << row.rule;
     }
+    // Of a message, whatever its prefixes: the rest of a word is a string like any other.
+    receive("<e" + declared + ">\xC3\xA9:\xC3\xA9 \xD0\xB6:\xD0\xB6 u\xC3\xA9:x</e>");
+    char **text = soap_string_element_in(&ctx, "e", nullptr, nullptr, 5, 2, -1, -1);
+    ASSERT_NE(text, nullptr);
+    EXPECT_STREQ(*text, "a:\xE9 a:? \"urn:\xE9\":x");
+    EXPECT_TRUE(at_last());
     receive("<e xmlns=\"urn:a\"></e>");
     ASSERT_EQ(soap_element_in_begin(&ctx, "e", 0, nullptr), 0);
     char *mapped = nullptr;

@@ -2,6 +2,7 @@
 #include <cerrno>
 #include <fcntl.h>
 #include <string>
+#include <tuple>
 
 #include <gtest/gtest.h>
 #include <zuv_client_pro/soap_error.h>
@@ -46,6 +47,42 @@ TEST_F(tcp_service, datagrams_go_to_the_address_and_come_from_the_peer)
     EXPECT_EQ(ctx->socket, socket) << "a datagram socket outlives the exchange";
 }
 
+TEST_F(tcp_service, a_stray_datagram_is_no_answer_unless_many_were_asked)
+{
+    static const struct {
+        const char *rule, *asked;
+        int flags;
+        const char *received[2];
+        bool keeps_peer;
+    } cases[] = {{"one host", "127.0.0.1", 0, {"answer", ""}, true},
+                 {"a group", "239.255.0.1", 0, {"stray", "answer"}, false},
+                 {"all hosts", "127.255.255.255", SO_BROADCAST, {"stray", "answer"}, false}};
+    for (const auto &c : cases) {
+        const bound_socket service(SOCK_DGRAM), another_port(SOCK_DGRAM);
+        const bound_socket another_host(SOCK_DGRAM, 0, "127.0.0.2", service.port());
+        context ctx(MODE_UDP);
+        ctx->connect_flags = c.flags;
+        ctx->recv_timeout = -20000;
+        ASSERT_GE(tcp_connect(ctx.get(), "soap.udp://x/", c.asked, service.port()), 0);
+        sockaddr_in own{};
+        own.sin_family = AF_INET;
+        own.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+        ASSERT_EQ(bind(ctx->socket, reinterpret_cast<sockaddr *>(&own), sizeof own), 0);
+        own.sin_port = htons(static_cast<std::uint16_t>(loopback::port_of(ctx->socket)));
+        const std::string asked(ctx->peer, ctx->peer_length);
+        const auto *const to = reinterpret_cast<sockaddr *>(&own);
+        for (int i = 0; i < (c.keeps_peer ? 110 : 1); ++i) // also more than a receive's attempts
+            EXPECT_EQ(
+                sendto((i % 2 == 0 ? another_port : another_host).socket(), "stray", 5, 0, to, sizeof own),
+                5);
+        EXPECT_EQ(sendto(service.socket(), "answer", 6, 0, to, sizeof own), 6);
+        for (const char *received : c.received)
+            EXPECT_EQ(receive(ctx), received) << c.rule;
+        EXPECT_EQ(ctx->errno_value, 0) << c.rule;
+        EXPECT_EQ(std::string(ctx->peer, ctx->peer_length) == asked, c.keeps_peer) << c.rule;
+    }
+}
+
 TEST_F(tcp_service, a_refused_datagram_is_sent_once_or_twice_more)
 {
     static const struct {
@@ -66,30 +103,76 @@ TEST_F(tcp_service, a_refused_datagram_is_sent_once_or_twice_more)
 
 // --- proxy ---
 
-TEST_F(tcp_service, a_proxy_that_refuses_ends_the_attempt_with_its_status)
+TEST_F(tcp_service, a_proxy_that_refuses_a_tunnel_is_an_error_that_says_so_and_changes_nothing)
 {
-    std::string head;
-    {
-        const peer proxy([&](int client) {
-            head = loopback::read_head(client);
-            write_text(client, "HTTP/1.1 407 Who are you\r\nContent-Length: 2\r\n\r\nno");
-            wait_for_end(client);
-        });
-        context ctx;
-        ctx->proxy_host = "[127.0.0.1]";
-        ctx->proxy_port = proxy.port();
-        ctx->proxy_user = "user";
-        ctx->proxy_password = "secret";
-        std::snprintf(ctx->host, sizeof ctx->host, "far.example");
-        ctx->port = 443;
-        const std::uint32_t output_mode = ctx->output_mode;
-        EXPECT_EQ(tcp_connect(ctx.get(), "https://far.example/x", "far.example", 443), -1);
-        EXPECT_EQ(ctx->error, 407);
-        EXPECT_EQ(ctx->socket, -1);
-        EXPECT_EQ(ctx->output_mode, output_mode);
+    const std::string more = "Accept-Encoding: gzip\r\nProxy-Authenticate: Basic realm=\"other\"\r\n"
+                             "Location: http://elsewhere/\r\nAuthorization: Basic QTpC\r\n";
+    static const struct {
+        const char *answer; // of the proxy, with `more` in the place of '@'
+        int error;
+        const char *detail;
+    } cases[] = {
+        {"HTTP/1.1 407 Who are you\r\n@Content-Length: 2\r\n\r\nno", 407, "no"},
+        {"HTTP/1.1 407 Who are you\r\n@\r\n", 407, nullptr},
+        {"HTTP/1.1 401 No\r\n@Content-Encoding: deflate\r\nContent-Length: 1\r\n\r\nx", 401, nullptr},
+        {"HTTP/1.1 302 Found\r\n@Transfer-Encoding: chunked\r\n\r\n2\r\nno\r\n0\r\n\r\n", 302, "no"},
+        {"HTTP/1.1 400 Bad\r\n@Content-Length: 2\r\n\r\nno", 400, "no"},
+        {"HTTP/1.1 500 Oops\r\n@Content-Type: text/html\r\nContent-Length: 2\r\n\r\nno", 500, "no"},
+        {"HTTP/1.1 500 Oops\r\n@\r\n", 500, nullptr},
+        {"HTTP/1.1 200 OK\r\n@Content-Length: 2\r\n\r\nno", 200, "no"},
+        {"HTTP/1.1 200 OK\r\n@Transfer-Encoding: chunked\r\n\r\n2\r\nno\r\n0\r\n\r\n", 200, "no"},
+        {"HTTP/1.1 202 Later\r\n@Content-Length: 2\r\n\r\nno", 202, "no"},
+        {"HTTP/1.1 204 None\r\n@\r\n", 204, nullptr},
+        {"POST / HTTP/1.1\r\n@\r\n", SOAP_HTTP_ERROR, nullptr},
+        {"GET / HTTP/1.1\r\n@\r\n", SOAP_HTTP_ERROR, nullptr},
+        {"\x16\x03 no HTTP at all\r\n@\r\n", SOAP_HTTP_ERROR, nullptr},
+        {"", SOAP_EOF, nullptr},
+    };
+    for (const auto &c : cases) {
+        std::string head, answer = c.answer;
+        if (const std::size_t place = answer.find('@'); place != std::string::npos)
+            answer.replace(place, 1, more);
+        {
+            const peer proxy([&](int client) {
+                head = loopback::read_head(client);
+                write_text(client, answer);
+                shutdown(client, SHUT_WR);
+                wait_for_end(client);
+            });
+            context ctx(MODE_KEEP_ALIVE);
+            ctx->proxy_host = "[127.0.0.1]";
+            ctx->proxy_port = proxy.port();
+            ctx->proxy_user = "user";
+            ctx->proxy_password = "secret";
+            ctx->auth_user = "service";
+            ctx->auth_password = "secret";
+            ctx->auth_realm = "realm";
+            ctx->http_content = "text/plain";
+            ctx->legacy = c.error == 407 ? LEGACY_TUNNEL_CREDENTIALS : 0;
+            const auto state = [&] {
+                return std::tuple(ctx->input_mode, ctx->output_mode, ctx->zlib_in, ctx->zlib_out,
+                                  ctx->keep_alive, std::string(ctx->auth_user),
+                                  std::string(ctx->auth_password), std::string(ctx->auth_realm),
+                                  std::string(ctx->http_content), std::string(ctx->endpoint),
+                                  std::string(ctx->action ? ctx->action : ""), ctx->status);
+            };
+            soap_parse_endpoint(ctx.get(), "https://far.example/x");
+            const auto before = state();
+            EXPECT_EQ(tcp_connect(ctx.get(), ctx->endpoint, "far.example", 443), -1) << answer;
+            EXPECT_EQ(ctx->error, c.error) << answer;
+            EXPECT_EQ(ctx->socket, -1) << answer;
+            EXPECT_EQ(ctx.fault_text(),
+                      "The HTTP proxy refused CONNECT far.example:443" +
+                          (c.error == SOAP_EOF ? ": no answer (Operation interrupted or timed out)"
+                                               : ": " + answer.substr(0, answer.find("\r\n"))));
+            EXPECT_EQ(ctx.fault_detail(), c.detail ? c.detail : "CONNECT failed in tcp_connect()") << answer;
+            EXPECT_EQ(state(), before) << answer;
+            ctx->auth_user = ctx->auth_password = ctx->auth_realm = nullptr;
+        }
+        EXPECT_TRUE(head.starts_with("CONNECT far.example:443 HTTP/1.1\r\n")) << head;
+        EXPECT_NE(head.find("Proxy-Authorization: Basic dXNlcjpzZWNyZXQ=\r\n"), std::string::npos) << head;
+        EXPECT_EQ(head.find("\r\nAuthorization: ") != std::string::npos, c.error == 407) << head;
     }
-    EXPECT_TRUE(head.starts_with("CONNECT far.example:443 HTTP/1.1\r\n")) << head;
-    EXPECT_NE(head.find("Proxy-Authorization: Basic dXNlcjpzZWNyZXQ=\r\n"), std::string::npos) << head;
 }
 
 // --- accepting ---

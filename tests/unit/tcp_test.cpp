@@ -14,6 +14,7 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_tcp.h>
+#include <zuv_client_pro/soap_tls.h>
 
 #include "support/tcp_client.h"
 #include "transport/tcp_socket.h"
@@ -25,7 +26,10 @@ using loopback::bound_socket;
 using loopback::peer;
 using loopback::write_text;
 
-class tcp : public socket_test {};
+class tcp : public socket_test {
+protected:
+    static void SetUpTestSuite() { tls_random_word(); } // OpenSSL keeps descriptors of its own from then on
+};
 
 struct connected : context {
     explicit connected(int port) { EXPECT_GE(open_to(*this, port), 0); }
@@ -114,16 +118,6 @@ TEST_F(tcp, a_failed_attempt_names_its_step_and_leaves_no_socket)
     EXPECT_GE(open_to(ctx, server.port()), 0) << "the context serves on after failures";
 }
 
-TEST_F(tcp, the_next_address_is_tried_after_a_refusal_without_a_limit)
-{
-    const peer server(wait_for_end);
-    context ctx;
-    EXPECT_GE(open_to(ctx, server.port(), "two.test"), 0);
-    ctx->connect_timeout = 5; // the first address's wait decides
-    EXPECT_EQ(open_to(ctx, server.port(), "two.test"), -1);
-    expect_failure(ctx, 28, "Connection refused", "connect failed in tcp_connect()");
-}
-
 TEST_F(tcp, an_address_in_use_is_tried_again_a_bounded_number_of_times)
 {
     const peer server(wait_for_end);
@@ -140,15 +134,15 @@ TEST_F(tcp, an_address_in_use_is_tried_again_a_bounded_number_of_times)
 // A listener whose queue of clients is full: further ones are neither taken nor refused.
 class full_listener {
 public:
-    full_listener()
+    explicit full_listener(const char *host = "127.0.0.1", int port = 0)
+        : listener_(SOCK_STREAM, 0, host, port)
     {
         sockaddr_in address{};
-        address.sin_family = AF_INET;
-        address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-        address.sin_port = htons(static_cast<std::uint16_t>(listener_.port()));
-        for (int i = 0; i < 4; ++i) {
-            clients_.push_back(::socket(AF_INET, SOCK_STREAM | SOCK_NONBLOCK, 0));
-            connect(clients_.back(), reinterpret_cast<sockaddr *>(&address), sizeof address);
+        socklen_t size = sizeof address;
+        getsockname(listener_.socket(), reinterpret_cast<sockaddr *>(&address), &size);
+        for (int &client : clients_) {
+            client = ::socket(AF_INET, SOCK_STREAM | SOCK_NONBLOCK, 0);
+            connect(client, reinterpret_cast<sockaddr *>(&address), sizeof address);
         }
     }
     ~full_listener()
@@ -156,20 +150,56 @@ public:
         for (const int client : clients_)
             close(client);
     }
+    full_listener(const full_listener &) = delete;
+    full_listener &operator=(const full_listener &) = delete;
     int port() const { return listener_.port(); }
 
 private:
-    bound_socket listener_{SOCK_STREAM, 0};
-    std::vector<int> clients_;
+    bound_socket listener_;
+    int clients_[4];
 };
 
-TEST_F(tcp, a_connection_that_does_not_come_about_times_out)
+TEST_F(tcp, each_address_of_a_host_is_tried_in_turn_within_the_limit_for_each)
 {
-    const full_listener silent;
-    context ctx;
-    ctx->connect_timeout = -50000;
-    EXPECT_EQ(open_to(ctx, silent.port()), -1);
-    expect_failure(ctx, 28, "Timeout", "connect failed in tcp_connect()");
+    constexpr int BRIEF_US = -50000; // as a time limit: microseconds
+    static const struct {
+        const char *rule, *hosts; // of the endpoints
+        bool silent;              // 127.0.0.9; else it refuses
+        int connect, call;
+        std::uint32_t legacy;
+        const char *text; // of the fault; null: connected
+    } cases[] = {
+        {"refused, no limit", "two.test", false, 0, 0, 0, nullptr},
+        {"refused, no limit, the older rule", "two.test", false, 0, 0, LEGACY_FIRST_ADDRESS, nullptr},
+        {"refused", "two.test", false, 5, 0, 0, nullptr},
+        {"refused late, the older rule", "two.test", false, 5, 0, LEGACY_FIRST_ADDRESS, "Connection refused"},
+        {"silent", "two.test", true, BRIEF_US, 0, 0, nullptr},
+        {"silent, the older rule", "two.test", true, BRIEF_US, 0, LEGACY_FIRST_ADDRESS, "Timeout"},
+        {"silent, until the call is over", "two.test", true, 5, BRIEF_US, 0,
+         "Operation interrupted or timed out (50000us call limit)"},
+        {"silent, then another endpoint", "two.test peer.test", true, BRIEF_US, 0, LEGACY_FIRST_ADDRESS,
+         nullptr},
+        {"IPv6 refused", "six.test", false, 5, 0, 0, nullptr},
+        {"as this machine has it", "localhost", false, 5, 0, 0, nullptr},
+    };
+    const peer server(wait_for_end, std::size(cases));
+    for (const auto &c : cases) {
+        std::optional<full_listener> first;
+        if (c.silent)
+            first.emplace("127.0.0.9", server.port());
+        context ctx;
+        ctx->connect_timeout = c.connect;
+        ctx->call_timeout = c.call;
+        ctx->legacy = c.legacy;
+        std::istringstream hosts(c.hosts);
+        std::string endpoints;
+        for (std::string host; hosts >> host;)
+            endpoints += "http://" + host + ":" + std::to_string(server.port()) + "/ ";
+        soap_server_connect(ctx.get(), endpoints.c_str(), "");
+        EXPECT_EQ(ctx->socket >= 0, c.text == nullptr) << c.rule;
+        if (c.text)
+            expect_failure(ctx, 28, c.text, "connect failed in tcp_connect()");
+    }
 }
 
 TEST_F(tcp, a_new_connection_closes_the_old_one_through_the_hook)
@@ -280,7 +310,7 @@ TEST_F(tcp, a_peer_that_is_gone_gives_an_error_and_no_signal)
     EXPECT_EQ(ctx->errno_value, EPIPE);
 }
 
-TEST_F(tcp, a_receive_gives_up_after_so_many_false_alarms)
+TEST_F(tcp, a_receive_gives_up_after_so_many_false_alarms_but_not_for_signals)
 {
     const peer server([](int client) {
         write_text(client, "x");
@@ -291,8 +321,127 @@ TEST_F(tcp, a_receive_gives_up_after_so_many_false_alarms)
     socket_calls::fail_recv = {1000000, EAGAIN};
     EXPECT_EQ(receive(ctx), "");
     EXPECT_EQ(socket_calls::counts.recv, 101);
-    socket_calls::fail_recv = {5, EINTR};
+    socket_calls::fail_recv = {150, EINTR};
     EXPECT_EQ(receive(ctx), "x");
+}
+
+// --- time limits ---
+
+constexpr int LIMIT_S = 1;
+constexpr socket_calls::interruption SIGNALS{100, 200000}; // each a fifth of the limit after the last
+
+void begin_signals()
+{
+    socket_calls::counts = {};
+    socket_calls::interrupt_select = SIGNALS;
+}
+
+// Something that is waited for in vain, on a connection to a peer that neither reads nor writes.
+struct wait_case {
+    const char *rule;
+    void (*limit)(soap *ctx);
+    bool (*waits)(context &ctx, int port); // false: it found what it waited for
+    const char *text;                      // of the error
+};
+
+bool connects_in_vain(context &ctx, int port)
+{
+    begin_signals();
+    return tcp_connect(ctx.get(), "http://x/", "127.0.0.1", port) == -1;
+}
+
+bool handshake_is_in_vain(context &ctx, int port)
+{
+    ctx->tls_setup = [](soap *c) { return begin_signals(), tls_context_setup(c); };
+    return tcp_connect(ctx.get(), "https://x/", "127.0.0.1", port) == -1;
+}
+
+bool proxy_answers_nothing(context &ctx, int port)
+{
+    ctx->proxy_host = "127.0.0.1";
+    ctx->proxy_port = port;
+    ctx->on_read_head = [](soap *c) { return begin_signals(), http_read_head(c); };
+    return tcp_connect(ctx.get(), "https://x/", "x", 443) == -1;
+}
+
+bool sends_in_vain(context &ctx, int port)
+{
+    open_to(ctx, port);
+    const std::string message(1 << 24, 'm');
+    begin_signals();
+    ctx->error = tcp_send(ctx.get(), message.data(), message.size());
+    return ctx->error == SOAP_EOF;
+}
+
+bool receives_in_vain(context &ctx, int port)
+{
+    open_to(ctx, port);
+    begin_signals();
+    ctx->error = SOAP_EOF;
+    return receive(ctx).empty();
+}
+
+bool no_descriptor_serves(context &ctx, int)
+{
+    int ends[2];
+    EXPECT_EQ(pipe(ends), 0);
+    ctx->send_fd = ends[1];
+    ctx->recv_fd = ends[0];
+    begin_signals();
+    ctx->error = SOAP_EOF;
+    const bool in_vain =
+        ctx->send_timeout != 0 ? tcp_send(ctx.get(), "x", 1) == SOAP_EOF : receive(ctx).empty();
+    close(ends[0]);
+    close(ends[1]);
+    return in_vain;
+}
+
+bool accepts_in_vain(context &ctx, int)
+{
+    EXPECT_GE(soap_bind(ctx.get(), "127.0.0.1", 0, 1), 0);
+    begin_signals();
+    return soap_accept(ctx.get()) == -1;
+}
+
+bool client_does_not_shake_hands(context &ctx, int port)
+{
+    open_to(ctx, port);
+    begin_signals();
+    return soap_ssl_accept(ctx.get()) == SOAP_TLS_ERROR;
+}
+
+const wait_case WAITS[] = {
+    {"connect", [](soap *c) { c->connect_timeout = LIMIT_S; }, connects_in_vain, "Timeout"},
+    {"handshake", [](soap *c) { c->connect_timeout = LIMIT_S; }, handshake_is_in_vain, "Timeout"},
+    {"handshake, in microseconds", [](soap *c) { c->connect_timeout = -1000000 * LIMIT_S; },
+     handshake_is_in_vain, "Timeout"},
+    {"CONNECT", [](soap *c) { c->connect_timeout = LIMIT_S; }, proxy_answers_nothing, "Timeout"},
+    {"send", [](soap *c) { c->send_timeout = LIMIT_S; }, sends_in_vain,
+     "End of file or no input: Operation interrupted or timed out (1 s send delay)"},
+    {"receive", [](soap *c) { c->recv_timeout = LIMIT_S; }, receives_in_vain,
+     "End of file or no input: Operation interrupted or timed out (1 s receive delay)"},
+    {"send to a descriptor", [](soap *c) { c->send_timeout = LIMIT_S; }, no_descriptor_serves,
+     "End of file or no input: Operation interrupted or timed out (1 s send delay)"},
+    {"receive from a descriptor", [](soap *c) { c->recv_timeout = LIMIT_S; }, no_descriptor_serves,
+     "End of file or no input: Operation interrupted or timed out (1 s receive delay)"},
+    {"accept", [](soap *c) { c->accept_timeout = LIMIT_S; }, accepts_in_vain, "Timeout"},
+    {"handshake of a client", [](soap *c) { c->accept_timeout = LIMIT_S; }, client_does_not_shake_hands,
+     "Timeout"},
+};
+
+TEST_F(tcp, limits_hold_whatever_signals_arrive)
+{
+    const full_listener silent;
+    for (const wait_case &c : WAITS) {
+        const bound_socket idle; // takes clients, and leaves them alone
+        context ctx;
+        c.limit(ctx.get());
+        EXPECT_TRUE(c.waits(ctx, c.waits == connects_in_vain ? silent.port() : idle.port())) << c.rule;
+        EXPECT_EQ(socket_calls::counts.select, 5) << c.rule;
+        soap_fault_text_fill(ctx.get());
+        EXPECT_EQ(ctx.fault_text(), c.text) << c.rule;
+        socket_calls::reset();
+    }
 }
 
 TEST_F(tcp, streams_and_descriptors_take_the_place_of_a_socket)

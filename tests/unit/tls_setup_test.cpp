@@ -1,11 +1,14 @@
 // tls_setup_test.cpp - the set-up of TLS, and the library's own server side.
 #include <future>
 #include <string>
+#include <vector>
 
 #include <gtest/gtest.h>
+#include <openssl/err.h>
 #include <openssl/ssl.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
+#include <zuv_client_pro/soap_io.h>
 #include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_tls.h>
 
@@ -54,7 +57,7 @@ TEST_F(tls_setup, a_set_up_that_fails_says_why_and_leaves_no_context)
     EXPECT_EQ(ctx.fault_detail(), "Can't read CRL file");
 }
 
-TEST_F(tls_setup, a_second_set_up_adds_to_the_context)
+TEST_F(tls_setup, a_second_set_up_replaces_the_first)
 {
     context ctx;
     ASSERT_EQ(set_up_client(ctx, VERIFIED), 0);
@@ -62,11 +65,185 @@ TEST_F(tls_setup, a_second_set_up_adds_to_the_context)
     EXPECT_EQ(SSL_CTX_get_options(first) & (SSL_OP_NO_TICKET | SSL_OP_NO_TLSv1), SSL_OP_NO_TICKET);
     EXPECT_EQ(SSL_CTX_get_verify_mode(first), SSL_VERIFY_PEER);
     EXPECT_EQ(SSL_CTX_get_verify_depth(first), 9);
+    SSL_CTX_up_ref(first);
     ASSERT_EQ(set_up_client(ctx, TLS_NO_TLSV1 | TLS_NO_SSLV3 | TLS_NO_DEFAULT_CA | TLS_ALLOW_EXPIRED), 0);
-    EXPECT_EQ(ctx->tls_context, first);
+    EXPECT_NE(ctx->tls_context, first);
     const std::uint64_t both = SSL_OP_NO_TLSv1 | SSL_OP_NO_SSLv3;
-    EXPECT_EQ(SSL_CTX_get_options(first) & both, both);
-    EXPECT_EQ(SSL_CTX_get_verify_mode(first), SSL_VERIFY_NONE);
+    EXPECT_EQ(SSL_CTX_get_options(ctx->tls_context) & both, both);
+    EXPECT_EQ(SSL_CTX_get_verify_mode(ctx->tls_context), SSL_VERIFY_NONE);
+    SSL_CTX_free(first);
+}
+
+// Answers each request of a connection by one byte.
+void answer_each(SSL *connection)
+{
+    static constexpr char ANSWER[] = "HTTP/1.1 200 OK\r\nContent-Length: 1\r\n\r\nx";
+    std::string head;
+    for (char byte; SSL_read(connection, &byte, 1) == 1;) {
+        head += byte;
+        if (!head.ends_with("\r\n\r\n"))
+            continue;
+        head.clear();
+        SSL_write(connection, ANSWER, sizeof ANSWER - 1);
+    }
+}
+
+// One exchange with such a server, on a kept connection where there is one. The code.
+int get(soap *ctx, int port)
+{
+    soap_reset_call(ctx);
+    const std::string url = "https://peer.test:" + std::to_string(port) + "/";
+    if (soap_connect_one(ctx, STATUS_GET, url.c_str(), nullptr) == 0 && soap_receive_begin(ctx) == 0) {
+        EXPECT_EQ(soap_recv_byte(ctx), 'x');
+        soap_receive_finish(ctx);
+    }
+    return soap_socket_release(ctx);
+}
+
+TEST_F(tls_setup, new_rules_take_force_at_the_next_call_of_the_context_that_has_them)
+{
+    const subject expired{"peer.test", "", -2 * DAY, -DAY};
+    const std::string trusted = ca().ca_file();
+    const struct {
+        const char *rule;
+        const subject &server;
+        unsigned first_flags, second_flags;
+        const char *second_ca;
+        int set_up, code;
+    } cases[] = {
+        {"the same", BY_NAME, VERIFIED, VERIFIED, trusted.c_str(), 0, 0},
+        {"expired certificates are refused again", expired, VERIFIED | TLS_ALLOW_EXPIRED, VERIFIED,
+         trusted.c_str(), 0, SOAP_TLS_ERROR},
+        {"the authority is removed", BY_NAME, VERIFIED, VERIFIED, nullptr, 0, SOAP_TLS_ERROR},
+        {"the set-up fails", BY_NAME, VERIFIED, VERIFIED, "/nonexistent", SOAP_TLS_ERROR, SOAP_TLS_ERROR},
+    };
+    for (const int version : {TLS1_2_VERSION, TLS1_3_VERSION}) {
+        for (const auto &c : cases) {
+            SCOPED_TRACE(std::string(c.rule) + (version == TLS1_2_VERSION ? ", 1.2" : ", 1.3"));
+            std::vector<int> resumed;
+            {
+                tls_peer server(
+                    server_for(c.server, version),
+                    [&](SSL *connection) {
+                        resumed.push_back(SSL_session_reused(connection));
+                        answer_each(connection);
+                    },
+                    10);
+                context ctx(MODE_KEEP_ALIVE);
+                ASSERT_EQ(set_up_client(ctx, c.first_flags), 0);
+                EXPECT_EQ(get(ctx.get(), server.port()), 0) << ctx.fault_text();
+                EXPECT_EQ(get(ctx.get(), server.port()), 0);
+                soap copy(*ctx.get());
+                EXPECT_EQ(soap_ssl_client_context(ctx.get(), static_cast<std::uint16_t>(c.second_flags),
+                                                  nullptr, nullptr, c.second_ca, nullptr, nullptr),
+                          c.set_up);
+                EXPECT_EQ(ctx->socket, -1) << "the kept connection is closed";
+                EXPECT_EQ(get(ctx.get(), server.port()), c.code);
+                tcp_disconnect(ctx.get());
+                copy.keep_alive = 0;
+                EXPECT_EQ(get(&copy, server.port()), 0) << "made before, it keeps the rules that it had";
+                tcp_disconnect(&copy);
+                ASSERT_EQ(set_up_client(ctx, c.first_flags), 0);
+                EXPECT_EQ(get(ctx.get(), server.port()), 0);
+            }
+            EXPECT_EQ(resumed, std::vector<int>(c.code == 0 ? 4 : 3, 0));
+        }
+    }
+}
+
+TEST_F(tls_setup, a_kept_connection_carries_calls_of_its_own_rules_only)
+{
+    static const struct {
+        const char *rule;
+        void (*change)(soap &ctx);
+        std::uint32_t legacy;
+        int connections;
+    } cases[] = {
+        {"nothing changes", [](soap &) {}, 0, 1},
+        {"flags", [](soap &ctx) { ctx.tls_flags |= TLS_STRICT_HOST_CHECK; }, 0, 2},
+        {"flags, as formerly", [](soap &ctx) { ctx.tls_flags |= TLS_STRICT_HOST_CHECK; }, LEGACY_ANY_ROUTE,
+         1},
+        {"a TLS context of the host's own",
+         [](soap &ctx) {
+             SSL_CTX_free(ctx.tls_context);
+             ctx.tls_context = SSL_CTX_new(TLS_client_method());
+             SSL_CTX_load_verify_file(ctx.tls_context, ctx.tls_ca_file);
+         },
+         0, 2},
+    };
+    for (const auto &c : cases) {
+        int connections = 0;
+        {
+            tls_peer server(
+                server_for(BY_NAME),
+                [&](SSL *connection) {
+                    ++connections;
+                    answer_each(connection);
+                },
+                2);
+            context ctx(MODE_KEEP_ALIVE);
+            ctx->legacy = c.legacy;
+            ASSERT_EQ(set_up_client(ctx), 0);
+            EXPECT_EQ(get(ctx.get(), server.port()), 0) << c.rule;
+            c.change(*ctx.get());
+            EXPECT_EQ(get(ctx.get(), server.port()), 0) << c.rule;
+        }
+        EXPECT_EQ(connections, c.connections) << c.rule;
+    }
+}
+
+// A handshake in memory, as far as it goes.
+bool come_together(SSL_CTX *one, SSL_CTX *other)
+{
+    SSL_CTX_set_cipher_list(one, "ALL:@SECLEVEL=0"); // OpenSSL's level alone would refuse the older versions
+    SSL_CTX_set_cipher_list(other, "ALL:@SECLEVEL=0");
+    const server_connection client(SSL_new(one)), server(SSL_new(other));
+    BIO *near = nullptr, *far = nullptr;
+    BIO_new_bio_pair(&near, 0, &far, 0);
+    SSL_set_bio(client.get(), near, near);
+    SSL_set_bio(server.get(), far, far);
+    SSL_set_connect_state(client.get());
+    SSL_set_accept_state(server.get());
+    for (int i = 0; i < 10; ++i) {
+        SSL_do_handshake(client.get());
+        SSL_do_handshake(server.get());
+    }
+    ERR_clear_error();
+    return SSL_is_init_finished(client.get()) && SSL_is_init_finished(server.get());
+}
+
+TEST_F(tls_setup, versions_before_1_2_are_spoken_only_if_the_host_lowers_the_least)
+{
+    const std::string pair =
+        ca().write_pair("old.pem", ca().issue(BY_NAME, server_key()).get(), server_key());
+    constexpr unsigned FLAGS[] = {VERIFIED, VERIFIED | TLS_STRICT_HOST_CHECK, TLS_NO_DEFAULT_CA};
+    for (const unsigned flags : FLAGS) {
+        for (const int version : {TLS1_VERSION, TLS1_1_VERSION, TLS1_2_VERSION, TLS1_3_VERSION}) {
+            const auto other = [version](const SSL_METHOD *method) {
+                server_context made(SSL_CTX_new(method));
+                SSL_CTX_set_min_proto_version(made.get(), TLS1_VERSION);
+                SSL_CTX_set_max_proto_version(made.get(), version);
+                return made;
+            };
+            const server_context server = other(TLS_server_method()), client = other(TLS_client_method());
+            SSL_CTX_use_certificate(server.get(), ca().issue(BY_NAME, server_key()).get());
+            SSL_CTX_use_PrivateKey(server.get(), server_key());
+            context ctx, service;
+            ASSERT_EQ(set_up_client(ctx, flags), 0);
+            ASSERT_EQ(soap_ssl_server_context(service.get(), static_cast<std::uint16_t>(flags), pair.c_str(),
+                                              nullptr, ca().ca_file().c_str(), nullptr, nullptr, nullptr,
+                                              nullptr),
+                      0);
+            SSL_CTX_set_verify(service->tls_context, SSL_VERIFY_NONE, nullptr);
+            const bool recent = version >= TLS1_2_VERSION;
+            EXPECT_EQ(come_together(ctx->tls_context, server.get()), recent) << version;
+            EXPECT_EQ(come_together(client.get(), service->tls_context), recent) << version;
+            SSL_CTX_set_min_proto_version(ctx->tls_context, TLS1_VERSION);
+            EXPECT_TRUE(come_together(ctx->tls_context, server.get())) << version;
+            ASSERT_EQ(set_up_client(ctx, flags), 0);
+            EXPECT_EQ(come_together(ctx->tls_context, server.get()), recent) << "a new set-up, " << version;
+        }
+    }
 }
 
 TEST_F(tls_setup, the_password_callback_needs_room_for_the_terminator)
@@ -121,8 +298,12 @@ TEST_F(tls_setup, a_client_certificate_is_asked_for_and_verified)
     const struct {
         const char *pair, *password;
         bool accepted;
-    } cases[] = {
-        {good.c_str(), "secret", true}, {unknown.c_str(), nullptr, false}, {nullptr, nullptr, false}};
+        const char *detail; // of the fault
+    } cases[] = {{good.c_str(), "secret", true, nullptr},
+                 {unknown.c_str(), nullptr, false,
+                  "SSL_accept() failed in soap_ssl_accept(): self-signed certificate (at depth 0: "
+                  "CN=somebody,O=Test)"},
+                 {nullptr, nullptr, false, "SSL_accept() failed in soap_ssl_accept()"}};
     for (const auto &c : cases) {
         context service, client;
         service->accept_timeout = 10;
@@ -143,7 +324,7 @@ TEST_F(tls_setup, a_client_certificate_is_asked_for_and_verified)
         EXPECT_EQ(end.result, c.accepted ? 0 : SOAP_TLS_ERROR) << end.text;
         EXPECT_EQ(end.closed, !c.accepted);
         if (!c.accepted) {
-            EXPECT_EQ(end.detail, "SSL_accept() failed in soap_ssl_accept()");
+            EXPECT_EQ(end.detail, c.detail);
         }
     }
     context wrong;

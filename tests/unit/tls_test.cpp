@@ -11,6 +11,7 @@
 
 #include <gtest/gtest.h>
 #include <openssl/ssl.h>
+#include <zuv_client_pro/soap_attachment.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_tcp.h>
@@ -114,10 +115,16 @@ TEST_F(tls, a_tunnel_through_a_proxy_leads_to_the_host_behind_it)
     ctx->auth_user = "user";
     ctx->proxy_user = ctx->proxy_password = "p";
     ctx->mode = ctx->output_mode = MODE_STORE | MODE_KEEP_ALIVE | MODE_INDENT;
+    ctx->mode |= MODE_DIME;
     ctx->message_count = 42;
+    char content[] = "attached";
+    ASSERT_EQ(soap_dime_attach(ctx.get(), content, sizeof content, "text/plain", "cid:id1", 0, nullptr), 0);
+    soap_mime_start(ctx.get(), "boundary", nullptr);
+    ctx->mime.first = ctx->mime.last = ctx->dime.first;
     const auto settings = [&] {
-        return std::tuple(ctx->status, ctx->keep_alive, std::string(ctx->action), std::string(ctx->auth_user),
-                          ctx->http_content, ctx->mode, ctx->output_mode & ~MODE_TLS, ctx->message_count);
+        return std::tuple(ctx->dime.first, ctx->mime.first, ctx->mime.boundary, ctx->status, ctx->keep_alive,
+                          std::string(ctx->action), std::string(ctx->auth_user), ctx->http_content, ctx->mode,
+                          ctx->output_mode & ~MODE_TLS, ctx->message_count);
     };
     const auto before = settings();
     ASSERT_GE(tcp_connect(ctx.get(), "https://far.example/service", "far.example", 443), 0)
@@ -173,6 +180,30 @@ TEST_F(tls, a_session_is_resumed_by_its_own_host_only)
     }
 }
 
+TEST_F(tls, a_session_is_not_offered_to_another_port_of_its_host)
+{
+    for (const int version : {TLS1_2_VERSION, TLS1_3_VERSION}) {
+        std::vector<int> reused;
+        {
+            const auto serve = [&](SSL *connection) {
+                reused.push_back(SSL_session_reused(connection));
+                echo(connection);
+            };
+            server_context made = server_for(BY_NAME, version);
+            SSL_CTX_up_ref(made.get());
+            tls_peer one(server_context(made.get()), serve, 2), other(std::move(made), serve);
+            context ctx;
+            ASSERT_EQ(set_up_client(ctx), 0);
+            for (const int port : {one.port(), one.port(), other.port()}) {
+                ASSERT_GE(open_to(ctx, port), 0) << ctx.fault_text();
+                EXPECT_EQ(exchange(ctx, "x"), "x");
+                EXPECT_EQ(tcp_disconnect(ctx.get()), 0);
+            }
+        }
+        EXPECT_EQ(reused, (std::vector<int>{0, 1, 0})) << version;
+    }
+}
+
 TEST_F(tls, a_session_accepted_under_former_rules_is_not_resumed)
 {
     std::vector<int> reused;
@@ -197,18 +228,21 @@ TEST_F(tls, a_session_accepted_under_former_rules_is_not_resumed)
 
 // --- transfers ---
 
-TEST_F(tls, a_call_on_a_kept_connection_costs_three_system_calls)
+TEST_F(tls, a_call_on_a_kept_connection_costs_three_system_calls_and_two_more_with_limits)
 {
     for (const int version : {TLS1_2_VERSION, TLS1_3_VERSION}) {
-        tls_peer server(server_for(BY_NAME, version), echo);
-        connected ctx(server.port());
-        EXPECT_EQ(exchange(ctx, "a"), "a"); // brings the session tickets too
-        socket_calls::counts = {};
-        EXPECT_EQ(tcp_peek(ctx.get()), 0);
-        EXPECT_EQ(exchange(ctx, "b"), "b");
-        EXPECT_EQ(socket_calls::counts.send, 1);
-        EXPECT_EQ(socket_calls::counts.recv, 1);
-        EXPECT_EQ(socket_calls::counts.all(), 3);
+        for (const int limit : {0, 10}) {
+            tls_peer server(server_for(BY_NAME, version), echo);
+            connected ctx(server.port(), limit);
+            EXPECT_EQ(exchange(ctx, "a"), "a"); // brings the session tickets too
+            socket_calls::counts = {};
+            EXPECT_EQ(tcp_peek(ctx.get()), 0);
+            EXPECT_EQ(exchange(ctx, "b"), "b");
+            EXPECT_EQ(socket_calls::counts.send, 1);
+            EXPECT_EQ(socket_calls::counts.recv, 1);
+            EXPECT_EQ(socket_calls::counts.all(), limit == 0 ? 3 : 5);
+            EXPECT_EQ(socket_calls::counts.clock == 0, limit == 0);
+        }
     }
 }
 
@@ -251,6 +285,33 @@ TEST_F(tls, transfers_end_when_time_is_up)
     over.set_value();
 }
 
+TEST_F(tls, messages_of_the_protocol_alone_are_read_no_longer_than_the_call_may_last)
+{
+    std::promise<void> sent, over;
+    tls_peer server(server_for(BY_NAME, TLS1_3_VERSION), [&](SSL *connection) {
+        for (int i = 0; i < 400; ++i) { // 100 KB, which is many receives
+            SSL_new_session_ticket(connection);
+            SSL_do_handshake(connection);
+        }
+        sent.set_value();
+        over.get_future().wait();
+    });
+    context ctx;
+    ASSERT_EQ(set_up_client(ctx), 0);
+    ctx->call_timeout = 1000;
+    const std::string endpoint = "https://peer.test:" + std::to_string(server.port()) + "/";
+    ASSERT_EQ(soap_server_connect(ctx.get(), endpoint.c_str(), ""), 0);
+    sent.get_future().wait();
+    socket_calls::call_takes_us = 400000000;
+    socket_calls::counts = {};
+    char byte;
+    EXPECT_EQ(tcp_recv(ctx.get(), &byte, 1), 0U);
+    over.set_value();
+    socket_calls::reset();
+    EXPECT_LE(socket_calls::counts.recv, 2);
+    EXPECT_STREQ(soap_eof_text(ctx.get()), "Operation interrupted or timed out (1000 s call limit)");
+}
+
 TEST_F(tls, a_peer_that_is_gone_gives_an_error_and_no_signal)
 {
     tls_peer server(server_for(BY_NAME), [](SSL *connection) {
@@ -262,6 +323,7 @@ TEST_F(tls, a_peer_that_is_gone_gives_an_error_and_no_signal)
     connected ctx(server.port());
     signal(SIGPIPE, SIG_DFL);
     EXPECT_EQ(exchange(ctx, "x"), "");
+    EXPECT_EQ(ctx->errno_value, ECONNRESET);
     while (tcp_send(ctx.get(), "x", 1) == 0) {
     }
     tcp_disconnect(ctx.get());
@@ -299,22 +361,29 @@ TEST_F(tls, a_ticket_is_no_reason_to_end_a_kept_connection_but_an_unannounced_en
 
 TEST_F(tls, neither_the_question_nor_the_end_waits_for_a_peer_that_reads_nothing)
 {
-    tls_peer server(server_for(BY_NAME, TLS1_2_VERSION), [](SSL *connection) {
-        SSL_write(connection, "unasked", 7);
-        char byte;
-        while (recv(SSL_get_fd(connection), &byte, 1, 0) > 0) { // no TLS, so no answer to the closing alert
+    for (const std::uint32_t legacy : {0U, LEGACY_CLOSE_WAIT}) {
+        tls_peer server(server_for(BY_NAME, TLS1_2_VERSION), [](SSL *connection) {
+            SSL_write(connection, "unasked", 7);
+            char byte;
+            while (recv(SSL_get_fd(connection), &byte, 1, 0) >
+                   0) { // no TLS, so no answer to the closing alert
+            }
+        });
+        connected ctx(server.port());
+        ctx->legacy = legacy;
+        if (!tls_has_pending(ctx.get())) { // else it came with the end of the handshake
+            ASSERT_EQ(tcp_wait(ctx.get(), ctx->socket, WAIT_RECV, 10), WAIT_RECV);
         }
-    });
-    connected ctx(server.port());
-    if (!tls_has_pending(ctx.get())) { // else it came with the end of the handshake
-        ASSERT_EQ(tcp_wait(ctx.get(), ctx->socket, WAIT_RECV, 10), WAIT_RECV);
+        EXPECT_EQ(tcp_peek(ctx.get()), -1);
+        socket_calls::counts = {};
+        socket_calls::interrupt_select = {100, 1000000}; // each second a signal
+        EXPECT_EQ(tcp_disconnect(ctx.get()), 0);
+        socket_calls::reset();
+        EXPECT_EQ(ctx->socket, -1);
+        EXPECT_GE(socket_calls::counts.send, 1) << "the closing alert";
+        EXPECT_EQ(socket_calls::counts.waiting, 0);
+        EXPECT_EQ(socket_calls::counts.select, legacy == 0 ? 0 : 5) << "seconds";
     }
-    socket_calls::counts = {};
-    EXPECT_EQ(tcp_peek(ctx.get()), -1);
-    EXPECT_EQ(tcp_disconnect(ctx.get()), 0);
-    EXPECT_EQ(ctx->socket, -1);
-    EXPECT_GE(socket_calls::counts.send, 1) << "the closing alert";
-    EXPECT_EQ(socket_calls::counts.waiting, 0);
 }
 
 TEST_F(tls, an_abandoned_socket_is_left_alone)

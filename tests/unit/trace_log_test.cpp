@@ -8,6 +8,7 @@
 #include <memory>
 #include <sstream>
 #include <string>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <gtest/gtest.h>
@@ -91,6 +92,24 @@ TEST_F(TraceLog, HoldsTheBytesOnTheWireAndWhatTheyUnpackTo)
     ASSERT_EQ(soap_receive_begin(&wire), 0);
     EXPECT_EQ(wire.read_all(), body);
     EXPECT_EQ(content_of(received), wire.sent() + body);
+}
+
+TEST_F(TraceLog, ANewFileIsForItsOwnerAloneAndAnOldOneIsLeftAsItIs)
+{
+    const mode_t before = umask(0);
+    std::ofstream(path("old.log")) << "old;";
+    for (const char *name : {"old.log", "new.log"}) {
+        soap ctx;
+        soap_log_set_sent(&ctx, path(name).c_str());
+        write(ctx, SOAP_LOG_SENT, "more");
+    }
+    umask(before);
+    const auto rights = [this](const char *name) {
+        return std::filesystem::status(path(name)).permissions();
+    };
+    EXPECT_EQ(rights("new.log"), std::filesystem::perms{0600});
+    EXPECT_EQ(rights("old.log"), std::filesystem::perms{0666});
+    EXPECT_EQ(content_of(path("old.log")), "old;more");
 }
 
 TEST_F(TraceLog, AFileThatCannotBeOpenedIsTriedAgain)

@@ -102,20 +102,39 @@ TEST(XmlRead, a_message_of_ever_new_names_does_not_grow_the_table)
         document += "<b n" + std::to_string(i) + "='1' p:n" + std::to_string(i) + "='2'/>";
     reception in(document + "</a>");
     in.in_root();
+    std::int64_t held = 0;
     for (int i = 0; i < 2000; ++i) {
         ASSERT_EQ(begin(in, "b"), 0);
         ASSERT_STREQ(soap_attr_get(in, ("n" + std::to_string(i)).c_str(), 0), "1");
+        if (i == 200)
+            held = in->memory_held;
     }
-    std::size_t records = 0;
-    for (const soap_attribute *p = in->attribute_list; p != nullptr; p = p->next)
-        ++records;
-    EXPECT_LE(records, 300u);
+    EXPECT_LE(in->memory_held, held);
+}
 
-    std::string tag = "<a";
-    for (int i = 0; i < SOAP_ATTRIBUTES_MAX; ++i)
-        tag += " b" + std::to_string(i);
-    EXPECT_EQ(soap_element_head_read(reception(tag + "/>")), 0);
-    EXPECT_EQ(soap_element_head_read(reception(tag + " more/>")), SOAP_SYNTAX_ERROR);
+TEST(XmlRead, many_attributes_of_an_element_are_told_apart)
+{
+    std::string tag;
+    for (int i = 0; i + 1 < SOAP_ATTRIBUTES_MAX; ++i)
+        tag += " b" + std::string(static_cast<std::size_t>(i % 30), 'n') + std::to_string(i) + "='" +
+               std::to_string(i) + "'";
+    const std::string element = "<a" + tag + " b0='again'/>";
+    EXPECT_EQ(soap_element_head_read(reception("<a c='d'" + tag + " more/>")), SOAP_SYNTAX_ERROR);
+    reception in("<a>" + element + "<a c='d'/>" + element + "</a>");
+    in.in_root();
+    for (int round = 0; round < 2; ++round) {
+        ASSERT_EQ(soap_element_head_read(in), 0);
+        const std::string seen = attributes(in);
+        EXPECT_EQ(std::count(seen.begin(), seen.end(), '='), SOAP_ATTRIBUTES_MAX - 1);
+        EXPECT_STREQ(soap_attr_get(in, "b0", 0), "again") << "the last one counts";
+        EXPECT_STREQ(soap_attr_get(in, "bnnnnnnn997", 0), "997");
+        EXPECT_EQ(soap_element_skip(in), 0);
+        if (round == 0) {
+            EXPECT_EQ(soap_element_head_read(in), 0);
+            EXPECT_EQ(attributes(in), " c=d");
+            EXPECT_EQ(soap_element_skip(in), 0);
+        }
+    }
 }
 
 TEST(XmlRead, a_held_tag_answers_every_question_until_it_is_consumed)
@@ -199,10 +218,11 @@ std::string fields(const soap *ctx)
 
 TEST(XmlRead, attributes_of_the_engine_are_understood_by_version)
 {
+    const auto name_of = [](std::size_t length) { return std::string(length, 'n'); };
     const struct {
-        const char *attribute;
+        std::string attribute;
         std::int16_t version;
-        const char *expected;
+        std::string expected;
         std::uint32_t mode;
     } cases[] = {
         {"id='x'", 1, "id=#x", 0},
@@ -225,6 +245,8 @@ TEST(XmlRead, attributes_of_the_engine_are_understood_by_version)
         {"c:arrayType='y:z[][2,3]'", 1, "arrayType=y:z[] arraySize=[2,3]", 0},
         {"c:arrayType='y:z'", 1, "arrayType=y:z", 0},
         {"c:arrayType='y:z[3]'", 2, "", 0},
+        {"c:arrayType='" + name_of(1023) + "[3]'", 1, "arrayType=" + name_of(1023) + " arraySize=[3]", 0},
+        {"c:arrayType='" + name_of(1024) + "[3]'", 1, "arrayType=" + name_of(1023), 0},
         {"c:itemType='y:z' c:arraySize='2 3'", 2, "arrayType=y:z arraySize=2 3", 0},
         {"c:offset='[2]'", 1, "offset=[2]", 0},
         {"c:position='[1,2]'", 1, "positions=2", 0},
@@ -242,7 +264,7 @@ TEST(XmlRead, attributes_of_the_engine_are_understood_by_version)
         {"w:required='true'", 1, "", 0},
     };
     for (const auto &c : cases) {
-        reception in("<a " + std::string(c.attribute) + DECLARATIONS + "/>", 9, 9, c.mode);
+        reception in("<a " + c.attribute + DECLARATIONS + "/>", 9, 9, c.mode);
         in->soap_version = c.version;
         in->actor = "urn:me";
         EXPECT_EQ(soap_element_head_read(in), 0);
@@ -348,15 +370,42 @@ TEST(XmlRead, skipping_deep_content_takes_no_stack_and_no_memory)
     std::string document = "<a>";
     for (int i = 0; i < depth; ++i)
         document += "<b>";
-    EXPECT_EQ(soap_element_skip(reception(document).in_root()), SOAP_EOF);
+    reception cut(document);
+    cut->max_depth = 0;
+    EXPECT_EQ(soap_element_skip(cut.in_root()), SOAP_EOF);
     for (int i = 0; i < depth; ++i)
         document += "</b>";
     reception in(document + "</a>");
+    in->max_depth = 0;
     in.in_root();
     const std::size_t before = failing_malloc::allocations();
     EXPECT_EQ(soap_element_skip(in), 0);
     EXPECT_EQ(failing_malloc::allocations(), before);
     EXPECT_EQ(soap_element_in_end(in, "a"), 0);
+}
+
+TEST(XmlRead, skipped_elements_count_as_open)
+{
+    for (const char *content : {"<b><c><d>x</d></c></b>", "x<b><e/><c><d/><d>x</d></c></b>"}) {
+        for (const std::uint32_t limit : {0U, 4U, 3U}) {
+            SCOPED_TRACE(std::string(content) + " " + std::to_string(limit));
+            const int code = limit == 3 ? SOAP_LENGTH : 0;
+            for (const bool held : {false, true}) {
+                reception in("<a>" + std::string(content) + "</a>");
+                in->max_depth = limit;
+                in.in_root();
+                if (held)
+                    soap_element_head_read(in);
+                EXPECT_EQ(soap_element_in_end(in, "a"), code);
+            }
+            reception in("<a>" + std::string(content).substr(std::string(content).find('<')) + "</a>");
+            in->max_depth = limit;
+            EXPECT_EQ(soap_element_skip(in.in_root()), code);
+        }
+    }
+    reception in("<a><b>x</b></a>");
+    in->max_depth = 1;
+    EXPECT_EQ(soap_element_skip(in.in_root()), SOAP_LENGTH);
 }
 
 TEST(XmlRead, strict_reading_compares_end_tags)

@@ -52,14 +52,10 @@ TEST(XmlText, strings_hold_characters_and_nested_elements)
         {"references", "&lt;x&gt; &amp;amp; &quot;&apos;&#65;", "<x> &amp; \"'A"},
         {"section", "a<![CDATA[<b>&amp;]]]]>c", "a<b>&amp;]]c"},
         {"comment and instruction", "a<!--x--><?y z?>b", "ab"},
-        {"Latin-1 comes out as one byte", "\xC3\xA9\xC3\xBF&#233;", "\xE9\xFF\xE9"},
-        {"what has no byte is marked", "\xE2\x82\xAC&#8364;\xC4\x80|", "???|"},
-        {"no zero from an overlong form", "a\xC0\x80z", "a?z"},
-        {"no zero byte", std::string("x\0<b\0/>y", 8), "x?<b?/>y"},
-        {"UTF-8", "\xE2\x82\xAC\xC3\xA9", "\xE2\x82\xAC\xC3\xA9", MODE_UTF_STRINGS},
+        {"references of Latin-1", "&#8364;&#233;|", "?\xE9|"},
         {"references in UTF-8", "&#8364;&#x1F600;&#65;", "\xE2\x82\xAC\xF0\x9F\x98\x80\x41",
          MODE_UTF_STRINGS},
-        {"Latin-1 on input", "\xC3\xA9", "\xC3\xA9", MODE_LATIN1},
+        {"no zero byte", std::string("x\0<b\0/>y", 8), "x?<b?/>y"},
     };
     for (const reading &body : bodies)
         EXPECT_EQ(string_text(body.document, body.mode, CHARACTERS), body.expected) << body.rule;
@@ -76,10 +72,108 @@ TEST(XmlText, strings_hold_characters_and_nested_elements)
     EXPECT_EQ(soap_string_read(in.in_root(), CHARACTERS, -1, -1), half + "&" + half);
 }
 
+// The text in one of the forms that strings come in: attributes, raw XML, characters, simple value, wide
+// string.
+std::string in_form(int form, soap *ctx)
+{
+    std::string text;
+    const char *bytes = nullptr;
+    const char32_t *wide = nullptr;
+    if (soap_element_in_begin(ctx, "e", 1, nullptr) != 0)
+        return failure(ctx);
+    if (form < 2)
+        bytes = soap_attr_get(ctx, "t", 0);
+    else if (form < 4)
+        bytes = soap_string_read(ctx, form == 2 ? RAW : CHARACTERS, -1, -1);
+    else if (form == 4)
+        bytes = soap_simple_value_read(ctx);
+    else
+        wide = soap_wide_string_read(ctx, CHARACTERS, -1, -1);
+    if (bytes != nullptr)
+        text = bytes;
+    char one[6];
+    for (; wide != nullptr && *wide != 0; ++wide) {
+        if ((ctx->mode & MODE_UTF_STRINGS) != 0)
+            text.append(one, utf8_encode(*wide, one));
+        else
+            text += *wide < 256 ? static_cast<char>(*wide) : '?';
+    }
+    return soap_element_in_end(ctx, "e") == 0 ? text : failure(ctx);
+}
+
+// The text that a piece of a message becomes in all forms alike, or the error.
+std::string in_all_forms(const std::string &declaration, const std::string &piece, std::uint32_t mode,
+                         bool split)
+{
+    std::string first;
+    for (int form = 0; form < 6; ++form) {
+        const std::string document = declaration + (form == 0   ? "<e t=\"" + piece + "\"></e>"
+                                                    : form == 1 ? "<e t='" + piece + "'></e>"
+                                                                : "<e>" + piece + "</e>");
+        const auto read = [form](soap *ctx) { return in_form(form, ctx); };
+        const std::string text = split ? every_reading(document, mode, read)
+                                       : read(reception(document, SOAP_BUFFER_SIZE, SOAP_BUFFER_SIZE, mode));
+        EXPECT_TRUE(form == 0 || text == first) << "form " << form << ": " << text;
+        first = text;
+    }
+    return first;
+}
+
+TEST(XmlText, strings_hold_what_they_are_said_to_hold_whatever_the_message_is_encoded_in)
+{
+    const std::string LATIN = "<?xml version='1.0' encoding='ISO-8859-1'?>",
+                      WINDOWS = "<?xml version='1.0' encoding='windows-1252'?>";
+    const struct {
+        const char *rule;
+        std::string declaration, bytes, latin, utf8; // bytes of the message, and of strings in either mode
+        int strict_latin = 0, strict_utf8 = 0;       // errors of strict reading
+    } rows[] = {
+        {"UTF-8", "", "\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80\xED\x9F\xBF", "\xE9???",
+         "\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80\xED\x9F\xBF"},
+        {"ISO-8859-1", LATIN, "\xE9\x80|\xC3\xA9", "\xE9\x80|\xC3\xA9", "\xC3\xA9\xC2\x80|\xC3\x83\xC2\xA9"},
+        {"windows-1252", WINDOWS, "\x80\x9F\xE9", "??\xE9", "\xE2\x82\xAC\xC5\xB8\xC3\xA9"},
+        {"a byte without meaning", WINDOWS, "a\x81z", "a?z", "a?z", 47, 47},
+        {"white space", "", "a\t\n\rz", "a\t\n\rz", "a\t\n\rz"},
+        {"overlong", "", "a\xC0\xBC\xE0\x80\x80\xF0\x8F\xBF\xBFz", "a???z", "a???z", 47, 47},
+        {"surrogates", "", "a\xED\xA0\x80z", "a?z", "a?z", 47, 47},
+        {"too large", "", "a\xF4\x90\x80\x80z", "a?z", "a?z", 47, 47},
+        {"no characters of XML", "", "a\xEF\xBF\xBF\xEF\xBF\xBEz", "a??z", "a??z", 47, 47},
+        {"cut", "", "a\xE2\x82z", "a?z", "a?z", 47, 47},
+        {"cut by markup", "", "a\xF0\x9F\x98", "a?", "a?", 47, 47},
+        {"stray", "", "a\xBF\xBFz", "a?\xBFz", "a??z", 47, 47},
+        {"a lone byte stands for itself in Latin-1", "", "a\xE9z\xE9", "a\xE9z\xE9", "a?z?", 0, 47},
+        {"control characters", "", "a\x01\x1Fz", "a??z", "a??z", 5, 5},
+        {"of ISO-8859-1", LATIN, "a\x0Bz", "a?z", "a?z", 5, 5},
+    };
+    for (const auto &row : rows)
+        for (const bool deep : {false, true}) { // past the end of a search's stride, and of its window
+            SCOPED_TRACE(row.rule);
+            std::string before, latin, utf8;
+            for (int i = 0; deep && i < 400; ++i) {
+                before += row.declaration.empty() ? "\xC3\xBC" : "\xFC";
+                latin += "\xFC";
+                utf8 += "\xC3\xBC";
+            }
+            latin += row.latin;
+            utf8 += row.utf8;
+            const auto read = [&](std::uint32_t mode) {
+                return in_all_forms(row.declaration, before + row.bytes, mode, !deep);
+            };
+            const auto strict = [](int error, const std::string &text) {
+                return error == 0 ? text : "!" + std::to_string(error);
+            };
+            EXPECT_EQ(read(0), latin);
+            EXPECT_EQ(read(MODE_UTF_STRINGS), utf8);
+            EXPECT_EQ(read(MODE_STRICT), strict(row.strict_latin, latin));
+            EXPECT_EQ(read(MODE_STRICT | MODE_UTF_STRINGS), strict(row.strict_utf8, utf8));
+        }
+}
+
 TEST(XmlText, raw_xml_is_copied_as_it_stands)
 {
     const reading bodies[] = {
-        {"references stay", "&lt;&#65;&unknown;", "&lt;&#65;&unknown;"},
+        {"references stay", "&lt;&#65;&unknown;&&#x;", "&lt;&#65;&unknown;&&#x;"},
+        {"but for those of no character", "&#0;&#xD800;&#x110000;&a\x01;", "???&a?;"},
         {"section", "a<![CDATA[</a>&]]]>b", "a<![CDATA[</a>&]]]>b"},
         {"section by another name", "<![XYZ[<b]]>", "<![CDATA[<b]]>"},
         {"comment", "a<!-- </a> - -->b<!---->", "a<!-- </a> - -->b<!---->"},

@@ -1,6 +1,9 @@
 // xml_token_test.cpp - tokens, references and encodings of XML input.
 #include "support/reader_input.h"
 
+#include <zuv_client_pro/soap_envelope.h>
+#include <zuv_client_pro/soap_error.h>
+
 #include "codec/xml_token.h"
 
 using namespace reader_input;
@@ -28,7 +31,7 @@ std::string tokens(std::int32_t (*next)(soap *), soap *ctx)
         if (token == XML_EOF)
             break;
     }
-    return text;
+    return ctx->error == 0 ? text : text + failure(ctx);
 }
 
 std::string utf8_tokens(soap *ctx)
@@ -72,26 +75,35 @@ TEST(XmlTokens, references_give_their_character_and_never_markup)
         {"Latin-1 names", "&nbsp;&yuml;&euro;", "{#160}{#255}{#127}[eof]"},
         {"case doesn't count, the first row wins", "&Auml;&auml;&EURO;", "{#196}{#196}{#127}[eof]"},
         {"upper case is no markup name", "&AMP;", "{#127}[eof]"},
-        {"seven bytes are kept", "&#x12345678;", "{#74565}[eof]"},
-        {"too large for the flag", "&#xFFFFFFFF;&#4294967295;", "{#1048575}{#429496}[eof]"},
-        {"no character", "&#0;&#;&#x;&#-1;&;", "{#127}{#127}{#127}{#127}{#127}[eof]"},
-        {"stray ampersands", "a&b<c>&&lt;", "a{#127}[<]c[>]{#127}{<}[eof]"},
+        {"zeros ahead and the last character", "&#0000065;&#x000000000041;&#x10FFFF;&#1114111;",
+         "{A}{A}{#1114111}{#1114111}[eof]"},
+        {"numbers of no character",
+         "&#0;&#11;&#xD800;&#xDFFF;&#xFFFE;&#x110000;&#xFFFFFFFFFFFFFFFF;&#4294967361;",
+         "{?}{?}{?}{?}{?}{?}{?}{?}[eof]"},
+        {"no numbers", "&#;&#x;&#-1;&;", "{#127}{#127}{#127}{#127}[eof]"},
+        {"stray ampersands", "a&b<c>&&lt; & \xE9;", "a{#127}[<]c[>]{#127}{<}#32{#127}#32#233;[eof]"},
         {"swallows a bounded stretch", "&" + std::string(64, 'n') + ";ok", "{#127};ok[eof]"},
         {"end of input", "&am", "{#127}[eof]"},
     };
     expect_readings(rows, raw_tokens);
+    for (const char *wrong :
+         {"&#0;", "&#xD800;", "&#x110000;", "&#;", "&#65x;", "&euro;", "&;", "&b<c>", "& "}) {
+        const reading row[] = {{wrong, wrong, "[eof]!5", MODE_STRICT}};
+        expect_readings(row, raw_tokens);
+    }
 }
 
-TEST(XmlTokens, utf8_is_decoded_unless_the_input_is_latin1)
+// What becomes of them in strings is told in xml_text_test.cpp.
+TEST(XmlTokens, bytes_are_decoded_by_the_encoding)
 {
     const reading rows[] = {
-        {"five and six bytes", "\xF8\x88\x80\x80\x80\xFC\x84\x80\x80\x80\x80\xFD\xBF\xBF\xBF\xBF\xBF",
-         "#2097152#67108864#2147483647[eof]"},
-        {"a lone byte is Latin-1", "\xE9t\xE9", "#233t#40959[eof]"},
-        {"markup stays markup", "\xE9<b>", "#233[<]b[>][eof]"},
-        {"missing continuation", "\xE2\x82", "#8383[eof]"},
-        {"in a section", "<![CDATA[\xC3\xA9]]>", "#233[eof]"},
+        {"five and six bytes", "\xF8\x88\x80\x80\x80\xFC\x84\x80\x80\x80\x80|", "??|[eof]"},
+        {"a lone byte is Latin-1", "\xE9t\xE9", "#233t#233[eof]"},
+        {"a lone byte isn't UTF-8", "\xE9t\xE9", "?t?[eof]", MODE_UTF_STRINGS},
+        {"markup stays markup", "\xE9<b>\xE2\x82</", "#233[<]b[>]?[</][eof]"},
+        {"in a section", "<![CDATA[\xC3\xA9\xE2]]>", "#233#226[eof]"},
         {"Latin-1", "\xC3\xA9", "#195#169[eof]", MODE_LATIN1},
+        {"refused", "a\xE2\x82|", "a[eof]!47", MODE_STRICT},
     };
     expect_readings(rows, utf8_tokens);
 }
@@ -100,17 +112,31 @@ TEST(XmlTokens, the_declaration_chooses_the_encoding)
 {
     const reading rows[] = {
         {"double quotes", "<?xml version='1.0' encoding=\"ISO-8859-1\"?>x", "latin1"},
-        {"single quotes", "<?xml version='1.0' encoding='iso-8859-15'?>x", "latin1"},
-        {"no version", "<?xml\nencoding=\"latin1\"?>x", "latin1"},
+        {"single quotes", "<?xml version='1.0' encoding='Latin1'?>x", "latin1"},
+        {"no version", "<?xml\nencoding=\"iso-8859-1\"?>x", "latin1"},
+        {"blanks", "<?xml version='1.0'" + std::string(80, ' ') + "encoding\n= 'ISO-8859-1' ?>x", "latin1"},
         {"utf-8", "<?xml version='1.0' encoding=\"utf-8\"?>x", "utf-8", MODE_LATIN1},
-        {"upper case", "<?xml version='1.0' encoding=\"UTF-8\"?>x", "utf-8", MODE_LATIN1},
-        {"unknown", "<?xml version='1.0' encoding=\"koi8-r\"?>x", "latin1", MODE_LATIN1},
+        {"ascii", "<?xml version='1.0' encoding=\"US-ASCII\"?>x", "utf-8", MODE_LATIN1},
+        {"windows", "<?xml version='1.0' encoding=\"Windows-1252\"?>x", "windows"},
+        {"the last one counts", "<?xml encoding='cp1252'?><?xml encoding='latin1'?>x", "latin1"},
         {"no name", "<?xml version='1.0' encoding=?>x", "latin1", MODE_LATIN1},
         {"another instruction", "<?xsl version='1.0' encoding=\"latin1\"?>x", "utf-8"},
+        {"unknown", "<?xml version='1.0' encoding=\"koi8-r\"?>x", "refused 'koi8-r'", MODE_LATIN1},
+        {"unknown, with strings in UTF-8", "<?xml encoding='iso-8859-15'?>x", "refused 'iso-8859-15'",
+         MODE_UTF_STRINGS},
+        {"not in these bytes", "<?xml encoding='UTF-16'?>x", "refused 'UTF-16'"},
+        {"no bytes for a trace", "<?xml encoding='a\xE9&amp;\x7F<b'?>x", "refused 'a?&amp;?<b'"},
     };
-    expect_readings(rows, [](soap *ctx) {
-        EXPECT_EQ(soap_char_next(ctx), 'x');
-        return std::string(ctx->mode & MODE_LATIN1 ? "latin1" : "utf-8");
+    expect_readings(rows, [](soap *ctx) -> std::string {
+        const std::int32_t token = soap_char_next_utf8(ctx);
+        if (token == XML_EOF && ctx->error == SOAP_UTF_ERROR) {
+            const std::string text = *soap_fault_string_field(ctx);
+            return "refused " + text.substr(text.find('\''), text.rfind('\'') - text.find('\'') + 1);
+        }
+        EXPECT_EQ(token, 'x');
+        ctx->look_ahead = 0x80;
+        const std::int32_t sign = ctx->mode & MODE_LATIN1 ? soap_char_next_utf8(ctx) : 0;
+        return sign == 0x20AC ? "windows" : sign == 0x80 ? "latin1" : "utf-8";
     });
 }
 

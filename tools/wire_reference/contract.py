@@ -37,6 +37,7 @@ class Type:
     words: list = dataclasses.field(default_factory=list)  # of an enumeration
     members: list = dataclasses.field(default_factory=list)  # its own, in order
     is_class: bool = True
+    wildcard: bool = False   # attributes of other namespaces are allowed
 
 
 @dataclasses.dataclass
@@ -45,6 +46,7 @@ class Operation:
     text: str
     request: str             # element
     response: str
+    faults: list             # elements
 
 
 @dataclasses.dataclass
@@ -151,6 +153,7 @@ class Contract:
             type_.members.append(Member("", type_.base, 1, 1, False, "The text of the element.", value=True))
             type_.base = ""
         content = extension if extension is not None else node
+        type_.wildcard = content.find(XSD + "anyAttribute") is not None
         for part in [*content.findall(XSD + "sequence/" + XSD + "element"), *content.findall(XSD + "attribute")]:
             type_.members.append(self.read_member(part, name))
         return type_
@@ -188,7 +191,8 @@ class Contract:
         port = root.find(WSDL + "portType")
         operations = [Operation(node.get("name"), documentation(node),
                                 messages[qualified(node, node.find(WSDL + "input").get("message"))],
-                                messages[qualified(node, node.find(WSDL + "output").get("message"))])
+                                messages[qualified(node, node.find(WSDL + "output").get("message"))],
+                                [messages[qualified(node, fault.get("message"))] for fault in node.findall(WSDL + "fault")])
                       for node in port.findall(WSDL + "operation")]
         address = root.find(".//" + SOAP + "address").get("location")
         self.ports.append(Port(port.get("name"), documentation(port) or documentation(root), address, operations))

@@ -69,6 +69,8 @@ class Pages:
         elements = [element for element, of in contract.elements.items() if of == key]
         if elements:
             told.append(("Elements", ", ".join("<code>%s</code>" % escape(contract.short(each)) for each in elements)))
+        if type_.wildcard:
+            told.append(("Besides", "attributes of other namespaces"))
         parts.append("<p>" + "<br>".join('<span class="quiet">%s:</span> %s' % row for row in told) + "</p>")
         if type_.words:
             parts.append("<table><tr><th>Code<th>Word" + "".join(
@@ -103,11 +105,12 @@ class Pages:
         return page(contract.prefixes[uri], "\n".join(body))
 
     def port_section(self, port):
-        rows = "".join("<tr><td><code>%s</code><td>%s<td>%s<td>%s" %
-                       (each.name, self.link(self.contract.elements[each.request]),
-                        self.link(self.contract.elements[each.response]), escape(each.text)) for each in port.operations)
+        elements = self.contract.elements
+        rows = "".join("<tr><td><code>%s</code><td>%s<td>%s<td>%s<td>%s" %
+                       (each.name, self.link(elements[each.request]), self.link(elements[each.response]), escape(each.text),
+                        ", ".join(self.link(elements[fault]) for fault in each.faults)) for each in port.operations)
         return ("<h2>%s</h2><p>%s</p><p class=\"quiet\">Default endpoint <code>%s</code></p>"
-                "<table><tr><th>Operation<th>Request<th>Response<th>What%s</table>" %
+                "<table><tr><th>Operation<th>Request<th>Response<th>What<th>Faults%s</table>" %
                 (port.name, escape(port.text), escape(port.address), rows))
 
     def index(self):

@@ -1,0 +1,33 @@
+// tcp_wait.h - private: the time limits of steps and of a whole call, and waiting within them.
+//
+// Always: limits run on the monotonic clock. A deadline is taken once, when its step begins, so that neither
+// signals nor a peer that comes up with one byte after the other put it off. The clock is read only where
+// there is a limit.
+#pragma once
+
+#include <cstdint>
+
+#include <zuv_client_pro/soap.h>
+
+// When a step must have ended: microseconds of the monotonic clock; 0: no limit.
+using tcp_deadline = std::int64_t;
+
+// The end of a step that begins now: after `timeout` (0 none, positive seconds, negative microseconds) or
+// with the call, whichever comes first.
+tcp_deadline tcp_deadline_of(const soap *ctx, int timeout);
+
+// True if the deadline, or that of the call, has passed.
+bool tcp_is_over(soap *ctx, tcp_deadline deadline);
+
+// True if call_timeout has passed. Notes in call_expired whether it has.
+bool tcp_call_is_over(soap *ctx);
+
+// The time of a call begins now, by call_timeout.
+void tcp_call_begin(soap *ctx);
+
+// As tcp_wait, but up to `deadline` and whatever signals arrive. Asks once if the deadline has passed;
+// doesn't ask if the call is over.
+int tcp_wait_until(soap *ctx, int socket, int flags, tcp_deadline deadline);
+
+// Text of a fault for a step whose time is up: constant, or in message_text.
+const char *tcp_timeout_text(soap *ctx);

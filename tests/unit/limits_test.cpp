@@ -1,0 +1,491 @@
+// limits_test.cpp - what one message may cost: bytes, memory, copies, raw bytes that bring nothing.
+//
+// Elsewhere: the limit of open elements (xml_read_test.cpp, binding_test.cpp), heads
+// (http_response_test.cpp).
+#include <cstdio>
+#include <deque>
+#include <filesystem>
+#include <functional>
+#include <string>
+
+#include <malloc.h>
+
+#include <gtest/gtest.h>
+
+#include <zuv_client_pro/ProfileSoapBindingProxy.h>
+#include <zuv_client_pro/protocol.h>
+#include <zuv_client_pro/protocolProfile.h>
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_log.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include "support/attachment_exchange.h"
+#include "support/call_wire.h"
+#include "support/deflated.h"
+#include "support/memory_wire.h"
+
+namespace {
+
+constexpr std::size_t MB = 1U << 20;
+
+std::string repeated(const std::string &text, std::size_t times)
+{
+    std::string all;
+    for (std::size_t i = 0; i < times; ++i)
+        all += text;
+    return all;
+}
+
+// The error is that of a limit, its text names it, and the connection carries no other message.
+void expect_told(soap &ctx, const std::string &limit)
+{
+    char text[512] = "";
+    EXPECT_EQ(ctx.error, SOAP_LENGTH);
+    EXPECT_NE(std::string(soap_fault_print_text(&ctx, text, sizeof text)).find("\"" + limit),
+              std::string::npos)
+        << text;
+    EXPECT_TRUE(ctx.response_unfinished || ctx.socket == -1);
+}
+
+std::string more_than(std::uint64_t bytes)
+{
+    return ": more than " + std::to_string(bytes) + " bytes\"";
+}
+
+// --- max_message ---
+
+std::string with_length(const std::string &body, const std::string &more = {})
+{
+    return "HTTP/1.1 200 OK\r\nContent-Type: text/xml\r\n" + more +
+           "Content-Length: " + std::to_string(body.size()) + "\r\n\r\n" + body;
+}
+
+std::string in_chunks(const std::string &body, const std::string &more = {})
+{
+    std::string message =
+        "HTTP/1.1 200 OK\r\nContent-Type: text/xml\r\n" + more + "Transfer-Encoding: chunked\r\n\r\n";
+    for (std::size_t at = 0; at < body.size(); at += 300) {
+        const std::string part = body.substr(at, 300);
+        char size[32];
+        std::snprintf(size, sizeof size, "%zx\r\n", part.size());
+        message += size + part + "\r\n";
+    }
+    return message + "0\r\n\r\n";
+}
+
+const std::string GZIP = "Content-Encoding: gzip\r\n";
+
+TEST(max_message, counts_the_plain_bytes_of_what_is_received)
+{
+    const struct {
+        const char *form;
+        std::string (*wrap)(const std::string &body);
+    } rows[] = {
+        {"a length", [](const std::string &body) { return with_length(body); }},
+        {"a length, and the next message at once",
+         [](const std::string &body) { return with_length(body) + with_length(body); }},
+        {"chunks", [](const std::string &body) { return in_chunks(body); }},
+        {"gzip", [](const std::string &body) { return with_length(gzipped(body), GZIP); }},
+        {"gzip in chunks", [](const std::string &body) { return in_chunks(gzipped(body), GZIP); }},
+        {"bare", [](const std::string &body) { return body; }},
+        {"bare gzip", [](const std::string &body) { return gzipped(body); }},
+    };
+    for (const auto &row : rows) {
+        for (const std::size_t size : {std::size_t{1000}, std::size_t{200000}}) {
+            for (const std::size_t limit : {size, size - 1, std::size_t{0}}) {
+                SCOPED_TRACE(std::string(row.form) + ", " + std::to_string(size) + " bytes, limit " +
+                             std::to_string(limit));
+                memory_wire wire(MODE_KEEP_ALIVE);
+                wire.keep_alive = 1;
+                wire.max_message = limit;
+                wire.piece = [](std::size_t) { return 5; }; // so that no part of the framing comes whole
+                wire.receive(row.wrap("<a>" + std::string(size - 7, 'x') + "</a>"));
+                if (soap_receive_begin(&wire) == 0 && soap_recv_skip(&wire, size) == 0)
+                    soap_receive_finish(&wire);
+                if (limit == size - 1)
+                    expect_told(wire, "max_message" + more_than(limit));
+                else
+                    EXPECT_EQ(wire.error, 0);
+            }
+        }
+    }
+}
+
+int write_document(soap *ctx, const std::string &text)
+{
+    if (soap_element_out_begin(ctx, "a", 0, nullptr) || soap_text_write(ctx, text.c_str(), 0))
+        return ctx->error;
+    return soap_element_out_end(ctx, "a");
+}
+
+int send_document(memory_wire &wire, const std::string &text)
+{
+    wire.on_response = nullptr;
+    if (soap_count_begin(&wire) || ((wire.mode & MODE_COUNTING) && write_document(&wire, text)) ||
+        soap_count_end(&wire) || soap_send_begin(&wire) || soap_send_text(&wire, "the head\r\n") ||
+        write_document(&wire, text))
+        return wire.error;
+    return soap_send_finish(&wire);
+}
+
+TEST(max_message, counts_the_plain_bytes_of_what_is_sent)
+{
+    const struct {
+        const char *form;
+        std::uint32_t modes;
+    } rows[] = {{"counted", MODE_BUFFERED},
+                {"direct", MODE_DIRECT},
+                {"chunks", MODE_CHUNKED},
+                {"stored", MODE_STORE},
+                {"bare", MODE_BUFFERED | MODE_BARE_XML},
+                {"compressed chunks", MODE_CHUNKED | MODE_DEFLATE},
+                {"compressed and stored", MODE_STORE | MODE_DEFLATE}};
+    for (const std::size_t size : {std::size_t{300}, std::size_t{150000}}) {
+        memory_wire plain(0, MODE_BARE_XML);
+        const std::string text(size, 'x');
+        ASSERT_EQ(send_document(plain, text), 0);
+        const std::uint64_t whole = plain.sent().size() - std::string("the head\r\n").size();
+        for (const auto &row : rows) {
+            for (const std::uint64_t limit : {whole, whole - 1}) {
+                SCOPED_TRACE(std::string(row.form) + ", " + std::to_string(size));
+                memory_wire wire(0, row.modes);
+                wire.max_message = limit;
+                EXPECT_EQ(send_document(wire, text), limit == whole ? 0 : SOAP_LENGTH);
+                if (limit == whole)
+                    continue;
+                expect_told(wire, "max_message" + more_than(limit));
+                EXPECT_LT(wire.sent().size(), whole);
+            }
+        }
+    }
+}
+
+// --- attachments, in memory and through callbacks ---
+
+TEST(attachments, count_in_max_memory_where_they_are_kept_in_memory)
+{
+    using namespace attachment_exchange;
+    const std::string one(300000, 'o'), other(300000, 'p');
+    for (const std::uint32_t form : {std::uint32_t{0}, MODE_MIME | MODE_MTOM}) {
+        memory_wire out(0, MODE_BUFFERED | MODE_BARE_XML | form);
+        out.max_message = 5000;
+        ASSERT_EQ(send(out, {make_value(one, "cid:x", "a/b"), make_value(other, "cid:y", "a/b")}), 0);
+        const struct {
+            const char *rule;
+            bool streams;
+            std::uint64_t message, memory;
+            std::string exceeded;
+        } rows[] = {{"in memory", false, 5000, 2 * MB, ""},
+                    {"in too little memory", false, 5000, MB / 2, "max_memory" + more_than(MB / 2)},
+                    {"streamed", true, 5000, MB / 8, ""},
+                    {"the XML alone too long", true, 100, MB, "max_message" + more_than(100)}};
+        for (const auto &row : rows) {
+            SCOPED_TRACE(std::string(row.rule) + (form == 0 ? ", DIME" : ", MTOM"));
+            reception in(out.sent(), form);
+            in.wire->max_message = row.message;
+            in.wire->max_memory = row.memory;
+            if (row.streams) {
+                in.wire->dime_write_open = [](soap *c, const char *, const char *, const char *) {
+                    return static_cast<void *>(c);
+                };
+                in.wire->mime_write_open = [](soap *c, void *, const char *, const char *, const char *,
+                                              int) { return static_cast<void *>(c); };
+                in.wire->dime_write =
+                    in.wire->mime_write = [](soap *, void *, const char *, std::size_t) { return 0; };
+            }
+            EXPECT_EQ(in.run(), row.exceeded.empty() ? 0 : SOAP_LENGTH);
+            if (!row.exceeded.empty())
+                expect_told(*in.wire, row.exceeded);
+        }
+    }
+}
+
+// --- max_memory ---
+
+std::string answer_with(const std::string &content, const std::string &behind = {})
+{
+    return answer_envelope("<E:Body><p:getResponse>" + content + "</p:getResponse>" + behind + "</E:Body>");
+}
+
+// A proxy that is answered by one message.
+struct get_call {
+    explicit get_call(const std::string &answer = {}) : proxy(static_cast<int>(MODE_KEEP_ALIVE))
+    {
+        wire.carry(proxy);
+        wire.answers.push_back(answer);
+    }
+    int run() { return proxy.get(&request, response); }
+
+    call_wire wire;
+    ProfileSoapBindingProxy proxy;
+    _protocolProfile__getRequest request;
+    __protocolProfile__getResponse response{};
+};
+
+std::size_t memory_in_use()
+{
+    const struct mallinfo2 info = mallinfo2();
+    return info.uordblks + info.hblkhd;
+}
+
+#if defined(__SANITIZE_ADDRESS__)
+constexpr bool KNOWS_MEMORY_IN_USE = false; // the sanitizer's allocator doesn't tell
+#elif defined(__has_feature)
+constexpr bool KNOWS_MEMORY_IN_USE = !__has_feature(address_sanitizer);
+#else
+constexpr bool KNOWS_MEMORY_IN_USE = true;
+#endif
+
+std::string numbered(const std::string &before, const std::string &behind, int count)
+{
+    std::string all;
+    for (int i = 0; i < count; ++i)
+        all += before + std::to_string(i) + behind;
+    return all;
+}
+
+TEST(max_memory, counts_what_a_message_holds)
+{
+    const struct {
+        const char *content;
+        std::string xml;
+        std::uint64_t passing = 0; // bytes that were held for some time only
+    } rows[] = {
+        {"objects", repeated("<p:profile/>", 5000)},
+        {"texts", repeated("<p:thisURI>urn:a-text-that-is-too-long-to-stand-in-place</p:thisURI>", 20000)},
+        {"short texts", repeated("<p:thisURI>u</p:thisURI>", 20000)},
+        {"a long text", "<c:identity><c:name>" + std::string(3000000, 'n') + "</c:name></c:identity>"},
+        {"a text with references",
+         "<c:identity><c:name>" + repeated("caf&#xE9; ", 300000) + "</c:name></c:identity>"},
+        {"bytes",
+         "<c:credentials><c:certificate>" + std::string(4000000, 'A') + "</c:certificate></c:credentials>"},
+        {"ids", numbered("<c:contact id=\"c", "\"/>", 5000)},
+        {"references", "<c:contact id=\"c\"/>" + repeated("<c:contact href=\"#c\"/>", 50000)},
+        {"references ahead",
+         repeated("<p:thisURI href=\"#u\"/>", 50000) + "<p:thisURI id=\"u\">u</p:thisURI>", 2 * MB},
+        {"attribute values", numbered("<p:profile a", "=\"" + std::string(20000, 'v') + "\"/>", 200)},
+    };
+    for (const auto &row : rows) {
+        SCOPED_TRACE(row.content);
+        const std::string answer = with_length(answer_with(row.xml));
+        std::uint64_t held = 0;
+        {
+            const std::size_t before = memory_in_use();
+            get_call free_of_limits(answer);
+            ASSERT_EQ(free_of_limits.run(), 0);
+            const double used = static_cast<double>(memory_in_use() - before);
+            held = static_cast<std::uint64_t>(free_of_limits.proxy.memory_held);
+            std::printf("%-25s %9zu bytes of XML, %9.0f bytes in use, counted %4.2f times\n", row.content,
+                        row.xml.size(), used, static_cast<double>(held) / used);
+            if (KNOWS_MEMORY_IN_USE) {
+                EXPECT_LT(used, 1.25 * static_cast<double>(held));
+                EXPECT_GT(used, 0.8 * static_cast<double>(held));
+            }
+        }
+        for (const bool enough : {true, false}) {
+            get_call limited(answer);
+            const std::uint64_t limit = enough ? held + row.passing : held - 1;
+            limited.proxy.max_memory = limit;
+            EXPECT_EQ(limited.run(), enough ? 0 : SOAP_LENGTH);
+            EXPECT_EQ(limited.wire.closed, enough ? 0 : 1);
+            if (!enough)
+                expect_told(limited.proxy, "max_memory" + more_than(limit));
+        }
+    }
+}
+
+// What a host holds from earlier answers is its own affair.
+TEST(max_memory, is_a_messages_own)
+{
+    const std::string answer = with_length(answer_with(repeated("<p:profile/>", 1000)));
+    get_call calls(answer);
+    ASSERT_EQ(calls.run(), 0);
+    calls.proxy.max_memory = static_cast<std::uint64_t>(calls.proxy.memory_held);
+    for (int i = 0; i < 3; ++i) {
+        calls.wire.answers.push_back(answer);
+        EXPECT_EQ(calls.run(), 0) << i;
+    }
+    EXPECT_NE(soap_block_alloc(&calls.proxy, 4 * MB), nullptr) << "outside of a message";
+    calls.proxy.destroy();
+    calls.wire.answers.push_back(answer);
+    EXPECT_EQ(calls.run(), 0);
+}
+
+TEST(max_memory, stops_a_small_answer_that_grows)
+{
+    const std::string bomb = gzipped(answer_with(repeated("<p:profile/>", 1000000)));
+    const std::string answer = with_length(bomb, GZIP);
+    get_call call(answer);
+    call.proxy.max_memory = 8 * MB;
+    const std::size_t before = memory_in_use();
+    EXPECT_EQ(call.run(), SOAP_LENGTH);
+    expect_told(call.proxy, "max_memory" + more_than(8 * MB));
+    if (KNOWS_MEMORY_IN_USE) {
+        EXPECT_LT(memory_in_use() - before, 20 * MB);
+    }
+    EXPECT_EQ(call.wire.closed, 1);
+    call.wire.answers = {with_length(answer_with(""))};
+    call.proxy.destroy();
+    EXPECT_EQ(call.run(), 0) << "the next call";
+}
+
+TEST(max_memory, bounds_a_stored_message)
+{
+    for (const std::uint64_t limit : {2 * MB, MB / 2}) {
+        memory_wire wire(0, MODE_STORE);
+        wire.max_memory = limit;
+        EXPECT_EQ(send_document(wire, std::string(MB, 'x')), limit > MB ? 0 : SOAP_LENGTH);
+        if (limit < MB)
+            expect_told(wire, "max_memory" + more_than(limit));
+        EXPECT_EQ(wire.sends.empty(), limit < MB);
+    }
+}
+
+// --- copies ---
+
+TEST(copies, by_references_and_qnames_are_bounded_by_the_message)
+{
+    const std::string big(100000, 'u');
+    const auto with_texts = [&](std::size_t times) {
+        return answer_with("<p:thisURI id=\"u\">" + big + "</p:thisURI>" +
+                           repeated("<p:thisURI href=\"#u\"/>", times));
+    };
+    const auto with_objects = [&](std::size_t times) {
+        return answer_with("", "<p:ProfileContent id=\"o\"><p:thisURI>" + big +
+                                   "</p:thisURI></p:ProfileContent>" +
+                                   repeated("<p:ProfileContent href=\"#o\"/>", times));
+    };
+    const auto with_qnames = [&](std::size_t times) {
+        return answer_envelope("<E:Body><E:Fault xmlns:q=\"" + big + "\"><faultcode>" +
+                               repeated("q:x ", times) + "</faultcode></E:Fault></E:Body>");
+    };
+    const struct {
+        const char *rule;
+        std::function<std::string(std::size_t)> answer;
+        int usual;
+    } rows[] = {{"texts", with_texts, 0}, {"objects", with_objects, 0}, {"QNames", with_qnames, SOAP_FAULT}};
+    for (const auto &row : rows) {
+        for (const std::size_t times : {10, 300}) {
+            SCOPED_TRACE(std::string(row.rule) + " " + std::to_string(times));
+            get_call call(with_length(row.answer(times)));
+            const bool within = times == 10;
+            EXPECT_EQ(call.run(), within ? row.usual : SOAP_LENGTH);
+            EXPECT_LT(call.proxy.memory_held, static_cast<std::int64_t>(4 * MB));
+            if (within)
+                continue;
+            expect_told(call.proxy, "copies by references and QNames: more than ");
+            EXPECT_EQ(call.wire.closed, 1);
+        }
+    }
+}
+
+// --- few objects that are written very often ---
+
+TEST(max_message, ends_the_writing_of_a_graph_that_is_no_tree)
+{
+    std::deque<protocolProfile__ProfileContent> levels(40); // 2^39 objects as a tree
+    for (std::size_t i = 0; i + 1 < levels.size(); ++i)
+        levels[i].profile = {&levels[i + 1], &levels[i + 1]};
+    for (const std::uint32_t mode : {MODE_BUFFERED, MODE_CHUNKED, MODE_STORE}) {
+        SCOPED_TRACE(mode);
+        const std::string answer = with_length(answer_with(""));
+        get_call calls(answer);
+        ASSERT_EQ(calls.run(), 0);
+        EXPECT_EQ(calls.wire.closed, 0);
+        calls.wire.sent.clear();
+        calls.proxy.output_mode = mode | MODE_KEEP_ALIVE;
+        calls.proxy.max_message = MB;
+        __protocolProfile__setResponse response{};
+        EXPECT_EQ(calls.proxy.set(&levels[0], response), SOAP_LENGTH);
+        expect_told(calls.proxy, "max_message" + more_than(MB));
+        EXPECT_LE(calls.wire.sent.size(), mode == MODE_CHUNKED ? MB + MB / 16 : 0);
+        EXPECT_EQ(calls.wire.closed, 1);
+        calls.proxy.output_mode = MODE_KEEP_ALIVE;
+        calls.wire.answers = {answer};
+        EXPECT_EQ(calls.run(), 0) << "the next call";
+        EXPECT_EQ(calls.wire.opened, 2);
+    }
+}
+
+// --- without end ---
+
+// A peer that repeats itself for ever.
+struct endless_peer : call_wire {
+    std::string first, rest;
+    std::size_t given = 0;
+
+    void carry(soap &ctx)
+    {
+        call_wire::carry(ctx);
+        ctx.on_recv = [](soap *c, char *buffer, std::size_t length) {
+            auto &self = static_cast<endless_peer &>(*static_cast<call_wire *>(c->user));
+            for (std::size_t i = 0; i < length; ++i, ++self.given)
+                buffer[i] = self.given < self.first.size()
+                                ? self.first[self.given]
+                                : self.rest[(self.given - self.first.size()) % self.rest.size()];
+            return length;
+        };
+    }
+};
+
+TEST(endless, input_ends_by_a_limit_and_so_does_its_trace)
+{
+    const std::string head = "HTTP/1.1 200 OK\r\nContent-Type: text/xml\r\n";
+    const std::string body = head + "\r\n", chunks = head + "Transfer-Encoding: chunked\r\n\r\n";
+    const std::string whole = in_chunks(answer_with(""));
+    const std::string ended = whole.substr(0, whole.size() - 5); // without the last chunk
+    const std::string message = "max_message" + more_than(MB),
+                      framing = "framing without contents: more than ";
+    const struct {
+        const char *name;
+        std::string first, rest;
+        int code;
+        std::string text;
+    } rows[] = {
+        {"blank lines ahead of the head", "", "\r\n", SOAP_HEADER_LINE, "Header line too long"},
+        {"blanks ahead of the root", body, " ", SOAP_LENGTH, message},
+        {"comments", body, "<!-- c -->", SOAP_LENGTH, message},
+        {"a comment", body + "<!--", "c", SOAP_LENGTH, message},
+        {"instructions", body, "<?p i?>", SOAP_LENGTH, message},
+        {"a document type", body + "<!DOCTYPE a [", "<!ELEMENT a ANY>", SOAP_LENGTH, message},
+        {"a name", body + "<", "n", SOAP_LENGTH, message},
+        {"an attribute", body + "<a b='", "c", SOAP_LENGTH, message},
+        {"a preamble", head + "Content-Type: multipart/related; boundary=\"b\"\r\n\r\n", "x\r\n", SOAP_LENGTH,
+         message},
+        {"blanks behind the envelope", ended, "4\r\n    \r\n", SOAP_LENGTH, message},
+        {"extensions of chunks", chunks, "1;" + std::string(4000, 'x') + "\r\n \r\n", SOAP_LENGTH, framing},
+        {"zeros of chunk sizes", chunks, std::string(15, '0') + "1\r\n \r\n", SOAP_LENGTH, framing},
+        {"empty blocks of deflate", head + GZIP + "\r\n" + gzipped("").substr(0, 10),
+         std::string("\0\0\0\xFF\xFF", 5), SOAP_LENGTH, framing},
+    };
+    const std::filesystem::path trace =
+        std::filesystem::temp_directory_path() / ("limits_test." + std::to_string(getpid()));
+    for (const auto &row : rows) {
+        SCOPED_TRACE(row.name);
+        endless_peer peer;
+        peer.first = row.first;
+        peer.rest = row.rest;
+        ProfileSoapBindingProxy proxy(static_cast<int>(MODE_KEEP_ALIVE));
+        peer.carry(proxy);
+        proxy.max_message = MB;
+        soap_log_set_received(&proxy, trace.c_str());
+        _protocolProfile__getRequest request;
+        __protocolProfile__getResponse response{};
+        EXPECT_EQ(proxy.get(&request, response), row.code);
+        char text[512] = "";
+        EXPECT_NE(std::string(soap_fault_print_text(&proxy, text, sizeof text)).find("\"" + row.text),
+                  std::string::npos)
+            << text;
+        EXPECT_EQ(peer.closed, 1);
+        // Blanks ahead of a head, the head, framing: 1 MB each, and eight bytes of framing for one of XML.
+        EXPECT_LE(peer.given, 3 * MB + 8 * proxy.max_message);
+        EXPECT_LE(std::filesystem::file_size(trace), peer.given + 2 * proxy.max_message);
+        std::printf("%-32s %8zu bytes, trace of %8zu\n", row.name, peer.given,
+                    static_cast<std::size_t>(std::filesystem::file_size(trace)));
+        soap_log_set_received(&proxy, nullptr);
+        std::filesystem::remove(trace);
+    }
+}
+
+} // namespace
