@@ -75,9 +75,9 @@ int share_and_note(soap *ctx, soap_plugin_record *record, void *argument)
 // Runs in each thread, at the same time as in all the others.
 void on_threads(const std::function<void()> &work)
 {
+    std::atomic<int> missing = THREADS; // outlives the threads, which its end would not wait for
     std::vector<std::jthread> threads;
     threads.reserve(THREADS);
-    std::atomic<int> missing = THREADS;
     for (int i = 0; i < THREADS; ++i)
         threads.emplace_back([&] {
             --missing;
