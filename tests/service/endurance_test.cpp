@@ -219,7 +219,9 @@ TEST(Endurance, SmallRequestsMakeNoLargeWork)
         EXPECT_NE(answer.body.find(r.answered), std::string::npos)
             << r.what << ": " << answer.body.substr(0, 3000);
     }
-    EXPECT_LT(service.peak_memory(), MEMORY_MAX);
+    if (MEMORY_IS_MEASURED) {
+        EXPECT_LT(service.peak_memory(), MEMORY_MAX);
+    }
     EXPECT_EQ(service.stop(), 0);
 }
 

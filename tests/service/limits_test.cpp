@@ -15,14 +15,6 @@ namespace {
 
 constexpr std::size_t MB = 1U << 20;
 
-#if defined(__SANITIZE_ADDRESS__)
-constexpr bool MEMORY_IS_MEASURED = false; // the sanitizer keeps freed blocks
-#elif defined(__has_feature)
-constexpr bool MEMORY_IS_MEASURED = !__has_feature(address_sanitizer);
-#else
-constexpr bool MEMORY_IS_MEASURED = true;
-#endif
-
 std::string repeated(const std::string &text, std::size_t times)
 {
     std::string all;

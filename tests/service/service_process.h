@@ -23,6 +23,15 @@ private:
     std::filesystem::path path_;
 };
 
+// Whether the memory of a process tells what it holds.
+#if defined(__SANITIZE_ADDRESS__)
+constexpr bool MEMORY_IS_MEASURED = false; // the sanitizer keeps freed blocks
+#elif defined(__has_feature)
+constexpr bool MEMORY_IS_MEASURED = !__has_feature(address_sanitizer);
+#else
+constexpr bool MEMORY_IS_MEASURED = true;
+#endif
+
 class service_process {
 public:
     // Starts the service and waits until it listens, at most START_LIMIT_MS. Its documents go when it goes,
