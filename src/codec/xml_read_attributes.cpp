@@ -223,7 +223,7 @@ void keep_reference(char *target, std::string_view name)
 void keep_array_type(soap *ctx, std::string_view value)
 {
     const std::size_t bracket = value.rfind('[');
-    if (bracket == std::string_view::npos || bracket > SOAP_TEXT_SIZE - 1) {
+    if (bracket > SOAP_TEXT_SIZE - 1) { // none, too
         keep_text(ctx->array_type, value);
         return;
     }

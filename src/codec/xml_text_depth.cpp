@@ -26,11 +26,10 @@ void append(soap *ctx, std::size_t *length, std::string_view text)
 void append_name(soap *ctx, std::size_t *length, const char *name)
 {
     char text[SOAP_TEXT_SIZE];
-    const std::size_t size = std::strlen(name);
+    const std::string_view whole = name;
     if ((ctx->mode & MODE_UTF_STRINGS) != 0)
-        return append(ctx, length, {name, size});
-    std::memcpy(text, name, size);
-    append(ctx, length, {text, utf8_to_latin1(text, size)});
+        return append(ctx, length, whole);
+    append(ctx, length, {text, utf8_to_latin1(text, whole.copy(text, sizeof text))});
 }
 
 std::size_t rebuild_tag(soap *ctx)

@@ -300,15 +300,11 @@ int xml_skip_content(soap *ctx, std::uint64_t depth)
 {
     bool too_deep = depth != 0 && skips_too_deep(ctx, depth - 1);
     for (;;) {
-        std::int32_t token;
-        if (too_deep)
-            token = XML_EOF;
-        else if (ctx->look_ahead != 0 || ctx->in_cdata != CDATA_OUTSIDE)
+        std::int32_t token = XML_EOF;
+        if (!too_deep && (ctx->look_ahead != 0 || ctx->in_cdata != CDATA_OUTSIDE))
             token = soap_char_next(ctx);
-        else if (skip_past(ctx, '<') != XML_EOF)
+        else if (!too_deep && skip_past(ctx, '<') != XML_EOF)
             token = xml_markup_next(ctx);
-        else
-            token = XML_EOF;
         if (token == XML_END && depth-- == 0)
             return 0;
         if (token == XML_START) {
