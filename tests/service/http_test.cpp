@@ -232,7 +232,7 @@ TEST(Http, KeepsItsFilesForTheirOwner)
         struct stat about = {};
         return stat(path.c_str(), &about) == 0 ? about.st_mode & 07777 : 0;
     };
-    for (const mode_t mask : {0, 0277}) {
+    for (const mode_t mask : {mode_t{0}, mode_t{0277}}) {
         scratch_directory directory;
         const std::string fresh = directory.file("fresh.db"), old = directory.file("old.db");
         std::ofstream(old).close();

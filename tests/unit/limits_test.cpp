@@ -366,7 +366,7 @@ TEST(copies, by_references_and_qnames_are_bounded_by_the_message)
         int usual;
     } rows[] = {{"texts", with_texts, 0}, {"objects", with_objects, 0}, {"QNames", with_qnames, SOAP_FAULT}};
     for (const auto &row : rows) {
-        for (const std::size_t times : {10, 300}) {
+        for (const std::size_t times : {10U, 300U}) {
             SCOPED_TRACE(std::string(row.rule) + " " + std::to_string(times));
             get_call call(with_length(row.answer(times)));
             const bool within = times == 10;
