@@ -27,7 +27,7 @@ namespace {
 constexpr std::size_t SHORT_LIST = 32; // references that are simply walked through
 constexpr std::size_t FIRST_CHAINS = 256;
 
-bool equal(id_view one, id_view other)
+bool equal(const id_view &one, const id_view &other)
 {
     return id_compare(one, other) == 0;
 }

@@ -25,7 +25,7 @@ void append(soap *ctx, std::size_t *length, std::string_view text)
 // Names are UTF-8 in every mode.
 void append_name(soap *ctx, std::size_t *length, const char *name)
 {
-    char text[SOAP_TEXT_SIZE];
+    char text[SOAP_TEXT_SIZE] = "";
     const std::string_view whole = name;
     if ((ctx->mode & MODE_UTF_STRINGS) != 0)
         return append(ctx, length, whole);
