@@ -261,7 +261,9 @@ void call_all(const hostility &peer, bool tls)
         if (i == 0) {
             first_call_is_over = true;
             first_call_is_over.notify_all();
-            EXPECT_EQ(caller.milliseconds >= -BRIEF_US / 1000, meets_limit) << peer.name;
+            if (meets_limit) {
+                EXPECT_GE(caller.milliseconds, -BRIEF_US / 1000) << peer.name;
+            }
         }
     }
     std::printf("%-35s %-4s %-12s %d connections %5d ms\n", peer.name.c_str(), tls ? "TLS" : "TCP",
