@@ -32,9 +32,9 @@ constexpr int STRETCHES = 20; // after the first of them nothing is made for the
 constexpr int ANEW = 100;     // one call in so many goes over a new connection
 constexpr std::ptrdiff_t BLOCK_LIMIT =
     20; // by which the blocks held may differ: of a session, of a random state
-constexpr double SLOWDOWN_LIMIT =
-    2.5; // of processor time per call. A busy neighbour on the same core makes up to 1.6; what
-         // grows with the calls made grows to a multiple of it in so many
+// Of processor time per call. 1.53 was measured beside another program on the same cores, with flat memory; a
+// cost that grows with the calls made grows to a multiple in so many.
+constexpr double SLOWDOWN_LIMIT = 2.5;
 
 int calls()
 {
