@@ -1,5 +1,5 @@
 // engine_run.cpp - the message's part of a call: the same steps in the same order as the proxies'
-// (src/proxies/call.cpp).
+// (src/exchange/call.cpp).
 #include "engine_run.h"
 
 #include <algorithm>

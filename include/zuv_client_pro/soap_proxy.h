@@ -1,7 +1,7 @@
 // soap_proxy.h - what every proxy class has, declared once.
 //
 // Here: the members and operations common to the generated proxies (*SoapBindingProxy.h). Elsewhere: the
-// context that a proxy is (soap.h), the cycle of a call (src/proxies).
+// context that a proxy is (soap.h), the cycle of a call (src/exchange).
 //
 // Always: a proxy is one engine context: one thread at a time, at most one connection, one set of managed
 // objects. What a call leaves behind lives in the proxy until `destroy`.

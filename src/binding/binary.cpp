@@ -6,9 +6,9 @@
 #include <zuv_client_pro/soap_primitive.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "attachments/attachment_value.h"
 #include "binding/class_rules.h"
 #include "binding/law_binary.h"
-#include "codec/attachment_value.h"
 
 namespace binding {
 

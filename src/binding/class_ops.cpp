@@ -12,10 +12,10 @@
 
 #include "binding/member_read.h"
 #include "binding/registry.h"
-#include "codec/namespace_scope.h"
-#include "codec/tag_view.h"
-#include "codec/xml_scan.h"
-#include "engine/limits.h"
+#include "core/limits.h"
+#include "xml/namespace_scope.h"
+#include "xml/tag_view.h"
+#include "xml/xml_scan.h"
 
 namespace binding {
 

@@ -15,7 +15,7 @@
 #include "binding/law.h"
 #include "binding/member_read.h"
 #include "binding/member_write.h"
-#include "codec/tag_view.h"
+#include "xml/tag_view.h"
 
 namespace binding {
 

@@ -15,7 +15,7 @@
 #include "binding/member_write.h"
 #include "binding/name_lookup.h"
 #include "binding/registry.h"
-#include "engine/limits.h"
+#include "core/limits.h"
 
 namespace binding {
 

@@ -13,9 +13,9 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "binding/registry.h"
-#include "codec/type_check.h"
-#include "codec/xml_text.h"
-#include "engine/limits.h"
+#include "core/limits.h"
+#include "values/type_check.h"
+#include "xml/xml_text.h"
 
 namespace binding {
 

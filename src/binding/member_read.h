@@ -18,7 +18,7 @@
 #include "binding/class_ops.h"
 #include "binding/law.h"
 #include "binding/vector_forms.h"
-#include "engine/limits.h"
+#include "core/limits.h"
 
 namespace binding {
 

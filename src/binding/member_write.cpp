@@ -9,7 +9,7 @@
 #include <zuv_client_pro/soap_primitive.h>
 #include <zuv_client_pro/soap_xml.h>
 
-#include "codec/xml_write_fast.h"
+#include "xml/xml_write_fast.h"
 
 namespace binding {
 

@@ -7,7 +7,7 @@
 
 #include "binding/name_lookup.h"
 #include "binding/registry.h"
-#include "codec/tag_view.h"
+#include "xml/tag_view.h"
 
 namespace binding {
 

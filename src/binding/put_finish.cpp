@@ -4,7 +4,7 @@
 #include <zuv_client_pro/soap_registry.h>
 
 #include "binding/registry.h"
-#include "codec/identity_apart.h"
+#include "identity/identity_apart.h"
 
 namespace binding {
 

@@ -14,8 +14,8 @@
 
 #include "binding/envelope.h"
 #include "binding/name_lookup.h"
-#include "codec/tag_view.h"
-#include "engine/limits.h"
+#include "core/limits.h"
+#include "xml/tag_view.h"
 
 namespace binding {
 

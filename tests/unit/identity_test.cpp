@@ -15,7 +15,7 @@
 
 #include <gtest/gtest.h>
 
-#include "codec/identity.h"
+#include "identity/identity.h"
 #include "support/failing_malloc.h"
 #include "support/memory_wire.h"
 

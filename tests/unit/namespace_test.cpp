@@ -5,9 +5,9 @@
 
 #include <zuv_client_pro/soap_error.h>
 
-#include "codec/namespace.h"
 #include "support/failing_malloc.h"
 #include "support/writer_fixture.h"
+#include "xml/namespace.h"
 
 using writer_fixture::table;
 using writer_fixture::writer;

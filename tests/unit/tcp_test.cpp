@@ -16,8 +16,8 @@
 #include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_tls.h>
 
+#include "net/tcp_socket.h"
 #include "support/tcp_client.h"
-#include "transport/tcp_socket.h"
 
 namespace {
 

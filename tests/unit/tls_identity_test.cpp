@@ -9,9 +9,9 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_tls.h>
 
+#include "net/tls_connection.h"
 #include "support/socket_calls.h"
 #include "support/tls_peer.h"
-#include "transport/tls_connection.h"
 
 namespace {
 

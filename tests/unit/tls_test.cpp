@@ -17,10 +17,10 @@
 #include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_tls.h>
 
+#include "net/tcp_socket.h"
+#include "net/tls_connection.h"
 #include "support/socket_calls.h"
 #include "support/tls_peer.h"
-#include "transport/tcp_socket.h"
-#include "transport/tls_connection.h"
 
 namespace {
 

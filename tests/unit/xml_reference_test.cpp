@@ -14,7 +14,7 @@
 
 #include "support/reader_input.h"
 
-#include "codec/xml_text.h"
+#include "xml/xml_text.h"
 
 using reader_input::reception;
 

@@ -3,8 +3,8 @@
 
 #include <zuv_client_pro/soap_error.h>
 
-#include "codec/tag_view.h"
-#include "codec/xml_text.h"
+#include "xml/tag_view.h"
+#include "xml/xml_text.h"
 
 using namespace reader_input;
 

@@ -4,7 +4,7 @@
 #include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
 
-#include "codec/xml_token.h"
+#include "xml/xml_token.h"
 
 using namespace reader_input;
 

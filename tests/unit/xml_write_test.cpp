@@ -9,9 +9,9 @@
 
 #include <zuv_client_pro/soap_error.h>
 
-#include "codec/xml_write_fast.h"
 #include "support/failing_malloc.h"
 #include "support/writer_fixture.h"
+#include "xml/xml_write_fast.h"
 
 using namespace writer_fixture;
 

@@ -48,7 +48,7 @@ emitted_file proxy_source(const port &port)
     text += public_includes({name, "type_ids"}) + "\n";
     for (const std::string &prefix : headers_of(port))
         text += "#include \"law_" + prefix + ".h\"\n";
-    text += "#include \"contract_namespaces.h\"\n#include \"proxies/proxy_rules.h\"\n\n";
+    text += "#include \"contract_namespaces.h\"\n#include \"exchange/proxy_rules.h\"\n\n";
     text += "static constexpr char default_endpoint[] = " + string_literal(port.address) + ";\n\n";
     text += "PROXY_DEFINE_MEMBERS(" + name + ", " + port.name + "_namespaces)\n";
     for (const operation &operation : port.operations)

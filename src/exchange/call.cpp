@@ -1,0 +1,170 @@
+// call.cpp - the cycle of an operation: mark, count, connect, send, receive, release.
+//
+// Always: until the connection is asked for, a failure returns at once and leaves a kept connection alone,
+// but for a message that is too large; from there on every way out releases the connection.
+#include "exchange/call.h"
+
+#include <zuv_client_pro/soap_envelope.h>
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_http.h>
+#include <zuv_client_pro/soap_identity.h>
+#include <zuv_client_pro/soap_io.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_tcp.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include "attachments/attachment_list.h"
+#include "binding/envelope.h"
+
+namespace proxies {
+
+namespace {
+
+int write_message(soap *ctx, const operation &op, const void *request)
+{
+    if (soap_envelope_out_begin(ctx) || soap_header_put(ctx) || soap_body_out_begin(ctx) ||
+        binding::class_pointer_out(ctx, *op.request, op.request_element, -1, request, "") ||
+        soap_body_out_end(ctx) || soap_envelope_out_end(ctx))
+        return ctx->error;
+    return 0;
+}
+
+int count_message(soap *ctx, const operation &op, const void *request)
+{
+    if (soap_count_begin(ctx))
+        return ctx->error;
+    if ((ctx->mode & MODE_COUNTING) && write_message(ctx, op, request))
+        return ctx->error;
+    return soap_count_end(ctx);
+}
+
+int send_message(soap *ctx, const char *endpoint, const char *action, const operation &op,
+                 const void *request)
+{
+    if (soap_server_connect(ctx, endpoint, action) || write_message(ctx, op, request))
+        return ctx->error;
+    return soap_send_finish(ctx);
+}
+
+// A value of the header is wrong. That must not hide a fault, which the Body may hold; what else it may hold
+// is not looked at.
+int look_for_fault(soap *ctx, std::uint32_t envelope_level)
+{
+    const int error = ctx->error;
+    const bool at_fault = error != SOAP_MUST_UNDERSTAND && binding::drop_bad_value(ctx, envelope_level) &&
+                          soap_body_in_begin(ctx) == 0 && soap_element_head_read(ctx) == 0 &&
+                          soap_tag_compare(ctx, ctx->tag, "SOAP-ENV:Fault") == 0;
+    ctx->error = error;
+    return at_fault ? soap_fault_receive(ctx, 1) : error;
+}
+
+int begin_response(soap *ctx)
+{
+    if (soap_receive_begin(ctx) || soap_envelope_in_begin(ctx))
+        return ctx->error;
+    const std::uint32_t level = ctx->nesting_level;
+    if (soap_header_get(ctx))
+        return ctx->message_part == PART_HEADER ? look_for_fault(ctx, level) : ctx->error;
+    return soap_body_in_begin(ctx);
+}
+
+// Reads the response out of the Body. The error stays in the context when it isn't there.
+void read_response(soap *ctx, const operation &op, void **result)
+{
+    soap_object_register(ctx, "", result, op.response_id, sizeof *result, 0, nullptr, nullptr, nullptr);
+    bool wanted = true, seen = false;
+    for (;;) {
+        ctx->error = SOAP_TAG_MISMATCH;
+        if (wanted && binding::class_pointer_in(ctx, *op.response, op.response_element, result)) {
+            wanted = false;
+            seen = true;
+            continue;
+        }
+        if (ctx->error == SOAP_TAG_MISMATCH)
+            soap_result_check(ctx);
+        if (ctx->error == SOAP_TAG_MISMATCH || (seen && ctx->error == SOAP_NO_TAG))
+            break;
+        if (ctx->error)
+            return;
+        seen = true;
+    }
+    if (!seen)
+        return;
+    ctx->error = 0;
+    binding::independents_read(ctx);
+}
+
+int end_response(soap *ctx)
+{
+    if (soap_body_in_end(ctx) || soap_envelope_in_end(ctx))
+        return ctx->error;
+    return soap_receive_finish(ctx);
+}
+
+} // namespace
+
+int call(soap *ctx, const char *&proxy_endpoint, const char *default_endpoint, const operation &op,
+         const char *endpoint, const char *action, const void *request, void **result)
+{
+    if (endpoint)
+        proxy_endpoint = endpoint;
+    if (!proxy_endpoint)
+        proxy_endpoint = default_endpoint;
+    ctx->encoding_style = nullptr;
+    soap_reset_call(ctx);
+    if (soap_endpoint_check(ctx, proxy_endpoint))
+        return ctx->error;
+    soap_mark_header(ctx);
+    binding::class_pointer_mark(ctx, *op.request, request);
+    if (count_message(ctx, op, request)) {
+        attachments_forget(ctx); // they belong to this call, as they do when it fails later
+        return ctx->exceeded != nullptr ? soap_socket_release(ctx) : ctx->error;
+    }
+    if (send_message(ctx, proxy_endpoint, action ? action : "", op, request) || !result)
+        return soap_socket_release(ctx);
+    *result = nullptr;
+    if (begin_response(ctx))
+        return soap_socket_release(ctx);
+    read_response(ctx, op, result);
+    if (ctx->error)
+        return soap_fault_receive(ctx, 0);
+    end_response(ctx);
+    return soap_socket_release(ctx);
+}
+
+void *record_or(void *record, void *stand_in)
+{
+    return record ? record : stand_in;
+}
+
+int init(soap *ctx, int input_mode, int output_mode, const soap_namespace *namespaces)
+{
+    ctx->input_mode = static_cast<std::uint32_t>(input_mode);
+    ctx->output_mode = static_cast<std::uint32_t>(output_mode);
+    return soap_set_namespaces(ctx, namespaces);
+}
+
+void destroy(soap *ctx)
+{
+    soap_discard_objects(ctx, nullptr);
+    soap_discard_all(ctx);
+}
+
+void set_header(soap *ctx, protocol__Header *header)
+{
+    soap_header_record(ctx);
+    if (ctx->header)
+        ctx->header->header = header;
+}
+
+const char *fault_string(soap *ctx)
+{
+    return *soap_fault_string_field(ctx);
+}
+
+const char *fault_detail(soap *ctx)
+{
+    return *soap_fault_detail_field(ctx);
+}
+
+} // namespace proxies

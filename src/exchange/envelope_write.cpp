@@ -1,0 +1,139 @@
+// envelope_write.cpp - the frame of a message: Envelope and Body, and the head of the part that they stand
+// in.
+//
+// Elsewhere: Header and Fault (binding), further parts and records (attachments), HTTP heads.
+#include <cstdio>
+#include <cstring>
+
+#include <zuv_client_pro/soap_attachment.h>
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include "attachments/attachment_list.h"
+#include "xml/namespace.h"
+#include "xml/xml_write.h"
+
+namespace {
+
+constexpr std::size_t MIME_NAMES_MAX =
+    944; // bytes of boundary and start id together, which a part head may take
+constexpr std::uint8_t DIME_FIRST = 0x24; // message begins; the type is an absolute URI
+constexpr std::uint8_t DIME_ONLY = 0x26;  // message begins and ends
+constexpr std::size_t DIME_HEADER = 12;   // bytes
+
+bool has_modes(const soap *ctx, std::uint32_t set, std::uint32_t clear)
+{
+    return (ctx->mode & (set | clear)) == set;
+}
+
+std::size_t padding_of(std::size_t size)
+{
+    return (4 - (size & 3)) & 3;
+}
+
+std::string_view part_type(const soap *ctx)
+{
+    if (has_modes(ctx, MODE_DIME, MODE_MTOM))
+        return "application/dime";
+    const bool is_soap12 = ctx->soap_version == 2;
+    if (ctx->mode & MODE_MTOM)
+        return is_soap12 ? "application/xop+xml; charset=utf-8; type=\"application/soap+xml\""
+                         : "application/xop+xml; charset=utf-8; type=\"text/xml\"";
+    return is_soap12 ? "application/soap+xml; charset=utf-8" : "text/xml; charset=utf-8";
+}
+
+bool begins_mime_part(const soap *ctx)
+{
+    return (ctx->mode & MODE_MIME) && ctx->mime.boundary && ctx->mime.start &&
+           std::strlen(ctx->mime.boundary) + std::strlen(ctx->mime.start) < MIME_NAMES_MAX;
+}
+
+int put_mime_part_head(soap *ctx)
+{
+    if (!begins_mime_part(ctx))
+        return 0;
+    const std::string_view boundary(ctx->mime.boundary);
+    const std::string_view start(ctx->mime.start);
+    if (xml_put(ctx, "--") || xml_put(ctx, boundary) || xml_put(ctx, "\r\nContent-Type: ") ||
+        xml_put(ctx, part_type(ctx)) ||
+        xml_put(ctx, "\r\nContent-Transfer-Encoding: binary\r\nContent-ID: ") || xml_put(ctx, start))
+        return ctx->error;
+    return xml_put(ctx, "\r\n\r\n");
+}
+
+const char *envelope_uri(const soap *ctx)
+{
+    const soap_namespace *table = ctx->local_namespaces;
+    return table && table->prefix ? xml_row_uri(*table) : nullptr;
+}
+
+// Makes the header of the SOAP record from what the counting pass found, and counts it.
+int prepare_dime_record(soap *ctx)
+{
+    ctx->dime.size = static_cast<std::size_t>(ctx->message_count) - ctx->dime.size;
+    char id[SOAP_TEXT_SIZE];
+    std::snprintf(id, sizeof id, ctx->dime_id_format, 0);
+    const char *type = envelope_uri(ctx);
+    ctx->dime.id = soap_string_dup(ctx, id);
+    ctx->dime.type = soap_string_dup(ctx, type ? type : "");
+    if (!ctx->dime.id || !ctx->dime.type)
+        return ctx->error;
+    ctx->dime.options = nullptr;
+    ctx->dime.flags = ctx->dime.first ? DIME_FIRST : DIME_ONLY;
+    const std::size_t id_length = std::strlen(ctx->dime.id);
+    const std::size_t type_length = std::strlen(ctx->dime.type);
+    ctx->message_count +=
+        DIME_HEADER + id_length + padding_of(id_length) + type_length + padding_of(type_length);
+    return 0;
+}
+
+int finish_dime_record(soap *ctx)
+{
+    if (!has_modes(ctx, MODE_DIME, MODE_MTOM))
+        return 0;
+    if ((ctx->mode & MODE_COUNTING) && prepare_dime_record(ctx))
+        return ctx->error;
+    return soap_send_bytes(ctx, "\0\0\0", padding_of(ctx->dime.size));
+}
+
+} // namespace
+
+int soap_envelope_out_begin(soap *ctx)
+{
+    if (put_mime_part_head(ctx))
+        return ctx->error;
+    if (ctx->mode & MODE_COUNTING)
+        ctx->dime.size = static_cast<std::size_t>(ctx->message_count);
+    else if ((ctx->mode & MODE_DIME) && soap_dime_header_write(ctx))
+        return ctx->error;
+    ctx->message_part = PART_ENVELOPE;
+    return soap_element_out_begin(ctx, "SOAP-ENV:Envelope", 0, nullptr);
+}
+
+int soap_envelope_out_end(soap *ctx)
+{
+    if (soap_element_out_end(ctx, "SOAP-ENV:Envelope") || xml_put(ctx, "\r\n") || finish_dime_record(ctx))
+        return ctx->error;
+    ctx->message_part = PART_AFTER_ENVELOPE;
+    // All attachments are known: what is wrong with them is told before anything is sent, where that can be.
+    return (ctx->mode & MODE_COUNTING) ? attachment_ids_check_out(ctx) : 0;
+}
+
+int soap_body_out_begin(soap *ctx)
+{
+    ctx->message_part = PART_BODY;
+    if (ctx->soap_version == 1)
+        ctx->encoding_flag = 1;
+    if ((ctx->mode & MODE_WSU_ID) && soap_attr_set(ctx, "wsu:Id", "Body", 1))
+        return ctx->error;
+    return soap_element_out_begin(ctx, "SOAP-ENV:Body", 0, nullptr);
+}
+
+int soap_body_out_end(soap *ctx)
+{
+    if (soap_element_out_end(ctx, "SOAP-ENV:Body"))
+        return ctx->error;
+    ctx->message_part = PART_AFTER_BODY;
+    return 0;
+}

@@ -1,0 +1,257 @@
+// endpoint.cpp - from an endpoint's text to a connection with the head of a request on it.
+//
+// Elsewhere: the head's lines (http_write.cpp), sockets (on_open and its default tcp_connect), framing
+// (soap_io.h).
+//
+//   endpoint = [scheme "://"] authority [path]
+//   authority = ("[" IPv6 "]" / host) [":" port]
+#include <cstdlib>
+#include <cstring>
+
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_http.h>
+#include <zuv_client_pro/soap_io.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_tcp.h>
+#include <zuv_client_pro/soap_tls.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include "net/tcp_socket.h"
+#include "net/tcp_wait.h"
+#include "net/tls_connection.h"
+
+namespace {
+
+constexpr int HTTP_PORT = 80;
+constexpr int HTTPS_PORT = 443;
+
+// Copies `length` bytes of `source`, or what fits, into a field of SOAP_TEXT_SIZE bytes.
+void copy_field(char *field, const char *source, std::size_t length)
+{
+    const std::size_t copied = length < SOAP_TEXT_SIZE ? length : SOAP_TEXT_SIZE - 1;
+    std::memcpy(field, source, copied);
+    field[copied] = '\0';
+}
+
+// Copies the host into its field; returns what follows it.
+const char *take_host(soap *ctx, const char *authority)
+{
+    const bool bracketed = *authority == '[';
+    const char *start = bracketed ? authority + 1 : authority;
+    const std::size_t length = std::strcspn(start, bracketed ? "]" : "/:");
+    copy_field(ctx->host, start, length);
+    start += length;
+    return bracketed && *start == ']' ? start + 1 : start;
+}
+
+void split_url(soap *ctx, const char *url)
+{
+    if (soap_tag_match(url, "https:*") == 0)
+        ctx->port = HTTPS_PORT;
+    copy_field(ctx->endpoint, url, std::strlen(url));
+    const char *colon = std::strchr(url, ':');
+    const bool has_scheme = colon != nullptr && colon[1] == '/' && colon[2] == '/';
+    const char *rest = take_host(ctx, has_scheme ? colon + 3 : url);
+    if (*rest == ':')
+        ctx->port = static_cast<int>(std::strtol(rest + 1, nullptr, 10));
+    if (const char *path = std::strchr(rest, '/'))
+        copy_field(ctx->path, path, std::strlen(path));
+}
+
+// --- the route of a connection ---
+
+bool is_secure(const char *endpoint)
+{
+    return soap_tag_match(endpoint, "https:*") == 0;
+}
+
+bool is_datagrams(const char *endpoint)
+{
+    return std::strncmp(endpoint, "soap.udp:", 9) == 0;
+}
+
+std::uint16_t tls_rules(const soap *ctx)
+{
+    return static_cast<std::uint16_t>(ctx->tls_flags & ~TLS_CLIENT_SIDE); // set on the way
+}
+
+const char *http_proxy(const soap *ctx)
+{
+    return ctx->proxy_host == nullptr ? "" : ctx->proxy_host;
+}
+
+void note_route(soap *ctx, const char *endpoint)
+{
+    soap_route &route = ctx->route;
+    route.known = true;
+    route.secure = is_secure(endpoint);
+    route.datagrams = is_datagrams(endpoint);
+    route.rules = tls_rules(ctx);
+    route.port = ctx->port;
+    route.proxy_port = ctx->proxy_port;
+    copy_field(route.host, ctx->host, std::strlen(ctx->host));
+    copy_field(route.proxy_host, http_proxy(ctx), std::strlen(http_proxy(ctx)));
+}
+
+// An https call never rides on a plain socket, whatever the mode flags say, nor a plain one on TLS.
+bool leads_to(const soap *ctx, const char *endpoint)
+{
+    const soap_route &route = ctx->route;
+    return route.known && route.port == ctx->port && std::strcmp(route.host, ctx->host) == 0 &&
+           route.datagrams == is_datagrams(endpoint) && route.secure == is_secure(endpoint) &&
+           (route.secure ? tls_established(ctx) : !tls_active(ctx));
+}
+
+bool has_same_proxy(const soap *ctx)
+{
+    const soap_route &route = ctx->route;
+    return std::strcmp(route.proxy_host, http_proxy(ctx)) == 0 &&
+           (route.proxy_host[0] == '\0' || route.proxy_port == ctx->proxy_port);
+}
+
+bool has_same_rules(const soap *ctx)
+{
+    return !ctx->route.secure || (ctx->route.rules == tls_rules(ctx) && tls_has_own_rules(ctx));
+}
+
+bool connection_is_reusable(soap *ctx, const char *endpoint)
+{
+    const bool any_route = (ctx->legacy & LEGACY_ANY_ROUTE) != 0;
+    return ctx->keep_alive != 0 && soap_socket_open(ctx) && !ctx->response_unfinished &&
+           leads_to(ctx, endpoint) && (any_route || (has_same_proxy(ctx) && has_same_rules(ctx))) &&
+           ctx->on_poll != nullptr && ctx->on_poll(ctx) == 0;
+}
+
+int end_connection(soap *ctx)
+{
+    ctx->error = SOAP_OK;
+    ctx->keep_alive = 0;
+    return tcp_release(ctx);
+}
+
+// Keeps the connection of an earlier exchange if it serves this endpoint too; otherwise closes it and opens a
+// new one.
+int provide_connection(soap *ctx, const char *endpoint)
+{
+    if (connection_is_reusable(ctx, endpoint))
+        return SOAP_OK;
+    if (is_datagrams(endpoint))
+        ctx->output_mode |= MODE_UDP;
+    else
+        ctx->output_mode &= ~MODE_UDP;
+    if (end_connection(ctx) != SOAP_OK)
+        return ctx->error;
+    ctx->socket = ctx->on_open(ctx, endpoint, ctx->host, ctx->port);
+    ctx->socket_abandoned = false;
+    ctx->opened_by = tcp_process();
+    ctx->socket_accepted = false;
+    ctx->response_unfinished = false;
+    if (ctx->error != SOAP_OK)
+        return ctx->error;
+    note_route(ctx, endpoint);
+    ctx->keep_alive = (ctx->output_mode & MODE_KEEP_ALIVE) != 0 ? 1 : 0;
+    return SOAP_OK;
+}
+
+// What is meant for nobody in particular doesn't go to whoever was called before.
+int connect_by_endpoint(soap *ctx, const char *endpoint)
+{
+    if (ctx->on_open != nullptr && endpoint != nullptr && ctx->host[0] != '\0')
+        return provide_connection(ctx, endpoint);
+    return ctx->route.known && ctx->on_connect == nullptr ? end_connection(ctx) : SOAP_OK;
+}
+
+// The head goes out as it is, neither chunked nor compressed; a stored message gets its head when its size is
+// known.
+int write_head(soap *ctx, const char *endpoint, const char *action, std::uint64_t count)
+{
+    const std::uint32_t mode = ctx->mode;
+    const std::uint32_t framing = mode & MODE_IO_MASK;
+    if (framing == MODE_STORE || (mode & MODE_BARE_XML) != 0 || endpoint == nullptr ||
+        ctx->on_post == nullptr)
+        return SOAP_OK;
+    ctx->mode &= ~(MODE_IO_MASK | MODE_DEFLATE);
+    if (framing != MODE_DIRECT)
+        ctx->mode |= MODE_BUFFERED;
+    ctx->error = ctx->on_post(ctx, endpoint, ctx->host, ctx->port, ctx->path, action, count);
+    if (ctx->error != SOAP_OK)
+        return ctx->error;
+    if (framing == MODE_CHUNKED && soap_send_flush(ctx) != SOAP_OK)
+        return ctx->error;
+    ctx->mode = mode;
+    return SOAP_OK;
+}
+
+} // namespace
+
+void soap_parse_endpoint(soap *ctx, const char *url)
+{
+    char own_copy[SOAP_TEXT_SIZE];
+    if (url == ctx->endpoint) { // the target of a redirect, about to be overwritten
+        copy_field(own_copy, url, std::strlen(url));
+        url = own_copy;
+    }
+    ctx->endpoint[0] = '\0';
+    ctx->host[0] = '\0';
+    copy_field(ctx->path, "/", 1);
+    ctx->port = HTTP_PORT;
+    if (url != nullptr && *url != '\0')
+        split_url(ctx, url);
+}
+
+// soap_connect_one within the time of a call that has begun.
+static int connect_one(soap *ctx, int status, const char *endpoint, const char *action)
+{
+    ctx->error = SOAP_OK;
+    ctx->fault = nullptr; // what an earlier attempt left must not explain a later failure
+    ctx->status = status;
+    soap_parse_endpoint(ctx, endpoint);
+    if (ctx->on_connect != nullptr) {
+        ctx->error = ctx->on_connect(ctx, endpoint, ctx->host, ctx->port);
+        if (ctx->error != SOAP_OK)
+            return ctx->error;
+    } else {
+        ctx->action = soap_string_dup(ctx, action);
+        if (action != nullptr && ctx->action == nullptr)
+            return ctx->error;
+    }
+    if (connect_by_endpoint(ctx, endpoint) != SOAP_OK)
+        return ctx->error;
+    const std::uint64_t count = soap_message_length(ctx);
+    if (soap_send_begin(ctx) != SOAP_OK)
+        return ctx->error;
+    if (status == STATUS_GET)
+        ctx->mode = (ctx->mode & ~MODE_IO_MASK) | MODE_BUFFERED;
+    if (write_head(ctx, endpoint, action, count) != SOAP_OK)
+        return ctx->error;
+    return status == STATUS_GET ? soap_send_finish(ctx) : SOAP_OK;
+}
+
+int soap_connect_one(soap *ctx, int status, const char *endpoint, const char *action)
+{
+    tcp_call_begin(ctx);
+    return connect_one(ctx, status, endpoint, action);
+}
+
+int soap_server_connect(soap *ctx, const char *endpoints, const char *action)
+{
+    tcp_call_begin(ctx);
+    if (endpoints == nullptr || std::strchr(endpoints, ' ') == nullptr)
+        return connect_one(ctx, STATUS_POST, endpoints, action), ctx->error;
+    const std::size_t bytes = std::strlen(endpoints) + 1;
+    char *const list = static_cast<char *>(SOAP_MALLOC(ctx, bytes));
+    if (list == nullptr)
+        return ctx->error = SOAP_OUT_OF_MEMORY;
+    std::memcpy(list, endpoints, bytes);
+    char *item = list + std::strspn(list, " ");
+    for (;;) {
+        char *end = item + std::strcspn(item, " ");
+        char *next = end + std::strspn(end, " ");
+        *end = '\0';
+        if (connect_one(ctx, STATUS_POST, item, action) != SOAP_TCP_ERROR || *next == '\0')
+            break;
+        item = next;
+    }
+    SOAP_FREE(ctx, list);
+    return ctx->error;
+}

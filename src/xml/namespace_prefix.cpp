@@ -1,0 +1,313 @@
+// namespace_prefix.cpp - the prefixes in scope, for the writer and the reader alike.
+//
+// Here: pushing, finding and popping, and the binding of declared URIs to rows of the namespace table.
+// Elsewhere: the table (namespace_table.cpp), which element declares what (xml_write.cpp, xml_read.cpp).
+//
+// Always: soap::prefix_list and the hash chains hold the same records in the same order, so that the head of
+// the list is the head of its chain. Records own their texts and are recycled.
+#include <algorithm>
+#include <cstring>
+#include <limits>
+
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_memory.h>
+
+#include "xml/namespace.h"
+#include "xml/namespace_scope.h"
+#include "xml/tag_view.h"
+#include "xml/utf8.h"
+
+namespace {
+
+constexpr std::int16_t DECLARED = 0;   // in scope, not written yet in canonical output
+constexpr std::int16_t TO_DECLARE = 1; // the element being opened declares it
+constexpr std::int16_t WRITTEN = 2;
+constexpr std::int16_t UNBOUND = -1;
+constexpr std::size_t USUAL_TEXTS = 128; // bytes of text in a new record
+
+std::uint16_t chain_of(const soap_namespace_scope *scope, std::string_view prefix)
+{
+    std::uint32_t hash = scope->hash_factor;
+    for (const char c : prefix)
+        hash = (hash ^ static_cast<unsigned char>(c)) * scope->hash_factor;
+    return static_cast<std::uint16_t>((hash >> 16) % PREFIX_CHAINS);
+}
+
+std::string_view text_of(const soap_prefix *record)
+{
+    return {record->prefix, record->prefix_length};
+}
+
+bool waits(const soap_prefix *record)
+{
+    return record->index == TO_DECLARE && record->uri;
+}
+
+soap_prefix *take_spare(soap_namespace_scope *scope, std::size_t texts)
+{
+    soap_prefix *record = scope->spare;
+    if (!record || record->capacity < texts)
+        return nullptr;
+    scope->spare = record->next;
+    --scope->spare_count;
+    return record;
+}
+
+soap_prefix *make_record(soap *ctx, std::size_t texts)
+{
+    texts = std::max(texts, USUAL_TEXTS);
+    if (texts > std::numeric_limits<std::uint32_t>::max()) {
+        ctx->error = SOAP_LENGTH;
+        return nullptr;
+    }
+    auto *record = static_cast<soap_prefix *>(SOAP_MALLOC(ctx, offsetof(soap_prefix, prefix) + texts));
+    if (!record) {
+        ctx->error = SOAP_OUT_OF_MEMORY;
+        return nullptr;
+    }
+    record->capacity = static_cast<std::uint32_t>(texts);
+    return record;
+}
+
+void drop_record(soap *ctx, soap_namespace_scope *scope, soap_prefix *record)
+{
+    if (scope->spare_count >= SPARE_PREFIXES_MAX || record->capacity > SPARE_PREFIX_SIZE) {
+        SOAP_FREE(ctx, record);
+        return;
+    }
+    record->next = scope->spare;
+    scope->spare = record;
+    ++scope->spare_count;
+}
+
+// Puts a prefix on the stack at the current depth. `uri` may be null.
+soap_prefix *push(soap *ctx, std::string_view prefix, const char *uri, std::int16_t index)
+{
+    soap_namespace_scope *scope = namespace_scope_of(ctx);
+    if (!scope)
+        return nullptr;
+    if (scope->in_scope >= SOAP_PREFIXES_MAX || prefix.size() > std::numeric_limits<std::uint16_t>::max()) {
+        ctx->error = SOAP_LENGTH;
+        return nullptr;
+    }
+    const std::size_t uri_size = uri ? std::strlen(uri) + 1 : 0;
+    const std::size_t texts = prefix.size() + 1 + uri_size;
+    soap_prefix *record = take_spare(scope, texts);
+    if (!record && !(record = make_record(ctx, texts)))
+        return nullptr;
+    char *place = record->prefix;
+    place = std::copy(prefix.begin(), prefix.end(), place);
+    *place++ = '\0';
+    record->uri = uri ? static_cast<const char *>(std::memcpy(place, uri, uri_size)) : nullptr;
+    record->prefix_length = static_cast<std::uint16_t>(prefix.size());
+    record->level = ctx->nesting_level;
+    record->index = index;
+    record->hash = chain_of(scope, prefix);
+    record->chain = scope->chains[record->hash];
+    scope->chains[record->hash] = record;
+    record->next = ctx->prefix_list;
+    ctx->prefix_list = record;
+    ++scope->in_scope;
+    xml_prefix_rows_forget(ctx);
+    if (uri && index == TO_DECLARE)
+        ++scope->waiting;
+    return record;
+}
+
+void pop_head(soap *ctx)
+{
+    soap_namespace_scope *scope = ctx->namespace_scope;
+    soap_prefix *record = ctx->prefix_list;
+    ctx->prefix_list = record->next;
+    scope->chains[record->hash] = record->chain;
+    --scope->in_scope;
+    xml_prefix_rows_forget(ctx);
+    if (scope->waiting > 0 && waits(record))
+        --scope->waiting;
+    drop_record(ctx, scope, record);
+}
+
+bool is_canonical(const soap *ctx)
+{
+    return (ctx->mode & MODE_CANONICAL) != 0;
+}
+
+bool same_uri(const char *one, const char *other)
+{
+    return one && other && std::strcmp(one, other) == 0;
+}
+
+bool is_row_uri(const soap_namespace &row, const namespace_lengths *lengths, std::string_view uri)
+{
+    return row.uri && (!lengths || lengths->uri == uri.size()) && uri == row.uri;
+}
+
+// The patterns of a table have long heads in common: the last letter of the head tells most apart.
+bool fits_pattern(const soap_namespace &row, const namespace_lengths *lengths, std::string_view uri)
+{
+    if (!row.pattern)
+        return false;
+    if (lengths && lengths->pattern_head > 0) {
+        constexpr char CASE = 'a' - 'A';
+        const std::size_t last = lengths->pattern_head - 1;
+        if (last >= uri.size() || (uri[last] | CASE) != (row.pattern[last] | CASE))
+            return false;
+    }
+    return soap_tag_match(uri.data(), row.pattern) == 0;
+}
+
+// Row of the working copy that a declared URI belongs to, or UNBOUND. False if memory runs out.
+bool bind_uri(soap *ctx, const char *uri, std::int16_t *index)
+{
+    *index = UNBOUND;
+    if (!ctx->local_namespaces)
+        return true;
+    const std::string_view text(uri);
+    for (std::size_t i = 0; ctx->local_namespaces[i].prefix; ++i) {
+        soap_namespace &row = ctx->local_namespaces[i];
+        const namespace_lengths *lengths = namespace_row_lengths(ctx, i);
+        if (is_row_uri(row, lengths, text)) {
+            xml_received_drop(ctx, row);
+        } else if (row.received) {
+            if (text != row.received)
+                continue;
+        } else {
+            if (!fits_pattern(row, lengths, text))
+                continue;
+            if (xml_received_set(ctx, row, uri))
+                return false;
+        }
+        *index = static_cast<std::int16_t>(i);
+        return true;
+    }
+    return true;
+}
+
+soap_prefix *find(const soap *ctx, std::string_view prefix)
+{
+    soap_prefix *record = ctx->namespace_scope->chains[chain_of(ctx->namespace_scope, prefix)];
+    while (record && text_of(record) != prefix)
+        record = record->chain;
+    return record;
+}
+
+// The record of a prefix out of a text of Latin-1; declared ones are UTF-8.
+soap_prefix *find_latin1(const soap *ctx, std::string_view prefix)
+{
+    char text[SOAP_TEXT_SIZE];
+    std::size_t length = 0;
+    bool is_ascii = true;
+    for (const char c : prefix) {
+        char bytes[6];
+        const std::size_t size = utf8_encode(static_cast<unsigned char>(c), bytes);
+        if (size > sizeof text - length)
+            return nullptr;
+        std::memcpy(text + length, bytes, size);
+        length += size;
+        is_ascii = is_ascii && size == 1;
+    }
+    return is_ascii ? nullptr : find(ctx, {text, length});
+}
+
+} // namespace
+
+bool xml_list_names(const char *list, std::string_view prefix)
+{
+    std::string_view rest(list);
+    while (!rest.empty()) {
+        const std::size_t end = std::min(rest.find_first_of(" \t\r\n"), rest.size());
+        std::string_view word = rest.substr(0, end);
+        if (word.ends_with(':'))
+            word.remove_suffix(1);
+        if (end > 0 && word == prefix)
+            return true;
+        rest.remove_prefix(std::min(end + 1, rest.size()));
+    }
+    return false;
+}
+
+soap_prefix *xml_prefix_find(const soap *ctx, std::string_view prefix)
+{
+    if (!ctx->prefix_list)
+        return nullptr;
+    soap_prefix *const record = find(ctx, prefix);
+    return record || (ctx->mode & MODE_UTF_STRINGS) ? record : find_latin1(ctx, prefix);
+}
+
+std::size_t xml_prefixes_waiting(const soap *ctx)
+{
+    return ctx->namespace_scope ? ctx->namespace_scope->waiting : 0;
+}
+
+void xml_prefix_declared(soap *ctx, soap_prefix *record)
+{
+    record->index = WRITTEN;
+    record->level = ctx->nesting_level;
+    --ctx->namespace_scope->waiting;
+}
+
+int soap_prefix_push_out(soap *ctx, const char *prefix, const char *uri, int state)
+{
+    if (is_canonical(ctx) && ctx->canonical_exclude && xml_list_names(ctx->canonical_exclude, prefix))
+        return 0;
+    if (state == DECLARED) {
+        const soap_prefix *known = xml_prefix_find(ctx, prefix);
+        if (known && (!known->uri || same_uri(known->uri, uri))) {
+            const bool declared_here = known->uri && known->level >= ctx->nesting_level;
+            if (declared_here || known->index != TO_DECLARE)
+                return 0;
+        }
+        // Known without a URI: the element has used it and now says what it stands for. Known with another
+        // URI: the element gives the prefix a new meaning, which must be written here to hold.
+        if (known)
+            state = TO_DECLARE;
+    }
+    return push(ctx, prefix, uri, static_cast<std::int16_t>(state)) ? 0 : ctx->error;
+}
+
+int soap_prefix_use(soap *ctx, const char *name)
+{
+    const std::string_view prefix = xml_prefix_of(name);
+    const soap_prefix *known = xml_prefix_find(ctx, prefix);
+    if (known ? known->index != DECLARED : prefix.starts_with("xml"))
+        return 0;
+    if (is_canonical(ctx) && ctx->canonical_exclude && !prefix.empty() &&
+        xml_list_names(ctx->canonical_exclude, prefix))
+        return 0;
+    return push(ctx, prefix, known ? known->uri : nullptr, TO_DECLARE) ? 0 : ctx->error;
+}
+
+soap_prefix *soap_prefix_push_in(soap *ctx, const char *prefix, const char *uri)
+{
+    std::int16_t index = UNBOUND;
+    if (!bind_uri(ctx, uri, &index))
+        return nullptr;
+    return push(ctx, prefix, index == UNBOUND ? uri : nullptr, index);
+}
+
+void soap_prefix_pop(soap *ctx)
+{
+    while (ctx->prefix_list && ctx->prefix_list->level >= ctx->nesting_level)
+        pop_head(ctx);
+}
+
+void soap_prefix_stack_reset(soap *ctx)
+{
+    while (ctx->prefix_list)
+        pop_head(ctx);
+}
+
+const char *soap_namespace_of(soap *ctx, const char *name)
+{
+    const std::string_view prefix = xml_prefix_of(name);
+    const soap_prefix *record = xml_prefix_find(ctx, prefix);
+    if (record && record->uri)
+        return record->uri;
+    if (record && record->index >= 0 && ctx->local_namespaces)
+        return xml_row_uri(ctx->local_namespaces[record->index]);
+    if (prefix == "xml")
+        return XML_NAMESPACE_URI;
+    if (!prefix.empty())
+        ctx->error = SOAP_NAMESPACE_ERROR;
+    return nullptr;
+}

@@ -1,0 +1,269 @@
+// namespace_table.cpp - the context's working copy of the namespace table and the URIs received for its rows.
+//
+// Here: making, installing and dropping the copy, received URIs, the declarations of a root element.
+// Elsewhere: prefixes in scope (namespace_prefix.cpp), what binds them (the same), the table's rows (the
+// host).
+//
+// Always: a copy's prefix, URI and pattern texts are those of the host's table; its received URIs are its
+// own.
+#include <algorithm>
+#include <cstring>
+#include <utility>
+
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_memory.h>
+
+#include "xml/attributes.h"
+#include "xml/namespace.h"
+#include "xml/namespace_scope.h"
+
+namespace {
+
+constexpr const char *SOAP_11_ENVELOPE = "http://schemas.xmlsoap.org/soap/envelope/";
+
+std::size_t count_rows(const soap_namespace *table)
+{
+    std::size_t count = 0;
+    while (table[count].prefix)
+        ++count;
+    return count;
+}
+
+bool same_texts(const soap_namespace &one, const soap_namespace &other)
+{
+    return one.prefix == other.prefix && one.uri == other.uri && one.pattern == other.pattern;
+}
+
+// True if the table holds just the rows measured last time, none with a received URI. The end of a shorter
+// table differs from the row in its place, so nothing behind it is looked at.
+bool is_measured(const soap_namespace_scope *scope, const soap_namespace *table)
+{
+    const auto same_row = [](const soap_namespace &one, const soap_namespace &other) {
+        return same_texts(one, other) && one.received == other.received;
+    };
+    return scope && scope->rows && std::equal(scope->rows, scope->rows + scope->row_count, table, same_row) &&
+           table[scope->row_count].prefix == nullptr;
+}
+
+void forget_rows(soap *ctx, soap_namespace_scope *scope)
+{
+    SOAP_FREE(ctx, scope->spare_table);
+    scope->spare_table = nullptr;
+    SOAP_FREE(ctx, scope->declarations);
+    SOAP_FREE(ctx, const_cast<soap_namespace *>(scope->rows));
+    scope->rows = nullptr;
+    scope->lengths = nullptr;
+    scope->row_count = 0;
+    scope->declarations = nullptr;
+}
+
+// Measures the table's texts unless they are the ones measured last time.
+int describe_rows(soap *ctx, const soap_namespace *table, std::size_t count)
+{
+    soap_namespace_scope *scope = namespace_scope_of(ctx);
+    if (!scope)
+        return ctx->error;
+    if (scope->rows && scope->row_count == count && std::equal(table, table + count, scope->rows, same_texts))
+        return 0;
+    forget_rows(ctx, scope);
+    void *place = SOAP_MALLOC(ctx, (count + 1) * (sizeof(soap_namespace) + sizeof(namespace_lengths)));
+    if (!place)
+        return ctx->error = SOAP_OUT_OF_MEMORY;
+    auto *rows = static_cast<soap_namespace *>(place);
+    auto *lengths = reinterpret_cast<namespace_lengths *>(rows + count + 1);
+    for (std::size_t i = 0; i < count; ++i) {
+        rows[i] = table[i];
+        rows[i].received = nullptr;
+        lengths[i] = {std::strlen(table[i].prefix), table[i].uri ? std::strlen(table[i].uri) : 0,
+                      table[i].pattern ? std::strcspn(table[i].pattern, "*-") : 0};
+    }
+    scope->rows = rows;
+    scope->lengths = lengths;
+    scope->row_count = count;
+    return 0;
+}
+
+bool is_declared(const soap_namespace &row)
+{
+    return row.prefix[0] != '\0' && row.uri;
+}
+
+char *append(char *target, const char *text, std::size_t length)
+{
+    return std::copy_n(text, length, target);
+}
+
+// Composes the declarations of all rows; false if memory runs out.
+bool compose_declarations(soap *ctx, soap_namespace_scope *scope)
+{
+    constexpr std::size_t FRAME = sizeof(" xmlns:=\"\"") - 1;
+    std::size_t size = scope->row_count * sizeof(std::size_t);
+    for (std::size_t i = 0; i < scope->row_count; ++i) {
+        if (is_declared(scope->rows[i]))
+            size += FRAME + std::strlen(scope->rows[i].prefix) + scope->lengths[i].uri;
+    }
+    auto *ends = static_cast<std::size_t *>(SOAP_MALLOC(ctx, size + 1));
+    if (!ends)
+        return false;
+    scope->declaration_ends = ends;
+    scope->declarations = reinterpret_cast<char *>(ends);
+    scope->declarations_plain = true;
+    char *const begin = reinterpret_cast<char *>(ends + scope->row_count);
+    char *end = begin;
+    for (std::size_t i = 0; i < scope->row_count; ++i) {
+        const soap_namespace &row = scope->rows[i];
+        if (is_declared(row)) {
+            end = append(end, " xmlns:", 7);
+            end = append(end, row.prefix, std::strlen(row.prefix));
+            end = append(end, "=\"", 2);
+            end = append(end, row.uri, scope->lengths[i].uri);
+            end = append(end, "\"", 1);
+            const auto is_plain = [](char c) { return c > ' ' && !std::strchr("\"&<", c); };
+            if (!std::all_of(row.uri, row.uri + scope->lengths[i].uri, is_plain))
+                scope->declarations_plain = false;
+        }
+        ends[i] = static_cast<std::size_t>(end - begin);
+    }
+    return true;
+}
+
+} // namespace
+
+soap_namespace_scope *namespace_scope_of(soap *ctx)
+{
+    if (ctx->namespace_scope)
+        return ctx->namespace_scope;
+    void *place = SOAP_MALLOC(ctx, sizeof(soap_namespace_scope));
+    if (!place) {
+        ctx->error = SOAP_OUT_OF_MEMORY;
+        return nullptr;
+    }
+    std::memset(place, 0, sizeof(soap_namespace_scope));
+    ctx->namespace_scope = static_cast<soap_namespace_scope *>(place);
+    // Addresses differ from process to process, which is enough to keep prefixes from being chosen to
+    // collide.
+    const auto address = reinterpret_cast<std::uintptr_t>(place);
+    ctx->namespace_scope->hash_factor = static_cast<std::uint32_t>((address >> 4) * 2654435761U) | 1U;
+    return ctx->namespace_scope;
+}
+
+void soap_namespace_scope_free(soap *ctx)
+{
+    soap_namespace_scope *scope = ctx->namespace_scope;
+    if (!scope)
+        return;
+    soap_prefix_stack_reset(ctx);
+    while (scope->spare) {
+        soap_prefix *next = scope->spare->next;
+        SOAP_FREE(ctx, scope->spare);
+        scope->spare = next;
+    }
+    xml_attributes_drop(ctx);
+    while (scope->spare_attributes) {
+        soap_attribute *next = scope->spare_attributes->next;
+        xml_attribute_free(ctx, scope->spare_attributes);
+        scope->spare_attributes = next;
+    }
+    forget_rows(ctx, scope);
+    SOAP_FREE(ctx, scope);
+    ctx->namespace_scope = nullptr;
+}
+
+int soap_namespace_table_copy(soap *ctx)
+{
+    if (ctx->local_namespaces || !ctx->namespaces)
+        return 0;
+    const bool measured = is_measured(ctx->namespace_scope, ctx->namespaces);
+    const std::size_t count = measured ? ctx->namespace_scope->row_count : count_rows(ctx->namespaces);
+    if (!measured && describe_rows(ctx, ctx->namespaces, count))
+        return ctx->error;
+    soap_namespace *rows = std::exchange(ctx->namespace_scope->spare_table, nullptr);
+    if (!rows)
+        rows = static_cast<soap_namespace *>(SOAP_MALLOC(ctx, (count + 1) * sizeof(soap_namespace)));
+    if (!rows)
+        return ctx->error = SOAP_OUT_OF_MEMORY;
+    std::copy_n(ctx->namespaces, count + 1, rows);
+    ctx->local_namespaces = rows;
+    std::for_each(rows, rows + count + 1, [](soap_namespace &row) { row.received = nullptr; });
+    for (std::size_t i = 0; i < count; ++i) {
+        const char *received = ctx->namespaces[i].received;
+        if (received && xml_received_set(ctx, rows[i], received)) {
+            soap_namespace_table_drop(ctx);
+            return ctx->error;
+        }
+    }
+    if (count > 0)
+        ctx->soap_version = rows[0].uri && std::strcmp(rows[0].uri, SOAP_11_ENVELOPE) == 0 ? 1 : 2;
+    return 0;
+}
+
+void soap_namespace_table_drop(soap *ctx)
+{
+    if (!ctx->local_namespaces)
+        return;
+    soap_namespace *row = ctx->local_namespaces;
+    for (; row->prefix; ++row) {
+        // The style was taken from the table in place of "" and may be another one in the next message.
+        if (ctx->encoding_style && ctx->encoding_style == row->uri)
+            ctx->encoding_style = "";
+        xml_received_drop(ctx, *row);
+    }
+    soap_namespace_scope *scope = ctx->namespace_scope;
+    if (scope && !scope->spare_table &&
+        scope->row_count == static_cast<std::size_t>(row - ctx->local_namespaces))
+        scope->spare_table = ctx->local_namespaces;
+    else
+        SOAP_FREE(ctx, ctx->local_namespaces);
+    ctx->local_namespaces = nullptr;
+}
+
+int soap_set_namespaces(soap *ctx, const soap_namespace *table)
+{
+    // A working copy can't serve as the table that it is copied from.
+    if (!table || table != ctx->local_namespaces) {
+        ctx->namespaces = table;
+        soap_namespace_table_drop(ctx);
+    }
+    return soap_namespace_table_copy(ctx);
+}
+
+int xml_received_set(soap *ctx, soap_namespace &row, const char *uri)
+{
+    if (row.received && std::strcmp(row.received, uri) == 0)
+        return 0;
+    const std::size_t size = std::strlen(uri) + 1;
+    auto *copy = static_cast<char *>(SOAP_MALLOC(ctx, size));
+    if (!copy)
+        return ctx->error = SOAP_OUT_OF_MEMORY;
+    std::memcpy(copy, uri, size);
+    xml_received_drop(ctx, row);
+    row.received = copy;
+    return 0;
+}
+
+void xml_received_drop(soap *ctx, soap_namespace &row)
+{
+    if (!row.received)
+        return;
+    if (ctx->encoding_style == row.received)
+        ctx->encoding_style = "";
+    SOAP_FREE(ctx, row.received);
+    row.received = nullptr;
+}
+
+const char *xml_root_declarations(soap *ctx, std::size_t rows_max, std::size_t *length)
+{
+    soap_namespace_scope *scope = ctx->namespace_scope;
+    const soap_namespace *table = ctx->local_namespaces;
+    if (!scope || !table)
+        return nullptr;
+    if (!is_measured(scope, table))
+        return nullptr;
+    if (!scope->declarations && !compose_declarations(ctx, scope))
+        return nullptr;
+    if (!scope->declarations_plain)
+        return nullptr;
+    const std::size_t rows = std::min(rows_max, scope->row_count);
+    *length = rows > 0 ? scope->declaration_ends[rows - 1] : 0;
+    return reinterpret_cast<const char *>(scope->declaration_ends + scope->row_count);
+}

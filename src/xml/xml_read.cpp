@@ -1,0 +1,466 @@
+// xml_read.cpp - elements on input: the held start tag, consuming it, its end, and dropping what nobody
+// knows.
+//
+// Here: the life of a start tag between questions. Elsewhere: attributes (xml_read_attributes.cpp), names and
+// namespaces (tag_compare.cpp), tokens (xml_token.cpp), text (xml_text.cpp).
+//
+// Always: a start tag is read once and held until it is consumed, skipped or taken as text; nesting_level
+// counts consumed elements that have content.
+#include "xml/xml_read.h"
+
+#include <cstring>
+#include <string_view>
+
+#include "xml/attributes.h"
+#include "xml/namespace.h"
+
+namespace {
+
+int no_tag(soap *ctx, int error)
+{
+    ctx->tag[0] = '\0';
+    ctx->tag_length = 0;
+    ctx->has_body = 1; // whatever comes is content of the element around it
+    return ctx->error = error;
+}
+
+// A code left by a search that found nothing says nothing about the input; any other tells why it ended.
+int end_of_input(soap *ctx)
+{
+    const int error = ctx->exceeded != nullptr ? static_cast<int>(SOAP_LENGTH) : ctx->error;
+    return error == 0 || error == SOAP_TAG_MISMATCH || error == SOAP_NO_TAG ? SOAP_EOF : error;
+}
+
+void forget_tag(soap *ctx)
+{
+    ctx->peeked = 1;
+    ctx->tag_resolved = false;
+    ctx->element_id[0] = '\0';
+    ctx->element_href[0] = '\0';
+    ctx->element_type[0] = '\0';
+    ctx->array_type[0] = '\0';
+    ctx->array_size[0] = '\0';
+    ctx->array_offset[0] = '\0';
+    ctx->other_flag = 0;
+    ctx->root_flag = -1;
+    ctx->position_count = 0;
+    ctx->null_flag = 0;
+    ctx->must_understand = 0;
+}
+
+// A byte-order mark may stand ahead of a tag. 0 when the next token can be read, 47 on UTF-16.
+int pass_byte_order_mark(soap *ctx)
+{
+    if (ctx->look_ahead < 0 || ctx->in_cdata != CDATA_OUTSIDE)
+        return 0;
+    const std::int32_t first = soap_recv_byte(ctx);
+    if (first < 0) { // the end of input
+        ctx->look_ahead = XML_EOF;
+        return 0;
+    }
+    if (first != 0xEF && first != 0xFE && first != 0xFF) {
+        ctx->look_ahead = first;
+        return 0;
+    }
+    const std::int32_t second = soap_recv_byte(ctx);
+    if ((first == 0xFE && second == 0xFF) || (first == 0xFF && second == 0xFE))
+        return SOAP_UTF_ERROR;
+    if (first == 0xEF && second == 0xBB) {
+        const std::int32_t third = soap_recv_byte(ctx);
+        if (third == 0xBF) {
+            ctx->mode &= ~ENCODING_MODES;
+            return 0;
+        }
+        // U+FEC0 and the following: pushed back as the one character that the three bytes are
+        if (third == XML_EOF)
+            ctx->look_ahead = XML_EOF;
+        else
+            ctx->look_ahead = static_cast<std::int32_t>(
+                (0xFEC0u | (static_cast<std::uint32_t>(third) & 0x3F)) | XML_REFERENCE);
+        return 0;
+    }
+    if (second != XML_EOF)
+        ctx->buffer_index--;
+    ctx->look_ahead = first;
+    return 0;
+}
+
+// Token by token: refills, marks, comments, pushed-back tokens.
+int find_start_tag_slow(soap *ctx)
+{
+    const int error = pass_byte_order_mark(ctx);
+    if (error != 0)
+        return no_tag(ctx, error);
+    std::int32_t token;
+    do
+        token = soap_char_next_utf8(ctx);
+    while (is_blank(token));
+    if (token == XML_START)
+        return 0;
+    if (token == XML_EOF)
+        return no_tag(ctx, end_of_input(ctx));
+    token_push_back(ctx, token);
+    return no_tag(ctx, SOAP_NO_TAG);
+}
+
+// Consumes up to and including the "<" of the next start tag; 0, or an error with no tag held.
+int find_start_tag(soap *ctx)
+{
+    if (ctx->look_ahead == 0 && ctx->in_cdata == CDATA_OUTSIDE) {
+        const char *p = input_here(ctx);
+        const char *end = input_end(ctx);
+        while (p != end && is_blank(static_cast<unsigned char>(*p)))
+            ++p;
+        if (end - p >= 2 && p[0] == '<') {
+            if (static_cast<unsigned char>(p[1]) > '?') { // none of the marks that lead to something else
+                input_consume(ctx, p + 1);
+                return 0;
+            }
+            if (p[1] == '/') {
+                input_consume(ctx, p + 2);
+                ctx->look_ahead = XML_END;
+                return no_tag(ctx, SOAP_NO_TAG);
+            }
+        }
+    }
+    return find_start_tag_slow(ctx);
+}
+
+// Takes the name at `name` and the ">" behind it, which most tags are, if it is short. False: nothing was
+// consumed. The buffer must hold SHORT_NAME bytes there.
+template <template <bool> class Stop> bool take_plain_name(soap *ctx, const char *name)
+{
+    const char *stop = Stop<true>::find(name, name + SHORT_NAME);
+    if (stop == name + SHORT_NAME || *stop != '>')
+        return false;
+    std::memcpy(ctx->tag, name, SHORT_NAME);
+    ctx->tag_length = static_cast<std::uint16_t>(stop - name);
+    ctx->tag[ctx->tag_length] = '\0';
+    input_consume(ctx, stop + 1);
+    return true;
+}
+
+// Reads a start tag that is a short name in brackets and stands whole in the buffer. False: the next thing is
+// another, and nothing was consumed.
+bool read_plain_tag(soap *ctx)
+{
+    if (ctx->look_ahead != 0 || ctx->in_cdata != CDATA_OUTSIDE)
+        return false;
+    const char *p = input_here(ctx);
+    const char *end = input_end(ctx);
+    while (p != end && is_blank(static_cast<unsigned char>(*p)))
+        ++p;
+    if (end - p <= static_cast<std::ptrdiff_t>(SHORT_NAME) || p[0] != '<' ||
+        static_cast<unsigned char>(p[1]) <= '?' || // one of the marks that lead to something else
+        !take_plain_name<tag_name_stop>(ctx, p + 1))
+        return false;
+    ctx->has_body = 1;
+    return true;
+}
+
+int read_tag_name(soap *ctx)
+{
+    if (input_skip_blanks(ctx) == XML_EOF)
+        return no_tag(ctx, end_of_input(ctx));
+    ctx->tag_length = static_cast<std::uint16_t>(xml_name_read<tag_name_stop>(ctx, ctx->tag));
+    if (ctx->tag_length != 0)
+        return 0;
+    return no_tag(ctx, xml_is_refused(ctx) ? ctx->error : static_cast<int>(SOAP_SYNTAX_ERROR));
+}
+
+// The innermost declaration is of an element that has ended.
+bool prefixes_end(const soap *ctx)
+{
+    return ctx->prefix_list != nullptr && ctx->prefix_list->level >= ctx->nesting_level;
+}
+
+// Drops the declarations of elements that have ended.
+void pop_prefixes(soap *ctx)
+{
+    if (prefixes_end(ctx))
+        soap_prefix_pop(ctx);
+}
+
+int read_tag_end(soap *ctx)
+{
+    const std::int32_t byte = input_skip_blanks(ctx);
+    if (byte == XML_EOF)
+        return no_tag(ctx, end_of_input(ctx));
+    ctx->buffer_index++;
+    ctx->has_body = byte != '/';
+    if (byte != '/')
+        return 0;
+    if (input_skip_blanks(ctx) == XML_EOF)
+        return no_tag(ctx, end_of_input(ctx));
+    ctx->buffer_index++; // the ">"
+    return 0;
+}
+
+// What the elements before this one have left: declarations of those that have ended, attributes of the last.
+[[gnu::noinline]] void leave_previous_head(soap *ctx)
+{
+    pop_prefixes(ctx);
+    if (ctx->attributes_set != 0)
+        xml_attributes_hide(ctx);
+}
+
+// A start tag of any kind; the rest of soap_element_head_read where it isn't a plain one.
+[[gnu::noinline]] int read_head(soap *ctx)
+{
+    if (find_start_tag(ctx) != 0 || read_tag_name(ctx) != 0)
+        return ctx->error;
+    leave_previous_head(ctx);
+    if (input_ready(ctx) && *input_here(ctx) == '>') {
+        ctx->buffer_index++;
+        ctx->has_body = 1;
+        return ctx->error = 0;
+    }
+    bool names_wide = false;
+    const int error = xml_attributes_read(ctx, &names_wide);
+    if (error != 0)
+        return no_tag(ctx, error == SOAP_EOF ? end_of_input(ctx) : error);
+    if (read_tag_end(ctx) != 0)
+        return ctx->error;
+    if (ctx->attributes_set != 0)
+        xml_attributes_apply(ctx, names_wide);
+    return ctx->error = 0;
+}
+
+int enter_element(soap *ctx)
+{
+    if (ctx->has_body == 0)
+        return 0;
+    if (ctx->max_depth != 0 && ctx->nesting_level >= ctx->max_depth)
+        return SOAP_LENGTH;
+    ctx->nesting_level++;
+    return 0;
+}
+
+// The name of an end tag and its ">". 0, 5 when something else stands there, or why the input ended.
+int read_end_tag_name(soap *ctx)
+{
+    ctx->tag_resolved = false;
+    if (ctx->look_ahead == 0 && input_end(ctx) - input_here(ctx) >= static_cast<std::ptrdiff_t>(SHORT_NAME) &&
+        take_plain_name<end_name_stop>(ctx, input_here(ctx)))
+        return 0;
+    ctx->tag_length = static_cast<std::uint16_t>(xml_name_read<end_name_stop>(ctx, ctx->tag));
+    const std::int32_t byte = input_skip_blanks(ctx);
+    if (byte == XML_EOF)
+        return end_of_input(ctx);
+    if (byte != '>')
+        return SOAP_SYNTAX_ERROR;
+    ctx->buffer_index++;
+    return 0;
+}
+
+// Drops content up to and including the "</" that ends the present element.
+int find_end_tag(soap *ctx, std::uint64_t depth)
+{
+    if (depth == 0 && ctx->look_ahead == XML_END) {
+        ctx->look_ahead = 0;
+        return 0;
+    }
+    if (depth == 0 && ctx->look_ahead == 0 && ctx->in_cdata == CDATA_OUTSIDE) {
+        const char *p = input_here(ctx);
+        if (input_end(ctx) - p >= 2 && p[0] == '<' && p[1] == '/') {
+            input_consume(ctx, p + 2);
+            return 0;
+        }
+    }
+    return xml_skip_content(ctx, depth);
+}
+
+// `here` begins the end tag that repeats the name in `tag`, whole in the buffer and without blanks.
+inline bool is_own_end(const soap *ctx, const char *here)
+{
+    const std::size_t length = ctx->tag_length;
+    return static_cast<std::size_t>(input_end(ctx) - here) >= length + 3 && here[0] == '<' &&
+           here[1] == '/' && here[2 + length] == '>' && same_name(here + 2, ctx->tag, length);
+}
+
+// The end tag of an element without children comes next, whole, and repeats the name that `tag` still holds.
+// True: it was consumed.
+bool leaf_ends(soap *ctx)
+{
+    if (ctx->peeked != 0 || ctx->look_ahead != 0 || ctx->in_cdata != CDATA_OUTSIDE)
+        return false;
+    const char *here = input_here(ctx);
+    if (!is_own_end(ctx, here))
+        return false;
+    input_consume(ctx, here + ctx->tag_length + 3);
+    return true;
+}
+
+void leave_element(soap *ctx)
+{
+    if (ctx->nesting_level != 0)
+        ctx->nesting_level--;
+}
+
+// A type whose prefix nobody has declared names no type at all. Generous reading takes it for one that it
+// doesn't know.
+bool has_undeclared_type(const soap *ctx)
+{
+    const std::string_view prefix = xml_prefix_of(ctx->element_type);
+    return !prefix.empty() && xml_prefix_find(ctx, prefix) == nullptr;
+}
+
+// The ways of soap_element_in_begin and soap_element_in_end that are not the short ones. Kept out of line, so
+// that the short ones save no registers for them.
+[[gnu::noinline]] int begin_asked(soap *ctx, const char *tag, int nil_allowed, const char *type)
+{
+    const bool own_element = tag == nullptr || *tag != '-';
+    if (soap_element_head_read(ctx) != 0) {
+        if (ctx->error == SOAP_NO_TAG && !own_element)
+            ctx->error = 0;
+        return ctx->error;
+    }
+    if (ctx->other_flag != 0)
+        return ctx->error = SOAP_TAG_MISMATCH;
+    if (!own_element)
+        return ctx->error = 0;
+    ctx->error = soap_tag_compare(ctx, ctx->tag, tag);
+    if (ctx->error != 0)
+        return ctx->error;
+    // Refused tags stay held, so that nesting_level still tells where the reader is.
+    if (type != nullptr && ctx->element_type[0] != '\0' &&
+        soap_tag_compare(ctx, ctx->element_type, type) != 0)
+        return ctx->error = SOAP_TYPE_MISMATCH;
+    if ((ctx->mode & MODE_STRICT) != 0) {
+        if (has_undeclared_type(ctx))
+            return ctx->error = SOAP_TYPE_MISMATCH;
+        if (nil_allowed == 0 && ctx->null_flag != 0)
+            return ctx->error = SOAP_NIL;
+    }
+    ctx->error = enter_element(ctx);
+    if (ctx->error == 0)
+        ctx->peeked = 0;
+    return ctx->error;
+}
+
+[[gnu::noinline]] int end_after_content(soap *ctx, const char *tag, bool any_name)
+{
+    if (ctx->error == SOAP_NO_TAG)
+        ctx->error = 0;
+    const bool inside_held = ctx->peeked != 0 && ctx->tag[0] != '\0' && ctx->has_body != 0;
+    ctx->peeked = 0;
+    if (find_end_tag(ctx, inside_held ? 1 : 0) != 0)
+        return ctx->error = end_of_input(ctx);
+    const int error = read_end_tag_name(ctx);
+    if (error != 0)
+        return ctx->error = error;
+    if (!any_name) {
+        pop_prefixes(ctx);
+        if (soap_tag_compare(ctx, ctx->tag, tag) != 0)
+            return ctx->error = SOAP_SYNTAX_ERROR;
+    }
+    leave_element(ctx);
+    return ctx->error = 0;
+}
+
+} // namespace
+
+void xml_name_character(soap *ctx, char *name, std::size_t &kept)
+{
+    char bytes[6];
+    const std::int32_t token = soap_char_next_utf8(ctx);
+    const std::size_t size = token == XML_EOF ? 0 : utf8_encode(token_code(token), bytes);
+    if (size > SOAP_TEXT_SIZE - 1 - kept)
+        return;
+    std::memcpy(name + kept, bytes, size);
+    kept += size;
+}
+
+int soap_element_head_read(soap *ctx)
+{
+    if (ctx->peeked != 0)
+        return ctx->tag[0] != '\0' ? 0 : ctx->error = SOAP_NO_TAG;
+    forget_tag(ctx);
+    if (!read_plain_tag(ctx))
+        return read_head(ctx);
+    if (prefixes_end(ctx) || ctx->attributes_set != 0)
+        leave_previous_head(ctx);
+    return ctx->error = 0;
+}
+
+int soap_element_in_begin(soap *ctx, const char *tag, int nil_allowed, const char *type)
+{
+    if (tag == nullptr && ctx->peeked != 0 && ctx->tag[0] != '\0' && ctx->attributes_set == 0) {
+        ctx->peeked = 0; // any element, and no attribute has a say
+        return ctx->error = enter_element(ctx);
+    }
+    return begin_asked(ctx, tag, nil_allowed, type);
+}
+
+bool xml_leaf_in_place(soap *ctx, std::string_view *text)
+{
+    const bool is_plain_head =
+        ctx->peeked != 0 && ctx->tag[0] != '\0' && ctx->attributes_set == 0 && ctx->has_body != 0;
+    const bool too_deep = ctx->max_depth != 0 && ctx->nesting_level >= ctx->max_depth;
+    if (!is_plain_head || too_deep || (ctx->mode & MODE_STRICT) != 0 || ctx->look_ahead != 0 ||
+        ctx->in_cdata != CDATA_OUTSIDE)
+        return false;
+    const char *here = input_here(ctx);
+    const char *stop = text_end(ctx, here, input_end(ctx));
+    if (!is_own_end(ctx, stop))
+        return false;
+    *text = {here, static_cast<std::size_t>(stop - here)};
+    input_consume(ctx, stop + ctx->tag_length + 3);
+    ctx->peeked = 0;
+    ctx->error = 0;
+    return true;
+}
+
+int soap_element_in_end(soap *ctx, const char *tag)
+{
+    if (tag != nullptr && *tag == '-')
+        return 0;
+    const bool any_name = tag == nullptr || (ctx->mode & MODE_STRICT) == 0;
+    if (!any_name || !leaf_ends(ctx))
+        return end_after_content(ctx, tag, any_name);
+    leave_element(ctx);
+    return ctx->error = 0;
+}
+
+int soap_element_skip(soap *ctx)
+{
+    if (soap_element_head_read(ctx) != 0)
+        return ctx->error;
+    if (ctx->must_understand != 0 && ctx->other_flag == 0)
+        return ctx->error = SOAP_MUST_UNDERSTAND;
+    if ((ctx->mode & MODE_STRICT) != 0 && ctx->message_part != PART_HEADER)
+        return ctx->error = SOAP_TAG_MISMATCH;
+    ctx->peeked = 0;
+    ctx->error = enter_element(ctx);
+    if (ctx->error != 0 || ctx->has_body == 0)
+        return ctx->error;
+    return soap_element_in_end(ctx, nullptr); // which takes the level back
+}
+
+void soap_tag_unread(soap *ctx)
+{
+    if (ctx->peeked != 0)
+        return;
+    ctx->peeked = 1;
+    if (ctx->has_body != 0 && ctx->nesting_level != 0)
+        ctx->nesting_level--;
+}
+
+const char *soap_attr_get(soap *ctx, const char *name, int occurrence)
+{
+    const bool strict = (ctx->mode & MODE_STRICT) != 0;
+    if (*name == '-')
+        return "";
+    if (ctx->attributes_set != 0) {
+        for (const soap_attribute *p = ctx->attribute_list; p != nullptr; p = p->next) {
+            if (p->visible == 0 || soap_tag_compare(ctx, p->name, name) != 0)
+                continue;
+            ctx->error = strict && occurrence == 2 ? SOAP_PROHIBITED : 0;
+            if (ctx->error != 0)
+                return nullptr;
+            return p->visible == 2 && p->value != nullptr ? p->value : "";
+        }
+    }
+    ctx->error = strict && occurrence == 1 ? SOAP_REQUIRED : 0;
+    return nullptr;
+}
