@@ -13,7 +13,7 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "binding/class_ops.h"
-#include "law_protocolProblemReport.h"
+#include "traits_protocolProblemReport.h"
 
 namespace {
 
@@ -21,7 +21,7 @@ using report_class = protocolProblemReport__ProblemReportContent;
 
 constexpr char ELEMENT[] = "protocolProblemReport:submitRequest";
 
-const binding::class_ops &ops = binding::law<report_class>::ops;
+const binding::class_ops &ops = binding::traits<report_class>::ops;
 
 int write_message(soap *ctx, const report_class &report)
 {

@@ -489,6 +489,9 @@ struct ZUV_CLASS soap {
     std::size_t zlib_buffer_length;
     std::int16_t zlib_level;             // 1 to 9
     float zlib_ratio_in, zlib_ratio_out; // compressed by plain size of the last message
+    const struct soap_upcalls *upcalls;  // what lower layers ask of the exchange of messages; private
+    int (*attachment_stage)(soap *ctx); // input: where soap_recv_more gets bytes from while the message comes
+                                        // in chunks of DIME records; null otherwise; private
 
     soap();                            // both modes 0
     explicit soap(std::uint32_t mode); // one mode for both ways

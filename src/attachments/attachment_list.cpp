@@ -1,4 +1,4 @@
-// attachment_list.cpp - the attachments of a message: hosts add them, their total length is known ahead.
+// attachment_list.cpp - the attachments of a message: hosts add them, their total length is known in advance.
 //
 // Elsewhere: how they go out and come in (dime.cpp, mime.cpp), values that refer to one (attachment_refs.cpp,
 // attachment_value.cpp).
@@ -14,6 +14,7 @@
 #include "attachments/attachment_list.h"
 #include "attachments/dime.h"
 #include "attachments/mime.h"
+#include "core/failure.h"
 
 namespace {
 
@@ -61,7 +62,7 @@ int soap_dime_attach(soap *ctx, char *content, std::size_t size, const char *typ
     }
     soap_attachment *record = soap_attachment_add(ctx, &ctx->dime.first, &ctx->dime.last, content, size);
     if (record == nullptr)
-        return ctx->error = SOAP_OUT_OF_MEMORY;
+        return fail(ctx, SOAP_OUT_OF_MEMORY);
     record->id = id;
     record->type = type;
     record->options = options;
@@ -73,7 +74,7 @@ int soap_mime_attach(soap *ctx, char *content, std::size_t size, int encoding, c
 {
     soap_attachment *record = soap_attachment_add(ctx, &ctx->mime.first, &ctx->mime.last, content, size);
     if (record == nullptr)
-        return ctx->error = SOAP_OUT_OF_MEMORY;
+        return fail(ctx, SOAP_OUT_OF_MEMORY);
     record->encoding = encoding;
     record->type = type;
     record->id = id;
@@ -91,7 +92,7 @@ int attachment_ids_check(soap *ctx, const soap_attachment *list, const char *mes
         return SOAP_OK;
     auto *const ids = static_cast<hashed_id *>(SOAP_MALLOC(ctx, count * sizeof(hashed_id)));
     if (ids == nullptr)
-        return ctx->error = SOAP_OUT_OF_MEMORY;
+        return fail(ctx, SOAP_OUT_OF_MEMORY);
     hashed_id *end = ids;
     if (message_id != nullptr)
         *end++ = hashed_id::of(message_id);
@@ -124,7 +125,7 @@ int attachment_fail(soap *ctx, int error, const char *format, ...)
     va_start(values, format);
     std::vsnprintf(text, sizeof text, format, values);
     va_end(values);
-    return soap_fault_sender(ctx, soap_string_dup(ctx, text), nullptr, error);
+    return fail_as_sender(ctx, soap_string_dup(ctx, text), nullptr, error);
 }
 
 std::uint64_t soap_attachments_length(soap *ctx)

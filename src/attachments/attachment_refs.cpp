@@ -2,7 +2,7 @@
 //
 // Elsewhere: who queues them (attachment_value.cpp), who reads the attachments (dime.cpp, mime.cpp).
 // Always: a message with many references and many attachments costs no more than the sum of both: from a
-// number of references on they hang in hash chains, keyed with a random number that no peer knows.
+// number of references on they are in hash chains, keyed with a random number that no peer knows.
 #include <climits>
 #include <cstring>
 
@@ -13,7 +13,9 @@
 #include <zuv_client_pro/soap_memory.h>
 
 #include "attachments/attachment_id.h"
-#include "attachments/attachment_refs.h"
+#include "attachments/attachment_list.h"
+
+#include "core/failure.h"
 
 struct soap_attachment_index {
     std::size_t count; // references in the list
@@ -42,14 +44,14 @@ id_view whole(const char *text, bool decodes)
     return {text, std::strlen(text), decodes};
 }
 
-void hang(soap_attachment_index &index, soap_attachment_ref *reference)
+void insert(soap_attachment_index &index, soap_attachment_ref *reference)
 {
     soap_attachment_ref *&chain = index.chains[reference->hash & (index.size - 1)];
     reference->next_in_chain = chain;
     chain = reference;
 }
 
-// Makes the chains, or twice as many; all references are hung in anew. If memory is short, the chains grow
+// Makes the chains, or twice as many; all references are inserted anew. If memory is short, the chains grow
 // longer or the list is walked through: slower and right all the same.
 void grow(soap *ctx, soap_attachment_index &index)
 {
@@ -63,7 +65,7 @@ void grow(soap *ctx, soap_attachment_index &index)
     index.chains = chains;
     index.size = size;
     for (soap_attachment_ref *reference = ctx->mtom_list; reference != nullptr; reference = reference->next)
-        hang(index, reference);
+        insert(index, reference);
 }
 
 soap_attachment_index *index_of_list(soap *ctx)
@@ -102,7 +104,7 @@ void forget(soap *ctx, soap_attachment_ref *reference)
 void answer(soap *ctx, soap_attachment_ref *reference, const soap_attachment *attachment)
 {
     if (attachment->size > INT_MAX) { // a value's size is an int
-        ctx->error = SOAP_LENGTH;
+        fail(ctx, SOAP_LENGTH);
         return;
     }
     *reference->content = reinterpret_cast<unsigned char *>(attachment->content);
@@ -142,7 +144,7 @@ int attachment_ref_queue(soap *ctx, const soap_attachment_ref &wanted)
     auto *reference = static_cast<soap_attachment_ref *>(SOAP_MALLOC(ctx, sizeof(soap_attachment_ref)));
     if (index == nullptr || reference == nullptr) {
         SOAP_FREE(ctx, reference);
-        return ctx->error = SOAP_OUT_OF_MEMORY;
+        return fail(ctx, SOAP_OUT_OF_MEMORY);
     }
     *reference = wanted;
     reference->hash = id_hash(whole(without_scheme(wanted.id), true), index->seed);
@@ -154,7 +156,7 @@ int attachment_ref_queue(soap *ctx, const soap_attachment_ref &wanted)
     if (++index->count > SHORT_LIST && index->count > index->size)
         grow(ctx, *index);
     else if (index->size != 0)
-        hang(*index, reference);
+        insert(*index, reference);
     return SOAP_OK;
 }
 
@@ -178,8 +180,8 @@ void soap_attachment_bind(soap *ctx, soap_attachment *attachment)
         answer_in_list(ctx, attachment);
         return;
     }
-    // A reference hangs under its decoded text without scheme; an id answers as it stands, without brackets,
-    // or decoded.
+    // A reference is filed under its decoded text without scheme; an id answers as it stands, without
+    // brackets, or decoded.
     const std::uint64_t seed = ctx->mtom_index->seed;
     const std::uint64_t keys[] = {id_hash(bare_id(attachment->id, false), seed),
                                   id_hash(bare_id(attachment->id, true), seed),

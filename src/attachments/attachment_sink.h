@@ -22,7 +22,7 @@ public:
 
     // 0, 20, or the result of the callback, also in ctx->error.
     int put(const char *data, std::size_t length);
-    // Stores content and size in the record: a managed block with a zero byte behind it, or the handle. 0
+    // Stores content and size in the record: a managed block with a zero byte after it, or the handle. 0
     // or 20.
     int finish(soap_attachment *record);
 

@@ -16,7 +16,7 @@ const char *name_of(const char *id)
     return id == nullptr ? "" : id;
 }
 
-// True if the message needs no length ahead, so that a stream may be as long as it turns out to be.
+// True if the message needs no length in advance, so that a stream may be as long as it turns out to be.
 bool length_is_open(const soap *ctx)
 {
     const std::uint32_t framing = ctx->mode & MODE_IO_MASK;

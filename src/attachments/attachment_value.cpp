@@ -12,10 +12,10 @@
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_xml.h>
 
-#include "attachments/attachment_refs.h"
-#include "attachments/attachment_value.h"
+#include "attachments/attachment_list.h"
 #include "attachments/dime.h"
-#include "identity/identity_value.h"
+#include "core/failure.h"
+#include "identity/pointer_table.h"
 #include "xml/xml_input.h"
 
 namespace {
@@ -241,7 +241,7 @@ int soap_xop_include_in(soap *ctx, unsigned char **content, int *size, char **id
         return result;
     const bool has_body = ctx->has_body != 0;
     if (ctx->element_href[0] == '\0')
-        return ctx->error = SOAP_MIME_HREF;
+        return fail(ctx, SOAP_MIME_HREF);
     if (soap_attachment_ref_in(ctx, content, size, id, type, options) != SOAP_OK)
         return ctx->error;
     return has_body ? soap_element_in_end(ctx, ":Include") : SOAP_OK;

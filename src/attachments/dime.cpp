@@ -1,7 +1,7 @@
 // dime.cpp - DIME records, out and in: the header, and the attachments that follow the record of the message.
 //
-// Elsewhere: a message that comes in several chunks (engine's dime_chunks.cpp), the numbers of the message's
-// own record (envelope_write.cpp).
+// The message itself may come as a record in several chunks: a stage of input (soap::attachment_stage) then
+// makes one text of them. Elsewhere: the numbers of the message's own record (exchange/envelope_frame.cpp).
 //
 //   record  = header options id type data, each padded with zeros to a multiple of 4
 //   header  = version and MB, ME, CF; type format; options, id, type length (16 bits); data length (32 bits)
@@ -18,13 +18,14 @@
 #include "attachments/attachment_sink.h"
 #include "attachments/attachment_stream.h"
 #include "attachments/dime.h"
-#include "attachments/dime_chunks.h"
 #include "attachments/mime.h"
+#include "core/buffered_in.h"
+#include "core/failure.h"
 
 namespace {
 
 constexpr std::size_t HEADER = 12;        // bytes
-constexpr std::size_t OPTIONS_HEADER = 4; // bytes ahead of the options' text
+constexpr std::size_t OPTIONS_HEADER = 4; // bytes before the options' text
 constexpr std::size_t FIELD_MAX = 65535;  // bytes of options, id and type
 constexpr std::size_t OPTIONS_TEXT_MAX = FIELD_MAX - OPTIONS_HEADER;
 constexpr std::uint64_t DATA_MAX = 0xFFFFFFFF;
@@ -35,9 +36,9 @@ constexpr unsigned MESSAGE_BEGIN = 4;     // MB
 constexpr unsigned MESSAGE_END = 2;       // ME
 constexpr unsigned CHUNK = 1;             // CF
 constexpr unsigned MARKS = 7;             // MB, ME, CF
-constexpr unsigned TYPE_FORMAT = 0xF0;    // 0 in it: the type is that of the chunk ahead
+constexpr unsigned TYPE_FORMAT = 0xF0;    // 0 in it: the type is that of the chunk before
 constexpr unsigned MEDIA_TYPE = 0x18;     // flags of an attachment
-constexpr unsigned UNCHANGED_TYPE = 0x08; // flags of a chunk behind the first
+constexpr unsigned UNCHANGED_TYPE = 0x08; // flags of a chunk after the first
 
 std::size_t padding_of(std::uint64_t length)
 {
@@ -148,11 +149,6 @@ int send_record(soap *ctx, const soap_attachment &record)
 
 // --- in ---
 
-int fail_at_end(soap *ctx)
-{
-    return ctx->error = ctx->error == SOAP_OK ? SOAP_EOF : ctx->error;
-}
-
 int skip(soap *ctx, std::size_t length)
 {
     return soap_recv_skip(ctx, length) == 0 ? SOAP_OK : fail_at_end(ctx);
@@ -166,7 +162,7 @@ int skip_padding(soap *ctx, std::size_t length)
         if (byte < 0)
             return fail_at_end(ctx);
         if (byte != 0)
-            return ctx->error = SOAP_DIME_ERROR;
+            return fail(ctx, SOAP_DIME_ERROR);
     }
     return SOAP_OK;
 }
@@ -180,7 +176,7 @@ int read_header(soap *ctx, char (&header)[HEADER])
         byte = static_cast<char>(c);
     }
     if ((number(header, 1) & VERSION_MASK) != VERSION)
-        return ctx->error = SOAP_DIME_VERSION;
+        return fail(ctx, SOAP_DIME_VERSION);
     ctx->dime.flags =
         static_cast<std::uint8_t>((number(header + 1, 1) & TYPE_FORMAT) | (number(header, 1) & MARKS));
     ctx->dime.size = number(header + 8, 4);
@@ -205,7 +201,87 @@ int check_options(soap *ctx, std::size_t length)
     if (length == 0 ||
         (length >= OPTIONS_HEADER && OPTIONS_HEADER + number(ctx->dime.options + 2, 2) <= length))
         return SOAP_OK;
-    return ctx->error = SOAP_DIME_ERROR;
+    return fail(ctx, SOAP_DIME_ERROR);
+}
+
+// The header of a chunk after the first: what it says of itself doesn't count, but that it is one.
+int read_chunk_header(soap *ctx)
+{
+    char header[HEADER];
+    if (read_header(ctx, header) != SOAP_OK)
+        return ctx->error;
+    if ((ctx->dime.flags & (MESSAGE_BEGIN | TYPE_FORMAT)) != 0)
+        return fail(ctx, SOAP_DIME_ERROR);
+    std::uint64_t fields = 0;
+    for (int i = 2; i <= 6; i += 2)
+        fields += padded(number(header + i, 2));
+    return skip(ctx, static_cast<std::size_t>(fields));
+}
+
+// --- in: the message's own record, in chunks ---
+//
+// While it is read, dime.size is the data length of the chunk under way, buffer_length ends with the chunk,
+// and message_count - (buffer_length - buffer_index) bytes of its data were used.
+
+// True if the reader has used up what it may see of a chunked record.
+bool chunk_pending(const soap *ctx)
+{
+    return (ctx->dime.chunk_size | ctx->dime.buffer_length) != 0;
+}
+
+// The buffer is seen up to the end of the chunk, if that has arrived.
+void clip_to_chunk(soap *ctx)
+{
+    const std::size_t available = ctx->buffer_length - ctx->buffer_index;
+    if (available < ctx->dime.chunk_size) {
+        ctx->dime.chunk_size -= available;
+        return;
+    }
+    ctx->message_count -= available - ctx->dime.chunk_size;
+    ctx->dime.buffer_length = ctx->buffer_length;
+    ctx->buffer_length = ctx->buffer_index + ctx->dime.chunk_size;
+    ctx->dime.chunk_size = 0;
+}
+
+void unclip(soap *ctx)
+{
+    ctx->buffer_length = ctx->dime.buffer_length;
+    ctx->dime.buffer_length = 0;
+}
+
+// The stage of input: the next bytes of the record, from this chunk or the next. Results as soap_recv_more.
+int more_of_message(soap *ctx);
+
+// The header was read and the data begins at buffer_index.
+void begin_message_data(soap *ctx)
+{
+    ctx->message_count = ctx->buffer_length - ctx->buffer_index;
+    ctx->dime.chunk_size = 0;
+    ctx->dime.buffer_length = 0;
+    if ((ctx->dime.flags & CHUNK) == 0)
+        return;
+    ctx->attachment_stage = more_of_message;
+    ctx->dime.chunk_size = ctx->dime.size;
+    clip_to_chunk(ctx);
+}
+
+int more_of_message(soap *ctx)
+{
+    while (chunk_pending(ctx)) {
+        if (ctx->dime.chunk_size != 0) {
+            const int result = soap_recv_filtered(ctx);
+            if (result == SOAP_OK)
+                clip_to_chunk(ctx);
+            return result;
+        }
+        unclip(ctx);
+        if (skip_padding(ctx, padding_of(ctx->dime.size)) != SOAP_OK || read_chunk_header(ctx) != SOAP_OK)
+            return ctx->error;
+        begin_message_data(ctx);
+        if (ctx->buffer_index != ctx->buffer_length)
+            return SOAP_OK;
+    }
+    return soap_recv_filtered(ctx);
 }
 
 // What is left of the message's own record, further chunks included, and its padding.
@@ -214,16 +290,16 @@ int skip_message_record(soap *ctx)
     if (ctx->look_ahead == -1)
         return fail_at_end(ctx);
     ctx->look_ahead = 0;
-    while (soap_dime_chunk_pending(ctx)) {
+    while (chunk_pending(ctx)) {
         ctx->buffer_index = ctx->buffer_length;
-        const int result = soap_dime_chunk_more(ctx);
-        const bool at_empty_end = !soap_dime_chunk_pending(ctx) && ctx->dime.size == 0;
+        const int result = more_of_message(ctx);
+        const bool at_empty_end = !chunk_pending(ctx) && ctx->dime.size == 0;
         if (result != SOAP_OK && !at_empty_end)
             return result > 1 ? result : fail_at_end(ctx);
     }
     const std::uint64_t used = ctx->message_count - (ctx->buffer_length - ctx->buffer_index);
     if (used > ctx->dime.size)
-        return ctx->error = SOAP_DIME_ERROR;
+        return fail(ctx, SOAP_DIME_ERROR);
     if (skip(ctx, static_cast<std::size_t>(ctx->dime.size - used)) != SOAP_OK)
         return ctx->error;
     return skip_padding(ctx, padding_of(ctx->dime.size));
@@ -245,22 +321,6 @@ int take_data(soap *ctx, attachment_sink &sink, std::size_t length)
     return skip_padding(ctx, padding_of(ctx->dime.size));
 }
 
-// A chunk behind the first: what it says of itself doesn't count, but that it is one.
-int read_chunk_header(soap *ctx)
-{
-    char header[HEADER];
-    if ((ctx->mode & MODE_DIME) == 0)
-        return ctx->error = SOAP_DIME_ERROR; // the message ended within a record
-    if (read_header(ctx, header) != SOAP_OK)
-        return ctx->error;
-    if ((ctx->dime.flags & (MESSAGE_BEGIN | TYPE_FORMAT)) != 0)
-        return ctx->error = SOAP_DIME_ERROR;
-    std::uint64_t fields = 0;
-    for (int i = 2; i <= 6; i += 2)
-        fields += padded(number(header + i, 2));
-    return skip(ctx, static_cast<std::size_t>(fields));
-}
-
 int take_all_data(soap *ctx, attachment_sink &sink)
 {
     for (;;) {
@@ -269,6 +329,8 @@ int take_all_data(soap *ctx, attachment_sink &sink)
             return ctx->error;
         if (!more)
             return SOAP_OK;
+        if ((ctx->mode & MODE_DIME) == 0)
+            return fail(ctx, SOAP_DIME_ERROR); // the message ended within a record
         if (read_chunk_header(ctx) != SOAP_OK)
             return ctx->error;
     }
@@ -294,7 +356,7 @@ int receive_to_stream(soap *ctx, soap_attachment *record, void *handle)
 int receive_record(soap *ctx)
 {
     if ((ctx->dime.flags & MESSAGE_BEGIN) != 0 || (ctx->dime.flags & TYPE_FORMAT) == 0)
-        return ctx->error = SOAP_DIME_ERROR; // another message, or a chunk without its first
+        return fail(ctx, SOAP_DIME_ERROR); // another message, or a chunk without its first
     soap_attachment *record = soap_attachment_add(ctx, &ctx->dime.list, &ctx->dime.last, nullptr, 0);
     if (record == nullptr)
         return ctx->error;
@@ -355,7 +417,7 @@ int soap_dime_header_write(soap *ctx)
     const std::size_t type = field_length(dime.type);
     char header[HEADER];
     if (dime.size > DATA_MAX || options > FIELD_MAX)
-        return ctx->error = SOAP_DIME_ERROR;
+        return fail(ctx, SOAP_DIME_ERROR);
     header[0] = static_cast<char>(VERSION | (dime.flags & MARKS));
     header[1] = static_cast<char>(dime.flags & 0xF0);
     put_number(header + 2, 2, options);
@@ -386,8 +448,8 @@ int soap_dime_header_read(soap *ctx)
 {
     char header[HEADER];
     if ((ctx->mode & MODE_DIME) == 0)
-        return ctx->error = SOAP_DIME_END;
-    if (soap_dime_chunk_pending(ctx) && skip_message_record(ctx) != SOAP_OK)
+        return fail(ctx, SOAP_DIME_END);
+    if (chunk_pending(ctx) && skip_message_record(ctx) != SOAP_OK)
         return ctx->error;
     if (read_header(ctx, header) != SOAP_OK)
         return ctx->error;
@@ -407,4 +469,14 @@ int soap_dime_attachments_read(soap *ctx)
             return ctx->error;
     }
     return attachment_ids_check(ctx, ctx->dime.list, nullptr, SOAP_DIME_ERROR);
+}
+
+int dime_message_begin(soap *ctx)
+{
+    if (soap_dime_header_read(ctx) != SOAP_OK)
+        return ctx->error;
+    if ((ctx->dime.flags & MESSAGE_BEGIN) == 0)
+        return fail(ctx, SOAP_DIME_ERROR);
+    begin_message_data(ctx);
+    return SOAP_OK;
 }

@@ -15,3 +15,8 @@ std::size_t dime_options_length(const char *options);
 
 // Length of a record on the wire, header and padding included, bytes.
 std::uint64_t dime_record_length(const soap_attachment &record);
+
+// A message begins that is, or whose root part is, the first record: reads its header, and from there on the
+// readers see the record's data alone. SOAP_OK, SOAP_EOF, SOAP_DIME_ERROR, SOAP_DIME_VERSION,
+// SOAP_OUT_OF_MEMORY.
+int dime_message_begin(soap *ctx);

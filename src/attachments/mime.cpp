@@ -1,7 +1,7 @@
 // mime.cpp - MIME parts, out and in: delimiters, part heads, contents.
 //
-// Elsewhere: the head of the part that holds the message (envelope_write.cpp), finding that part (the
-// engine's soap_receive_begin), the message's own Content-Type (HTTP).
+// Elsewhere: the head of the part that holds the message (exchange/envelope_frame.cpp), finding that part
+// (the engine's soap_receive_begin), the message's own Content-Type (HTTP).
 //
 //   message   = [preamble] first *part end [epilogue]
 //   first     = "--" boundary CR LF fields CR LF content
@@ -18,13 +18,15 @@
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_io.h>
 #include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_xml.h>
 
 #include "attachments/attachment_list.h"
 #include "attachments/attachment_sink.h"
 #include "attachments/attachment_stream.h"
 #include "attachments/mime.h"
+#include "core/buffered_in.h"
+#include "core/failure.h"
+#include "core/text_encoding.h"
 
 namespace {
 
@@ -34,7 +36,7 @@ constexpr unsigned FIELDS_MAX = 1024;        // fields of one part head
 constexpr char BOUNDARY_PREFIX[] = "=_zuv_"; // "=_" can't come out of base64 or quoted-printable
 constexpr const char *ROOT_ID = "<message@zuv_client_pro>";
 
-// Stands behind a description. A value that the part answers takes the description in place of DIME options,
+// Stands after a description. A value that the part answers takes the description in place of DIME options,
 // and whoever takes it for such a block reads as many bytes as its third and fourth say: this is how it is
 // known, and the zeros are there for descriptions of fewer characters.
 constexpr char DESCRIPTION_END[] = "\0\0\0\0\0\x9DMIME description";
@@ -169,7 +171,7 @@ int take_boundary(soap *ctx, char *text)
         ctx->mime.boundary = soap_string_dup(ctx, text);
         return ctx->mime.boundary == nullptr ? ctx->error : SOAP_OK;
     }
-    return std::strcmp(ctx->mime.boundary, text) == 0 ? SOAP_OK : ctx->error = SOAP_MIME_ERROR;
+    return std::strcmp(ctx->mime.boundary, text) == 0 ? SOAP_OK : fail(ctx, SOAP_MIME_ERROR);
 }
 
 int store_copy(soap *ctx, const char *text, const char *&field)
@@ -231,7 +233,7 @@ int read_fields(soap *ctx, char *line)
         return ctx->error;
     for (unsigned fields = 0; line[0] != '\0'; ++fields) {
         if (fields == FIELDS_MAX)
-            return ctx->error = SOAP_MIME_ERROR;
+            return fail(ctx, SOAP_MIME_ERROR);
         if (split_field(ctx, part, line) != SOAP_OK || soap_recv_line(ctx, line, SOAP_TEXT_SIZE) != SOAP_OK)
             return ctx->error;
     }
@@ -292,12 +294,12 @@ std::size_t match_on(soap *ctx, const delimiter &wanted, std::size_t matched)
     return matched;
 }
 
-// Takes the content up to the delimiter, and the delimiter. `matched` bytes of one were read ahead.
+// Takes the content up to the delimiter, and the delimiter. `matched` bytes of one were read already.
 int take_content(soap *ctx, attachment_sink *sink, const delimiter &wanted, std::size_t matched)
 {
     for (;;) {
         if (ctx->buffer_index >= ctx->buffer_length && soap_recv_more(ctx) != SOAP_OK)
-            return ctx->error = ctx->error == SOAP_OK ? SOAP_EOF : ctx->error;
+            return fail_at_end(ctx);
         if (matched == 0) {
             const char *const start = ctx->buffer + ctx->buffer_index;
             const char *const found = find_delimiter(start, ctx->buffer + ctx->buffer_length, wanted);
@@ -317,14 +319,14 @@ int take_content(soap *ctx, attachment_sink *sink, const delimiter &wanted, std:
     }
 }
 
-// A byte that the XML reader gave back stands ahead of the rest of the message's part; `matched` tells
+// A byte that the XML reader gave back stands before the rest of the message's part; `matched` tells
 // whether a delimiter may begin with it.
 int take_pushed_back(soap *ctx, attachment_sink *sink, std::size_t &matched)
 {
     const std::int32_t byte = ctx->look_ahead;
     matched = 0;
     if (byte == -1)
-        return ctx->error = ctx->error == SOAP_OK ? SOAP_EOF : ctx->error;
+        return fail_at_end(ctx);
     ctx->look_ahead = 0;
     if (byte == '\r')
         matched = 1;
@@ -338,7 +340,7 @@ int take_delimiter_end(soap *ctx, bool &last)
     std::int32_t c = soap_recv_byte(ctx);
     last = c == '-';
     if (last)
-        return soap_recv_byte(ctx) == '-' ? SOAP_OK : ctx->error = SOAP_MIME_ERROR;
+        return soap_recv_byte(ctx) == '-' ? SOAP_OK : fail(ctx, SOAP_MIME_ERROR);
     while (c == ' ' || c == '\t' || c == '\r')
         c = soap_recv_byte(ctx);
     if (c == '\n')
@@ -387,7 +389,7 @@ int receive_part(soap *ctx, soap_attachment *part, void *handle)
     return result != SOAP_OK ? result : ctx->error;
 }
 
-// The message had no references yet when the parts ahead of it were read.
+// The message had no references yet when the parts before it were read.
 void bind_early_parts(soap *ctx)
 {
     for (soap_attachment *part = ctx->mime.list; part != nullptr && part != ctx->mime.root; part = part->next)
@@ -447,7 +449,7 @@ int soap_mime_boundary_make(soap *ctx)
     char text[BOUNDARY_RANDOM + 16];
     std::memcpy(text, BOUNDARY_PREFIX, sizeof BOUNDARY_PREFIX);
     if (!draw(text + sizeof BOUNDARY_PREFIX - 1, BOUNDARY_RANDOM))
-        return ctx->error = SOAP_FATAL_ERROR;
+        return fail(ctx, SOAP_FATAL_ERROR);
     ctx->mime.boundary = soap_string_dup(ctx, text);
     return ctx->mime.boundary == nullptr ? ctx->error : SOAP_OK;
 }
@@ -516,19 +518,42 @@ int soap_mime_parts_read_all(soap *ctx)
     return SOAP_OK;
 }
 
-soap_attachment *soap_mime_next_part(soap *ctx)
+// Drops what stands before the first line that begins with "--".
+static int skip_to_boundary(soap *ctx)
 {
-    if ((ctx->mode & MODE_MIME) == 0)
-        return nullptr;
-    soap_attachment *part = soap_mime_part_read(ctx, nullptr);
-    if (part != nullptr && part == ctx->mime.root)
-        part = soap_mime_part_read(ctx, nullptr); // null if the message is the only part
-    if (ctx->error == SOAP_OK && (ctx->mode & MODE_MIME) != 0)
-        return part;
-    if (ctx->error == SOAP_OK)
-        soap_receive_finish(ctx);
-    ctx->mode &= ~MODE_MIME;
-    if (ctx->keep_alive < 0)
-        ctx->keep_alive = 0; // the connection was only held for the parts
-    return soap_socket_release(ctx) == SOAP_OK ? part : nullptr;
+    bool line_start = true;
+    for (;;) {
+        const std::int32_t c = soap_recv_byte(ctx);
+        if (c == -1)
+            return fail_at_end(ctx);
+        if (c == '-' && line_start && input_peek_byte(ctx) == '-') {
+            ctx->look_ahead = c;
+            return SOAP_OK;
+        }
+        line_start = c == '\n';
+    }
+}
+
+// Reads on to the part that holds the message; the parts before it are kept.
+int mime_message_begin(soap *ctx)
+{
+    if (skip_to_boundary(ctx) != SOAP_OK || soap_mime_part_header_read(ctx) != SOAP_OK)
+        return ctx->error;
+    while (ctx->mime.start != nullptr && ctx->mime.last != nullptr &&
+           soap_cid_compare(ctx, ctx->mime.start, ctx->mime.last->id) != 0) {
+        if (soap_mime_part_read(ctx, nullptr) == nullptr)
+            break;
+    }
+    if (ctx->error != SOAP_OK)
+        return ctx->error;
+    if (ctx->mime.last == nullptr)
+        return fail(ctx, SOAP_MIME_ERROR);
+    ctx->mime.root = ctx->mime.last;
+    const char *type = ctx->mime.root->type;
+    if (type != nullptr && soap_attr_value(ctx, type, "application/dime") != nullptr)
+        ctx->mode |= MODE_DIME;
+    if (type != nullptr && soap_attr_value(ctx, type, "application/xop+xml") != nullptr)
+        ctx->mode |= MODE_MTOM;
+    text_encoding_by_type(ctx, type, ctx->mode);
+    return SOAP_OK;
 }

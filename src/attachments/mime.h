@@ -13,8 +13,12 @@ inline bool mime_is_written(const soap *ctx)
 // are what it has if it is a block of options.
 bool mime_is_description(const char *options, std::size_t length);
 
-// Length of a part on the wire, its head and the delimiter ahead of it included, bytes.
+// Length of a part on the wire, its head and the delimiter before it included, bytes.
 std::uint64_t mime_part_length(soap *ctx, const soap_attachment &part);
 
 // Length of the delimiter that ends the message, bytes.
 std::uint64_t mime_end_length(soap *ctx);
+
+// A multipart message begins: reads on to the header of the part that holds the message; the parts before it
+// are kept in ctx->mime. SOAP_OK, SOAP_EOF, SOAP_MIME_ERROR, SOAP_OUT_OF_MEMORY, or the result of a hook.
+int mime_message_begin(soap *ctx);

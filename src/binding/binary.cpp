@@ -6,15 +6,15 @@
 #include <zuv_client_pro/soap_primitive.h>
 #include <zuv_client_pro/soap_xml.h>
 
-#include "attachments/attachment_value.h"
+#include "attachments/attachment_list.h"
 #include "binding/class_rules.h"
-#include "binding/law_binary.h"
+#include "binding/traits_binary.h"
 
 namespace binding {
 
 namespace {
 
-constexpr int BINARY_ID = law<xsd__base64Binary>::type_id;
+constexpr int BINARY_ID = traits<xsd__base64Binary>::type_id;
 
 int write_bytes(soap *ctx, const void *object, const char *)
 {
@@ -79,7 +79,7 @@ constexpr class_ops make_binary_ops()
 
 } // namespace
 
-constinit const class_ops law<xsd__base64Binary>::ops = make_binary_ops();
+constinit const class_ops traits<xsd__base64Binary>::ops = make_binary_ops();
 
 } // namespace binding
 

@@ -12,6 +12,7 @@
 
 #include "binding/member_read.h"
 #include "binding/registry.h"
+#include "core/failure.h"
 #include "core/limits.h"
 #include "xml/namespace_scope.h"
 #include "xml/tag_view.h"
@@ -47,8 +48,7 @@ void *class_instantiate(soap *ctx, const class_ops &ops, int count, const char *
     entry->object = actual->create(ctx, count);
     if (!entry->object) {
         // NOLINTNEXTLINE(clang-analyzer-core.NullDereference): no call lacks a context
-        ctx->error = SOAP_OUT_OF_MEMORY;
-        return nullptr;
+        return fail_null(ctx, SOAP_OUT_OF_MEMORY);
     }
     const std::size_t bytes = actual->size * static_cast<std::size_t>(count < 0 ? 1 : count);
     memory_charge(ctx, bytes);
@@ -158,18 +158,18 @@ std::size_t next_member(const member_table &members, std::size_t index)
 }
 
 // Gives the held element to the member that it names. The members with its local name are tried in order.
-step take_member(soap *ctx, const member_table &members, void *object, std::uint64_t &spent)
+step take_member(soap *ctx, const member_table &members, void *object, std::uint64_t &seen)
 {
     const tag_view tag = soap_held_tag(ctx);
     std::size_t index = first_member(members, tag);
     for (; index != NO_MEMBER; index = next_member(members, index)) {
         const member_entry &entry = members.entries[index];
         const std::uint64_t bit = std::uint64_t{1} << index;
-        if ((spent & bit) != 0)
+        if ((seen & bit) != 0)
             continue;
         if (entry.read(ctx, asked_tag(ctx, tag, entry.tag, entry.local), object)) {
             if (entry.single)
-                spent |= bit;
+                seen |= bit;
             return step::consumed;
         }
         if (ctx->error != SOAP_TAG_MISMATCH)
@@ -178,15 +178,15 @@ step take_member(soap *ctx, const member_table &members, void *object, std::uint
     return step::unknown;
 }
 
-// Reads all elements up to the end of the parent, in any order. `spent` takes the single members that were
+// Reads all elements up to the end of the parent, in any order. `seen` takes the single members that were
 // met.
-bool read_elements(soap *ctx, const member_table &members, void *object, std::uint64_t &spent)
+bool read_elements(soap *ctx, const member_table &members, void *object, std::uint64_t &seen)
 {
     for (;;) {
         if (soap_element_head_read(ctx))
             return ctx->error == SOAP_NO_TAG;
-        ctx->error = SOAP_TAG_MISMATCH;
-        const step taken = take_member(ctx, members, object, spent);
+        fail(ctx, SOAP_TAG_MISMATCH);
+        const step taken = take_member(ctx, members, object, seen);
         if (taken == step::failed)
             return false;
         if (taken == step::unknown && soap_element_skip(ctx))
@@ -194,9 +194,9 @@ bool read_elements(soap *ctx, const member_table &members, void *object, std::ui
     }
 }
 
-bool lacks(const class_ops &ops, const void *object, std::uint64_t spent)
+bool lacks(const class_ops &ops, const void *object, std::uint64_t seen)
 {
-    return (ops.members->required & ~spent) != 0 || (ops.enough && !ops.enough(object));
+    return (ops.members->required & ~seen) != 0 || (ops.holds_minima && !ops.holds_minima(object));
 }
 
 void *read_by_reference(soap *ctx, const class_ops &ops, const char *tag, void *object)
@@ -206,14 +206,12 @@ void *read_by_reference(soap *ctx, const class_ops &ops, const char *tag, void *
         return nullptr;
     if (body && soap_element_in_end(ctx, tag))
         return nullptr;
-    if (strict(ctx) && (ops.members->required || ops.members->minima)) {
-        ctx->error = SOAP_OCCURS;
-        return nullptr;
-    }
+    if (strict(ctx) && (ops.members->required || ops.members->minima))
+        return fail_null(ctx, SOAP_OCCURS);
     return object;
 }
 
-// What comes ahead of the content in all forms: the object's identity and its attributes.
+// What comes before the content in all forms: the object's identity and its attributes.
 bool read_preamble(soap *ctx, const class_ops &ops, void *object)
 {
     if (ctx->element_id[0] && !soap_object_register(ctx, ctx->element_id, object, ops.type_id, ops.size, 0,
@@ -248,13 +246,11 @@ void *read_members(soap *ctx, const class_ops &ops, const char *tag, void *objec
 
 void *read_further_members(soap *ctx, const class_ops &ops, const char *tag, void *object)
 {
-    std::uint64_t spent = 0;
-    if (!read_elements(ctx, *ops.members, object, spent) || soap_element_in_end(ctx, tag))
+    std::uint64_t seen = 0;
+    if (!read_elements(ctx, *ops.members, object, seen) || soap_element_in_end(ctx, tag))
         return nullptr;
-    if (strict(ctx) && lacks(ops, object, spent)) {
-        ctx->error = SOAP_OCCURS;
-        return nullptr;
-    }
+    if (strict(ctx) && lacks(ops, object, seen))
+        return fail_null(ctx, SOAP_OCCURS);
     return object;
 }
 

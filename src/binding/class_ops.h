@@ -41,7 +41,7 @@ struct member_table {
 
 struct class_ops;
 
-// Reads what stands behind the consumed start tag of an element into `object`, up to and with the end tag.
+// Reads what stands after the consumed start tag of an element into `object`, up to and with the end tag.
 // The object, or null with error set.
 using content_reader = void *(*)(soap *ctx, const class_ops &ops, const char *tag, void *object);
 
@@ -65,8 +65,8 @@ struct class_ops {
     int (*write_attributes)(soap *ctx, const void *object);
     content_reader read;
     bool (*read_attributes)(soap *ctx, void *object);
-    bool (*enough)(const void *object); // vectors hold their minima
-    std::string *(*text)(void *object); // simple content
+    bool (*holds_minima)(const void *object); // vectors hold their minima
+    std::string *(*text)(void *object);       // simple content
     void (*copy_hook)(soap *ctx, int type, int place_type, void *place, std::size_t length,
                       const void *source, std::size_t size);
 };
@@ -86,13 +86,13 @@ bool independents_read(soap *ctx);
 
 // The content readers: elements, and text with attributes.
 void *read_members(soap *ctx, const class_ops &ops, const char *tag, void *object);
-// Goes on with the elements of an object behind a value that was refused and dropped.
+// Goes on with the elements of an object after a value that was refused and dropped.
 void *read_further_members(soap *ctx, const class_ops &ops, const char *tag, void *object);
 void *read_simple_content(soap *ctx, const class_ops &ops, const char *tag, void *object);
 
 // Pointer forms. The reader takes the element `tag`, nil and references included, and fills the place.
 bool class_pointer_in(soap *ctx, const class_ops &ops, const char *tag, void **place);
-// The same behind a consumed start tag that is neither nil nor a reference.
+// The same after a consumed start tag that is neither nil nor a reference.
 bool class_new_in(soap *ctx, const class_ops &ops, const char *tag, void **place);
 int class_pointer_out(soap *ctx, const class_ops &ops, const char *tag, int id, const void *object,
                       const char *type);

@@ -1,6 +1,6 @@
 // class_rules.h - the rules of a data class, unrolled from its member list.
 //
-// Here: templates that turn law<T> into a class_ops record: defaulting, marking, writing, reading of each
+// Here: templates that turn traits<T> into a class_ops record: defaulting, marking, writing, reading of each
 // member in order. Elsewhere: whole objects (class_ops.cpp), leaves (member_write.h, member_read.h).
 //
 // Always: inherited members come first and are handled by the base's own functions, so that a class that adds
@@ -12,33 +12,35 @@
 #include <utility>
 
 #include "binding/class_ops.h"
-#include "binding/law.h"
 #include "binding/member_read.h"
 #include "binding/member_write.h"
+#include "binding/traits.h"
+#include "core/failure.h"
+#include "xml/namespace.h"
 #include "xml/tag_view.h"
 
 namespace binding {
 
-template <class T> inline constexpr std::size_t own_count = std::tuple_size_v<decltype(law<T>::elements)>;
+template <class T> inline constexpr std::size_t own_count = std::tuple_size_v<decltype(traits<T>::elements)>;
 
 template <class T> constexpr std::size_t total_count()
 {
     if constexpr (std::is_void_v<T>)
         return 0;
     else
-        return total_count<typename law<T>::base>() + own_count<T>;
+        return total_count<typename traits<T>::base>() + own_count<T>;
 }
 
 // The nearest class of the chain that has members of its own: its functions serve for T.
-template <class T> constexpr auto bearer_tag()
+template <class T> constexpr auto member_class_tag()
 {
-    using base = typename law<T>::base;
+    using base = typename traits<T>::base;
     if constexpr (own_count < T >> 0 || std::is_void_v<base>)
         return static_cast<T *>(nullptr);
     else
-        return bearer_tag<base>();
+        return member_class_tag<base>();
 }
-template <class T> using bearer = std::remove_pointer_t<decltype(bearer_tag<T>())>;
+template <class T> using member_class = std::remove_pointer_t<decltype(member_class_tag<T>())>;
 
 // Calls `visit` with each own element of T as a constant, in order, until it gives true: the result tells
 // whether it did. Constants, and not references into the tuple, so that a member costs no more than its own
@@ -56,13 +58,14 @@ template <class T, class Visit> constexpr bool any_element(Visit visit)
 
 template <class T> void reset_members(T &object)
 {
-    if constexpr (!std::is_void_v<typename law<T>::base>)
-        reset_members<typename law<T>::base>(object);
-    std::apply([&](const auto &...row) { (reset_attribute(object.*row.member), ...); }, law<T>::attributes);
-    if constexpr (law<T>::text != nullptr)
-        (object.*law<T>::text).clear();
+    if constexpr (!std::is_void_v<typename traits<T>::base>)
+        reset_members<typename traits<T>::base>(object);
+    std::apply([&](const auto &...row) { (reset_attribute(object.*row.member), ...); },
+               traits<T>::attributes);
+    if constexpr (traits<T>::text != nullptr)
+        (object.*traits<T>::text).clear();
     any_element<T>([&](auto index) {
-        constexpr const auto &row = std::get<index>(law<T>::elements);
+        constexpr const auto &row = std::get<index>(traits<T>::elements);
         reset_value(object.*row.member, row.initial);
         return false;
     });
@@ -72,10 +75,10 @@ template <class T> void reset_members(T &object)
 
 template <class T> void mark_members(soap *ctx, const T &object)
 {
-    if constexpr (!std::is_void_v<typename law<T>::base>)
-        mark_members<typename law<T>::base>(ctx, object);
+    if constexpr (!std::is_void_v<typename traits<T>::base>)
+        mark_members<typename traits<T>::base>(ctx, object);
     any_element<T>([&](auto index) {
-        constexpr const auto &row = std::get<index>(law<T>::elements);
+        constexpr const auto &row = std::get<index>(traits<T>::elements);
         mark_value(ctx, object.*row.member, row.item_type);
         return false;
     });
@@ -85,12 +88,12 @@ template <class T> void mark_members(soap *ctx, const T &object)
 
 template <class T> int write_members(soap *ctx, const T &object)
 {
-    if constexpr (!std::is_void_v<typename law<T>::base>) {
-        if (write_members<bearer<typename law<T>::base>>(ctx, object))
+    if constexpr (!std::is_void_v<typename traits<T>::base>) {
+        if (write_members<member_class<typename traits<T>::base>>(ctx, object))
             return ctx->error;
     }
     const bool failed = any_element<T>([&](auto index) {
-        constexpr const auto &row = std::get<index>(law<T>::elements);
+        constexpr const auto &row = std::get<index>(traits<T>::elements);
         return write_value(ctx, row.tag, object.*row.member, row.how, row.item_type) != 0;
     });
     return failed ? ctx->error : 0;
@@ -98,19 +101,20 @@ template <class T> int write_members(soap *ctx, const T &object)
 
 template <class T> int write_content(soap *ctx, const void *object, const char *)
 {
-    return write_members<bearer<T>>(ctx, *static_cast<const T *>(object));
+    return write_members<member_class<T>>(ctx, *static_cast<const T *>(object));
 }
 
 template <class T> int write_attributes(soap *ctx, const void *object)
 {
     const T &self = *static_cast<const T *>(object);
-    if constexpr (!std::is_void_v<typename law<T>::base>) {
-        if (write_attributes<typename law<T>::base>(ctx, static_cast<const typename law<T>::base *>(&self)))
+    if constexpr (!std::is_void_v<typename traits<T>::base>) {
+        if (write_attributes<typename traits<T>::base>(ctx,
+                                                       static_cast<const typename traits<T>::base *>(&self)))
             return ctx->error;
     }
     const bool failed = std::apply(
         [&](const auto &...row) { return (... || (write_attribute(ctx, row.name, self.*row.member) != 0)); },
-        law<T>::attributes);
+        traits<T>::attributes);
     return failed ? ctx->error : 0;
 }
 
@@ -119,62 +123,57 @@ template <class T> int write_attributes(soap *ctx, const void *object)
 template <class T> bool read_attributes(soap *ctx, void *object)
 {
     T &self = *static_cast<T *>(object);
-    if constexpr (!std::is_void_v<typename law<T>::base>) {
-        if (!read_attributes<typename law<T>::base>(ctx, static_cast<typename law<T>::base *>(&self)))
+    if constexpr (!std::is_void_v<typename traits<T>::base>) {
+        if (!read_attributes<typename traits<T>::base>(ctx, static_cast<typename traits<T>::base *>(&self)))
             return false;
     }
     return std::apply(
         [&](const auto &...row) {
             return (... && read_attribute(ctx, row.name, self.*row.member, row.required));
         },
-        law<T>::attributes);
+        traits<T>::attributes);
 }
 
 template <class T, std::size_t I> bool read_member(soap *ctx, const char *tag, void *object)
 {
-    constexpr const auto &row = std::get<I>(law<T>::elements);
+    constexpr const auto &row = std::get<I>(traits<T>::elements);
     return read_value(ctx, tag, static_cast<T *>(object)->*row.member, row.item_type, row.vector_type);
 }
 
 template <class V> inline constexpr bool is_vector = false;
 template <class V> inline constexpr bool is_vector<std::vector<V>> = true;
 
-template <class T> bool enough_items(const void *object)
+template <class T> bool holds_minima(const void *object)
 {
     const T &self = *static_cast<const T *>(object);
-    if constexpr (!std::is_void_v<typename law<T>::base>) {
-        if (!enough_items<typename law<T>::base>(static_cast<const typename law<T>::base *>(&self)))
+    if constexpr (!std::is_void_v<typename traits<T>::base>) {
+        if (!holds_minima<typename traits<T>::base>(static_cast<const typename traits<T>::base *>(&self)))
             return false;
     }
     return !any_element<T>([&](auto index) {
-        constexpr const auto &row = std::get<index>(law<T>::elements);
+        constexpr const auto &row = std::get<index>(traits<T>::elements);
         return !holds_minimum(self.*row.member, row.minimum);
     });
 }
 
 // --- the table of members ---
 
-constexpr std::string_view local_part(std::string_view tag)
-{
-    const auto colon = tag.find(':');
-    return colon == std::string_view::npos ? tag : tag.substr(colon + 1);
-}
-
 template <class T, std::size_t N, std::size_t... I>
 constexpr void add_own_entries(std::array<member_entry, N> &entries, std::size_t first,
                                std::index_sequence<I...>)
 {
-    ((entries[first + I] = {std::get<I>(law<T>::elements).tag, local_part(std::get<I>(law<T>::elements).tag),
-                            &read_member<T, I>, std::get<I>(law<T>::elements).how != occurs::many,
-                            std::get<I>(law<T>::elements).how == occurs::required}),
+    ((entries[first + I] = {std::get<I>(traits<T>::elements).tag,
+                            xml_local_part(std::get<I>(traits<T>::elements).tag), &read_member<T, I>,
+                            std::get<I>(traits<T>::elements).how != occurs::many,
+                            std::get<I>(traits<T>::elements).how == occurs::required}),
      ...);
 }
 
 template <class T, std::size_t N> constexpr void add_entries(std::array<member_entry, N> &entries)
 {
     if constexpr (!std::is_void_v<T>) {
-        add_entries<typename law<T>::base>(entries);
-        add_own_entries<T>(entries, total_count<typename law<T>::base>(),
+        add_entries<typename traits<T>::base>(entries);
+        add_own_entries<T>(entries, total_count<typename traits<T>::base>(),
                            std::make_index_sequence<own_count<T>>{});
     }
 }
@@ -184,10 +183,10 @@ template <class T> constexpr bool has_minima()
     if constexpr (std::is_void_v<T>) {
         return false;
     } else {
-        return has_minima<typename law<T>::base>() ||
+        return has_minima<typename traits<T>::base>() ||
                std::apply(
                    [](const auto &...row) { return (... || (row.how == occurs::many && row.minimum > 0)); },
-                   law<T>::elements);
+                   traits<T>::elements);
     }
 }
 
@@ -300,12 +299,12 @@ template <class V> std::size_t content_of(const std::vector<V> &items)
 template <class T> std::size_t content_bytes(const T &object)
 {
     std::size_t bytes = 0;
-    if constexpr (!std::is_void_v<typename law<T>::base>)
-        bytes += content_bytes<bearer<typename law<T>::base>>(object);
-    if constexpr (law<T>::text != nullptr)
-        bytes += content_of(object.*law<T>::text);
+    if constexpr (!std::is_void_v<typename traits<T>::base>)
+        bytes += content_bytes<member_class<typename traits<T>::base>>(object);
+    if constexpr (traits<T>::text != nullptr)
+        bytes += content_of(object.*traits<T>::text);
     any_element<T>([&](auto index) {
-        bytes += content_of(object.*std::get<index>(law<T>::elements).member);
+        bytes += content_of(object.*std::get<index>(traits<T>::elements).member);
         return false;
     });
     return bytes;
@@ -314,12 +313,12 @@ template <class T> std::size_t content_bytes(const T &object)
 template <class T>
 void copy_hook(soap *ctx, int, int, void *place, std::size_t, const void *source, std::size_t)
 {
-    if (!object_copy_allowed(ctx, sizeof(T), content_bytes<bearer<T>>(*static_cast<const T *>(source))))
+    if (!object_copy_allowed(ctx, sizeof(T), content_bytes<member_class<T>>(*static_cast<const T *>(source))))
         return;
     try {
         assign<T>(place, source);
     } catch (const std::bad_alloc &) {
-        ctx->error = 20;
+        fail(ctx, 20);
     }
 }
 
@@ -345,36 +344,36 @@ template <class T> int out_object(const void *object, soap *ctx, const char *tag
 
 template <class T> std::string *text_of(void *object)
 {
-    if constexpr (law<T>::text != nullptr)
-        return &(static_cast<T *>(object)->*law<T>::text);
+    if constexpr (traits<T>::text != nullptr)
+        return &(static_cast<T *>(object)->*traits<T>::text);
     else
         return nullptr;
 }
 
 template <class T> int write_text_content(soap *ctx, const void *object, const char *)
 {
-    return write_text(ctx, static_cast<const T *>(object)->*law<T>::text);
+    return write_text(ctx, static_cast<const T *>(object)->*traits<T>::text);
 }
 
 template <class T> constexpr const class_ops *base_ops()
 {
-    if constexpr (std::is_void_v<typename law<T>::base>)
+    if constexpr (std::is_void_v<typename traits<T>::base>)
         return nullptr;
     else
-        return &ops_of<typename law<T>::base>;
+        return &ops_of<typename traits<T>::base>;
 }
 
 template <class T> constexpr auto content_writer()
 {
-    if constexpr (law<T>::text != nullptr)
+    if constexpr (traits<T>::text != nullptr)
         return &write_text_content<T>;
     else
-        return &write_content<bearer<T>>;
+        return &write_content<member_class<T>>;
 }
 
 template <class T> constexpr content_reader reader_of()
 {
-    return law<T>::text != nullptr ? &read_simple_content : &read_members;
+    return traits<T>::text != nullptr ? &read_simple_content : &read_members;
 }
 
 template <class T> constexpr bool has_attributes()
@@ -382,18 +381,19 @@ template <class T> constexpr bool has_attributes()
     if constexpr (std::is_void_v<T>)
         return false;
     else
-        return std::tuple_size_v<decltype(law<T>::attributes)> > 0 || has_attributes<typename law<T>::base>();
+        return std::tuple_size_v<decltype(traits<T>::attributes)> > 0 ||
+               has_attributes<typename traits<T>::base>();
 }
 
 template <class T> constexpr class_ops make_ops()
 {
-    return {law<T>::type_id,
-            law<T>::xml_type,
+    return {traits<T>::type_id,
+            traits<T>::xml_type,
             base_ops<T>(),
             sizeof(T),
-            law<T>::global_element,
-            law<T>::text != nullptr,
-            &members_table<bearer<T>>,
+            traits<T>::global_element,
+            traits<T>::text != nullptr,
+            &members_table<member_class<T>>,
             &create<T>,
             &destroy<T>,
             &assign<T>,
@@ -405,17 +405,17 @@ template <class T> constexpr class_ops make_ops()
             has_attributes<T>() ? &write_attributes<T> : nullptr,
             reader_of<T>(),
             has_attributes<T>() ? &read_attributes<T> : nullptr,
-            has_minima<T>() ? &enough_items<T> : nullptr,
+            has_minima<T>() ? &holds_minima<T> : nullptr,
             &text_of<T>,
             &copy_hook<T>};
 }
 
 } // namespace binding
 
-// Defines everything that a generated class declares, from its law. The arguments' names can't be those of
+// Defines everything that a generated class declares, from its traits. The arguments' names can't be those of
 // members.
 #define BINDING_DEFINE_CLASS(T)                                                                              \
-    constinit const binding::class_ops binding::law<T>::ops = binding::make_ops<T>();                        \
+    constinit const binding::class_ops binding::traits<T>::ops = binding::make_ops<T>();                     \
     T::T()                                                                                                   \
     {                                                                                                        \
         T::soap_default(nullptr);                                                                            \
@@ -423,7 +423,7 @@ template <class T> constexpr class_ops make_ops()
     T::~T() = default;                                                                                       \
     int T::soap_type() const                                                                                 \
     {                                                                                                        \
-        return binding::law<T>::type_id;                                                                     \
+        return binding::traits<T>::type_id;                                                                  \
     }                                                                                                        \
     void T::soap_default(struct soap *ctx_)                                                                  \
     {                                                                                                        \
@@ -432,7 +432,7 @@ template <class T> constexpr class_ops make_ops()
     }                                                                                                        \
     void T::soap_serialize(struct soap *ctx_) const                                                          \
     {                                                                                                        \
-        binding::mark_members<binding::bearer<T>>(ctx_, *this);                                              \
+        binding::mark_members<binding::member_class<T>>(ctx_, *this);                                        \
     }                                                                                                        \
     int T::soap_put(struct soap *ctx_, const char *tag_, const char *type_) const                            \
     {                                                                                                        \

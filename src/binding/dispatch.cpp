@@ -13,9 +13,10 @@
 #include "binding/envelope.h"
 #include "binding/member_read.h"
 #include "binding/member_write.h"
-#include "binding/name_lookup.h"
 #include "binding/registry.h"
+#include "core/failure.h"
 #include "core/limits.h"
+#include "xml/namespace.h"
 
 namespace binding {
 
@@ -183,10 +184,8 @@ void *soap_read_element(soap *ctx, int *type)
     *type = type_by_identity(ctx);
     if (*type < 1 || *type > DISPATCH_ID_MAX)
         *type = type_of_element(ctx);
-    if (*type == 0) {
-        ctx->error = SOAP_TAG_MISMATCH;
-        return nullptr;
-    }
+    if (*type == 0)
+        return fail_null(ctx, SOAP_TAG_MISMATCH);
     return read_by_type(ctx, *type);
 }
 

@@ -19,7 +19,8 @@
 
 #include "binding/member_read.h"
 #include "binding/member_write.h"
-#include "law_protocol.h"
+#include "core/failure.h"
+#include "traits_protocol.h"
 
 namespace binding {
 
@@ -65,7 +66,7 @@ template <> constexpr int id_of<SOAP_ENV__Fault>()
 }
 
 // The error says that a value isn't what it should be, in XML that is sound. Characters that XML can't carry
-// are errors of strict mode alone, which holds the tags behind them to their names.
+// are errors of strict mode alone, which holds the tags after them to their names.
 bool is_bad_value(const soap *ctx)
 {
     switch (ctx->error) {
@@ -169,7 +170,7 @@ void try_members(record_reader &r, SOAP_ENV__Detail &detail)
 {
 #define TRY_FAULT(name)                                                                                      \
     r.member([&] {                                                                                           \
-        return fault_in(r.ctx, ops_of<protocol__##name>, law<protocol__##name>::xml_type,                    \
+        return fault_in(r.ctx, ops_of<protocol__##name>, traits<protocol__##name>::xml_type,                 \
                         reinterpret_cast<void **>(&detail.name));                                            \
     });
     SOAP_DETAIL_FAULTS(TRY_FAULT)
@@ -206,7 +207,7 @@ template <class R> bool read_members_of(soap *ctx, R &record)
     record_reader reader{ctx};
     const std::uint32_t level = ctx->nesting_level;
     for (;;) {
-        ctx->error = SOAP_TAG_MISMATCH;
+        fail(ctx, SOAP_TAG_MISMATCH);
         reader.next = 0;
         reader.hit = false;
         try_members(reader, record);
@@ -232,7 +233,7 @@ template <class R> R *record_content_in(soap *ctx, const char *tag, R *record)
     return record;
 }
 
-// Behind the start tag; nil gives null.
+// After the start tag; nil gives null.
 template <class R> bool record_new_in(soap *ctx, const char *tag, R **place)
 {
     *place = nullptr;
@@ -313,8 +314,8 @@ int members_out(soap *ctx, const SOAP_ENV__Detail &detail)
     if (detail.__any && soap_send_text(ctx, detail.__any))
         return ctx->error;
 #define PUT_FAULT(name)                                                                                      \
-    if (detail.name && class_pointer_out(ctx, ops_of<protocol__##name>, law<protocol__##name>::xml_type, -1, \
-                                         detail.name, ""))                                                   \
+    if (detail.name && class_pointer_out(ctx, ops_of<protocol__##name>, traits<protocol__##name>::xml_type,  \
+                                         -1, detail.name, ""))                                               \
         return ctx->error;
     SOAP_DETAIL_FAULTS(PUT_FAULT)
 #undef PUT_FAULT

@@ -13,8 +13,9 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "binding/registry.h"
+#include "core/failure.h"
 #include "core/limits.h"
-#include "values/type_check.h"
+#include "values/values.h"
 #include "xml/xml_text.h"
 
 namespace binding {
@@ -89,7 +90,7 @@ bool is_reference(const soap *ctx)
 
 bool mismatch(soap *ctx)
 {
-    ctx->error = SOAP_TYPE_MISMATCH;
+    fail(ctx, SOAP_TYPE_MISMATCH);
     return false;
 }
 
@@ -208,7 +209,7 @@ void copy_text_late(soap *ctx, int, int, void *place, std::size_t, const void *s
 
 bool out_of_memory(soap *ctx)
 {
-    ctx->error = SOAP_OUT_OF_MEMORY;
+    fail(ctx, SOAP_OUT_OF_MEMORY);
     return false;
 }
 

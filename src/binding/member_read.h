@@ -16,7 +16,7 @@
 #include <zuv_client_pro/soap_memory.h>
 
 #include "binding/class_ops.h"
-#include "binding/law.h"
+#include "binding/traits.h"
 #include "binding/vector_forms.h"
 #include "core/limits.h"
 

@@ -10,8 +10,8 @@
 #include <vector>
 
 #include "binding/class_ops.h"
-#include "binding/law.h"
-#include "binding/law_binary.h"
+#include "binding/traits.h"
+#include "binding/traits_binary.h"
 
 namespace binding {
 

@@ -5,8 +5,8 @@
 
 #include <array>
 
-#include "binding/name_lookup.h"
 #include "binding/registry.h"
+#include "xml/namespace.h"
 #include "xml/tag_view.h"
 
 namespace binding {
@@ -30,9 +30,9 @@ template <std::size_t N> constexpr name_storage<N> index_of_names(const std::arr
     name_storage<N> storage;
     storage.names = names;
     for (std::size_t i = 0; i < N; ++i) {
-        const std::string_view local = name_local(names[i].name);
+        const std::string_view local = xml_local_part(names[i].name);
         std::size_t slot = tag_local_hash(local.data(), local.size()) & (name_slots(N) - 1);
-        while (storage.slots[slot] != 0 && name_local(names[storage.slots[slot] - 1U].name) != local)
+        while (storage.slots[slot] != 0 && xml_local_part(names[storage.slots[slot] - 1U].name) != local)
             slot = (slot + 1) & (name_slots(N) - 1);
         if (storage.slots[slot] == 0) {
             storage.slots[slot] = static_cast<std::uint16_t>(i + 1);

@@ -4,7 +4,7 @@
 #include <zuv_client_pro/soap_registry.h>
 
 #include "binding/registry.h"
-#include "identity/identity_apart.h"
+#include "identity/pointer_table.h"
 
 namespace binding {
 

@@ -13,8 +13,9 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "binding/envelope.h"
-#include "binding/name_lookup.h"
+#include "core/failure.h"
 #include "core/limits.h"
+#include "xml/namespace.h"
 #include "xml/tag_view.h"
 
 namespace binding {
@@ -28,11 +29,11 @@ const type_entry *type_entry_of(int type_id)
 
 int type_by_qname(soap *ctx, const name_index &index, const char *qname)
 {
-    const std::string_view local = name_local(qname);
+    const std::string_view local = xml_local_part(qname);
     std::uint32_t slot = tag_local_hash(local.data(), local.size()) & index.slot_mask;
     for (; index.slots[slot] != 0; slot = (slot + 1) & index.slot_mask) {
         std::size_t row = index.slots[slot] - 1U;
-        if (name_local(index.names[row].name) != local)
+        if (xml_local_part(index.names[row].name) != local)
             continue;
         for (;;) {
             const int error = ctx->error;
@@ -168,7 +169,7 @@ void *make_instance(soap *ctx, const type_entry &entry, int type, int count)
         return nullptr;
     instance->object = make(entry, count);
     if (!instance->object)
-        ctx->error = SOAP_OUT_OF_MEMORY;
+        fail(ctx, SOAP_OUT_OF_MEMORY);
     memory_charge(ctx, plain_size(entry) * static_cast<std::size_t>(count < 0 ? 1 : count));
     return instance->object;
 }
@@ -250,7 +251,7 @@ void soap_insert_into_vector(soap *ctx, int, int place_type, void *vector, std::
     try {
         entry->vector->store(vector, index, source);
     } catch (const std::bad_alloc &) {
-        ctx->error = SOAP_OUT_OF_MEMORY;
+        fail(ctx, SOAP_OUT_OF_MEMORY);
     }
 }
 
@@ -262,7 +263,7 @@ const char *soap_type_name(int type)
 
 int soap_type_by_name(const char *name)
 {
-    const std::string_view local = name_local(name);
+    const std::string_view local = xml_local_part(name);
     std::uint32_t slot = tag_local_hash(local.data(), local.size()) & type_index.slot_mask;
     for (; type_index.slots[slot] != 0; slot = (slot + 1) & type_index.slot_mask) {
         for (std::size_t row = type_index.slots[slot]; row != 0; row = type_index.next_same[row - 1]) {

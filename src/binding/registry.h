@@ -9,7 +9,7 @@
 #include <string_view>
 
 #include "binding/class_ops.h"
-#include "binding/law.h"
+#include "binding/traits.h"
 
 namespace binding {
 
@@ -91,6 +91,8 @@ extern const simple_ops simple_int, simple_byte, simple_unsigned_int, simple_uns
 void *read_by_type(soap *ctx, int type_id);
 // Row of an id, or null when the id names nothing.
 const type_entry *type_entry_of(int type_id);
+// Type id of a name with a prefix of the message, or 0. Leaves ctx->error alone.
+int type_by_qname(soap *ctx, const name_index &index, const char *qname);
 // Class of an xsi:type as the message spells it, or null. Leaves ctx->error alone.
 const class_ops *class_by_xsi_type(soap *ctx, const char *xsi_type);
 

@@ -5,15 +5,16 @@
 #include <cstring>
 
 #include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_identity.h>
 #include <zuv_client_pro/soap_memory.h>
+
+#include "core/failure.h"
+#include "core/memory.h"
 
 static_assert(sizeof(soap_block) % 8 == 0, "data areas are aligned to 8");
 
 static void *out_of_memory(soap *ctx)
 {
-    ctx->error = SOAP_OUT_OF_MEMORY;
-    return nullptr;
+    return fail_null(ctx, SOAP_OUT_OF_MEMORY);
 }
 
 static char *block_data(soap_block *block)
@@ -100,20 +101,20 @@ std::size_t soap_block_stack_trim(soap *ctx, soap_block_stack *stack, std::size_
 }
 
 // Copies the blocks in order of age to `place`, freeing each as it goes.
-static void gather(soap *ctx, soap_block_stack *stack, char *place, int fix_references)
+static void gather(soap *ctx, soap_block_stack *stack, char *place, block_moved moved)
 {
     char *data = soap_block_stack_first(ctx, stack);
     while (data != nullptr) {
         const std::size_t size = stack->first_block->size;
         std::memcpy(place, data, size);
-        if (fix_references != 0)
-            soap_forward_relocate(ctx, data, data + size, place, data);
+        if (moved != nullptr)
+            moved(ctx, data, data + size, place, data);
         place += size;
         data = soap_block_stack_next(ctx, stack);
     }
 }
 
-void *soap_block_stack_save(soap *ctx, soap_block_stack *stack, void *target, int fix_references)
+void *block_stack_gather(soap *ctx, soap_block_stack *stack, void *target, block_moved moved)
 {
     stack = stack_or_top(ctx, stack);
     if (stack == nullptr)
@@ -121,9 +122,9 @@ void *soap_block_stack_save(soap *ctx, soap_block_stack *stack, void *target, in
     if (target == nullptr)
         target = soap_block_alloc(ctx, stack->total_size);
     if (target == nullptr)
-        ctx->error = SOAP_OUT_OF_MEMORY;
+        fail(ctx, SOAP_OUT_OF_MEMORY);
     else if (stack->total_size > 0)
-        gather(ctx, stack, static_cast<char *>(target), fix_references);
+        gather(ctx, stack, static_cast<char *>(target), moved);
     soap_block_stack_drop(ctx, stack);
     return target;
 }

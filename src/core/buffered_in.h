@@ -1,4 +1,5 @@
-// buffered_in.h - the stages of input that other rooms of the engine and the head reader step into.
+// buffered_in.h - the stages of input that decompression, attachments, the head reader and exchange step
+// into.
 //
 // Elsewhere: what readers call (soap_io.h).
 #pragma once
@@ -17,3 +18,11 @@ int soap_recv_deliver(soap *ctx);
 // A head reader that drops an error's body calls it itself. Once for each message. Returns 0; with no body 14
 // if the status is 200, otherwise the status, or -1 if that is 0; 20; 22; 31.
 int soap_body_open(soap *ctx);
+
+// Ends the body: the end of the compressed stream is checked, chunks are read to the last one.
+// ctx->response_unfinished is cleared if that was all of the message. SOAP_OK, SOAP_HEADER_LINE,
+// SOAP_ZLIB_ERROR.
+int body_close(soap *ctx);
+
+// The next byte, which stays the next one; -1 at the end of input.
+std::int32_t input_peek_byte(soap *ctx);

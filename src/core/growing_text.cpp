@@ -7,6 +7,8 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_memory.h>
 
+#include "core/failure.h"
+
 static constexpr std::size_t CAPACITY_AT_START = 256; // bytes
 
 static std::size_t capacity_for(const soap *ctx, std::size_t needed)
@@ -20,14 +22,14 @@ static std::size_t capacity_for(const soap *ctx, std::size_t needed)
 int soap_text_buffer_reserve(soap *ctx, std::size_t room)
 {
     if (room > SIZE_MAX - ctx->label_index)
-        return ctx->error = SOAP_OUT_OF_MEMORY;
+        return fail(ctx, SOAP_OUT_OF_MEMORY);
     const std::size_t needed = ctx->label_index + room;
     if (needed <= ctx->label_size)
         return SOAP_OK;
     const std::size_t capacity = capacity_for(ctx, needed);
     auto *area = static_cast<char *>(SOAP_MALLOC(ctx, capacity));
     if (area == nullptr)
-        return ctx->error = SOAP_OUT_OF_MEMORY;
+        return fail(ctx, SOAP_OUT_OF_MEMORY);
     if (ctx->label_index > 0)
         std::memcpy(area, ctx->label_buffer, ctx->label_index);
     SOAP_FREE(ctx, ctx->label_buffer);

@@ -9,6 +9,7 @@
 #include <zuv_client_pro/soap_memory.h>
 
 #include "core/buffered_in.h"
+#include "core/failure.h"
 #include "core/raw_in.h"
 #include "core/zlib_common.h"
 
@@ -18,7 +19,7 @@ constexpr int STREAM_ENDED = -1;
 constexpr int RAW_ENDED = 1;
 constexpr int AGAIN = -2; // nothing came out yet
 
-int fail(soap *ctx)
+int fail_to_inflate(soap *ctx)
 {
     ctx->framing_doubtful = true;
     ctx->buffer_index = ctx->buffer_length = 0;
@@ -67,11 +68,11 @@ int inflate_once(soap *ctx)
     stream->avail_out = SOAP_BUFFER_SIZE;
     const int result = inflate(stream, Z_NO_FLUSH);
     if (result == Z_NEED_DICT)
-        return ctx->zlib_dictionary != nullptr && set_dictionary(ctx) == Z_OK ? AGAIN : fail(ctx);
+        return ctx->zlib_dictionary != nullptr && set_dictionary(ctx) == Z_OK ? AGAIN : fail_to_inflate(ctx);
     if (result == Z_BUF_ERROR && stream->avail_in == 0)
         return AGAIN; // it wants more input
     if (result != Z_OK && result != Z_STREAM_END)
-        return fail(ctx);
+        return fail_to_inflate(ctx);
     ctx->buffer_index = 0;
     ctx->buffer_length = SOAP_BUFFER_SIZE - stream->avail_out;
     if (ctx->zlib_in == ENCODING_GZIP)
@@ -82,7 +83,7 @@ int inflate_once(soap *ctx)
         return SOAP_OK;
     if (result == Z_STREAM_END)
         return STREAM_ENDED;
-    return stream->avail_in == available ? fail(ctx) : AGAIN;
+    return stream->avail_in == available ? fail_to_inflate(ctx) : AGAIN;
 }
 
 bool trailer_number_is(soap *ctx, unsigned long expected)
@@ -94,7 +95,7 @@ bool trailer_number_is(soap *ctx, unsigned long expected)
     return true;
 }
 
-// Whatever came of the stream, the raw bytes behind it are read as they are from here on. Result of
+// Whatever came of the stream, the raw bytes after it are read as they are from here on. Result of
 // inflateEnd.
 int leave_stream(soap *ctx)
 {
@@ -119,7 +120,7 @@ int soap_inflate_begin(soap *ctx, int window_bits)
     stream->next_in = nullptr;
     stream->avail_in = 0;
     if (inflateInit2(stream, window_bits) != Z_OK)
-        return fail(ctx);
+        return fail_to_inflate(ctx);
     ctx->zlib_state = ZLIB_INFLATING;
     ctx->mode |= MODE_DEFLATE;
     ctx->zlib_crc = crc32(0, nullptr, 0);
@@ -130,7 +131,7 @@ int soap_inflate_begin(soap *ctx, int window_bits)
     stream->avail_out = SOAP_BUFFER_SIZE;
     // A stream with a zlib head asks for its dictionary; a raw one cannot.
     if (window_bits < 0 && ctx->zlib_dictionary != nullptr && set_dictionary(ctx) != Z_OK)
-        return fail(ctx);
+        return fail_to_inflate(ctx);
     return SOAP_OK;
 }
 
@@ -145,7 +146,7 @@ int soap_inflate_begin_deflate(soap *ctx, std::uint8_t first)
     if (soap_inflate_begin(ctx, has_zlib_head ? ZLIB_WRAPPED : ZLIB_RAW) != SOAP_OK)
         return ctx->error;
     if (inflatePrime(ctx->zlib_stream, 8, first) != Z_OK)
-        return fail(ctx);
+        return fail_to_inflate(ctx);
     ctx->zlib_stream->total_in = 1;
     return SOAP_OK;
 }
@@ -174,7 +175,7 @@ int soap_inflate_refill(soap *ctx)
 int soap_inflate_finish(soap *ctx)
 {
     if (ctx->zlib_state != ZLIB_INFLATING)
-        return fail(ctx);
+        return fail_to_inflate(ctx);
     int result;
     do
         result = soap_inflate_refill(ctx);
@@ -184,9 +185,9 @@ int soap_inflate_finish(soap *ctx)
     const bool left = leave_stream(ctx) == Z_OK;
     if (!left || result == RAW_ENDED ||
         (result == STREAM_ENDED && gzip && !trailer_is_right(ctx, plain_length)))
-        result = fail(ctx);
+        result = fail_to_inflate(ctx);
     ctx->zlib_in = 0;
     if (ctx->exceeded != nullptr) // what the stream lacks is what nobody wanted to receive
-        return ctx->error = SOAP_LENGTH;
-    return result == STREAM_ENDED ? SOAP_OK : ctx->error = result;
+        return fail(ctx, SOAP_LENGTH);
+    return result == STREAM_ENDED ? SOAP_OK : fail(ctx, result);
 }

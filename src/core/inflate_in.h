@@ -14,10 +14,10 @@ int soap_inflate_begin(soap *ctx, int window_bits);
 // The same for a deflate body, whose first byte was read: some senders leave the zlib head and trailer away.
 int soap_inflate_begin_deflate(soap *ctx, std::uint8_t first);
 
-// Fills `buffer` with plain bytes. 0 with at least one byte; -1 behind the end of the stream; 1 if the input
+// Fills `buffer` with plain bytes. 0 with at least one byte; -1 after the end of the stream; 1 if the input
 // ended before; 22; 31; or the result of on_recv_prepare.
 int soap_inflate_refill(soap *ctx);
 
-// Drops the rest of the stream, ends it and checks the gzip trailer. The raw bytes behind it are in `buffer`
+// Drops the rest of the stream, ends it and checks the gzip trailer. The raw bytes after it are in `buffer`
 // then. 0, 22, 31 (also for a stream cut short), or the result of on_recv_prepare.
 int soap_inflate_finish(soap *ctx);

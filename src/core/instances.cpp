@@ -1,7 +1,7 @@
 // instances.cpp - objects of classes that a context owns, each with the function that destroys it.
 //
 // Elsewhere: blocks without a destructor, and taking objects out of management (managed_blocks.cpp).
-#include "core/instances.h"
+#include "core/memory.h"
 
 #include <cstdio>
 
@@ -9,6 +9,7 @@
 #include <zuv_client_pro/soap_memory.h>
 
 #include "core/context_state.h"
+#include "core/failure.h"
 #include "core/limits.h"
 #include "core/tracking.h"
 
@@ -27,10 +28,8 @@ static soap_instance *enter_instance(soap *ctx, void *object, int type_id, int a
 enter_in_new_slab(soap *ctx, void *object, int type_id, int array_size, int (*hook)(soap_instance *instance))
 {
     soap_memory_pools *pools = memory_pools(ctx);
-    if (pools == nullptr || !pools->instances.reserve(1)) {
-        ctx->error = SOAP_OUT_OF_MEMORY;
-        return nullptr;
-    }
+    if (pools == nullptr || !pools->instances.reserve(1))
+        return fail_null(ctx, SOAP_OUT_OF_MEMORY);
     return enter_instance(ctx, object, type_id, array_size, hook);
 }
 

@@ -6,11 +6,12 @@
 
 #include <zuv_client_pro/soap_error.h>
 
+#include "core/failure.h"
 #include "core/raw_in.h"
 
 namespace {
 
-// Bytes at hand that belong to no XML: those behind the length that the head told, and where attachments may
+// Bytes at hand that belong to no XML: those after the length that the head told, and where attachments may
 // follow, those that nobody has looked at yet.
 std::uint64_t beside_xml(const soap *ctx)
 {
@@ -41,7 +42,7 @@ bool counting(const soap *ctx)
     return (ctx->mode & MODE_COUNTING) != 0;
 }
 
-// Bytes of the message ahead of the present place.
+// Bytes of the message before the present place.
 std::uint64_t output_place(const soap *ctx)
 {
     if (counting(ctx))
@@ -73,13 +74,13 @@ int limit_exceeded(soap *ctx, const char *name, std::uint64_t value)
     ctx->exceeded = name;
     ctx->exceeded_value = value;
     ctx->response_unfinished = true;
-    return ctx->error = SOAP_LENGTH;
+    return fail(ctx, SOAP_LENGTH);
 }
 
 int input_limits_check(soap *ctx)
 {
     if (ctx->exceeded != nullptr)
-        return ctx->error = SOAP_LENGTH;
+        return fail(ctx, SOAP_LENGTH);
     const std::uint64_t received = xml_received(ctx);
     if (ctx->max_message != 0 && received > ctx->max_message && received - beside_xml(ctx) > ctx->max_message)
         return limit_exceeded(ctx, "max_message", ctx->max_message);

@@ -4,6 +4,7 @@
 // A block is one tracked allocation: the user's bytes, padding, a 16-bit canary, a trailer. The user's bytes
 // and the canary span a multiple of 8, so the trailer is aligned and an overrun meets the canary before the
 // trailer. Elsewhere: objects with a destructor (instances.cpp), the tracking below (tracking.cpp).
+#include <algorithm>
 #include <cstdio>
 #include <cstring>
 
@@ -12,9 +13,10 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_memory.h>
 
-#include "core/context_fields.h"
 #include "core/context_state.h"
+#include "core/failure.h"
 #include "core/limits.h"
+#include "core/memory.h"
 #include "core/tracking.h"
 
 struct soap_block_trailer {
@@ -39,7 +41,7 @@ static char *canary_place(soap_block_trailer *trailer)
 static int corruption(soap *ctx)
 {
     std::fprintf(stderr, "Data corruption in dynamic allocation (see logs)\n");
-    return ctx->error = SOAP_CORRUPTION;
+    return fail(ctx, SOAP_CORRUPTION);
 }
 
 // 0, or error 21 for a block whose end was overwritten.
@@ -62,14 +64,13 @@ static void free_block(soap *ctx, soap_block_trailer *trailer)
         if (track_is_secret(trailer->entry))
             OPENSSL_cleanse(block_start(trailer), trailer->span - sizeof CANARY);
         track_free(ctx, trailer->entry);
-    } else // let the table name it
+    } else // damaged: tracking reports the address
         SOAP_FREE(ctx, block_start(trailer));
 }
 
 static void *out_of_memory(soap *ctx)
 {
-    ctx->error = SOAP_OUT_OF_MEMORY;
-    return nullptr;
+    return fail_null(ctx, SOAP_OUT_OF_MEMORY);
 }
 
 void *soap_block_alloc(soap *ctx, std::size_t size)
@@ -98,17 +99,26 @@ void *soap_block_alloc(soap *ctx, std::size_t size)
     return start;
 }
 
+void credentials_wipe(soap *ctx)
+{
+    if (!ctx->credentials_passed)
+        return;
+    ctx->credentials_passed = false;
+    OPENSSL_cleanse(ctx->scratch_text, sizeof ctx->scratch_text);
+    const bool sending = ctx->buffer_index > ctx->buffer_length;
+    const std::size_t kept_from = sending ? 0 : ctx->buffer_index;
+    const std::size_t filled = sending ? ctx->buffer_index : ctx->buffer_length;
+    const std::size_t kept_to = std::max(filled, ctx->chunk_buffer_length);
+    OPENSSL_cleanse(ctx->buffer, kept_from);
+    OPENSSL_cleanse(ctx->buffer + kept_to, sizeof ctx->buffer - kept_to);
+}
+
 // The fields whose values live in managed blocks.
 static void forget_managed_fields(soap *ctx)
 {
-    ctx->http_content = nullptr;
-    ctx->action = nullptr;
-    ctx->fault = nullptr;
-    ctx->header = nullptr;
-    ctx->auth_user = nullptr;
-    ctx->auth_password = nullptr;
-    ctx->auth_realm = nullptr;
-    ctx->forwarded_for = nullptr;
+#define FIELD_FORGOTTEN(name) ctx->name = nullptr;
+    CONTEXT_MANAGED_FIELDS(FIELD_FORGOTTEN)
+#undef FIELD_FORGOTTEN
     ctx->output_mode &= ~MODE_MIME;
     ctx->dime.id = ctx->dime.type = ctx->dime.options = nullptr;
     ctx->dime.list = ctx->dime.first = ctx->dime.last = nullptr;
@@ -123,7 +133,7 @@ static void free_all_blocks(soap *ctx)
         __builtin_prefetch(trailer->next); // blocks are scattered: the next one comes while this one goes
         free_block(ctx, trailer);
     }
-    context_credentials_wipe(ctx);
+    credentials_wipe(ctx);
     forget_managed_fields(ctx); // after a damaged block too: what they point to may be gone
 }
 

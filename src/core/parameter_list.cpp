@@ -4,7 +4,7 @@
 //
 //   list  = item *( ("," / ";") item )
 //   item  = name [ "=" value ]
-//   value = '"' characters '"' / characters; between quotes a backslash may stand ahead of a quote or
+//   value = '"' characters '"' / characters; between quotes a backslash may stand before a quote or
 //   backslash
 #include <cstddef>
 #include <cstring>
@@ -12,16 +12,9 @@
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_xml.h>
 
-namespace {
+#include "core/hex_digit.h"
 
-bool is_hex(char c)
-{
-    return (c >= '0' && c <= '9') || (c >= 'A' && c <= 'F') || (c >= 'a' && c <= 'f');
-}
-unsigned hex_value(char c)
-{
-    return c <= '9' ? static_cast<unsigned>(c - '0') : (c & 7U) + 9U;
-}
+namespace {
 
 const char *skip_blanks(const char *text)
 {
@@ -38,8 +31,8 @@ const char *copy_plain(const char *text, const char *stops, char *target)
     std::size_t kept = 0; // length without the blanks at the end
     while (*text != '\0' && std::strchr(stops, *text) == nullptr) {
         char c = *text++;
-        if (c == '%' && is_hex(text[0]) && is_hex(text[1])) {
-            c = static_cast<char>(hex_value(text[0]) << 4 | hex_value(text[1]));
+        if (c == '%' && hex_digit(text[0]) >= 0 && hex_digit(text[1]) >= 0) {
+            c = static_cast<char>(hex_digit(text[0]) * 16 + hex_digit(text[1]));
             text += 2;
         }
         if (length == SOAP_TEXT_SIZE - 1)
@@ -52,7 +45,7 @@ const char *copy_plain(const char *text, const char *stops, char *target)
     return text;
 }
 
-// As above, for what stands between double quotes; `text` is behind the first. A missing second quote is the
+// As above, for what stands between double quotes; `text` is after the first. A missing second quote is the
 // end.
 const char *copy_quoted(const char *text, char *target)
 {

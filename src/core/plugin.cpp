@@ -7,12 +7,14 @@
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_plugin.h>
 
+#include "core/failure.h"
+
 int soap_register_plugin_arg(soap *ctx, int (*create)(soap *ctx, soap_plugin_record *record, void *argument),
                              void *argument)
 {
     auto *record = static_cast<soap_plugin_record *>(SOAP_MALLOC(ctx, sizeof(soap_plugin_record)));
     if (record == nullptr)
-        return ctx->error = SOAP_OUT_OF_MEMORY;
+        return fail(ctx, SOAP_OUT_OF_MEMORY);
     *record = {};
     const int result = create(ctx, record, argument);
     if (result != SOAP_OK || record->delete_hook == nullptr) {

@@ -8,6 +8,8 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_io.h>
 
+#include "core/failure.h"
+
 namespace {
 
 // A blank or a tab at the head of the next line folds it onto the one just read.
@@ -24,7 +26,7 @@ bool next_line_is_folded(soap *ctx)
 int end_of_input(soap *ctx)
 {
     if (ctx->error == SOAP_OK)
-        ctx->error = SOAP_EOF;
+        fail(ctx, SOAP_EOF);
     return ctx->error;
 }
 
@@ -82,7 +84,7 @@ int soap_recv_line(soap *ctx, char *text, std::size_t size)
                 return SOAP_OK;
         } else if (left == 0) {
             *end = '\0';
-            return ctx->error = SOAP_HEADER_LINE;
+            return fail(ctx, SOAP_HEADER_LINE);
         }
     }
 }

@@ -7,7 +7,7 @@
 
 namespace {
 
-// ASCII only: the outcome must not hang on the host's locale.
+// ASCII only: the outcome must not depend on the host's locale.
 char lower(char c)
 {
     return c >= 'A' && c <= 'Z' ? static_cast<char>(c + ('a' - 'A')) : c;
@@ -27,21 +27,21 @@ bool at_end(const char *text)
 
 int soap_tag_match(const char *text, const char *pattern)
 {
-    const char *behind_star = nullptr; // pattern behind the last "*" met
-    const char *run_end = nullptr;     // text that this "*" doesn't cover yet
+    const char *after_star = nullptr; // pattern after the last "*" met
+    const char *run_end = nullptr;    // text that this "*" doesn't cover yet
     if (text == nullptr || pattern == nullptr)
         return 1;
     while (!at_end(text)) {
         if (*pattern == '*') {
-            behind_star = ++pattern;
+            after_star = ++pattern;
             run_end = text;
             if (*pattern == '\0')
                 return 0;
         } else if (*pattern == '-' || (*pattern != '\0' && same_letter(*text, *pattern))) {
             ++text;
             ++pattern;
-        } else if (behind_star != nullptr) {
-            pattern = behind_star;
+        } else if (after_star != nullptr) {
+            pattern = after_star;
             text = ++run_end;
         } else {
             return 1;

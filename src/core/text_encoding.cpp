@@ -1,6 +1,8 @@
 // text_encoding.cpp - see text_encoding.h.
 #include "core/text_encoding.h"
 
+#include "core/failure.h"
+
 #include <algorithm>
 #include <cstdio>
 
@@ -66,6 +68,6 @@ int text_encoding_refuse(soap *ctx, std::string_view name)
     std::snprintf(text, sizeof text, "The encoding '%s' is not read: send UTF-8, ISO-8859-1 or windows-1252",
                   shown);
     if (const char *const copy = soap_string_dup(ctx, text))
-        soap_fault_sender(ctx, copy, nullptr, SOAP_UTF_ERROR);
-    return ctx->error = SOAP_UTF_ERROR;
+        fail_as_sender(ctx, copy, nullptr, SOAP_UTF_ERROR);
+    return fail(ctx, SOAP_UTF_ERROR);
 }

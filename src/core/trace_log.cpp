@@ -4,6 +4,8 @@
 // Always: nothing here fails a message; a file that can't be opened is tried again at the next write.
 #include "core/trace_log.h"
 
+#include "core/failure.h"
+
 #include <cstring>
 #include <fcntl.h>
 #include <new>
@@ -39,7 +41,7 @@ static int set_path(soap *ctx, int channel, const char *path, std::size_t length
     SOAP_FREE(ctx, ctx->log_paths[channel]);
     ctx->log_paths[channel] = copy;
     if (path != nullptr && copy == nullptr)
-        return ctx->error = SOAP_OUT_OF_MEMORY;
+        return fail(ctx, SOAP_OUT_OF_MEMORY);
     return SOAP_OK;
 }
 

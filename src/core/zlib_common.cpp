@@ -1,6 +1,8 @@
 // zlib_common.cpp - see zlib_common.h.
 #include "core/zlib_common.h"
 
+#include "core/failure.h"
+
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_memory.h>
 
@@ -10,7 +12,7 @@ int soap_zlib_prepare(soap *ctx)
     if (ctx->zlib_buffer == nullptr)
         ctx->zlib_buffer = static_cast<char *>(SOAP_MALLOC(ctx, SOAP_BUFFER_SIZE));
     if (ctx->zlib_stream == nullptr || ctx->zlib_buffer == nullptr)
-        return ctx->error = SOAP_OUT_OF_MEMORY;
+        return fail(ctx, SOAP_OUT_OF_MEMORY);
     return SOAP_OK;
 }
 
@@ -30,5 +32,5 @@ int soap_zlib_fail(soap *ctx)
 {
     if (ctx->zlib_stream != nullptr)
         ctx->zlib_stream->next_out = nullptr;
-    return ctx->error = SOAP_ZLIB_ERROR;
+    return fail(ctx, SOAP_ZLIB_ERROR);
 }

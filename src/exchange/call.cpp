@@ -1,4 +1,5 @@
-// call.cpp - the cycle of an operation: mark, count, connect, send, receive, release.
+// call.cpp - the cycle of a call: mark, count, connect, send, receive, release; and what all proxies have in
+// common.
 //
 // Always: until the connection is asked for, a failure returns at once and leaves a kept connection alone,
 // but for a message that is too large; from there on every way out releases the connection.
@@ -7,7 +8,6 @@
 #include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_identity.h>
 #include <zuv_client_pro/soap_io.h>
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_tcp.h>
@@ -15,33 +15,48 @@
 
 #include "attachments/attachment_list.h"
 #include "binding/envelope.h"
-
-namespace proxies {
+#include "binding/registry.h"
+#include "core/failure.h"
 
 namespace {
 
-int write_message(soap *ctx, const operation &op, const void *request)
+// What an operation puts into the Body, or expects there.
+struct body_part {
+    const char *element;
+    const binding::class_ops *ops;
+};
+
+// Of a request's or response's record; no element if the id is of none.
+body_part part_of(int record, binding::type_kind kind)
+{
+    const binding::type_entry *const entry = binding::type_entry_of(record);
+    if (entry == nullptr || entry->kind != kind)
+        return {nullptr, nullptr};
+    return {entry->element, binding::type_entry_of(entry->item)->ops};
+}
+
+int write_message(soap *ctx, const body_part &body, const void *request)
 {
     if (soap_envelope_out_begin(ctx) || soap_header_put(ctx) || soap_body_out_begin(ctx) ||
-        binding::class_pointer_out(ctx, *op.request, op.request_element, -1, request, "") ||
-        soap_body_out_end(ctx) || soap_envelope_out_end(ctx))
+        binding::class_pointer_out(ctx, *body.ops, body.element, -1, request, "") || soap_body_out_end(ctx) ||
+        soap_envelope_out_end(ctx))
         return ctx->error;
     return 0;
 }
 
-int count_message(soap *ctx, const operation &op, const void *request)
+int count_message(soap *ctx, const body_part &body, const void *request)
 {
     if (soap_count_begin(ctx))
         return ctx->error;
-    if ((ctx->mode & MODE_COUNTING) && write_message(ctx, op, request))
+    if ((ctx->mode & MODE_COUNTING) && write_message(ctx, body, request))
         return ctx->error;
     return soap_count_end(ctx);
 }
 
-int send_message(soap *ctx, const char *endpoint, const char *action, const operation &op,
+int send_message(soap *ctx, const char *endpoint, const char *action, const body_part &body,
                  const void *request)
 {
-    if (soap_server_connect(ctx, endpoint, action) || write_message(ctx, op, request))
+    if (soap_server_connect(ctx, endpoint, action) || write_message(ctx, body, request))
         return ctx->error;
     return soap_send_finish(ctx);
 }
@@ -69,13 +84,12 @@ int begin_response(soap *ctx)
 }
 
 // Reads the response out of the Body. The error stays in the context when it isn't there.
-void read_response(soap *ctx, const operation &op, void **result)
+void read_response(soap *ctx, const body_part &body, void **result)
 {
-    soap_object_register(ctx, "", result, op.response_id, sizeof *result, 0, nullptr, nullptr, nullptr);
     bool wanted = true, seen = false;
     for (;;) {
-        ctx->error = SOAP_TAG_MISMATCH;
-        if (wanted && binding::class_pointer_in(ctx, *op.response, op.response_element, result)) {
+        fail(ctx, SOAP_TAG_MISMATCH);
+        if (wanted && binding::class_pointer_in(ctx, *body.ops, body.element, result)) {
             wanted = false;
             seen = true;
             continue;
@@ -101,35 +115,63 @@ int end_response(soap *ctx)
     return soap_receive_finish(ctx);
 }
 
+// soap_call, but for what becomes of *response in a failure: it is left alone until a response is awaited.
+int run_call(soap *ctx, const char *endpoint, const char *action, const soap_operation &operation,
+             const void *request, void **response)
+{
+    const body_part sent = part_of(operation.request, binding::type_kind::request);
+    const body_part expected = part_of(operation.response, binding::type_kind::response);
+    ctx->encoding_style = nullptr;
+    soap_reset_call(ctx);
+    if (!sent.element || !expected.element)
+        return fail(ctx, SOAP_NO_METHOD);
+    if (soap_endpoint_check(ctx, endpoint))
+        return ctx->error;
+    soap_mark_header(ctx);
+    binding::class_pointer_mark(ctx, *sent.ops, request);
+    if (count_message(ctx, sent, request)) {
+        attachments_forget(ctx); // they belong to this call, as they do when it fails later
+        return ctx->exceeded != nullptr ? soap_socket_release(ctx) : ctx->error;
+    }
+    if (send_message(ctx, endpoint, action ? action : "", sent, request) || !response)
+        return soap_socket_release(ctx);
+    *response = nullptr;
+    if (begin_response(ctx))
+        return soap_socket_release(ctx);
+    read_response(ctx, expected, response);
+    if (ctx->error)
+        return soap_fault_receive(ctx, 0);
+    end_response(ctx);
+    return soap_socket_release(ctx);
+}
+
 } // namespace
 
-int call(soap *ctx, const char *&proxy_endpoint, const char *default_endpoint, const operation &op,
-         const char *endpoint, const char *action, const void *request, void **result)
+int soap_call(soap *ctx, const char *endpoint, const char *action, const soap_operation &operation,
+              const void *request, void **response)
+{
+    if (response)
+        *response = nullptr;
+    const int error = run_call(ctx, endpoint, action, operation, request, response);
+    if (error && response)
+        *response = nullptr;
+    return error;
+}
+
+// ---------------------------------------------------------------------------------------------
+// Proxies.
+
+namespace proxies {
+
+int call(soap *ctx, const char *&proxy_endpoint, const char *default_endpoint,
+         const soap_operation &operation, const char *endpoint, const char *action, const void *request,
+         void **result)
 {
     if (endpoint)
         proxy_endpoint = endpoint;
     if (!proxy_endpoint)
         proxy_endpoint = default_endpoint;
-    ctx->encoding_style = nullptr;
-    soap_reset_call(ctx);
-    if (soap_endpoint_check(ctx, proxy_endpoint))
-        return ctx->error;
-    soap_mark_header(ctx);
-    binding::class_pointer_mark(ctx, *op.request, request);
-    if (count_message(ctx, op, request)) {
-        attachments_forget(ctx); // they belong to this call, as they do when it fails later
-        return ctx->exceeded != nullptr ? soap_socket_release(ctx) : ctx->error;
-    }
-    if (send_message(ctx, proxy_endpoint, action ? action : "", op, request) || !result)
-        return soap_socket_release(ctx);
-    *result = nullptr;
-    if (begin_response(ctx))
-        return soap_socket_release(ctx);
-    read_response(ctx, op, result);
-    if (ctx->error)
-        return soap_fault_receive(ctx, 0);
-    end_response(ctx);
-    return soap_socket_release(ctx);
+    return run_call(ctx, proxy_endpoint, action, operation, request, result);
 }
 
 void *record_or(void *record, void *stand_in)

@@ -1,33 +1,23 @@
-// call.h - the cycle of an operation, and what all proxies have in common.
+// call.h - what all proxies have in common.
 //
-// Here: declarations that the generated proxies and wrapper records are written against. Elsewhere: the
-// operations' names and types (generated from the contract), the engine below.
+// Here: declarations that the generated proxies are written against. Elsewhere: the cycle of a call
+// (soap_call.h), the operations' names and types (generated from the contract).
 #pragma once
 
 #include <iosfwd>
 
-#include <zuv_client_pro/soap.h>
-
-#include "binding/class_ops.h"
+#include <zuv_client_pro/soap_call.h>
 
 class protocol__Header;
 
 namespace proxies {
 
-// What one operation puts on the wire and expects back.
-struct operation {
-    const char *request_element; // "protocolProfile:setRequest"
-    const binding::class_ops *request;
-    const char *response_element; // "protocolProfile:setResponse"
-    const binding::class_ops *response;
-    int response_id; // type id of the response record
-};
-
 // One call. `proxy_endpoint` is the proxy's own endpoint, set by the call when `endpoint` or the default
 // fills it. `request` may be null; `result` is the response record's pointer, null for a call that reads no
 // answer. 0, or the error that stands in the context.
-int call(soap *ctx, const char *&proxy_endpoint, const char *default_endpoint, const operation &op,
-         const char *endpoint, const char *action, const void *request, void **result);
+int call(soap *ctx, const char *&proxy_endpoint, const char *default_endpoint,
+         const soap_operation &operation, const char *endpoint, const char *action, const void *request,
+         void **result);
 
 // Stands for the response record of a call that has none: a null reference, which the host's one-way call is
 // told by, can't be handed on as a reference. Never written.

@@ -1,6 +1,6 @@
-// context.cpp - life of a context: defaults, the reset ahead of a call, release at its end, the end itself.
+// context.cpp - life of a context: defaults, the reset before a call, release at its end, the end itself.
 //
-// Elsewhere: copies (context_copy.cpp), the list of callbacks (callbacks.cpp), the release of each kind of
+// Elsewhere: copies (context_copy.cpp), what becomes of each field (context.h), the release of each kind of
 // memory (managed_blocks.cpp, instances.cpp, tracking.cpp). Always: every release operation does nothing on a
 // context that has ended.
 #include <algorithm>
@@ -14,6 +14,7 @@
 #include <zlib.h>
 
 #include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_identity.h>
 #include <zuv_client_pro/soap_log.h>
 #include <zuv_client_pro/soap_memory.h>
@@ -22,42 +23,56 @@
 #include <zuv_client_pro/soap_tls.h>
 #include <zuv_client_pro/soap_xml.h>
 
-#include "core/context_fields.h"
 #include "core/context_state.h"
-#include "core/instances.h"
-#include "core/scratch.h"
+#include "core/memory.h"
 #include "core/trace_log.h"
 #include "core/tracking.h"
-#include "exchange/callbacks.h"
+#include "exchange/context.h"
+#include "exchange/fault.h"
 #include "xml/attributes.h"
 
 // ---------------------------------------------------------------------------------------------
 // Start.
 
-void context_tables_clear(soap *ctx)
+// Every field has a row: this doesn't compile if there are more or fewer rows than fields, or a name stands
+// twice.
+[[maybe_unused]] static void every_field_has_a_row(const soap &ctx)
 {
-    std::memset(ctx->id_table, 0, sizeof ctx->id_table);
-    ctx->id_count = 0;
-    ctx->id_index = nullptr;
-    std::memset(ctx->pointer_table, 0, sizeof ctx->pointer_table);
-    ctx->pointer_chains = ctx->pointer_table;
-    ctx->pointer_chain_mask = SOAP_POINTER_HASH_SIZE - 1;
-    ctx->pointer_count = 0;
-    ctx->pointer_blocks = nullptr;
-    ctx->pointer_block_used = 0;
+#define FIELD_NAME(name, fate, value) , name##_
+#define MANAGED_FIELD_NAME(name)      , name##_
+    [[maybe_unused]] const auto &[state_ CONTEXT_MANAGED_FIELDS(MANAGED_FIELD_NAME)
+                                      CONTEXT_FIELDS(FIELD_NAME)] = ctx;
+#undef MANAGED_FIELD_NAME
+#undef FIELD_NAME
 }
 
-void context_fields_clear(soap *ctx)
+void context_tables_clear(soap *ctx)
 {
-    // Ends behind the last field and not at sizeof(soap): a derived class may use the padding there.
-    char *first = reinterpret_cast<char *>(ctx) +
-                  (reinterpret_cast<char *>(&ctx->state) - reinterpret_cast<char *>(ctx));
-    const char *end = reinterpret_cast<const char *>(&ctx->zlib_ratio_out) + sizeof ctx->zlib_ratio_out;
-    std::memset(first, 0, static_cast<std::size_t>(end - first));
-    ctx->master_socket = -1;
-    ctx->socket = -1;
+    ctx->pointer_chains = ctx->pointer_table;
+    ctx->pointer_chain_mask = SOAP_POINTER_HASH_SIZE - 1;
     track_table_clear(ctx);
+}
+
+void context_fields_reset(soap *ctx)
+{
+    ctx->state = 0;
+#define MANAGED_FIELD_DEFAULT(name) ctx->name = nullptr;
+    CONTEXT_MANAGED_FIELDS(MANAGED_FIELD_DEFAULT)
+#undef MANAGED_FIELD_DEFAULT
+#define FIELD_DEFAULT(name, fate, value) field_reset(ctx->name, value);
+    CONTEXT_FIELDS(FIELD_DEFAULT)
+#undef FIELD_DEFAULT
+    ctx->path[0] = '/';
     context_tables_clear(ctx);
+}
+
+void callbacks_set_defaults(soap *ctx)
+{
+#define CALLBACK_DEFAULT(name, fate, value)                                                                  \
+    if constexpr (field_fate::fate == field_fate::CALLBACK)                                                  \
+        field_reset(ctx->name, value);
+    CONTEXT_FIELDS(CALLBACK_DEFAULT)
+#undef CALLBACK_DEFAULT
 }
 
 void context_zlib_make(soap *ctx)
@@ -67,53 +82,12 @@ void context_zlib_make(soap *ctx)
         std::memset(ctx->zlib_stream, 0, sizeof(z_stream));
 }
 
-void context_credentials_wipe(soap *ctx)
-{
-    if (!ctx->credentials_passed)
-        return;
-    ctx->credentials_passed = false;
-    OPENSSL_cleanse(ctx->scratch_text, sizeof ctx->scratch_text);
-    const bool sending = ctx->buffer_index > ctx->buffer_length;
-    const std::size_t kept_from = sending ? 0 : ctx->buffer_index;
-    const std::size_t filled = sending ? ctx->buffer_index : ctx->buffer_length;
-    const std::size_t kept_to = std::max(filled, ctx->chunk_buffer_length);
-    OPENSSL_cleanse(ctx->buffer, kept_from);
-    OPENSSL_cleanse(ctx->buffer + kept_to, sizeof ctx->buffer - kept_to);
-}
-
-// The fields whose default is not zero, null or empty.
-static void set_field_defaults(soap *ctx)
-{
-    ctx->float_format = "%.9G";
-    ctx->double_format = "%.17lG";
-    ctx->dime_id_format = "cid:id%d";
-    ctx->http_version = "1.1";
-    ctx->encoding_style = "";
-    ctx->language = "en";
-    ctx->namespaces = soap_program_namespaces;
-    ctx->send_fd = 1;
-    ctx->recv_fd = 0;
-    ctx->max_depth = SOAP_MAX_DEPTH;
-    ctx->max_message = SOAP_MAX_MESSAGE;
-    ctx->max_memory = SOAP_MAX_MEMORY;
-    ctx->path[0] = '/';
-    ctx->keep_alive_limit = 100;
-    ctx->proxy_http_version = "1.0";
-    ctx->proxy_port = 8080;
-    ctx->zlib_level = 6;
-    ctx->tls_flags = TLS_VERIFY_PEER;
-    ctx->tls_setup = tls_context_setup;
-    ctx->tls_verify = tls_verify_plain;
-    ctx->message_part = PART_OUTSIDE;
-}
-
 void soap_context_init(soap *ctx)
 {
-    context_fields_clear(ctx);
+    context_fields_reset(ctx);
     ctx->state = 1;
+    ctx->namespaces = soap_program_namespaces;
     trace_log_set_defaults(ctx);
-    callbacks_set_defaults(ctx);
-    set_field_defaults(ctx);
     context_zlib_make(ctx);
     tls_global_init();
     ctx->error = SOAP_OK;
@@ -155,6 +129,25 @@ soap *soap_context_create(std::uint32_t input_mode, std::uint32_t output_mode)
 // ---------------------------------------------------------------------------------------------
 // Between calls.
 
+void soap_element_state_reset(soap *ctx)
+{
+    ctx->in_cdata = 0;
+    ctx->has_body = 0;
+    ctx->position_count = 0;
+    ctx->encoding_flag = 0;
+    ctx->must_understand = 0;
+    ctx->null_flag = 0;
+    ctx->namespace_state = 0;
+    ctx->attributes_set = 0;
+    ctx->peeked = 0;
+    ctx->other_flag = 0;
+    ctx->root_flag = 0;
+    ctx->allocated = 0;
+    ctx->wsu_id_flag = 0;
+    ctx->nesting_level = 0;
+    ctx->next_id = 0;
+}
+
 void soap_reset_call(soap *ctx)
 {
     if (ctx->keep_alive == 0) {
@@ -175,6 +168,7 @@ void soap_reset_call(soap *ctx)
     ctx->dime.count = 0;
     ctx->dime.chunk_size = 0;
     ctx->dime.buffer_length = 0;
+    ctx->attachment_stage = nullptr;
     soap_call_scratch_free(ctx);
 }
 
@@ -283,7 +277,7 @@ void soap_engine_done(soap *ctx)
     close_master_socket(ctx);
     end_tls(ctx);
     end_compression(ctx);
-    context_credentials_wipe(ctx);
+    credentials_wipe(ctx);
     trace_log_end(ctx);
     ctx->state = 0;
     track_end(ctx);

@@ -1,7 +1,7 @@
 // context_copy.cpp - copies of a context, and its move to another place.
 //
-// A copy takes by bytes: settings, callbacks, scratch texts, streams. It gets a reference of its own to the
-// TLS context. Never shared: what the engine frees at the end of a call or of a context, and a client's
+// A copy takes settings, callbacks, scratch texts and streams as they are. It gets a reference of its own to
+// the TLS context. Never shared: what the engine frees at the end of a call or of a context, and a client's
 // connection: two contexts on one socket would take each other's answers and close each other's descriptors.
 #include <cstdlib>
 #include <cstring>
@@ -11,25 +11,31 @@
 
 #include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_log.h>
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_plugin.h>
 #include <zuv_client_pro/soap_tcp.h>
+#include <zuv_client_pro/soap_tls.h>
 #include <zuv_client_pro/soap_xml.h>
 
-#include "core/context_fields.h"
 #include "core/context_state.h"
+#include "core/memory.h"
 #include "core/tracking.h"
+#include "exchange/context.h"
+#include "exchange/fault.h"
 
 void soap_context_assign(soap *target, const soap *source)
 {
     if (target == source)
         return;
-    const char *base = reinterpret_cast<const char *>(source);
-    const auto start = static_cast<std::size_t>(reinterpret_cast<const char *>(&source->state) - base);
-    const auto end =
-        static_cast<std::size_t>(reinterpret_cast<const char *>(&source->zlib_ratio_out + 1) - base);
-    std::memcpy(reinterpret_cast<char *>(target) + start, base + start, end - start);
+    target->state = source->state;
+#define MANAGED_FIELD_COPY(name) target->name = source->name;
+    CONTEXT_MANAGED_FIELDS(MANAGED_FIELD_COPY)
+#undef MANAGED_FIELD_COPY
+#define FIELD_COPY(name, fate, value) field_copy(target->name, source->name);
+    CONTEXT_FIELDS(FIELD_COPY)
+#undef FIELD_COPY
     if (source->pointer_chains == source->pointer_table)
         target->pointer_chains = target->pointer_table;
     if (source->track_chains == source->track_table)
@@ -48,74 +54,36 @@ static bool style_is_received(const soap *source)
     return false;
 }
 
-// Lists and managed texts of the message under way: they stay the source's.
-static void forget_message(soap *ctx)
+// Gives the fields of a fate their defaults.
+template <field_fate Fate> static void reset_fields(soap *ctx)
 {
-    ctx->prefix_list = nullptr;
-    ctx->prefix_cache_list = nullptr;
-    ctx->prefix_cache_valid = 0;
-    ctx->tag_resolved = false;
-    ctx->block_stack = nullptr;
-    ctx->instance_list = nullptr;
-    ctx->allocation_list = nullptr;
-    ctx->attribute_list = nullptr;
-    ctx->label_buffer = nullptr;
-    ctx->label_size = 0;
-    ctx->label_index = 0;
-    ctx->mtom_list = nullptr;
-    ctx->mtom_index = nullptr;
-    ctx->dime = {};
-    ctx->mime = {};
-    ctx->header = nullptr;
-    ctx->fault = nullptr;
-    ctx->action = nullptr;
-    ctx->http_content = nullptr;
-    ctx->auth_user = nullptr;
-    ctx->auth_password = nullptr;
-    ctx->auth_realm = nullptr;
-    ctx->forwarded_for = nullptr;
-    context_tables_clear(ctx);
+#define FIELD_DEFAULT(name, fate, value)                                                                     \
+    if constexpr (field_fate::fate == Fate)                                                                  \
+        field_reset(ctx->name, value);
+    CONTEXT_FIELDS(FIELD_DEFAULT)
+#undef FIELD_DEFAULT
+}
+
+// Texts that belong to the source's managed memory.
+static void forget_managed_fields(soap *ctx)
+{
+#define FIELD_FORGOTTEN(name) ctx->name = nullptr;
+    CONTEXT_MANAGED_FIELDS(FIELD_FORGOTTEN)
+#undef FIELD_FORGOTTEN
 }
 
 static void forget_connection(soap *ctx)
 {
-    ctx->socket = -1;
-    ctx->socket_abandoned = false;
-    ctx->socket_accepted = false;
-    ctx->response_unfinished = false;
-    ctx->route.known = false;
-    ctx->keep_alive = 0;
+    reset_fields<field_fate::CONNECTION>(ctx);
     ctx->input_mode &= ~MODE_TLS;
     ctx->output_mode &= ~MODE_TLS;
-    ctx->filter_stop = 0;
-    ctx->look_ahead = 0;
-    ctx->buffer_index = ctx->buffer_length = ctx->chunk_buffer_length = 0;
 }
 
 static void forget_resources(soap *ctx)
 {
-    ctx->plugin_list = nullptr;
-    ctx->namespace_scope = nullptr;
-    ctx->local_namespaces = nullptr;
-    ctx->namespaces = nullptr;
-    for (std::size_t channel = 0; channel < SOAP_LOG_CHANNELS; ++channel) {
-        ctx->log_paths[channel] = nullptr;
-        ctx->log_streams[channel] = nullptr;
-    }
-    ctx->call_deadline = 0;
-    ctx->tls_bio = nullptr;
-    ctx->tls_connection = nullptr;
-    ctx->tls_session = nullptr;
-    ctx->session_rules = nullptr;
+    reset_fields<field_fate::RESOURCE>(ctx);
     if (ctx->tls_context != nullptr)
         SSL_CTX_up_ref(ctx->tls_context);
-    ctx->zlib_stream = nullptr;
-    ctx->zlib_state = 0;
-    ctx->zlib_buffer = nullptr;
-    ctx->zlib_buffer_length = 0;
-    ctx->raw_aside = false; // the raw bytes lay in zlib_buffer
-    ctx->raw_index = 0;
-    track_table_clear(ctx);
 }
 
 // The copy starts with the rows that the source has; the host's own table is what it falls back on later,
@@ -167,14 +135,15 @@ static soap *copy_settings(soap *target, const soap *source)
     target->master_shared = true;
     if (style_is_received(source))
         target->encoding_style = "";
-    forget_message(target);
+    reset_fields<field_fate::MESSAGE>(target);
+    forget_managed_fields(target);
     forget_connection(target);
     forget_resources(target);
+    context_tables_clear(target);
     soap_log_set_received(target,
                           source->log_paths[SOAP_LOG_RECEIVED]); // a copy without memory for it goes unlogged
     soap_log_set_sent(target, source->log_paths[SOAP_LOG_SENT]);
     context_zlib_make(target);
-    target->error = SOAP_OK;
     if (copy_namespaces(target, source) != SOAP_OK || copy_plugins(target, source) != SOAP_OK)
         return nullptr;
     return target;
@@ -209,7 +178,7 @@ soap *soap_context_copy(soap *target, const soap *source)
 // A failed copy shows as state 0 or as an error in the new context.
 soap::soap(const soap &other)
 {
-    context_fields_clear(this);
+    context_fields_reset(this);
     copy_settings(this, &other);
 }
 
@@ -252,7 +221,7 @@ static void hang_up(soap *ctx)
 
 soap::soap(soap &&other) noexcept
 {
-    context_fields_clear(this);
+    context_fields_reset(this);
     if (!context_is_alive(&other))
         return;
     hang_up(&other);

@@ -11,7 +11,8 @@
 #include <zuv_client_pro/soap_memory.h>
 
 #include "core/context_state.h"
-#include "exchange/error_text.h"
+#include "core/failure.h"
+#include "exchange/fault.h"
 
 static const char *sender_code(const soap *ctx)
 {
@@ -76,7 +77,7 @@ int soap_fault_set(soap *ctx, const char *code, const char *subcode, const char 
     *soap_fault_string_field(ctx) = text;
     if (detail != nullptr && detail[0] != '\0')
         *soap_fault_detail_field(ctx) = detail;
-    return ctx->error = error;
+    return fail(ctx, error);
 }
 
 // True unless memory ran out for the copy.
@@ -92,7 +93,7 @@ int soap_fault_set_copied(soap *ctx, const char *code, const char *subcode, cons
     const char *own_code, *own_subcode, *own_text, *own_detail;
     if (!copy_text(ctx, code, &own_code) || !copy_text(ctx, subcode, &own_subcode) ||
         !copy_text(ctx, text, &own_text) || !copy_text(ctx, detail, &own_detail))
-        return ctx->error = SOAP_OUT_OF_MEMORY;
+        return fail(ctx, SOAP_OUT_OF_MEMORY);
     return soap_fault_set(ctx, own_code, own_subcode, own_text, own_detail, SOAP_FAULT);
 }
 
@@ -115,6 +116,22 @@ int soap_fault_receiver_copied(soap *ctx, const char *subcode, const char *text,
 {
     return soap_fault_set_copied(ctx, receiver_code(ctx), subcode, text, detail);
 }
+
+// ---------------------------------------------------------------------------------------------
+// For lower layers.
+
+static int make_fault(soap *ctx, fault_side side, const char *text, const char *detail, int error)
+{
+    return side == fault_side::sender ? soap_fault_sender(ctx, text, detail, error)
+                                      : soap_fault_receiver(ctx, text, detail, error);
+}
+
+static fault_texts read_fault(soap *ctx)
+{
+    return {*soap_fault_code_field(ctx), *soap_fault_string_field(ctx), soap_fault_detail_value(ctx)};
+}
+
+const soap_upcalls fault_upcalls = {make_fault, read_fault};
 
 // ---------------------------------------------------------------------------------------------
 // Printing.
@@ -192,7 +209,7 @@ void soap_fault_print_file(soap *ctx, std::FILE *file)
 
 void soap_fault_location_print(soap *ctx, std::FILE *file)
 {
-    constexpr std::size_t EXCERPT_MAX = 1023; // bytes behind the place
+    constexpr std::size_t EXCERPT_MAX = 1023; // bytes after the place
     const std::size_t position = ctx->buffer_index, fill = ctx->buffer_length;
     if (ctx->error == SOAP_OK || ctx->error == SOAP_STOP)
         return;

@@ -11,6 +11,7 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "binding/envelope.h"
+#include "core/failure.h"
 
 namespace {
 
@@ -58,14 +59,14 @@ int keep_error(soap *ctx, int error)
     return error;
 }
 
-// What stands behind the fault: it may refer to it.
+// What stands after the fault: it may refer to it.
 void read_rest_of_body(soap *ctx)
 {
     const std::uint32_t level = ctx->nesting_level;
     do {
         int type = 0;
         if (soap_read_element(ctx, &type) == nullptr && ctx->error == 0)
-            ctx->error = SOAP_TAG_MISMATCH; // nothing that could be read
+            fail(ctx, SOAP_TAG_MISMATCH); // nothing that could be read
     } while (ctx->error == 0 || binding::drop_bad_value(ctx, level));
 }
 
@@ -79,7 +80,7 @@ int soap_fault_receive(soap *ctx, int check)
     ctx->error = 0;
     if (soap_fault_read(ctx)) {
         if (ctx->exceeded != nullptr) {
-            ctx->error = SOAP_LENGTH;
+            fail(ctx, SOAP_LENGTH);
             return soap_socket_release(ctx);
         }
         if (check && ctx->error == SOAP_TAG_MISMATCH && ctx->nesting_level == 2)

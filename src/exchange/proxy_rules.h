@@ -7,7 +7,7 @@
 #include <zuv_client_pro/soap_proxy.h>
 #include <zuv_client_pro/soap_tcp.h>
 
-#include "binding/law.h"
+#include "binding/traits.h"
 #include "exchange/call.h"
 
 // Everything of a proxy class P but its calls. `table`: the port's namespace table.
@@ -96,10 +96,9 @@
         return soap_fault_print_text(this, text, length);                                                    \
     }
 
-// One operation: its name, class of the request, response record, element of the request, class and element
-// of the response, type id of the response record. The address of `response` is passed on unread: it may be
-// null.
-#define PROXY_DEFINE_CALL(P, name, Request, Record, request_element, Result, response_element, record_id)    \
+// One operation: its name, the class of the request, the record of the response. The address of `response` is
+// passed on unread: it may be null.
+#define PROXY_DEFINE_CALL(P, name, Request, Record, request_id, record_id)                                   \
     int P::name(Request *request, Record &response)                                                          \
     {                                                                                                        \
         return _##name(nullptr, nullptr, request,                                                            \
@@ -107,9 +106,7 @@
     }                                                                                                        \
     int P::_##name(const char *url, const char *soap_action, Request *request, Record &response)             \
     {                                                                                                        \
-        static constexpr proxies::operation operation = {request_element, &binding::ops_of<Request>,         \
-                                                         response_element, &binding::ops_of<Result>,         \
-                                                         record_id};                                         \
+        static constexpr soap_operation operation = {request_id, record_id};                                 \
         const bool one_way = &response == &proxies::no_record<Record>;                                       \
         return proxies::call(this, endpoint, default_endpoint, operation, url, soap_action, request,         \
                              one_way ? nullptr : reinterpret_cast<void **>(&response));                      \

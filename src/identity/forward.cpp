@@ -7,6 +7,8 @@
 // within the object waits for a copy. That order comes from a list of waiting places sorted by address: an
 // object watches the first place within it that waits, and looks on from there when that place is filled.
 
+#include "core/failure.h"
+#include "core/memory.h"
 #include "identity/identity.h"
 
 #include <algorithm>
@@ -81,7 +83,7 @@ int forward_address(soap *ctx, const soap_id_record *record, const soap_forward_
     for (unsigned level = record->level + 1; level < forward->level; level++) {
         void *cell = soap_block_alloc(ctx, sizeof(void *));
         if (cell == nullptr)
-            return ctx->error = SOAP_OUT_OF_MEMORY;
+            return fail(ctx, SOAP_OUT_OF_MEMORY);
         store_place(cell, target);
         target = cell;
     }
@@ -137,7 +139,7 @@ public:
             return SOAP_OK;
         places = static_cast<waiting_place *>(SOAP_MALLOC(ctx, (total + 1) * sizeof *places));
         if (places == nullptr)
-            return ctx->error = SOAP_OUT_OF_MEMORY;
+            return fail(ctx, SOAP_OUT_OF_MEMORY);
         sort_places();
         for_each_record(ctx, [this](soap_id_record *record) {
             if (waits_on(record))
@@ -152,7 +154,7 @@ public:
 
 private:
     soap *ctx;
-    waiting_place *places = nullptr; // sorted by address, each address once, with a sentinel behind the last
+    waiting_place *places = nullptr; // sorted by address, each address once, with a sentinel after the last
     std::size_t count = 0;
     soap_id_record *ready = nullptr; // a queue, linked by next_held
     soap_id_record **ready_end = &ready;
@@ -217,7 +219,7 @@ private:
 
     std::size_t first_at(const void *address) { return waiting_from(position(address)); }
 
-    // Puts an object on watch at the place with this index, or in the queue if that lies behind the object.
+    // Puts an object on watch at the place with this index, or in the queue if that lies after the object.
     void watch(soap_id_record *record, std::size_t index)
     {
         const auto start = reinterpret_cast<std::uintptr_t>(record->ptr);
@@ -384,4 +386,9 @@ void soap_forward_relocate(soap *ctx, const void *start, const void *end, char *
         reference->type = range.moved(reference->type);
         reference->options = range.moved(reference->options);
     }
+}
+
+void *soap_block_stack_save(soap *ctx, soap_block_stack *stack, void *target, int fix_references)
+{
+    return block_stack_gather(ctx, stack, target, fix_references != 0 ? soap_forward_relocate : nullptr);
 }

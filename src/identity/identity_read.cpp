@@ -6,6 +6,7 @@
 // reset frees as a whole. Past a few thousand ids a keyed index finds them, so that texts chosen to collide
 // cost no more than others.
 
+#include "core/failure.h"
 #include "identity/identity.h"
 
 #include <ctime>
@@ -21,7 +22,7 @@ constexpr std::size_t INDEX_START = 8192;      // its first size, a power of two
 
 struct store_block {
     store_block *next;
-    std::size_t size; // bytes behind this header
+    std::size_t size; // bytes after this header
     std::size_t used;
 };
 
@@ -66,10 +67,8 @@ void *store_alloc(soap *ctx, std::size_t bytes)
     bytes = (bytes + 7) & ~static_cast<std::size_t>(7);
     if (index == nullptr ||
         ((index->blocks == nullptr || index->blocks->size - index->blocks->used < bytes) &&
-         !add_store_block(ctx, index, bytes))) {
-        ctx->error = SOAP_OUT_OF_MEMORY;
-        return nullptr;
-    }
+         !add_store_block(ctx, index, bytes)))
+        return fail_null(ctx, SOAP_OUT_OF_MEMORY);
     store_block *block = index->blocks;
     char *area = reinterpret_cast<char *>(block + 1) + block->used;
     block->used += bytes;
@@ -169,7 +168,7 @@ index_slot *new_slots(soap *ctx, std::size_t count)
 {
     auto *slots = static_cast<index_slot *>(SOAP_MALLOC(ctx, count * sizeof(index_slot)));
     if (slots == nullptr)
-        ctx->error = SOAP_OUT_OF_MEMORY;
+        fail(ctx, SOAP_OUT_OF_MEMORY);
     else
         std::memset(slots, 0, count * sizeof(index_slot));
     return slots;
@@ -292,10 +291,8 @@ void *add_indirections(soap *ctx, void *place, unsigned count)
 {
     for (; count > 0; count--) {
         void *cell = soap_block_alloc(ctx, sizeof(void *));
-        if (cell == nullptr) {
-            ctx->error = SOAP_OUT_OF_MEMORY;
-            return nullptr;
-        }
+        if (cell == nullptr)
+            return fail_null(ctx, SOAP_OUT_OF_MEMORY);
         store_place(place, cell);
         place = cell;
     }
@@ -316,7 +313,7 @@ int id_failure(soap *ctx, const char *id, int error)
     const std::size_t length = strnlen(id, sizeof ctx->element_id - 1);
     std::memmove(ctx->element_id, id, length);
     ctx->element_id[length] = '\0';
-    return ctx->error = error;
+    return fail(ctx, error);
 }
 
 std::size_t soap_id_hash(const char *text)

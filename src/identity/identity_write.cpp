@@ -14,7 +14,8 @@
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_xml.h>
 
-#include "identity/identity_value.h"
+#include "core/failure.h"
+#include "identity/pointer_table.h"
 
 struct soap_pointer_block {
     soap_pointer_block *next;
@@ -147,10 +148,8 @@ soap_pointer_record *add_record(soap *ctx, const void *address, const void *arra
     const bool table_full = ctx->pointer_count > RECORDS_PER_CHAIN_MAX * (ctx->pointer_chain_mask + 1);
     const bool block_full =
         ctx->pointer_blocks == nullptr || ctx->pointer_block_used == SOAP_POINTER_BLOCK_SIZE;
-    if ((table_full && !grow_table(ctx)) || (block_full && !add_block(ctx))) {
-        ctx->error = SOAP_OUT_OF_MEMORY;
-        return nullptr;
-    }
+    if ((table_full && !grow_table(ctx)) || (block_full && !add_block(ctx)))
+        return fail_null(ctx, SOAP_OUT_OF_MEMORY);
     soap_pointer_record *record = &ctx->pointer_blocks->records[ctx->pointer_block_used++];
     record->ptr = address;
     record->array = array;
@@ -220,7 +219,7 @@ inline bool literal(const soap *ctx)
     return ctx->encoding_style == nullptr && (ctx->mode & SOAP_XML_GRAPH) == 0;
 }
 
-// Encoded SOAP 1.1: objects met twice stand behind the Body's first element, and all that refer to them do
+// Encoded SOAP 1.1: objects met twice stand after the Body's first element, and all that refer to them do
 // so.
 inline bool encoded_1_1(const soap *ctx)
 {
@@ -415,10 +414,8 @@ soap_pointer_block **blocks_in_order(soap *ctx, std::size_t *count)
         ++*count;
     auto **blocks =
         static_cast<soap_pointer_block **>(SOAP_MALLOC(ctx, (*count + 1) * sizeof(soap_pointer_block *)));
-    if (blocks == nullptr) {
-        ctx->error = SOAP_OUT_OF_MEMORY;
-        return nullptr;
-    }
+    if (blocks == nullptr)
+        return fail_null(ctx, SOAP_OUT_OF_MEMORY);
     std::size_t place = *count;
     for (soap_pointer_block *block = ctx->pointer_blocks; block != nullptr; block = block->next)
         blocks[--place] = block;

@@ -13,6 +13,8 @@
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "core/failure.h"
+
 namespace {
 
 constexpr int PORT_MAX = 65535;
@@ -80,7 +82,7 @@ const char *fault_of(std::string_view item)
     return fault_of_authority(item.substr(0, item.find('/')));
 }
 
-// Where the part of a user ends, whose password no text tells: behind the last "@" of its stretch; 0 for
+// Where the part of a user ends, whose password no text tells: after the last "@" of its stretch; 0 for
 // none.
 std::size_t end_of_user(std::string_view item)
 {
@@ -111,7 +113,7 @@ int refuse(soap *ctx, std::string_view item, const char *why)
     const char *const own = soap_string_dup_n(ctx, text, length);
     if (own == nullptr)
         return ctx->error;
-    return soap_fault_sender(ctx, own, "nothing was sent", SOAP_TCP_ERROR);
+    return fail_as_sender(ctx, own, "nothing was sent", SOAP_TCP_ERROR);
 }
 
 } // namespace

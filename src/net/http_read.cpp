@@ -17,6 +17,7 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "core/buffered_in.h"
+#include "core/failure.h"
 
 namespace {
 
@@ -68,7 +69,7 @@ bool is_low(char c)
     return static_cast<unsigned char>(c) <= ' ';
 }
 
-// The number behind the first blank; 0 if there is none, which makes the line that of a request.
+// The number after the first blank; 0 if there is none, which makes the line that of a request.
 int status_of(const char *start_line)
 {
     const char *const blank = std::strchr(start_line, ' ');
@@ -85,7 +86,7 @@ int read_start_line(soap *ctx)
     if (result == SOAP_OK)
         ctx->status = status_of(ctx->message_text);
     else if (result != SOAP_EOF)
-        ctx->error = STATUS_URI_TOO_LARGE;
+        fail(ctx, STATUS_URI_TOO_LARGE);
     return ctx->error;
 }
 
@@ -139,7 +140,7 @@ int read_headers(soap *ctx, head_state &head)
             return result;
         head.bytes += std::strlen(line);
         if (++head.lines > LINES_MAX || head.bytes > HEAD_BYTES_MAX)
-            return ctx->error = SOAP_HEADER_LINE;
+            return fail(ctx, SOAP_HEADER_LINE);
         if (!is_interim(ctx->status) && take_header(ctx, head, line) != SOAP_OK)
             return ctx->error;
     }
@@ -155,7 +156,7 @@ int read_final_head(soap *ctx, head_state &head)
         if (!is_interim(ctx->status))
             return SOAP_OK;
     }
-    return ctx->error = SOAP_HEADER_LINE;
+    return fail(ctx, SOAP_HEADER_LINE);
 }
 
 // Where the protocol's name stands in the start line; the last place, as a request's path may hold it too.
@@ -210,7 +211,7 @@ int run_method_hook(soap *ctx, const head_state &head, const method_row &method)
 {
     int (*const hook)(soap *) = ctx->*method.hook;
     if (hook == http_put_default && head.is_retry)
-        return ctx->error = SOAP_PUT_METHOD; // one PUT leads to one more head, not to any number of them
+        return fail(ctx, SOAP_PUT_METHOD); // one PUT leads to one more head, not to any number of them
     const int result = hook == nullptr ? SOAP_OK : hook(ctx);
     return ctx->error = result == SOAP_OK ? static_cast<int>(SOAP_STOP) : result;
 }
@@ -241,8 +242,8 @@ int fail_with(soap *ctx, int code, const char *body)
     if (start_line == nullptr)
         return ctx->error;
     if (body != nullptr)
-        return soap_fault_receiver(ctx, start_line, body, code);
-    return soap_fault_receiver(ctx, "HTTP Error", start_line, code);
+        return fail_as_receiver(ctx, start_line, body, code);
+    return fail_as_receiver(ctx, "HTTP Error", start_line, code);
 }
 
 bool is_chunked(const soap *ctx)
@@ -321,7 +322,7 @@ char *http_drain_body(soap *ctx)
 
 int http_get_default(soap *ctx)
 {
-    return ctx->error = SOAP_GET_METHOD;
+    return fail(ctx, SOAP_GET_METHOD);
 }
 
 int http_put_default(soap *ctx)
@@ -331,19 +332,5 @@ int http_put_default(soap *ctx)
 
 int http_delete_default(soap *ctx)
 {
-    return ctx->error = STATUS_NO_METHOD;
-}
-
-int http_method_default(soap *ctx)
-{
-    constexpr std::uint32_t FRAMING = MODE_IO_MASK | MODE_DEFLATE | MODE_DIME | MODE_MIME | MODE_MTOM;
-    const std::uint32_t output_mode = ctx->output_mode;
-    ctx->output_mode = (output_mode & ~FRAMING) | MODE_BUFFERED;
-    int result = soap_send_begin(ctx);
-    if (result == SOAP_OK && ctx->on_response != nullptr)
-        result = ctx->on_response(ctx, 200, 0);
-    if (result == SOAP_OK)
-        result = soap_send_finish(ctx);
-    ctx->output_mode = output_mode;
-    return ctx->error = result == SOAP_OK ? static_cast<int>(SOAP_STOP) : result;
+    return fail(ctx, STATUS_NO_METHOD);
 }

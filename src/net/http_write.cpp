@@ -11,12 +11,12 @@
 #include <openssl/crypto.h>
 #include <openssl/evp.h>
 
-#include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_io.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "core/failure.h"
 #include "core/tracking.h"
 #include "net/tcp_socket.h"
 #include "net/tls_connection.h"
@@ -223,7 +223,7 @@ int write_request_line(soap *ctx, const char *endpoint, const char *host, int po
     }
     text.put(" HTTP/");
     text.put(ctx->http_version);
-    return text.fits ? line(ctx, text.text, nullptr) : ctx->error = SOAP_OUT_OF_MEMORY;
+    return text.fits ? line(ctx, text.text, nullptr) : fail(ctx, SOAP_OUT_OF_MEMORY);
 }
 
 int write_host(soap *ctx, const char *host, int port)
@@ -302,7 +302,7 @@ const char *engine_error_status(soap *ctx, int status)
     if (status >= SOAP_GET_METHOD && status <= SOAP_HTTP_METHOD)
         return "405 Method Not Allowed";
     if (ctx->soap_version == 2) {
-        const char *const code = *soap_fault_code_field(ctx);
+        const char *const code = ctx->upcalls->read_fault(ctx).code;
         if (code == nullptr || std::strcmp(code, "SOAP-ENV:Sender") == 0)
             return "400 Bad Request";
     }
@@ -378,7 +378,7 @@ int http_write_request(soap *ctx, const char *endpoint, const char *host, int po
     if (endpoint == nullptr || !is_http_scheme(endpoint))
         return SOAP_OK;
     if (std::strlen(endpoint) + std::strlen(ctx->http_version) > HEAD_TEXT_LIMIT)
-        return ctx->error = SOAP_OUT_OF_MEMORY;
+        return fail(ctx, SOAP_OUT_OF_MEMORY);
     if (write_request_line(ctx, endpoint, host, port, path) != SOAP_OK ||
         write_host(ctx, host, port) != SOAP_OK || line(ctx, "User-Agent", PRODUCT) != SOAP_OK ||
         http_write_entity_headers(ctx, 0, count) != SOAP_OK ||
@@ -391,7 +391,7 @@ int http_write_request(soap *ctx, const char *endpoint, const char *host, int po
 int http_write_response(soap *ctx, int status, std::uint64_t count)
 {
     if (std::strlen(ctx->http_version) >= VERSION_LIMIT)
-        return ctx->error = SOAP_OUT_OF_MEMORY;
+        return fail(ctx, SOAP_OUT_OF_MEMORY);
     if (write_status(ctx, status, count) != SOAP_OK || line(ctx, "Server", PRODUCT) != SOAP_OK ||
         http_write_entity_headers(ctx, status, count) != SOAP_OK)
         return ctx->error;

@@ -12,6 +12,7 @@
 #include <zuv_client_pro/soap_tcp.h>
 
 #include "core/context_state.h"
+#include "core/failure.h"
 #include "net/tcp_socket.h"
 #include "net/tls_connection.h"
 
@@ -50,7 +51,7 @@ void end_compression(soap *ctx)
 
 int fail_peek(soap *ctx)
 {
-    return soap_fault_sender(ctx, tcp_error_text(ctx), "select failed in soap_poll()", SOAP_TCP_ERROR);
+    return fail_as_sender(ctx, tcp_error_text(ctx), "select failed in soap_poll()", SOAP_TCP_ERROR);
 }
 
 int peek_master(soap *ctx)
@@ -115,7 +116,7 @@ int tcp_peek(soap *ctx)
         return -1;
     if ((ready & WAIT_RECV) == 0)
         return 0;
-    // Readable ahead of a request: the peer has closed, or sent what no request of ours asked for, which must
+    // Readable before a request: the peer has closed, or sent what no request of ours asked for, which must
     // not be taken for the answer to the next. Under TLS it may also be a message of the protocol itself.
     return tls_active(ctx) ? tls_peek(ctx) : -1;
 }

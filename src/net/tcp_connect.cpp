@@ -13,7 +13,6 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "net/tcp_socket.h"
-#include "net/tcp_tunnel.h"
 #include "net/tcp_wait.h"
 #include "net/tls_connection.h"
 

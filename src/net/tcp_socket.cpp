@@ -1,7 +1,8 @@
-// tcp_socket.cpp - one socket: set its options and mode, close it, put its errors into words.
+// tcp_socket.cpp - one socket: set its options and mode, close it.
 //
 // Elsewhere: waiting for it (tcp_wait.cpp), how it comes to be (tcp_connect.cpp, tcp_server.cpp), its bytes
-// (tcp_transfer.cpp), the end of a connection and of a transaction (tcp_close.cpp).
+// (tcp_transfer.cpp), texts of its errors (tcp_error.cpp), the end of a connection and of a transaction
+// (tcp_close.cpp).
 #include "net/tcp_socket.h"
 
 #include <cerrno>
@@ -15,6 +16,7 @@
 #include <zuv_client_pro/soap_tcp.h>
 
 #include "core/context_state.h"
+#include "core/failure.h"
 #include "net/tls_connection.h"
 
 namespace {
@@ -98,7 +100,7 @@ void tcp_save_errno(soap *ctx)
 int tcp_fail(soap *ctx, int socket, const char *detail, const char *text)
 {
     tcp_close_through_hook(ctx, socket);
-    soap_fault_sender(ctx, text ? text : tcp_error_text(ctx), detail, SOAP_TCP_ERROR);
+    fail_as_sender(ctx, text ? text : tcp_error_text(ctx), detail, SOAP_TCP_ERROR);
     return -1;
 }
 
@@ -107,7 +109,7 @@ bool tcp_refuse_large(soap *ctx, int socket)
     if (socket < FD_SETSIZE)
         return false;
     tcp_close_through_hook(ctx, socket);
-    ctx->error = SOAP_FD_EXCEEDED;
+    fail(ctx, SOAP_FD_EXCEEDED);
     return true;
 }
 
@@ -117,19 +119,6 @@ const char *tcp_set_options(int socket, std::initializer_list<tcp_option> option
         if (option.wanted && setsockopt(socket, option.level, option.name, option.value, option.size) != 0)
             return option.failure;
     return nullptr;
-}
-
-const char *tcp_error_text(soap *ctx)
-{
-    static const char *const resolver_texts[] = {"Host not found", "Try Again", "No Recovery", "No Data"};
-    if (ctx->error_mode == 1)
-        return "WSAStartup failed";
-    if (ctx->error_mode != 2)
-        return soap_eof_text(ctx); // the system's text, or that of an interruption with the limits in force
-    if (ctx->errno_value >= 1 && ctx->errno_value <= 4)
-        return resolver_texts[ctx->errno_value - 1];
-    std::snprintf(ctx->message_text, sizeof ctx->message_text, "TCP/UDP IP error %d", ctx->errno_value);
-    return ctx->message_text;
 }
 
 int tcp_close_socket(soap *, int socket)

@@ -84,3 +84,7 @@ struct tcp_option {
 
 // Sets the options in order; null, or the failure text of the first that is refused, with errno.
 const char *tcp_set_options(int socket, std::initializer_list<tcp_option> options);
+
+// Asks the proxy on ctx->socket for a connection to host and port. 0, or non-zero with ctx->error: the
+// failure, or the status of the proxy's refusal. The socket stays open then.
+int tcp_open_tunnel(soap *ctx, const char *endpoint, const char *host, int port);

@@ -1,19 +1,20 @@
 // tcp_tunnel.cpp - CONNECT to an HTTP proxy, in the midst of another message's beginning.
 //
 // Always: the request that is about to be sent finds the context as it left it, whatever the proxy answers.
-// An answer that opens the tunnel has a head only; bytes behind it that came before anything was said to the
-// host behind are nobody's answer and are dropped.
-#include "net/tcp_tunnel.h"
+// An answer that opens the tunnel has a head only; bytes after it that came before anything was said to the
+// host after are nobody's answer and are dropped.
+#include "net/tcp_socket.h"
 
 #include <cstdio>
 #include <cstring>
 
-#include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_io.h>
 #include <zuv_client_pro/soap_memory.h>
 
+#include "core/buffered_out.h"
+#include "core/failure.h"
 #include "core/zlib_common.h"
 
 namespace {
@@ -79,15 +80,16 @@ private:
 int send_connect(soap *ctx, const char *endpoint, const char *host, int port)
 {
     ctx->output_mode = (ctx->output_mode & ~MESSAGE_BITS) | MODE_BUFFERED;
-    ctx->mode = 0; // attachments are not the proxy's
-    if (const int error = soap_send_begin(ctx))
+    ctx->mode = ctx->output_mode; // without attachments, which are not the proxy's
+    ctx->error = SOAP_OK;
+    if (const int error = output_begin(ctx))
         return error;
     ctx->status = STATUS_CONNECT;
     ctx->keep_alive = 1;
     if (ctx->on_post)
         if (const int error = ctx->on_post(ctx, endpoint, host, port, nullptr, nullptr, 0))
             return error;
-    return soap_send_finish(ctx);
+    return output_close(ctx);
 }
 
 void forget_input(soap *ctx)
@@ -123,8 +125,8 @@ struct answer {
 // The head reader has made a fault of its own from most refusals: the line and the body, if it could be read.
 const char *body_in_fault(soap *ctx, const answer &got)
 {
-    const char *const text = *soap_fault_string_field(ctx);
-    return text && std::strcmp(text, got.line) == 0 ? soap_fault_detail_value(ctx) : nullptr;
+    const fault_texts fault = ctx->upcalls->read_fault(ctx);
+    return fault.text && std::strcmp(fault.text, got.line) == 0 ? fault.detail : nullptr;
 }
 
 void read_answer(soap *ctx, answer &got)
@@ -155,7 +157,7 @@ int refuse(soap *ctx, const char *host, int port, const answer &got)
     if (!own)
         return ctx->error;
     const bool told = got.body && got.body[0] != '\0';
-    return soap_fault_sender(ctx, own, told ? got.body : "CONNECT failed in tcp_connect()", got.error());
+    return fail_as_sender(ctx, own, told ? got.body : "CONNECT failed in tcp_connect()", got.error());
 }
 
 } // namespace
@@ -173,9 +175,8 @@ int tcp_open_tunnel(soap *ctx, const char *endpoint, const char *host, int port)
     }
     state.restore();
     if (error != 0)
-        return ctx->error = error;
-    error = soap_send_begin(ctx);
+        return fail(ctx, error);
+    ctx->buffer_index = ctx->buffer_length = 0; // as before the request
     std::snprintf(ctx->endpoint, sizeof ctx->endpoint, "%s", endpoint);
-    state.restore_mode();
-    return error;
+    return SOAP_OK;
 }

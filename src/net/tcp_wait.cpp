@@ -9,6 +9,7 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_tcp.h>
 
+#include "core/failure.h"
 #include "net/tcp_socket.h"
 
 namespace {
@@ -58,7 +59,7 @@ int wait_for(soap *ctx, int socket, int flags, timeval *limit)
 {
     ctx->errno_value = 0;
     if (socket >= FD_SETSIZE) {
-        ctx->error = SOAP_FD_EXCEEDED;
+        fail(ctx, SOAP_FD_EXCEEDED);
         return -1;
     }
     if (socket < 0) {
@@ -131,9 +132,4 @@ int tcp_wait_until(soap *ctx, int socket, int flags, tcp_deadline deadline)
         if (deadline != 0 && left == 0)
             return time_is_up(ctx);
     }
-}
-
-const char *tcp_timeout_text(soap *ctx)
-{
-    return ctx->call_expired ? soap_eof_text(ctx) : "Timeout";
 }

@@ -17,6 +17,7 @@
 #include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_tls.h>
 
+#include "core/failure.h"
 #include "net/tls_connection.h"
 
 namespace {
@@ -194,7 +195,7 @@ const char *set_up(const soap *ctx, SSL_CTX *context)
 
 int fail_setup(soap *ctx, const char *detail)
 {
-    return soap_fault_receiver(ctx, "SSL/TLS error", detail, SOAP_TLS_ERROR);
+    return fail_as_receiver(ctx, "SSL/TLS error", detail, SOAP_TLS_ERROR);
 }
 
 // New rules are in force from here on: nothing that was made or accepted under the old ones may bypass them,

@@ -13,6 +13,7 @@
 #include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_tls.h>
 
+#include "core/failure.h"
 #include "net/tcp_socket.h"
 #include "net/tcp_wait.h"
 #include "net/tls_connection.h"
@@ -115,11 +116,10 @@ int name_server(SSL *ssl, const char *host)
 int fail_connect(soap *ctx, handshake outcome, int result, const tls_verdict &verdict)
 {
     if (outcome == handshake::refused)
-        soap_fault_sender(ctx, tls_error_text(ctx, result),
-                          tls_with_reason(ctx, "SSL_connect error in tcp_connect()", verdict),
-                          SOAP_TLS_ERROR);
+        fail_as_sender(ctx, tls_error_text(ctx, result),
+                       tls_with_reason(ctx, "SSL_connect error in tcp_connect()", verdict), SOAP_TLS_ERROR);
     else
-        soap_fault_sender(
+        fail_as_sender(
             ctx, outcome == handshake::out_of_time ? tcp_timeout_text(ctx) : tls_error_text(ctx, result),
             "SSL_connect failed in tcp_connect()", SOAP_TCP_ERROR);
     return -1;
@@ -127,13 +127,13 @@ int fail_connect(soap *ctx, handshake outcome, int result, const tls_verdict &ve
 
 int lack_of_memory(soap *ctx)
 {
-    ctx->error = SOAP_TLS_ERROR;
+    fail(ctx, SOAP_TLS_ERROR);
     return -1;
 }
 
 int fail_accept(soap *ctx, const char *detail, const char *text)
 {
-    const int error = soap_fault_sender(ctx, text, detail, SOAP_TLS_ERROR);
+    const int error = fail_as_sender(ctx, text, detail, SOAP_TLS_ERROR);
     tcp_drop_socket(ctx);
     return error;
 }
@@ -180,16 +180,16 @@ int tls_connect(soap *ctx, const char *host, int port)
 int soap_ssl_accept(soap *ctx)
 {
     if (!soap_socket_open(ctx))
-        return soap_fault_receiver(ctx, "SSL/TLS error", "No socket in soap_ssl_accept()", SOAP_TLS_ERROR);
+        return fail_as_receiver(ctx, "SSL/TLS error", "No socket in soap_ssl_accept()", SOAP_TLS_ERROR);
     ctx->tls_flags = static_cast<std::uint16_t>(ctx->tls_flags & ~TLS_CLIENT_SIDE);
     if (const int error = ensure_context(ctx)) {
         tcp_drop_socket(ctx);
-        return ctx->error = error;
+        return fail(ctx, error);
     }
     if (renew_connection(ctx) != 0 || attach(ctx) != 0) {
         tcp_drop_socket(ctx);
-        return soap_fault_receiver(ctx, "SSL/TLS error", "SSL_new() failed in soap_ssl_accept()",
-                                   SOAP_TLS_ERROR);
+        return fail_as_receiver(ctx, "SSL/TLS error", "SSL_new() failed in soap_ssl_accept()",
+                                SOAP_TLS_ERROR);
     }
     SSL_set_accept_state(ctx->tls_connection);
     int result;

@@ -27,6 +27,7 @@
 #include <zuv_client_pro/soap_tls.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "core/failure.h"
 #include "net/tls_connection.h"
 
 namespace {
@@ -153,7 +154,7 @@ bool pattern_names(const char *host, const char *pattern)
     return domain && soap_tag_match(domain, pattern + 1) == 0;
 }
 
-// The comparison works on terminated texts: a name that goes on behind a NUL is not the name it shows.
+// The comparison works on terminated texts: a name that continues after a NUL is not the name it shows.
 bool is_plain_text(std::string_view name)
 {
     return name.find('\0') == std::string_view::npos;
@@ -258,9 +259,9 @@ int fail_host(soap *ctx, const X509 *certificate, const char *host)
     if (!reason.has_items())
         reason.add("no host");
     const char *detail = soap_string_dup(ctx, reason.text());
-    return soap_fault_sender(ctx, "SSL/TLS error",
-                             detail ? detail : "SSL/TLS certificate host name mismatch in tcp_connect()",
-                             SOAP_TLS_ERROR);
+    return fail_as_sender(ctx, "SSL/TLS error",
+                          detail ? detail : "SSL/TLS certificate host name mismatch in tcp_connect()",
+                          SOAP_TLS_ERROR);
 }
 
 // Where an SSL keeps the address of its tls_verdict.
@@ -340,7 +341,7 @@ int tls_check_peer(soap *ctx, const char *host)
 {
     const long verdict = SSL_get_verify_result(ctx->tls_connection);
     if (verdict != X509_V_OK)
-        return soap_fault_sender(
+        return fail_as_sender(
             ctx, X509_verify_cert_error_string(verdict),
             tls_with_reason(ctx, "SSL/TLS certificate presented by peer cannot be verified in tcp_connect()",
                             {static_cast<int>(verdict)}),
@@ -350,9 +351,9 @@ int tls_check_peer(soap *ctx, const char *host)
     const std::unique_ptr<X509, certificate_delete> certificate(
         SSL_get1_peer_certificate(ctx->tls_connection));
     if (!certificate)
-        return soap_fault_sender(ctx, "SSL/TLS error",
-                                 "No SSL/TLS certificate was presented by the peer in tcp_connect()",
-                                 SOAP_TLS_ERROR);
+        return fail_as_sender(ctx, "SSL/TLS error",
+                              "No SSL/TLS certificate was presented by the peer in tcp_connect()",
+                              SOAP_TLS_ERROR);
     return names_host(ctx, certificate.get(), host) ? 0 : fail_host(ctx, certificate.get(), host);
 }
 

@@ -38,32 +38,7 @@ bool advance(std::int64_t *linear, std::int64_t size, std::int64_t offset)
     return *linear <= INT_MAX;
 }
 
-// Behind the next ",", or if there is none, the next blank; null if neither is there.
-const char *behind_separator(const char *text)
-{
-    const char *found = std::strchr(text, ',');
-    if (found == nullptr)
-        found = std::strchr(text, ' ');
-    return found != nullptr ? found + 1 : nullptr;
-}
-
 } // namespace
-
-int soap_position_parse(const char *text, int *numbers)
-{
-    int count = 0;
-    if (text == nullptr || *text != '[')
-        return 0;
-    for (const char *at = text + 1; at != nullptr && count < static_cast<int>(SOAP_POSITIONS_MAX);
-         at = behind_separator(at)) {
-        const scanned_integer number = scan_integer(at);
-        if (!number.digits || number.as_signed() < INT_MIN || number.as_signed() > INT_MAX)
-            break;
-        numbers[count++] = static_cast<int>(number.as_signed());
-        at = number.end;
-    }
-    return count;
-}
 
 int soap_array_dims_parse(const char *text, int *sizes, int dimensions)
 {
@@ -91,7 +66,7 @@ int soap_array_dims_offset_parse(const char *text, const char *offset_text, int 
         return -1;
     if (*text == '[')
         text++;
-    for (; text != nullptr; text = behind_separator(text)) {
+    for (; text != nullptr; text = after_separator(text)) {
         const scanned_integer size = scan_integer(text);
         if (!size.digits || !multiply(&product, size.as_signed()))
             return -1;
@@ -117,7 +92,7 @@ int soap_array_offset_parse(const char *text, const int *sizes, int *offsets, in
             return -1;
         if (offsets != nullptr)
             offsets[i] = static_cast<int>(number);
-        at = at != nullptr ? behind_separator(at) : nullptr;
+        at = at != nullptr ? after_separator(at) : nullptr;
     }
     return static_cast<int>(linear);
 }

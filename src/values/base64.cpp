@@ -15,6 +15,7 @@
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_primitive.h>
 
+#include "core/failure.h"
 #include "values/inline_bytes.h"
 
 namespace {
@@ -35,7 +36,7 @@ constexpr auto PAIRS = [] {
     return pairs;
 }();
 
-// Writes (length + 2) / 3 * 4 characters; returns the place behind them.
+// Writes (length + 2) / 3 * 4 characters; returns the place after them.
 char *encode(const unsigned char *bytes, std::size_t length, char *out)
 {
     for (; length >= 3; bytes += 3, length -= 3, out += 4) {
@@ -177,10 +178,8 @@ const char *soap_base642s(soap *ctx, const char *text, char *target, std::size_t
     decoder decoded;
     decoded.set_target(reinterpret_cast<unsigned char *>(target), capacity);
     const char *stopped = decoded.take(text, text + text_length);
-    if (!decoded.full() && *stopped != '\0' && *stopped != '=') {
-        ctx->error = SOAP_TYPE_MISMATCH;
-        return nullptr;
-    }
+    if (!decoded.full() && *stopped != '\0' && *stopped != '=')
+        return fail_null(ctx, SOAP_TYPE_MISMATCH);
     decoded.finish();
     const auto count = static_cast<std::size_t>(reinterpret_cast<const char *>(decoded.written()) - target);
     if (length != nullptr)
@@ -238,10 +237,8 @@ unsigned char *soap_base64_inline_read(soap *ctx, int *length)
             inline_rest_skip(ctx, token);
             break;
         }
-        if (!taken) {
-            ctx->error = SOAP_TYPE_MISMATCH;
-            return nullptr;
-        }
+        if (!taken)
+            return fail_null(ctx, SOAP_TYPE_MISMATCH);
     }
     return inline_block_save(ctx, length);
 }

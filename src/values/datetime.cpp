@@ -11,6 +11,7 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_primitive.h>
 
+#include "core/failure.h"
 #include "xml/scan.h"
 
 namespace {
@@ -18,9 +19,9 @@ namespace {
 constexpr std::size_t ZONE_SIZE = 32; // what follows the seconds, terminator included
 constexpr int FIELDS = 6;             // year, month, day, hour, minute, second
 
-// A form of the text: the byte ahead of each field (0 for none) and the field's greatest width (0 for any).
+// A form of the text: the byte before each field (0 for none) and the field's greatest width (0 for any).
 struct date_form {
-    char ahead[FIELDS];
+    char before[FIELDS];
     int width[FIELDS];
 };
 
@@ -53,14 +54,14 @@ const char *scan_fields(const char *text, std::int64_t fields[FIELDS])
 {
     const date_form &form = form_of(text);
     for (int i = 0; i < FIELDS && text != nullptr; i++) {
-        if (form.ahead[i] != 0 && *text++ != form.ahead[i])
+        if (form.before[i] != 0 && *text++ != form.before[i])
             return nullptr;
         text = scan_field(text, form.width[i], &fields[i]);
     }
     return text;
 }
 
-// The word behind the seconds, cut to its buffer, less the fraction.
+// The word after the seconds, cut to its buffer, less the fraction.
 const char *zone_of(const char *text, char word[ZONE_SIZE])
 {
     while (is_c_space(*text))
@@ -156,7 +157,7 @@ int soap_datetime_parse(soap *ctx, const char *text, std::time_t *target)
 {
     if (text == nullptr)
         return ctx->error;
-    return parse(text, target) ? SOAP_OK : ctx->error = SOAP_TYPE_MISMATCH;
+    return parse(text, target) ? SOAP_OK : fail(ctx, SOAP_TYPE_MISMATCH);
 }
 
 std::time_t soap_timegm(std::tm *utc)

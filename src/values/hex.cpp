@@ -11,6 +11,8 @@
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_primitive.h>
 
+#include "core/failure.h"
+#include "core/hex_digit.h"
 #include "values/inline_bytes.h"
 
 namespace {
@@ -42,7 +44,7 @@ inline unsigned char byte_of(char high, char low)
 
 inline bool is_hex_digit(std::int32_t code)
 {
-    return (code >= '0' && code <= '9') || (code >= 'A' && code <= 'F') || (code >= 'a' && code <= 'f');
+    return hex_digit(code) >= 0;
 }
 
 // Decodes the pairs of digits at the start of a stretch into the growing text, which has room for them.
@@ -55,7 +57,7 @@ const char *take_pairs(soap *ctx, const char *text, const char *end)
     return text;
 }
 
-// First character behind blanks.
+// First character after blanks.
 std::int32_t first_character(soap *ctx)
 {
     std::int32_t token = inline_character_next(ctx);
@@ -119,10 +121,8 @@ unsigned char *soap_hex_inline_read(soap *ctx, int *length)
     std::int32_t high = first_character(ctx);
     while (is_hex_digit(high)) {
         const std::int32_t low = inline_character_next(ctx);
-        if (!is_hex_digit(low)) {
-            ctx->error = SOAP_TYPE_MISMATCH;
-            return nullptr;
-        }
+        if (!is_hex_digit(low))
+            return fail_null(ctx, SOAP_TYPE_MISMATCH);
         const inline_stretch stretch = inline_stretch_next(ctx);
         if (soap_text_buffer_reserve(ctx, stretch.length() / 2 + 1))
             return nullptr;

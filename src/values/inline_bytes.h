@@ -11,6 +11,7 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_memory.h>
 
+#include "core/failure.h"
 #include "xml/xml_token.h"
 
 // Bytes of the input buffer that may be taken as they stand as long as they are no markup; they die at the
@@ -27,7 +28,7 @@ inline inline_stretch inline_stretch_next(soap *ctx)
     return {input_here(ctx), input_end(ctx)};
 }
 
-// Everything of the stretch ahead of `position` has been used.
+// Everything of the stretch before `position` has been used.
 inline void inline_stretch_consume(soap *ctx, const char *position)
 {
     if (position != ctx->buffer)
@@ -50,14 +51,12 @@ inline void inline_rest_skip(soap *ctx, std::int32_t token)
     ctx->look_ahead = token;
 }
 
-// The growing text as a managed block with a terminator behind it; null on failure.
+// The growing text as a managed block with a terminator after it; null on failure.
 inline unsigned char *inline_block_save(soap *ctx, int *length)
 {
     const std::size_t count = ctx->label_index;
-    if (count > INT_MAX) {
-        ctx->error = SOAP_LENGTH;
-        return nullptr;
-    }
+    if (count > INT_MAX)
+        return fail_null(ctx, SOAP_LENGTH);
     auto *block = static_cast<unsigned char *>(soap_block_alloc(ctx, count + 1));
     if (block == nullptr)
         return nullptr;

@@ -19,13 +19,14 @@
 #include <zuv_client_pro/soap_primitive.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "core/failure.h"
 #include "xml/scan.h"
 
 namespace {
 
 int refuse(soap *ctx)
 {
-    return ctx->error = SOAP_TYPE_MISMATCH;
+    return fail(ctx, SOAP_TYPE_MISMATCH);
 }
 
 // --- integers ---
@@ -114,7 +115,7 @@ bool parse_plain(const char *text, double *value)
 }
 
 // Everything else that the C library takes: a sign, white space, hexadecimal, numbers out of range, and,
-// where sscanf finds a number at the start, text behind it.
+// where sscanf finds a number at the start, text after it.
 bool parse_by_library(const char *text, double *value)
 {
     const c_locale_scope scope;

@@ -12,7 +12,9 @@
 #include <zuv_client_pro/soap_primitive.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "core/failure.h"
 #include "core/limits.h"
+#include "values/values.h"
 #include "xml/namespace.h"
 #include "xml/utf8.h"
 
@@ -126,12 +128,12 @@ int map_list(soap *ctx, const char *text, char **target, bool narrows)
 {
     text_sink measure = {nullptr, 0, narrows};
     if (!put_list(ctx, text, &measure))
-        return ctx->error = SOAP_NAMESPACE_ERROR;
+        return fail(ctx, SOAP_NAMESPACE_ERROR);
     if (copy_charge(ctx, measure.length) != SOAP_OK)
         return ctx->error;
     auto *mapped = static_cast<char *>(soap_block_alloc(ctx, measure.length + 1));
     if (mapped == nullptr)
-        return ctx->error = SOAP_OUT_OF_MEMORY;
+        return fail(ctx, SOAP_OUT_OF_MEMORY);
     text_sink out = {mapped, 0, narrows};
     put_list(ctx, text, &out);
     mapped[out.length] = '\0';
@@ -167,7 +169,7 @@ int put_text(soap *ctx, std::string_view text)
     return soap_text_buffer_put(ctx, text.data(), text.size());
 }
 
-// Declares a prefix of its own for a URI on the element to come and puts it. The URI stands behind the
+// Declares a prefix of its own for a URI on the element to come and puts it. The URI stands after the
 // growing text for the time of the call, as it needs a terminator.
 int put_new_prefix(soap *ctx, std::string_view uri)
 {
@@ -218,7 +220,7 @@ int soap_qname_read_map(soap *ctx, const char *text, char **target, long minimum
     if (text == nullptr)
         return ctx->error;
     if (!length_allowed(std::strlen(text), minimum, maximum))
-        return ctx->error = SOAP_LENGTH;
+        return fail(ctx, SOAP_LENGTH);
     return map_list(ctx, text, target, false);
 }
 

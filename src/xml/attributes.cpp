@@ -13,6 +13,7 @@
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "core/failure.h"
 #include "xml/attributes.h"
 #include "xml/namespace_scope.h"
 
@@ -158,10 +159,8 @@ soap_attribute *xml_attribute_record(soap *ctx, std::string_view name)
     if (soap_attribute *known = find(chain_of(scope, hash), hash, name))
         return known;
     soap_attribute *record = make_record(ctx, scope, name.size() + 1);
-    if (!record) {
-        ctx->error = SOAP_OUT_OF_MEMORY;
-        return nullptr;
-    }
+    if (!record)
+        return fail_null(ctx, SOAP_OUT_OF_MEMORY);
     record->escape = 0;
     record->uri = nullptr;
     record->visible = 0;
@@ -201,7 +200,7 @@ int xml_attribute_room(soap *ctx, soap_attribute *record, std::size_t size)
     record->size = 0;
     record->value = static_cast<char *>(SOAP_MALLOC(ctx, size));
     if (!record->value)
-        return ctx->error = SOAP_OUT_OF_MEMORY;
+        return fail(ctx, SOAP_OUT_OF_MEMORY);
     record->size = size;
     return 0;
 }
@@ -243,7 +242,7 @@ int soap_attr_set(soap *ctx, const char *name, const char *value, int escape)
     if (record && record->visible != 0)
         return 0;
     if (ctx->attributes_set == std::numeric_limits<std::int16_t>::max())
-        return ctx->error = SOAP_LENGTH;
+        return fail(ctx, SOAP_LENGTH);
     if (!record || (value && xml_attribute_store(ctx, record, value)))
         return ctx->error;
     record->escape = static_cast<std::int16_t>(escape);

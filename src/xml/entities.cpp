@@ -5,6 +5,7 @@
 #include <cstring>
 #include <string_view>
 
+#include "core/hex_digit.h"
 #include "xml/utf8.h"
 #include "xml/xml_token.h"
 
@@ -49,12 +50,11 @@ std::int32_t named_code(const char *name)
     return UNKNOWN;
 }
 
+// 16 for what is no digit.
 int digit_value(char c)
 {
-    if (c >= '0' && c <= '9')
-        return c - '0';
-    const char lower = static_cast<char>(c | 0x20);
-    return lower >= 'a' && lower <= 'f' ? lower - 'a' + 10 : 16;
+    const int value = hex_digit(c);
+    return value < 0 ? 16 : value;
 }
 
 std::int32_t unknown(soap *ctx)
@@ -62,7 +62,7 @@ std::int32_t unknown(soap *ctx)
     return (ctx->mode & MODE_STRICT) != 0 ? xml_refuse(ctx, SOAP_SYNTAX_ERROR) : UNKNOWN;
 }
 
-// What stands behind the "#". The digits end where they end, which strict reading demands to be the end.
+// What stands after the "#". The digits end where they end, which strict reading demands to be the end.
 std::int32_t numbered_code(soap *ctx, std::string_view text)
 {
     const bool hexadecimal = !text.empty() && (text[0] == 'x' || text[0] == 'X');

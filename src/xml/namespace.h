@@ -41,9 +41,6 @@ void xml_prefix_declared(soap *ctx, soap_prefix *record);
 // True if the blank-separated list names the prefix: by itself, or followed by a colon.
 bool xml_list_names(const char *list, std::string_view prefix);
 
-// As soap_qname_read_map without bounds, but the text is UTF-8 whatever the strings of the mode are.
-int xml_qname_map_utf8(soap *ctx, const char *text, char **target);
-
 // Prefix of a QName, empty without a colon.
 inline std::string_view xml_prefix_of(std::string_view name)
 {
@@ -51,6 +48,7 @@ inline std::string_view xml_prefix_of(std::string_view name)
     return colon == std::string_view::npos ? std::string_view() : name.substr(0, colon);
 }
 
+// The rest of a QName, or all of it without a colon.
 constexpr std::string_view xml_local_part(std::string_view name)
 {
     const auto colon = name.find(':');

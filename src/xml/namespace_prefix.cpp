@@ -12,6 +12,7 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_memory.h>
 
+#include "core/failure.h"
 #include "xml/namespace.h"
 #include "xml/namespace_scope.h"
 #include "xml/tag_view.h"
@@ -56,15 +57,11 @@ soap_prefix *take_spare(soap_namespace_scope *scope, std::size_t texts)
 soap_prefix *make_record(soap *ctx, std::size_t texts)
 {
     texts = std::max(texts, USUAL_TEXTS);
-    if (texts > std::numeric_limits<std::uint32_t>::max()) {
-        ctx->error = SOAP_LENGTH;
-        return nullptr;
-    }
+    if (texts > std::numeric_limits<std::uint32_t>::max())
+        return fail_null(ctx, SOAP_LENGTH);
     auto *record = static_cast<soap_prefix *>(SOAP_MALLOC(ctx, offsetof(soap_prefix, prefix) + texts));
-    if (!record) {
-        ctx->error = SOAP_OUT_OF_MEMORY;
-        return nullptr;
-    }
+    if (!record)
+        return fail_null(ctx, SOAP_OUT_OF_MEMORY);
     record->capacity = static_cast<std::uint32_t>(texts);
     return record;
 }
@@ -86,10 +83,8 @@ soap_prefix *push(soap *ctx, std::string_view prefix, const char *uri, std::int1
     soap_namespace_scope *scope = namespace_scope_of(ctx);
     if (!scope)
         return nullptr;
-    if (scope->in_scope >= SOAP_PREFIXES_MAX || prefix.size() > std::numeric_limits<std::uint16_t>::max()) {
-        ctx->error = SOAP_LENGTH;
-        return nullptr;
-    }
+    if (scope->in_scope >= SOAP_PREFIXES_MAX || prefix.size() > std::numeric_limits<std::uint16_t>::max())
+        return fail_null(ctx, SOAP_LENGTH);
     const std::size_t uri_size = uri ? std::strlen(uri) + 1 : 0;
     const std::size_t texts = prefix.size() + 1 + uri_size;
     soap_prefix *record = take_spare(scope, texts);
@@ -307,7 +302,5 @@ const char *soap_namespace_of(soap *ctx, const char *name)
         return xml_row_uri(ctx->local_namespaces[record->index]);
     if (prefix == "xml")
         return XML_NAMESPACE_URI;
-    if (!prefix.empty())
-        ctx->error = SOAP_NAMESPACE_ERROR;
-    return nullptr;
+    return prefix.empty() ? nullptr : fail_null(ctx, SOAP_NAMESPACE_ERROR);
 }

@@ -24,7 +24,7 @@ constexpr std::size_t SPARE_ATTRIBUTE_SIZE =
 // Bytes in a row's own texts.
 struct namespace_lengths {
     std::size_t prefix, uri;
-    std::size_t pattern_head; // of the pattern, ahead of its first "*" or "-"
+    std::size_t pattern_head; // of the pattern, before its first "*" or "-"
 };
 
 struct soap_namespace_scope {

@@ -13,6 +13,7 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_memory.h>
 
+#include "core/failure.h"
 #include "xml/attributes.h"
 #include "xml/namespace.h"
 #include "xml/namespace_scope.h"
@@ -35,7 +36,7 @@ bool same_texts(const soap_namespace &one, const soap_namespace &other)
 }
 
 // True if the table holds just the rows measured last time, none with a received URI. The end of a shorter
-// table differs from the row in its place, so nothing behind it is looked at.
+// table differs from the row in its place, so nothing after it is looked at.
 bool is_measured(const soap_namespace_scope *scope, const soap_namespace *table)
 {
     const auto same_row = [](const soap_namespace &one, const soap_namespace &other) {
@@ -68,7 +69,7 @@ int describe_rows(soap *ctx, const soap_namespace *table, std::size_t count)
     forget_rows(ctx, scope);
     void *place = SOAP_MALLOC(ctx, (count + 1) * (sizeof(soap_namespace) + sizeof(namespace_lengths)));
     if (!place)
-        return ctx->error = SOAP_OUT_OF_MEMORY;
+        return fail(ctx, SOAP_OUT_OF_MEMORY);
     auto *rows = static_cast<soap_namespace *>(place);
     auto *lengths = reinterpret_cast<namespace_lengths *>(rows + count + 1);
     for (std::size_t i = 0; i < count; ++i) {
@@ -134,10 +135,8 @@ soap_namespace_scope *namespace_scope_of(soap *ctx)
     if (ctx->namespace_scope)
         return ctx->namespace_scope;
     void *place = SOAP_MALLOC(ctx, sizeof(soap_namespace_scope));
-    if (!place) {
-        ctx->error = SOAP_OUT_OF_MEMORY;
-        return nullptr;
-    }
+    if (!place)
+        return fail_null(ctx, SOAP_OUT_OF_MEMORY);
     std::memset(place, 0, sizeof(soap_namespace_scope));
     ctx->namespace_scope = static_cast<soap_namespace_scope *>(place);
     // Addresses differ from process to process, which is enough to keep prefixes from being chosen to
@@ -181,7 +180,7 @@ int soap_namespace_table_copy(soap *ctx)
     if (!rows)
         rows = static_cast<soap_namespace *>(SOAP_MALLOC(ctx, (count + 1) * sizeof(soap_namespace)));
     if (!rows)
-        return ctx->error = SOAP_OUT_OF_MEMORY;
+        return fail(ctx, SOAP_OUT_OF_MEMORY);
     std::copy_n(ctx->namespaces, count + 1, rows);
     ctx->local_namespaces = rows;
     std::for_each(rows, rows + count + 1, [](soap_namespace &row) { row.received = nullptr; });
@@ -234,7 +233,7 @@ int xml_received_set(soap *ctx, soap_namespace &row, const char *uri)
     const std::size_t size = std::strlen(uri) + 1;
     auto *copy = static_cast<char *>(SOAP_MALLOC(ctx, size));
     if (!copy)
-        return ctx->error = SOAP_OUT_OF_MEMORY;
+        return fail(ctx, SOAP_OUT_OF_MEMORY);
     std::memcpy(copy, uri, size);
     xml_received_drop(ctx, row);
     row.received = copy;

@@ -4,6 +4,7 @@
 #pragma once
 
 #include <cstdint>
+#include <cstring>
 
 // White space of the "C" locale.
 inline bool is_c_space(char byte)
@@ -18,7 +19,7 @@ inline bool is_digit(char byte)
 
 // Result of scan_integer. Numbers of any length are safe: past 64 bits only `overflow` tells.
 struct scanned_integer {
-    const char *end;         // behind the last digit; the start of the text without digits
+    const char *end;         // after the last digit; the start of the text without digits
     std::uint64_t magnitude; // UINT64_MAX on overflow
     bool negative;
     bool digits;   // there was at least one
@@ -39,7 +40,7 @@ struct scanned_integer {
     std::uint64_t as_unsigned() const { return negative && !overflow ? 0 - magnitude : magnitude; }
 };
 
-// Reads white space, a sign and digits; at most `width` bytes behind the white space, 0 for any number.
+// Reads white space, a sign and digits; at most `width` bytes after the white space, 0 for any number.
 inline scanned_integer scan_integer(const char *text, int width = 0)
 {
     scanned_integer number = {text, 0, false, false, false};
@@ -59,4 +60,13 @@ inline scanned_integer scan_integer(const char *text, int width = 0)
     if (number.digits)
         number.end = at;
     return number;
+}
+
+// After the next ",", or if there is none, the next blank; null if neither is there.
+inline const char *after_separator(const char *text)
+{
+    const char *found = std::strchr(text, ',');
+    if (found == nullptr)
+        found = std::strchr(text, ' ');
+    return found != nullptr ? found + 1 : nullptr;
 }

@@ -7,6 +7,7 @@
 
 #include <zuv_client_pro/soap_error.h>
 
+#include "core/failure.h"
 #include "xml/namespace.h"
 #include "xml/namespace_scope.h"
 #include "xml/tag_view.h"
@@ -147,7 +148,7 @@ int soap_prefix_compare(soap *ctx, const char *read, const char *asked, std::siz
     if (is_xml_prefix(read, read_length) && is_xml_prefix(asked, asked_length) && row == TAG_ROW_UNBOUND)
         return 0;
     if (row == TAG_ROW_UNDECLARED)
-        return ctx->error = SOAP_SYNTAX_ERROR;
+        return fail(ctx, SOAP_SYNTAX_ERROR);
     if (row < 0)
         return SOAP_NAMESPACE_ERROR;
     return namespace_row_has_prefix(ctx, row, asked, asked_length) ? 0 : SOAP_NAMESPACE_ERROR;

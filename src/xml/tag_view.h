@@ -34,7 +34,7 @@ inline void xml_prefix_rows_forget(soap *ctx)
     ctx->tag_resolved = false;
 }
 
-// The row's prefix fits the one asked for: equal, or with a "_" behind it.
+// The row's prefix fits the one asked for: equal, or with a "_" after it.
 bool xml_row_has_prefix(const soap *ctx, int row, const char *prefix, std::size_t length);
 
 namespace tag_hash_detail {

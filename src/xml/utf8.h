@@ -67,5 +67,5 @@ std::size_t utf8_encode(std::uint32_t code, char target[6]);
 // The new length.
 std::size_t utf8_to_latin1(char *text, std::size_t length);
 
-// Code point of the well-formed character at `p`, which goes on to behind it.
+// Code point of the well-formed character at `p`, which moves past it.
 std::uint32_t utf8_decode(const char *&p);

@@ -31,7 +31,7 @@ inline const char *input_end(const soap *ctx)
     return ctx->buffer + ctx->buffer_length;
 }
 
-// Everything ahead of `position`, a place in the unread stretch, has been used.
+// Everything before `position`, a place in the unread stretch, has been used.
 inline void input_consume(soap *ctx, const char *position)
 {
     ctx->buffer_index = static_cast<std::size_t>(position - ctx->buffer);

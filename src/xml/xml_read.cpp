@@ -11,6 +11,7 @@
 #include <cstring>
 #include <string_view>
 
+#include "core/failure.h"
 #include "xml/attributes.h"
 #include "xml/namespace.h"
 
@@ -21,7 +22,7 @@ int no_tag(soap *ctx, int error)
     ctx->tag[0] = '\0';
     ctx->tag_length = 0;
     ctx->has_body = 1; // whatever comes is content of the element around it
-    return ctx->error = error;
+    return fail(ctx, error);
 }
 
 // A code left by a search that found nothing says nothing about the input; any other tells why it ended.
@@ -48,7 +49,7 @@ void forget_tag(soap *ctx)
     ctx->must_understand = 0;
 }
 
-// A byte-order mark may stand ahead of a tag. 0 when the next token can be read, 47 on UTF-16.
+// A byte-order mark may stand before a tag. 0 when the next token can be read, 47 on UTF-16.
 int pass_byte_order_mark(soap *ctx)
 {
     if (ctx->look_ahead < 0 || ctx->in_cdata != CDATA_OUTSIDE)
@@ -126,7 +127,7 @@ int find_start_tag(soap *ctx)
     return find_start_tag_slow(ctx);
 }
 
-// Takes the name at `name` and the ">" behind it, which most tags are, if it is short. False: nothing was
+// Takes the name at `name` and the ">" after it, which most tags are, if it is short. False: nothing was
 // consumed. The buffer must hold SHORT_NAME bytes there.
 template <template <bool> class Stop> bool take_plain_name(soap *ctx, const char *name)
 {
@@ -316,7 +317,7 @@ bool has_undeclared_type(const soap *ctx)
         return ctx->error;
     }
     if (ctx->other_flag != 0)
-        return ctx->error = SOAP_TAG_MISMATCH;
+        return fail(ctx, SOAP_TAG_MISMATCH);
     if (!own_element)
         return ctx->error = 0;
     ctx->error = soap_tag_compare(ctx, ctx->tag, tag);
@@ -325,12 +326,12 @@ bool has_undeclared_type(const soap *ctx)
     // Refused tags stay held, so that nesting_level still tells where the reader is.
     if (type != nullptr && ctx->element_type[0] != '\0' &&
         soap_tag_compare(ctx, ctx->element_type, type) != 0)
-        return ctx->error = SOAP_TYPE_MISMATCH;
+        return fail(ctx, SOAP_TYPE_MISMATCH);
     if ((ctx->mode & MODE_STRICT) != 0) {
         if (has_undeclared_type(ctx))
-            return ctx->error = SOAP_TYPE_MISMATCH;
+            return fail(ctx, SOAP_TYPE_MISMATCH);
         if (nil_allowed == 0 && ctx->null_flag != 0)
-            return ctx->error = SOAP_NIL;
+            return fail(ctx, SOAP_NIL);
     }
     ctx->error = enter_element(ctx);
     if (ctx->error == 0)
@@ -348,11 +349,11 @@ bool has_undeclared_type(const soap *ctx)
         return ctx->error = end_of_input(ctx);
     const int error = read_end_tag_name(ctx);
     if (error != 0)
-        return ctx->error = error;
+        return fail(ctx, error);
     if (!any_name) {
         pop_prefixes(ctx);
         if (soap_tag_compare(ctx, ctx->tag, tag) != 0)
-            return ctx->error = SOAP_SYNTAX_ERROR;
+            return fail(ctx, SOAP_SYNTAX_ERROR);
     }
     leave_element(ctx);
     return ctx->error = 0;
@@ -374,7 +375,7 @@ void xml_name_character(soap *ctx, char *name, std::size_t &kept)
 int soap_element_head_read(soap *ctx)
 {
     if (ctx->peeked != 0)
-        return ctx->tag[0] != '\0' ? 0 : ctx->error = SOAP_NO_TAG;
+        return ctx->tag[0] != '\0' ? 0 : fail(ctx, SOAP_NO_TAG);
     forget_tag(ctx);
     if (!read_plain_tag(ctx))
         return read_head(ctx);
@@ -427,9 +428,9 @@ int soap_element_skip(soap *ctx)
     if (soap_element_head_read(ctx) != 0)
         return ctx->error;
     if (ctx->must_understand != 0 && ctx->other_flag == 0)
-        return ctx->error = SOAP_MUST_UNDERSTAND;
+        return fail(ctx, SOAP_MUST_UNDERSTAND);
     if ((ctx->mode & MODE_STRICT) != 0 && ctx->message_part != PART_HEADER)
-        return ctx->error = SOAP_TAG_MISMATCH;
+        return fail(ctx, SOAP_TAG_MISMATCH);
     ctx->peeked = 0;
     ctx->error = enter_element(ctx);
     if (ctx->error != 0 || ctx->has_body == 0)

@@ -11,7 +11,7 @@
 // A name up to this many bytes is copied by one block of so many: cheaper than a copy of its exact length.
 constexpr std::size_t SHORT_NAME = 64;
 
-// Reads the attributes behind a tag's name up to the ">" or "/" that ends them, which stays unread: records
+// Reads the attributes after a tag's name up to the ">" or "/" that ends them, which stays unread: records
 // in the attribute table, declarations on the prefix stack. 0, -1, 5, 20 or 47. `names_wide` is set if values
 // that are names are UTF-8 though strings are Latin-1, until they have been applied.
 int xml_attributes_read(soap *ctx, bool *names_wide);

@@ -6,6 +6,7 @@
 // Always: an attribute costs the same however many the element has.
 #include <algorithm>
 #include <array>
+#include <climits>
 #include <cstring>
 #include <string_view>
 
@@ -13,6 +14,7 @@
 
 #include "xml/attributes.h"
 #include "xml/namespace.h"
+#include "xml/scan.h"
 #include "xml/xml_read.h"
 
 namespace {
@@ -28,7 +30,7 @@ constexpr char NEXT_ROLE[] = "http://www.w3.org/2003/05/soap-envelope/role/next"
 // are understood first.
 struct attribute_order {
     soap *ctx;
-    soap_attribute **end; // behind the last one
+    soap_attribute **end; // after the last one
 
     explicit attribute_order(soap *context) : ctx(context), end(&context->attribute_list) {}
 
@@ -54,7 +56,7 @@ int store_value(soap *ctx, soap_attribute *record, const char *text, std::size_t
 
 // ------------------------------------------------------------------------------------------ values
 
-// A byte that a value goes on behind, but not as it stands.
+// A byte that a value continues after, but not as it stands.
 bool is_special(char c)
 {
     return c == '&' || is_high(c) || is_control(c);
@@ -401,4 +403,20 @@ void xml_attributes_apply(soap *ctx, bool names_wide)
             narrow_value(p);
     }
     ctx->error = 0;
+}
+
+int soap_position_parse(const char *text, int *numbers)
+{
+    int count = 0;
+    if (text == nullptr || *text != '[')
+        return 0;
+    for (const char *at = text + 1; at != nullptr && count < static_cast<int>(SOAP_POSITIONS_MAX);
+         at = after_separator(at)) {
+        const scanned_integer number = scan_integer(at);
+        if (!number.digits || number.as_signed() < INT_MIN || number.as_signed() > INT_MAX)
+            break;
+        numbers[count++] = static_cast<int>(number.as_signed());
+        at = number.end;
+    }
+    return count;
 }

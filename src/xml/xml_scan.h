@@ -123,7 +123,7 @@ template <bool High> using markup_stop = byte_class<false, High, '<', '&'>;
 template <bool High> using literal_stop = byte_class<false, High>;
 
 // From a byte of 128 or above on, the first that ends well-formed UTF-8 or is of the class Stop<false>; a
-// character that goes on behind `end` ends it too. Nothing behind the result is looked at twice, so that the
+// character that continues after `end` ends it too. Nothing after the result is looked at twice, so that the
 // cost is linear however often a text is broken off.
 template <template <bool> class Stop>
 [[gnu::noinline]] const char *utf8_stretch_end(const char *p, const char *end)

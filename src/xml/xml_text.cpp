@@ -1,7 +1,7 @@
 // xml_text.cpp - text of elements as byte strings.
 //
 // Here: text in place, gathered text, simple values. Elsewhere: raw XML (xml_text_raw.cpp), wide strings
-// (xml_text_wide.cpp), whole string elements (xml_text_elements.cpp).
+// (xml_text_wide.cpp), whole string elements (values/string_element.cpp).
 //
 // Always: text runs in stretches between two special bytes; only those go through the tokens. Gathered text
 // stands in the growing text and is copied once to managed memory.
@@ -12,6 +12,7 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_primitive.h>
 
+#include "core/failure.h"
 #include "xml/namespace.h"
 #include "xml/xml_scan.h"
 
@@ -85,10 +86,8 @@ std::size_t trimmed_length(const char *text, std::size_t length)
 
 const char *simple_value_done(soap *ctx, std::size_t length, bool cut)
 {
-    if (cut && (ctx->mode & MODE_STRICT) != 0) {
-        ctx->error = SOAP_LENGTH;
-        return nullptr;
-    }
+    if (cut && (ctx->mode & MODE_STRICT) != 0)
+        return fail_null(ctx, SOAP_LENGTH);
     ctx->scratch_text[trimmed_length(ctx->scratch_text, length)] = '\0';
     return ctx->scratch_text;
 }
@@ -120,23 +119,6 @@ const char *simple_value_by_tokens(soap *ctx)
     }
     token_push_back(ctx, token);
     return xml_is_refused(ctx) ? nullptr : simple_value_done(ctx, length, !ends_simple_value(token));
-}
-
-// Form 0 or 1 of a string, in place or in the growing text. Null on failure.
-const char *string_text(soap *ctx, int form, long minimum, long maximum, std::size_t *length)
-{
-    const char *text;
-    if (form != 0 && xml_text_in_place(ctx, &text, length)) {
-        if (fits(ctx, text, *length, minimum, maximum))
-            return text;
-        ctx->error = SOAP_LENGTH;
-        return nullptr;
-    }
-    text_limits limits{minimum, maximum};
-    if ((form == 0 ? text_gather_raw(ctx, limits) : gather_text(ctx, limits)) != 0)
-        return nullptr;
-    *length = ctx->label_index;
-    return ctx->label_index != 0 ? ctx->label_buffer : "";
 }
 
 } // namespace
@@ -191,21 +173,19 @@ const char *soap_text_read(soap *ctx, std::size_t *length)
     return ctx->label_buffer;
 }
 
-char *soap_string_read(soap *ctx, int form, long minimum, long maximum)
+const char *xml_string_text(soap *ctx, int form, long minimum, long maximum, std::size_t *length)
 {
-    std::size_t length;
-    if (form != 2) {
-        const char *const text = string_text(ctx, form, minimum, maximum, &length);
-        return text != nullptr ? soap_string_dup_n(ctx, text, length) : nullptr;
+    const char *text;
+    if (form != 0 && xml_text_in_place(ctx, &text, length)) {
+        if (fits(ctx, text, *length, minimum, maximum))
+            return text;
+        return fail_null(ctx, SOAP_LENGTH);
     }
-    // Prefixes are declared in UTF-8 and have to be looked up in it.
-    const std::uint32_t strings = ctx->mode & MODE_UTF_STRINGS;
-    ctx->mode |= MODE_UTF_STRINGS;
-    const char *text = string_text(ctx, 1, minimum, maximum, &length);
-    text = text != nullptr ? soap_string_dup_n(ctx, text, length) : nullptr;
-    ctx->mode = (ctx->mode & ~MODE_UTF_STRINGS) | strings;
-    char *mapped = nullptr;
-    return text != nullptr && xml_qname_map_utf8(ctx, text, &mapped) == 0 ? mapped : nullptr;
+    text_limits limits{minimum, maximum};
+    if ((form == 0 ? text_gather_raw(ctx, limits) : gather_text(ctx, limits)) != 0)
+        return nullptr;
+    *length = ctx->label_index;
+    return ctx->label_index != 0 ? ctx->label_buffer : "";
 }
 
 const char *soap_simple_value_read(soap *ctx)

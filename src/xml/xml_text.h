@@ -91,7 +91,7 @@ public:
     text_depth() = default;
     explicit text_depth(bool held, bool open) : held_(held), open_(open ? 1 : 0) {}
 
-    // Takes the next token into account. True: the text ends ahead of it.
+    // Takes the next token into account. True: the text ends before it.
     bool ends_at(std::int32_t token);
 
     bool in_tag() const { return in_tag_; }
@@ -114,3 +114,7 @@ text_depth text_take_held_tag(soap *ctx, std::size_t *length);
 
 // Form 0 of soap_string_read, gathered in the growing text. 0 or an error.
 int text_gather_raw(soap *ctx, text_limits &limits);
+
+// The content of an element as form 0 or 1 of soap_string_read, in place or in the growing text, not
+// terminated; until the next read. Null on failure.
+const char *xml_string_text(soap *ctx, int form, long minimum, long maximum, std::size_t *length);

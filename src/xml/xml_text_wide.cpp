@@ -3,6 +3,8 @@
 // Always: gathered in a block stack, 256 characters a block, and copied once to one managed array.
 #include <zuv_client_pro/soap_error.h>
 
+#include "core/failure.h"
+#include "core/memory.h"
 #include "xml/xml_text.h"
 
 namespace {
@@ -22,7 +24,7 @@ struct wide_sink {
             block = static_cast<char32_t *>(
                 soap_block_stack_grow(ctx, nullptr, BLOCK_CHARACTERS * sizeof(char32_t)));
             if (block == nullptr)
-                return ctx->error = SOAP_OUT_OF_MEMORY;
+                return fail(ctx, SOAP_OUT_OF_MEMORY);
             used = 0;
         }
         block[used++] = character;
@@ -32,7 +34,7 @@ struct wide_sink {
     int put_counted(char32_t character)
     {
         if (count == maximum)
-            return ctx->error = SOAP_LENGTH;
+            return fail(ctx, SOAP_LENGTH);
         ++count;
         return put(character);
     }
@@ -107,7 +109,7 @@ char32_t *soap_wide_string_read(soap *ctx, int form, long minimum, long maximum)
     wide_sink sink{ctx, maximum < 0 ? UINT64_MAX : static_cast<std::uint64_t>(maximum)};
     int error = gather_wide(ctx, sink, form == 0);
     if (error == 0 && minimum > 0 && sink.count < static_cast<std::uint64_t>(minimum))
-        error = ctx->error = SOAP_LENGTH;
+        error = fail(ctx, SOAP_LENGTH);
     if (error == 0)
         error = sink.put(U'\0');
     if (error != 0) {
@@ -115,5 +117,5 @@ char32_t *soap_wide_string_read(soap *ctx, int form, long minimum, long maximum)
         return nullptr;
     }
     soap_block_stack_trim(ctx, nullptr, sink.used * sizeof(char32_t));
-    return static_cast<char32_t *>(soap_block_stack_save(ctx, nullptr, nullptr, 0));
+    return static_cast<char32_t *>(block_stack_gather(ctx, nullptr, nullptr, nullptr));
 }

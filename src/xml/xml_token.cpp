@@ -11,6 +11,7 @@
 
 #include <zuv_client_pro/soap_error.h>
 
+#include "core/failure.h"
 #include "core/text_encoding.h"
 #include "xml/utf8.h"
 #include "xml/xml_scan.h"
@@ -292,7 +293,7 @@ static bool skips_too_deep(soap *ctx, std::uint64_t depth)
 {
     if (ctx->max_depth == 0 || ctx->nesting_level + depth < ctx->max_depth)
         return false;
-    ctx->error = SOAP_LENGTH;
+    fail(ctx, SOAP_LENGTH);
     return true;
 }
 

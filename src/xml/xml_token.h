@@ -10,12 +10,12 @@
 
 #include "xml/xml_input.h"
 
-// Result of xml_markup_next for a construct that no caller sees: reading goes on behind it. No character has
+// Result of xml_markup_next for a construct that no caller sees: reading continues after it. No character has
 // this value: a reference to zero is an unknown one.
 constexpr std::int32_t XML_SKIPPED = INT32_MIN;
 
 // Values of soap::in_cdata. In a section with one "]" that was looked at but not yet handed out, the
-// next byte is behind that bracket.
+// next byte is after that bracket.
 constexpr std::int16_t CDATA_OUTSIDE = 0;
 constexpr std::int16_t CDATA_INSIDE = 1;
 constexpr std::int16_t CDATA_BRACKET_DUE = 2;
@@ -39,7 +39,7 @@ inline std::int32_t xml_no_character(soap *ctx, int error)
     return (ctx->mode & MODE_STRICT) != 0 ? xml_refuse(ctx, error) : '?';
 }
 
-// A reference as it stands, from behind its "&" up to the ";" if there is one.
+// A reference as it stands, from after its "&" up to the ";" if there is one.
 struct xml_reference {
     char text[64];
     std::size_t length = 0;
@@ -48,11 +48,11 @@ struct xml_reference {
 // Reads a reference whose "&" has been read. Results as soap_entity_read.
 std::int32_t xml_reference_read(soap *ctx, xml_reference &reference);
 
-// Goes on behind a "<": XML_START (the byte after it is unread), XML_END, XML_EOF, or XML_SKIPPED after a
+// Continues after a "<": XML_START (the byte after it is unread), XML_END, XML_EOF, or XML_SKIPPED after a
 // comment, declaration or instruction, or at the start of a CDATA section.
 std::int32_t xml_markup_next(soap *ctx);
 
-// Goes on behind an XML_START to the end of the tag. 1 if it ended in "/>", 0 in ">", XML_EOF.
+// Continues after an XML_START to the end of the tag. 1 if it ended in "/>", 0 in ">", XML_EOF.
 int xml_skip_tag(soap *ctx);
 
 // Drops content up to and including the "</" that closes `depth` elements and the one around them; bounded in

@@ -1,7 +1,7 @@
 // xml_write.cpp - elements out: start tags with what they carry, end tags, empty elements.
 //
 // Here: the tags in all output modes. Elsewhere: text and escapes (xml_write_text.cpp), arrays and string
-// elements (xml_write_values.cpp), the envelope (envelope_write.cpp), canonical order
+// elements (values/string_element.cpp), the envelope (exchange/envelope_frame.cpp), canonical order
 // (xml_write_canonical.cpp), the attribute table (attributes.cpp), prefixes in scope (namespace_prefix.cpp).
 //
 // Always: a message is written twice when its length must be known first, and both passes give the same
@@ -202,7 +202,7 @@ int write_empty(soap *ctx, const char *tag, int id, const char *type, const char
     return soap_element_attrs_close(ctx, tag);
 }
 
-// "#_%d" for the attribute href; the name alone stands behind the "#".
+// "#_%d" for the attribute href; the name alone stands after the "#".
 void compose_reference(char *text, std::size_t size, int number)
 {
     text[0] = '#';

@@ -10,6 +10,7 @@
 
 #include <zuv_client_pro/soap_error.h>
 
+#include "core/failure.h"
 #include "xml/namespace.h"
 #include "xml/xml_write.h"
 
@@ -128,7 +129,7 @@ int declare(soap *ctx, soap_prefix *record)
 {
     char name[PREFIX_DECLARATION_SIZE];
     if (!compose_declaration(record, name))
-        return ctx->error = SOAP_LENGTH;
+        return fail(ctx, SOAP_LENGTH);
     xml_prefix_declared(ctx, record);
     return soap_attr_set(ctx, name, record->uri, 1);
 }

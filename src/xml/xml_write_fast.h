@@ -13,6 +13,8 @@
 #include <zuv_client_pro/soap_io.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "core/failure.h"
+
 // Modes in which a start or end tag is more than its name in brackets.
 constexpr std::uint32_t XML_SPECIAL_TAGS = MODE_INDENT | MODE_DEFAULT_NAMESPACE | MODE_CANONICAL;
 
@@ -40,7 +42,7 @@ inline int xml_enter(soap *ctx)
     ++ctx->nesting_level;
     // A limit of 0 wraps around to the largest number and so never holds.
     if (ctx->nesting_level - 1U > ctx->max_depth - 1U)
-        return ctx->error = SOAP_LENGTH;
+        return fail(ctx, SOAP_LENGTH);
     return 0;
 }
 

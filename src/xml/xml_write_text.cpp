@@ -21,6 +21,7 @@
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "core/failure.h"
 #include "xml/xml_scan.h"
 #include "xml/xml_write.h"
 
@@ -163,9 +164,9 @@ template <place P>
     std::snprintf(text, sizeof text, format, value);
     if (ctx->fault == nullptr) { // which may be what is being written
         if (const char *const copy = soap_string_dup(ctx, text))
-            soap_fault_sender(ctx, copy, nullptr, SOAP_UTF_ERROR);
+            fail_as_sender(ctx, copy, nullptr, SOAP_UTF_ERROR);
     }
-    return ctx->error = SOAP_UTF_ERROR;
+    return fail(ctx, SOAP_UTF_ERROR);
 }
 
 int refuse_character(soap *ctx, std::uint32_t code)
@@ -183,7 +184,7 @@ int refuse_bytes(soap *ctx, char byte)
 template <bool High> using element_stop = byte_class<false, High, '<', '>', '&', '\n', '\r'>;
 template <bool High> using attribute_stop = byte_class<false, High, '<', '"', '&', '\t', '\n', '\r'>;
 
-// From a byte of 128 or above on, sends what is of UTF-8 and needs no escape. `text` goes on to behind it.
+// From a byte of 128 or above on, sends what is of UTF-8 and needs no escape. `text` moves past it.
 template <place P> int put_utf8(soap *ctx, const char *&text, const char *end)
 {
     const char *stop = end - text > STRETCH ? text + STRETCH : end;

@@ -86,18 +86,18 @@ TEST(published_contract, gives_every_type_id_a_row_and_every_class_one_home)
             ++found;
         return found;
     };
-    std::size_t declared = 0, laws = 0, defined = 0;
+    std::size_t declared = 0, traits = 0, defined = 0;
     for (const emitted_file &file : result.files) {
         declared += count(file.text, "\nclass ZUV_CLASS ") - count(file.text, "Proxy : public soap {");
-        laws += count(file.text, "struct law<");
+        traits += count(file.text, "struct traits<");
         const std::size_t in_unit = count(file.text, "BINDING_DEFINE_CLASS(");
         EXPECT_LE(in_unit, 40U) << file.path;
         defined += in_unit;
     }
     const std::size_t ids = count(result.model, "\ntype ");
-    EXPECT_EQ(declared, laws);
+    EXPECT_EQ(declared, traits);
     EXPECT_EQ(declared, defined);
-    EXPECT_EQ(declared, count(result.output("src/registry_tables.cpp"), ".ops = &law<") - 1); // base64Binary
+    EXPECT_EQ(declared, count(result.output("src/registry_tables.cpp"), ".ops = &traits<") - 1); // base64Binary
     EXPECT_EQ(ids, count(result.output("include/zuv_client_pro/type_ids.h"), "    SOAP_TYPE_"));
 }
 

@@ -17,7 +17,7 @@
 #include <zuv_client_pro/soap_registry.h>
 #include <zuv_client_pro/type_ids.h>
 
-#include "binding/law_binary.h"
+#include "binding/traits_binary.h"
 #include "binding/registry.h"
 
 namespace random_objects {
@@ -82,7 +82,7 @@ public:
     // An object of the class, or now and then of one derived from it.
     template <class T> T *object(int depth)
     {
-        if (T *shared = again<T>(binding::law<T>::type_id))
+        if (T *shared = again<T>(binding::traits<T>::type_id))
             return shared;
         const binding::class_ops *ops = chance(2) ? derived(binding::ops_of<T>) : &binding::ops_of<T>;
         void *made = soap_instantiate(ctx_, ops->type_id, nullptr, nullptr, nullptr);
@@ -142,7 +142,7 @@ template <class V> void fill_new(source &random, V &value, int type_id, int dept
     else if constexpr (std::is_same_v<V, bool>)
         value = random.chance(2);
     else if constexpr (std::is_enum_v<V>)
-        value = static_cast<V>(random.below(enum_law<V>::count));
+        value = static_cast<V>(random.below(enum_traits<V>::count));
     else if constexpr (std::is_same_v<V, double>)
         value = static_cast<double>(random.below(1000000)) / 64.0;
     else if constexpr (std::is_arithmetic_v<V>)
@@ -252,37 +252,37 @@ template <class V> void fill_attribute(source &random, V &member, bool required)
 
 template <class T> void fill(source &random, T &object, int depth)
 {
-    using law = binding::law<T>;
-    if constexpr (!std::is_void_v<typename law::base>)
-        fill<typename law::base>(random, object, depth);
+    using traits = binding::traits<T>;
+    if constexpr (!std::is_void_v<typename traits::base>)
+        fill<typename traits::base>(random, object, depth);
     std::apply([&](const auto &...row) { (fill_attribute(random, object.*row.member, row.required), ...); },
-               law::attributes);
-    if constexpr (law::text != nullptr)
-        object.*law::text = random.text();
+               traits::attributes);
+    if constexpr (traits::text != nullptr)
+        object.*traits::text = random.text();
     std::apply(
         [&](const auto &...row) {
             (fill_member(random, object.*row.member, row.how, row.item_type, row.minimum, depth), ...);
         },
-        law::elements);
+        traits::elements);
 }
 
 template <class T> bool equal(const T &one, const T &other)
 {
-    using law = binding::law<T>;
-    if constexpr (!std::is_void_v<typename law::base>) {
-        if (!equal<typename law::base>(one, other))
+    using traits = binding::traits<T>;
+    if constexpr (!std::is_void_v<typename traits::base>) {
+        if (!equal<typename traits::base>(one, other))
             return false;
     }
-    if constexpr (law::text != nullptr) {
-        if (one.*law::text != other.*law::text)
+    if constexpr (traits::text != nullptr) {
+        if (one.*traits::text != other.*traits::text)
             return false;
     }
     return std::apply(
                [&](const auto &...row) { return (... && equal_value(one.*row.member, other.*row.member)); },
-               law::attributes) &&
+               traits::attributes) &&
            std::apply(
                [&](const auto &...row) { return (... && equal_value(one.*row.member, other.*row.member)); },
-               law::elements);
+               traits::elements);
 }
 
 template <class T>

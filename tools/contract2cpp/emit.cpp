@@ -20,7 +20,7 @@ std::vector<emitted_file> emit_contract(const contract_model &model, const std::
     files.push_back(emit_type_ids(model));
     for (const service_namespace &service : model.services) {
         files.push_back(emit_service_header(service));
-        files.push_back(emit_law_header(service));
+        files.push_back(emit_traits_header(service));
         add(emit_class_units(model, service));
     }
     files.push_back(emit_class_list(model));

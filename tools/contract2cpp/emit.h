@@ -26,7 +26,7 @@ std::vector<emitted_file> emit_contract(const contract_model &model, const std::
 // The families of files.
 emitted_file emit_type_ids(const contract_model &model);
 emitted_file emit_service_header(const service_namespace &service);
-emitted_file emit_law_header(const service_namespace &service);
+emitted_file emit_traits_header(const service_namespace &service);
 std::vector<emitted_file> emit_class_units(const contract_model &model, const service_namespace &service);
 emitted_file emit_class_list(const contract_model &model);
 emitted_file emit_registry_tables(const contract_model &model);

@@ -32,7 +32,7 @@ std::string tuple(const std::vector<std::string> &rows)
                         : "std::make_tuple(\n        " + joined(rows, ",\n        ") + ")";
 }
 
-std::string law_text(const data_class &type)
+std::string traits_text(const data_class &type)
 {
     std::vector<std::string> attributes, elements;
     for (const class_attribute &attribute : type.attributes)
@@ -40,7 +40,7 @@ std::string law_text(const data_class &type)
                              attribute.name + ", " + (attribute.required ? "true" : "false") + "}");
     for (const class_member &member : type.members)
         elements.push_back(element_row(member));
-    return "template <> struct law<" + type.name + "> {\n" + "    using self = " + type.name + ";\n" +
+    return "template <> struct traits<" + type.name + "> {\n" + "    using self = " + type.name + ";\n" +
            "    using base = " + (type.base.empty() ? "void" : type.base) + ";\n" +
            "    static constexpr int type_id = " + type.type_id + ";\n" +
            "    static constexpr char xml_type[] = " + string_literal(type.xml_type) + ";\n" +
@@ -52,10 +52,10 @@ std::string law_text(const data_class &type)
            "    static const class_ops ops;\n" + "};\n";
 }
 
-std::string enumeration_law(const enumeration &type)
+std::string enumeration_traits(const enumeration &type)
 {
     const std::string count = std::to_string(type.literals.size());
-    return "template <> struct enum_law<" + type.name + "> {\n" +
+    return "template <> struct enum_traits<" + type.name + "> {\n" +
            "    static constexpr int type_id = " + type.type_id + ";\n" +
            "    static constexpr char xml_type[] = " + string_literal(type.xml_type) + ";\n" +
            "    static constexpr std::uint32_t count = " + count + ";\n" +
@@ -64,7 +64,7 @@ std::string enumeration_law(const enumeration &type)
 
 std::string codes_text(const enumeration &type)
 {
-    std::string text = "const soap_code_row enum_law<" + type.name + ">::codes[] = {\n";
+    std::string text = "const soap_code_row enum_traits<" + type.name + ">::codes[] = {\n";
     for (std::size_t code = 0; code < type.literals.size(); ++code)
         text += "    {" + std::to_string(code) + ", " + string_literal(type.literals[code].text) + "},\n";
     return text + "    {0, nullptr},\n};\n";
@@ -82,7 +82,7 @@ const data_class *class_of(const contract_model &model, const std::string &name)
 }
 
 // Namespaces whose member lists the rules of a class look into: its own, its bases' and those of all members.
-std::set<std::string> laws_needed(const contract_model &model, const data_class &type)
+std::set<std::string> traits_needed(const contract_model &model, const data_class &type)
 {
     std::set<std::string> prefixes;
     for (const data_class *part = &type; part; part = class_of(model, part->base)) {
@@ -101,13 +101,13 @@ emitted_file emit_class_unit(const contract_model &model, const service_namespac
                              std::size_t first, std::size_t last)
 {
     const std::string name = "classes_" + service.prefix + "_" + std::to_string(unit) + ".cpp";
-    std::set<std::string> laws = {service.prefix};
+    std::set<std::string> traits = {service.prefix};
     for (std::size_t i = first; i < last; ++i)
-        laws.merge(laws_needed(model, service.classes[i]));
+        traits.merge(traits_needed(model, service.classes[i]));
     std::string text = opening(name, service.file, "");
     text += "#include \"binding/class_rules.h\"\n";
-    for (const std::string &prefix : laws)
-        text += "#include \"law_" + prefix + ".h\"\n";
+    for (const std::string &prefix : traits)
+        text += "#include \"traits_" + prefix + ".h\"\n";
     if (unit == 1 && !service.enumerations.empty()) {
         text += "\nnamespace binding {\n\n";
         for (const enumeration &type : service.enumerations)
@@ -122,9 +122,9 @@ emitted_file emit_class_unit(const contract_model &model, const service_namespac
 
 } // namespace
 
-emitted_file emit_law_header(const service_namespace &service)
+emitted_file emit_traits_header(const service_namespace &service)
 {
-    const std::string name = "law_" + service.prefix + ".h";
+    const std::string name = "traits_" + service.prefix + ".h";
     std::set<std::string> headers = {service.prefix, "type_ids"};
     for (const data_class &type : service.classes) {
         for (const class_member &member : type.members) {
@@ -134,11 +134,11 @@ emitted_file emit_law_header(const service_namespace &service)
     }
     std::string text = opening(name, service.file, "The member lists of the classes, in wire order.");
     text += "#pragma once\n\n" + public_includes(headers) +
-            "\n#include \"binding/law.h\"\n\nnamespace binding {\n\n";
+            "\n#include \"binding/traits.h\"\n\nnamespace binding {\n\n";
     for (const enumeration &type : service.enumerations)
-        text += enumeration_law(type);
+        text += enumeration_traits(type);
     for (const data_class &type : service.classes)
-        text += law_text(type);
+        text += traits_text(type);
     return {"src/" + name, text + "\n} // namespace binding\n"};
 }
 

@@ -46,16 +46,13 @@ emitted_file proxy_source(const port &port)
     const std::string name = port.binding + "Proxy";
     std::string text = opening(name + ".cpp", port.file, "");
     text += public_includes({name, "type_ids"}) + "\n";
-    for (const std::string &prefix : headers_of(port))
-        text += "#include \"law_" + prefix + ".h\"\n";
     text += "#include \"contract_namespaces.h\"\n#include \"exchange/proxy_rules.h\"\n\n";
     text += "static constexpr char default_endpoint[] = " + string_literal(port.address) + ";\n\n";
     text += "PROXY_DEFINE_MEMBERS(" + name + ", " + port.name + "_namespaces)\n";
     for (const operation &operation : port.operations)
         text += "\nPROXY_DEFINE_CALL(" +
                 joined({name, operation.name, operation.request.object, operation.response.name,
-                        string_literal(operation.request.element), operation.response.object,
-                        string_literal(operation.response.element), operation.response.type_id},
+                        operation.request.type_id, operation.response.type_id},
                        ",\n                  ") +
                 ")\n";
     return {"src/" + name + ".cpp", text};

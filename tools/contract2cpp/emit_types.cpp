@@ -26,7 +26,7 @@ std::string type_row(const identified_type &type)
         return row("text", "");
     case id_kind::binary:
     case id_kind::object:
-        return row("object", ", .ops = &law<" + type.name + ">::ops");
+        return row("object", ", .ops = &traits<" + type.name + ">::ops");
     case id_kind::code:
         return row("enumeration", ", .names = &enum_of<" + type.name + ">");
     case id_kind::vector: {
@@ -124,7 +124,7 @@ emitted_file emit_class_list(const contract_model &model)
     std::string text = opening("class_list.h", "type_ids.txt", "Every class of the contract, by namespace.");
     text += "#pragma once\n\n";
     for (const service_namespace &service : model.services)
-        text += "#include \"law_" + service.prefix + ".h\"\n";
+        text += "#include \"traits_" + service.prefix + ".h\"\n";
     for (const service_namespace &service : model.services) {
         text += "\n#define CLASSES_OF_" + service.prefix + "(X)";
         for (const data_class &type : service.classes)
@@ -137,10 +137,10 @@ emitted_file emit_class_list(const contract_model &model)
 emitted_file emit_registry_tables(const contract_model &model)
 {
     std::string text = opening("registry_tables.cpp", "type_ids.txt", "");
-    text += "#include <zuv_client_pro/type_ids.h>\n\n#include \"binding/law_binary.h\"\n#include "
+    text += "#include <zuv_client_pro/type_ids.h>\n\n#include \"binding/traits_binary.h\"\n#include "
             "\"binding/name_index.h\"\n#include \"binding/registry.h\"\n";
     for (const service_namespace &service : model.services)
-        text += "#include \"law_" + service.prefix + ".h\"\n";
+        text += "#include \"traits_" + service.prefix + ".h\"\n";
     std::vector<const identified_type *> types, elements;
     for (const identified_type &type : model.types) {
         if (is_element_name(type))

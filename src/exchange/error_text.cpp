@@ -1,9 +1,9 @@
-// error.cpp - texts of the error codes: the fixed ones from the list of codes, and those composed from the
-// context's state.
+// error_text.cpp - texts of the error codes: the fixed ones from the list of codes, and those composed from
+// the context's state.
 //
-// Elsewhere: the fault record that takes a text (fault.cpp), socket errors (transport).
+// Elsewhere: the fault record that takes a text (fault.cpp), socket errors and timeouts (net/tcp_error.cpp).
 // Always: a composed text stands in message_text, cut to its size.
-#include "exchange/error_text.h"
+#include "exchange/fault.h"
 
 #include <cstdio>
 #include <cstring>
@@ -57,35 +57,7 @@ const char *soap_constraint_text(soap *ctx, const char *text, const char *argume
     return compose(ctx, {violation, text, argument, " in element '", ctx->tag, "'"});
 }
 
-// What a time limit adds to a text: "u" for microseconds, blank for seconds.
-static std::size_t append_limit(char *text, std::size_t size, const char *what, int timeout)
-{
-    if (timeout == 0)
-        return 0;
-    const long amount = timeout < 0 ? -static_cast<long>(timeout) : timeout;
-    const int written = std::snprintf(text, size, " (%ld%cs %s)", amount, timeout < 0 ? 'u' : ' ', what);
-    return static_cast<std::size_t>(written);
-}
-
-const char *soap_eof_text(soap *ctx)
-{
-    if (ctx->errno_value != 0 && !ctx->call_expired) {
-        char own[SOAP_TEXT_SIZE];
-        return compose(ctx, {strerror_r(ctx->errno_value, own, sizeof own)});
-    }
-    char *text = ctx->message_text;
-    const std::size_t size = sizeof ctx->message_text;
-    auto length = static_cast<std::size_t>(std::snprintf(text, size, "Operation interrupted or timed out"));
-    if (ctx->call_expired) {
-        append_limit(text + length, size - length, "call limit", ctx->call_timeout);
-        return text;
-    }
-    length += append_limit(text + length, size - length, "receive delay", ctx->recv_timeout);
-    append_limit(text + length, size - length, "send delay", ctx->send_timeout);
-    return text;
-}
-
-// The end-of-input text behind its prefix, or alone if both together are too long.
+// The end-of-input text after its prefix, or alone if both together are too long.
 static const char *prefixed_eof_text(soap *ctx)
 {
     const std::string_view prefix = listed_text(SOAP_EOF);

@@ -1,9 +1,11 @@
-// law.h - how the contract's declarations are told to the rules: the vocabulary of a generated member list.
+// traits.h - how the contract's declarations are told to the rules: the vocabulary of a generated member
+// list.
 //
 // Here: rows of a member list and the traits that a list specialises. Elsewhere: what the rules do with a
 // list (class_rules.h), leaf reads and writes (member_read.h, member_write.h).
 //
-// Always: a class costs its declaration and one law<T>; everything else is unrolled from it by the compiler.
+// Always: a class costs its declaration and one traits<T>; everything else is unrolled from it by the
+// compiler.
 #pragma once
 
 #include <cstddef>
@@ -75,13 +77,13 @@ template <class M> attribute(const char *, M, bool) -> attribute<M>;
 //   text: pointer to the std::string member of simple content, or nullptr
 //   ops: static const class_ops, the class as the shared code sees it; BINDING_DEFINE_CLASS defines it, in
 //   one unit
-template <class T> struct law;
+template <class T> struct traits;
 
 struct class_ops;
-template <class T> inline constexpr const class_ops &ops_of = law<T>::ops;
+template <class T> inline constexpr const class_ops &ops_of = traits<T>::ops;
 
 // Specialised for each enumeration: type_id, xml_type, codes (rows in code order), count.
-template <class E> struct enum_law;
+template <class E> struct enum_traits;
 
 // An enumeration's table as the leaf operations take it.
 struct enum_table {
@@ -91,7 +93,7 @@ struct enum_table {
     std::uint32_t count;
 };
 template <class E>
-inline constexpr enum_table enum_of = {enum_law<E>::type_id, enum_law<E>::xml_type, enum_law<E>::codes,
-                                       enum_law<E>::count};
+inline constexpr enum_table enum_of = {enum_traits<E>::type_id, enum_traits<E>::xml_type,
+                                       enum_traits<E>::codes, enum_traits<E>::count};
 
 } // namespace binding

@@ -1,13 +1,13 @@
-// law_binary.h - the law of xsd__base64Binary, the one class that is written by hand.
+// traits_binary.h - the traits of xsd__base64Binary, the one class that is written by hand.
 #pragma once
 
 #include <zuv_client_pro/soap_binary.h>
 
-#include "binding/law.h"
+#include "binding/traits.h"
 
 namespace binding {
 
-template <> struct law<xsd__base64Binary> {
+template <> struct traits<xsd__base64Binary> {
     using self = xsd__base64Binary;
     using base = void;
     static constexpr int type_id = 10;
