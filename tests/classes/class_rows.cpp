@@ -9,7 +9,7 @@ const class_row *ROWS_NAME(int type_id)
 {
     switch (type_id) {
 #define ROW(T)                                                                                               \
-    case binding::traits<T>::type_id:                                                                           \
+    case binding::traits<T>::type_id:                                                                        \
         return &row<T>;
         ROWS_OF(ROW)
 #undef ROW

@@ -97,7 +97,8 @@ TEST(published_contract, gives_every_type_id_a_row_and_every_class_one_home)
     const std::size_t ids = count(result.model, "\ntype ");
     EXPECT_EQ(declared, traits);
     EXPECT_EQ(declared, defined);
-    EXPECT_EQ(declared, count(result.output("src/registry_tables.cpp"), ".ops = &traits<") - 1); // base64Binary
+    EXPECT_EQ(declared,
+              count(result.output("src/registry_tables.cpp"), ".ops = &traits<") - 1); // base64Binary
     EXPECT_EQ(ids, count(result.output("include/zuv_client_pro/type_ids.h"), "    SOAP_TYPE_"));
 }
 
