@@ -7,6 +7,9 @@ add_test(NAME built_docs COMMAND /usr/bin/python3 -B ${DOCS_TESTS}/built_docs_te
 set_tests_properties(built_docs PROPERTIES FIXTURES_REQUIRED docs)
 add_test(NAME wire_reference COMMAND /usr/bin/python3 -B ${DOCS_TESTS}/wire_reference_test.py ${PROJECT_SOURCE_DIR}
     ${ZUV_GENERATED_DIR})
+add_test(NAME docs_comment_files COMMAND /usr/bin/python3 -B ${DOCS_TESTS}/comment_files_test.py ${PROJECT_SOURCE_DIR}
+    ${ZUV_GENERATED_DIR})
+set_tests_properties(docs_comment_files PROPERTIES SKIP_RETURN_CODE 77)
 
 set_property(DIRECTORY APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/README.md)
 
@@ -23,4 +26,4 @@ target_link_libraries(readme_host PRIVATE zuv_objects zuv_flags)
 
 add_test(NAME pages COMMAND /usr/bin/python3 -B ${DOCS_TESTS}/pages_test.py ${PROJECT_SOURCE_DIR}
     $<TARGET_FILE:zuv-service> $<TARGET_FILE:guide> $<TARGET_FILE:readme_host>)
-set_tests_properties(docs built_docs wire_reference pages PROPERTIES LABELS docs TIMEOUT 180)
+set_tests_properties(docs built_docs wire_reference docs_comment_files pages PROPERTIES LABELS docs TIMEOUT 180)
