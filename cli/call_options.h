@@ -1,6 +1,6 @@
 // call_options.h - the options of a call, as the command line gives them.
 //
-// Elsewhere: what they do to a context (connection.h), to the header block (header.h), to attachments
+// Elsewhere: what they do to a context (connection.h), to the header block (request_header.h), to attachments
 // (attachments.h).
 #pragma once
 

@@ -1,34 +1,35 @@
-// soap_attachment.h - binary data beside a message: DIME records, MIME parts, MTOM.
+// soap_attachment.h - binary data sent with a message: DIME records, MIME parts, MTOM.
 //
-// Elsewhere: when they go out and come in (soap_io.h), the value that refers to one (soap_binary.h).
-// Always: results are 0 or the code that also stands in ctx->error. What is received is managed memory and
-// lives until the context lets go. Attachments that are to be sent are borrowed: content and texts must stay
-// as they are until soap_send_finish has returned.
+// Elsewhere: when they are sent and received (soap_io.h), the value that refers to one (soap_binary.h).
+// Always: what is received is managed memory and lives until the managed blocks are freed. Attachments to be
+// sent are borrowed: content and texts must stay as they are until soap_send_finish has returned. "Errors of
+// sending" and "of receiving" are those of soap_io.h; errors of a callback are those under "callbacks of the
+// host program".
 #pragma once
 
 #include <zuv_client_pro/soap.h>
 
-// Codes of Content-Transfer-Encoding; 0 none given.
+// Codes of Content-Transfer-Encoding.
 enum soap_mime_encoding : int {
-    MIME_NONE = 0,
-    MIME_7BIT = 1,
-    MIME_8BIT = 2,
-    MIME_BINARY = 3,
-    MIME_QUOTED_PRINTABLE = 4,
-    MIME_BASE64 = 5,
-    MIME_IETF_TOKEN = 6,
-    MIME_X_TOKEN = 7
+    MIME_NONE = 0,             // none given
+    MIME_7BIT = 1,             // 7bit
+    MIME_8BIT = 2,             // 8bit
+    MIME_BINARY = 3,           // binary
+    MIME_QUOTED_PRINTABLE = 4, // quoted-printable
+    MIME_BASE64 = 5,           // base64
+    MIME_IETF_TOKEN = 6,       // ietf-token
+    MIME_X_TOKEN = 7           // x-token
 };
 
-// One attachment, for DIME and MIME alike; the record is managed memory. Those received hang in
-// ctx->dime.list and ctx->mime.list, in order. Contents are never decoded: `encoding` only tells what the
-// sender says, and a host that wants them decoded does so in its write callback or afterwards.
+// One attachment, for DIME and MIME alike; the record is managed memory. Those received are in ctx->dime.list
+// and ctx->mime.list, in order. Contents are never decoded: `encoding` only tells what the sender says, and a
+// host program that wants them decoded does so in its write callback or afterwards.
 struct soap_attachment {
-    soap_attachment *next;
-    char *content;        // the bytes (with a zero byte behind them on input), or a stream handle of the host
-    std::size_t size;     // bytes; 0 with a handle to be sent: unknown
-    const char *id;       // DIME id, or MIME Content-ID with its angle brackets
-    const char *type;     // media type
+    soap_attachment *next; // in its list
+    char *content;    // the bytes (on input followed by a zero byte), or a stream handle of the host program
+    std::size_t size; // bytes; 0 with a handle to be sent: unknown
+    const char *id;   // DIME id, or MIME Content-ID with its angle brackets
+    const char *type; // media type
     const char *options;  // DIME: type (2 bytes), length of the text (2 bytes), both big-endian, text of any
                           // bytes. Sent as they are up to that length
     int encoding;         // soap_mime_encoding
@@ -36,137 +37,219 @@ struct soap_attachment {
     const char *description; // Content-Description
 };
 
-// --- callbacks of the host ---
+// --- callbacks of the host program ---
 //
-// With dime_read_open or mime_read_open set, every attachment is asked about when it is sent, binary values
-// of the message among them; with dime_write_open or mime_write_open, every one that is received. The open
-// callback returns
-//   a handle: the bytes go through the read or write callback, and `close` ends it, whatever happens then;
-//   soap_attachment_in_memory(ctx): the attachment is left to the library, `content` holds the bytes to send,
-//     or what is received is gathered in memory;
-//   null: it failed, and the call ends with the code that it has put in ctx->error, or else with 10,
-//     SOAP_USER_ERROR. Only an attachment to be sent that has neither content nor size is empty then.
-// A read callback returns the number of bytes that it has stored, 0 at the end. The call ends with -1 if they
-// are fewer than the size told, and with 21 if they are more than asked for. A write callback returns 0 or
-// the code that ends the call. When mime_write_close is called, ctx->mime.last is the part: content and size
-// that the callback puts there are those that its values get, and a code that it puts in ctx->error ends the
-// call. The codes 10, 21 and -1 come with a fault text that names the attachment.
+// With dime_read_open or mime_read_open set, it is called for every attachment that is sent, binary values of
+// the message included; with dime_write_open or mime_write_open, for every one that is received. The open
+// callback returns one of these:
+//   handle
+//       the bytes pass through the read or write callback, and the close callback ends it, whatever happens
+//       then
+//   soap_attachment_in_memory(ctx)
+//       the attachment is left to the library: `content` holds the bytes to send, or what is received is
+//       collected in memory
+//   null
+//       it failed, and the call ends with the code that it has put in ctx->error, or else with
+//       SOAP_USER_ERROR. Only an attachment to be sent that has neither content nor size is empty then
+// A read callback returns the number of bytes that it has stored, 0 at the end. The call ends with SOAP_EOF
+// if they are fewer than the size given, and with SOAP_CORRUPTION if they are more than asked for. A write
+// callback returns SOAP_OK or the code that ends the call. When mime_write_close is called, ctx->mime.last is
+// the part: content and size that the callback stores there are those that its values get, and a code that it
+// puts in ctx->error ends the call. SOAP_USER_ERROR, SOAP_CORRUPTION and SOAP_EOF come with a fault text that
+// names the attachment.
 
-// No handle of a host has this address.
+// A value for open callbacks that no handle of a host program has.
+//   returns  an address in the context
 inline void *soap_attachment_in_memory(soap *ctx)
 {
     return &ctx->dime;
 }
 
 // --- attachments to send ---
+//
+// Called between exchanges, before the call that sends them.
 
-// Adds a DIME record to the next message sent; the host sets MODE_DIME in ctx->output_mode.
-//   content, size  the bytes, or a handle for dime_read_open with the stream's length, 0 if that is unknown.
-//                  In a message that is neither chunked nor stored an unknown length is error 10 when it is
-//                  sent; an attachment without bytes has null content and size 0. What is longer than a
-//                  record can be goes out in chunks
-//   type, id       may be null; texts over 65535 bytes are cut on the wire. No two attachments of a message
-//                  may have one id: see soap_dime_attachments_write
-//   option_text    null for no options
-//   0, 20
+// Adds a DIME record to the next message sent; the host program sets MODE_DIME in ctx->output_mode.
+//   content      the bytes, or a handle for dime_read_open; null with size 0: an attachment without bytes
+//   size         bytes; with a handle the stream's length, 0 if that is unknown: sending it ends with
+//                SOAP_USER_ERROR in a message that is neither chunked nor stored. What exceeds the size of a
+//                record is sent in chunks
+//   type         media type; may be null; over 65535 bytes it is cut on the wire
+//   id           may be null; cut likewise. No two attachments of a message may have one id: see
+//                soap_dime_attachments_write
+//   option_type  type of the options
+//   option_text  null for no options
+//   SOAP_OK
+//   SOAP_OUT_OF_MEMORY
 ZUV_API int soap_dime_attach(soap *ctx, char *content, std::size_t size, const char *type, const char *id,
                              unsigned short option_type, const char *option_text);
 
-// Adds a MIME part to the next message sent; soap_mime_start makes that a MIME message. `encoding` is a
-// soap_mime_encoding that tells how the content is encoded already. Null texts give no field. content, size
-// and id as above. 0, 20.
+// Adds a MIME part to the next message sent; soap_mime_start makes that a MIME message. Null texts give no
+// field.
+//   content      as above, with mime_read_open
+//   size         as above
+//   encoding     a soap_mime_encoding that tells how the content is encoded already
+//   type         media type
+//   id           Content-ID; no two parts of a message may have one id: see soap_mime_attachments_write
+//   location     Content-Location
+//   description  Content-Description
+//   SOAP_OK
+//   SOAP_OUT_OF_MEMORY
 ZUV_API int soap_mime_attach(soap *ctx, char *content, std::size_t size, int encoding, const char *type,
                              const char *id, const char *location, const char *description);
 
-// Makes the messages sent from now on MIME messages, until the managed blocks are freed. Both texts are
-// copied.
-//   boundary  null: one is drawn at random
-//   start     Content-ID of the part that holds the message; null: a fixed one
-// Error 20 stands in ctx->error if a copy fails.
+// Makes the messages sent from now on MIME messages, until the managed blocks are freed. SOAP_OUT_OF_MEMORY
+// in ctx->error if a copy fails.
+//   boundary  copied; null: one is drawn at random
+//   start     Content-ID of the part that holds the message, copied; null: a fixed one
 ZUV_API void soap_mime_start(soap *ctx, const char *boundary, const char *start);
 
-// Appends a record to a list; its other fields are 0. `last` is not looked at while the list is empty. Null:
-// error 20.
+// Appends a record to a list; its other fields are 0.
+//   first    start of the list
+//   last     end of the list; not used while the list is empty
+//   content  borrowed
+//   size     bytes
+//   returns  the record
+//   null     SOAP_OUT_OF_MEMORY in ctx->error
 ZUV_API soap_attachment *soap_attachment_add(soap *ctx, soap_attachment **first, soap_attachment **last,
                                              char *content, std::size_t size);
 
-// An options block in managed memory; the text is cut at 65531 bytes. Null: error 20.
+// Makes an options block, as soap_attachment::options.
+//   type     type of the options
+//   text     cut at 65531 bytes; null is empty
+//   returns  the block, in managed memory
+//   null     SOAP_OUT_OF_MEMORY in ctx->error
 ZUV_API char *soap_dime_options_make(soap *ctx, unsigned short type, const char *text);
 
-// Gives the message under way a boundary of 192 random bits and a start id, where it has none. 0, 20, or 11
-// if the system has no randomness.
+// Gives the message in progress a boundary of 192 random bits and a start id, where it has none.
+//   SOAP_OK
+//   SOAP_OUT_OF_MEMORY
+//   SOAP_FATAL_ERROR    the system has no randomness
 ZUV_API int soap_mime_boundary_make(soap *ctx);
 
-// Length of the MIME framing and DIME records that ride with the message, bytes (part of
-// soap_message_length).
+// Length of the MIME framing and DIME records that are sent with the message (part of soap_message_length).
+//   returns  bytes
 ZUV_API std::uint64_t soap_attachments_length(soap *ctx);
 
-// --- values that stand beside the message ---
+// --- values sent as attachments ---
 
-// Writes the reference in place of a value's bytes, and adds the bytes to the attachments.
-//   id                   number of the element; above 0 it goes into a generated attachment id
-//   address, holder      the bytes; the record that begins with their address and their number (an int)
-//   id_text, type        attachment id ("cid:...") and media type; both null, or an empty id alone: no
-//                        attachment. Values that are alike in bytes (their address and number), id, type and
-//                        options are one attachment
-//   type_text, type_id   XML type and type id of the element
-// Result: -1 if the element stands (or failed: ctx->error). Otherwise the value is to be written in place
-// under the element id returned, 0 for none.
+// Writes the reference in place of a value's bytes, and adds the bytes to the attachments. Values that are
+// alike in bytes (their address and number), id, type and options are one attachment. Called during sending.
+//   tag         name of the value's element
+//   id          number of the element; above 0 it becomes part of a generated attachment id
+//   address     the bytes; null writes a null value
+//   holder      the record that begins with their address and their number (an int)
+//   id_text     attachment id ("cid:..."); null or empty: one is generated
+//   type        media type; null, without an id: the value is no attachment
+//   options     DIME options; null for none
+//   dimensions  sizes in the holder, for a value that is no attachment
+//   type_text   XML type of the element
+//   type_id     type id of the value
+//   -1          the element is written, or writing it failed: see ctx->error
+//   returns     otherwise the value is to be written in place under this element id, 0 for none
 ZUV_API int soap_attachment_ref_out(soap *ctx, const char *tag, int id, const void *address,
                                     const void *holder, const char *id_text, const char *type,
                                     const char *options, int dimensions, const char *type_text, int type_id);
 
-// Reads the reference of the element just begun (ctx->element_href): clears the places, stores a copy of it
-// in *id, and leaves the rest to the attachment, which may come at the end of the message. A reference that
-// stays unanswered is error 33 or, in MTOM, 37 at the end of the message. 0, 20.
+// Reads a reference: that of the element just begun (ctx->element_href), or of an xop:Include child. The
+// places are filled when the attachment arrives, which may be at the end of the message. A reference without
+// an attachment ends soap_receive_finish with SOAP_DIME_HREF or, in MTOM, SOAP_MIME_HREF. Called during
+// receiving.
+//   content  takes the bytes; null until then
+//   size     takes their number; 0 until then
+//   id       takes a copy of the reference at once
+//   type     takes the media type; null until then
+//   options  takes the DIME options or the MIME description; null until then
+//   SOAP_OK
+//   SOAP_OUT_OF_MEMORY
+//   SOAP_TAG_MISMATCH   soap_xop_include_in: another child comes next; ctx->error is SOAP_OK
+//   SOAP_NO_TAG         soap_xop_include_in: no child comes next, only blanks were read; ctx->error is
+//                       SOAP_OK
+//   SOAP_MIME_HREF      soap_xop_include_in: the child refers to nothing
+//   returns             soap_xop_include_in: otherwise an error of reading (soap_xml.h)
 ZUV_API int soap_attachment_ref_in(soap *ctx, unsigned char **content, int *size, char **id, char **type,
                                    char **options);
-
-// Reads an xop:Include child as above. A result of 3 or 6 with ctx->error 0: there is no such child, and
-// nothing but blanks was used. 37 if the child refers to nothing.
 ZUV_API int soap_xop_include_in(soap *ctx, unsigned char **content, int *size, char **id, char **type,
                                 char **options);
 
-// Gives a received attachment to all values that wait for its id. More than 2^31-1 bytes for one that does:
-// error 45 in ctx->error. Attachments that no value waits for may have any size.
+// Gives a received attachment to all values that wait for its id. SOAP_LENGTH in ctx->error if a value waits
+// for one of more than 2^31-1 bytes; attachments that no value waits for may have any size.
+//   attachment  from ctx->dime.list or ctx->mime.list
 ZUV_API void soap_attachment_bind(soap *ctx, soap_attachment *attachment);
 
-// 0 if the reference (with or without "cid:", percent-encoded or not) means the id (with or without angle
-// brackets).
+// Compares a reference with an id.
+//   href  with or without "cid:", percent-encoded or not
+//   id    with or without angle brackets
+//   0     the reference means the id
+//   1     it does not, or an argument is null
 ZUV_API int soap_cid_compare(soap *ctx, const char *href, const char *id);
 
 // --- records and parts, for the engine ---
 
-// The header, options, id and type of the record described by ctx->dime. 0, 32, or an error of sending.
+// Writes the header, options, id and type of the record described by ctx->dime.
+//   SOAP_OK
+//   SOAP_DIME_ERROR  the data or the options are too long for a record
+//   returns          otherwise an error of sending
 ZUV_API int soap_dime_header_write(soap *ctx);
 // Reads the same into ctx->dime (managed texts, null for an empty one). The record that ends the message
-// takes MODE_DIME out of ctx->mode. 0; 35 if the message has ended; 34; 32 if the options' length is not
-// theirs; 20; -1.
+// removes MODE_DIME from ctx->mode.
+//   SOAP_OK
+//   SOAP_DIME_END       the message has ended
+//   SOAP_DIME_VERSION   another version of the format
+//   SOAP_DIME_ERROR     the options' length is not theirs, or data follows where padding is due
+//   SOAP_OUT_OF_MEMORY
+//   returns             otherwise an error of receiving
 ZUV_API int soap_dime_header_read(soap *ctx);
-// All DIME records of a message in DIME mode; nothing otherwise. 0, an error of sending or of a callback, or
-// 32 for two attachments of one id, which a message that is counted tells before anything is sent.
+// Writes all DIME records of a message in DIME mode; nothing otherwise.
+//   SOAP_OK
+//   SOAP_DIME_ERROR     two attachments have one id; a message that is counted finds that before anything is
+//                       sent
+//   SOAP_OUT_OF_MEMORY
+//   returns             otherwise an error of sending or of a callback
 ZUV_API int soap_dime_attachments_write(soap *ctx);
-// The rest of the message's record and all records behind it. 0, 20, 34, -1, the error of a callback, or 32:
-// a record where it can't stand, a chunk without its record, two records of one id.
+// Reads the rest of the message's record and all records after it.
+//   SOAP_OK
+//   SOAP_DIME_ERROR     a record where it is not allowed, a chunk without its record, two records of one id
+//   SOAP_DIME_VERSION   another version of the format
+//   SOAP_OUT_OF_MEMORY
+//   returns             otherwise an error of receiving, of soap_attachment_bind or of a callback
 ZUV_API int soap_dime_attachments_read(soap *ctx);
-// Delimiter and head of a part.
+// Writes delimiter and head of a part.
+//   part     its fields
+//   SOAP_OK
+//   returns  otherwise an error of sending
 ZUV_API int soap_mime_part_header_write(soap *ctx, const soap_attachment *part);
-// The same at the start of a message: empty lines, the delimiter unless it was read already, and the fields
-// into a new record, ctx->mime.last. 0, 20, 22 for a line over 1023 characters, 36 if the boundary isn't the
-// announced one, -1.
+// Reads the same at the start of a message: empty lines, the delimiter unless it was read already, and the
+// fields into a new record, ctx->mime.last.
+//   SOAP_OK
+//   SOAP_MIME_ERROR     the boundary isn't the announced one, or there are more than 1024 fields
+//   SOAP_HEADER_LINE    a line over 1023 characters
+//   SOAP_OUT_OF_MEMORY
+//   returns             otherwise an error of receiving
 ZUV_API int soap_mime_part_header_read(soap *ctx);
-// All MIME parts and the end of a message in MIME mode; nothing otherwise. As above, with 36 for two parts of
-// one id, that of the message's own part included; ids that differ in angle brackets or percent-encoding
-// alone are one.
+// Writes all MIME parts and the end of a message in MIME mode; nothing otherwise.
+//   SOAP_OK
+//   SOAP_MIME_ERROR     two parts have one id, that of the message's own part included; ids that differ in
+//                       angle brackets or percent-encoding alone are one
+//   SOAP_OUT_OF_MEMORY
+//   returns             otherwise an error of sending or of a callback
 ZUV_API int soap_mime_attachments_write(soap *ctx);
-// Reads the content of the part whose head was read, and the head of the next. `handle` goes to
-// mime_write_open, which is asked about all parts but the one that holds the message. The rest of that one is
-// dropped. The part; null at the end (ctx->error 0) or on error: 20, 36 (also for two parts of one id), -1,
-// or that of a callback.
+// Reads the content of the part whose head was read, and the head of the next. The rest of the part that
+// holds the message is dropped.
+//   handle   passed to mime_write_open, which is called for all parts but the one that holds the message
+//   returns  the part
+//   null     at the end with ctx->error SOAP_OK; or SOAP_OUT_OF_MEMORY, SOAP_MIME_ERROR (a broken delimiter,
+//            two parts of one id), an error of receiving, of soap_attachment_bind or of a callback
 ZUV_API soap_attachment *soap_mime_part_read(soap *ctx, void *handle);
-// All parts that remain.
+// Reads all parts that remain.
+//   SOAP_OK
+//   returns  otherwise as soap_mime_part_read
 ZUV_API int soap_mime_parts_read_all(soap *ctx);
 
-// Lazy reading (MODE_MIME_AFTER): one more part after the call has returned. With the last one the message
-// ends and the connection is released. Null at the end or on an error, which stands in ctx->error.
+// --- reading parts after the call ---
+
+// Reads one more part after a call with MODE_MIME_AFTER has returned. With the last one the message ends and
+// the connection is released.
+//   returns  the part
+//   null     at the end with ctx->error SOAP_OK; or an error of soap_mime_part_read or soap_receive_finish
 ZUV_API soap_attachment *soap_mime_next_part(soap *ctx);

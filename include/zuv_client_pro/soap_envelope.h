@@ -3,15 +3,16 @@
 // Here: the records, their accessors by SOAP version, and their place in a message. Elsewhere: error codes
 // and texts (soap_error.h), the envelope's tags (soap_xml.h), the fault classes (protocol.h).
 //
-// Always: the records are plain, made by the engine and owned by the context until soap_discard_objects. One
-// fault record serves both SOAP versions; only the accessors look at the version.
+// Always: the records are plain, made by the engine and owned by the context until soap_discard_objects; so
+// are the texts of a received one. One fault record serves both SOAP versions; the accessors choose the
+// members by soap::soap_version.
 #pragma once
 
 #include <zuv_client_pro/soap.h>
 
 class protocol__Header;
 #define SOAP_DETAIL_CLASS(name) class protocol__##name;
-// The 29 faults that a detail names, in the order in which they are written and tried.
+// The 29 faults of the contract that a detail can hold, in the order in which they are written and tried.
 #define SOAP_DETAIL_FAULTS(X)                                                                                \
     X(Client)                                                                                                \
     X(Client_x002eAccountInformation)                                                                        \
@@ -45,28 +46,34 @@ class protocol__Header;
 SOAP_DETAIL_FAULTS(SOAP_DETAIL_CLASS)
 #undef SOAP_DETAIL_CLASS
 
+// The SOAP header.
 struct SOAP_ENV__Header {
-    protocol__Header *header; // "protocol:header"; the host's when set by a proxy's soap_header()
+    // "protocol:header"; belongs to the host program when a proxy object's soap_header() has set it.
+    protocol__Header *header;
 };
 
+// Code of a SOAP 1.2 fault.
 struct SOAP_ENV__Code {
     char *Value;             // a QName such as "SOAP-ENV:Sender"
     SOAP_ENV__Code *Subcode; // null for none
 };
 
+// Reason of a SOAP 1.2 fault.
 struct SOAP_ENV__Reason {
-    char *Text;
+    char *Text; // null for none
 };
 
+// Detail of a fault.
 struct SOAP_ENV__Detail {
     char *__any; // raw XML of content that no other member took
 #define SOAP_DETAIL_MEMBER(name) protocol__##name *name;
-    SOAP_DETAIL_FAULTS(SOAP_DETAIL_MEMBER)
+    SOAP_DETAIL_FAULTS(SOAP_DETAIL_MEMBER) // the contract's fault of this name; null for none
 #undef SOAP_DETAIL_MEMBER
     int __type;  // type id of `fault`; 0 for none
     void *fault; // one further element of a type known to the registry
 };
 
+// A fault of either SOAP version.
 struct SOAP_ENV__Fault {
     char *faultcode;          // SOAP 1.1
     char *faultstring;        // SOAP 1.1
@@ -79,29 +86,53 @@ struct SOAP_ENV__Fault {
     SOAP_ENV__Detail *Detail; // SOAP 1.2
 };
 
-// Make the context's record if there is none. If memory runs out the pointer stays null and error is 20.
+// Make the context's header or fault record if there is none. If memory runs out the pointer stays null, and
+// ctx->error is SOAP_OUT_OF_MEMORY.
 ZUV_API void soap_header_record(soap *ctx);
 ZUV_API void soap_fault_record(soap *ctx);
 
-// Places of a fault's parts by SOAP version; the records on the way are made. Never null: if memory runs out
-// they give a place that is thrown away.
+// Where a fault's parts are, by SOAP version: code, subcode, text, raw XML of the detail. The records that
+// hold them are made. In SOAP 1.1 the subcode is in the place of the code.
+//   returns  address of the member, valid as long as the fault record. Never null: if memory runs out, a
+//            place that nothing reads, with SOAP_OUT_OF_MEMORY in ctx->error
 ZUV_API const char **soap_fault_code_field(soap *ctx);
 ZUV_API const char **soap_fault_subcode_field(soap *ctx);
 ZUV_API const char **soap_fault_string_field(soap *ctx);
-ZUV_API const char **
-soap_fault_detail_field(soap *ctx); // raw text of the detail, by the rule version 1 or not
+ZUV_API const char **soap_fault_detail_field(soap *ctx);
 
-// Texts of subcode and detail as they stand; null for none.
+// Texts of subcode and detail as they are; nothing is made.
+//   returns  the text, which lives as long as the fault record
+//   null     there is none; SOAP 1.1 has no subcode
 ZUV_API const char *soap_fault_subcode_value(soap *ctx);
 ZUV_API const char *soap_fault_detail_value(soap *ctx);
 
-// The header's turn in a message. Each returns ctx->error. The block that is written bears mustUnderstand: a
-// peer that doesn't know it has to refuse the message.
+// Enters soap::header in the pointer table. Before sending. SOAP_OUT_OF_MEMORY in ctx->error if that can't
+// grow.
 ZUV_API void soap_mark_header(soap *ctx);
+// Writes soap::header, if there is one, between the start tag of the Envelope and that of the Body. It
+// carries mustUnderstand: a peer that doesn't know it has to refuse the message.
+//   SOAP_OK
+//   returns  otherwise an error of writing (soap_xml.h)
 ZUV_API int soap_header_put(soap *ctx);
+// Reads the Header, if there is one, into soap::header, between the start tag of the Envelope and that of the
+// Body, and runs on_soap_header.
+//   SOAP_OK               also if there is none
+//   SOAP_MUST_UNDERSTAND  the Header demands what is not known
+//   returns               otherwise an error of reading (soap_xml.h), or of on_soap_header
 ZUV_API int soap_header_get(soap *ctx);
 
-// The fault as the Body's content. soap_fault_read stores the record in ctx->fault, null included.
+// Enters soap::fault in the pointer table. Before sending. SOAP_OUT_OF_MEMORY in ctx->error if that can't
+// grow.
 ZUV_API void soap_mark_fault(soap *ctx);
+// Writes soap::fault, which is made if there is none, as the Body's content.
+//   SOAP_OK
+//   SOAP_OUT_OF_MEMORY
+//   returns  otherwise an error of writing (soap_xml.h)
 ZUV_API int soap_fault_put(soap *ctx);
+// Reads a fault as the Body's content into soap::fault, which is null on failure.
+//   SOAP_OK
+//   SOAP_TAG_MISMATCH   another element comes next
+//   SOAP_NO_TAG         no element comes next
+//   SOAP_OUT_OF_MEMORY
+//   returns             otherwise an error of reading (soap_xml.h)
 ZUV_API int soap_fault_read(soap *ctx);

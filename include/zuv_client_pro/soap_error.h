@@ -1,14 +1,15 @@
 // soap_error.h - error codes, their texts, and faults made from them.
 //
 // Elsewhere: the fault record itself (soap_envelope.h), socket texts (soap_tcp.h).
-// Always: a code is sticky until the next call begins; a text is composed only when somebody asks.
+// Always: a code stays until the next call begins; a text is composed only when somebody asks. Composed texts
+// are in soap::message_text and last until its next use.
 #pragma once
 
 #include <zuv_client_pro/soap.h>
 
 // Every engine code: name, value, text. This list is the one source of the texts. soap_fault_text_fill puts
-// an argument in the place of "%s", behind texts that end in a blank, and "Validation constraint violation: "
-// in front of those that tell what an element violates. A code with an empty text is told by its number, or
+// an argument in the place of "%s" and after texts that end in a blank, and "Validation constraint violation"
+// before those that tell what an element violates. A code with an empty text is described by its number, or
 // by another module.
 #define SOAP_ERRORS(X)                                                                                       \
     X(SOAP_EOF, -1, "End of file or no input: ")                                                             \
@@ -63,35 +64,42 @@
     X(SOAP_STOP, 1000, "Stopped: no response to be sent or received (informative)")                          \
     X(SOAP_FORM, 1001, "")
 
+// The engine's codes. Besides these, an operation can return an HTTP status or the code of a callback.
 enum soap_error_code : int {
 #define SOAP_ERROR_ENUMERATOR(name, value, text) name = value,
     SOAP_ERRORS(SOAP_ERROR_ENUMERATOR)
 #undef SOAP_ERROR_ENUMERATOR
 };
 
-// Fills the fault record's code and text from ctx->error. The host's on_error_text is asked first. What is
-// set stays; a missing code becomes that of the sender, and a missing text that of the error, with the code
-// and, in SOAP 1.2, the subcode that the error calls for. Error 45 of a limit on bytes is told by the limit's
-// name and value, such as "max_memory: more than 536870912 bytes". Error 12 (a fault that was received or
-// set) gets no text. A composed text stands in message_text and lasts until the next one.
+// Fills the fault record's code and text from ctx->error. The host program's on_error_text is asked first.
+// What is set stays; a missing code becomes that of the sender, and a missing text that of the error, with
+// the code and, in SOAP 1.2, the subcode that the error calls for. SOAP_LENGTH from a limit on bytes gives
+// the limit's name and value, such as "max_memory: more than 536870912 bytes". SOAP_FAULT (a fault that was
+// received or set) gets no text.
 ZUV_API void soap_fault_text_fill(soap *ctx);
 
-// Store a fault in the context's record and its error in ctx->error, replacing what was there.
-//   code     a QName with a prefix of the namespace table, such as "SOAP-ENV:Client"
-//   subcode  null: none. Ignored unless the version is 1.2
-//   text     the fault's reason
-//   detail   raw XML; null or empty: the detail stays as it is
-// Texts are borrowed: they must live as long as the fault record is used. Lack of memory for the record
-// itself goes unnoticed here; a print form then shows what it can.
-//   `error`, always
+// Store a fault in the context's record and its error in ctx->error, replacing what was there. The forms
+// without a code take that of the sender (client) or the receiver (server) in the current SOAP version. If
+// memory runs out for the record, only the error is stored.
+//   code     a QName with a prefix of the namespace table, such as "SOAP-ENV:Client"; borrowed while the
+//            fault record is used
+//   subcode  null: none; ignored unless the version is 1.2; borrowed likewise
+//   text     the fault's reason; borrowed likewise
+//   detail   raw XML, borrowed likewise; null or empty: the detail stays as it is
+//   error    the error to store
+//   returns  `error`, always
 ZUV_API int soap_fault_set(soap *ctx, const char *code, const char *subcode, const char *text,
                            const char *detail, int error);
-// soap_fault_set with the code of the sender (client) or the receiver (server) in the current SOAP version.
 ZUV_API int soap_fault_sender(soap *ctx, const char *text, const char *detail, int error);
 ZUV_API int soap_fault_receiver(soap *ctx, const char *text, const char *detail, int error);
 
 // The same with managed copies of the texts.
-//   SOAP_FAULT; SOAP_OUT_OF_MEMORY, with the fault left as it was
+//   code     as above
+//   subcode  as above
+//   text     the fault's reason
+//   detail   as above
+//   SOAP_FAULT          the fault is stored
+//   SOAP_OUT_OF_MEMORY  the fault is as it was
 ZUV_API int soap_fault_set_copied(soap *ctx, const char *code, const char *subcode, const char *text,
                                   const char *detail);
 ZUV_API int soap_fault_sender_copied(soap *ctx, const char *subcode, const char *text, const char *detail);
@@ -102,26 +110,45 @@ ZUV_API int soap_fault_receiver_copied(soap *ctx, const char *subcode, const cha
 //     "text"
 //     Detail: [no detail]
 // filling the fault record first if it has no code. Without a SOAP version the line begins "Error " and the
-// error. Nothing is printed for error 0, not even a terminator. A null or ended context is said to be not
-// initialised.
-//   buffer  takes at most `length` bytes, terminator included; returned
-//   stream  returned
+// number. Nothing is printed for SOAP_OK.
+//   ctx      null or ended: the output says that it is not initialised
+//   buffer   takes the text, cut to its size and terminated; untouched for SOAP_OK, unless `length` is 1
+//   length   bytes in `buffer`, terminator included
+//   stream   takes the text
+//   file     takes the text
+//   returns  `buffer`, `stream`
 ZUV_API char *soap_fault_print_text(soap *ctx, char *buffer, std::size_t length);
 ZUV_API std::ostream &soap_fault_print_stream(soap *ctx, std::ostream &stream);
 ZUV_API void soap_fault_print_file(soap *ctx, std::FILE *file);
 
 // Prints the input in ctx->buffer up to the place where reading stopped, a mark, and at most 1022 bytes from
-// there on. Nothing for error 0 or 1000, or when the buffer holds no input.
+// there on. Nothing for SOAP_OK or SOAP_STOP, or when the buffer holds no input.
+//   file  takes the text
 ZUV_API void soap_fault_location_print(soap *ctx, std::FILE *file);
 
-// Composes "Validation constraint violation: " and text, argument (null: none) and the element in ctx->tag,
-// if there is one. The text, in message_text, cut to its size; neither argument may lie there.
+// Composes "Validation constraint violation: ", the text, the argument and the element in ctx->tag, if there
+// is one.
+//   text      must not be in message_text
+//   argument  likewise; null: none
+//   returns   the text, cut to SOAP_TEXT_SIZE - 1 bytes
 ZUV_API const char *soap_constraint_text(soap *ctx, const char *text, const char *argument);
 
-// Text of an end of input: that of ctx->errno_value, or of a timeout with the time limits that are set, or
-// with call_timeout alone if that has passed. In message_text.
+// Text for an end of input: that of ctx->errno_value, or of a timeout with the time limits that are set, or
+// with call_timeout alone if that has passed.
+//   returns  the text
 ZUV_API const char *soap_eof_text(soap *ctx);
 
-// Takes a fault out of a response that did not read as expected, ends the message and releases the
-// connection; see soap_envelope.h for the record. `check` not 0: the absence of a fault is no error.
+// Reads a fault from a response that did not read as expected, ends the message and releases the connection;
+// see soap_envelope.h for the record. Called during receiving, with the error of the response in ctx->error.
+//   check  0: only if the error may stem from a fault in the place of the response; otherwise a fault is
+//          looked for whatever the error, and its absence is no error
+//   SOAP_OK                with `check`: there is no fault, and the message is still to be read
+//   SOAP_CLIENT_FAULT      a fault with the code Client or Sender
+//   SOAP_SERVER_FAULT      Server or Receiver
+//   SOAP_MUST_UNDERSTAND   MustUnderstand
+//   SOAP_VERSION_MISMATCH  VersionMismatch
+//   SOAP_FAULT             any other code
+//   SOAP_OUT_OF_MEMORY     the fault could not be stored
+//   SOAP_LENGTH            a limit of the context was exceeded
+//   returns                otherwise the error of the response, or of soap_socket_release
 ZUV_API int soap_fault_receive(soap *ctx, int check);

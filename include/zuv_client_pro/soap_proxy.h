@@ -1,10 +1,11 @@
 // soap_proxy.h - what every proxy class has, declared once.
 //
-// Here: the members and operations common to the generated proxies (*SoapBindingProxy.h). Elsewhere: the
-// context that a proxy is (soap.h), the cycle of a call (src/exchange).
+// Here: the members and operations common to the generated proxy classes (*SoapBindingProxy.h). Elsewhere:
+// the context that a proxy object is (soap.h), the cycle of a call (src/exchange).
 //
-// Always: a proxy is one engine context: one thread at a time, at most one connection, one set of managed
-// objects. What a call leaves behind lives in the proxy until `destroy`.
+// Always: a proxy object is one engine context: one thread at a time, at most one connection, one set of
+// managed objects. Responses, the fault and the received header belong to it and live until `destroy` or its
+// end.
 #pragma once
 
 #include <cstddef>
@@ -15,37 +16,61 @@
 #include <zuv_client_pro/soap.h>
 #include <zuv_client_pro/soap_envelope.h>
 
-// Of a proxy class P:
+// Members of a proxy class P. All may be called between calls only.
 //   endpoint
-//       URL to which calls go, or several with blanks between: the next is tried while connections fail.
-//       Borrowed, never copied: the text must outlive every call. Null: the port's default, which the next
-//       call stores here. One that soap_endpoint_check refuses ends a call with error 28 before anything is
-//       sent.
+//       URL to which calls are sent, or several with blanks between: the next is tried while connections
+//       fail. Borrowed: the text must outlive every call. Null: the port's default, which the next call
+//       stores here. A call to one that soap_endpoint_check refuses ends with SOAP_TCP_ERROR before anything
+//       is sent.
 //   constructors
-//       Modes for input and output, one for both, or none; the endpoint, or none. A proxy made from a context
-//       or from another proxy copies its settings (soap_context_copy) and starts without a connection; its
-//       endpoint is null, so that the port's default holds until one is given. A proxy that is moved, as when
-//       a vector grows, keeps endpoint, settings and managed objects and loses its connection; what it came
-//       from is as P() makes it.
+//       Makes a proxy object. Without arguments the modes are 0 and the endpoint is null. If memory runs out,
+//       `error` is SOAP_OUT_OF_MEMORY. A proxy object made from a context or from another proxy object copies
+//       its settings (soap_context_copy) and starts without a connection; its endpoint is null, so that the
+//       port's default holds until one is given. One that is moved, as when a vector grows, keeps endpoint,
+//       settings and managed objects and loses its connection; what it was made from is then as P() makes it.
+//   destructor
+//       Frees all managed objects and closes the connection.
 //   P_init
-//       Replaces both modes, forgets the endpoint and installs the port's namespaces. 0, or error 20.
+//       Replaces both modes, sets endpoint to null and installs the port's namespaces. Returns SOAP_OK or
+//       SOAP_OUT_OF_MEMORY.
 //   destroy
-//       Frees all managed objects: responses, fault, received header. The proxy stays usable.
+//       Frees all managed objects: responses, fault, received header. Ends the use of the connection, which
+//       stays open if it is to be kept, and closes the trace files. The proxy object stays usable.
 //   soap_noheader
 //       Forgets the header of the next call; frees nothing.
 //   soap_header
-//       Sets the header of the next call only, by pointer: the host's object must live until then. Without
-//       argument: the header in force, after a call the one received; null for none.
+//       With an argument: sets the header of the next call only, by pointer; if memory runs out, none is set
+//       and `error` is SOAP_OUT_OF_MEMORY. Without argument: asks for the header in force. Returns after a
+//       call the header received; null for none.
 //   soap_fault
-//       The fault record of the last call, or null.
-//   soap_fault_string, soap_fault_detail
-//       Text and raw detail of the fault, for either SOAP version; null for none. Both make the record.
+//       The fault of the last call. Returns its record, or null.
+//   soap_fault_string
+//       Text of the fault, for either SOAP version. Makes the record if there is none. Returns the text, or
+//       null for none.
+//   soap_fault_detail
+//       Raw XML of the fault's detail, for either SOAP version. Makes the record if there is none. Returns
+//       the text, or null for none.
 //   soap_close_socket
-//       Ends the use of the connection, which stays open if it is to be kept. The context's error code.
+//       Ends the use of the connection, which stays open if it is to be kept. Returns the result of
+//       soap_socket_release.
 //   soap_force_close_socket
-//       Closes the connection at once. The result of close, or 0 without a connection.
-//   soap_print_fault, soap_stream_fault, soap_print_fault_buffer
-//       Print the last error to a file, a stream (the result), or a buffer of `length` bytes (the result).
+//       Closes the connection at once. Returns the result of soap_force_close.
+//   soap_print_fault
+//       Prints the last error; nothing if there is none. See soap_fault_print_file.
+//   soap_stream_fault
+//       Prints the last error; nothing if there is none. See soap_fault_print_stream. Returns the stream.
+//   soap_print_fault_buffer
+//       Prints the last error; nothing if there is none. See soap_fault_print_text. Returns the buffer.
+// Their arguments:
+//   imode   MODE_... for input
+//   omode   MODE_... for output
+//   iomode  MODE_... for both
+//   other   what the proxy object is made from
+//   header  borrowed: the host program's object must live until the end of the next call
+//   file    takes the text
+//   stream  takes the text
+//   buffer  takes the text, terminated
+//   length  bytes in the buffer, terminator included
 #define SOAP_PROXY_MEMBERS(P)                                                                                \
     const char *endpoint = nullptr;                                                                          \
                                                                                                              \
@@ -72,13 +97,25 @@
     virtual std::ostream &soap_stream_fault(std::ostream &stream);                                           \
     virtual char *soap_print_fault_buffer(char *buffer, std::size_t length);
 
-// One operation of the port, in its short and its full form. The short form calls the full one with nulls.
-//   endpoint     unless null, stored in the proxy's endpoint, for this call and later ones
-//   soap_action  null: empty
-//   request      the host's, needed during the call only; null: the Body is empty
-//   response     takes the object read, which is the context's and lives until `destroy`. A null reference
-//                sends the request and reads nothing
-// Returns 0, or the error code that stands in the context; a received fault gives 1, 2, 8, 12 or 39.
+// Called between calls, in two forms: the short one takes the proxy object's endpoint and an empty action.
+//   endpoint     unless null, stored in the proxy object's endpoint, for this call and later ones
+//   soap_action  SOAPAction; null: empty
+//   request      the host program's, needed during the call only; null: the Body is empty
+//   response     takes the object read, which the proxy object owns until `destroy`; null if the call fails.
+//                A null reference sends the request and reads nothing
+//   SOAP_OK                the response was read
+//   SOAP_CLIENT_FAULT      the service sent a fault: Client or Sender
+//   SOAP_SERVER_FAULT      the service sent a fault: Server or Receiver
+//   SOAP_MUST_UNDERSTAND   the service sent this fault, or the response's header demands what is not known
+//   SOAP_VERSION_MISMATCH  the service sent this fault, or the response is of another SOAP version
+//   SOAP_FAULT             the service sent another fault
+//   SOAP_TCP_ERROR         the endpoint was refused, or there is no connection
+//   SOAP_TLS_ERROR         TLS or the peer's certificate failed
+//   SOAP_EOF               the connection broke, or a time limit has passed
+//   SOAP_LENGTH            a limit of the context was exceeded
+//   SOAP_OUT_OF_MEMORY     memory ran out
+//   returns                otherwise the code of a failure in sending, receiving or reading, or an HTTP
+//                          status
 #define SOAP_PROXY_CALL(name, Request, Response)                                                             \
     virtual int name(Request *request, Response &response);                                                  \
     virtual int _##name(const char *endpoint, const char *soap_action, Request *request, Response &response);

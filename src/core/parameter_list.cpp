@@ -1,6 +1,6 @@
 // parameter_list.cpp - items of lists such as `multipart/related; boundary="x"; start=y`, found by name.
 //
-// Elsewhere: the headers that hold such lists (transport's http_headers.cpp, codec's mime_read.cpp).
+// Elsewhere: the headers that hold such lists (transport's http_headers.cpp, codec's mime.cpp).
 //
 //   list  = item *( ("," / ";") item )
 //   item  = name [ "=" value ]

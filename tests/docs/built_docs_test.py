@@ -1,16 +1,50 @@
 #!/usr/bin/python3
-"""The built documents show what they speak of: the page about the command line is found from the first page, and its pictures
+"""The built documents show what they speak of: a proxy's page holds its members with their arguments and what is said of them, a
+symbol that nobody documents fails the build, the page about the command line is found from the first page, and its pictures
 are whole PNG files on which something can be seen.
 
-Usage: built_docs_test.py FOLDER
+Usage: built_docs_test.py SOURCE_DIR DOXYFILE FOLDER
 """
+import glob
+import html
 import os
 import re
 import struct
+import subprocess
 import sys
+import tempfile
 import zlib
 
 PICTURES = {"trace.png", "trace-open.png"}
+# Of the page of a class: a member as it is declared, and words of what is said there of it or of its arguments.
+MEMBERS = {
+    "classProfileSoapBindingProxy.html": [
+        ("ProfileSoapBindingProxy (int imode, int omode)", "MODE_... for output"),
+        ("ProfileSoapBindingProxy (const char *endpoint, int iomode)", "Without arguments the modes are 0"),
+        ("ProfileSoapBindingProxy (ProfileSoapBindingProxy &&other) noexcept", "loses its connection"),
+        ("virtual int create (protocolProfile__ProfileContent *request, __protocolProfile__createResponse &response)",
+         "Creates a profile."),
+        ("virtual int _create (const char *endpoint, const char *soap_action, protocolProfile__ProfileContent *request, "
+         "__protocolProfile__createResponse &response)", "the service sent a fault: Client or Sender"),
+        ("virtual void destroy ()", "Frees all managed objects"),
+        ("virtual SOAP_ENV__Fault * soap_fault ()", "The fault of the last call."),
+        ("virtual const char * soap_fault_string ()", "Text of the fault"),
+        ("virtual const char * soap_fault_detail ()", "Raw XML of the fault's detail"),
+        ("virtual char * soap_print_fault_buffer (char *buffer, std::size_t length)", "bytes in the buffer"),
+        ("const char * endpoint", "Borrowed: the text must outlive every call."),
+    ],
+    "classprotocol____Identity.html": [
+        ("virtual int soap_out (struct soap *ctx, const char *tag, int id, const char *type) const",
+         "number for an id attribute"),
+        ("protocol__Identity ()", "All members at their defaults"),
+        ("std::string * name", ""),
+    ],
+    "soap__error_8h.html": [
+        ("int soap_fault_set_copied (soap *ctx, const char *code, const char *subcode, const char *text, const char *detail)",
+         "SOAP_OUT_OF_MEMORY the fault is as it was"),
+        ("SOAP_TLS_ERROR", "30 SSL/TLS error"),
+    ],
+}
 
 
 def picture(path):
@@ -31,8 +65,62 @@ def picture(path):
     return *size, zlib.decompress(rows)
 
 
+def words(text):
+    """The text of a page or of a declaration, blanks between words alone."""
+    return " ".join(html.unescape(re.sub(r"<[^>]*>", " ", text)).split())
+
+
+def spelled(text):
+    """A declaration whatever its blanks."""
+    return re.sub(r"\s*([^\w\s])\s*", r"\1", words(text))
+
+
+def check_members(folder):
+    for name, members in MEMBERS.items():
+        with open(os.path.join(folder, name), encoding="utf-8") as file:
+            page = file.read()
+        for declaration, told in members:
+            assert spelled(html.escape(declaration)) in spelled(page), "%s lacks %s" % (name, declaration)
+            assert told in words(page), "%s doesn't say \"%s\"" % (name, told)
+
+
+def check_functions(source, folder):
+    """No function of the hand-written headers is lost on the way."""
+    count = 0
+    for path in glob.glob(os.path.join(source, "include", "zuv_client_pro", "*.h")):
+        with open(path, encoding="utf-8") as file:
+            names = re.findall(r"^(?:extern \"C\" )?ZUV_API[^;{}(]*?(\w+)\(", file.read(), re.M)
+        page = os.path.join(folder, os.path.basename(path).replace("_", "__").replace(".h", "_8h.html"))
+        if names:
+            with open(page, encoding="utf-8") as file:
+                shown = words(file.read())
+            missing = [name for name in names if name + " (" not in shown]
+            assert not missing, "%s: not shown: %s" % (page, missing)
+        count += len(names)
+    assert count > 300, count
+
+
+def check_undocumented(source, doxyfile):
+    """A header with a symbol, an argument or a result that nobody documents isn't accepted; one with all of them is."""
+    header = "// a.h - a header.\n#pragma once\n\n%sint f(int x);\n"
+    whole = "// Doubles.\n//   x        a number\n//   returns  twice of it\n"
+    for comment, accepted in ((whole, True), ("", False), ("// Doubles.\n//   y        a number\n//   returns  two\n", False),
+                              ("// Doubles.\n//   x        a number\n", False), ("// Doubles.\n//   returns  two\n", False)):
+        with tempfile.TemporaryDirectory() as folder:
+            with open(os.path.join(folder, "a.h"), "w", encoding="utf-8") as file:
+                file.write(header % comment)
+            settings = "@INCLUDE = %s\nINPUT = %s\nOUTPUT_DIRECTORY = %s\nSTRIP_FROM_PATH =\nIMAGE_PATH =\n" % (
+                doxyfile, os.path.join(folder, "a.h"), folder)
+            run = subprocess.run(["doxygen", "-"], input=settings, text=True, capture_output=True, cwd=source, timeout=60)
+        assert (run.returncode == 0) == accepted, "%s\n%s" % (comment, run.stderr)
+
+
 def main():
-    folder = os.path.join(sys.argv[1], "api")
+    source, doxyfile, folder = (os.path.abspath(path) for path in sys.argv[1:])
+    folder = os.path.join(folder, "api")
+    check_members(folder)
+    check_functions(source, folder)
+    check_undocumented(source, doxyfile)
     with open(os.path.join(folder, "index.html"), encoding="utf-8") as file:
         assert 'href="command_line.html"' in file.read(), "the first page doesn't lead to the command line"
     with open(os.path.join(folder, "command_line.html"), encoding="utf-8") as file:

@@ -23,7 +23,7 @@ RUN_BY = {
     "script/package": (".ci/run", "script/package "),
     "cmake --install build/release": ("tests/package/readme_test.py", "cmake --install"),
     "g++ host.cpp $(pkg-config --cflags --libs zuv_client_pro)": ("tests/package/readme_test.py", r"g\+\+"),
-    "cmake --build build/release --target docs": ("cmake/docs.cmake", "--build . --target docs"),
+    "cmake --build build/release --target docs": ("cmake/docs_tests.cmake", "--build . --target docs"),
 }
 
 
