@@ -133,7 +133,7 @@ private:
         }
         const char *const action = options_.message.action.empty() ? "" : options_.message.action.c_str();
         const auto began = clock::now();
-        const int error = op_.call(ctx, addresses_.c_str(), action, request_, &response_);
+        const int error = soap_call(ctx, addresses_.c_str(), action, op_.records, request_, &response_);
         times_.push_back(clock::now() - began);
         return error;
     }

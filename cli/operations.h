@@ -1,13 +1,13 @@
 // operations.h - every operation of every port: names, documentation, types, and how it is called.
 //
-// Elsewhere: the rows, which the generator makes from the WSDL files (operation_list.h); the cycle of a port
-// that has no proxy class (call_cycle.h).
+// Elsewhere: the rows, which the generator makes from the WSDL files (operation_list.h); the cycle of a call
+// (soap_call.h).
 #pragma once
 
 #include <memory>
 #include <span>
 
-#include <zuv_client_pro/soap.h>
+#include <zuv_client_pro/soap_call.h>
 
 namespace cli {
 
@@ -26,14 +26,13 @@ struct operation {
     const char *documentation;
     int request_type; // type ids of the two classes
     int response_type;
+    soap_operation records; // for soap_call
 
     // A context that can make the call, the port's proxy where there is one.
     std::unique_ptr<soap> (*make_context)();
     // Reads the element that comes next as the request's class, whatever its name. An object of the context,
     // or null.
     void *(*read_request)(soap *ctx);
-    // One call. 0, or the error that stands in the context; the response is the context's.
-    int (*call)(soap *ctx, const char *endpoints, const char *action, void *request, void **response);
     // Writes the response as an element of its own.
     int (*write_response)(soap *ctx, const void *response);
 };

@@ -12,37 +12,29 @@
 //     constexpr soap_operation set = {SOAP_TYPE___protocolProfile__set,
 //     SOAP_TYPE___protocolProfile__setResponse};
 struct soap_operation {
-    int request;
-    int response;
+    int request;  // type id of the request's record
+    int response; // type id of the response's record
 };
 
-// Sends a request and reads the response: the whole cycle of a call. ctx->header, unless null, goes into the
-// message; an earlier fault is forgotten.
-//   ctx        between calls, with the namespace table of the port or the program's
-//   endpoint   URL, or several with blanks between, the next of which is tried while connecting fails; may be
-//   null if
-//              on_connect or the context's streams lead somewhere
+// Sends a request and reads the response: the whole cycle of a call, between calls. ctx->header, unless null, goes into
+// the message; an earlier fault is forgotten. The connection is kept for the next call by the rules of
+// soap_socket_release.
+//   endpoint   URL, or several with blanks between, the next of which is tried while connecting fails; null if on_connect
+//              or the context's streams lead somewhere
 //   action     SOAPAction; null: empty
-//   operation  only needed during the call
-//   request    an object of the operation's request class, the caller's and only needed during the call;
-//   null: the Body
-//              stays empty
-//   response   takes the object read, of the response class or one derived from it. It belongs to the context
-//   and lives
-//              until soap_discard_objects; null after a failure. A null argument sends the request and reads
-//              nothing
-// Results, which also stand in ctx->error:
-//   SOAP_OK             the response was read, or with a null argument the request sent
-//   SOAP_NO_METHOD      the ids are not those of an operation's records; nothing was sent
+//   operation  what is called
+//   request    an object of the operation's request class; null: the Body stays empty
+//   response   takes the object read, of the response class or one derived from it, which belongs to the context and lives
+//              until soap_discard_objects; null after a failure. A null argument sends the request and reads nothing
+//   returns              what is also in ctx->error: one of these, an HTTP status that came without a SOAP message, what the
+//                        reader refuses (soap_error.h), or the result of a callback
+//   SOAP_OK              the response was read, or with a null argument the request sent
+//   SOAP_NO_METHOD       the ids are not those of an operation's records; nothing was sent
 //   SOAP_CLIENT_FAULT, SOAP_SERVER_FAULT, SOAP_MUST_UNDERSTAND, SOAP_VERSION_MISMATCH, SOAP_FAULT
-//                       a fault was received: ctx->fault
+//                        a fault was received: ctx->fault
 //   SOAP_TCP_ERROR, SOAP_TLS_ERROR, SOAP_EOF
-//                       no connection, or one that failed or went beyond a time limit; the fault's text tells
-//                       which
-//   SOAP_LENGTH         beyond max_message or max_memory, in either direction
-//   SOAP_OUT_OF_MEMORY
-//   an HTTP status      the service answered with it, and without a SOAP message
-//   others              what the reader refuses (soap_error.h), or the result of a callback
-// The connection is kept for the next call by the rules of soap_socket_release.
+//                        no connection, or one that failed or went beyond a time limit; the fault's text tells which
+//   SOAP_LENGTH          beyond max_message or max_memory, in either direction
+//   SOAP_OUT_OF_MEMORY   memory ran out
 ZUV_API int soap_call(soap *ctx, const char *endpoint, const char *action, const soap_operation &operation,
                       const void *request, void **response);

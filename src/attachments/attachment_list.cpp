@@ -85,9 +85,9 @@ int soap_mime_attach(soap *ctx, char *content, std::size_t size, int encoding, c
 
 int attachment_ids_check(soap *ctx, const soap_attachment *list, const char *message_id, int error)
 {
-    std::size_t count = message_id != nullptr;
+    std::size_t count = static_cast<std::size_t>(message_id != nullptr);
     for (const soap_attachment *record = list; record != nullptr; record = record->next)
-        count += record->id != nullptr;
+        count += static_cast<std::size_t>(record->id != nullptr);
     if (count < 2)
         return SOAP_OK;
     auto *const ids = static_cast<hashed_id *>(SOAP_MALLOC(ctx, count * sizeof(hashed_id)));

@@ -1,7 +1,7 @@
 // mime.cpp - MIME parts, out and in: delimiters, part heads, contents.
 //
-// Elsewhere: the head of the part that holds the message (exchange/envelope_frame.cpp), finding that part
-// (the engine's soap_receive_begin), the message's own Content-Type (HTTP).
+// Elsewhere: the head of the part that holds the message (exchange/envelope_frame.cpp), the message's own
+// Content-Type (net/http_write.cpp).
 //
 //   message   = [preamble] first *part end [epilogue]
 //   first     = "--" boundary CR LF fields CR LF content
@@ -399,8 +399,8 @@ void bind_early_parts(soap *ctx)
 // Fields of a form may have one name.
 int end_of_parts(soap *ctx)
 {
-    const bool form =
-        ctx->http_content != nullptr && soap_attr_value(ctx, ctx->http_content, "multipart/form-data");
+    const bool form = ctx->http_content != nullptr &&
+                      (soap_attr_value(ctx, ctx->http_content, "multipart/form-data") != nullptr);
     ctx->mode &= ~MODE_MIME;
     ctx->mime.boundary = nullptr; // a message to be sent draws its own
     ctx->mime.start = nullptr;

@@ -19,9 +19,9 @@ constexpr int BINARY_ID = traits<xsd__base64Binary>::type_id;
 int write_bytes(soap *ctx, const void *object, const char *)
 {
     const auto *binary = static_cast<const xsd__base64Binary *>(object);
-    return soap_base64_write(ctx, binary->content,
-                             binary->content && binary->size > 0 ? static_cast<std::size_t>(binary->size)
-                                                                 : 0);
+    return soap_base64_write(
+        ctx, binary->content,
+        (binary->content != nullptr) && binary->size > 0 ? static_cast<std::size_t>(binary->size) : 0);
 }
 
 bool read_bytes(soap *ctx, xsd__base64Binary &binary)
@@ -41,7 +41,7 @@ bool read_bytes(soap *ctx, xsd__base64Binary &binary)
 bool take_nothing(soap *ctx, xsd__base64Binary &binary)
 {
     binary.content = static_cast<unsigned char *>(soap_block_alloc(ctx, 1));
-    if (!binary.content)
+    if (binary.content == nullptr)
         return false;
     *binary.content = '\0';
     binary.size = 0;
@@ -58,8 +58,8 @@ void *read_binary(soap *ctx, const class_ops &ops, const char *tag, void *object
 {
     auto &binary = *static_cast<xsd__base64Binary *>(object);
     const bool body = ctx->has_body != 0;
-    if (ctx->element_id[0] && !soap_object_register(ctx, ctx->element_id, object, BINARY_ID, ops.size, 0,
-                                                    nullptr, nullptr, nullptr))
+    if (ctx->element_id[0] && soap_object_register(ctx, ctx->element_id, object, BINARY_ID, ops.size, 0,
+                                                   nullptr, nullptr, nullptr) == nullptr)
         return nullptr;
     const bool taken = ctx->element_href[0] ? refer_to_attachment(ctx, binary)
                        : body               ? read_bytes(ctx, binary)

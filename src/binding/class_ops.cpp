@@ -22,7 +22,7 @@ namespace binding {
 
 bool class_descends(const class_ops *derived, const class_ops *base)
 {
-    while (derived && derived != base)
+    while (derived != nullptr && derived != base)
         derived = derived->base;
     return derived != nullptr;
 }
@@ -37,24 +37,24 @@ void *class_instantiate(soap *ctx, const class_ops &ops, int count, const char *
                         const class_ops **made)
 {
     const class_ops *actual = &ops;
-    if (xsi_type && *xsi_type) {
+    if (xsi_type != nullptr && *xsi_type) {
         const class_ops *named = class_by_xsi_type(ctx, xsi_type);
-        if (named && class_descends(named, &ops))
+        if (named != nullptr && class_descends(named, &ops))
             actual = named;
     }
     soap_instance *entry = soap_instance_register(ctx, nullptr, actual->type_id, count, soap_delete_object);
-    if (!entry)
+    if (entry == nullptr)
         return nullptr;
     entry->object = actual->create(ctx, count);
-    if (!entry->object) {
+    if (entry->object == nullptr) {
         // NOLINTNEXTLINE(clang-analyzer-core.NullDereference): no call lacks a context
         return fail_null(ctx, SOAP_OUT_OF_MEMORY);
     }
     const std::size_t bytes = actual->size * static_cast<std::size_t>(count < 0 ? 1 : count);
     memory_charge(ctx, bytes);
-    if (size)
+    if (size != nullptr)
         *size = bytes;
-    if (made)
+    if (made != nullptr)
         *made = actual;
     return entry->object;
 }
@@ -66,7 +66,7 @@ namespace {
 bool is_empty_text(const class_ops &ops, const void *object)
 {
     const std::string *const text = ops.text(const_cast<void *>(object));
-    return text && text->empty();
+    return text != nullptr && text->empty();
 }
 
 // Few objects that refer to each other may be written very often: the counting pass must not go on for ever.
@@ -81,12 +81,12 @@ int class_out(soap *ctx, const class_ops &ops, const void *object, const char *t
 {
     if (counted_too_much(ctx))
         return limit_exceeded(ctx, "max_message", ctx->max_message);
-    if (ops.write_attributes && ops.write_attributes(ctx, object))
+    if (ops.write_attributes != nullptr && ops.write_attributes(ctx, object))
         return ctx->error;
     const int element_id = soap_element_id(ctx, id, object, ops.type_id);
     if ((ctx->mode & MODE_NULL_STRINGS) && is_empty_text(ops, object))
-        return soap_element_null(ctx, tag, element_id, ops.base ? ops.xml_type : type);
-    if (soap_element_out_begin(ctx, tag, element_id, ops.base ? ops.xml_type : type))
+        return soap_element_null(ctx, tag, element_id, ops.base != nullptr ? ops.xml_type : type);
+    if (soap_element_out_begin(ctx, tag, element_id, ops.base != nullptr ? ops.xml_type : type))
         return ctx->error;
     if (ops.write_content(ctx, object, tag))
         return ctx->error;
@@ -96,7 +96,7 @@ int class_out(soap *ctx, const class_ops &ops, const void *object, const char *t
 int class_put(soap *ctx, const class_ops &ops, const void *object, const char *tag, const char *type)
 {
     const int id = soap_multiref_begin(ctx, object, nullptr, 0, tag, ops.type_id);
-    if (ops.out(object, ctx, tag ? tag : ops.xml_type, id, type))
+    if (ops.out(object, ctx, tag != nullptr ? tag : ops.xml_type, id, type))
         return ctx->error;
     return soap_put_finish(ctx);
 }
@@ -104,14 +104,15 @@ int class_put(soap *ctx, const class_ops &ops, const void *object, const char *t
 int class_pointer_out(soap *ctx, const class_ops &ops, const char *tag, int id, const void *object,
                       const char *type)
 {
-    id = soap_element_ref(ctx, tag, id, object, nullptr, 0, type, object ? ops.type_of(object) : ops.type_id);
+    id = soap_element_ref(ctx, tag, id, object, nullptr, 0, type,
+                          object != nullptr ? ops.type_of(object) : ops.type_id);
     return id < 0 ? ctx->error : ops.out(object, ctx, tag, id, type);
 }
 
 void class_pointer_mark(soap *ctx, const class_ops &ops, const void *object)
 {
     // The object's own id, so that the element that defines it and the references to it agree.
-    if (object && soap_mark_pointer(ctx, object, ops.type_of(object)) == 0)
+    if (object != nullptr && soap_mark_pointer(ctx, object, ops.type_of(object)) == 0)
         ops.mark(object, ctx);
 }
 
@@ -196,13 +197,14 @@ bool read_elements(soap *ctx, const member_table &members, void *object, std::ui
 
 bool lacks(const class_ops &ops, const void *object, std::uint64_t seen)
 {
-    return (ops.members->required & ~seen) != 0 || (ops.holds_minima && !ops.holds_minima(object));
+    return (ops.members->required & ~seen) != 0 || (ops.holds_minima != nullptr && !ops.holds_minima(object));
 }
 
 void *read_by_reference(soap *ctx, const class_ops &ops, const char *tag, void *object)
 {
     const bool body = ctx->has_body != 0;
-    if (!soap_object_forward(ctx, ctx->element_href, object, 0, ops.type_id, 0, ops.size, 0, ops.copy_hook))
+    if (soap_object_forward(ctx, ctx->element_href, object, 0, ops.type_id, 0, ops.size, 0, ops.copy_hook) ==
+        nullptr)
         return nullptr;
     if (body && soap_element_in_end(ctx, tag))
         return nullptr;
@@ -214,10 +216,10 @@ void *read_by_reference(soap *ctx, const class_ops &ops, const char *tag, void *
 // What comes before the content in all forms: the object's identity and its attributes.
 bool read_preamble(soap *ctx, const class_ops &ops, void *object)
 {
-    if (ctx->element_id[0] && !soap_object_register(ctx, ctx->element_id, object, ops.type_id, ops.size, 0,
-                                                    nullptr, nullptr, nullptr))
+    if (ctx->element_id[0] && soap_object_register(ctx, ctx->element_id, object, ops.type_id, ops.size, 0,
+                                                   nullptr, nullptr, nullptr) == nullptr)
         return false;
-    return !ops.read_attributes || ops.read_attributes(ctx, object);
+    return ops.read_attributes == nullptr || ops.read_attributes(ctx, object);
 }
 
 } // namespace
@@ -256,12 +258,12 @@ void *read_further_members(soap *ctx, const class_ops &ops, const char *tag, voi
 
 void *class_in(soap *ctx, const class_ops &ops, const char *tag, void *object)
 {
-    if (soap_element_in_begin(ctx, tag, ops.nillable, nullptr))
+    if (soap_element_in_begin(ctx, tag, static_cast<int>(ops.nillable), nullptr))
         return nullptr;
     const class_ops *actual = &ops;
-    if (!object)
+    if (object == nullptr)
         object = class_instantiate(ctx, ops, -1, ctx->element_type, nullptr, &actual);
-    return object ? actual->read(ctx, *actual, tag, object) : nullptr;
+    return object != nullptr ? actual->read(ctx, *actual, tag, object) : nullptr;
 }
 
 bool independents_read(soap *ctx)
@@ -274,14 +276,14 @@ bool independents_read(soap *ctx)
 void *class_get(soap *ctx, const class_ops &ops, const char *tag, void *object)
 {
     object = class_in(ctx, ops, tag, object);
-    return object && independents_read(ctx) ? object : nullptr;
+    return object != nullptr && independents_read(ctx) ? object : nullptr;
 }
 
 bool class_new_in(soap *ctx, const class_ops &ops, const char *tag, void **place)
 {
     const class_ops *actual = &ops;
     void *object = class_instantiate(ctx, ops, -1, ctx->element_type, nullptr, &actual);
-    if (!object || !actual->read(ctx, *actual, tag, object))
+    if (object == nullptr || actual->read(ctx, *actual, tag, object) == nullptr)
         return false;
     *place = object;
     return true;
@@ -295,7 +297,7 @@ bool class_pointer_in(soap *ctx, const class_ops &ops, const char *tag, void **p
     if (!ctx->null_flag && ctx->element_href[0] != '#')
         return class_new_in(ctx, ops, tag, place);
     const bool body = ctx->has_body != 0;
-    if (!soap_object_forward_ptr(ctx, ctx->element_href, place, ops.type_id, ops.size, 0))
+    if (soap_object_forward_ptr(ctx, ctx->element_href, place, ops.type_id, ops.size, 0) == nullptr)
         return false;
     return !body || soap_element_in_end(ctx, tag) == 0;
 }
@@ -310,8 +312,9 @@ bool read_vector_item_object(soap *ctx, const class_ops &ops, const char *tag, v
         return class_new_in(ctx, ops, tag, object);
     const bool body = ctx->has_body != 0;
     // Level 1: what the vector takes is the object's address, which is known before the object is complete.
-    if (!ctx->null_flag && !soap_object_forward(ctx, ctx->element_href, vector, index, ops.type_id,
-                                                vector_type, ops.size, 1, soap_insert_into_vector))
+    if (!ctx->null_flag &&
+        (soap_object_forward(ctx, ctx->element_href, vector, index, ops.type_id, vector_type, ops.size, 1,
+                             soap_insert_into_vector) == nullptr))
         return false;
     return !body || soap_element_in_end(ctx, tag) == 0;
 }

@@ -36,22 +36,22 @@ void *read_chars(soap *ctx, const type_entry &entry, int type)
 {
     char **place =
         soap_string_element_in(ctx, nullptr, nullptr, entry.xml_name, type, type == CHARS_ID ? 1 : 2, -1, -1);
-    return place ? *place : nullptr;
+    return place != nullptr ? *place : nullptr;
 }
 
 // The object itself is what a reference fills late: no pointer to it may be waiting when this returns.
 void *read_text(soap *ctx)
 {
     auto *text = static_cast<std::string *>(soap_instantiate(ctx, TEXT_ID, nullptr, nullptr, nullptr));
-    return text && read_text_object(ctx, nullptr, text) ? text : nullptr;
+    return text != nullptr && read_text_object(ctx, nullptr, text) ? text : nullptr;
 }
 
 void *read_vector(soap *ctx, const type_entry &entry, int type)
 {
     void *vector = soap_instantiate(ctx, type, nullptr, nullptr, nullptr);
     int item_type = entry.item;
-    void *item = vector ? read_by_type(ctx, item_type) : nullptr;
-    if (!item)
+    void *item = vector != nullptr ? read_by_type(ctx, item_type) : nullptr;
+    if (item == nullptr)
         return nullptr;
     memory_charge(ctx, SMALLEST_ALLOCATION);
     if (!entry.vector->append(vector, item)) {
@@ -64,7 +64,7 @@ void *read_vector(soap *ctx, const type_entry &entry, int type)
 void *read_wrapper(soap *ctx, const type_entry &entry, int type)
 {
     void *record = soap_instantiate(ctx, type, nullptr, nullptr, nullptr);
-    if (!record ||
+    if (record == nullptr ||
         !class_pointer_in(ctx, *type_entries[entry.item].ops, entry.element, static_cast<void **>(record)))
         return nullptr;
     return record;
@@ -73,7 +73,7 @@ void *read_wrapper(soap *ctx, const type_entry &entry, int type)
 void *read_pointer(soap *ctx, const type_entry &entry)
 {
     auto **place = static_cast<void **>(soap_block_alloc(ctx, sizeof(void *)));
-    if (!place || !class_pointer_in(ctx, *type_entries[entry.item].ops, nullptr, place))
+    if (place == nullptr || !class_pointer_in(ctx, *type_entries[entry.item].ops, nullptr, place))
         return nullptr;
     return place;
 }
@@ -81,7 +81,7 @@ void *read_pointer(soap *ctx, const type_entry &entry)
 void *read_code(soap *ctx, const type_entry &entry, int type)
 {
     auto *code = static_cast<std::int32_t *>(soap_instantiate(ctx, type, nullptr, nullptr, nullptr));
-    return code && read_code_value(ctx, nullptr, code, *entry.names) ? code : nullptr;
+    return code != nullptr && read_code_value(ctx, nullptr, code, *entry.names) ? code : nullptr;
 }
 
 } // namespace
@@ -89,7 +89,7 @@ void *read_code(soap *ctx, const type_entry &entry, int type)
 void *read_by_type(soap *ctx, int type)
 {
     const type_entry *entry = dispatched(type);
-    if (!entry)
+    if (entry == nullptr)
         return nullptr;
     switch (entry->kind) {
     case type_kind::chars:
@@ -192,9 +192,9 @@ void *soap_read_element(soap *ctx, int *type)
 int soap_write_element(soap *ctx, void *object, const char *tag, int id, int type)
 {
     const type_entry *entry = dispatched(type);
-    if (!entry)
+    if (entry == nullptr)
         return 0;
-    const char *name = tag ? tag : entry->xml_name;
+    const char *name = tag != nullptr ? tag : entry->xml_name;
     switch (entry->kind) {
     case type_kind::chars:
         return write_chars(ctx, *entry, name, id, reinterpret_cast<char *const *>(&object), type);
@@ -228,7 +228,7 @@ int soap_write_element(soap *ctx, void *object, const char *tag, int id, int typ
 void soap_mark_object(soap *ctx, void *object, int type)
 {
     const type_entry *entry = dispatched(type);
-    if (!entry || !object)
+    if (entry == nullptr || object == nullptr)
         return;
     switch (entry->kind) {
     case type_kind::object:
@@ -261,7 +261,7 @@ int soap_read_independents(soap *ctx)
     if (ctx->soap_version == 1) {
         for (;;) {
             int type = 0;
-            if (soap_read_element(ctx, &type))
+            if (soap_read_element(ctx, &type) != nullptr)
                 continue;
             if (ctx->error || soap_element_skip(ctx))
                 break;

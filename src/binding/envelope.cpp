@@ -1,6 +1,6 @@
 // envelope.cpp - header, fault and detail of the SOAP envelope: made, written, read, reached by version.
 //
-// Elsewhere: what becomes of a received fault (fault_receive.cpp), texts of errors (engine).
+// Elsewhere: what becomes of a received fault (exchange/fault_receive.cpp), texts of errors (exchange/error_text.cpp).
 #include "binding/envelope.h"
 
 #include <new>
@@ -267,7 +267,7 @@ template <class R> bool lone_record_in(soap *ctx, const char *tag, R **place)
 
 int chars_out(soap *ctx, const char *tag, char *text)
 {
-    if (!text)
+    if (text == nullptr)
         return 0;
     if (soap_element_out_begin(ctx, tag, -1, "") || soap_text_write(ctx, text, 0))
         return ctx->error;
@@ -276,7 +276,7 @@ int chars_out(soap *ctx, const char *tag, char *text)
 
 int code_out(soap *ctx, const char *tag, const char *code)
 {
-    if (!code)
+    if (code == nullptr)
         return 0;
     const char *mapped = soap_qname_write_map(ctx, code);
     if (soap_element_out_begin(ctx, tag, -1, "") || soap_text_write(ctx, mapped, 0))
@@ -302,16 +302,17 @@ int members_out(soap *ctx, const SOAP_ENV__Code &code)
 
 int members_out(soap *ctx, const SOAP_ENV__Reason &reason)
 {
-    if (!reason.Text)
+    if (reason.Text == nullptr)
         return 0;
-    if (ctx->soap_version == 2 && soap_attr_set(ctx, "xml:lang", ctx->language ? ctx->language : "en", 1))
+    if (ctx->soap_version == 2 &&
+        soap_attr_set(ctx, "xml:lang", ctx->language != nullptr ? ctx->language : "en", 1))
         return ctx->error;
     return chars_out(ctx, "SOAP-ENV:Text", reason.Text);
 }
 
 int members_out(soap *ctx, const SOAP_ENV__Detail &detail)
 {
-    if (detail.__any && soap_send_text(ctx, detail.__any))
+    if (detail.__any != nullptr && soap_send_text(ctx, detail.__any))
         return ctx->error;
 #define PUT_FAULT(name)                                                                                      \
     if (detail.name && class_pointer_out(ctx, ops_of<protocol__##name>, traits<protocol__##name>::xml_type,  \
@@ -319,7 +320,7 @@ int members_out(soap *ctx, const SOAP_ENV__Detail &detail)
         return ctx->error;
     SOAP_DETAIL_FAULTS(PUT_FAULT)
 #undef PUT_FAULT
-    return detail.fault ? soap_write_element(ctx, detail.fault, nullptr, -1, detail.__type) : 0;
+    return detail.fault != nullptr ? soap_write_element(ctx, detail.fault, nullptr, -1, detail.__type) : 0;
 }
 
 int members_out(soap *ctx, const SOAP_ENV__Fault &fault)
@@ -345,7 +346,7 @@ template <class R> int record_out(soap *ctx, const char *tag, const R *record, i
 
 void mark_detail(soap *ctx, const SOAP_ENV__Detail *detail)
 {
-    if (!detail)
+    if (detail == nullptr)
         return;
 #define MARK_FAULT(name) class_pointer_mark(ctx, ops_of<protocol__##name>, detail->name);
     SOAP_DETAIL_FAULTS(MARK_FAULT)
@@ -379,7 +380,7 @@ bool drop_bad_value(soap *ctx, std::uint32_t level)
     ctx->error = 0;
     if (ctx->peeked && ctx->tag[0] && ctx->nesting_level == level) { // refused before it was entered
         ctx->peeked = 0;
-        ctx->nesting_level += ctx->has_body != 0;
+        ctx->nesting_level += static_cast<unsigned int>(ctx->has_body != 0);
     }
     while (ctx->nesting_level > level) {
         if (soap_element_in_end(ctx, nullptr)) {
@@ -452,19 +453,19 @@ using namespace binding;
 
 void soap_header_record(soap *ctx)
 {
-    if (!ctx->header)
+    if (ctx->header == nullptr)
         ctx->header = make<SOAP_ENV__Header>(ctx);
 }
 
 void soap_mark_header(soap *ctx)
 {
-    if (ctx->header)
+    if (ctx->header != nullptr)
         mark_record(ctx, *ctx->header);
 }
 
 int soap_header_put(soap *ctx)
 {
-    if (!ctx->header)
+    if (ctx->header == nullptr)
         return 0;
     ctx->message_part = PART_HEADER;
     if (record_out(ctx, "SOAP-ENV:Header", ctx->header))
@@ -487,7 +488,7 @@ int soap_header_get(soap *ctx)
     if (ctx->error)
         return ctx->error;
     ctx->message_part = PART_AFTER_HEADER;
-    if (ctx->error == 0 && ctx->on_soap_header)
+    if (ctx->error == 0 && ctx->on_soap_header != nullptr)
         ctx->error = ctx->on_soap_header(ctx);
     return ctx->error;
 }
@@ -496,14 +497,14 @@ int soap_header_get(soap *ctx)
 
 void soap_mark_fault(soap *ctx)
 {
-    if (ctx->fault)
+    if (ctx->fault != nullptr)
         mark_record(ctx, *ctx->fault);
 }
 
 int soap_fault_put(soap *ctx)
 {
     soap_fault_record(ctx);
-    return ctx->fault ? record_out(ctx, "SOAP-ENV:Fault", ctx->fault) : ctx->error;
+    return ctx->fault != nullptr ? record_out(ctx, "SOAP-ENV:Fault", ctx->fault) : ctx->error;
 }
 
 int soap_fault_read(soap *ctx)
@@ -521,13 +522,13 @@ int soap_fault_read(soap *ctx)
 
 void soap_fault_record(soap *ctx)
 {
-    if (!ctx->fault)
+    if (ctx->fault == nullptr)
         ctx->fault = make<SOAP_ENV__Fault>(ctx);
-    if (!ctx->fault || ctx->soap_version != 2)
+    if (ctx->fault == nullptr || ctx->soap_version != 2)
         return;
-    if (!ctx->fault->Code)
+    if (ctx->fault->Code == nullptr)
         ctx->fault->Code = make<SOAP_ENV__Code>(ctx);
-    if (!ctx->fault->Reason)
+    if (ctx->fault->Reason == nullptr)
         ctx->fault->Reason = make<SOAP_ENV__Reason>(ctx);
 }
 
@@ -550,10 +551,10 @@ const char **place_of(char **text)
 SOAP_ENV__Detail *detail_record(soap *ctx)
 {
     soap_fault_record(ctx);
-    if (!ctx->fault)
+    if (ctx->fault == nullptr)
         return nullptr;
     SOAP_ENV__Detail *&detail = ctx->soap_version == 1 ? ctx->fault->detail : ctx->fault->Detail;
-    if (!detail)
+    if (detail == nullptr)
         detail = make<SOAP_ENV__Detail>(ctx);
     return detail;
 }
@@ -563,55 +564,56 @@ SOAP_ENV__Detail *detail_record(soap *ctx)
 const char **soap_fault_code_field(soap *ctx)
 {
     soap_fault_record(ctx);
-    if (!ctx->fault)
+    if (ctx->fault == nullptr)
         return thrown_away();
     if (ctx->soap_version != 2)
         return place_of(&ctx->fault->faultcode);
-    return ctx->fault->Code ? place_of(&ctx->fault->Code->Value) : thrown_away();
+    return ctx->fault->Code != nullptr ? place_of(&ctx->fault->Code->Value) : thrown_away();
 }
 
 const char **soap_fault_subcode_field(soap *ctx)
 {
     soap_fault_record(ctx);
-    if (!ctx->fault)
+    if (ctx->fault == nullptr)
         return thrown_away();
     if (ctx->soap_version != 2)
         return place_of(&ctx->fault->faultcode);
-    if (!ctx->fault->Code)
+    if (ctx->fault->Code == nullptr)
         return thrown_away();
-    if (!ctx->fault->Code->Subcode)
+    if (ctx->fault->Code->Subcode == nullptr)
         ctx->fault->Code->Subcode = make<SOAP_ENV__Code>(ctx);
-    return ctx->fault->Code->Subcode ? place_of(&ctx->fault->Code->Subcode->Value) : thrown_away();
+    return ctx->fault->Code->Subcode != nullptr ? place_of(&ctx->fault->Code->Subcode->Value) : thrown_away();
 }
 
 const char **soap_fault_string_field(soap *ctx)
 {
     soap_fault_record(ctx);
-    if (!ctx->fault)
+    if (ctx->fault == nullptr)
         return thrown_away();
     if (ctx->soap_version != 2)
         return place_of(&ctx->fault->faultstring);
-    return ctx->fault->Reason ? place_of(&ctx->fault->Reason->Text) : thrown_away();
+    return ctx->fault->Reason != nullptr ? place_of(&ctx->fault->Reason->Text) : thrown_away();
 }
 
 const char **soap_fault_detail_field(soap *ctx)
 {
     SOAP_ENV__Detail *detail = detail_record(ctx);
-    return detail ? place_of(&detail->__any) : thrown_away();
+    return detail != nullptr ? place_of(&detail->__any) : thrown_away();
 }
 
 const char *soap_fault_subcode_value(soap *ctx)
 {
     const SOAP_ENV__Fault *fault = ctx->fault;
-    if (ctx->soap_version != 2 || !fault || !fault->Code || !fault->Code->Subcode)
+    if (ctx->soap_version != 2 || fault == nullptr || fault->Code == nullptr ||
+        (fault->Code->Subcode == nullptr))
         return nullptr;
     return fault->Code->Subcode->Value;
 }
 
 const char *soap_fault_detail_value(soap *ctx)
 {
-    if (!ctx->fault)
+    if (ctx->fault == nullptr)
         return nullptr;
     const SOAP_ENV__Detail *detail = ctx->soap_version == 1 ? ctx->fault->detail : ctx->fault->Detail;
-    return detail ? detail->__any : nullptr;
+    return detail != nullptr ? detail->__any : nullptr;
 }

@@ -1,6 +1,6 @@
 // member_read.cpp - leaf operations of reading: texts, enumerations, booleans, items of vectors.
 //
-// Elsewhere: numbers (codec), whole objects (class_ops.cpp).
+// Elsewhere: numbers (values), whole objects (class_ops.cpp).
 #include "binding/member_read.h"
 
 #include <cstring>
@@ -46,7 +46,7 @@ int delete_text(soap_instance *instance)
 std::string *new_text(soap *ctx, std::string_view content = {})
 {
     soap_instance *instance = soap_instance_register(ctx, nullptr, TEXT_TYPE_ID, -1, delete_text);
-    if (!instance)
+    if (instance == nullptr)
         return nullptr;
     try {
         auto *text = new std::string(content);
@@ -172,14 +172,14 @@ bool is_nil(soap *ctx, const char *tag, bool *done)
 
 bool refers(soap *ctx, const char *tag, void *place, std::size_t size, int type_id, bool body)
 {
-    return soap_object_forward(ctx, ctx->element_href, place, 0, type_id, 0, size, 0, nullptr) &&
+    return soap_object_forward(ctx, ctx->element_href, place, 0, type_id, 0, size, 0, nullptr) != nullptr &&
            ends(ctx, tag, body);
 }
 
 bool registers(soap *ctx, void *object, int type_id, std::size_t size)
 {
-    return !ctx->element_id[0] || soap_object_register(ctx, ctx->element_id, object, type_id, size, 0,
-                                                       nullptr, nullptr, nullptr) != nullptr;
+    return (ctx->element_id[0] == 0) || soap_object_register(ctx, ctx->element_id, object, type_id, size, 0,
+                                                             nullptr, nullptr, nullptr) != nullptr;
 }
 
 // The element just begun is nil or a reference: the place becomes null, or is filled when the object is
@@ -187,7 +187,8 @@ bool registers(soap *ctx, void *object, int type_id, std::size_t size)
 bool refers_pointer(soap *ctx, const char *tag, void **place, int type_id, std::size_t size)
 {
     const bool body = ctx->has_body != 0;
-    return soap_object_forward_ptr(ctx, ctx->element_href, place, type_id, size, 0) && ends(ctx, tag, body);
+    return soap_object_forward_ptr(ctx, ctx->element_href, place, type_id, size, 0) != nullptr &&
+           ends(ctx, tag, body);
 }
 
 bool refers_item(soap *ctx, const char *tag, void *vector, std::size_t index, int item_type, std::size_t size,
@@ -195,7 +196,7 @@ bool refers_item(soap *ctx, const char *tag, void *vector, std::size_t index, in
 {
     const bool body = ctx->has_body != 0;
     return soap_object_forward(ctx, ctx->element_href, vector, index, item_type, vector_type, size, 0,
-                               soap_insert_into_vector) &&
+                               soap_insert_into_vector) != nullptr &&
            ends(ctx, tag, body);
 }
 
@@ -243,7 +244,7 @@ bool read_text_pointer(soap *ctx, const char *tag, void **place)
     if (body && !read_characters(ctx, content))
         return false;
     std::string *text = new_text(ctx, content);
-    if (!text || !registers(ctx, text, TEXT_TYPE_ID, sizeof(std::string)))
+    if (text == nullptr || !registers(ctx, text, TEXT_TYPE_ID, sizeof(std::string)))
         return false;
     *place = text;
     return ends(ctx, tag, body);
@@ -257,7 +258,7 @@ bool read_text_object(soap *ctx, const char *tag, std::string *text)
     const bool body = ctx->has_body != 0;
     if (is_reference(ctx)) {
         return soap_object_forward(ctx, ctx->element_href, text, 0, TEXT_TYPE_ID, 0, sizeof *text, 0,
-                                   copy_text_late) &&
+                                   copy_text_late) != nullptr &&
                ends(ctx, tag, body);
     }
     if (body && !ctx->null_flag && !read_text_content(ctx, *text))
@@ -281,12 +282,12 @@ bool read_vector_item_text(soap *ctx, const char *tag, std::vector<std::string> 
     std::string *shared = nullptr; // an item with an id needs a place that stays: the vector moves its items
     if (ctx->element_id[0]) {
         shared = new_text(ctx);
-        if (!shared || !registers(ctx, shared, TEXT_TYPE_ID, sizeof(std::string)))
+        if (shared == nullptr || !registers(ctx, shared, TEXT_TYPE_ID, sizeof(std::string)))
             return false;
     }
     if (body && !ctx->null_flag && !read_text_content(ctx, vector.back()))
         return false;
-    if (shared && !copy_text(ctx, *shared, vector.back()))
+    if (shared != nullptr && !copy_text(ctx, *shared, vector.back()))
         return false;
     return ends(ctx, tag, body);
 }
@@ -326,7 +327,7 @@ bool read_code_pointer(soap *ctx, const char *tag, void **place, const enum_tabl
     if (ctx->null_flag || is_reference(ctx))
         return refers_pointer(ctx, tag, place, names.type_id, sizeof(std::int32_t));
     auto *code = static_cast<std::int32_t *>(soap_block_alloc(ctx, sizeof(std::int32_t)));
-    if (!code || !registers(ctx, code, names.type_id, sizeof *code))
+    if (code == nullptr || !registers(ctx, code, names.type_id, sizeof *code))
         return false;
     *code = 0;
     if (!read_simple(ctx, tag, [&](const char *text) { return parse_code(ctx, text, names, code); }))
@@ -352,12 +353,12 @@ bool read_vector_item_code(soap *ctx, const char *tag, std::int32_t *code, bool 
     std::int32_t *shared = nullptr; // as for texts
     if (ctx->element_id[0]) {
         shared = static_cast<std::int32_t *>(soap_block_alloc(ctx, sizeof *shared));
-        if (!shared || !registers(ctx, shared, names.type_id, sizeof *shared))
+        if (shared == nullptr || !registers(ctx, shared, names.type_id, sizeof *shared))
             return false;
     }
     if (!read_simple(ctx, tag, [&](const char *text) { return parse_code(ctx, text, names, code); }))
         return false;
-    if (shared)
+    if (shared != nullptr)
         *shared = *code;
     return true;
 }
@@ -366,7 +367,7 @@ bool read_code_attribute(soap *ctx, const char *name, bool required, const enum_
                          std::int32_t *code, bool *present)
 {
     const char *text = soap_attr_get(ctx, name, required ? 1 : 0);
-    if (!text)
+    if (text == nullptr)
         return ctx->error == 0;
     *present = true;
     return parse_code(ctx, text, names, code);
@@ -384,7 +385,7 @@ bool read_boolean_value(soap *ctx, const char *tag, bool *place)
     if (is_reference(ctx)) {
         const bool body = ctx->has_body != 0;
         return soap_object_forward(ctx, ctx->element_href, place, 0, BOOLEAN_TYPE_ID, 0, sizeof *place, 0,
-                                   soap_copy_bytes) &&
+                                   soap_copy_bytes) != nullptr &&
                ends(ctx, tag, body);
     }
     return read_simple(ctx, tag, [&](const char *text) { return parse_boolean(ctx, text, place); });

@@ -1,6 +1,6 @@
 // member_write.cpp - leaf operations of writing: texts, enumerations, booleans, what is absent.
 //
-// Elsewhere: numbers (codec), whole objects (class_ops.cpp).
+// Elsewhere: numbers (values), whole objects (class_ops.cpp).
 #include "binding/member_write.h"
 
 #include <cstring>
@@ -97,7 +97,7 @@ void mark_text(soap *ctx, const std::string *text)
 
 void mark_plain(soap *ctx, const void *value, int type_id)
 {
-    if (value && !is_tree(ctx))
+    if (value != nullptr && !is_tree(ctx))
         soap_mark_pointer(ctx, value, type_id);
 }
 

@@ -13,7 +13,7 @@ namespace {
 // The object of a record. Bytes are entered by their content; the object is what holds it.
 void *object_of(const soap_pointer_record &record)
 {
-    if (!record.array)
+    if (record.array == nullptr)
         return const_cast<void *>(record.ptr);
     static const xsd__base64Binary model;
     const auto offset =
@@ -32,7 +32,7 @@ int write_apart(soap *ctx, const soap_pointer_record &record)
 
 int soap_put_finish(soap *ctx)
 {
-    const bool encoded = ctx->soap_version == 1 && ctx->encoding_style;
+    const bool encoded = ctx->soap_version == 1 && ctx->encoding_style != nullptr;
     if (!encoded || (ctx->mode & (SOAP_XML_TREE | SOAP_XML_GRAPH)))
         return 0;
     return soap_pointer_each_apart(ctx, &binding::write_apart);

@@ -52,7 +52,7 @@ int type_by_qname(soap *ctx, const name_index &index, const char *qname)
 const class_ops *class_by_xsi_type(soap *ctx, const char *xsi_type)
 {
     const type_entry *entry = type_entry_of(type_by_qname(ctx, type_index, xsi_type));
-    return entry ? entry->ops : nullptr;
+    return entry != nullptr ? entry->ops : nullptr;
 }
 
 namespace {
@@ -157,7 +157,7 @@ void *make_block(soap *ctx, std::size_t size, int count)
 {
     const std::size_t bytes = size * static_cast<std::size_t>(count < 0 ? 1 : count);
     void *block = soap_block_alloc(ctx, bytes);
-    if (block && bytes)
+    if (block != nullptr && bytes)
         std::memset(block, 0, bytes);
     return block;
 }
@@ -165,10 +165,10 @@ void *make_block(soap *ctx, std::size_t size, int count)
 void *make_instance(soap *ctx, const type_entry &entry, int type, int count)
 {
     soap_instance *instance = soap_instance_register(ctx, nullptr, type, count, soap_delete_object);
-    if (!instance)
+    if (instance == nullptr)
         return nullptr;
     instance->object = make(entry, count);
-    if (!instance->object)
+    if (instance->object == nullptr)
         fail(ctx, SOAP_OUT_OF_MEMORY);
     memory_charge(ctx, plain_size(entry) * static_cast<std::size_t>(count < 0 ? 1 : count));
     return instance->object;
@@ -209,11 +209,11 @@ void *soap_instantiate_array(soap *ctx, int type, int count, const char *xsi_typ
                              std::size_t *size)
 {
     const type_entry *entry = type_entry_of(type);
-    if (!entry)
+    if (entry == nullptr)
         return nullptr;
     if (entry->kind == type_kind::object)
         return class_instantiate(ctx, *entry->ops, count, xsi_type, size, nullptr);
-    if (size)
+    if (size != nullptr)
         *size = plain_size(*entry) * static_cast<std::size_t>(count < 0 ? 1 : count);
     return is_instance(entry->kind) ? make_instance(ctx, *entry, type, count)
                                     : make_block(ctx, plain_size(*entry), count);
@@ -231,7 +231,7 @@ int soap_delete_object(soap_instance *instance)
     const type_entry &entry = type_entries[instance->type_id];
     if (!is_instance(entry.kind))
         return -1;
-    if (instance->object)
+    if (instance->object != nullptr)
         unmake(entry, instance->object, instance->array_size);
     return 0;
 }
@@ -240,7 +240,7 @@ void soap_insert_into_vector(soap *ctx, int, int place_type, void *vector, std::
                              const void *source, std::size_t)
 {
     const type_entry *entry = type_entry_of(place_type);
-    if (!entry || !entry->vector)
+    if (entry == nullptr || entry->vector == nullptr)
         return;
     if (entry->kind == type_kind::text_vector) {
         const std::size_t length = static_cast<const std::string *>(source)->size();
@@ -258,7 +258,7 @@ void soap_insert_into_vector(soap *ctx, int, int place_type, void *vector, std::
 const char *soap_type_name(int type)
 {
     const type_entry *entry = type_entry_of(type);
-    return entry ? entry->xml_name : nullptr;
+    return entry != nullptr ? entry->xml_name : nullptr;
 }
 
 int soap_type_by_name(const char *name)

@@ -28,10 +28,10 @@ int number_out(soap *ctx, const char *tag, int id, const void *place, const char
 
 void *boolean_in(soap *ctx, const char *tag, void *place, const char *)
 {
-    auto *value = static_cast<bool *>(place ? place : soap_block_alloc(ctx, sizeof(bool)));
-    if (!value)
+    auto *value = static_cast<bool *>(place != nullptr ? place : soap_block_alloc(ctx, sizeof(bool)));
+    if (value == nullptr)
         return nullptr;
-    if (!place)
+    if (place == nullptr)
         *value = false;
     return read_boolean_value(ctx, tag, value) ? value : nullptr;
 }

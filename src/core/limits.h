@@ -1,7 +1,7 @@
 // limits.h - what one message may cost: bytes of its XML, memory, copies, raw bytes that bring nothing.
 //
 // Here: counting, and the one place where a limit's error is born. Elsewhere: the text that tells it
-// (error.cpp), open elements (soap::max_depth, in the codec), heads (transport).
+// (exchange/error_text.cpp), open elements (soap::max_depth, in xml), heads (net).
 //
 // Always: counting costs an addition. Received bytes and memory are compared with their limits once for each
 // buffer of input and at the end of the message, so that what one buffer (64 KB) is made into comes on top.

@@ -1,6 +1,6 @@
 // parameter_list.cpp - items of lists such as `multipart/related; boundary="x"; start=y`, found by name.
 //
-// Elsewhere: the headers that hold such lists (transport's http_headers.cpp, codec's mime.cpp).
+// Elsewhere: the headers that hold such lists (net/http_headers.cpp, attachments/mime.cpp).
 //
 //   list  = item *( ("," / ";") item )
 //   item  = name [ "=" value ]
@@ -57,7 +57,7 @@ const char *copy_quoted(const char *text, char *target)
             target[length++] = *text;
     }
     target[length] = '\0';
-    return text + (*text == '"');
+    return text + static_cast<int>(*text == '"');
 }
 
 const char *copy_value(const char *text, char *target)

@@ -1,6 +1,6 @@
 // recv_line.cpp - one header line of HTTP or MIME out of the input buffer, folded lines joined.
 //
-// Elsewhere: what the lines mean (transport's http_read.cpp, codec's mime.cpp), filling the buffer.
+// Elsewhere: what the lines mean (net/http_read.cpp, attachments/mime.cpp), filling the buffer.
 // Always: what is stored is terminated and shorter than the size given, whatever arrives.
 #include <algorithm>
 #include <cstring>

@@ -1,7 +1,7 @@
 // text_encoding.h - which encoding received XML is in: its names, and the bits of soap::mode that stand for
 // it.
 //
-// Elsewhere: who names it (the XML declaration, xml/xml_token.cpp; heads, transport and MIME parts),
+// Elsewhere: who names it (the XML declaration, xml/xml_token.cpp; heads and MIME parts),
 // decoding (xml/xml_token.cpp).
 #pragma once
 

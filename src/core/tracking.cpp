@@ -1,4 +1,4 @@
-// tracking.cpp - tracked allocation: every block that the engine takes stands in a hash table, so that leaks
+// tracking.cpp - tracked allocation: every block that the library allocates is in a hash table, so that leaks
 // and double frees can be named with the place in the source where the block came from.
 //
 // Elsewhere: blocks that are released together (managed_blocks.cpp), records in slabs (record_pool.h).

@@ -123,7 +123,7 @@ int run_call(soap *ctx, const char *endpoint, const char *action, const soap_ope
     const body_part expected = part_of(operation.response, binding::type_kind::response);
     ctx->encoding_style = nullptr;
     soap_reset_call(ctx);
-    if (!sent.element || !expected.element)
+    if (sent.element == nullptr || expected.element == nullptr)
         return fail(ctx, SOAP_NO_METHOD);
     if (soap_endpoint_check(ctx, endpoint))
         return ctx->error;
@@ -133,7 +133,7 @@ int run_call(soap *ctx, const char *endpoint, const char *action, const soap_ope
         attachments_forget(ctx); // they belong to this call, as they do when it fails later
         return ctx->exceeded != nullptr ? soap_socket_release(ctx) : ctx->error;
     }
-    if (send_message(ctx, endpoint, action ? action : "", sent, request) || !response)
+    if (send_message(ctx, endpoint, action != nullptr ? action : "", sent, request) || response == nullptr)
         return soap_socket_release(ctx);
     *response = nullptr;
     if (begin_response(ctx))
@@ -150,10 +150,10 @@ int run_call(soap *ctx, const char *endpoint, const char *action, const soap_ope
 int soap_call(soap *ctx, const char *endpoint, const char *action, const soap_operation &operation,
               const void *request, void **response)
 {
-    if (response)
+    if (response != nullptr)
         *response = nullptr;
     const int error = run_call(ctx, endpoint, action, operation, request, response);
-    if (error && response)
+    if (error && response != nullptr)
         *response = nullptr;
     return error;
 }
@@ -167,16 +167,16 @@ int call(soap *ctx, const char *&proxy_endpoint, const char *default_endpoint,
          const soap_operation &operation, const char *endpoint, const char *action, const void *request,
          void **result)
 {
-    if (endpoint)
+    if (endpoint != nullptr)
         proxy_endpoint = endpoint;
-    if (!proxy_endpoint)
+    if (proxy_endpoint == nullptr)
         proxy_endpoint = default_endpoint;
     return run_call(ctx, proxy_endpoint, action, operation, request, result);
 }
 
 void *record_or(void *record, void *stand_in)
 {
-    return record ? record : stand_in;
+    return record != nullptr ? record : stand_in;
 }
 
 int init(soap *ctx, int input_mode, int output_mode, const soap_namespace *namespaces)
@@ -195,7 +195,7 @@ void destroy(soap *ctx)
 void set_header(soap *ctx, protocol__Header *header)
 {
     soap_header_record(ctx);
-    if (ctx->header)
+    if (ctx->header != nullptr)
         ctx->header->header = header;
 }
 

@@ -1,6 +1,6 @@
 // context.h - what becomes of each field of a context when it begins, is copied, and loses its connection.
 //
-// A field has one row here, or in core/managed_fields.h; context.cpp doesn't compile without it. What more
+// A field has one row here, or in core/memory.h; context.cpp doesn't compile without it. What more
 // has to be done for a field than the row tells stands in the functions of context.cpp and context_copy.cpp
 // that use the rows.
 #pragma once

@@ -47,7 +47,7 @@ std::string_view part_type(const soap *ctx)
 
 bool begins_mime_part(const soap *ctx)
 {
-    return (ctx->mode & MODE_MIME) && ctx->mime.boundary && ctx->mime.start &&
+    return ((ctx->mode & MODE_MIME) != 0u) && ctx->mime.boundary != nullptr && (ctx->mime.start != nullptr) &&
            std::strlen(ctx->mime.boundary) + std::strlen(ctx->mime.start) < MIME_NAMES_MAX;
 }
 
@@ -67,7 +67,7 @@ int put_mime_part_head(soap *ctx)
 const char *envelope_uri(const soap *ctx)
 {
     const soap_namespace *table = ctx->local_namespaces;
-    return table && table->prefix ? xml_row_uri(*table) : nullptr;
+    return table != nullptr && table->prefix != nullptr ? xml_row_uri(*table) : nullptr;
 }
 
 // Makes the header of the SOAP record from what the counting pass found, and counts it.
@@ -78,11 +78,11 @@ int prepare_dime_record(soap *ctx)
     std::snprintf(id, sizeof id, ctx->dime_id_format, 0);
     const char *type = envelope_uri(ctx);
     ctx->dime.id = soap_string_dup(ctx, id);
-    ctx->dime.type = soap_string_dup(ctx, type ? type : "");
-    if (!ctx->dime.id || !ctx->dime.type)
+    ctx->dime.type = soap_string_dup(ctx, type != nullptr ? type : "");
+    if (ctx->dime.id == nullptr || ctx->dime.type == nullptr)
         return ctx->error;
     ctx->dime.options = nullptr;
-    ctx->dime.flags = ctx->dime.first ? DIME_FIRST : DIME_ONLY;
+    ctx->dime.flags = ctx->dime.first != nullptr ? DIME_FIRST : DIME_ONLY;
     const std::size_t id_length = std::strlen(ctx->dime.id);
     const std::size_t type_length = std::strlen(ctx->dime.type);
     ctx->message_count +=

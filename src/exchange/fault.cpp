@@ -1,6 +1,6 @@
 // fault.cpp - faults made from error codes, and their printed forms.
 //
-// Elsewhere: the fault record (soap_envelope.h), the texts of codes (error.cpp).
+// Elsewhere: the fault record (soap_envelope.h), the texts of codes (error_text.cpp).
 // Always: a fault is made only when somebody asks for it.
 #include <cstdio>
 #include <cstring>

@@ -36,7 +36,7 @@ int error_of_fault(soap *ctx)
 {
     const char *code = *soap_fault_code_field(ctx);
     for (const code_row &row : CODES) {
-        if (code && is_code(ctx, code, row.code))
+        if (code != nullptr && is_code(ctx, code, row.code))
             return row.error;
     }
     return SOAP_FAULT;

@@ -332,14 +332,14 @@ int soap_pointer_is_multi(soap *ctx, const soap_pointer_record *record)
     if (record == nullptr)
         return 0;
     const std::int8_t mark = phase_mark(ctx, record);
-    return encoded_1_1(ctx) ? mark != MARK_ONCE : mark == MARK_WRITTEN;
+    return static_cast<int>(encoded_1_1(ctx) ? mark != MARK_ONCE : mark == MARK_WRITTEN);
 }
 
 int soap_pointer_is_single(soap *ctx, const soap_pointer_record *record)
 {
     if (ctx->message_part == PART_HEADER)
         return 1;
-    return record != nullptr && phase_mark(ctx, record) == MARK_ONCE;
+    return static_cast<int>(record != nullptr && phase_mark(ctx, record) == MARK_ONCE);
 }
 
 void soap_pointer_set_written(soap *ctx, soap_pointer_record *record)

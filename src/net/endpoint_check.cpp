@@ -25,7 +25,7 @@ bool is_control(char c)
     return static_cast<unsigned char>(c) <= ' ' || c == '\x7F';
 }
 
-// As the transport tells schemes: the case counts for some.
+// As net recognises schemes: the case counts for some.
 bool is_known_scheme(std::string_view item)
 {
     const std::string_view scheme = item.substr(0, item.find(':') + 1);

@@ -219,7 +219,7 @@ int write_request_line(soap *ctx, const char *endpoint, const char *host, int po
         text.put(endpoint);
     } else {
         text.put("/");
-        text.put(path == nullptr ? "" : path + (*path == '/'));
+        text.put(path == nullptr ? "" : path + static_cast<int>(*path == '/'));
     }
     text.put(" HTTP/");
     text.put(ctx->http_version);

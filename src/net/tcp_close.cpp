@@ -95,7 +95,7 @@ int tcp_disconnect(soap *ctx)
     const int tls_result = tls_close(ctx);
     if ((tcp_is_udp(ctx) || context_shares_socket(ctx)) && soap_socket_open(ctx))
         return tls_result;
-    if (tls_result == 0 && soap_socket_open(ctx) && ctx->on_shutdown_socket)
+    if (tls_result == 0 && soap_socket_open(ctx) && ctx->on_shutdown_socket != nullptr)
         ctx->on_shutdown_socket(ctx, ctx->socket, SHUT_RDWR);
     tcp_drop_socket(ctx);
     return tls_result;
@@ -126,12 +126,12 @@ int tcp_release(soap *ctx)
     const int error = ctx->error;
     if (error != 0)
         forget_attachments(ctx);
-    if (ctx->on_disconnect)
+    if (ctx->on_disconnect != nullptr)
         if (const int refused = ctx->on_disconnect(ctx))
             return ctx->error = refused;
     int closed = 0;
     if (must_close(ctx)) {
-        closed = ctx->on_close ? ctx->on_close(ctx) : 0;
+        closed = ctx->on_close != nullptr ? ctx->on_close(ctx) : 0;
         ctx->keep_alive = 0;
         ctx->response_unfinished = false;
         ctx->route.known = false;

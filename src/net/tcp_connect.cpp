@@ -23,10 +23,10 @@ constexpr int ADDRESS_IN_USE_TRIES = 16; // new sockets for one address after EA
 // The name to resolve: a proxy may be given as an IPv6 address in brackets, which are cut off into `space`.
 const char *target_host(const soap *ctx, const char *host, char (&space)[SOAP_TEXT_SIZE])
 {
-    if (!ctx->proxy_host)
+    if (ctx->proxy_host == nullptr)
         return host;
     const char *end = ctx->proxy_host[0] == '[' ? std::strchr(ctx->proxy_host, ']') : nullptr;
-    if (!end || end - ctx->proxy_host > static_cast<std::ptrdiff_t>(SOAP_TEXT_SIZE))
+    if (end == nullptr || end - ctx->proxy_host > static_cast<std::ptrdiff_t>(SOAP_TEXT_SIZE))
         return ctx->proxy_host;
     const auto length = static_cast<std::size_t>(end - ctx->proxy_host - 1);
     std::memcpy(space, ctx->proxy_host + 1, length);
@@ -37,7 +37,8 @@ const char *target_host(const soap *ctx, const char *host, char (&space)[SOAP_TE
 tcp_address_list resolve_target(soap *ctx, const char *host, int port)
 {
     char space[SOAP_TEXT_SIZE];
-    return tcp_resolve(ctx, target_host(ctx, host, space), ctx->proxy_host ? ctx->proxy_port : port, 0,
+    return tcp_resolve(ctx, target_host(ctx, host, space),
+                       ctx->proxy_host != nullptr ? ctx->proxy_port : port, 0,
                        "getaddrinfo failed in tcp_connect()");
 }
 
@@ -75,7 +76,7 @@ const char *set_multicast_options(const soap *ctx, int socket, addrinfo *address
     return tcp_set_options(
         socket, {{ctx->ipv4_multicast_ttl != 0, IPPROTO_IP, IP_MULTICAST_TTL, &ctx->ipv4_multicast_ttl,
                   sizeof ctx->ipv4_multicast_ttl, "setsockopt IP_MULTICAST_TTL failed in tcp_connect()"},
-                 {ctx->ipv4_multicast_interface && ctx->ipv6_multicast_scope == 0, IPPROTO_IP,
+                 {(ctx->ipv4_multicast_interface != nullptr) && ctx->ipv6_multicast_scope == 0, IPPROTO_IP,
                   IP_MULTICAST_IF, ctx->ipv4_multicast_interface, sizeof(in_addr),
                   "setsockopt IP_MULTICAST_IF failed in tcp_connect()"}});
 }
@@ -101,9 +102,9 @@ int open_socket(soap *ctx, addrinfo *address, bool *made)
     if (tcp_refuse_large(ctx, fresh))
         return -1;
     const char *failure = set_stream_options(ctx, fresh);
-    if (!failure && tcp_is_udp(ctx))
+    if (failure == nullptr && tcp_is_udp(ctx))
         failure = set_multicast_options(ctx, fresh, address);
-    if (!failure)
+    if (failure == nullptr)
         return fresh;
     tcp_save_errno(ctx);
     return tcp_fail(ctx, fresh, failure);
@@ -164,7 +165,7 @@ int connect_to_list(soap *ctx, addrinfo *address)
             tcp_close_through_hook(ctx, socket);
             continue;
         }
-        if (!address->ai_next || is_final(ctx, outcome))
+        if (address->ai_next == nullptr || is_final(ctx, outcome))
             return tcp_fail(ctx, socket,
                             made ? "connect failed in tcp_connect()" : "socket failed in tcp_connect()",
                             outcome == attempt::out_of_time ? tcp_timeout_text(ctx) : nullptr);
@@ -185,7 +186,7 @@ bool asks_one_host(const soap *ctx, const addrinfo *address)
 
 int open_datagram_socket(soap *ctx, addrinfo *address)
 {
-    for (; address; address = address->ai_next) {
+    for (; address != nullptr; address = address->ai_next) {
         bool made;
         const int socket = open_socket(ctx, address, &made);
         if (made && socket < 0)
@@ -232,9 +233,9 @@ int tcp_connect(soap *ctx, const char *endpoint, const char *host, int port)
     ctx->peer_length = 0;
     ctx->input_mode &= ~MODE_TLS;
     ctx->output_mode &= ~MODE_TLS;
-    if (!endpoint || soap_tag_match(endpoint, "https:*") != 0) {
+    if (endpoint == nullptr || soap_tag_match(endpoint, "https:*") != 0) {
         tls_discard(ctx);
-    } else if ((ctx->proxy_host && open_tunnel(ctx, endpoint, host, port) != 0) ||
+    } else if ((ctx->proxy_host != nullptr && open_tunnel(ctx, endpoint, host, port) != 0) ||
                tls_connect(ctx, host, port) != 0) {
         tcp_drop_socket(ctx);
         return -1;

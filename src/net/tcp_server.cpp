@@ -124,8 +124,9 @@ int accept_client(soap *ctx)
         if (await_client(ctx, deadline) != 0)
             return -1;
         int length = sizeof ctx->peer;
-        errno = ctx->on_accept ? 0 : ENOSYS;
-        const int client = ctx->on_accept ? ctx->on_accept(ctx, ctx->master_socket, ctx->peer, &length) : -1;
+        errno = ctx->on_accept != nullptr ? 0 : ENOSYS;
+        const int client =
+            ctx->on_accept != nullptr ? ctx->on_accept(ctx, ctx->master_socket, ctx->peer, &length) : -1;
         if (client >= 0) {
             ctx->peer_length = static_cast<std::size_t>(length) < sizeof ctx->peer
                                    ? static_cast<std::size_t>(length)
@@ -159,7 +160,7 @@ int soap_bind(soap *ctx, const char *host, int port, int backlog)
             return -1;
         failure = prepare_listener(ctx, master, address, backlog);
     }
-    if (failure) {
+    if (failure != nullptr) {
         tcp_save_errno(ctx);
         return tcp_fail(ctx, master, failure);
     }

@@ -75,7 +75,7 @@ void tcp_drop_socket(soap *ctx)
 
 void tcp_close_through_hook(soap *ctx, int socket)
 {
-    if (socket != -1 && ctx->on_close_socket)
+    if (socket != -1 && ctx->on_close_socket != nullptr)
         ctx->on_close_socket(ctx, socket);
 }
 
@@ -100,7 +100,7 @@ void tcp_save_errno(soap *ctx)
 int tcp_fail(soap *ctx, int socket, const char *detail, const char *text)
 {
     tcp_close_through_hook(ctx, socket);
-    fail_as_sender(ctx, text ? text : tcp_error_text(ctx), detail, SOAP_TCP_ERROR);
+    fail_as_sender(ctx, text != nullptr ? text : tcp_error_text(ctx), detail, SOAP_TCP_ERROR);
     return -1;
 }
 

@@ -1,7 +1,7 @@
 // tcp_transfer.cpp - bytes out and in: socket, TLS, datagrams, and the streams and descriptors in place of a
 // socket.
 //
-// Elsewhere: the single TLS transfer (tls_transfer.cpp), buffering (the engine).
+// Elsewhere: the single TLS transfer (tls_transfer.cpp), buffering (core).
 //
 // Always: without time limits one transfer is one system call. A wait is made before it only under a time
 // limit, or after the system said that it isn't ready; under a limit no transfer blocks, whatever the
@@ -149,7 +149,7 @@ ssize_t send_once(soap *ctx, const char *data, std::size_t length, bool limited,
         return tls_write(ctx, data, length, limited, wait_for);
     *wait_for = WAIT_SEND;
     errno = 0;
-    if (ctx->tls_bio)
+    if (ctx->tls_bio != nullptr)
         return BIO_write(ctx->tls_bio, data, length < INT_MAX ? static_cast<int>(length) : INT_MAX);
     if (tcp_is_udp(ctx))
         return send_datagram_with_retries(ctx, data, length, limited);
@@ -226,7 +226,7 @@ ssize_t recv_once(soap *ctx, char *buffer, std::size_t length, bool limited, int
         tcp_save_errno(ctx);
         return 0;
     }
-    if (ctx->tls_bio) {
+    if (ctx->tls_bio != nullptr) {
         const int received =
             BIO_read(ctx->tls_bio, buffer, length < INT_MAX ? static_cast<int>(length) : INT_MAX);
         return received > 0 ? received : 0;
@@ -313,7 +313,7 @@ int tcp_send(soap *ctx, const char *data, std::size_t length)
         ctx->errno_value = 0;
         return -1;
     }
-    if (ctx->output_stream)
+    if (ctx->output_stream != nullptr)
         return send_to_stream(ctx, data, length);
     if (ctx->socket == -1)
         return send_to_descriptor(ctx, data, length);
@@ -328,7 +328,7 @@ std::size_t tcp_recv(soap *ctx, char *buffer, std::size_t length)
     ctx->errno_value = 0;
     if (tcp_call_is_over(ctx))
         return 0;
-    if (ctx->input_stream)
+    if (ctx->input_stream != nullptr)
         return recv_from_stream(ctx, buffer, length);
     if (ctx->socket == -1)
         return recv_from_descriptor(ctx, buffer, length);

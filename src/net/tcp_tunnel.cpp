@@ -86,7 +86,7 @@ int send_connect(soap *ctx, const char *endpoint, const char *host, int port)
         return error;
     ctx->status = STATUS_CONNECT;
     ctx->keep_alive = 1;
-    if (ctx->on_post)
+    if (ctx->on_post != nullptr)
         if (const int error = ctx->on_post(ctx, endpoint, host, port, nullptr, nullptr, 0))
             return error;
     return output_close(ctx);
@@ -126,7 +126,7 @@ struct answer {
 const char *body_in_fault(soap *ctx, const answer &got)
 {
     const fault_texts fault = ctx->upcalls->read_fault(ctx);
-    return fault.text && std::strcmp(fault.text, got.line) == 0 ? fault.detail : nullptr;
+    return fault.text != nullptr && std::strcmp(fault.text, got.line) == 0 ? fault.detail : nullptr;
 }
 
 void read_answer(soap *ctx, answer &got)
@@ -136,7 +136,7 @@ void read_answer(soap *ctx, answer &got)
     forget_input(ctx);
     ctx->message_text[0] = '\0';
     ctx->status = STATUS_OK; // of a host that reads no heads
-    got.result = ctx->on_read_head ? ctx->on_read_head(ctx) : 0;
+    got.result = ctx->on_read_head != nullptr ? ctx->on_read_head(ctx) : 0;
     got.status = ctx->status;
     got.has_body = ctx->content_length != 0 || (ctx->input_mode & MODE_IO_MASK) == MODE_CHUNKED;
     got.body = nullptr;
@@ -154,9 +154,9 @@ int refuse(soap *ctx, const char *host, int port, const answer &got)
     char text[3 * SOAP_TEXT_SIZE];
     std::snprintf(text, sizeof text, "The HTTP proxy refused CONNECT %.1023s:%d: %s", host, port, got.line);
     const char *const own = soap_string_dup(ctx, text);
-    if (!own)
+    if (own == nullptr)
         return ctx->error;
-    const bool told = got.body && got.body[0] != '\0';
+    const bool told = got.body != nullptr && got.body[0] != '\0';
     return fail_as_sender(ctx, own, told ? got.body : "CONNECT failed in tcp_connect()", got.error());
 }
 

@@ -89,7 +89,7 @@ long bio_control(BIO *bio, int command, long number, void *out)
         state_of(bio)->nonblocking = number != 0;
         return 1;
     case BIO_C_GET_FD:
-        if (out)
+        if (out != nullptr)
             *static_cast<int *>(out) = state_of(bio)->ctx->socket;
         return state_of(bio)->ctx->socket;
     default:
@@ -102,7 +102,7 @@ int bio_create(BIO *bio)
     auto *state = static_cast<bio_state *>(OPENSSL_zalloc(sizeof(bio_state)));
     BIO_set_data(bio, state);
     BIO_set_init(bio, 1);
-    return state != nullptr;
+    return static_cast<int>(state != nullptr);
 }
 
 int bio_destroy(BIO *bio)
@@ -116,7 +116,7 @@ BIO_METHOD *make_method()
 {
     BIO_METHOD *method =
         BIO_meth_new(BIO_get_new_index() | BIO_TYPE_SOURCE_SINK | BIO_TYPE_DESCRIPTOR, "soap socket");
-    if (!method)
+    if (method == nullptr)
         return nullptr;
     BIO_meth_set_write(method, bio_write);
     BIO_meth_set_read(method, bio_read);
@@ -132,13 +132,13 @@ BIO *tls_bio_new(soap *ctx)
 {
     // Never freed: a context that the host destroys at the very end of the process still closes through it.
     static const BIO_METHOD *const method = make_method();
-    BIO *bio = method ? BIO_new(method) : nullptr;
-    if (bio)
+    BIO *bio = method != nullptr ? BIO_new(method) : nullptr;
+    if (bio != nullptr)
         state_of(bio)->ctx = ctx;
     return bio;
 }
 
 void tls_bio_set_nonblocking(BIO *bio, bool nonblocking)
 {
-    BIO_ctrl(bio, BIO_C_SET_NBIO, nonblocking, nullptr);
+    BIO_ctrl(bio, BIO_C_SET_NBIO, static_cast<long>(nonblocking), nullptr);
 }

@@ -52,16 +52,17 @@ bool has_flag(const soap *ctx, std::uint16_t flag)
 
 const char *load_randomness(const soap *ctx)
 {
-    return ctx->tls_random_file && RAND_load_file(ctx->tls_random_file, -1) <= 0 ? "Can't load randomness"
-                                                                                 : nullptr;
+    return ctx->tls_random_file != nullptr && RAND_load_file(ctx->tls_random_file, -1) <= 0
+               ? "Can't load randomness"
+               : nullptr;
 }
 
 const char *load_trust(const soap *ctx, SSL_CTX *context)
 {
-    if (ctx->tls_ca_file || ctx->tls_ca_path) {
+    if (ctx->tls_ca_file != nullptr || ctx->tls_ca_path != nullptr) {
         if (SSL_CTX_load_verify_locations(context, ctx->tls_ca_file, ctx->tls_ca_path) == 0)
             return "Can't read CA file";
-        if (ctx->tls_ca_file && has_flag(ctx, TLS_REQUIRE_CLIENT_CERT))
+        if (ctx->tls_ca_file != nullptr && has_flag(ctx, TLS_REQUIRE_CLIENT_CERT))
             SSL_CTX_set_client_CA_list(context, SSL_load_client_CA_file(ctx->tls_ca_file));
     }
     if (!has_flag(ctx, TLS_NO_DEFAULT_CA) && SSL_CTX_set_default_verify_paths(context) == 0)
@@ -71,11 +72,11 @@ const char *load_trust(const soap *ctx, SSL_CTX *context)
 
 const char *load_revocations(const soap *ctx, SSL_CTX *context)
 {
-    if (!ctx->tls_crl)
+    if (ctx->tls_crl == nullptr)
         return nullptr;
     X509_STORE *store = SSL_CTX_get_cert_store(context);
     X509_LOOKUP *lookup = X509_STORE_add_lookup(store, X509_LOOKUP_file());
-    if (!lookup || X509_load_crl_file(lookup, ctx->tls_crl, X509_FILETYPE_PEM) <= 0 ||
+    if (lookup == nullptr || X509_load_crl_file(lookup, ctx->tls_crl, X509_FILETYPE_PEM) <= 0 ||
         X509_STORE_set_flags(store, X509_V_FLAG_CRL_CHECK) == 0)
         return "Can't read CRL file";
     return nullptr;
@@ -83,7 +84,7 @@ const char *load_revocations(const soap *ctx, SSL_CTX *context)
 
 const char *load_key(const soap *ctx, SSL_CTX *context)
 {
-    if (!ctx->tls_key_file)
+    if (ctx->tls_key_file == nullptr)
         return nullptr;
     if (SSL_CTX_use_certificate_chain_file(context, ctx->tls_key_file) == 0)
         return "Can't read certificate key file";
@@ -152,7 +153,7 @@ const char *set_key_exchange(const soap *ctx, SSL_CTX *context)
     if (has_flag(ctx,
                  TLS_RSA_EPHEMERAL)) // RSA keys for one connection are gone from TLS: OpenSSL picks DH groups
         return SSL_CTX_set_dh_auto(context, 1) == 1 ? nullptr : "Can't set RSA key";
-    return ctx->tls_dh_file ? set_dh_parameters(ctx, context) : nullptr;
+    return ctx->tls_dh_file != nullptr ? set_dh_parameters(ctx, context) : nullptr;
 }
 
 void set_protocol_options(const soap *ctx, SSL_CTX *context)
@@ -232,7 +233,7 @@ int set_up_by_flags(soap *ctx, unsigned flags)
     forget_former_rules(ctx);
     ctx->tls_flags = static_cast<std::uint16_t>(flags);
     ctx->tls_verify = has_flag(ctx, TLS_ALLOW_EXPIRED) ? tls_verify_ignore_expiry : tls_verify_plain;
-    return ctx->tls_setup ? ctx->tls_setup(ctx) : 0;
+    return ctx->tls_setup != nullptr ? ctx->tls_setup(ctx) : 0;
 }
 
 } // namespace
@@ -249,11 +250,11 @@ int soap_ssl_server_context(soap *ctx, std::uint16_t flags, const char *key_file
                             const char *random_file, const char *session_id)
 {
     store_files(ctx, key_file, password, ca_file, ca_path, dh_file, random_file);
-    if (const int error = set_up_by_flags(ctx, flags | (dh_file ? 0u : TLS_RSA_EPHEMERAL)))
+    if (const int error = set_up_by_flags(ctx, flags | (dh_file != nullptr ? 0u : TLS_RSA_EPHEMERAL)))
         return error;
-    if (!ctx->tls_context) // the host's own set-up keeps it elsewhere
+    if (ctx->tls_context == nullptr) // the host's own set-up keeps it elsewhere
         return 0;
-    if (!session_id) {
+    if (session_id == nullptr) {
         SSL_CTX_set_session_cache_mode(ctx->tls_context, SSL_SESS_CACHE_OFF);
         SSL_CTX_set_num_tickets(ctx->tls_context, 0); // nothing could redeem them
         return 0;
@@ -281,7 +282,7 @@ int tls_context_setup(soap *ctx)
 
 int tls_password_callback(char *buffer, int size, int, void *password)
 {
-    const std::size_t length = password ? std::strlen(static_cast<const char *>(password)) : 0;
+    const std::size_t length = password != nullptr ? std::strlen(static_cast<const char *>(password)) : 0;
     if (length == 0 || size <= 0 || length >= static_cast<std::size_t>(size))
         return 0;
     std::memcpy(buffer, password, length + 1);

@@ -78,15 +78,15 @@ int renew_connection(soap *ctx)
         SSL_set_session(ctx->tls_connection, nullptr) == 1)
         return 0;
     SSL_free(ctx->tls_connection);
-    ctx->tls_connection = ctx->tls_context ? SSL_new(ctx->tls_context) : nullptr;
-    return ctx->tls_connection ? 0 : -1;
+    ctx->tls_connection = ctx->tls_context != nullptr ? SSL_new(ctx->tls_context) : nullptr;
+    return ctx->tls_connection != nullptr ? 0 : -1;
 }
 
 // Puts TLS on ctx->socket. 0, or -1 if memory runs out.
 int attach(soap *ctx)
 {
     BIO *bio = tls_bio_new(ctx);
-    if (!bio)
+    if (bio == nullptr)
         return -1;
     SSL_set_bio(ctx->tls_connection, bio, bio);
     SSL_set_read_ahead(ctx->tls_connection, 1); // a record's head and body by one system call
@@ -102,7 +102,7 @@ void mark_tls(soap *ctx)
 
 int ensure_context(soap *ctx)
 {
-    return ctx->tls_context || !ctx->tls_setup ? 0 : ctx->tls_setup(ctx);
+    return ctx->tls_context != nullptr || ctx->tls_setup == nullptr ? 0 : ctx->tls_setup(ctx);
 }
 
 // Servers of many names choose their certificate by it. Addresses are no names.
@@ -145,7 +145,7 @@ int check_client(soap *ctx)
     if (verdict != X509_V_OK)
         return fail_accept(ctx, "SSL certificate presented by peer cannot be verified in soap_ssl_accept()",
                            X509_verify_cert_error_string(verdict));
-    if (!SSL_get0_peer_certificate(ctx->tls_connection))
+    if (SSL_get0_peer_certificate(ctx->tls_connection) == nullptr)
         return fail_accept(ctx, "No SSL certificate was presented by the peer in soap_ssl_accept()",
                            "SSL/TLS error");
     return 0;

@@ -27,7 +27,7 @@ void keep_session(soap *ctx)
     if (SSL_is_server(ctx->tls_connection) || ctx->session_host[0] == '\0')
         return;
     SSL_SESSION *session = SSL_get1_session(ctx->tls_connection);
-    if (!session || !SSL_SESSION_is_resumable(session)) {
+    if (session == nullptr || !SSL_SESSION_is_resumable(session)) {
         SSL_SESSION_free(session);
         return;
     }
@@ -54,7 +54,7 @@ int look_for_peer_alert(SSL *ssl)
 // Tells the peer by the socket's end that nothing more comes, and waits for it to end as well.
 void half_close(soap *ctx)
 {
-    if (!ctx->on_shutdown_socket || ctx->on_shutdown_socket(ctx, ctx->socket, SHUT_WR) != 0)
+    if (ctx->on_shutdown_socket == nullptr || ctx->on_shutdown_socket(ctx, ctx->socket, SHUT_WR) != 0)
         return;
     const tcp_deadline deadline = tcp_deadline_of(ctx, CLOSE_WAIT_S);
     if (tcp_wait_until(ctx, ctx->socket, WAIT_RECV | WAIT_ERROR, deadline) < 0) {
@@ -75,7 +75,7 @@ void tls_session_drop(soap *ctx)
 
 void tls_session_offer(soap *ctx, const char *host, int port)
 {
-    if (ctx->tls_session && ctx->session_rules == ctx->tls_context && ctx->session_port == port &&
+    if (ctx->tls_session != nullptr && ctx->session_rules == ctx->tls_context && ctx->session_port == port &&
         std::strcmp(ctx->session_host, host) == 0)
         SSL_set_session(ctx->tls_connection, ctx->tls_session);
     tls_session_drop(ctx);

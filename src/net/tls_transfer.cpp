@@ -78,17 +78,17 @@ private:
 
 bool tls_active(const soap *ctx)
 {
-    return ctx->tls_connection && SSL_get_rbio(ctx->tls_connection);
+    return ctx->tls_connection != nullptr && SSL_get_rbio(ctx->tls_connection) != nullptr;
 }
 
 bool tls_established(const soap *ctx)
 {
-    return tls_active(ctx) && SSL_is_init_finished(ctx->tls_connection);
+    return tls_active(ctx) && (SSL_is_init_finished(ctx->tls_connection) != 0);
 }
 
 bool tls_has_own_rules(const soap *ctx)
 {
-    return ctx->tls_connection && SSL_get_SSL_CTX(ctx->tls_connection) == ctx->tls_context;
+    return ctx->tls_connection != nullptr && SSL_get_SSL_CTX(ctx->tls_connection) == ctx->tls_context;
 }
 
 int tls_write(soap *ctx, const char *data, std::size_t length, bool limited, int *wait_for)

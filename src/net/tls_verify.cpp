@@ -151,7 +151,7 @@ bool pattern_names(const char *host, const char *pattern)
     if (pattern[0] != '*')
         return soap_tag_match(host, pattern) == 0;
     const char *domain = std::strchr(host, '.');
-    return domain && soap_tag_match(domain, pattern + 1) == 0;
+    return domain != nullptr && soap_tag_match(domain, pattern + 1) == 0;
 }
 
 // The comparison works on terminated texts: a name that continues after a NUL is not the name it shows.
@@ -206,7 +206,7 @@ public:
     void add(std::string_view part)
     {
         for (const char c : part) {
-            const bool harmless = c >= ' ' && c <= '~' && !std::strchr("<>&", c);
+            const bool harmless = c >= ' ' && c <= '~' && (std::strchr("<>&", c) == nullptr);
             if (length_ + 1 < sizeof text_)
                 text_[length_++] = harmless ? c : '?';
         }
@@ -260,7 +260,8 @@ int fail_host(soap *ctx, const X509 *certificate, const char *host)
         reason.add("no host");
     const char *detail = soap_string_dup(ctx, reason.text());
     return fail_as_sender(ctx, "SSL/TLS error",
-                          detail ? detail : "SSL/TLS certificate host name mismatch in tcp_connect()",
+                          detail != nullptr ? detail
+                                            : "SSL/TLS certificate host name mismatch in tcp_connect()",
                           SOAP_TLS_ERROR);
 }
 
@@ -277,7 +278,7 @@ void note_verdict(tls_verdict *verdict, X509_STORE_CTX *store)
     verdict->depth = X509_STORE_CTX_get_error_depth(store);
     verdict->subject[0] = '\0';
     const X509 *certificate = X509_STORE_CTX_get_current_cert(store);
-    const std::unique_ptr<BIO, bio_delete> text(certificate ? BIO_new(BIO_s_mem()) : nullptr);
+    const std::unique_ptr<BIO, bio_delete> text(certificate != nullptr ? BIO_new(BIO_s_mem()) : nullptr);
     if (!text)
         return;
     X509_NAME_print_ex(text.get(), X509_get_subject_name(certificate), 0, XN_FLAG_RFC2253);
@@ -291,10 +292,10 @@ int listen_to_verdict(int result, X509_STORE_CTX *store)
     auto *const ssl =
         static_cast<SSL *>(X509_STORE_CTX_get_ex_data(store, SSL_get_ex_data_X509_STORE_CTX_idx()));
     const SSL_verify_cb decide = SSL_CTX_get_verify_callback(SSL_get_SSL_CTX(ssl));
-    if (decide)
+    if (decide != nullptr)
         result = decide(result, store);
     auto *const verdict = static_cast<tls_verdict *>(SSL_get_ex_data(ssl, verdict_index()));
-    if (result == 0 && verdict && SSL_get_verify_mode(ssl) != SSL_VERIFY_NONE)
+    if (result == 0 && verdict != nullptr && SSL_get_verify_mode(ssl) != SSL_VERIFY_NONE)
         note_verdict(verdict, store);
     return result;
 }
@@ -321,7 +322,7 @@ const char *tls_with_reason(soap *ctx, const char *text, const tls_verdict &verd
             reason.add(part);
     }
     const char *detail = soap_string_dup(ctx, reason.text());
-    return detail ? detail : text;
+    return detail != nullptr ? detail : text;
 }
 
 std::size_t tls_address_of(const char *host, unsigned char (&address)[16])
@@ -373,7 +374,7 @@ int tls_verify_ignore_expiry(int result, x509_store_ctx_st *store)
 
 bool IsIPAddr(const char *host)
 {
-    if (!host)
+    if (host == nullptr)
         return false;
     for (; *host; ++host)
         if ((*host >= 'A' && *host <= 'Z') || (*host >= 'a' && *host <= 'z'))

@@ -201,10 +201,10 @@ bool is_literal(const soap *ctx)
 // URI of the table's row for a prefix; empty if there is none.
 const char *uri_of_prefix(const soap *ctx, std::string_view prefix)
 {
-    for (const soap_namespace *row = ctx->local_namespaces; row->prefix; ++row) {
+    for (const soap_namespace *row = ctx->local_namespaces; row->prefix != nullptr; ++row) {
         if (prefix == row->prefix) {
             const char *uri = xml_row_uri(*row);
-            return uri ? uri : "";
+            return uri != nullptr ? uri : "";
         }
     }
     return "";
@@ -212,15 +212,15 @@ const char *uri_of_prefix(const soap *ctx, std::string_view prefix)
 
 bool has_own_tag(const char *tag)
 {
-    return tag && *tag != '-';
+    return tag != nullptr && *tag != '-';
 }
 
 // Tag under which literal content stands: with its namespace as the default one, the name goes without a
 // prefix.
 const char *literal_name(const soap *ctx, const char *tag)
 {
-    const char *colon = ctx->local_namespaces ? std::strchr(tag, ':') : nullptr;
-    return colon ? colon + 1 : tag;
+    const char *colon = ctx->local_namespaces != nullptr ? std::strchr(tag, ':') : nullptr;
+    return colon != nullptr ? colon + 1 : tag;
 }
 
 int open_literal(soap *ctx, const char *tag)
@@ -272,7 +272,7 @@ private:
 int put_soap12_array(soap *ctx, const char *array_type)
 {
     const char *bracket = std::strrchr(array_type, '[');
-    const auto length = bracket ? static_cast<std::size_t>(bracket - array_type) : SOAP_TEXT_SIZE;
+    const auto length = bracket != nullptr ? static_cast<std::size_t>(bracket - array_type) : SOAP_TEXT_SIZE;
     if (length >= SOAP_TEXT_SIZE)
         return 0;
     char item_type[SOAP_TEXT_SIZE];
@@ -284,7 +284,7 @@ int put_soap12_array(soap *ctx, const char *array_type)
 
 int put_soap11_array(soap *ctx, const char *array_type, const char *offset)
 {
-    if (offset && soap_attr_write(ctx, "SOAP-ENC:offset", offset))
+    if (offset != nullptr && soap_attr_write(ctx, "SOAP-ENC:offset", offset))
         return ctx->error;
     return soap_attr_write(ctx, "SOAP-ENC:arrayType", array_type);
 }
@@ -310,7 +310,7 @@ const char *soap_array_type_text(soap *ctx, const char *type, const int *sizes, 
     text.put(type);
     for (int i = 0; i < dimensions; ++i) {
         text.put(i == 0 ? "[" : is_soap12 ? " " : ",");
-        text.put(std::int64_t{sizes[i]} + (offsets && !is_soap12 ? offsets[i] : 0));
+        text.put(std::int64_t{sizes[i]} + (offsets != nullptr && !is_soap12 ? offsets[i] : 0));
     }
     if (!is_soap12)
         text.put("]");
@@ -319,7 +319,7 @@ const char *soap_array_type_text(soap *ctx, const char *type, const int *sizes, 
 
 int soap_array_open(soap *ctx, const char *tag, int id, const char *array_type, const char *offset)
 {
-    if (!array_type || *array_type == '\0')
+    if (array_type == nullptr || *array_type == '\0')
         return soap_element_out_begin(ctx, tag, id, nullptr);
     if (soap_element_open(ctx, tag, id, "SOAP-ENC:Array"))
         return ctx->error;
@@ -347,7 +347,7 @@ int soap_result_out(soap *ctx, const char *name)
 
 int soap_literal_write(soap *ctx, const char *tag, char *const *text, const char *)
 {
-    if (!text || !*text)
+    if (text == nullptr || *text == nullptr)
         return 0;
     if (open_literal(ctx, tag) || xml_put_literal(ctx, *text))
         return ctx->error;
@@ -356,7 +356,7 @@ int soap_literal_write(soap *ctx, const char *tag, char *const *text, const char
 
 int soap_wide_literal_write(soap *ctx, const char *tag, char32_t *const *text, const char *)
 {
-    if (!text || !*text)
+    if (text == nullptr || *text == nullptr)
         return 0;
     if (open_literal(ctx, tag) || xml_put_wide(ctx, *text))
         return ctx->error;
@@ -381,7 +381,7 @@ static bool begins_string(soap *ctx, const char *tag, int id, const Char *text, 
 int soap_string_element_out(soap *ctx, const char *tag, int id, char *const *text, const char *type,
                             int type_id)
 {
-    const char *value = text ? *text : nullptr;
+    const char *value = text != nullptr ? *text : nullptr;
     if (!begins_string(ctx, tag, id, value, type, type_id) || soap_text_write(ctx, value, 0))
         return ctx->error;
     return soap_element_out_end(ctx, tag);
@@ -390,7 +390,7 @@ int soap_string_element_out(soap *ctx, const char *tag, int id, char *const *tex
 int soap_wide_string_element_out(soap *ctx, const char *tag, int id, char32_t *const *text, const char *type,
                                  int type_id)
 {
-    const char32_t *value = text ? *text : nullptr;
+    const char32_t *value = text != nullptr ? *text : nullptr;
     if (!begins_string(ctx, tag, id, value, type, type_id) || soap_wide_text_write(ctx, value, 0))
         return ctx->error;
     return soap_element_out_end(ctx, tag);

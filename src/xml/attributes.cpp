@@ -66,8 +66,8 @@ soap_attribute *&chain_of(soap_namespace_scope *scope, std::uint32_t hash)
 
 soap_attribute *find(soap_attribute *chain, std::uint32_t hash, std::string_view name)
 {
-    while (chain && (chain->hash != hash || chain->name_length != name.size() ||
-                     !same_name(chain->name, name.data(), name.size())))
+    while (chain != nullptr && (chain->hash != hash || chain->name_length != name.size() ||
+                                !same_name(chain->name, name.data(), name.size())))
         chain = chain->chain;
     return chain;
 }
@@ -83,7 +83,7 @@ void announce_wsu_id(soap *ctx, const char *value)
 
 soap_attribute *take_spare(soap_namespace_scope *scope, std::size_t name_size)
 {
-    if (!scope->spare_attributes || name_size > USUAL_NAME)
+    if (scope->spare_attributes == nullptr || name_size > USUAL_NAME)
         return nullptr;
     soap_attribute *record = scope->spare_attributes;
     scope->spare_attributes = record->next;
@@ -98,7 +98,7 @@ soap_attribute *allocate(soap *ctx, std::size_t name_size)
         return nullptr;
     auto *record =
         static_cast<soap_attribute *>(SOAP_MALLOC(ctx, offsetof(soap_attribute, name) + name_size));
-    if (record) {
+    if (record != nullptr) {
         record->name_size = static_cast<std::uint32_t>(name_size);
         record->value = nullptr;
         record->size = 0;
@@ -124,7 +124,7 @@ soap_attribute *take_idle(soap_namespace_scope *scope)
 {
     for (;; scope->attribute_reuse = (scope->attribute_reuse + 1) % ATTRIBUTE_CHAINS) {
         soap_attribute **link = &scope->attribute_chains[scope->attribute_reuse];
-        while (*link && (*link)->visible != 0)
+        while (*link != nullptr && (*link)->visible != 0)
             link = &(*link)->chain;
         if (soap_attribute *record = *link) {
             *link = record->chain;
@@ -145,7 +145,7 @@ soap_attribute *make_record(soap *ctx, soap_namespace_scope *scope, std::size_t 
         xml_attribute_free(ctx, idle);
     }
     soap_attribute *spare = take_spare(scope, name_size);
-    return spare ? spare : allocate(ctx, name_size);
+    return spare != nullptr ? spare : allocate(ctx, name_size);
 }
 
 } // namespace
@@ -153,13 +153,13 @@ soap_attribute *make_record(soap *ctx, soap_namespace_scope *scope, std::size_t 
 soap_attribute *xml_attribute_record(soap *ctx, std::string_view name)
 {
     soap_namespace_scope *scope = namespace_scope_of(ctx);
-    if (!scope)
+    if (scope == nullptr)
         return nullptr;
     const std::uint32_t hash = hash_of(scope, name);
     if (soap_attribute *known = find(chain_of(scope, hash), hash, name))
         return known;
     soap_attribute *record = make_record(ctx, scope, name.size() + 1);
-    if (!record)
+    if (record == nullptr)
         return fail_null(ctx, SOAP_OUT_OF_MEMORY);
     record->escape = 0;
     record->uri = nullptr;
@@ -183,11 +183,11 @@ void xml_attribute_show(soap *ctx, soap_attribute **link, soap_attribute *record
 
 void xml_attributes_hide(soap *ctx)
 {
-    for (soap_attribute *record = ctx->attribute_list; record; record = record->next)
+    for (soap_attribute *record = ctx->attribute_list; record != nullptr; record = record->next)
         record->visible = 0;
     ctx->attribute_list = nullptr;
     ctx->attributes_set = 0;
-    if (ctx->namespace_scope)
+    if (ctx->namespace_scope != nullptr)
         ctx->namespace_scope->attributes_visible = 0;
 }
 
@@ -199,7 +199,7 @@ int xml_attribute_room(soap *ctx, soap_attribute *record, std::size_t size)
     SOAP_FREE(ctx, record->value);
     record->size = 0;
     record->value = static_cast<char *>(SOAP_MALLOC(ctx, size));
-    if (!record->value)
+    if (record->value == nullptr)
         return fail(ctx, SOAP_OUT_OF_MEMORY);
     record->size = size;
     return 0;
@@ -223,7 +223,7 @@ void xml_attributes_drop(soap *ctx)
 {
     xml_attributes_hide(ctx);
     soap_namespace_scope *scope = ctx->namespace_scope;
-    if (!scope || scope->attribute_count == 0)
+    if (scope == nullptr || scope->attribute_count == 0)
         return;
     for (soap_attribute *&chain : scope->attribute_chains) {
         while (soap_attribute *record = chain) {
@@ -239,16 +239,16 @@ int soap_attr_set(soap *ctx, const char *name, const char *value, int escape)
     if (*name == '-')
         return 0;
     soap_attribute *record = xml_attribute_record(ctx, name);
-    if (record && record->visible != 0)
+    if (record != nullptr && record->visible != 0)
         return 0;
     if (ctx->attributes_set == std::numeric_limits<std::int16_t>::max())
         return fail(ctx, SOAP_LENGTH);
-    if (!record || (value && xml_attribute_store(ctx, record, value)))
+    if (record == nullptr || (value != nullptr && xml_attribute_store(ctx, record, value)))
         return ctx->error;
     record->escape = static_cast<std::int16_t>(escape);
-    xml_attribute_show(ctx, &ctx->attribute_list, record, value ? 2 : 1);
+    xml_attribute_show(ctx, &ctx->attribute_list, record, value != nullptr ? 2 : 1);
     ++ctx->attributes_set;
-    if (value && std::strcmp(name, "wsu:Id") == 0)
+    if (value != nullptr && std::strcmp(name, "wsu:Id") == 0)
         announce_wsu_id(ctx, value);
     return 0;
 }

@@ -1,4 +1,4 @@
-// namespace.h - the namespace table in use and the prefixes in scope, as the codec sees them.
+// namespace.h - the namespace table in use and the prefixes in scope, as the reader and the writer see them.
 //
 // Here: look-ups that the writer and the reader share. Elsewhere: the operations themselves (soap_xml.h).
 #pragma once
@@ -22,7 +22,7 @@ void xml_received_drop(soap *ctx, soap_namespace &row);
 // The URI that a row stands for in the message under way: the one received, else its own; may be null.
 inline const char *xml_row_uri(const soap_namespace &row)
 {
-    return row.received ? row.received : row.uri;
+    return row.received != nullptr ? row.received : row.uri;
 }
 
 // The declarations of the table's first rows as one stretch of attributes, ready to send after a root

@@ -41,13 +41,13 @@ std::string_view text_of(const soap_prefix *record)
 
 bool waits(const soap_prefix *record)
 {
-    return record->index == TO_DECLARE && record->uri;
+    return record->index == TO_DECLARE && record->uri != nullptr;
 }
 
 soap_prefix *take_spare(soap_namespace_scope *scope, std::size_t texts)
 {
     soap_prefix *record = scope->spare;
-    if (!record || record->capacity < texts)
+    if (record == nullptr || record->capacity < texts)
         return nullptr;
     scope->spare = record->next;
     --scope->spare_count;
@@ -60,7 +60,7 @@ soap_prefix *make_record(soap *ctx, std::size_t texts)
     if (texts > std::numeric_limits<std::uint32_t>::max())
         return fail_null(ctx, SOAP_LENGTH);
     auto *record = static_cast<soap_prefix *>(SOAP_MALLOC(ctx, offsetof(soap_prefix, prefix) + texts));
-    if (!record)
+    if (record == nullptr)
         return fail_null(ctx, SOAP_OUT_OF_MEMORY);
     record->capacity = static_cast<std::uint32_t>(texts);
     return record;
@@ -81,19 +81,19 @@ void drop_record(soap *ctx, soap_namespace_scope *scope, soap_prefix *record)
 soap_prefix *push(soap *ctx, std::string_view prefix, const char *uri, std::int16_t index)
 {
     soap_namespace_scope *scope = namespace_scope_of(ctx);
-    if (!scope)
+    if (scope == nullptr)
         return nullptr;
     if (scope->in_scope >= SOAP_PREFIXES_MAX || prefix.size() > std::numeric_limits<std::uint16_t>::max())
         return fail_null(ctx, SOAP_LENGTH);
-    const std::size_t uri_size = uri ? std::strlen(uri) + 1 : 0;
+    const std::size_t uri_size = uri != nullptr ? std::strlen(uri) + 1 : 0;
     const std::size_t texts = prefix.size() + 1 + uri_size;
     soap_prefix *record = take_spare(scope, texts);
-    if (!record && !(record = make_record(ctx, texts)))
+    if (record == nullptr && (record = make_record(ctx, texts)) == nullptr)
         return nullptr;
     char *place = record->prefix;
     place = std::copy(prefix.begin(), prefix.end(), place);
     *place++ = '\0';
-    record->uri = uri ? static_cast<const char *>(std::memcpy(place, uri, uri_size)) : nullptr;
+    record->uri = uri != nullptr ? static_cast<const char *>(std::memcpy(place, uri, uri_size)) : nullptr;
     record->prefix_length = static_cast<std::uint16_t>(prefix.size());
     record->level = ctx->nesting_level;
     record->index = index;
@@ -104,7 +104,7 @@ soap_prefix *push(soap *ctx, std::string_view prefix, const char *uri, std::int1
     ctx->prefix_list = record;
     ++scope->in_scope;
     xml_prefix_rows_forget(ctx);
-    if (uri && index == TO_DECLARE)
+    if (uri != nullptr && index == TO_DECLARE)
         ++scope->waiting;
     return record;
 }
@@ -129,20 +129,20 @@ bool is_canonical(const soap *ctx)
 
 bool same_uri(const char *one, const char *other)
 {
-    return one && other && std::strcmp(one, other) == 0;
+    return one != nullptr && other != nullptr && std::strcmp(one, other) == 0;
 }
 
 bool is_row_uri(const soap_namespace &row, const namespace_lengths *lengths, std::string_view uri)
 {
-    return row.uri && (!lengths || lengths->uri == uri.size()) && uri == row.uri;
+    return row.uri != nullptr && (lengths == nullptr || lengths->uri == uri.size()) && uri == row.uri;
 }
 
 // The patterns of a table have long heads in common: the last letter of the head tells most apart.
 bool fits_pattern(const soap_namespace &row, const namespace_lengths *lengths, std::string_view uri)
 {
-    if (!row.pattern)
+    if (row.pattern == nullptr)
         return false;
-    if (lengths && lengths->pattern_head > 0) {
+    if (lengths != nullptr && lengths->pattern_head > 0) {
         constexpr char CASE = 'a' - 'A';
         const std::size_t last = lengths->pattern_head - 1;
         if (last >= uri.size() || (uri[last] | CASE) != (row.pattern[last] | CASE))
@@ -155,15 +155,15 @@ bool fits_pattern(const soap_namespace &row, const namespace_lengths *lengths, s
 bool bind_uri(soap *ctx, const char *uri, std::int16_t *index)
 {
     *index = UNBOUND;
-    if (!ctx->local_namespaces)
+    if (ctx->local_namespaces == nullptr)
         return true;
     const std::string_view text(uri);
-    for (std::size_t i = 0; ctx->local_namespaces[i].prefix; ++i) {
+    for (std::size_t i = 0; ctx->local_namespaces[i].prefix != nullptr; ++i) {
         soap_namespace &row = ctx->local_namespaces[i];
         const namespace_lengths *lengths = namespace_row_lengths(ctx, i);
         if (is_row_uri(row, lengths, text)) {
             xml_received_drop(ctx, row);
-        } else if (row.received) {
+        } else if (row.received != nullptr) {
             if (text != row.received)
                 continue;
         } else {
@@ -181,7 +181,7 @@ bool bind_uri(soap *ctx, const char *uri, std::int16_t *index)
 soap_prefix *find(const soap *ctx, std::string_view prefix)
 {
     soap_prefix *record = ctx->namespace_scope->chains[chain_of(ctx->namespace_scope, prefix)];
-    while (record && text_of(record) != prefix)
+    while (record != nullptr && text_of(record) != prefix)
         record = record->chain;
     return record;
 }
@@ -223,15 +223,15 @@ bool xml_list_names(const char *list, std::string_view prefix)
 
 soap_prefix *xml_prefix_find(const soap *ctx, std::string_view prefix)
 {
-    if (!ctx->prefix_list)
+    if (ctx->prefix_list == nullptr)
         return nullptr;
     soap_prefix *const record = find(ctx, prefix);
-    return record || (ctx->mode & MODE_UTF_STRINGS) ? record : find_latin1(ctx, prefix);
+    return record != nullptr || (ctx->mode & MODE_UTF_STRINGS) ? record : find_latin1(ctx, prefix);
 }
 
 std::size_t xml_prefixes_waiting(const soap *ctx)
 {
-    return ctx->namespace_scope ? ctx->namespace_scope->waiting : 0;
+    return ctx->namespace_scope != nullptr ? ctx->namespace_scope->waiting : 0;
 }
 
 void xml_prefix_declared(soap *ctx, soap_prefix *record)
@@ -243,33 +243,34 @@ void xml_prefix_declared(soap *ctx, soap_prefix *record)
 
 int soap_prefix_push_out(soap *ctx, const char *prefix, const char *uri, int state)
 {
-    if (is_canonical(ctx) && ctx->canonical_exclude && xml_list_names(ctx->canonical_exclude, prefix))
+    if (is_canonical(ctx) && ctx->canonical_exclude != nullptr &&
+        xml_list_names(ctx->canonical_exclude, prefix))
         return 0;
     if (state == DECLARED) {
         const soap_prefix *known = xml_prefix_find(ctx, prefix);
-        if (known && (!known->uri || same_uri(known->uri, uri))) {
-            const bool declared_here = known->uri && known->level >= ctx->nesting_level;
+        if (known != nullptr && (known->uri == nullptr || same_uri(known->uri, uri))) {
+            const bool declared_here = known->uri != nullptr && known->level >= ctx->nesting_level;
             if (declared_here || known->index != TO_DECLARE)
                 return 0;
         }
         // Known without a URI: the element has used it and now says what it stands for. Known with another
         // URI: the element gives the prefix a new meaning, which must be written here to hold.
-        if (known)
+        if (known != nullptr)
             state = TO_DECLARE;
     }
-    return push(ctx, prefix, uri, static_cast<std::int16_t>(state)) ? 0 : ctx->error;
+    return push(ctx, prefix, uri, static_cast<std::int16_t>(state)) != nullptr ? 0 : ctx->error;
 }
 
 int soap_prefix_use(soap *ctx, const char *name)
 {
     const std::string_view prefix = xml_prefix_of(name);
     const soap_prefix *known = xml_prefix_find(ctx, prefix);
-    if (known ? known->index != DECLARED : prefix.starts_with("xml"))
+    if (known != nullptr ? known->index != DECLARED : prefix.starts_with("xml"))
         return 0;
-    if (is_canonical(ctx) && ctx->canonical_exclude && !prefix.empty() &&
+    if (is_canonical(ctx) && ctx->canonical_exclude != nullptr && !prefix.empty() &&
         xml_list_names(ctx->canonical_exclude, prefix))
         return 0;
-    return push(ctx, prefix, known ? known->uri : nullptr, TO_DECLARE) ? 0 : ctx->error;
+    return push(ctx, prefix, known != nullptr ? known->uri : nullptr, TO_DECLARE) != nullptr ? 0 : ctx->error;
 }
 
 soap_prefix *soap_prefix_push_in(soap *ctx, const char *prefix, const char *uri)
@@ -282,13 +283,13 @@ soap_prefix *soap_prefix_push_in(soap *ctx, const char *prefix, const char *uri)
 
 void soap_prefix_pop(soap *ctx)
 {
-    while (ctx->prefix_list && ctx->prefix_list->level >= ctx->nesting_level)
+    while (ctx->prefix_list != nullptr && ctx->prefix_list->level >= ctx->nesting_level)
         pop_head(ctx);
 }
 
 void soap_prefix_stack_reset(soap *ctx)
 {
-    while (ctx->prefix_list)
+    while (ctx->prefix_list != nullptr)
         pop_head(ctx);
 }
 
@@ -296,9 +297,9 @@ const char *soap_namespace_of(soap *ctx, const char *name)
 {
     const std::string_view prefix = xml_prefix_of(name);
     const soap_prefix *record = xml_prefix_find(ctx, prefix);
-    if (record && record->uri)
+    if (record != nullptr && record->uri != nullptr)
         return record->uri;
-    if (record && record->index >= 0 && ctx->local_namespaces)
+    if (record != nullptr && record->index >= 0 && ctx->local_namespaces != nullptr)
         return xml_row_uri(ctx->local_namespaces[record->index]);
     if (prefix == "xml")
         return XML_NAMESPACE_URI;

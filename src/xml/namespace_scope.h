@@ -58,7 +58,7 @@ soap_namespace_scope *namespace_scope_of(soap *ctx);
 inline bool namespace_prefix_has_length(const soap_namespace_scope *scope, const soap_namespace &row,
                                         std::size_t index, std::size_t length)
 {
-    return scope && index < scope->row_count && scope->rows[index].prefix == row.prefix &&
+    return scope != nullptr && index < scope->row_count && scope->rows[index].prefix == row.prefix &&
            scope->lengths[index].prefix == length;
 }
 
@@ -66,7 +66,7 @@ inline bool namespace_prefix_has_length(const soap_namespace_scope *scope, const
 inline bool namespace_row_has_prefix(const soap *ctx, int row, const char *prefix, std::size_t length)
 {
     const soap_namespace *table = ctx->local_namespaces;
-    if (table &&
+    if (table != nullptr &&
         namespace_prefix_has_length(ctx->namespace_scope, table[row], static_cast<std::size_t>(row), length))
         return same_name(table[row].prefix, prefix, length);
     return xml_row_has_prefix(ctx, row, prefix, length);
@@ -76,7 +76,7 @@ inline bool namespace_row_has_prefix(const soap *ctx, int row, const char *prefi
 inline const namespace_lengths *namespace_row_lengths(const soap *ctx, std::size_t row)
 {
     const soap_namespace_scope *scope = ctx->namespace_scope;
-    const bool known = scope && row < scope->row_count &&
+    const bool known = scope != nullptr && row < scope->row_count &&
                        scope->rows[row].uri == ctx->local_namespaces[row].uri &&
                        scope->rows[row].pattern == ctx->local_namespaces[row].pattern;
     return known ? &scope->lengths[row] : nullptr;

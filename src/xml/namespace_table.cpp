@@ -25,7 +25,7 @@ constexpr const char *SOAP_11_ENVELOPE = "http://schemas.xmlsoap.org/soap/envelo
 std::size_t count_rows(const soap_namespace *table)
 {
     std::size_t count = 0;
-    while (table[count].prefix)
+    while (table[count].prefix != nullptr)
         ++count;
     return count;
 }
@@ -42,7 +42,8 @@ bool is_measured(const soap_namespace_scope *scope, const soap_namespace *table)
     const auto same_row = [](const soap_namespace &one, const soap_namespace &other) {
         return same_texts(one, other) && one.received == other.received;
     };
-    return scope && scope->rows && std::equal(scope->rows, scope->rows + scope->row_count, table, same_row) &&
+    return scope != nullptr && scope->rows != nullptr &&
+           std::equal(scope->rows, scope->rows + scope->row_count, table, same_row) &&
            table[scope->row_count].prefix == nullptr;
 }
 
@@ -62,21 +63,22 @@ void forget_rows(soap *ctx, soap_namespace_scope *scope)
 int describe_rows(soap *ctx, const soap_namespace *table, std::size_t count)
 {
     soap_namespace_scope *scope = namespace_scope_of(ctx);
-    if (!scope)
+    if (scope == nullptr)
         return ctx->error;
-    if (scope->rows && scope->row_count == count && std::equal(table, table + count, scope->rows, same_texts))
+    if (scope->rows != nullptr && scope->row_count == count &&
+        std::equal(table, table + count, scope->rows, same_texts))
         return 0;
     forget_rows(ctx, scope);
     void *place = SOAP_MALLOC(ctx, (count + 1) * (sizeof(soap_namespace) + sizeof(namespace_lengths)));
-    if (!place)
+    if (place == nullptr)
         return fail(ctx, SOAP_OUT_OF_MEMORY);
     auto *rows = static_cast<soap_namespace *>(place);
     auto *lengths = reinterpret_cast<namespace_lengths *>(rows + count + 1);
     for (std::size_t i = 0; i < count; ++i) {
         rows[i] = table[i];
         rows[i].received = nullptr;
-        lengths[i] = {std::strlen(table[i].prefix), table[i].uri ? std::strlen(table[i].uri) : 0,
-                      table[i].pattern ? std::strcspn(table[i].pattern, "*-") : 0};
+        lengths[i] = {std::strlen(table[i].prefix), table[i].uri != nullptr ? std::strlen(table[i].uri) : 0,
+                      table[i].pattern != nullptr ? std::strcspn(table[i].pattern, "*-") : 0};
     }
     scope->rows = rows;
     scope->lengths = lengths;
@@ -86,7 +88,7 @@ int describe_rows(soap *ctx, const soap_namespace *table, std::size_t count)
 
 bool is_declared(const soap_namespace &row)
 {
-    return row.prefix[0] != '\0' && row.uri;
+    return row.prefix[0] != '\0' && row.uri != nullptr;
 }
 
 char *append(char *target, const char *text, std::size_t length)
@@ -104,7 +106,7 @@ bool compose_declarations(soap *ctx, soap_namespace_scope *scope)
             size += FRAME + std::strlen(scope->rows[i].prefix) + scope->lengths[i].uri;
     }
     auto *ends = static_cast<std::size_t *>(SOAP_MALLOC(ctx, size + 1));
-    if (!ends)
+    if (ends == nullptr)
         return false;
     scope->declaration_ends = ends;
     scope->declarations = reinterpret_cast<char *>(ends);
@@ -119,7 +121,7 @@ bool compose_declarations(soap *ctx, soap_namespace_scope *scope)
             end = append(end, "=\"", 2);
             end = append(end, row.uri, scope->lengths[i].uri);
             end = append(end, "\"", 1);
-            const auto is_plain = [](char c) { return c > ' ' && !std::strchr("\"&<", c); };
+            const auto is_plain = [](char c) { return c > ' ' && (std::strchr("\"&<", c) == nullptr); };
             if (!std::all_of(row.uri, row.uri + scope->lengths[i].uri, is_plain))
                 scope->declarations_plain = false;
         }
@@ -132,10 +134,10 @@ bool compose_declarations(soap *ctx, soap_namespace_scope *scope)
 
 soap_namespace_scope *namespace_scope_of(soap *ctx)
 {
-    if (ctx->namespace_scope)
+    if (ctx->namespace_scope != nullptr)
         return ctx->namespace_scope;
     void *place = SOAP_MALLOC(ctx, sizeof(soap_namespace_scope));
-    if (!place)
+    if (place == nullptr)
         return fail_null(ctx, SOAP_OUT_OF_MEMORY);
     std::memset(place, 0, sizeof(soap_namespace_scope));
     ctx->namespace_scope = static_cast<soap_namespace_scope *>(place);
@@ -149,16 +151,16 @@ soap_namespace_scope *namespace_scope_of(soap *ctx)
 void soap_namespace_scope_free(soap *ctx)
 {
     soap_namespace_scope *scope = ctx->namespace_scope;
-    if (!scope)
+    if (scope == nullptr)
         return;
     soap_prefix_stack_reset(ctx);
-    while (scope->spare) {
+    while (scope->spare != nullptr) {
         soap_prefix *next = scope->spare->next;
         SOAP_FREE(ctx, scope->spare);
         scope->spare = next;
     }
     xml_attributes_drop(ctx);
-    while (scope->spare_attributes) {
+    while (scope->spare_attributes != nullptr) {
         soap_attribute *next = scope->spare_attributes->next;
         xml_attribute_free(ctx, scope->spare_attributes);
         scope->spare_attributes = next;
@@ -170,45 +172,46 @@ void soap_namespace_scope_free(soap *ctx)
 
 int soap_namespace_table_copy(soap *ctx)
 {
-    if (ctx->local_namespaces || !ctx->namespaces)
+    if (ctx->local_namespaces != nullptr || ctx->namespaces == nullptr)
         return 0;
     const bool measured = is_measured(ctx->namespace_scope, ctx->namespaces);
     const std::size_t count = measured ? ctx->namespace_scope->row_count : count_rows(ctx->namespaces);
     if (!measured && describe_rows(ctx, ctx->namespaces, count))
         return ctx->error;
     soap_namespace *rows = std::exchange(ctx->namespace_scope->spare_table, nullptr);
-    if (!rows)
+    if (rows == nullptr)
         rows = static_cast<soap_namespace *>(SOAP_MALLOC(ctx, (count + 1) * sizeof(soap_namespace)));
-    if (!rows)
+    if (rows == nullptr)
         return fail(ctx, SOAP_OUT_OF_MEMORY);
     std::copy_n(ctx->namespaces, count + 1, rows);
     ctx->local_namespaces = rows;
     std::for_each(rows, rows + count + 1, [](soap_namespace &row) { row.received = nullptr; });
     for (std::size_t i = 0; i < count; ++i) {
         const char *received = ctx->namespaces[i].received;
-        if (received && xml_received_set(ctx, rows[i], received)) {
+        if (received != nullptr && xml_received_set(ctx, rows[i], received)) {
             soap_namespace_table_drop(ctx);
             return ctx->error;
         }
     }
     if (count > 0)
-        ctx->soap_version = rows[0].uri && std::strcmp(rows[0].uri, SOAP_11_ENVELOPE) == 0 ? 1 : 2;
+        ctx->soap_version =
+            (rows[0].uri != nullptr) && std::strcmp(rows[0].uri, SOAP_11_ENVELOPE) == 0 ? 1 : 2;
     return 0;
 }
 
 void soap_namespace_table_drop(soap *ctx)
 {
-    if (!ctx->local_namespaces)
+    if (ctx->local_namespaces == nullptr)
         return;
     soap_namespace *row = ctx->local_namespaces;
-    for (; row->prefix; ++row) {
+    for (; row->prefix != nullptr; ++row) {
         // The style was taken from the table in place of "" and may be another one in the next message.
-        if (ctx->encoding_style && ctx->encoding_style == row->uri)
+        if (ctx->encoding_style != nullptr && ctx->encoding_style == row->uri)
             ctx->encoding_style = "";
         xml_received_drop(ctx, *row);
     }
     soap_namespace_scope *scope = ctx->namespace_scope;
-    if (scope && !scope->spare_table &&
+    if (scope != nullptr && scope->spare_table == nullptr &&
         scope->row_count == static_cast<std::size_t>(row - ctx->local_namespaces))
         scope->spare_table = ctx->local_namespaces;
     else
@@ -219,7 +222,7 @@ void soap_namespace_table_drop(soap *ctx)
 int soap_set_namespaces(soap *ctx, const soap_namespace *table)
 {
     // A working copy can't serve as the table that it is copied from.
-    if (!table || table != ctx->local_namespaces) {
+    if (table == nullptr || table != ctx->local_namespaces) {
         ctx->namespaces = table;
         soap_namespace_table_drop(ctx);
     }
@@ -228,11 +231,11 @@ int soap_set_namespaces(soap *ctx, const soap_namespace *table)
 
 int xml_received_set(soap *ctx, soap_namespace &row, const char *uri)
 {
-    if (row.received && std::strcmp(row.received, uri) == 0)
+    if (row.received != nullptr && std::strcmp(row.received, uri) == 0)
         return 0;
     const std::size_t size = std::strlen(uri) + 1;
     auto *copy = static_cast<char *>(SOAP_MALLOC(ctx, size));
-    if (!copy)
+    if (copy == nullptr)
         return fail(ctx, SOAP_OUT_OF_MEMORY);
     std::memcpy(copy, uri, size);
     xml_received_drop(ctx, row);
@@ -242,7 +245,7 @@ int xml_received_set(soap *ctx, soap_namespace &row, const char *uri)
 
 void xml_received_drop(soap *ctx, soap_namespace &row)
 {
-    if (!row.received)
+    if (row.received == nullptr)
         return;
     if (ctx->encoding_style == row.received)
         ctx->encoding_style = "";
@@ -254,11 +257,11 @@ const char *xml_root_declarations(soap *ctx, std::size_t rows_max, std::size_t *
 {
     soap_namespace_scope *scope = ctx->namespace_scope;
     const soap_namespace *table = ctx->local_namespaces;
-    if (!scope || !table)
+    if (scope == nullptr || table == nullptr)
         return nullptr;
     if (!is_measured(scope, table))
         return nullptr;
-    if (!scope->declarations && !compose_declarations(ctx, scope))
+    if (scope->declarations == nullptr && !compose_declarations(ctx, scope))
         return nullptr;
     if (!scope->declarations_plain)
         return nullptr;

@@ -188,7 +188,7 @@ int read_tag_end(soap *ctx)
     if (byte == XML_EOF)
         return no_tag(ctx, end_of_input(ctx));
     ctx->buffer_index++;
-    ctx->has_body = byte != '/';
+    ctx->has_body = static_cast<std::int16_t>(byte != '/');
     if (byte != '/')
         return 0;
     if (input_skip_blanks(ctx) == XML_EOF)

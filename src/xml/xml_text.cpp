@@ -66,7 +66,7 @@ bool fits(const soap *ctx, const char *text, std::size_t length, long minimum, l
     std::size_t count = length;
     if ((ctx->mode & MODE_UTF_STRINGS) != 0) {
         for (std::size_t i = 0; i < length; ++i)
-            count -= (static_cast<unsigned char>(text[i]) & 0xC0) == 0x80;
+            count -= static_cast<std::size_t>((static_cast<unsigned char>(text[i]) & 0xC0) == 0x80);
     }
     return (minimum <= 0 || count >= static_cast<std::size_t>(minimum)) &&
            (maximum < 0 || count <= static_cast<std::size_t>(maximum));

@@ -67,7 +67,7 @@ std::uint64_t characters(const soap *ctx, const char *text, std::size_t length)
         return length;
     std::uint64_t count = 0;
     for (std::size_t i = 0; i < length; ++i)
-        count += (static_cast<unsigned char>(text[i]) & 0xC0) != 0x80;
+        count += static_cast<std::size_t>((static_cast<unsigned char>(text[i]) & 0xC0) != 0x80);
     return count;
 }
 

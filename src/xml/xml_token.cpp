@@ -276,7 +276,7 @@ int xml_skip_tag(soap *ctx)
                     quote = '\0';
             } else if (*p == '>') {
                 input_consume(ctx, p + 1);
-                return last == '/';
+                return static_cast<int>(last == '/');
             } else if ((*p == '"' || *p == '\'') && last == '=') {
                 quote = *p;
             }

@@ -50,7 +50,7 @@ int put_indent(soap *ctx)
 
 int put_prolog(soap *ctx)
 {
-    if (ctx->xml_prolog)
+    if (ctx->xml_prolog != nullptr)
         return xml_put(ctx, ctx->xml_prolog);
     return xml_put(ctx, DECLARATION);
 }
@@ -58,17 +58,17 @@ int put_prolog(soap *ctx)
 bool is_default_prefix(const soap *ctx, std::string_view prefix)
 {
     const soap_prefix *top = ctx->prefix_list;
-    return top && prefix == std::string_view(top->prefix, top->prefix_length);
+    return top != nullptr && prefix == std::string_view(top->prefix, top->prefix_length);
 }
 
 // Makes the namespace of `prefix` the default one, with a declaration if it isn't that already.
 int put_default_namespace(soap *ctx, std::string_view prefix)
 {
-    if (is_default_prefix(ctx, prefix) || !ctx->local_namespaces)
+    if (is_default_prefix(ctx, prefix) || ctx->local_namespaces == nullptr)
         return 0;
-    for (const soap_namespace *row = ctx->local_namespaces; row->prefix; ++row) {
+    for (const soap_namespace *row = ctx->local_namespaces; row->prefix != nullptr; ++row) {
         const char *uri = xml_row_uri(*row);
-        if (!uri || prefix != row->prefix)
+        if (uri == nullptr || prefix != row->prefix)
             continue;
         if (soap_prefix_push_out(ctx, row->prefix, uri, 2))
             return ctx->error;
@@ -96,17 +96,17 @@ int put_root_namespaces(soap *ctx)
 {
     const std::size_t rows =
         has_default_namespaces(ctx) ? DEFAULT_NAMESPACE_ROWS : std::numeric_limits<std::size_t>::max();
-    if (!ctx->local_namespaces)
+    if (ctx->local_namespaces == nullptr)
         return 0;
     if (has_mode(ctx, MODE_CANONICAL))
         return xml_canonical_root(ctx, rows);
     std::size_t length = 0;
     if (const char *stretch = xml_root_declarations(ctx, rows, &length))
         return soap_send_bytes(ctx, stretch, length);
-    for (std::size_t i = 0; i < rows && ctx->local_namespaces[i].prefix; ++i) {
+    for (std::size_t i = 0; i < rows && ctx->local_namespaces[i].prefix != nullptr; ++i) {
         const soap_namespace &row = ctx->local_namespaces[i];
         const char *uri = xml_row_uri(row);
-        if (!uri || *row.prefix == '\0')
+        if (uri == nullptr || *row.prefix == '\0')
             continue;
         if (xml_put(ctx, " xmlns:") || xml_put(ctx, row.prefix) || xml_put(ctx, "=\"") ||
             soap_text_write(ctx, uri, 1) || xml_put(ctx, "\""))
@@ -117,7 +117,7 @@ int put_root_namespaces(soap *ctx)
 
 int put_type(soap *ctx, const char *type)
 {
-    if (!type || *type == '\0' || has_mode(ctx, MODE_NO_TYPE) || ctx->message_part == PART_HEADER)
+    if (type == nullptr || *type == '\0' || has_mode(ctx, MODE_NO_TYPE) || ctx->message_part == PART_HEADER)
         return 0;
     const char *text = has_default_namespaces(ctx) ? xml_local_part(type).data() : type;
     // A type that the caller set as an attribute comes first and stays the only one.
@@ -148,7 +148,7 @@ int put_must_understand(soap *ctx)
     if (!ctx->must_understand)
         return 0;
     const bool is_soap12 = ctx->soap_version == 2;
-    if (ctx->actor && *ctx->actor &&
+    if (ctx->actor != nullptr && *ctx->actor &&
         soap_attr_write(ctx, is_soap12 ? "SOAP-ENV:role" : "SOAP-ENV:actor", ctx->actor))
         return ctx->error;
     if (soap_attr_write(ctx, "SOAP-ENV:mustUnderstand", is_soap12 ? "true" : "1"))
@@ -159,15 +159,16 @@ int put_must_understand(soap *ctx)
 
 bool table_has_encoding_row(const soap *ctx)
 {
-    return ctx->local_namespaces && ctx->local_namespaces[0].prefix && ctx->local_namespaces[1].prefix;
+    return ctx->local_namespaces != nullptr && ctx->local_namespaces[0].prefix != nullptr &&
+           (ctx->local_namespaces[1].prefix != nullptr);
 }
 
 int put_encoding_style(soap *ctx)
 {
-    if (ctx->encoding_flag && ctx->encoding_style && ctx->local_namespaces) {
+    if (ctx->encoding_flag && ctx->encoding_style != nullptr && ctx->local_namespaces != nullptr) {
         if (*ctx->encoding_style == '\0' && table_has_encoding_row(ctx)) {
             const char *uri = xml_row_uri(ctx->local_namespaces[1]);
-            ctx->encoding_style = uri ? uri : "";
+            ctx->encoding_style = uri != nullptr ? uri : "";
         }
         if (soap_attr_write(ctx, "SOAP-ENV:encodingStyle", ctx->encoding_style))
             return ctx->error;
@@ -179,7 +180,7 @@ int put_encoding_style(soap *ctx)
 // The visible attributes of the table, each of which becomes idle.
 int put_waiting_attributes(soap *ctx)
 {
-    for (soap_attribute *record = ctx->attribute_list; record && ctx->attributes_set > 0;
+    for (soap_attribute *record = ctx->attribute_list; (record != nullptr) && ctx->attributes_set > 0;
          record = record->next) {
         std::string_view name = xml_attribute_name(record);
         if (drops_prefix(ctx, name) && is_default_prefix(ctx, xml_prefix_of(name)))
@@ -216,7 +217,7 @@ int xml_put_attribute(soap *ctx, std::string_view name, const char *value, int e
 {
     if (xml_put(ctx, " ") || xml_put(ctx, name))
         return ctx->error;
-    if (!value)
+    if (value == nullptr)
         return 0;
     if (xml_put(ctx, "=\"") || soap_text_write(ctx, value, escape) || xml_put(ctx, "\""))
         return ctx->error;
@@ -274,7 +275,7 @@ int soap_element_attrs_close(soap *ctx, const char *tag)
         return ctx->error;
     if (ctx->attributes_set && put_waiting_attributes(ctx))
         return ctx->error;
-    if (!tag)
+    if (tag == nullptr)
         return xml_put(ctx, ">");
     if (is_canonical)
         return xml_put(ctx, ">") ? ctx->error : soap_element_out_end(ctx, tag);
@@ -293,7 +294,7 @@ int soap_element_out_begin(soap *ctx, const char *tag, int id, const char *type)
 {
     if (stands_for_none(tag))
         return 0;
-    if (id <= 0 && (!type || *type == '\0'))
+    if (id <= 0 && (type == nullptr || *type == '\0'))
         return xml_open_plain(ctx, tag, std::strlen(tag));
     return xml_open_long(ctx, tag, id, type);
 }

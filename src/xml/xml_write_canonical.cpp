@@ -26,7 +26,7 @@ bool is_declaration(std::string_view name)
 // A generated declaration in the table serves prefixes that the stack doesn't know.
 const char *declared_in_table(const soap *ctx, std::string_view prefix)
 {
-    for (const soap_attribute *record = ctx->attribute_list; record; record = record->next) {
+    for (const soap_attribute *record = ctx->attribute_list; record != nullptr; record = record->next) {
         const std::string_view name(record->name);
         if (record->visible == 2 && name.starts_with("xmlns:") && name.substr(6) == prefix)
             return record->value;
@@ -45,14 +45,14 @@ const char *uri_of(const soap *ctx, const soap_attribute *record)
     if (prefix == "xml")
         return XML_NAMESPACE_URI;
     const soap_prefix *known = xml_prefix_find(ctx, prefix);
-    return known && known->uri ? known->uri : declared_in_table(ctx, prefix);
+    return known != nullptr && known->uri != nullptr ? known->uri : declared_in_table(ctx, prefix);
 }
 
 int group_of(const soap_attribute *record)
 {
     if (is_declaration(record->name))
         return 0;
-    return record->uri ? 2 : 1;
+    return record->uri != nullptr ? 2 : 1;
 }
 
 bool comes_before(const soap_attribute *one, const soap_attribute *other)
@@ -70,7 +70,7 @@ bool comes_before(const soap_attribute *one, const soap_attribute *other)
 soap_attribute *take_sorted(soap *ctx)
 {
     soap_attribute *sorted = nullptr;
-    for (soap_attribute **link = &ctx->attribute_list; *link;) {
+    for (soap_attribute **link = &ctx->attribute_list; *link != nullptr;) {
         soap_attribute *record = *link;
         if (record->visible == 0) {
             link = &record->next;
@@ -78,7 +78,7 @@ soap_attribute *take_sorted(soap *ctx)
         }
         *link = record->next;
         soap_attribute **place = &sorted;
-        while (*place && comes_before(*place, record))
+        while (*place != nullptr && comes_before(*place, record))
             place = &(*place)->next;
         record->next = *place;
         *place = record;
@@ -88,7 +88,7 @@ soap_attribute *take_sorted(soap *ctx)
 
 void find_uris(soap *ctx)
 {
-    for (soap_attribute *record = ctx->attribute_list; record; record = record->next)
+    for (soap_attribute *record = ctx->attribute_list; record != nullptr; record = record->next)
         record->uri = record->visible ? uri_of(ctx, record) : nullptr;
 }
 
@@ -97,7 +97,7 @@ void sort_attributes(soap *ctx)
     find_uris(ctx);
     soap_attribute *sorted = take_sorted(ctx);
     soap_attribute **end = &sorted;
-    while (*end)
+    while (*end != nullptr)
         end = &(*end)->next;
     *end = ctx->attribute_list;
     ctx->attribute_list = sorted;
@@ -106,9 +106,9 @@ void sort_attributes(soap *ctx)
 // Unprefixed attributes are in no namespace; declarations and "xml" need none.
 int use_attribute_prefixes(soap *ctx)
 {
-    for (const soap_attribute *record = ctx->attribute_list; record; record = record->next) {
+    for (const soap_attribute *record = ctx->attribute_list; record != nullptr; record = record->next) {
         const std::string_view prefix = xml_prefix_of(record->name);
-        if (record->visible && !prefix.empty() && !declared_in_table(ctx, prefix) &&
+        if (record->visible && !prefix.empty() && declared_in_table(ctx, prefix) == nullptr &&
             soap_prefix_use(ctx, record->name))
             return ctx->error;
     }
@@ -136,9 +136,9 @@ int declare(soap *ctx, soap_prefix *record)
 
 int declare_waiting(soap *ctx)
 {
-    for (soap_prefix *record = ctx->prefix_list; record && xml_prefixes_waiting(ctx) > 0;
+    for (soap_prefix *record = ctx->prefix_list; (record != nullptr) && xml_prefixes_waiting(ctx) > 0;
          record = record->next) {
-        if (record->index == 1 && record->uri && declare(ctx, record))
+        if (record->index == 1 && record->uri != nullptr && declare(ctx, record))
             return ctx->error;
     }
     return 0;
@@ -146,17 +146,17 @@ int declare_waiting(soap *ctx)
 
 bool includes(const soap *ctx, std::string_view prefix)
 {
-    return ctx->canonical_include && xml_list_names(ctx->canonical_include, prefix);
+    return ctx->canonical_include != nullptr && xml_list_names(ctx->canonical_include, prefix);
 }
 
 } // namespace
 
 int xml_canonical_root(soap *ctx, std::size_t rows)
 {
-    for (std::size_t i = 0; i < rows && ctx->local_namespaces[i].prefix; ++i) {
+    for (std::size_t i = 0; i < rows && ctx->local_namespaces[i].prefix != nullptr; ++i) {
         const soap_namespace &row = ctx->local_namespaces[i];
         const char *uri = xml_row_uri(row);
-        if (*row.prefix == '\0' || !uri)
+        if (*row.prefix == '\0' || uri == nullptr)
             continue;
         if (soap_prefix_push_out(ctx, row.prefix, uri, includes(ctx, row.prefix) ? 1 : 0))
             return ctx->error;

@@ -21,15 +21,16 @@ constexpr std::uint32_t XML_SPECIAL_TAGS = MODE_INDENT | MODE_DEFAULT_NAMESPACE 
 // True in a counting pass that nobody watches: bytes need only be added up.
 inline bool xml_only_counts(const soap *ctx)
 {
-    return (ctx->mode & MODE_COUNTING) && !ctx->on_send_filter && !ctx->on_send_prepare;
+    return ((ctx->mode & MODE_COUNTING) != 0u) && ctx->on_send_filter == nullptr &&
+           (ctx->on_send_prepare == nullptr);
 }
 
 // Room for `length` bytes in the send buffer, which count as sent; the caller fills all of it at once. Null
 // if the bytes must go through soap_send_bytes: counting, unbuffered, filtered, or no room left.
 inline char *xml_reserve(soap *ctx, std::size_t length)
 {
-    if ((ctx->mode & MODE_COUNTING) || (ctx->mode & MODE_IO_MASK) == MODE_DIRECT || ctx->on_send_filter ||
-        length >= SOAP_BUFFER_SIZE - ctx->buffer_index)
+    if ((ctx->mode & MODE_COUNTING) || (ctx->mode & MODE_IO_MASK) == MODE_DIRECT ||
+        (ctx->on_send_filter != nullptr) || length >= SOAP_BUFFER_SIZE - ctx->buffer_index)
         return nullptr;
     char *place = ctx->buffer + ctx->buffer_index;
     ctx->buffer_index += length;
@@ -55,7 +56,7 @@ inline void xml_leave(soap *ctx)
 // True if the next start tag without id and type is its name in brackets and nothing else.
 inline bool xml_tag_is_plain(const soap *ctx)
 {
-    return !(ctx->mode & XML_SPECIAL_TAGS) && ctx->namespace_state != 0 &&
+    return ((ctx->mode & XML_SPECIAL_TAGS) == 0u) && ctx->namespace_state != 0 &&
            (ctx->attributes_set | ctx->encoding_flag | ctx->must_understand | ctx->null_flag) == 0;
 }
 
@@ -71,7 +72,7 @@ inline int xml_open_plain(soap *ctx, const char *tag, std::size_t length)
     if (!xml_tag_is_plain(ctx))
         return xml_open_long(ctx, tag, 0, nullptr);
     char *place = xml_reserve(ctx, length + 2);
-    if (place) {
+    if (place != nullptr) {
         *place = '<';
         std::memcpy(place + 1, tag, length);
         place[length + 1] = '>';
@@ -91,7 +92,7 @@ inline int xml_close_plain(soap *ctx, const char *tag, std::size_t length)
     if (ctx->mode & XML_SPECIAL_TAGS)
         return xml_close_long(ctx, tag);
     char *place = xml_reserve(ctx, length + 3);
-    if (place) {
+    if (place != nullptr) {
         place[0] = '<';
         place[1] = '/';
         std::memcpy(place + 2, tag, length);
