@@ -1,10 +1,8 @@
 // attachment_checks.h - what holds of every message with attachments, however it is framed.
 #pragma once
 
-#include <gtest/gtest.h>
-
 #include "support/attachment_exchange.h"
-#include "support/failing_malloc.h"
+#include "support/testing.h"
 
 namespace attachment_exchange {
 

@@ -4,18 +4,6 @@
 // expectations of the tests are in attachment_checks.h.
 #pragma once
 
-#include <cstring>
-#include <deque>
-#include <memory>
-#include <string>
-#include <vector>
-
-#include <zuv_client_pro/soap_attachment.h>
-#include <zuv_client_pro/soap_binary.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_xml.h>
-
 #include "support/memory_wire.h"
 
 namespace attachment_exchange {
@@ -39,11 +27,6 @@ struct value : xsd__base64Binary {
                    : std::string(reinterpret_cast<char *>(content), static_cast<std::size_t>(size));
     }
 };
-
-inline std::string text(const char *text)
-{
-    return text == nullptr ? "(null)" : text;
-}
 
 // A value to send; the texts must live as long as it.
 inline value make_value(const std::string &bytes, const char *id, const char *type,
@@ -123,8 +106,7 @@ struct reception {
                        std::size_t piece = 65536)
     {
         wire->input_mode = mode;
-        wire->receive(bytes);
-        wire->piece = [first, piece](std::size_t given) { return given == 0 ? first : piece; };
+        wire->receive(bytes, first, piece);
     }
     int run()
     {
@@ -143,7 +125,7 @@ struct reception {
             return "!" + std::to_string(error);
         std::string all;
         for (const value &v : values)
-            all += "[" + text(v.id) + " " + text(v.type) + " " + v.bytes() + "]";
+            all += "[" + text_of(v.id) + " " + text_of(v.type) + " " + v.bytes() + "]";
         return all;
     }
 

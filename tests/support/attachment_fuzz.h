@@ -1,10 +1,6 @@
 // attachment_fuzz.h - what the readers of DIME and MIME are held against for any bytes.
 #pragma once
 
-#include <cstdio>
-#include <cstdlib>
-#include <string>
-
 #include "support/attachment_exchange.h"
 #include "support/host_streams.h"
 
@@ -36,7 +32,7 @@ inline reading read_in_memory(const std::string &bytes, std::size_t piece)
     for (const soap_attachment *list : {ctx->dime.list, ctx->mime.list})
         for (const soap_attachment *a = list; a != nullptr; a = a->next)
             if (a != ctx->mime.root && a->content != nullptr)
-                result.attachments += text(a->id) + "=" + std::string(a->content, a->size) + ";";
+                result.attachments += text_of(a->id) + "=" + std::string(a->content, a->size) + ";";
     return result;
 }
 
@@ -53,7 +49,7 @@ inline reading read_through_callbacks(const std::string &bytes)
             if (a == ctx->mime.root || a->content == nullptr)
                 continue;
             const auto *const stream = host.find(a->content);
-            result.attachments += text(a->id) + "=" +
+            result.attachments += text_of(a->id) + "=" +
                                   (stream == nullptr ? std::string(a->content, a->size) : stream->data) + ";";
         }
     return result;

@@ -4,12 +4,12 @@
 // an empty list means that the peer closes.
 #pragma once
 
-#include <algorithm>
-#include <cstring>
-#include <deque>
-#include <string>
+#include <zuv_client_pro/ProfileSoapBindingProxy.h>
+#include <zuv_client_pro/protocol.h>
+#include <zuv_client_pro/protocolProfile.h>
+#include <zuv_client_pro/type_ids.h>
 
-#include <zuv_client_pro/soap_log.h>
+#include "support/library.h"
 
 constexpr int CALL_WIRE_SOCKET = 900; // never opened, never closed
 

@@ -1,13 +1,7 @@
 // host_streams.h - a host that gives and takes attachments through its callbacks, for DIME and MIME alike.
 #pragma once
 
-#include <algorithm>
-#include <cstring>
-#include <deque>
-#include <string>
-#include <utility>
-
-#include <zuv_client_pro/soap_attachment.h>
+#include "support/library.h"
 
 // A stream with its bytes. Its address is the handle of an attachment to send.
 struct host_stream {

@@ -4,12 +4,10 @@
 
 #include <atomic>
 #include <chrono>
-#include <string>
-
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
 #include <zuv_client_pro/protocol.h>
-#include <zuv_client_pro/soap_log.h>
 
+#include "support/library.h"
 #include "support/scripted_server.h"
 
 namespace scripted {

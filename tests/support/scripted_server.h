@@ -4,10 +4,7 @@
 #pragma once
 
 #include <atomic>
-#include <cstdio>
-#include <functional>
 #include <netinet/tcp.h>
-#include <string>
 
 #include "support/tls_peer.h"
 

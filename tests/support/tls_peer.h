@@ -3,15 +3,8 @@
 #pragma once
 
 #include <csignal>
-#include <functional>
-#include <memory>
 #include <netinet/tcp.h>
-#include <string>
-
-#include <gtest/gtest.h>
 #include <openssl/ssl.h>
-#include <zuv_client_pro/soap_tcp.h>
-#include <zuv_client_pro/soap_tls.h>
 
 #include "support/certificates.h"
 #include "support/loopback.h"

@@ -4,15 +4,7 @@
 // through a filter, and demands the same bytes of all.
 #pragma once
 
-#include <functional>
-#include <memory>
-#include <string>
-
-#include <gtest/gtest.h>
-
-#include <zuv_client_pro/soap_io.h>
-#include <zuv_client_pro/soap_log.h>
-#include <zuv_client_pro/soap_xml.h>
+#include "support/testing.h"
 
 namespace writer_fixture {
 

@@ -1,9 +1,4 @@
 // The samples of tests/samples: read, cut and changed; records whose lengths lie.
-#include <filesystem>
-#include <fstream>
-#include <iterator>
-#include <utility>
-
 #include "support/annotated_bytes.h"
 #include "support/attachment_checks.h"
 #include "support/dime_bytes.h"

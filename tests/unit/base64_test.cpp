@@ -1,16 +1,4 @@
 // base64_test.cpp - base64 and hexadecimal: whole texts, content of a message, both compared with Python.
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_primitive.h>
-#include <zuv_client_pro/soap_xml.h>
-
-#include <cstring>
-#include <random>
-#include <string>
-#include <vector>
-
-#include <gtest/gtest.h>
-
 #include "support/memory_wire.h"
 #include "support/python_batch.h"
 

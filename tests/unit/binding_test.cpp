@@ -1,8 +1,6 @@
 // binding_test.cpp - the rules of data classes, on documents read from memory and objects written to it.
 //
 // Elsewhere: order and number of members, words and values that are refused, in every class (tests/foreign).
-#include <gtest/gtest.h>
-
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
 #include <zuv_client_pro/protocol.h>
 #include <zuv_client_pro/protocolHTTP.h>
@@ -10,14 +8,10 @@
 #include <zuv_client_pro/protocolProblemReport.h>
 #include <zuv_client_pro/protocolProfile.h>
 #include <zuv_client_pro/protocolUpdateOrder.h>
-#include <zuv_client_pro/soap_binary.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_registry.h>
-#include <zuv_client_pro/soap_xml.h>
 #include <zuv_client_pro/type_ids.h>
 
 #include "support/memory_wire.h"
+#include "support/testing.h"
 
 namespace {
 

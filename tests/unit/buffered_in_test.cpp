@@ -1,14 +1,5 @@
 // How a message comes in: its start recognised, chunks and compression undone, its end proven, hostile bytes
 // refused.
-#include <cstdio>
-#include <string>
-
-#include <gtest/gtest.h>
-
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_io.h>
-
 #include "support/deflated.h"
 #include "support/memory_wire.h"
 

@@ -1,17 +1,7 @@
 // call_allocation_test.cpp - every allocation of a call refused once: a code comes back, and the next call
 // works.
-#include <cstdlib>
-#include <vector>
-
-#include <gtest/gtest.h>
-
-#include <zuv_client_pro/ProfileSoapBindingProxy.h>
-#include <zuv_client_pro/protocol.h>
-#include <zuv_client_pro/protocolProfile.h>
-#include <zuv_client_pro/soap_error.h>
-
 #include "support/call_wire.h"
-#include "support/failing_malloc.h"
+#include "support/testing.h"
 
 namespace {
 

@@ -1,19 +1,7 @@
 // call_cycle_test.cpp - a call from its endpoint to its release: where it goes, how it ends, what it leaves
 // behind.
-#include <gtest/gtest.h>
-
-#include <sstream>
-#include <tuple>
-
-#include <zuv_client_pro/ProfileSoapBindingProxy.h>
-#include <zuv_client_pro/protocol.h>
-#include <zuv_client_pro/protocolProfile.h>
-#include <zuv_client_pro/soap_attachment.h>
-#include <zuv_client_pro/soap_envelope.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/type_ids.h>
-
 #include "support/call_wire.h"
+#include "support/testing.h"
 
 namespace {
 

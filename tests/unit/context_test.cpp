@@ -1,30 +1,12 @@
 // context_test.cpp - life of a context: reset, discard, end, copies.
-#include <zuv_client_pro/soap.h>
-
-#include <cstring>
-#include <functional>
-#include <memory>
-#include <string>
-#include <vector>
-
 #include <fcntl.h>
-#include <gtest/gtest.h>
 #include <netinet/in.h>
 #include <openssl/ssl.h>
 #include <sys/socket.h>
 #include <unistd.h>
-
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
-#include <zuv_client_pro/soap_envelope.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_log.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_tcp.h>
-#include <zuv_client_pro/soap_tls.h>
-#include <zuv_client_pro/soap_xml.h>
 
-#include "support/failing_malloc.h"
+#include "support/testing.h"
 
 namespace {
 

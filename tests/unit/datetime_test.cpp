@@ -1,14 +1,4 @@
 // datetime_test.cpp - xsd:dateTime: forms of the text, zones, hostile fields.
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_primitive.h>
-
-#include <cstdlib>
-#include <memory>
-#include <string>
-#include <vector>
-
-#include <gtest/gtest.h>
-
 #include "support/python_batch.h"
 
 namespace {

@@ -1,8 +1,7 @@
 // DIME records on the wire and back, streams, chunks, and lengths that lie.
-#include "support/attachment_checks.h"
-
 #include <malloc.h>
 
+#include "support/attachment_checks.h"
 #include "support/dime_bytes.h"
 #include "support/host_streams.h"
 

@@ -1,18 +1,5 @@
 // error_test.cpp - texts of error codes, faults made from them, and their printed forms.
-#include <zuv_client_pro/soap_envelope.h>
-#include <zuv_client_pro/soap_error.h>
-
-#include <cerrno>
-#include <climits>
-#include <cstdio>
-#include <cstring>
-#include <set>
-#include <sstream>
-#include <string>
-
-#include <gtest/gtest.h>
-
-#include "support/failing_malloc.h"
+#include "support/testing.h"
 
 namespace {
 

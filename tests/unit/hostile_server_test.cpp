@@ -2,20 +2,9 @@
 //
 // Each call ends within its time limits, with its own answer or an error, and never with another's answer.
 // The table of what was found is printed.
-#include <algorithm>
 #include <atomic>
 #include <chrono>
-#include <cstdio>
 #include <future>
-#include <string>
-#include <vector>
-
-#include <gtest/gtest.h>
-#include <zuv_client_pro/ProfileSoapBindingProxy.h>
-#include <zuv_client_pro/protocol.h>
-#include <zuv_client_pro/soap_envelope.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_log.h>
 
 #include "support/scripted_client.h"
 #include "support/socket_calls.h"

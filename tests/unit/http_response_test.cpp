@@ -1,19 +1,7 @@
 // http_response_test.cpp - what a received head does to the context, and the lines and lists that it is made
 // of.
-#include <memory>
-#include <string>
-
-#include <gtest/gtest.h>
-
-#include <zuv_client_pro/soap_envelope.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_xml.h>
-
-#include "support/failing_malloc.h"
-#include "support/http_head.h"
-#include "support/read_wire.h"
+#include "support/memory_wire.h"
+#include "support/testing.h"
 
 namespace {
 

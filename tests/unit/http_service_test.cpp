@@ -1,19 +1,6 @@
 // http_service_test.cpp - the accepting side of HTTP: requests told by their head, and the heads of answers.
-#include <cstring>
-#include <string>
-
-#include <gtest/gtest.h>
-
-#include <zuv_client_pro/soap_envelope.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_tcp.h>
-#include <zuv_client_pro/soap_xml.h>
-
-#include "support/failing_malloc.h"
-#include "support/http_head.h"
-#include "support/read_wire.h"
+#include "support/memory_wire.h"
+#include "support/testing.h"
 
 namespace {
 

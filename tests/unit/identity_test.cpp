@@ -1,23 +1,9 @@
 // identity_test.cpp - the pointer table and the forms of writing, the id table and late resolution.
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_identity.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_xml.h>
-
-#include <algorithm>
 #include <array>
-#include <cstring>
-#include <functional>
-#include <memory>
-#include <random>
-#include <string>
-#include <vector>
-
-#include <gtest/gtest.h>
 
 #include "identity/identity.h"
-#include "support/failing_malloc.h"
 #include "support/memory_wire.h"
+#include "support/testing.h"
 
 namespace {
 

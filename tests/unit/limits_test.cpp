@@ -2,23 +2,7 @@
 //
 // Elsewhere: the limit of open elements (xml_read_test.cpp, binding_test.cpp), heads
 // (http_response_test.cpp).
-#include <cstdio>
-#include <deque>
-#include <filesystem>
-#include <functional>
-#include <string>
-
 #include <malloc.h>
-
-#include <gtest/gtest.h>
-
-#include <zuv_client_pro/ProfileSoapBindingProxy.h>
-#include <zuv_client_pro/protocol.h>
-#include <zuv_client_pro/protocolProfile.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_log.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_xml.h>
 
 #include "support/attachment_exchange.h"
 #include "support/call_wire.h"

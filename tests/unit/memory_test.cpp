@@ -1,16 +1,5 @@
 // memory_test.cpp - tracked allocation, managed blocks, instances, block stacks, growing text.
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_memory.h>
-
-#include <cstdlib>
-#include <cstring>
-#include <memory>
-#include <string>
-#include <vector>
-
-#include <gtest/gtest.h>
-
-#include "support/failing_malloc.h"
+#include "support/testing.h"
 
 namespace {
 

@@ -1,15 +1,8 @@
 // MIME and MTOM messages on the wire and back: delimiters at every place, heads, lazy reading, references.
-#include "support/attachment_checks.h"
-
-#include <algorithm>
 #include <chrono>
 #include <regex>
-#include <set>
 
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_tcp.h>
-
+#include "support/attachment_checks.h"
 #include "support/host_streams.h"
 
 using namespace attachment_exchange;
@@ -163,8 +156,8 @@ TEST(mime_in, reads_part_heads)
     EXPECT_EQ(read.wire->mime.list, read.wire->mime.root);
     std::string summary;
     for (const soap_attachment *p = read.wire->mime.list->next; p != nullptr; p = p->next)
-        summary += text(p->id) + "|" + text(p->location) + "|" + text(p->type) + "|" + text(p->description) +
-                   "|" + std::to_string(p->encoding) + "|" + p->content + "\n";
+        summary += text_of(p->id) + "|" + text_of(p->location) + "|" + text_of(p->type) + "|" +
+                   text_of(p->description) + "|" + std::to_string(p->encoding) + "|" + p->content + "\n";
     EXPECT_EQ(summary, "<1>|there|a/b; c=d|what|" + std::to_string(MIME_BASE64) +
                            "|one\n"
                            "two|(null)|(null)|(null)|0|two\n(null)|(null)|(null)|(null)|0|no head\n"
@@ -357,7 +350,7 @@ TEST(cid, means_an_id_in_several_spellings)
     memory_wire wire;
     for (const auto &c : cases)
         EXPECT_EQ(soap_cid_compare(&wire, c.href, c.id) == 0, c.same)
-            << text(c.href) << " and " << text(c.id);
+            << text_of(c.href) << " and " << text_of(c.id);
 }
 
 TEST(references, are_answered_in_linear_time_in_any_order_and_spelling)
@@ -473,10 +466,10 @@ TEST(values, over_one_buffer_go_out_each_in_its_form)
                 for (std::size_t i = 0; i < 3; ++i) {
                     const value &sent = values[i], &got = read.values[i];
                     EXPECT_EQ(got.bytes(), sent.bytes()) << wire.sent();
-                    EXPECT_EQ(text(got.type), text(sent.type)) << wire.sent();
+                    EXPECT_EQ(text_of(got.type), text_of(sent.type)) << wire.sent();
                     const bool has_id = sent.id != nullptr && *sent.id != '\0';
                     EXPECT_EQ(got.id != nullptr, has_id || sent.type != nullptr) << wire.sent();
-                    EXPECT_TRUE(!has_id || text(sent.id) == got.id) << wire.sent();
+                    EXPECT_TRUE(!has_id || text_of(sent.id) == got.id) << wire.sent();
                     EXPECT_EQ(got.options != nullptr, sent.options != nullptr && (mode & MODE_MTOM) == 0);
                 }
                 attachments.erase(0);

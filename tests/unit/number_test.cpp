@@ -1,22 +1,8 @@
 // number_test.cpp - numbers: what the parsers accept and refuse, texts of values, independence of the locale.
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_primitive.h>
-
 #include <bit>
 #include <clocale>
 #include <cmath>
-#include <cstdlib>
-#include <cstring>
-#include <filesystem>
-#include <fstream>
-#include <memory>
-#include <random>
-#include <string>
-#include <vector>
-
 #include <unistd.h>
-
-#include <gtest/gtest.h>
 
 #include "support/python_batch.h"
 

@@ -1,14 +1,5 @@
 // plugin_test.cpp - the registry of plug-ins: finding, copying, deleting.
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_plugin.h>
-
-#include <string>
-#include <vector>
-
-#include <gtest/gtest.h>
-
-#include "support/failing_malloc.h"
+#include "support/testing.h"
 
 namespace {
 

@@ -4,30 +4,15 @@
 // One row for each operation; the port descriptions tell which there must be. The golden files are composed
 // by hand from the contract, never recorded; a request is read from its file and must go out as it stands
 // there. The rules of the cycle itself: call_cycle_test.cpp.
-#include <gtest/gtest.h>
-
-#include <deque>
-#include <filesystem>
-#include <functional>
-#include <memory>
 #include <regex>
-#include <set>
-
 #include <zuv_client_pro/InventoryReportSoapBindingProxy.h>
 #include <zuv_client_pro/ProblemReportSoapBinding.h>
-#include <zuv_client_pro/ProfileSoapBindingProxy.h>
 #include <zuv_client_pro/StatusReportSoapBindingProxy.h>
 #include <zuv_client_pro/UpdateOrderSoapBindingProxy.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_identity.h>
-#include <zuv_client_pro/soap_io.h>
-#include <zuv_client_pro/soap_tcp.h>
-#include <zuv_client_pro/soap_xml.h>
-#include <zuv_client_pro/type_ids.h>
 
 #include "support/call_wire.h"
 #include "support/golden.h"
+#include "support/testing.h"
 
 namespace {
 

@@ -1,16 +1,6 @@
 // primitive_test.cpp - simple elements, type checks, QNames, tables of names, numbers of arrays.
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_identity.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_primitive.h>
-#include <zuv_client_pro/soap_xml.h>
-
-#include <sstream>
-#include <string>
-
-#include <gtest/gtest.h>
-
 #include "support/memory_wire.h"
+#include "support/testing.h"
 
 namespace {
 

@@ -2,22 +2,11 @@
 // writing.
 //
 // Meaningful in an optimised build only: others are skipped.
-#include <gtest/gtest.h>
-
+#include <pthread.h>
 #include <sys/mman.h>
 
-#include <algorithm>
-#include <cstdio>
-#include <deque>
-#include <functional>
-#include <string>
-
-#include <pthread.h>
-
-#include <zuv_client_pro/ProfileSoapBindingProxy.h>
-#include <zuv_client_pro/protocol.h>
-
 #include "support/call_wire.h"
+#include "support/testing.h"
 
 namespace {
 

@@ -1,20 +1,9 @@
 // tcp_test.cpp - stream sockets of a context against peers on the loopback.
 //
 // Elsewhere: datagrams, proxies and the accepting side (tcp_service_test.cpp).
-#include <cerrno>
-#include <climits>
 #include <fcntl.h>
 #include <netinet/tcp.h>
 #include <optional>
-#include <sstream>
-#include <vector>
-
-#include <gtest/gtest.h>
-#include <zuv_client_pro/soap_attachment.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_tcp.h>
-#include <zuv_client_pro/soap_tls.h>
 
 #include "net/tcp_socket.h"
 #include "support/tcp_client.h"

@@ -1,13 +1,7 @@
 // tls_identity_test.cpp - which certificates are accepted: a table of certificates by flags, under TLS 1.2
 // and 1.3. The outcome of a connection is one letter.
-#include <algorithm>
-#include <regex>
-#include <string>
-
-#include <gtest/gtest.h>
 #include <openssl/ssl.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_tls.h>
+#include <regex>
 
 #include "net/tls_connection.h"
 #include "support/socket_calls.h"

@@ -1,16 +1,7 @@
 // tls_setup_test.cpp - the set-up of TLS, and the library's own server side.
 #include <future>
-#include <string>
-#include <vector>
-
-#include <gtest/gtest.h>
 #include <openssl/err.h>
 #include <openssl/ssl.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_io.h>
-#include <zuv_client_pro/soap_tcp.h>
-#include <zuv_client_pro/soap_tls.h>
 
 #include "support/socket_calls.h"
 #include "support/tls_peer.h"

@@ -2,20 +2,9 @@
 //
 // Elsewhere: who the peer is (tls_identity_test.cpp), set-up and the library's server side
 // (tls_setup_test.cpp).
-#include <cerrno>
 #include <future>
-#include <optional>
-#include <string>
-#include <tuple>
-#include <vector>
-
-#include <gtest/gtest.h>
 #include <openssl/ssl.h>
-#include <zuv_client_pro/soap_attachment.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_tcp.h>
-#include <zuv_client_pro/soap_tls.h>
+#include <optional>
 
 #include "net/tcp_socket.h"
 #include "net/tls_connection.h"

@@ -1,20 +1,9 @@
 // trace_log_test.cpp - the trace files of a context, and certificates taken out of message texts.
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_log.h>
-
-#include <cstring>
-#include <filesystem>
-#include <fstream>
-#include <memory>
-#include <sstream>
-#include <string>
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <gtest/gtest.h>
-
-#include "support/failing_malloc.h"
 #include "support/memory_wire.h"
+#include "support/testing.h"
 
 namespace {
 

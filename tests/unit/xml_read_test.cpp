@@ -1,10 +1,6 @@
 // xml_read_test.cpp - elements on input: tags, attributes, namespaces, the envelope's frame.
 #include "support/reader_input.h"
 
-#include <zuv_client_pro/soap_error.h>
-
-#include "support/failing_malloc.h"
-
 using namespace reader_input;
 
 namespace {

@@ -1,8 +1,5 @@
 // xml_text_test.cpp - text of elements: the forms of strings, raw XML, wide strings, simple values.
 #include "support/reader_input.h"
-
-#include <zuv_client_pro/soap_error.h>
-
 #include "xml/tag_view.h"
 #include "xml/xml_text.h"
 

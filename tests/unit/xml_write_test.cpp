@@ -1,15 +1,6 @@
 // Start tags, text, arrays and the envelope as they stand on the wire, in every output mode.
-#include <cstdio>
-#include <cstdlib>
-#include <fstream>
-#include <random>
-#include <vector>
-
 #include <unistd.h>
 
-#include <zuv_client_pro/soap_error.h>
-
-#include "support/failing_malloc.h"
 #include "support/writer_fixture.h"
 #include "xml/xml_write_fast.h"
 
