@@ -1,4 +1,5 @@
-// library.h - the library's public headers, and what of the standard library most tests work with.
+// library.h - the library's public headers, what of the standard library most tests work with, and small
+// texts.
 //
 // Elsewhere: the classes of the service (their own headers), GoogleTest (testing.h).
 #pragma once
@@ -45,4 +46,28 @@
 inline std::string text_of(const char *text)
 {
     return text != nullptr ? text : "(null)";
+}
+
+// Data as one chunk of a chunked body, and a body in chunks of a size, with the last one.
+inline std::string chunk(const std::string &data)
+{
+    char size[32];
+    std::snprintf(size, sizeof size, "%zX\r\n", data.size());
+    return size + data + "\r\n";
+}
+
+inline std::string in_chunks_of(std::size_t size, const std::string &body)
+{
+    std::string chunks;
+    for (std::size_t at = 0; at < body.size(); at += size)
+        chunks += chunk(body.substr(at, size));
+    return chunks + "0\r\n\r\n";
+}
+
+inline std::string repeated(const std::string &text, std::size_t times)
+{
+    std::string all;
+    for (std::size_t i = 0; i < times; ++i)
+        all += text;
+    return all;
 }

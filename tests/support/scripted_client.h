@@ -12,9 +12,8 @@
 
 namespace scripted {
 
-constexpr int GUARD_S = 10;                    // time limit of transfers where none should be met
-constexpr int OTHERS_ANSWER = 9999;            // in place of a code
-constexpr const char *A_NAME = "call-1000000"; // as long as those of all calls
+constexpr int GUARD_S = 10;         // time limit of transfers where none should be met
+constexpr int OTHERS_ANSWER = 9999; // in place of a code
 
 // A client that keeps its connection and counts those it needed.
 class client {

@@ -89,9 +89,19 @@ TEST(Context, LeavesDerivedClassesAlone)
 TEST(Context, ResetClearsTheMessageAndKeepsTheConnection)
 {
     soap ctx(MODE_KEEP_ALIVE, 0);
-    ctx.buffer_index = 3;
-    ctx.buffer_length = 9;
-    ctx.keep_alive = 1;
+    const auto message = [&ctx] {
+        return std::tuple(ctx.mode, ctx.message_count, ctx.content_length, ctx.dime.chunk_size,
+                          ctx.dime.buffer_length, ctx.nesting_level, ctx.error, ctx.peeked, ctx.null_flag,
+                          ctx.in_cdata, std::string(ctx.endpoint));
+    };
+    const auto connection = [&ctx] {
+        return std::tuple(ctx.buffer_index, ctx.buffer_length, ctx.keep_alive);
+    };
+    soap_reset_call(&ctx);
+    const auto fresh = message();
+    const auto none = connection();
+    std::tie(ctx.buffer_index, ctx.buffer_length, ctx.keep_alive) = std::tuple(3, 9, 1);
+    const auto kept = connection();
     ctx.mode = MODE_CHUNKED;
     ctx.message_count = ctx.content_length = ctx.dime.chunk_size = ctx.dime.buffer_length = 5;
     ctx.nesting_level = 3;
@@ -99,18 +109,11 @@ TEST(Context, ResetClearsTheMessageAndKeepsTheConnection)
     ctx.peeked = ctx.null_flag = ctx.in_cdata = 1;
     std::strcpy(ctx.endpoint, "http://x");
     soap_reset_call(&ctx);
-    EXPECT_EQ(ctx.buffer_index, 3u) << "bytes of a kept connection";
-    EXPECT_EQ(ctx.buffer_length, 9u);
-    EXPECT_EQ(ctx.keep_alive, 1);
-    EXPECT_EQ(ctx.mode, 0u);
-    EXPECT_EQ(ctx.message_count + ctx.content_length + ctx.dime.chunk_size + ctx.dime.buffer_length, 0u);
-    EXPECT_EQ(ctx.nesting_level, 0u);
-    EXPECT_EQ(ctx.error, 0);
-    EXPECT_EQ(ctx.peeked + ctx.null_flag + ctx.in_cdata, 0);
-    EXPECT_STREQ(ctx.endpoint, "");
+    EXPECT_EQ(message(), fresh);
+    EXPECT_EQ(connection(), kept) << "bytes of a kept connection";
     ctx.keep_alive = 0;
     soap_reset_call(&ctx);
-    EXPECT_EQ(ctx.buffer_index + ctx.buffer_length, 0u);
+    EXPECT_EQ(connection(), none);
 }
 
 TEST(Context, TheScratchOfACallIsFreedWhole)
@@ -130,11 +133,8 @@ TEST(Context, TheScratchOfACallIsFreedWhole)
         ctx.local_namespaces[1].received = static_cast<char *>(SOAP_MALLOC(&ctx, 8));
         ctx.encoding_style = ctx.local_namespaces[1].received;
         soap_call_scratch_free(&ctx);
-        EXPECT_EQ(ctx.attribute_list, nullptr);
-        EXPECT_EQ(ctx.mtom_list, nullptr);
-        EXPECT_EQ(ctx.label_buffer, nullptr);
-        EXPECT_EQ(ctx.block_stack, nullptr);
-        EXPECT_EQ(ctx.local_namespaces, nullptr);
+        EXPECT_TRUE(!ctx.attribute_list && !ctx.mtom_list && !ctx.label_buffer && !ctx.block_stack &&
+                    !ctx.local_namespaces);
         EXPECT_STREQ(ctx.encoding_style, "");
     }
     EXPECT_EQ(GetCapturedStderr(), "");

@@ -13,14 +13,6 @@ namespace {
 
 constexpr std::size_t MB = 1U << 20;
 
-std::string repeated(const std::string &text, std::size_t times)
-{
-    std::string all;
-    for (std::size_t i = 0; i < times; ++i)
-        all += text;
-    return all;
-}
-
 // The error is that of a limit, its text names it, and the connection carries no other message.
 void expect_told(soap &ctx, const std::string &limit)
 {
@@ -47,15 +39,8 @@ std::string with_length(const std::string &body, const std::string &more = {})
 
 std::string in_chunks(const std::string &body, const std::string &more = {})
 {
-    std::string message =
-        "HTTP/1.1 200 OK\r\nContent-Type: text/xml\r\n" + more + "Transfer-Encoding: chunked\r\n\r\n";
-    for (std::size_t at = 0; at < body.size(); at += 300) {
-        const std::string part = body.substr(at, 300);
-        char size[32];
-        std::snprintf(size, sizeof size, "%zx\r\n", part.size());
-        message += size + part + "\r\n";
-    }
-    return message + "0\r\n\r\n";
+    return "HTTP/1.1 200 OK\r\nContent-Type: text/xml\r\n" + more + "Transfer-Encoding: chunked\r\n\r\n" +
+           in_chunks_of(300, body);
 }
 
 const std::string GZIP = "Content-Encoding: gzip\r\n";
@@ -192,21 +177,6 @@ std::string answer_with(const std::string &content, const std::string &behind = 
     return answer_envelope("<E:Body><p:getResponse>" + content + "</p:getResponse>" + behind + "</E:Body>");
 }
 
-// A proxy that is answered by one message.
-struct get_call {
-    explicit get_call(const std::string &answer = {}) : proxy(static_cast<int>(MODE_KEEP_ALIVE))
-    {
-        wire.carry(proxy);
-        wire.answers.push_back(answer);
-    }
-    int run() { return proxy.get(&request, response); }
-
-    call_wire wire;
-    ProfileSoapBindingProxy proxy;
-    _protocolProfile__getRequest request;
-    __protocolProfile__getResponse response{};
-};
-
 std::size_t memory_in_use()
 {
     const struct mallinfo2 info = mallinfo2();
@@ -256,8 +226,8 @@ TEST(max_memory, counts_what_a_message_holds)
         std::uint64_t held = 0;
         {
             const std::size_t before = memory_in_use();
-            get_call free_of_limits(answer);
-            ASSERT_EQ(free_of_limits.run(), 0);
+            profile_call free_of_limits;
+            ASSERT_EQ(free_of_limits.get(answer), 0);
             const double used = static_cast<double>(memory_in_use() - before);
             held = static_cast<std::uint64_t>(free_of_limits.proxy.memory_held);
             std::printf("%-25s %9zu bytes of XML, %9.0f bytes in use, counted %4.2f times\n", row.content,
@@ -268,10 +238,10 @@ TEST(max_memory, counts_what_a_message_holds)
             }
         }
         for (const bool enough : {true, false}) {
-            get_call limited(answer);
+            profile_call limited;
             const std::uint64_t limit = enough ? held + row.passing : held - 1;
             limited.proxy.max_memory = limit;
-            EXPECT_EQ(limited.run(), enough ? 0 : SOAP_LENGTH);
+            EXPECT_EQ(limited.get(answer), enough ? 0 : SOAP_LENGTH);
             EXPECT_EQ(limited.wire.closed, enough ? 0 : 1);
             if (!enough)
                 expect_told(limited.proxy, "max_memory" + more_than(limit));
@@ -283,35 +253,31 @@ TEST(max_memory, counts_what_a_message_holds)
 TEST(max_memory, is_a_messages_own)
 {
     const std::string answer = with_length(answer_with(repeated("<p:profile/>", 1000)));
-    get_call calls(answer);
-    ASSERT_EQ(calls.run(), 0);
+    profile_call calls;
+    ASSERT_EQ(calls.get(answer), 0);
     calls.proxy.max_memory = static_cast<std::uint64_t>(calls.proxy.memory_held);
-    for (int i = 0; i < 3; ++i) {
-        calls.wire.answers.push_back(answer);
-        EXPECT_EQ(calls.run(), 0) << i;
-    }
+    for (int i = 0; i < 3; ++i)
+        EXPECT_EQ(calls.get(answer), 0) << i;
     EXPECT_NE(soap_block_alloc(&calls.proxy, 4 * MB), nullptr) << "outside of a message";
     calls.proxy.destroy();
-    calls.wire.answers.push_back(answer);
-    EXPECT_EQ(calls.run(), 0);
+    EXPECT_EQ(calls.get(answer), 0);
 }
 
 TEST(max_memory, stops_a_small_answer_that_grows)
 {
     const std::string bomb = gzipped(answer_with(repeated("<p:profile/>", 1000000)));
-    const std::string answer = with_length(bomb, GZIP);
-    get_call call(answer);
+    profile_call call;
     call.proxy.max_memory = 8 * MB;
     const std::size_t before = memory_in_use();
-    EXPECT_EQ(call.run(), SOAP_LENGTH);
+    EXPECT_EQ(call.get(with_length(bomb, GZIP)), SOAP_LENGTH);
     expect_told(call.proxy, "max_memory" + more_than(8 * MB));
     if (KNOWS_MEMORY_IN_USE) {
         EXPECT_LT(memory_in_use() - before, 20 * MB);
     }
     EXPECT_EQ(call.wire.closed, 1);
-    call.wire.answers = {with_length(answer_with(""))};
+    call.wire.answers.clear();
     call.proxy.destroy();
-    EXPECT_EQ(call.run(), 0) << "the next call";
+    EXPECT_EQ(call.get(with_length(answer_with(""))), 0) << "the next call";
 }
 
 TEST(max_memory, bounds_a_stored_message)
@@ -352,9 +318,9 @@ TEST(copies, by_references_and_qnames_are_bounded_by_the_message)
     for (const auto &row : rows) {
         for (const std::size_t times : {10U, 300U}) {
             SCOPED_TRACE(std::string(row.rule) + " " + std::to_string(times));
-            get_call call(with_length(row.answer(times)));
+            profile_call call;
             const bool within = times == 10;
-            EXPECT_EQ(call.run(), within ? row.usual : SOAP_LENGTH);
+            EXPECT_EQ(call.get(with_length(row.answer(times))), within ? row.usual : SOAP_LENGTH);
             EXPECT_LT(call.proxy.memory_held, static_cast<std::int64_t>(4 * MB));
             if (within)
                 continue;
@@ -374,20 +340,18 @@ TEST(max_message, ends_the_writing_of_a_graph_that_is_no_tree)
     for (const std::uint32_t mode : {MODE_BUFFERED, MODE_CHUNKED, MODE_STORE}) {
         SCOPED_TRACE(mode);
         const std::string answer = with_length(answer_with(""));
-        get_call calls(answer);
-        ASSERT_EQ(calls.run(), 0);
+        profile_call calls;
+        ASSERT_EQ(calls.get(answer), 0);
         EXPECT_EQ(calls.wire.closed, 0);
         calls.wire.sent.clear();
         calls.proxy.output_mode = mode | MODE_KEEP_ALIVE;
         calls.proxy.max_message = MB;
-        __protocolProfile__setResponse response{};
-        EXPECT_EQ(calls.proxy.set(&levels[0], response), SOAP_LENGTH);
+        EXPECT_EQ(calls.proxy.set(&levels[0], calls.held), SOAP_LENGTH);
         expect_told(calls.proxy, "max_message" + more_than(MB));
         EXPECT_LE(calls.wire.sent.size(), mode == MODE_CHUNKED ? MB + MB / 16 : 0);
         EXPECT_EQ(calls.wire.closed, 1);
         calls.proxy.output_mode = MODE_KEEP_ALIVE;
-        calls.wire.answers = {answer};
-        EXPECT_EQ(calls.run(), 0) << "the next call";
+        EXPECT_EQ(calls.get(answer), 0) << "the next call";
         EXPECT_EQ(calls.wire.opened, 2);
     }
 }

@@ -321,29 +321,19 @@ TEST_F(Memory, SizesBeyondTheAddressSpaceAreOutOfMemory)
 
 TEST(MemoryExhausted, TextsAndGatheredBlocksGiveAnErrorAndLeaveNothing)
 {
-    bool (*const runs[])(soap * ctx) = {
-        // each says whether it failed
-        [](soap *ctx) { return soap_wide_string_dup(ctx, U"abc") == nullptr; },
-        [](soap *ctx) { return soap_text_buffer_put(ctx, "abc", 3) != 0; },
-        [](soap *ctx) {
-            return soap_block_stack_push(ctx) == nullptr ||
-                   soap_block_stack_grow(ctx, nullptr, 8) == nullptr ||
-                   soap_block_stack_save(ctx, nullptr, nullptr, 0) == nullptr;
+    int (*const runs[])(soap & ctx) = {
+        [](soap &ctx) { return soap_wide_string_dup(&ctx, U"abc") == nullptr ? ctx.error : 0; },
+        [](soap &ctx) { return soap_text_buffer_put(&ctx, "abc", 3); },
+        [](soap &ctx) {
+            const bool saved = soap_block_stack_push(&ctx) && soap_block_stack_grow(&ctx, nullptr, 8) &&
+                               soap_block_stack_save(&ctx, nullptr, nullptr, 0);
+            return saved ? 0 : ctx.error;
         }};
-    for (const auto run : runs) {
-        std::unique_ptr<soap> ctx = std::make_unique<soap>();
-        bool failed = false;
-        CaptureStderr();
-        const std::size_t refusals = failing_malloc::at_each_allocation(
-            failing_malloc::refuse::one, [&] { failed = run(ctx.get()); },
-            [&](bool refused) {
-                EXPECT_EQ(failed, refused);
-                EXPECT_EQ(ctx->error, refused ? SOAP_OUT_OF_MEMORY : 0);
-                ctx = std::make_unique<soap>();
-            });
-        EXPECT_GT(refusals, 0u);
-        EXPECT_EQ(GetCapturedStderr(), "");
-    }
+    CaptureStderr();
+    for (const auto run : runs)
+        expect_out_of_memory_at_each_allocation(
+            1, [] { return std::make_unique<soap>(); }, run);
+    EXPECT_EQ(GetCapturedStderr(), "");
 }
 
 TEST(MemoryExhausted, AMoveFailsWholeOrNotAtAll)

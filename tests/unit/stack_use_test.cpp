@@ -38,31 +38,13 @@ std::size_t stack_used_by(std::function<void()> work)
     return static_cast<std::size_t>(end - deepest);
 }
 
-std::string repeated(const std::string &text, std::size_t times)
-{
-    std::string all;
-    for (std::size_t i = 0; i < times; ++i)
-        all += text;
-    return all;
-}
-
-std::string answer(const std::string &content)
-{
-    return http_answer("<E:Envelope xmlns:E=\"http://schemas.xmlsoap.org/soap/envelope/\""
-                       " xmlns:p=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0/Profile\""
-                       " xmlns:c=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0\"><E:Body><p:setResponse>" +
-                       content + "</p:setResponse></E:Body></E:Envelope>");
-}
-
 // Sends the request, which is answered by `content`.
 int set(protocolProfile__ProfileContent &request, const std::string &content)
 {
-    call_wire wire;
-    ProfileSoapBindingProxy proxy;
-    wire.carry(proxy);
-    wire.answers.push_back(answer(content));
-    __protocolProfile__setResponse response{};
-    return proxy.set(&request, response);
+    profile_call call(0);
+    call.wire.answers = {
+        http_answer(answer_envelope("<E:Body><p:setResponse>" + content + "</p:setResponse></E:Body>"))};
+    return call.proxy.set(&request, call.held);
 }
 
 // A level more costs no more than the limit.
