@@ -54,8 +54,8 @@ inline int write_message(soap *ctx, const std::deque<value> &values)
     return soap_envelope_out_end(ctx);
 }
 
-// Both passes of a message without HTTP. 0, the context's error, or LENGTH_DIFFERS.
-inline int send(memory_wire &wire, const std::deque<value> &values, bool length_is_known = true)
+// The marking pass of a message, and the counting pass if there is one.
+inline int prepare(memory_wire &wire, const std::deque<value> &values, bool &counts)
 {
     wire.encoding_style = nullptr;
     soap_reset_call(&wire);
@@ -63,10 +63,17 @@ inline int send(memory_wire &wire, const std::deque<value> &values, bool length_
         v.soap_serialize(&wire);
     if (soap_count_begin(&wire) != 0)
         return wire.error;
-    const bool counts = (wire.mode & MODE_COUNTING) != 0;
+    counts = (wire.mode & MODE_COUNTING) != 0;
     if (counts && write_message(&wire, values) != 0)
         return wire.error;
-    if (soap_count_end(&wire) != 0)
+    return soap_count_end(&wire);
+}
+
+// Both passes of a message without HTTP. 0, the context's error, or LENGTH_DIFFERS.
+inline int send(memory_wire &wire, const std::deque<value> &values, bool length_is_known = true)
+{
+    bool counts = false;
+    if (prepare(wire, values, counts) != 0)
         return wire.error;
     const std::uint64_t length = soap_message_length(&wire);
     if (soap_send_begin(&wire) != 0 || write_message(&wire, values) != 0 || soap_send_finish(&wire) != 0)
@@ -78,13 +85,8 @@ inline int send(memory_wire &wire, const std::deque<value> &values, bool length_
 inline int send_request(memory_wire &wire, const std::deque<value> &values)
 {
     wire.on_open = [](soap *, const char *, const char *, int) { return -1; };
-    wire.encoding_style = nullptr;
-    soap_reset_call(&wire);
-    for (const value &v : values)
-        v.soap_serialize(&wire);
-    if (soap_count_begin(&wire) != 0 ||
-        ((wire.mode & MODE_COUNTING) != 0 && write_message(&wire, values) != 0) ||
-        soap_count_end(&wire) != 0 || soap_server_connect(&wire, "http://host/path", "") != 0 ||
+    bool counts = false;
+    if (prepare(wire, values, counts) != 0 || soap_server_connect(&wire, "http://host/path", "") != 0 ||
         write_message(&wire, values) != 0)
         return wire.error;
     return soap_send_finish(&wire);

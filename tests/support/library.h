@@ -64,7 +64,7 @@ inline std::string in_chunks_of(std::size_t size, const std::string &body)
     return chunks + "0\r\n\r\n";
 }
 
-inline std::string repeated(const std::string &text, std::size_t times)
+inline std::string repeat_text(const std::string &text, std::size_t times)
 {
     std::string all;
     for (std::size_t i = 0; i < times; ++i)

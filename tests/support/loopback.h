@@ -65,7 +65,7 @@ private:
     int socket_;
 };
 
-// A server thread: `serve` gets each client's socket in turn, which is closed after it. Declare it ahead of
+// A server thread: `serve` gets each client's socket in turn, which is closed after it. Declare it before
 // the context that talks to it. Its end waits for the client that is being served.
 class peer {
 public:

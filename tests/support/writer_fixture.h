@@ -36,7 +36,7 @@ inline int pass_on(soap *, const char **, std::size_t *)
     return 0;
 }
 
-enum class start { document, inside }; // ahead of the first start tag of a message, or past it
+enum class start { document, inside }; // before the first start tag of a message, or past it
 
 using calls = std::function<void(soap *)>;
 

@@ -19,7 +19,7 @@ std::string sample(const std::string &name)
 struct sample_case {
     const char *name;
     const char *summary;
-    const char *end; // the message ends with this text; anything behind it is nobody's
+    const char *end; // the message ends with this text; anything after it is nobody's
 };
 
 // What is announced as encoded is handed out as it came: its receiver knows the encoding from the record.

@@ -361,9 +361,9 @@ TEST_F(Binding, a_vector_named_by_a_reference_is_filled_through_its_id)
 
 TEST_F(Binding, nesting_stops_at_the_limit_of_open_elements)
 {
-    EXPECT_EQ(nullptr,
-              read<protocolProfile__ProfileContent>("<p>" + repeated("<protocolProfile:profile>", 5000) +
-                                                    repeated("</protocolProfile:profile>", 5000) + "</p>"));
+    EXPECT_EQ(nullptr, read<protocolProfile__ProfileContent>(
+                           "<p>" + repeat_text("<protocolProfile:profile>", 5000) +
+                           repeat_text("</protocolProfile:profile>", 5000) + "</p>"));
     EXPECT_EQ(SOAP_LENGTH, ctx.error);
 }
 

@@ -242,7 +242,7 @@ TEST(buffered_in, lines_between_chunks_are_bounded)
               (outcome{0, "<a/>", SOAP_HEADER_LINE, false}));
     EXPECT_EQ(read_on_kept_connection(first + "4;" + endless.substr(0, 8000) + "\r\n<b/>\r\n0\r\n\r\n"),
               (outcome{0, "<a/><b/>", 0, true}));
-    kept_wire wire(first + "0\r\n" + repeated("A: b\r\n", 100000), [](std::size_t) { return 1000; });
+    kept_wire wire(first + "0\r\n" + repeat_text("A: b\r\n", 100000), [](std::size_t) { return 1000; });
     EXPECT_EQ(read_message(wire), (outcome{0, "<a/>", 0, false}));
     EXPECT_LT(wire.given, 20000U);
 }
@@ -388,7 +388,7 @@ int growing_filter(soap *ctx, char *buffer, std::size_t *length, std::size_t siz
     return 0;
 }
 
-// A head reader behind which the filter starts.
+// A head reader after which the filter starts.
 int filtering_head(soap *ctx)
 {
     const int result = http_read_head(ctx);

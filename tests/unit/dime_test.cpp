@@ -48,17 +48,6 @@ TEST(dime_out, of_a_message_alone_is_one_record)
     EXPECT_EQ(wire.sent().substr(0, 2), "\x0E\x20");
 }
 
-TEST(dime_out, sends_a_value_met_twice_once)
-{
-    const std::string bytes = "shared";
-    memory_wire wire(0, SENDING);
-    const value v = make_value(bytes, "cid:x", "a/b");
-    ASSERT_EQ(send(wire, {v, v}), 0);
-    const std::string sent = wire.sent();
-    EXPECT_EQ(sent.find("shared"), sent.rfind("shared"));
-    EXPECT_EQ(reception(sent).summary(), "[cid:x a/b shared][cid:x a/b shared]");
-}
-
 TEST(dime_out, cuts_texts_and_refuses_data_that_no_header_can_tell)
 {
     std::string long_text(70000, 't');

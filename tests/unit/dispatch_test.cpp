@@ -67,7 +67,7 @@ protected:
         return ctx.sent();
     }
 
-    // Puts the reader behind the start tag of an element that declares what `content` needs, and which
+    // Puts the reader after the start tag of an element that declares what `content` needs, and which
     // doesn't end if the content is cut.
     void receive(const std::string &content, bool cut = false)
     {

@@ -37,7 +37,7 @@ TEST(tag_match, compares_without_case_up_to_a_quote_with_dash_and_star)
 
 TEST(tag_match, takes_quadratic_work_at_most)
 {
-    EXPECT_NE(soap_tag_match(repeated("a", 8000).c_str(), (repeated("*a", 200) + "*b").c_str()), 0);
+    EXPECT_NE(soap_tag_match(repeat_text("a", 8000).c_str(), (repeat_text("*a", 200) + "*b").c_str()), 0);
 }
 
 TEST(attr_value, finds_items_of_lists)
@@ -210,7 +210,7 @@ TEST(response_head, takes_each_header_over)
     }
 }
 
-// What stands behind the buffer of their text stays as it was.
+// What stands after the buffer of their text stays as it was.
 TEST(request_head, cuts_credentials_at_the_end_of_their_buffer)
 {
     for (const std::size_t groups : {340U, 341U, 342U, 2000U}) {
@@ -337,7 +337,7 @@ TEST(response_head, decides_by_the_status)
 
 TEST(response_head, bounds_an_error_body)
 {
-    const std::string body = repeated(chunk(std::string(65536, 'e')), 40);
+    const std::string body = repeat_text(chunk(std::string(65536, 'e')), 40);
     read_wire wire("HTTP/1.1 502 Bad\r\nTransfer-Encoding: chunked\r\n\r\n" + body);
     EXPECT_EQ(wire.result, 502);
     EXPECT_EQ(text_of(soap_fault_detail_value(&wire)).size(), 1024U * 1024U);
@@ -380,7 +380,7 @@ TEST(response_head, drops_interim_heads_up_to_a_limit)
             "\r\nContent-Length: 7\r\nContent-Type: multipart/related; boundary=b\r\nContent-Encoding: "
             "gzip\r\n"
             "Transfer-Encoding: chunked\r\nConnection: close\r\nLocation: http://elsewhere/\r\n\r\n";
-        const std::string hundred = repeated(interim, 100);
+        const std::string hundred = repeat_text(interim, 100);
         for (const std::string &heads : {interim, hundred}) {
             read_wire wire(heads + last, MODE_KEEP_ALIVE);
             EXPECT_EQ(wire.result, 0) << status;
@@ -397,7 +397,7 @@ TEST(response_head, drops_interim_heads_up_to_a_limit)
 TEST(response_head, has_limits)
 {
     const auto lines = [](std::size_t count, std::size_t length) {
-        return OK_HEAD + repeated("X: " + std::string(length, 'x') + "\r\n", count) + "\r\n<a/>";
+        return OK_HEAD + repeat_text("X: " + std::string(length, 'x') + "\r\n", count) + "\r\n<a/>";
     };
     EXPECT_EQ(read_wire(lines(1024, 1)).result, 0);
     EXPECT_EQ(read_wire(lines(1025, 1)).result, SOAP_HEADER_LINE);

@@ -62,7 +62,7 @@ TEST(request, of_put_leads_to_one_more_head_and_not_to_any_number)
     accepting_wire wire;
     const std::string put = "PUT /a HTTP/1.1\r\n\r\n";
     EXPECT_EQ(wire.request(put + "POST /b HTTP/1.1\r\n\r\n<a/>"), SOAP_STOP);
-    EXPECT_EQ(wire.request(repeated(put, 100000)), SOAP_PUT_METHOD);
+    EXPECT_EQ(wire.request(repeat_text(put, 100000)), SOAP_PUT_METHOD);
 }
 
 TEST(request, brings_its_credentials_and_a_clients_own_answer_does_not)

@@ -206,18 +206,18 @@ TEST(max_memory, counts_what_a_message_holds)
         std::string xml;
         std::uint64_t passing = 0; // bytes that were held for some time only
     } rows[] = {
-        {"objects", repeated("<p:profile/>", 5000)},
-        {"texts", repeated("<p:thisURI>urn:a-text-that-is-too-long-to-stand-in-place</p:thisURI>", 20000)},
-        {"short texts", repeated("<p:thisURI>u</p:thisURI>", 20000)},
+        {"objects", repeat_text("<p:profile/>", 5000)},
+        {"texts", repeat_text("<p:thisURI>urn:a-text-that-is-too-long-to-stand-in-place</p:thisURI>", 20000)},
+        {"short texts", repeat_text("<p:thisURI>u</p:thisURI>", 20000)},
         {"a long text", "<c:identity><c:name>" + std::string(3000000, 'n') + "</c:name></c:identity>"},
         {"a text with references",
-         "<c:identity><c:name>" + repeated("caf&#xE9; ", 300000) + "</c:name></c:identity>"},
+         "<c:identity><c:name>" + repeat_text("caf&#xE9; ", 300000) + "</c:name></c:identity>"},
         {"bytes",
          "<c:credentials><c:certificate>" + std::string(4000000, 'A') + "</c:certificate></c:credentials>"},
         {"ids", numbered("<c:contact id=\"c", "\"/>", 5000)},
-        {"references", "<c:contact id=\"c\"/>" + repeated("<c:contact href=\"#c\"/>", 50000)},
+        {"references", "<c:contact id=\"c\"/>" + repeat_text("<c:contact href=\"#c\"/>", 50000)},
         {"references ahead",
-         repeated("<p:thisURI href=\"#u\"/>", 50000) + "<p:thisURI id=\"u\">u</p:thisURI>", 2 * MB},
+         repeat_text("<p:thisURI href=\"#u\"/>", 50000) + "<p:thisURI id=\"u\">u</p:thisURI>", 2 * MB},
         {"attribute values", numbered("<p:profile a", "=\"" + std::string(20000, 'v') + "\"/>", 200)},
     };
     for (const auto &row : rows) {
@@ -252,7 +252,7 @@ TEST(max_memory, counts_what_a_message_holds)
 // What a host holds from earlier answers is its own affair.
 TEST(max_memory, is_a_messages_own)
 {
-    const std::string answer = with_length(answer_with(repeated("<p:profile/>", 1000)));
+    const std::string answer = with_length(answer_with(repeat_text("<p:profile/>", 1000)));
     profile_call calls;
     ASSERT_EQ(calls.get(answer), 0);
     calls.proxy.max_memory = static_cast<std::uint64_t>(calls.proxy.memory_held);
@@ -265,7 +265,7 @@ TEST(max_memory, is_a_messages_own)
 
 TEST(max_memory, stops_a_small_answer_that_grows)
 {
-    const std::string bomb = gzipped(answer_with(repeated("<p:profile/>", 1000000)));
+    const std::string bomb = gzipped(answer_with(repeat_text("<p:profile/>", 1000000)));
     profile_call call;
     call.proxy.max_memory = 8 * MB;
     const std::size_t before = memory_in_use();
@@ -299,16 +299,16 @@ TEST(copies, by_references_and_qnames_are_bounded_by_the_message)
     const std::string big(100000, 'u');
     const auto with_texts = [&](std::size_t times) {
         return answer_with("<p:thisURI id=\"u\">" + big + "</p:thisURI>" +
-                           repeated("<p:thisURI href=\"#u\"/>", times));
+                           repeat_text("<p:thisURI href=\"#u\"/>", times));
     };
     const auto with_objects = [&](std::size_t times) {
         return answer_with("", "<p:ProfileContent id=\"o\"><p:thisURI>" + big +
                                    "</p:thisURI></p:ProfileContent>" +
-                                   repeated("<p:ProfileContent href=\"#o\"/>", times));
+                                   repeat_text("<p:ProfileContent href=\"#o\"/>", times));
     };
     const auto with_qnames = [&](std::size_t times) {
         return answer_envelope("<E:Body><E:Fault xmlns:q=\"" + big + "\"><faultcode>" +
-                               repeated("q:x ", times) + "</faultcode></E:Fault></E:Body>");
+                               repeat_text("q:x ", times) + "</faultcode></E:Fault></E:Body>");
     };
     const struct {
         const char *rule;
@@ -426,7 +426,7 @@ TEST(endless, input_ends_by_a_limit_and_so_does_its_trace)
                   std::string::npos)
             << text;
         EXPECT_EQ(peer.closed, 1);
-        // Blanks ahead of a head, the head, framing: 1 MB each, and eight bytes of framing for one of XML.
+        // Blanks before a head, the head, framing: 1 MB each, and eight bytes of framing for one of XML.
         EXPECT_LE(peer.given, 3 * MB + 8 * proxy.max_message);
         EXPECT_LE(std::filesystem::file_size(trace), peer.given + 2 * proxy.max_message);
         std::printf("%-32s %8zu bytes, trace of %8zu\n", row.name, peer.given,

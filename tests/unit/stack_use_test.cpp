@@ -73,8 +73,8 @@ TEST(StackUse, of_reading_one_level)
     for (const auto &c : cases)
         expect_bounded(c.rule, [&c](std::size_t levels) {
             protocolProfile__ProfileContent request;
-            EXPECT_EQ(0, set(request, c.around_begin + repeated(c.begin, levels) + repeated(c.end, levels) +
-                                          c.around_end))
+            EXPECT_EQ(0, set(request, c.around_begin + repeat_text(c.begin, levels) +
+                                          repeat_text(c.end, levels) + c.around_end))
                 << c.rule;
         });
 }

@@ -180,7 +180,7 @@ TEST_F(tls_identity, is_decided_by_certificate_and_flags)
 TEST_F(tls_identity, the_reason_of_a_refusal_is_short_and_harmless_text)
 {
     const std::string label(60, 'x'), evil = "<a>&\r\n\x01\xC3\xA4'\"";
-    const std::string names = "DNS:" + label + repeated(",DNS:" + label, 100);
+    const std::string names = "DNS:" + label + repeat_text(",DNS:" + label, 100);
     for (const subject &who : {subject{evil, ""}, subject{evil, names}, subject{evil, "", -2 * DAY, -DAY}}) {
         tls_peer server(server_for(who), echo);
         context ctx;

@@ -75,7 +75,7 @@ TEST(XmlRead, elements_and_attributes_come_out_as_they_stand)
         {"no name but a value", "<a \"1\"/>", "a \"1\"; !-1"},
     };
     expect_readings(rows, tree);
-    // With bytes to spare behind them, tags are read in blocks where they aren't cut.
+    // With bytes to spare after them, tags are read in blocks where they aren't cut.
     for (const reading &row : rows)
         every_reading(row.document + "<!--" + std::string(80, '.') + "-->", row.mode, tree);
 }
@@ -159,7 +159,7 @@ TEST(XmlRead, a_held_tag_answers_every_question_until_it_is_consumed)
 TEST(XmlRead, names_are_compared_by_namespace_row)
 {
     const struct {
-        // As sent, behind declarations of p: urn:one, q: urn:two, u: unknown, default: urn:one.
+        // As sent, after declarations of p: urn:one, q: urn:two, u: unknown, default: urn:one.
         const char *tag;
         const char *asked;
         int expected;
@@ -362,11 +362,11 @@ TEST(XmlRead, unknown_elements_are_dropped_whole)
 
 TEST(XmlRead, skipping_deep_content_takes_no_stack_and_no_memory)
 {
-    const std::string document = "<a>" + repeated("<b>", 300000);
+    const std::string document = "<a>" + repeat_text("<b>", 300000);
     reception cut(document);
     cut->max_depth = 0;
     EXPECT_EQ(soap_element_skip(cut.in_root()), SOAP_EOF);
-    reception in(document + repeated("</b>", 300000) + "</a>");
+    reception in(document + repeat_text("</b>", 300000) + "</a>");
     in->max_depth = 0;
     in.in_root();
     const std::size_t before = failing_malloc::allocations();

@@ -145,7 +145,7 @@ TEST(XmlText, strings_hold_what_they_are_said_to_hold_whatever_the_message_is_en
     for (const auto &row : rows)
         for (const bool deep : {false, true}) { // past the end of a search's stride, and of its window
             SCOPED_TRACE(row.rule);
-            const auto umlauts = [deep](const char *one) { return repeated(one, deep ? 400 : 0); };
+            const auto umlauts = [deep](const char *one) { return repeat_text(one, deep ? 400 : 0); };
             const std::string before = umlauts(row.declaration.empty() ? "\xC3\xBC" : "\xFC"),
                               latin = umlauts("\xFC") + row.latin, utf8 = umlauts("\xC3\xBC") + row.utf8;
             const auto read = [&](std::uint32_t mode) {

@@ -238,7 +238,7 @@ TEST(xml_write, code_points_take_one_to_six_bytes)
 TEST(xml_write, wide_text_is_escaped_like_byte_text)
 {
     const std::u32string text = U"a<\n\t\"&>\u00E9\u20AC\U0001F600" + std::u32string(300, U'\u00E9');
-    const std::string end = "\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80" + repeated("\xC3\xA9", 300);
+    const std::string end = "\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80" + repeat_text("\xC3\xA9", 300);
     EXPECT_EQ(inside(0, [&](soap *ctx) { soap_wide_text_write(ctx, text.c_str(), 0); }),
               "a&lt;&#xA;\t\"&amp;&gt;" + end);
     EXPECT_EQ(inside(MODE_UTF_STRINGS, [&](soap *ctx) { soap_wide_text_write(ctx, text.c_str(), 1); }),
@@ -767,7 +767,7 @@ static void types_and_arrays(soap *ctx)
         EXPECT_EQ(soap_element_out_end(c, "a:typed"), 0);
         EXPECT_EQ(soap_array_open(c, "a:list", 0, "b:item[2]", nullptr), 0);
         EXPECT_EQ(soap_element_out_end(c, "a:list"), 0);
-        EXPECT_EQ(soap_prefix_use(c, "xsd:value"), 0); // ahead of an element whose text is a name
+        EXPECT_EQ(soap_prefix_use(c, "xsd:value"), 0); // before an element whose text is a name
         element(c, "a:name");
         element(c, "xsd:next");
         EXPECT_EQ(soap_result_out(c, "b:return"), 0);
@@ -795,7 +795,7 @@ TEST(xml_write, canonical_output_is_what_canonicalisation_makes_of_the_plain_for
         SCOPED_TRACE(c.rule);
         std::string bytes = document(MODE_CANONICAL, c.write, c.version);
         if (bytes.ends_with("\r\n"))
-            bytes.resize(bytes.size() - 2); // behind the document element
+            bytes.resize(bytes.size() - 2); // after the document element
         EXPECT_NE(bytes, "");
         EXPECT_EQ(bytes, canonical_form(bytes, "--c14n"));
         if (c.is_exclusive) {
