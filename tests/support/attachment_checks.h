@@ -1,10 +1,8 @@
 // attachment_checks.h - what holds of every message with attachments, however it is framed.
 #pragma once
 
-#include <gtest/gtest.h>
-
 #include "support/attachment_exchange.h"
-#include "support/failing_malloc.h"
+#include "support/testing.h"
 
 namespace attachment_exchange {
 
@@ -40,17 +38,8 @@ inline void expect_survival_of_every_change(const std::string &bytes, std::uint3
 // Each allocation of a good message may fail.
 inline void expect_survival_of_every_refused_allocation(const std::string &bytes)
 {
-    int result = -2;
-    std::unique_ptr<reception> read;
-    const auto fresh = [&] { read = std::make_unique<reception>(bytes); };
-    fresh();
-    const std::size_t refusals = failing_malloc::at_each_allocation(
-        failing_malloc::refuse::one, [&] { result = read->run(); },
-        [&](bool refused) {
-            EXPECT_EQ(result, refused ? SOAP_OUT_OF_MEMORY : 0);
-            fresh();
-        });
-    EXPECT_GT(refusals, 10U);
+    expect_out_of_memory_at_each_allocation(
+        11, [&] { return std::make_unique<reception>(bytes); }, [](reception &read) { return read.run(); });
 }
 
 // Megabytes that look like delimiters go out and come back.

@@ -4,18 +4,6 @@
 // expectations of the tests are in attachment_checks.h.
 #pragma once
 
-#include <cstring>
-#include <deque>
-#include <memory>
-#include <string>
-#include <vector>
-
-#include <zuv_client_pro/soap_attachment.h>
-#include <zuv_client_pro/soap_binary.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_xml.h>
-
 #include "support/memory_wire.h"
 
 namespace attachment_exchange {
@@ -39,11 +27,6 @@ struct value : xsd__base64Binary {
                    : std::string(reinterpret_cast<char *>(content), static_cast<std::size_t>(size));
     }
 };
-
-inline std::string text(const char *text)
-{
-    return text == nullptr ? "(null)" : text;
-}
 
 // A value to send; the texts must live as long as it.
 inline value make_value(const std::string &bytes, const char *id, const char *type,
@@ -71,8 +54,8 @@ inline int write_message(soap *ctx, const std::deque<value> &values)
     return soap_envelope_out_end(ctx);
 }
 
-// Both passes of a message without HTTP. 0, the context's error, or LENGTH_DIFFERS.
-inline int send(memory_wire &wire, const std::deque<value> &values, bool length_is_known = true)
+// The marking pass of a message, and the counting pass if there is one.
+inline int prepare(memory_wire &wire, const std::deque<value> &values, bool &counts)
 {
     wire.encoding_style = nullptr;
     soap_reset_call(&wire);
@@ -80,10 +63,17 @@ inline int send(memory_wire &wire, const std::deque<value> &values, bool length_
         v.soap_serialize(&wire);
     if (soap_count_begin(&wire) != 0)
         return wire.error;
-    const bool counts = (wire.mode & MODE_COUNTING) != 0;
+    counts = (wire.mode & MODE_COUNTING) != 0;
     if (counts && write_message(&wire, values) != 0)
         return wire.error;
-    if (soap_count_end(&wire) != 0)
+    return soap_count_end(&wire);
+}
+
+// Both passes of a message without HTTP. 0, the context's error, or LENGTH_DIFFERS.
+inline int send(memory_wire &wire, const std::deque<value> &values, bool length_is_known = true)
+{
+    bool counts = false;
+    if (prepare(wire, values, counts) != 0)
         return wire.error;
     const std::uint64_t length = soap_message_length(&wire);
     if (soap_send_begin(&wire) != 0 || write_message(&wire, values) != 0 || soap_send_finish(&wire) != 0)
@@ -95,13 +85,8 @@ inline int send(memory_wire &wire, const std::deque<value> &values, bool length_
 inline int send_request(memory_wire &wire, const std::deque<value> &values)
 {
     wire.on_open = [](soap *, const char *, const char *, int) { return -1; };
-    wire.encoding_style = nullptr;
-    soap_reset_call(&wire);
-    for (const value &v : values)
-        v.soap_serialize(&wire);
-    if (soap_count_begin(&wire) != 0 ||
-        ((wire.mode & MODE_COUNTING) != 0 && write_message(&wire, values) != 0) ||
-        soap_count_end(&wire) != 0 || soap_server_connect(&wire, "http://host/path", "") != 0 ||
+    bool counts = false;
+    if (prepare(wire, values, counts) != 0 || soap_server_connect(&wire, "http://host/path", "") != 0 ||
         write_message(&wire, values) != 0)
         return wire.error;
     return soap_send_finish(&wire);
@@ -123,8 +108,7 @@ struct reception {
                        std::size_t piece = 65536)
     {
         wire->input_mode = mode;
-        wire->receive(bytes);
-        wire->piece = [first, piece](std::size_t given) { return given == 0 ? first : piece; };
+        wire->receive(bytes, first, piece);
     }
     int run()
     {
@@ -143,7 +127,7 @@ struct reception {
             return "!" + std::to_string(error);
         std::string all;
         for (const value &v : values)
-            all += "[" + text(v.id) + " " + text(v.type) + " " + v.bytes() + "]";
+            all += "[" + text_of(v.id) + " " + text_of(v.type) + " " + v.bytes() + "]";
         return all;
     }
 

@@ -1,10 +1,6 @@
 // attachment_fuzz.h - what the readers of DIME and MIME are held against for any bytes.
 #pragma once
 
-#include <cstdio>
-#include <cstdlib>
-#include <string>
-
 #include "support/attachment_exchange.h"
 #include "support/host_streams.h"
 
@@ -18,7 +14,7 @@ struct reading {
     bool operator==(const reading &) const = default;
 };
 
-// How much of a broken compressed stream came at once settles whether it is noticed ahead of what is wrong
+// How much of a broken compressed stream came at once settles whether it is noticed before what is wrong
 // with the bytes in front of the break. That something is wrong shows either way.
 inline int outcome(const soap *ctx, int error)
 {
@@ -32,11 +28,11 @@ inline reading read_in_memory(const std::string &bytes, std::size_t piece)
     const int error = read.run();
     reading result = {outcome(ctx, error), {}};
     if (result.error == SOAP_ZLIB_ERROR)
-        return result; // what came ahead of the break may differ as well
+        return result; // what came before the break may differ as well
     for (const soap_attachment *list : {ctx->dime.list, ctx->mime.list})
         for (const soap_attachment *a = list; a != nullptr; a = a->next)
             if (a != ctx->mime.root && a->content != nullptr)
-                result.attachments += text(a->id) + "=" + std::string(a->content, a->size) + ";";
+                result.attachments += text_of(a->id) + "=" + std::string(a->content, a->size) + ";";
     return result;
 }
 
@@ -53,7 +49,7 @@ inline reading read_through_callbacks(const std::string &bytes)
             if (a == ctx->mime.root || a->content == nullptr)
                 continue;
             const auto *const stream = host.find(a->content);
-            result.attachments += text(a->id) + "=" +
+            result.attachments += text_of(a->id) + "=" +
                                   (stream == nullptr ? std::string(a->content, a->size) : stream->data) + ";";
         }
     return result;

@@ -4,12 +4,12 @@
 // an empty list means that the peer closes.
 #pragma once
 
-#include <algorithm>
-#include <cstring>
-#include <deque>
-#include <string>
+#include <zuv_client_pro/ProfileSoapBindingProxy.h>
+#include <zuv_client_pro/protocol.h>
+#include <zuv_client_pro/protocolProfile.h>
+#include <zuv_client_pro/type_ids.h>
 
-#include <zuv_client_pro/soap_log.h>
+#include "support/library.h"
 
 constexpr int CALL_WIRE_SOCKET = 900; // never opened, never closed
 
@@ -83,3 +83,23 @@ inline std::string answer_envelope(const std::string &content, const std::string
            " xmlns:p=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0/" +
            port + "\">" + content + "</E:Envelope>";
 }
+
+// A proxy of Profile on a wire of its own, and its calls.
+struct profile_call {
+    explicit profile_call(std::uint32_t mode = MODE_KEEP_ALIVE) : proxy(static_cast<int>(mode))
+    {
+        wire.carry(proxy);
+    }
+    int get() { return proxy.get(&request, got); }
+    int get(const std::string &answer)
+    {
+        wire.answers.push_back(answer);
+        return get();
+    }
+
+    call_wire wire;
+    ProfileSoapBindingProxy proxy;
+    _protocolProfile__getRequest request;
+    __protocolProfile__getResponse got{};
+    __protocolProfile__setResponse held{}; // what set gives
+};

@@ -97,8 +97,6 @@ public:
     {
         return make(who, subject_key, certificate_.get(), key_.get(), ++serial_);
     }
-    X509 *own() const { return certificate_.get(); }
-    EVP_PKEY *own_key() const { return key_.get(); }
 
     // Path of the authority's certificate.
     std::string ca_file() const { return path("ca.pem"); }

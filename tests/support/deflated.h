@@ -1,10 +1,9 @@
 // deflated.h - texts compressed by zlib itself, for tests of what the engine makes of them.
 #pragma once
 
-#include <string>
-
-#include <gtest/gtest.h>
 #include <zlib.h>
+
+#include "support/testing.h"
 
 // `window_bits` as zlib takes them: 15 with its own head, -15 raw, 31 gzip.
 inline std::string deflated(const std::string &text, int window_bits, const std::string &dictionary = {})

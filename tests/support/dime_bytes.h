@@ -1,8 +1,6 @@
 // dime_bytes.h - DIME records put together from their fields.
 #pragma once
 
-#include <string>
-
 #include "support/attachment_exchange.h"
 
 namespace dime_bytes {

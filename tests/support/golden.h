@@ -1,12 +1,12 @@
-// golden.h - messages as a person can read them, and as they go over the wire.
+// golden.h - requests as a person can read them, and as they go over the wire.
 //
-// A golden file is a head, an empty line, a body. The head's lines end with CR LF on the wire. The body's
-// line breaks and the blanks ahead of each line are for the reader alone; "\n" and "\r" stand for the bytes.
-// A line that begins with "#" is a remark.
-// "~" at the start of a line is a blank. "@declarations" stands for the namespace declarations that the root
-// element of every message carries, which declarations.txt holds once.
+// request.txt holds what all requests have in common, a file of each port what is a request's own. The head's
+// lines end with CR LF on the wire. The body's line breaks and the blanks before each line are for the reader
+// alone; "\n" and "\r" stand for the bytes, "~" at the start of a line for a blank. A line that begins with
+// "#" is a remark.
 #pragma once
 
+#include <algorithm>
 #include <fstream>
 #include <sstream>
 #include <stdexcept>
@@ -14,42 +14,57 @@
 
 namespace golden {
 
-inline std::string unescape(const std::string &text)
-{
-    std::string bytes;
-    for (std::size_t i = 0; i < text.size(); ++i) {
-        if (text[i] == '\\' && i + 1 < text.size() && (text[i + 1] == 'n' || text[i + 1] == 'r'))
-            bytes += text[++i] == 'n' ? '\n' : '\r';
-        else
-            bytes += text[i];
-    }
-    return bytes;
-}
-
 inline std::ifstream open(const std::string &name)
 {
-    std::ifstream file(std::string(ZUV_GOLDEN_DIR) + "/" + name);
+    std::ifstream file(std::string(ZUV_GOLDEN_DIR) + "/" + name + ".txt");
     if (!file)
         throw std::runtime_error("no golden file " + name);
     return file;
 }
 
-inline std::string body(std::istream &file)
+inline std::string replaced(std::string text, const std::string &from, const std::string &to)
 {
-    std::string bytes, line;
-    while (std::getline(file, line)) {
-        const std::size_t start = line.find_first_not_of(' ');
-        if (start == std::string::npos || line[start] == '#')
-            continue;
-        if (line.substr(start) == "@declarations") {
-            std::ifstream declarations = open("declarations.txt");
-            bytes += body(declarations);
-        } else {
-            bytes += unescape(line[start] == '~' ? " " + line.substr(start + 1) : line.substr(start));
-        }
-    }
-    return bytes;
+    for (std::size_t at = 0; (at = text.find(from, at)) != text.npos; at += to.size())
+        text.replace(at, from.size(), to);
+    return text;
 }
+
+// The bytes of a line of a body.
+inline std::string body_bytes(const std::string &line)
+{
+    const std::string text = line.substr(std::min(line.find_first_not_of(' '), line.size()));
+    if (text.starts_with('#'))
+        return {};
+    return replaced(replaced(text.starts_with('~') ? " " + text.substr(1) : text, "\\n", "\n"), "\\r", "\r");
+}
+
+// What is an operation's own: its section begins with "== ", the names of operations and traits.
+struct section {
+    explicit section(const std::string &port, const std::string &operation)
+    {
+        std::ifstream file = open(port);
+        bool own = false;
+        for (std::string line; std::getline(file, line);) {
+            if (line.starts_with("== ")) {
+                own = line.find(" " + operation + " ") != line.npos;
+                heading += own ? line : "";
+            } else if (own) {
+                members += body_bytes(line);
+            }
+        }
+        if (heading.empty())
+            throw std::runtime_error("no golden request " + port + " " + operation);
+    }
+    // Without its trait, if it begins with one; empty if the request doesn't have it.
+    std::string line_of(const std::string &line) const
+    {
+        const std::size_t start = line.find('['), end = line.find("] ");
+        if (start != line.find_first_not_of(' ') || end == line.npos)
+            return line;
+        return heading.find(line.substr(start, end - start + 1)) == heading.npos ? "" : line.substr(end + 2);
+    }
+    std::string heading, members;
+};
 
 struct message {
     std::string head; // with its empty line
@@ -57,21 +72,26 @@ struct message {
     std::string whole() const { return head + body; }
 };
 
-// The message of a file. A Content-Length of "*" takes the body's length.
-inline message read(const std::string &name)
+// The request of an operation. A Content-Length of "*" takes the body's length.
+inline message read(const std::string &port, const std::string &operation)
 {
-    std::ifstream file = open(name);
+    const section own(port, operation);
+    std::string low = port;
+    std::transform(low.begin(), low.end(), low.begin(), [](char c) { return c < 'a' ? c + 32 : c; });
+    std::stringstream common;
+    common << open("request").rdbuf();
+    std::istringstream lines(
+        replaced(replaced(replaced(common.str(), "@Port", port), "@port", low), "@operation", operation));
     message result;
-    std::string line, head;
-    while (std::getline(file, line) && !line.empty()) {
-        if (line[0] != '#')
-            head += line + "\r\n";
+    std::string line;
+    while (std::getline(lines, line) && !line.empty()) {
+        line = line[0] == '#' ? "" : own.line_of(line);
+        result.head += line.empty() ? "" : line + "\r\n";
     }
-    result.body = body(file);
-    const std::size_t star = head.find("Content-Length: *");
-    if (star != std::string::npos)
-        head.replace(star + 16, 1, std::to_string(result.body.size()));
-    result.head = head + "\r\n";
+    while (std::getline(lines, line))
+        result.body += body_bytes(own.line_of(line));
+    result.body = replaced(result.body, "@members", own.members);
+    result.head = replaced(result.head, "*", std::to_string(result.body.size())) + "\r\n";
     return result;
 }
 

@@ -1,13 +1,7 @@
 // host_streams.h - a host that gives and takes attachments through its callbacks, for DIME and MIME alike.
 #pragma once
 
-#include <algorithm>
-#include <cstring>
-#include <deque>
-#include <string>
-#include <utility>
-
-#include <zuv_client_pro/soap_attachment.h>
+#include "support/library.h"
 
 // A stream with its bytes. Its address is the handle of an attachment to send.
 struct host_stream {
@@ -55,6 +49,15 @@ struct stream_host {
         return nullptr;
     }
 
+    static std::size_t read(soap *, void *handle, char *buffer, std::size_t length)
+    {
+        auto &source = *static_cast<host_stream *>(handle);
+        const std::size_t part = std::min({length, source.step, source.data.size() - source.at});
+        std::memcpy(buffer, source.data.data() + source.at, part);
+        source.at += part;
+        return part;
+    }
+
 private:
     static bool is_for_memory(const char *id)
     {
@@ -63,14 +66,6 @@ private:
     static void *open_read(soap *ctx, void *handle, const char *id, const char *, const char *)
     {
         return is_for_memory(id) ? soap_attachment_in_memory(ctx) : handle;
-    }
-    static std::size_t read(soap *, void *handle, char *buffer, std::size_t length)
-    {
-        auto &source = *static_cast<host_stream *>(handle);
-        const std::size_t part = std::min({length, source.step, source.data.size() - source.at});
-        std::memcpy(buffer, source.data.data() + source.at, part);
-        source.at += part;
-        return part;
     }
     static void *take(soap *ctx, const char *id)
     {

@@ -3,21 +3,13 @@
 #pragma once
 
 #include <arpa/inet.h>
-#include <cstddef>
-#include <filesystem>
-#include <functional>
 #include <list>
-#include <memory>
 #include <netinet/in.h>
-#include <string>
 #include <sys/socket.h>
 #include <thread>
 #include <unistd.h>
 
-#include <gtest/gtest.h>
-#include <zuv_client_pro/soap.h>
-#include <zuv_client_pro/soap_envelope.h>
-#include <zuv_client_pro/soap_log.h>
+#include "support/testing.h"
 
 namespace loopback {
 
@@ -35,7 +27,6 @@ public:
     std::string fault_detail() { return text_of(soap_fault_detail_value(ctx_.get())); }
 
 private:
-    static std::string text_of(const char *text) { return text ? text : "(null)"; }
     std::unique_ptr<soap> ctx_;
 };
 
@@ -74,7 +65,7 @@ private:
     int socket_;
 };
 
-// A server thread: `serve` gets each client's socket in turn, which is closed after it. Declare it ahead of
+// A server thread: `serve` gets each client's socket in turn, which is closed after it. Declare it before
 // the context that talks to it. Its end waits for the client that is being served.
 class peer {
 public:

@@ -3,17 +3,7 @@
 // For tests of framing. Nothing is written to a trace file, no socket is opened.
 #pragma once
 
-#include <algorithm>
-#include <cstddef>
-#include <cstring>
-#include <functional>
-#include <limits>
-#include <string>
-#include <vector>
-
-#include <zuv_client_pro/soap.h>
-#include <zuv_client_pro/soap_io.h>
-#include <zuv_client_pro/soap_log.h>
+#include "support/library.h"
 
 class memory_wire : public soap {
 public:
@@ -45,6 +35,12 @@ public:
         incoming = std::move(bytes);
         given = 0;
         receives = 0;
+    }
+    // The same in pieces: the first has so many bytes, each later one at most as many as told.
+    void receive(std::string bytes, std::size_t first, std::size_t later)
+    {
+        receive(std::move(bytes));
+        piece = [first, later](std::size_t before) { return before == 0 ? first : later; };
     }
 
     // Reads on to the end of input; more than `limit` bytes are a fault of the reader.
@@ -82,3 +78,25 @@ private:
         return part;
     }
 };
+
+// A wire that has begun to receive a message by the time it is there.
+struct read_wire : memory_wire {
+    explicit read_wire(const std::string &bytes, std::uint32_t modes = 0, std::size_t piece_size = 65536)
+        : memory_wire(modes, modes)
+    {
+        receive(bytes, piece_size, piece_size);
+        keep_alive = (modes & MODE_KEEP_ALIVE) != 0 ? 1 : 0;
+        result = soap_receive_begin(this);
+    }
+    int result;
+};
+
+// Value of a line of an HTTP head, or "(none)".
+inline std::string line_of(const std::string &head, const std::string &key)
+{
+    const std::size_t at = head.find("\r\n" + key + ": ");
+    if (at == std::string::npos)
+        return "(none)";
+    const std::size_t start = at + key.size() + 4;
+    return head.substr(start, head.find("\r\n", start) - start);
+}

@@ -3,12 +3,7 @@
 
 #include <unistd.h>
 
-#include <cstdio>
-#include <cstdlib>
-#include <string>
-#include <vector>
-
-#include <gtest/gtest.h>
+#include "support/testing.h"
 
 // Runs `script`, in which `lines` is the list of `input`, and returns what it printed, one entry for each
 // line. Empty, with a failure of the test, if Python can't be run.

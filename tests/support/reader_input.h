@@ -5,18 +5,10 @@
 // expect_readings does so for a table of documents.
 #pragma once
 
-#include <algorithm>
-#include <cstring>
-#include <memory>
 #include <span>
-#include <string>
-#include <string_view>
 
-#include <gtest/gtest.h>
-
-#include <zuv_client_pro/soap.h>
-#include <zuv_client_pro/soap_log.h>
-#include <zuv_client_pro/soap_xml.h>
+#include "support/memory_wire.h"
+#include "support/testing.h"
 
 namespace reader_input {
 
@@ -31,53 +23,27 @@ inline constexpr soap_namespace NAMESPACES[] = {
     {nullptr, nullptr, nullptr, nullptr},
 };
 
-// One reception of a document: the first piece has `first` bytes, each later one at most `piece`.
-class reception {
-public:
-    explicit reception(std::string document, std::size_t first = SOAP_BUFFER_SIZE,
-                       std::size_t piece = SOAP_BUFFER_SIZE, std::uint32_t mode = 0)
-        : document_(std::move(document)), rest_(document_), next_(first), piece_(piece),
-          context_(std::make_unique<soap>())
+// One reception of a document: the first piece has `first` bytes, each later one at most `later`.
+struct reception : memory_wire {
+    explicit reception(const std::string &document, std::size_t first = SOAP_BUFFER_SIZE,
+                       std::size_t later = SOAP_BUFFER_SIZE, std::uint32_t modes = 0)
     {
-        soap_reset_call(context());
-        soap_log_set_received(context(), nullptr);
-        context()->user = this;
-        context()->on_recv = receive;
-        context()->namespaces = NAMESPACES;
-        context()->mode = mode;
-        soap_namespace_table_copy(context());
-        context()->soap_version = 1;
+        receive(document, first, later);
+        soap_reset_call(this);
+        namespaces = NAMESPACES;
+        mode = modes;
+        soap_namespace_table_copy(this);
+        soap_version = 1;
     }
-    reception(const reception &) = delete;
-    reception &operator=(const reception &) = delete;
-
-    soap *context() { return context_.get(); }
-    operator soap *() { return context_.get(); }
-    soap *operator->() { return context_.get(); }
-
-    // The context behind the start tag of the root element.
+    soap *context() { return this; }
+    operator soap *() { return this; }
+    soap *operator->() { return this; }
+    // The context after the start tag of the root element.
     soap *in_root()
     {
-        EXPECT_EQ(soap_element_in_begin(context(), nullptr, 1, nullptr), 0);
-        return context();
+        EXPECT_EQ(soap_element_in_begin(this, nullptr, 1, nullptr), 0);
+        return this;
     }
-
-private:
-    static std::size_t receive(soap *ctx, char *buffer, std::size_t length)
-    {
-        auto *self = static_cast<reception *>(ctx->user);
-        const std::size_t size = std::min({length, self->next_, self->rest_.size()});
-        std::memcpy(buffer, self->rest_.data(), size);
-        self->rest_.remove_prefix(size);
-        self->next_ = self->piece_;
-        return size;
-    }
-
-    std::string document_;
-    std::string_view rest_;
-    std::size_t next_;
-    std::size_t piece_;
-    std::unique_ptr<soap> context_;
 };
 
 template <class Read> std::string every_reading(const std::string &document, std::uint32_t mode, Read read)

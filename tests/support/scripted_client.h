@@ -4,19 +4,16 @@
 
 #include <atomic>
 #include <chrono>
-#include <string>
-
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
 #include <zuv_client_pro/protocol.h>
-#include <zuv_client_pro/soap_log.h>
 
+#include "support/library.h"
 #include "support/scripted_server.h"
 
 namespace scripted {
 
-constexpr int GUARD_S = 10;                    // time limit of transfers where none should be met
-constexpr int OTHERS_ANSWER = 9999;            // in place of a code
-constexpr const char *A_NAME = "call-1000000"; // as long as those of all calls
+constexpr int GUARD_S = 10;         // time limit of transfers where none should be met
+constexpr int OTHERS_ANSWER = 9999; // in place of a code
 
 // A client that keeps its connection and counts those it needed.
 class client {

@@ -4,10 +4,7 @@
 #pragma once
 
 #include <atomic>
-#include <cstdio>
-#include <functional>
 #include <netinet/tcp.h>
-#include <string>
 
 #include "support/tls_peer.h"
 
@@ -34,6 +31,15 @@ public:
             if ((count = read(bytes, sizeof bytes)) <= 0)
                 return {};
         return text;
+    }
+    // So many bytes, or fewer when the client has ended.
+    std::string bytes(std::size_t length)
+    {
+        std::string all(length, '\0');
+        std::size_t have = 0;
+        for (int count = 1; have < length && count > 0; have += static_cast<std::size_t>(std::max(count, 0)))
+            count = read(all.data() + have, static_cast<int>(length - have));
+        return all.substr(0, have);
     }
     void send(const std::string &bytes)
     {
@@ -96,16 +102,9 @@ inline std::string with_length(const std::string &body)
     return head("Content-Length: " + std::to_string(body.size()) + "\r\n") + body;
 }
 
-inline std::string in_chunks(const std::string &body, std::size_t size = 100)
+inline std::string in_chunks(const std::string &body)
 {
-    std::string text = head("Transfer-Encoding: chunked\r\n");
-    char number[32];
-    for (std::size_t at = 0; at < body.size(); at += size) {
-        const std::string part = body.substr(at, size);
-        std::snprintf(number, sizeof number, "%zX\r\n", part.size());
-        text += number + part + "\r\n";
-    }
-    return text + "0\r\n\r\n";
+    return head("Transfer-Encoding: chunked\r\n") + in_chunks_of(100, body);
 }
 
 // The whole answer to a request, as a healthy server gives it.

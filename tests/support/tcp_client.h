@@ -1,10 +1,7 @@
 // tcp_client.h - what the tests of sockets say often: connect, receive, look at an option or a failure.
 #pragma once
 
-#include <string>
-
-#include <zuv_client_pro/soap_tcp.h>
-
+#include "support/library.h"
 #include "support/loopback.h"
 #include "support/socket_calls.h"
 

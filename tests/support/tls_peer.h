@@ -3,15 +3,8 @@
 #pragma once
 
 #include <csignal>
-#include <functional>
-#include <memory>
 #include <netinet/tcp.h>
-#include <string>
-
-#include <gtest/gtest.h>
 #include <openssl/ssl.h>
-#include <zuv_client_pro/soap_tcp.h>
-#include <zuv_client_pro/soap_tls.h>
 
 #include "support/certificates.h"
 #include "support/loopback.h"
@@ -65,7 +58,6 @@ public:
           peer_([this, serve = std::move(serve)](int client) { shake_hands(client, serve); }, clients)
     {}
     int port() const { return peer_.port(); }
-    SSL_CTX *context() { return context_.get(); }
 
 private:
     void shake_hands(int client, const service &serve)
@@ -88,6 +80,15 @@ inline void echo(SSL *connection)
     while (SSL_read(connection, &byte, 1) == 1)
         SSL_write(connection, &byte, 1);
     SSL_shutdown(connection);
+}
+
+// Serves, and notes of each connection whether its session was resumed.
+inline tls_peer::service noting(std::vector<int> &resumed, tls_peer::service serve = echo)
+{
+    return [&resumed, serve = std::move(serve)](SSL *connection) {
+        resumed.push_back(SSL_session_reused(connection));
+        serve(connection);
+    };
 }
 
 class tls_test : public loopback::descriptor_test {

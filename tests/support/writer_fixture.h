@@ -4,15 +4,7 @@
 // through a filter, and demands the same bytes of all.
 #pragma once
 
-#include <functional>
-#include <memory>
-#include <string>
-
-#include <gtest/gtest.h>
-
-#include <zuv_client_pro/soap_io.h>
-#include <zuv_client_pro/soap_log.h>
-#include <zuv_client_pro/soap_xml.h>
+#include "support/testing.h"
 
 namespace writer_fixture {
 
@@ -44,7 +36,7 @@ inline int pass_on(soap *, const char **, std::size_t *)
     return 0;
 }
 
-enum class start { document, inside }; // ahead of the first start tag of a message, or past it
+enum class start { document, inside }; // before the first start tag of a message, or past it
 
 using calls = std::function<void(soap *)>;
 

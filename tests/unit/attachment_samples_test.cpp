@@ -1,9 +1,4 @@
 // The samples of tests/samples: read, cut and changed; records whose lengths lie.
-#include <filesystem>
-#include <fstream>
-#include <iterator>
-#include <utility>
-
 #include "support/annotated_bytes.h"
 #include "support/attachment_checks.h"
 #include "support/dime_bytes.h"
@@ -24,7 +19,7 @@ std::string sample(const std::string &name)
 struct sample_case {
     const char *name;
     const char *summary;
-    const char *end; // the message ends with this text; anything behind it is nobody's
+    const char *end; // the message ends with this text; anything after it is nobody's
 };
 
 // What is announced as encoded is handed out as it came: its receiver knows the encoding from the record.

@@ -1,14 +1,5 @@
 // How a message comes in: its start recognised, chunks and compression undone, its end proven, hostile bytes
 // refused.
-#include <cstdio>
-#include <string>
-
-#include <gtest/gtest.h>
-
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_io.h>
-
 #include "support/deflated.h"
 #include "support/memory_wire.h"
 
@@ -20,13 +11,6 @@ const std::string CHUNKED_HEAD = OK_HEAD + "Transfer-Encoding: chunked\r\n\r\n";
 std::string with_length(const std::string &body, std::size_t length)
 {
     return OK_HEAD + "Content-Length: " + std::to_string(length) + "\r\n\r\n" + body;
-}
-
-std::string chunk(const std::string &data)
-{
-    char size[32];
-    std::snprintf(size, sizeof size, "%zX\r\n", data.size());
-    return size + data + "\r\n";
 }
 
 struct outcome {
@@ -197,12 +181,6 @@ TEST(buffered_in, bodies_read_the_same_at_every_split)
     // Five bytes of head and the text as it stands, in a block whose unused bits are those of a zlib head.
     const std::string stored =
         "\x78\x27" + std::string(1, '\0') + "\xD8\xFF" + text + "\x03" + std::string(1, '\0');
-    const auto in_small_chunks = [](const std::string &bytes) {
-        std::string chunks;
-        for (const char c : bytes)
-            chunks += chunk(std::string(1, c));
-        return chunks + "0\r\n\r\n";
-    };
     std::string with_flags = gzip;
     with_flags[3] = 8; // a file name announced and not there: the flags are not looked at
     const struct {
@@ -215,13 +193,13 @@ TEST(buffered_in, bodies_read_the_same_at_every_split)
         {"gzip flags", "gzip\r\n\r\n", with_flags},
         {"gzip in two chunks", "gzip\r\nTransfer-Encoding: chunked\r\n\r\n",
          chunk(gzip.substr(0, 20)) + chunk(gzip.substr(20)) + "0\r\n\r\n"},
-        {"gzip in chunks of one byte", "gzip\r\nTransfer-Encoding: chunked\r\n\r\n", in_small_chunks(gzip)},
+        {"gzip in chunks of one byte", "gzip\r\nTransfer-Encoding: chunked\r\n\r\n", in_chunks_of(1, gzip)},
         {"deflate in chunks of one byte", "deflate\r\nTransfer-Encoding: chunked\r\n\r\n",
-         in_small_chunks(deflate)},
+         in_chunks_of(1, deflate)},
         {"deflate without its zlib head", "deflate\r\n\r\n", raw},
         {"the same sent as gzip", "gzip\r\n\r\n", raw},
         {"the same in chunks of one byte", "deflate\r\nTransfer-Encoding: chunked\r\n\r\n",
-         in_small_chunks(raw)},
+         in_chunks_of(1, raw)},
         {"stored", "deflate\r\n\r\n", stored},
     };
     for (const auto &row : compressed) {
@@ -264,10 +242,7 @@ TEST(buffered_in, lines_between_chunks_are_bounded)
               (outcome{0, "<a/>", SOAP_HEADER_LINE, false}));
     EXPECT_EQ(read_on_kept_connection(first + "4;" + endless.substr(0, 8000) + "\r\n<b/>\r\n0\r\n\r\n"),
               (outcome{0, "<a/><b/>", 0, true}));
-    std::string trailers = first + "0\r\n";
-    for (int i = 0; i < 100000; ++i)
-        trailers += "A: b\r\n";
-    kept_wire wire(trailers, [](std::size_t) { return 1000; });
+    kept_wire wire(first + "0\r\n" + repeat_text("A: b\r\n", 100000), [](std::size_t) { return 1000; });
     EXPECT_EQ(read_message(wire), (outcome{0, "<a/>", 0, false}));
     EXPECT_LT(wire.given, 20000U);
 }
@@ -278,10 +253,8 @@ TEST(buffered_in, chunks_of_every_size_around_the_buffer)
     for (std::size_t i = 0; i < body.size(); i += 7)
         body[i] = static_cast<char>('A' + i % 26);
     for (const std::size_t step : {17U, 4096U, 65000U, 65530U, 65536U, 200000U}) {
-        std::string chunks = CHUNKED_HEAD;
-        for (std::size_t at = 0; at < body.size(); at += step)
-            chunks += chunk(body.substr(at, step));
-        EXPECT_TRUE(read_on_kept_connection(chunks + "0\r\n\r\n") == (outcome{0, body, 0, true})) << step;
+        const std::string bytes = CHUNKED_HEAD + in_chunks_of(step, body);
+        EXPECT_TRUE(read_on_kept_connection(bytes) == (outcome{0, body, 0, true})) << step;
     }
 }
 
@@ -415,7 +388,7 @@ int growing_filter(soap *ctx, char *buffer, std::size_t *length, std::size_t siz
     return 0;
 }
 
-// A head reader behind which the filter starts.
+// A head reader after which the filter starts.
 int filtering_head(soap *ctx)
 {
     const int result = http_read_head(ctx);

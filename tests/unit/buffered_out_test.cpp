@@ -1,14 +1,8 @@
 // How a message leaves: modes, stages, framing on the wire, hooks, failures.
-#include <string>
-
-#include <gtest/gtest.h>
 #include <zlib.h>
 
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_io.h>
-
 #include "support/memory_wire.h"
+#include "support/testing.h"
 
 namespace {
 

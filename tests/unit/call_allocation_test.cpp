@@ -1,17 +1,7 @@
 // call_allocation_test.cpp - every allocation of a call refused once: a code comes back, and the next call
 // works.
-#include <cstdlib>
-#include <vector>
-
-#include <gtest/gtest.h>
-
-#include <zuv_client_pro/ProfileSoapBindingProxy.h>
-#include <zuv_client_pro/protocol.h>
-#include <zuv_client_pro/protocolProfile.h>
-#include <zuv_client_pro/soap_error.h>
-
 #include "support/call_wire.h"
-#include "support/failing_malloc.h"
+#include "support/testing.h"
 
 namespace {
 
@@ -42,25 +32,19 @@ const std::string FAULT_12 = answer_envelope(
 // A document that has something of everything, and parts of it twice.
 const protocolProfile__ProfileContent *rich_document()
 {
-    static call_wire wire;
-    static ProfileSoapBindingProxy proxy;
-    static __protocolProfile__getResponse read{};
-    if (read.result == nullptr) {
-        _protocolProfile__getRequest request;
-        wire.carry(proxy);
-        wire.answers.push_back(http_answer(rich_answer("get")));
-        EXPECT_EQ(0, proxy.get(&request, read));
+    static profile_call call(0);
+    if (call.got.result == nullptr) {
+        EXPECT_EQ(0, call.get(http_answer(rich_answer("get"))));
     }
-    return read.result;
+    return call.got.result;
 }
 
 // Two calls, which are answered by `body`, with a proxy of their own, so that nothing is left over from
 // another run.
-struct trial {
+struct trial : profile_call {
     trial(const std::string &body, std::uint32_t mode)
-        : proxy(static_cast<int>(mode | MODE_KEEP_ALIVE)), answer(http_answer(body))
+        : profile_call(mode | MODE_KEEP_ALIVE), answer(http_answer(body))
     {
-        wire.carry(proxy);
         wire.sent.reserve(SOAP_BUFFER_SIZE); // the peer's memory is not what is tested
         wire.opened_at.reserve(SOAP_TEXT_SIZE);
         header.targetURI = &name;
@@ -68,13 +52,12 @@ struct trial {
     }
     void prepare()
     {
-        wire.answers.clear();
-        wire.answers.push_back(answer);
+        wire.answers = {answer};
         proxy.soap_header(&header);
         got.result = nullptr;
         held.result = nullptr;
     }
-    int get() { return proxy.get(&request, got); }
+    int get() { return profile_call::get(); }
     int set() { return proxy.set(const_cast<protocolProfile__ProfileContent *>(rich_document()), held); }
     const protocolProfile__ProfileContent *result() const { return got.result ? got.result : held.result; }
     // The text with an id and the reference to it are both there.
@@ -84,13 +67,8 @@ struct trial {
                !result()->thisURI[0].empty();
     }
 
-    call_wire wire;
-    ProfileSoapBindingProxy proxy;
     std::string answer, name = "a name that does not fit in place \xE9 <&>";
     protocol__Header header;
-    _protocolProfile__getRequest request;
-    __protocolProfile__getResponse got{};
-    __protocolProfile__setResponse held{};
 };
 
 struct call_case {
@@ -132,6 +110,7 @@ TEST(AllocationFailure, of_a_call_gives_a_code_and_leaves_nothing_behind)
         {"set, stored", &trial::set, rich_answer("set"), MODE_STORE, 0},
         {"set, compressed chunks", &trial::set, rich_answer("set"), MODE_CHUNKED | MODE_DEFLATE, 0},
         {"set, canonical", &trial::set, rich_answer("set"), MODE_CANONICAL, 0},
+        {"set, default namespaces", &trial::set, rich_answer("set"), MODE_DEFAULT_NAMESPACE, 0},
         {"fault", &trial::get, FAULT_11, 0, SOAP_CLIENT_FAULT},
         {"fault of SOAP 1.2", &trial::get, FAULT_12, 0, SOAP_CLIENT_FAULT},
     };
@@ -205,25 +184,21 @@ TEST(AllocationFailure, of_the_hosts_own_allocator_is_told_wherever_it_is_met)
 // Memory in use stays where it was, whatever the number of calls.
 TEST(ManyCalls, leave_a_proxy_as_small_as_it_was)
 {
-    call_wire wire;
-    ProfileSoapBindingProxy proxy(static_cast<int>(MODE_KEEP_ALIVE));
-    wire.carry(proxy);
-    _protocolProfile__getRequest request;
-    __protocolProfile__getResponse response;
+    profile_call calls;
     const std::string answer = http_answer(rich_answer("get"));
     std::size_t before = 0, per_call = 0;
     for (int i = 0; i < 20000; ++i) {
-        wire.sent.clear();
-        wire.answers.push_back(answer);
+        calls.wire.sent.clear();
+        calls.wire.answers.push_back(answer);
         const std::size_t start = failing_malloc::allocations();
-        ASSERT_EQ(0, proxy.get(&request, response));
-        proxy.destroy();
+        ASSERT_EQ(0, calls.get());
+        calls.proxy.destroy();
         per_call = failing_malloc::allocations() - start;
         if (i == 100)
             before = per_call;
     }
     EXPECT_EQ(before, per_call) << "allocations of the last call and of the hundredth";
-    EXPECT_EQ(1, wire.opened);
+    EXPECT_EQ(1, calls.wire.opened);
 }
 
 } // namespace

@@ -1,37 +1,19 @@
 // context_test.cpp - life of a context: reset, discard, end, copies.
-#include <zuv_client_pro/soap.h>
-
-#include <cstring>
-#include <functional>
-#include <memory>
-#include <string>
-#include <vector>
-
 #include <fcntl.h>
-#include <gtest/gtest.h>
 #include <netinet/in.h>
 #include <openssl/ssl.h>
 #include <sys/socket.h>
 #include <unistd.h>
-
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
-#include <zuv_client_pro/soap_envelope.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_log.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_tcp.h>
-#include <zuv_client_pro/soap_tls.h>
-#include <zuv_client_pro/soap_xml.h>
 
-#include "support/failing_malloc.h"
+#include "support/testing.h"
 
 namespace {
 
 using testing::internal::CaptureStderr;
 using testing::internal::GetCapturedStderr;
 
-TEST(Context, EndsQuietlyAndOnlyOnceAndMayStartAgain)
+TEST(Context, ends_quietly_and_only_once_and_may_start_again)
 {
     CaptureStderr();
     {
@@ -59,7 +41,7 @@ TEST(Context, EndsQuietlyAndOnlyOnceAndMayStartAgain)
     EXPECT_NE(fcntl(1, F_GETFD), -1);
 }
 
-TEST(Context, TheEndClosesWhatTheContextOpened)
+TEST(Context, the_end_closes_what_the_context_opened)
 {
     int pair[2];
     ASSERT_EQ(socketpair(AF_UNIX, SOCK_STREAM, 0, pair), 0);
@@ -83,7 +65,7 @@ struct derived : soap {
 };
 int derived::ended = 0;
 
-TEST(Context, LeavesDerivedClassesAlone)
+TEST(Context, leaves_derived_classes_alone)
 {
     auto made = std::make_unique<derived>();
     made->first_member = 'k';
@@ -104,12 +86,22 @@ TEST(Context, LeavesDerivedClassesAlone)
     EXPECT_EQ(derived::ended, 2);
 }
 
-TEST(Context, ResetClearsTheMessageAndKeepsTheConnection)
+TEST(Context, reset_clears_the_message_and_keeps_the_connection)
 {
     soap ctx(MODE_KEEP_ALIVE, 0);
-    ctx.buffer_index = 3;
-    ctx.buffer_length = 9;
-    ctx.keep_alive = 1;
+    const auto message = [&ctx] {
+        return std::tuple(ctx.mode, ctx.message_count, ctx.content_length, ctx.dime.chunk_size,
+                          ctx.dime.buffer_length, ctx.nesting_level, ctx.error, ctx.peeked, ctx.null_flag,
+                          ctx.in_cdata, std::string(ctx.endpoint));
+    };
+    const auto connection = [&ctx] {
+        return std::tuple(ctx.buffer_index, ctx.buffer_length, ctx.keep_alive);
+    };
+    soap_reset_call(&ctx);
+    const auto fresh = message();
+    const auto none = connection();
+    std::tie(ctx.buffer_index, ctx.buffer_length, ctx.keep_alive) = std::tuple(3, 9, 1);
+    const auto kept = connection();
     ctx.mode = MODE_CHUNKED;
     ctx.message_count = ctx.content_length = ctx.dime.chunk_size = ctx.dime.buffer_length = 5;
     ctx.nesting_level = 3;
@@ -117,21 +109,14 @@ TEST(Context, ResetClearsTheMessageAndKeepsTheConnection)
     ctx.peeked = ctx.null_flag = ctx.in_cdata = 1;
     std::strcpy(ctx.endpoint, "http://x");
     soap_reset_call(&ctx);
-    EXPECT_EQ(ctx.buffer_index, 3u) << "bytes of a kept connection";
-    EXPECT_EQ(ctx.buffer_length, 9u);
-    EXPECT_EQ(ctx.keep_alive, 1);
-    EXPECT_EQ(ctx.mode, 0u);
-    EXPECT_EQ(ctx.message_count + ctx.content_length + ctx.dime.chunk_size + ctx.dime.buffer_length, 0u);
-    EXPECT_EQ(ctx.nesting_level, 0u);
-    EXPECT_EQ(ctx.error, 0);
-    EXPECT_EQ(ctx.peeked + ctx.null_flag + ctx.in_cdata, 0);
-    EXPECT_STREQ(ctx.endpoint, "");
+    EXPECT_EQ(message(), fresh);
+    EXPECT_EQ(connection(), kept) << "bytes of a kept connection";
     ctx.keep_alive = 0;
     soap_reset_call(&ctx);
-    EXPECT_EQ(ctx.buffer_index + ctx.buffer_length, 0u);
+    EXPECT_EQ(connection(), none);
 }
 
-TEST(Context, TheScratchOfACallIsFreedWhole)
+TEST(Context, the_scratch_of_a_call_is_freed_whole)
 {
     CaptureStderr();
     {
@@ -148,11 +133,8 @@ TEST(Context, TheScratchOfACallIsFreedWhole)
         ctx.local_namespaces[1].received = static_cast<char *>(SOAP_MALLOC(&ctx, 8));
         ctx.encoding_style = ctx.local_namespaces[1].received;
         soap_call_scratch_free(&ctx);
-        EXPECT_EQ(ctx.attribute_list, nullptr);
-        EXPECT_EQ(ctx.mtom_list, nullptr);
-        EXPECT_EQ(ctx.label_buffer, nullptr);
-        EXPECT_EQ(ctx.block_stack, nullptr);
-        EXPECT_EQ(ctx.local_namespaces, nullptr);
+        EXPECT_TRUE(!ctx.attribute_list && !ctx.mtom_list && !ctx.label_buffer && !ctx.block_stack &&
+                    !ctx.local_namespaces);
         EXPECT_STREQ(ctx.encoding_style, "");
     }
     EXPECT_EQ(GetCapturedStderr(), "");
@@ -164,7 +146,7 @@ int count_hook(soap_instance *instance)
     return 0;
 }
 
-TEST(Context, DiscardForgetsInstancesThatTheDestructorDestroys)
+TEST(Context, discard_forgets_instances_that_the_destructor_destroys)
 {
     int destroyed = 0;
     {
@@ -178,7 +160,7 @@ TEST(Context, DiscardForgetsInstancesThatTheDestructorDestroys)
     EXPECT_EQ(destroyed, 1);
 }
 
-TEST(ContextCopy, RefusesWhatIsNoContext)
+TEST(ContextCopy, refuses_what_is_no_context)
 {
     soap ended;
     soap_engine_done(&ended);
@@ -194,7 +176,7 @@ TEST(ContextCopy, RefusesWhatIsNoContext)
     EXPECT_EQ(of_ended.state, 0);
 }
 
-TEST(ContextCopy, KeepsSettingsAndSharesNothingThatIsOwned)
+TEST(ContextCopy, keeps_settings_and_shares_nothing_that_is_owned)
 {
     CaptureStderr();
     {
@@ -228,7 +210,7 @@ TEST(ContextCopy, KeepsSettingsAndSharesNothingThatIsOwned)
     EXPECT_EQ(GetCapturedStderr(), "");
 }
 
-TEST(ContextCopy, OutlivesItsSource)
+TEST(ContextCopy, outlives_its_source)
 {
     CaptureStderr();
     auto source = std::make_unique<soap>();
@@ -243,7 +225,7 @@ TEST(ContextCopy, OutlivesItsSource)
     EXPECT_EQ(GetCapturedStderr(), "");
 }
 
-TEST(ContextCopy, SharesTheTlsContextWhicheverOfThemEndsFirst)
+TEST(ContextCopy, shares_the_tls_context_whichever_of_them_ends_first)
 {
     auto source = std::make_unique<soap>();
     source->tls_context = SSL_CTX_new(TLS_client_method());
@@ -255,7 +237,7 @@ TEST(ContextCopy, SharesTheTlsContextWhicheverOfThemEndsFirst)
     SSL_free(connection);
 }
 
-TEST(ContextCopy, FreesWhatItsTargetHeldAndTheTlsContextThatItMakes)
+TEST(ContextCopy, frees_what_its_target_held_and_the_tls_context_that_it_makes)
 {
     const soap source;
     const auto held_by = [](const std::function<void()> &round) {
@@ -320,7 +302,7 @@ void expect_no_connection(const soap &made, const char *how)
     EXPECT_STREQ(made.log_paths[SOAP_LOG_SENT], "/dev/null") << how;
 }
 
-TEST(ContextCopy, StartsWithoutAConnectionHoweverItIsMade)
+TEST(ContextCopy, starts_without_a_connection_however_it_is_made)
 {
     static const struct {
         const char *how;
@@ -357,7 +339,7 @@ TEST(ContextCopy, StartsWithoutAConnectionHoweverItIsMade)
     }
 }
 
-TEST(ContextMove, TakesAllButTheConnection)
+TEST(ContextMove, takes_all_but_the_connection)
 {
     CaptureStderr();
     static int closed;
@@ -389,7 +371,7 @@ TEST(ContextMove, TakesAllButTheConnection)
     EXPECT_EQ(GetCapturedStderr(), "") << "nothing leaks, nothing is freed twice";
 }
 
-TEST(ContextCopy, ServesTheConnectionThatItsSourceAcceptedAndClosesOnlyThat)
+TEST(ContextCopy, serves_the_connection_that_its_source_accepted_and_closes_only_that)
 {
     soap service(MODE_KEEP_ALIVE), client;
     ASSERT_GE(soap_bind(&service, "127.0.0.1", 0, 5), 0);
@@ -427,7 +409,7 @@ TEST(ContextCopy, ServesTheConnectionThatItsSourceAcceptedAndClosesOnlyThat)
     EXPECT_TRUE(is_open(service.master_socket));
 }
 
-TEST(ContextExhausted, StartAndCopySurviveEveryRefusal)
+TEST(ContextExhausted, start_and_copy_survive_every_refusal)
 {
     for (const auto how : {failing_malloc::refuse::one, failing_malloc::refuse::all_from}) {
         CaptureStderr();

@@ -1,14 +1,4 @@
 // datetime_test.cpp - xsd:dateTime: forms of the text, zones, hostile fields.
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_primitive.h>
-
-#include <cstdlib>
-#include <memory>
-#include <string>
-#include <vector>
-
-#include <gtest/gtest.h>
-
 #include "support/python_batch.h"
 
 namespace {
@@ -40,7 +30,7 @@ protected:
     }
 };
 
-TEST_F(Dates, AreReadInAllFormsAndZones)
+TEST_F(Dates, are_read_in_all_forms_and_zones)
 {
     const struct {
         const char *text;
@@ -74,7 +64,7 @@ TEST_F(Dates, AreReadInAllFormsAndZones)
     EXPECT_EQ(kept, 5);
 }
 
-TEST_F(Dates, WithoutAZoneAreLocalTimeAndAreWrittenInUtc)
+TEST_F(Dates, without_a_zone_are_local_time_and_are_written_in_utc)
 {
     const local_zone eastern("EST5EDT,M3.2.0,M11.1.0");
     EXPECT_EQ(parsed("2009-02-13T18:31:30"), "1234567890");
@@ -84,7 +74,7 @@ TEST_F(Dates, WithoutAZoneAreLocalTimeAndAreWrittenInUtc)
     EXPECT_STREQ(soap_datetime_text(ctx.get(), INT64_MAX), "1969-12-31T23:59:59Z");
 }
 
-TEST_F(Dates, RandomDatesAgreeWithPython)
+TEST_F(Dates, random_dates_agree_with_python)
 {
     const std::vector<std::string> answers = python_batch(
         "import random\n"

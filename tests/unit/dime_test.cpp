@@ -1,8 +1,7 @@
 // DIME records on the wire and back, streams, chunks, and lengths that lie.
-#include "support/attachment_checks.h"
-
 #include <malloc.h>
 
+#include "support/attachment_checks.h"
 #include "support/dime_bytes.h"
 #include "support/host_streams.h"
 
@@ -47,17 +46,6 @@ TEST(dime_out, of_a_message_alone_is_one_record)
     memory_wire wire(0, SENDING | MODE_DIME);
     ASSERT_EQ(send(wire, {}), 0);
     EXPECT_EQ(wire.sent().substr(0, 2), "\x0E\x20");
-}
-
-TEST(dime_out, sends_a_value_met_twice_once)
-{
-    const std::string bytes = "shared";
-    memory_wire wire(0, SENDING);
-    const value v = make_value(bytes, "cid:x", "a/b");
-    ASSERT_EQ(send(wire, {v, v}), 0);
-    const std::string sent = wire.sent();
-    EXPECT_EQ(sent.find("shared"), sent.rfind("shared"));
-    EXPECT_EQ(reception(sent).summary(), "[cid:x a/b shared][cid:x a/b shared]");
 }
 
 TEST(dime_out, cuts_texts_and_refuses_data_that_no_header_can_tell)

@@ -1,24 +1,13 @@
 // dispatch_test.cpp - what is done by type id alone, over every id there is.
 //
 // Elsewhere: objects that are shared (tests/classes/graph_test.cpp).
-#include <gtest/gtest.h>
-
-#include <cstring>
-
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
 #include <zuv_client_pro/protocolProfile.h>
-#include <zuv_client_pro/soap_binary.h>
-#include <zuv_client_pro/soap_envelope.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_identity.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_registry.h>
-#include <zuv_client_pro/soap_xml.h>
 #include <zuv_client_pro/type_ids.h>
 
 #include "binding/registry.h"
-#include "support/failing_malloc.h"
 #include "support/memory_wire.h"
+#include "support/testing.h"
 
 using namespace binding;
 
@@ -78,7 +67,7 @@ protected:
         return ctx.sent();
     }
 
-    // Puts the reader behind the start tag of an element that declares what `content` needs, and which
+    // Puts the reader after the start tag of an element that declares what `content` needs, and which
     // doesn't end if the content is cut.
     void receive(const std::string &content, bool cut = false)
     {

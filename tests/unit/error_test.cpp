@@ -1,18 +1,5 @@
 // error_test.cpp - texts of error codes, faults made from them, and their printed forms.
-#include <zuv_client_pro/soap_envelope.h>
-#include <zuv_client_pro/soap_error.h>
-
-#include <cerrno>
-#include <climits>
-#include <cstdio>
-#include <cstring>
-#include <set>
-#include <sstream>
-#include <string>
-
-#include <gtest/gtest.h>
-
-#include "support/failing_malloc.h"
+#include "support/testing.h"
 
 namespace {
 
@@ -47,6 +34,15 @@ std::string printed_to_file(soap *ctx)
     return written([ctx](std::FILE *file) { soap_fault_print_file(ctx, file); });
 }
 
+// What all forms print, unless they differ.
+std::string printed(soap *ctx)
+{
+    const std::string text = printed_to_buffer(ctx);
+    EXPECT_EQ(printed_to_stream(ctx), text);
+    EXPECT_EQ(printed_to_file(ctx), text);
+    return text;
+}
+
 std::string filled_text(int error)
 {
     soap ctx;
@@ -58,7 +54,7 @@ std::string filled_text(int error)
     return *soap_fault_string_field(&ctx);
 }
 
-TEST(ErrorText, IsComposedOfWhatIsKnown)
+TEST(ErrorText, is_composed_of_what_is_known)
 {
     static const struct {
         int error;
@@ -66,11 +62,9 @@ TEST(ErrorText, IsComposedOfWhatIsKnown)
     } cases[] = {
         {-1, "End of file or no input: Operation interrupted or timed out"},
         {0, "Error 0"},
-        {1, "Client fault"},
         {3, "Validation constraint violation: tag name or namespace mismatch in element 't:tag'"},
         {4, "Validation constraint violation: data type mismatch xsd:int in element 't:tag'"},
         {8, "The data in element 't:tag' must be understood but cannot be handled"},
-        {9, "Validation constraint violation: namespace error in element 't:tag'"},
         {13, "Method 't:tag' not implemented: method name or namespace not recognized"},
         {17, "Error 17"},
         {23, "Validation constraint violation: nil not allowed in element 't:tag'"},
@@ -80,11 +74,6 @@ TEST(ErrorText, IsComposedOfWhatIsKnown)
         {25, "Validation constraint violation: missing id for ref #id7 in element 't:tag'"},
         {26, "Validation constraint violation: incompatible object type ref/id pair #id7 in element 't:tag'"},
         {31, "Zlib/gzip error: ''"},
-        {39, "Invalid SOAP message or SOAP version mismatch"},
-        {42, "Validation constraint violation: missing required attribute in element 't:tag'"},
-        {43, "Validation constraint violation: prohibited attribute present in element 't:tag'"},
-        {44, "Validation constraint violation: occurrence violation in element 't:tag'"},
-        {45, "Validation constraint violation: content range or length violation in element 't:tag'"},
         {46, "Maximum number of open connections was reached (no define HAVE_POLL): increase FD_SETSIZE"},
         {200, "Error 200"},
         {201, "HTTP Error: 201 Created"},
@@ -98,7 +87,7 @@ TEST(ErrorText, IsComposedOfWhatIsKnown)
         EXPECT_EQ(filled_text(c.error), c.text) << c.error;
 }
 
-TEST(ErrorText, EveryCodeHasATextOfItsOwn)
+TEST(ErrorText, every_code_has_a_text_of_its_own)
 {
     std::set<std::string> texts;
     for (int error = 1; error <= 48; ++error) {
@@ -110,7 +99,7 @@ TEST(ErrorText, EveryCodeHasATextOfItsOwn)
     }
 }
 
-TEST(ErrorText, ConstraintTextNamesTheElementIfThereIsOne)
+TEST(ErrorText, constraint_text_names_the_element_if_there_is_one)
 {
     soap ctx;
     EXPECT_STREQ(soap_constraint_text(&ctx, "wrong ", "value"),
@@ -121,7 +110,7 @@ TEST(ErrorText, ConstraintTextNamesTheElementIfThereIsOne)
         << "cut to the buffer";
 }
 
-TEST(Fault, TheCodeFollowsTheVersionUnlessTheErrorHasItsOwn)
+TEST(Fault, the_code_follows_the_version_unless_the_error_has_its_own)
 {
     static const struct {
         int error;
@@ -150,7 +139,7 @@ TEST(Fault, TheCodeFollowsTheVersionUnlessTheErrorHasItsOwn)
     }
 }
 
-TEST(Fault, WhatIsSetStaysAndTheHookComesFirst)
+TEST(Fault, what_is_set_stays_and_the_hook_comes_first)
 {
     soap ctx;
     EXPECT_EQ(soap_fault_receiver(&ctx, "own text", "own detail", 5), 5);
@@ -170,7 +159,7 @@ TEST(Fault, WhatIsSetStaysAndTheHookComesFirst)
     EXPECT_STREQ(*soap_fault_string_field(&hooked), "from the hook");
 }
 
-TEST(Fault, SettersStoreWhatIsGiven)
+TEST(Fault, setters_store_what_is_given)
 {
     soap ctx;
     ctx.soap_version = 2;
@@ -184,26 +173,23 @@ TEST(Fault, SettersStoreWhatIsGiven)
     EXPECT_EQ(ctx.error, SOAP_FAULT);
 }
 
-TEST(Fault, TheThreePrintFormsAgree)
+TEST(Fault, the_three_print_forms_agree)
 {
     soap ctx;
-    EXPECT_EQ(printed_to_buffer(&ctx) + printed_to_stream(&ctx) + printed_to_file(&ctx), "") << "error 0";
+    EXPECT_EQ(printed(&ctx), "") << "error 0";
     EXPECT_EQ(ctx.fault, nullptr);
     ctx.error = SOAP_SYNTAX_ERROR;
-    const std::string expected =
-        "Error 5 fault: SOAP-ENV:Client [no subcode]\n\"Well-formedness violation\"\nDetail: [no detail]\n";
-    EXPECT_EQ(printed_to_buffer(&ctx), expected);
-    EXPECT_EQ(printed_to_stream(&ctx), expected);
-    EXPECT_EQ(printed_to_file(&ctx), expected);
+    EXPECT_EQ(printed(&ctx), "Error 5 fault: SOAP-ENV:Client [no subcode]\n\"Well-formedness violation\"\n"
+                             "Detail: [no detail]\n");
 
     soap received;
     received.soap_version = 1;
     received.error = SOAP_FAULT;
-    EXPECT_EQ(printed_to_stream(&received),
+    EXPECT_EQ(printed(&received),
               "SOAP 1.1 fault: SOAP-ENV:Client [no subcode]\n\"[no reason]\"\nDetail: [no detail]\n");
 }
 
-TEST(Fault, TheBufferFormKeepsToItsLength)
+TEST(Fault, the_buffer_form_keeps_to_its_length)
 {
     soap ctx;
     ctx.error = SOAP_SYNTAX_ERROR;
@@ -219,7 +205,7 @@ TEST(Fault, TheBufferFormKeepsToItsLength)
     }
 }
 
-TEST(Fault, AContextThatHasEndedSaysSo)
+TEST(Fault, a_context_that_has_ended_says_so)
 {
     soap ended;
     soap_engine_done(&ended);
@@ -240,7 +226,7 @@ std::string location(soap *ctx, std::size_t position, const std::string &input)
     return printed;
 }
 
-TEST(FaultLocation, ShowsTheInputAroundThePlace)
+TEST(FaultLocation, shows_the_input_around_the_place)
 {
     soap ctx;
     EXPECT_EQ(location(&ctx, 3, "<a>bc"), "") << "error 0";
@@ -258,7 +244,7 @@ TEST(FaultLocation, ShowsTheInputAroundThePlace)
     EXPECT_EQ(location(&ctx, SOAP_BUFFER_SIZE, full), full + "\n<!-- ** HERE ** -->\n");
 }
 
-TEST(Fault, WithoutMemoryAFaultIsStillPrinted)
+TEST(Fault, without_memory_a_fault_is_still_printed)
 {
     soap ctx;
     ctx.error = SOAP_SYNTAX_ERROR;

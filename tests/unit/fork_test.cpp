@@ -1,11 +1,6 @@
 // fork_test.cpp - a host that forks: the child's calls and ends leave the parent's connections alone.
-#include <functional>
-#include <memory>
 #include <sys/wait.h>
 #include <unistd.h>
-
-#include <gtest/gtest.h>
-#include <zuv_client_pro/soap_tcp.h>
 
 #include "support/scripted_client.h"
 #include "support/socket_calls.h"

@@ -1,15 +1,6 @@
 // Both directions together: any bytes through every framing and compression come back equal.
-#include <algorithm>
-#include <random>
-#include <string>
-
-#include <gtest/gtest.h>
-
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_io.h>
-
-#include "support/failing_malloc.h"
 #include "support/memory_wire.h"
+#include "support/testing.h"
 
 namespace {
 

@@ -1,22 +1,11 @@
 // http_request_test.cpp - request heads byte for byte, endpoints, and the choice of a connection.
 //
 // Elsewhere: response heads (http_response_test.cpp), the accepting side (http_service_test.cpp).
-#include <cstring>
-#include <string>
 #include <sys/socket.h>
 #include <unistd.h>
-#include <vector>
 
-#include <gtest/gtest.h>
-
-#include <zuv_client_pro/soap_envelope.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_xml.h>
-
-#include "support/http_head.h"
 #include "support/memory_wire.h"
+#include "support/testing.h"
 
 namespace {
 

@@ -1,19 +1,7 @@
 // http_response_test.cpp - what a received head does to the context, and the lines and lists that it is made
 // of.
-#include <memory>
-#include <string>
-
-#include <gtest/gtest.h>
-
-#include <zuv_client_pro/soap_envelope.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_xml.h>
-
-#include "support/failing_malloc.h"
-#include "support/http_head.h"
-#include "support/read_wire.h"
+#include "support/memory_wire.h"
+#include "support/testing.h"
 
 namespace {
 
@@ -49,11 +37,7 @@ TEST(tag_match, compares_without_case_up_to_a_quote_with_dash_and_star)
 
 TEST(tag_match, takes_quadratic_work_at_most)
 {
-    const std::string text(8000, 'a');
-    std::string pattern;
-    for (int i = 0; i < 200; ++i)
-        pattern += "*a";
-    EXPECT_NE(soap_tag_match(text.c_str(), (pattern + "*b").c_str()), 0);
+    EXPECT_NE(soap_tag_match(repeat_text("a", 8000).c_str(), (repeat_text("*a", 200) + "*b").c_str()), 0);
 }
 
 TEST(attr_value, finds_items_of_lists)
@@ -226,7 +210,7 @@ TEST(response_head, takes_each_header_over)
     }
 }
 
-// What stands behind the buffer of their text stays as it was.
+// What stands after the buffer of their text stays as it was.
 TEST(request_head, cuts_credentials_at_the_end_of_their_buffer)
 {
     for (const std::size_t groups : {340U, 341U, 342U, 2000U}) {
@@ -353,10 +337,7 @@ TEST(response_head, decides_by_the_status)
 
 TEST(response_head, bounds_an_error_body)
 {
-    const std::string chunk = "10000\r\n" + std::string(65536, 'e') + "\r\n";
-    std::string body;
-    for (int i = 0; i < 40; ++i)
-        body += chunk;
+    const std::string body = repeat_text(chunk(std::string(65536, 'e')), 40);
     read_wire wire("HTTP/1.1 502 Bad\r\nTransfer-Encoding: chunked\r\n\r\n" + body);
     EXPECT_EQ(wire.result, 502);
     EXPECT_EQ(text_of(soap_fault_detail_value(&wire)).size(), 1024U * 1024U);
@@ -399,9 +380,7 @@ TEST(response_head, drops_interim_heads_up_to_a_limit)
             "\r\nContent-Length: 7\r\nContent-Type: multipart/related; boundary=b\r\nContent-Encoding: "
             "gzip\r\n"
             "Transfer-Encoding: chunked\r\nConnection: close\r\nLocation: http://elsewhere/\r\n\r\n";
-        std::string hundred;
-        for (int i = 0; i < 100; ++i)
-            hundred += interim;
+        const std::string hundred = repeat_text(interim, 100);
         for (const std::string &heads : {interim, hundred}) {
             read_wire wire(heads + last, MODE_KEEP_ALIVE);
             EXPECT_EQ(wire.result, 0) << status;
@@ -418,10 +397,7 @@ TEST(response_head, drops_interim_heads_up_to_a_limit)
 TEST(response_head, has_limits)
 {
     const auto lines = [](std::size_t count, std::size_t length) {
-        std::string text = OK_HEAD;
-        for (std::size_t i = 0; i < count; ++i)
-            text += "X: " + std::string(length, 'x') + "\r\n";
-        return text + "\r\n<a/>";
+        return OK_HEAD + repeat_text("X: " + std::string(length, 'x') + "\r\n", count) + "\r\n<a/>";
     };
     EXPECT_EQ(read_wire(lines(1024, 1)).result, 0);
     EXPECT_EQ(read_wire(lines(1025, 1)).result, SOAP_HEADER_LINE);
@@ -438,21 +414,13 @@ TEST(response_head, survives_every_refused_allocation)
         "HTTP/1.1 200 OK\r\nContent-Type: multipart/related; boundary=\"b\"; start=\"s\"; action=a\r\n"
         "WWW-Authenticate: Basic realm=\"r\"\r\nAuthorization: Basic QTpC\r\nSOAPAction: \"x\"\r\n"
         "X-Forwarded-For: y\r\n\r\n";
-    std::unique_ptr<memory_wire> wire;
-    int result = -2;
-    const auto fresh = [&] {
-        wire = std::make_unique<memory_wire>();
+    const auto make = [&] {
+        auto wire = std::make_unique<memory_wire>();
         wire->legacy = LEGACY_ANSWER_CREDENTIALS;
         wire->receive(bytes);
+        return wire;
     };
-    fresh();
-    const std::size_t refusals = failing_malloc::at_each_allocation(
-        failing_malloc::refuse::one, [&] { result = http_read_head(wire.get()); },
-        [&](bool refused) {
-            EXPECT_EQ(result, refused ? SOAP_OUT_OF_MEMORY : 0);
-            fresh();
-        });
-    EXPECT_GT(refusals, 8U);
+    expect_out_of_memory_at_each_allocation(9, make, [](soap &ctx) { return http_read_head(&ctx); });
 }
 
 } // namespace

@@ -1,19 +1,6 @@
 // http_service_test.cpp - the accepting side of HTTP: requests told by their head, and the heads of answers.
-#include <cstring>
-#include <string>
-
-#include <gtest/gtest.h>
-
-#include <zuv_client_pro/soap_envelope.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_tcp.h>
-#include <zuv_client_pro/soap_xml.h>
-
-#include "support/failing_malloc.h"
-#include "support/http_head.h"
-#include "support/read_wire.h"
+#include "support/memory_wire.h"
+#include "support/testing.h"
 
 namespace {
 
@@ -75,10 +62,7 @@ TEST(request, of_put_leads_to_one_more_head_and_not_to_any_number)
     accepting_wire wire;
     const std::string put = "PUT /a HTTP/1.1\r\n\r\n";
     EXPECT_EQ(wire.request(put + "POST /b HTTP/1.1\r\n\r\n<a/>"), SOAP_STOP);
-    std::string many;
-    for (int i = 0; i < 100000; ++i)
-        many += put;
-    EXPECT_EQ(wire.request(many), SOAP_PUT_METHOD);
+    EXPECT_EQ(wire.request(repeat_text(put, 100000)), SOAP_PUT_METHOD);
 }
 
 TEST(request, brings_its_credentials_and_a_clients_own_answer_does_not)

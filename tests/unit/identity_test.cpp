@@ -1,23 +1,9 @@
 // identity_test.cpp - the pointer table and the forms of writing, the id table and late resolution.
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_identity.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_xml.h>
-
-#include <algorithm>
 #include <array>
-#include <cstring>
-#include <functional>
-#include <memory>
-#include <random>
-#include <string>
-#include <vector>
-
-#include <gtest/gtest.h>
 
 #include "identity/identity.h"
-#include "support/failing_malloc.h"
 #include "support/memory_wire.h"
+#include "support/testing.h"
 
 namespace {
 
@@ -29,7 +15,7 @@ void expect_empty_table(const soap &ctx)
         ASSERT_EQ(head, nullptr);
 }
 
-TEST(PointerTable, FindsObjectsByAddressAndTypeAtEverySize)
+TEST(PointerTable, finds_objects_by_address_and_type_at_every_size)
 {
     soap ctx;
     std::vector<std::array<char, 64>> objects(30000);
@@ -48,7 +34,7 @@ TEST(PointerTable, FindsObjectsByAddressAndTypeAtEverySize)
     expect_empty_table(ctx);
 }
 
-TEST(PointerTable, FindsArraysByContentAndSizes)
+TEST(PointerTable, finds_arrays_by_content_and_sizes)
 {
     struct holder {
         const char *content;
@@ -66,13 +52,13 @@ TEST(PointerTable, FindsArraysByContentAndSizes)
     EXPECT_EQ(mark(empty), 1);
     EXPECT_EQ(find(alike), 1);
     EXPECT_EQ(find(other_size), 2);
-    // The holders may go ahead of the table: a reset must not look at them.
+    // The holders may be gone before the table: a reset must not look at them.
     two_by_three.content = reinterpret_cast<const char *>(8);
     soap_pointer_table_reset(&ctx);
     expect_empty_table(ctx);
 }
 
-TEST(MarkPass, EntersAnObjectOnceAndThenKnowsItIsShared)
+TEST(MarkPass, enters_an_object_once_and_then_knows_it_is_shared)
 {
     soap ctx;
     int shared = 0, single = 0, unseen = 0;
@@ -92,7 +78,7 @@ TEST(MarkPass, EntersAnObjectOnceAndThenKnowsItIsShared)
     EXPECT_EQ(soap_pointer_find(&ctx, &unseen, 30, nullptr), 0);
 }
 
-TEST(MarkPass, EndsWhereMemoryDoes)
+TEST(MarkPass, ends_where_memory_does)
 {
     soap ctx;
     int object = 0, second = 0;
@@ -161,25 +147,18 @@ struct form_case {
 
 const form_case FORMS[] = {
     {"tree: the id as given", 1, ENCODED, SOAP_XML_TREE, PART_BODY, 2, -1, -1, 2, 0, 2},
-    {"tree: a positive id", 1, ENCODED, SOAP_XML_TREE, PART_BODY, 0, 5, 5, 0, 0, 0},
     {"literal 1.1: none", 1, LITERAL, 0, PART_BODY, 2, -1, 0, 2, 0, 2},
-    {"literal 1.2: none", 2, LITERAL, 0, PART_BODY, 2, -1, 0, 2, 0, 2},
     {"encoded 1.1, met once", 1, ENCODED, 0, PART_BODY, 0, -1, -1, 2, 0, 0},
     {"encoded 1.1, shared: a reference from everywhere", 1, ENCODED, 0, PART_BODY, 2, -1, -1, 2, -1, 2},
     {"encoded 1.1, the independent element", 1, ENCODED, 0, PART_BODY, 2, 1, 1, 2, 1, 2},
     {"encoded 1.1, header: single", 1, ENCODED, 0, PART_HEADER, 2, -1, 1, 1, 0, 2},
-    {"encoded 1.1, header, written", 1, ENCODED, 0, PART_HEADER, 1, 0, 0, 1, -1, 1},
-    {"encoded 1.2, met once", 2, ENCODED, 0, PART_BODY, 0, 0, 0, 0, 0, 0},
     {"encoded 1.2, shared: first in full", 2, ENCODED, 0, PART_BODY, 2, -1, 1, 1, 1, 1},
     {"encoded 1.2, shared: then by reference", 2, ENCODED, 0, PART_BODY, 1, -1, 1, 1, -1, 1},
-    {"graph, met once", 1, LITERAL, SOAP_XML_GRAPH, PART_BODY, 0, 0, 0, 0, 0, 0},
     {"graph, shared: first in full", 1, LITERAL, SOAP_XML_GRAPH, PART_BODY, 2, -1, 1, 1, 1, 1},
-    {"graph, shared: then by reference", 1, LITERAL, SOAP_XML_GRAPH, PART_BODY, 1, -1, 1, 1, -1, 1},
     {"graph over encoded 1.1", 1, ENCODED, SOAP_XML_GRAPH, PART_BODY, 2, -1, 1, 1, 1, 1},
-    {"graph, a positive id", 1, LITERAL, SOAP_XML_GRAPH, PART_BODY, 2, 7, 7, 1, 7, 2},
 };
 
-TEST_F(Forms, FollowVersionStyleAndMode)
+TEST_F(Forms, follow_version_style_and_mode)
 {
     for (const form_case &row : FORMS)
         for (const pass phase : {COUNT, SEND}) {
@@ -197,7 +176,7 @@ TEST_F(Forms, FollowVersionStyleAndMode)
         }
 }
 
-TEST_F(Forms, UnknownAndNullObjectsHaveNone)
+TEST_F(Forms, unknown_and_null_objects_have_none)
 {
     int stranger = 0;
     begin(2, ENCODED, 0, PART_BODY, SEND, 2);
@@ -210,7 +189,7 @@ TEST_F(Forms, UnknownAndNullObjectsHaveNone)
     EXPECT_EQ(soap_pointer_is_single(&ctx, nullptr), 0);
 }
 
-TEST_F(Forms, AnIndependentObjectIsBegunOnce)
+TEST_F(Forms, an_independent_object_is_begun_once)
 {
     begin(2, ENCODED, 0, PART_BODY, SEND, 2);
     EXPECT_EQ(multiref(), 1);
@@ -246,7 +225,7 @@ std::vector<std::string> texts_of_one_bucket(std::size_t count)
     return texts;
 }
 
-TEST(IdTable, ManyIdsOfOneBucketStayApartAndCheap)
+TEST(IdTable, many_ids_of_one_bucket_stay_apart_and_cheap)
 {
     constexpr std::size_t COUNT = 200000;
     soap ctx;
@@ -295,7 +274,7 @@ public:
     }
 };
 
-TEST_F(Ids, RegisteringMakesTheObjectIfNoneIsGiven)
+TEST_F(Ids, registering_makes_the_object_if_none_is_given)
 {
     void *made = put("#a", nullptr);
     ASSERT_NE(made, nullptr);
@@ -313,7 +292,7 @@ TEST_F(Ids, RegisteringMakesTheObjectIfNoneIsGiven)
     EXPECT_EQ(soap_id_lookup(&ctx, "#b")->size, 3U);
 }
 
-TEST_F(Ids, DisagreementAndRepetitionAreErrors)
+TEST_F(Ids, disagreement_and_repetition_are_errors)
 {
     struct step {
         enum { PUT, COPY, REFER } what;
@@ -358,7 +337,7 @@ TEST_F(Ids, DisagreementAndRepetitionAreErrors)
     }
 }
 
-TEST_F(Ids, PointersAreFilledThroughTheirIndirections)
+TEST_F(Ids, pointers_are_filled_through_their_indirections)
 {
     for (const bool with_direct : {true, false}) {
         pair_value object = {1, 2};
@@ -383,7 +362,7 @@ TEST_F(Ids, PointersAreFilledThroughTheirIndirections)
     }
 }
 
-TEST_F(Ids, AMissingIdIsAnErrorUnlessItLiesOutside)
+TEST_F(Ids, a_missing_id_is_an_error_unless_it_lies_outside)
 {
     void *outside[2] = {&ctx, &ctx}, *missing = &ctx;
     refer("cid:part", &outside[0]);
@@ -398,7 +377,7 @@ TEST_F(Ids, AMissingIdIsAnErrorUnlessItLiesOutside)
     EXPECT_EQ(missing, nullptr);
 }
 
-TEST_F(Ids, SmallValuesAndHooksAreCopiedLate)
+TEST_F(Ids, small_values_and_hooks_are_copied_late)
 {
     std::int32_t source = 0, places[2] = {7, 7};
     copy("#n", &places[0], 1, sizeof source);
@@ -414,7 +393,7 @@ TEST_F(Ids, SmallValuesAndHooksAreCopiedLate)
     EXPECT_EQ(soap_forward_has_pending(&ctx, places, places + 2), 0);
 }
 
-TEST_F(Ids, CopiesAreDroppedWhenTheLevelOfAnIdFalls)
+TEST_F(Ids, copies_are_dropped_when_the_level_of_an_id_falls)
 {
     pair_value object = {5, 6}, place = {7, 8};
     void *far = nullptr, *near = nullptr;
@@ -429,7 +408,7 @@ TEST_F(Ids, CopiesAreDroppedWhenTheLevelOfAnIdFalls)
     EXPECT_EQ(*static_cast<void **>(far), &object);
 }
 
-TEST_F(Ids, LongChainsOfCopiesAreFilledInAnyOrder)
+TEST_F(Ids, long_chains_of_copies_are_filled_in_any_order)
 {
     constexpr std::size_t COUNT = 100000;
     std::vector<pair_value> values(COUNT);
@@ -444,7 +423,7 @@ TEST_F(Ids, LongChainsOfCopiesAreFilledInAnyOrder)
         ASSERT_EQ(value.two, 12U);
 }
 
-TEST_F(Ids, WhatWaitsMovesWithItsBlock)
+TEST_F(Ids, what_waits_moves_with_its_block)
 {
     constexpr std::size_t COUNT = 6; // elements
     constexpr std::size_t WIDTH = 6; // words: pointer, two of a value, a small value, two of a value
@@ -482,7 +461,7 @@ TEST_F(Ids, WhatWaitsMovesWithItsBlock)
 
 // A message of values, each of its own or a copy of another, and of composites of two values that are copied
 // whole. The elements arrive in random order. Graphs of pointers are those of tests/classes/graph_test.cpp.
-TEST_F(Ids, RandomGraphsResolveAsAModelDoes)
+TEST_F(Ids, random_graphs_resolve_as_a_model_does)
 {
     struct composite {
         pair_value left, right;
@@ -554,7 +533,7 @@ TEST_F(Ids, RandomGraphsResolveAsAModelDoes)
     }
 }
 
-TEST_F(Ids, EveryAllocationMayFail)
+TEST_F(Ids, every_allocation_may_fail)
 {
     constexpr std::size_t COUNT = 3000; // enough for the index of many ids
     std::vector<std::string> ids;

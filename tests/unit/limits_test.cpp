@@ -2,23 +2,7 @@
 //
 // Elsewhere: the limit of open elements (xml_read_test.cpp, binding_test.cpp), heads
 // (http_response_test.cpp).
-#include <cstdio>
-#include <deque>
-#include <filesystem>
-#include <functional>
-#include <string>
-
 #include <malloc.h>
-
-#include <gtest/gtest.h>
-
-#include <zuv_client_pro/ProfileSoapBindingProxy.h>
-#include <zuv_client_pro/protocol.h>
-#include <zuv_client_pro/protocolProfile.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_log.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_xml.h>
 
 #include "support/attachment_exchange.h"
 #include "support/call_wire.h"
@@ -28,14 +12,6 @@
 namespace {
 
 constexpr std::size_t MB = 1U << 20;
-
-std::string repeated(const std::string &text, std::size_t times)
-{
-    std::string all;
-    for (std::size_t i = 0; i < times; ++i)
-        all += text;
-    return all;
-}
 
 // The error is that of a limit, its text names it, and the connection carries no other message.
 void expect_told(soap &ctx, const std::string &limit)
@@ -63,15 +39,8 @@ std::string with_length(const std::string &body, const std::string &more = {})
 
 std::string in_chunks(const std::string &body, const std::string &more = {})
 {
-    std::string message =
-        "HTTP/1.1 200 OK\r\nContent-Type: text/xml\r\n" + more + "Transfer-Encoding: chunked\r\n\r\n";
-    for (std::size_t at = 0; at < body.size(); at += 300) {
-        const std::string part = body.substr(at, 300);
-        char size[32];
-        std::snprintf(size, sizeof size, "%zx\r\n", part.size());
-        message += size + part + "\r\n";
-    }
-    return message + "0\r\n\r\n";
+    return "HTTP/1.1 200 OK\r\nContent-Type: text/xml\r\n" + more + "Transfer-Encoding: chunked\r\n\r\n" +
+           in_chunks_of(300, body);
 }
 
 const std::string GZIP = "Content-Encoding: gzip\r\n";
@@ -208,21 +177,6 @@ std::string answer_with(const std::string &content, const std::string &behind = 
     return answer_envelope("<E:Body><p:getResponse>" + content + "</p:getResponse>" + behind + "</E:Body>");
 }
 
-// A proxy that is answered by one message.
-struct get_call {
-    explicit get_call(const std::string &answer = {}) : proxy(static_cast<int>(MODE_KEEP_ALIVE))
-    {
-        wire.carry(proxy);
-        wire.answers.push_back(answer);
-    }
-    int run() { return proxy.get(&request, response); }
-
-    call_wire wire;
-    ProfileSoapBindingProxy proxy;
-    _protocolProfile__getRequest request;
-    __protocolProfile__getResponse response{};
-};
-
 std::size_t memory_in_use()
 {
     const struct mallinfo2 info = mallinfo2();
@@ -252,18 +206,18 @@ TEST(max_memory, counts_what_a_message_holds)
         std::string xml;
         std::uint64_t passing = 0; // bytes that were held for some time only
     } rows[] = {
-        {"objects", repeated("<p:profile/>", 5000)},
-        {"texts", repeated("<p:thisURI>urn:a-text-that-is-too-long-to-stand-in-place</p:thisURI>", 20000)},
-        {"short texts", repeated("<p:thisURI>u</p:thisURI>", 20000)},
+        {"objects", repeat_text("<p:profile/>", 5000)},
+        {"texts", repeat_text("<p:thisURI>urn:a-text-that-is-too-long-to-stand-in-place</p:thisURI>", 20000)},
+        {"short texts", repeat_text("<p:thisURI>u</p:thisURI>", 20000)},
         {"a long text", "<c:identity><c:name>" + std::string(3000000, 'n') + "</c:name></c:identity>"},
         {"a text with references",
-         "<c:identity><c:name>" + repeated("caf&#xE9; ", 300000) + "</c:name></c:identity>"},
+         "<c:identity><c:name>" + repeat_text("caf&#xE9; ", 300000) + "</c:name></c:identity>"},
         {"bytes",
          "<c:credentials><c:certificate>" + std::string(4000000, 'A') + "</c:certificate></c:credentials>"},
         {"ids", numbered("<c:contact id=\"c", "\"/>", 5000)},
-        {"references", "<c:contact id=\"c\"/>" + repeated("<c:contact href=\"#c\"/>", 50000)},
+        {"references", "<c:contact id=\"c\"/>" + repeat_text("<c:contact href=\"#c\"/>", 50000)},
         {"references ahead",
-         repeated("<p:thisURI href=\"#u\"/>", 50000) + "<p:thisURI id=\"u\">u</p:thisURI>", 2 * MB},
+         repeat_text("<p:thisURI href=\"#u\"/>", 50000) + "<p:thisURI id=\"u\">u</p:thisURI>", 2 * MB},
         {"attribute values", numbered("<p:profile a", "=\"" + std::string(20000, 'v') + "\"/>", 200)},
     };
     for (const auto &row : rows) {
@@ -272,8 +226,8 @@ TEST(max_memory, counts_what_a_message_holds)
         std::uint64_t held = 0;
         {
             const std::size_t before = memory_in_use();
-            get_call free_of_limits(answer);
-            ASSERT_EQ(free_of_limits.run(), 0);
+            profile_call free_of_limits;
+            ASSERT_EQ(free_of_limits.get(answer), 0);
             const double used = static_cast<double>(memory_in_use() - before);
             held = static_cast<std::uint64_t>(free_of_limits.proxy.memory_held);
             std::printf("%-25s %9zu bytes of XML, %9.0f bytes in use, counted %4.2f times\n", row.content,
@@ -284,10 +238,10 @@ TEST(max_memory, counts_what_a_message_holds)
             }
         }
         for (const bool enough : {true, false}) {
-            get_call limited(answer);
+            profile_call limited;
             const std::uint64_t limit = enough ? held + row.passing : held - 1;
             limited.proxy.max_memory = limit;
-            EXPECT_EQ(limited.run(), enough ? 0 : SOAP_LENGTH);
+            EXPECT_EQ(limited.get(answer), enough ? 0 : SOAP_LENGTH);
             EXPECT_EQ(limited.wire.closed, enough ? 0 : 1);
             if (!enough)
                 expect_told(limited.proxy, "max_memory" + more_than(limit));
@@ -298,36 +252,32 @@ TEST(max_memory, counts_what_a_message_holds)
 // What a host holds from earlier answers is its own affair.
 TEST(max_memory, is_a_messages_own)
 {
-    const std::string answer = with_length(answer_with(repeated("<p:profile/>", 1000)));
-    get_call calls(answer);
-    ASSERT_EQ(calls.run(), 0);
+    const std::string answer = with_length(answer_with(repeat_text("<p:profile/>", 1000)));
+    profile_call calls;
+    ASSERT_EQ(calls.get(answer), 0);
     calls.proxy.max_memory = static_cast<std::uint64_t>(calls.proxy.memory_held);
-    for (int i = 0; i < 3; ++i) {
-        calls.wire.answers.push_back(answer);
-        EXPECT_EQ(calls.run(), 0) << i;
-    }
+    for (int i = 0; i < 3; ++i)
+        EXPECT_EQ(calls.get(answer), 0) << i;
     EXPECT_NE(soap_block_alloc(&calls.proxy, 4 * MB), nullptr) << "outside of a message";
     calls.proxy.destroy();
-    calls.wire.answers.push_back(answer);
-    EXPECT_EQ(calls.run(), 0);
+    EXPECT_EQ(calls.get(answer), 0);
 }
 
 TEST(max_memory, stops_a_small_answer_that_grows)
 {
-    const std::string bomb = gzipped(answer_with(repeated("<p:profile/>", 1000000)));
-    const std::string answer = with_length(bomb, GZIP);
-    get_call call(answer);
+    const std::string bomb = gzipped(answer_with(repeat_text("<p:profile/>", 1000000)));
+    profile_call call;
     call.proxy.max_memory = 8 * MB;
     const std::size_t before = memory_in_use();
-    EXPECT_EQ(call.run(), SOAP_LENGTH);
+    EXPECT_EQ(call.get(with_length(bomb, GZIP)), SOAP_LENGTH);
     expect_told(call.proxy, "max_memory" + more_than(8 * MB));
     if (KNOWS_MEMORY_IN_USE) {
         EXPECT_LT(memory_in_use() - before, 20 * MB);
     }
     EXPECT_EQ(call.wire.closed, 1);
-    call.wire.answers = {with_length(answer_with(""))};
+    call.wire.answers.clear();
     call.proxy.destroy();
-    EXPECT_EQ(call.run(), 0) << "the next call";
+    EXPECT_EQ(call.get(with_length(answer_with(""))), 0) << "the next call";
 }
 
 TEST(max_memory, bounds_a_stored_message)
@@ -349,16 +299,16 @@ TEST(copies, by_references_and_qnames_are_bounded_by_the_message)
     const std::string big(100000, 'u');
     const auto with_texts = [&](std::size_t times) {
         return answer_with("<p:thisURI id=\"u\">" + big + "</p:thisURI>" +
-                           repeated("<p:thisURI href=\"#u\"/>", times));
+                           repeat_text("<p:thisURI href=\"#u\"/>", times));
     };
     const auto with_objects = [&](std::size_t times) {
         return answer_with("", "<p:ProfileContent id=\"o\"><p:thisURI>" + big +
                                    "</p:thisURI></p:ProfileContent>" +
-                                   repeated("<p:ProfileContent href=\"#o\"/>", times));
+                                   repeat_text("<p:ProfileContent href=\"#o\"/>", times));
     };
     const auto with_qnames = [&](std::size_t times) {
         return answer_envelope("<E:Body><E:Fault xmlns:q=\"" + big + "\"><faultcode>" +
-                               repeated("q:x ", times) + "</faultcode></E:Fault></E:Body>");
+                               repeat_text("q:x ", times) + "</faultcode></E:Fault></E:Body>");
     };
     const struct {
         const char *rule;
@@ -368,9 +318,9 @@ TEST(copies, by_references_and_qnames_are_bounded_by_the_message)
     for (const auto &row : rows) {
         for (const std::size_t times : {10U, 300U}) {
             SCOPED_TRACE(std::string(row.rule) + " " + std::to_string(times));
-            get_call call(with_length(row.answer(times)));
+            profile_call call;
             const bool within = times == 10;
-            EXPECT_EQ(call.run(), within ? row.usual : SOAP_LENGTH);
+            EXPECT_EQ(call.get(with_length(row.answer(times))), within ? row.usual : SOAP_LENGTH);
             EXPECT_LT(call.proxy.memory_held, static_cast<std::int64_t>(4 * MB));
             if (within)
                 continue;
@@ -390,20 +340,18 @@ TEST(max_message, ends_the_writing_of_a_graph_that_is_no_tree)
     for (const std::uint32_t mode : {MODE_BUFFERED, MODE_CHUNKED, MODE_STORE}) {
         SCOPED_TRACE(mode);
         const std::string answer = with_length(answer_with(""));
-        get_call calls(answer);
-        ASSERT_EQ(calls.run(), 0);
+        profile_call calls;
+        ASSERT_EQ(calls.get(answer), 0);
         EXPECT_EQ(calls.wire.closed, 0);
         calls.wire.sent.clear();
         calls.proxy.output_mode = mode | MODE_KEEP_ALIVE;
         calls.proxy.max_message = MB;
-        __protocolProfile__setResponse response{};
-        EXPECT_EQ(calls.proxy.set(&levels[0], response), SOAP_LENGTH);
+        EXPECT_EQ(calls.proxy.set(&levels[0], calls.held), SOAP_LENGTH);
         expect_told(calls.proxy, "max_message" + more_than(MB));
         EXPECT_LE(calls.wire.sent.size(), mode == MODE_CHUNKED ? MB + MB / 16 : 0);
         EXPECT_EQ(calls.wire.closed, 1);
         calls.proxy.output_mode = MODE_KEEP_ALIVE;
-        calls.wire.answers = {answer};
-        EXPECT_EQ(calls.run(), 0) << "the next call";
+        EXPECT_EQ(calls.get(answer), 0) << "the next call";
         EXPECT_EQ(calls.wire.opened, 2);
     }
 }
@@ -478,7 +426,7 @@ TEST(endless, input_ends_by_a_limit_and_so_does_its_trace)
                   std::string::npos)
             << text;
         EXPECT_EQ(peer.closed, 1);
-        // Blanks ahead of a head, the head, framing: 1 MB each, and eight bytes of framing for one of XML.
+        // Blanks before a head, the head, framing: 1 MB each, and eight bytes of framing for one of XML.
         EXPECT_LE(peer.given, 3 * MB + 8 * proxy.max_message);
         EXPECT_LE(std::filesystem::file_size(trace), peer.given + 2 * proxy.max_message);
         std::printf("%-32s %8zu bytes, trace of %8zu\n", row.name, peer.given,

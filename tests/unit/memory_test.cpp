@@ -1,16 +1,5 @@
 // memory_test.cpp - tracked allocation, managed blocks, instances, block stacks, growing text.
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_memory.h>
-
-#include <cstdlib>
-#include <cstring>
-#include <memory>
-#include <string>
-#include <vector>
-
-#include <gtest/gtest.h>
-
-#include "support/failing_malloc.h"
+#include "support/testing.h"
 
 namespace {
 
@@ -42,7 +31,7 @@ protected:
     soap ctx;
 };
 
-TEST_F(Memory, NamesFreesOfBlocksThatAreNotLiveAndLeaks)
+TEST_F(Memory, names_frees_of_blocks_that_are_not_live_and_leaks)
 {
     char outside = 0;
     auto *other = new soap;
@@ -65,7 +54,7 @@ TEST_F(Memory, NamesFreesOfBlocksThatAreNotLiveAndLeaks)
     std::free(leaked);
 }
 
-TEST_F(Memory, RemembersManyBlocksAndABoundedNumberOfFreedOnes)
+TEST_F(Memory, remembers_many_blocks_and_a_bounded_number_of_freed_ones)
 {
     constexpr std::size_t COUNT = 100000;
     std::vector<void *> blocks;
@@ -82,7 +71,7 @@ TEST_F(Memory, RemembersManyBlocksAndABoundedNumberOfFreedOnes)
                                        ") double free of pointer malloced at a(1)\n");
 }
 
-TEST_F(Memory, CallsReuseWhatEarlierCallsNeeded)
+TEST_F(Memory, calls_reuse_what_earlier_calls_needed)
 {
     const auto call = [this] {
         for (int i = 0; i < 1000; ++i) {
@@ -102,7 +91,7 @@ TEST_F(Memory, CallsReuseWhatEarlierCallsNeeded)
         << "one for each block, none for the book-keeping";
 }
 
-TEST_F(Memory, ManagedBlocksKeepTheirSizeAlignmentAndCanary)
+TEST_F(Memory, managed_blocks_keep_their_size_alignment_and_canary)
 {
     for (std::size_t size = 1; size <= 70; ++size) {
         auto *block = static_cast<char *>(soap_block_alloc(&ctx, size));
@@ -116,7 +105,7 @@ TEST_F(Memory, ManagedBlocksKeepTheirSizeAlignmentAndCanary)
     }
 }
 
-TEST_F(Memory, AnEmptyBlockIsSharedAndTheHostsAllocatorTakesThePlaceOfOthers)
+TEST_F(Memory, an_empty_block_is_shared_and_the_hosts_allocator_takes_the_place_of_others)
 {
     static char area[16];
     ctx.on_malloc = [](soap *, std::size_t size) -> void * { return size <= sizeof area ? area : nullptr; };
@@ -137,7 +126,7 @@ TEST_F(Memory, AnEmptyBlockIsSharedAndTheHostsAllocatorTakesThePlaceOfOthers)
     EXPECT_EQ(std::u32string(soap_wide_string_dup(&ctx, U"\U0001F600x")), U"\U0001F600x");
 }
 
-TEST_F(Memory, OneByteIntoThePaddingIsHarmlessOnePastItIsReported)
+TEST_F(Memory, one_byte_into_the_padding_is_harmless_one_past_it_is_reported)
 {
     auto *padded = static_cast<char *>(soap_block_alloc(&ctx, 3)); // spans 8: three bytes of padding
     padded[5] = 'x';
@@ -163,7 +152,7 @@ TEST_F(Memory, OneByteIntoThePaddingIsHarmlessOnePastItIsReported)
     damaged[6] = canary;
 }
 
-TEST_F(Memory, FreesOneBlockOrOneInstanceByAddressAndThenAllWithTheFieldsThatLiveThere)
+TEST_F(Memory, frees_one_block_or_one_instance_by_address_and_then_all_with_the_fields_that_live_there)
 {
     void *first = soap_block_alloc(&ctx, 8);
     ctx.action = ctx.auth_user = ctx.mime.boundary = soap_string_dup(&ctx, "a");
@@ -187,7 +176,7 @@ TEST_F(Memory, FreesOneBlockOrOneInstanceByAddressAndThenAllWithTheFieldsThatLiv
     EXPECT_EQ(ctx.allocation_list, nullptr);
 }
 
-TEST_F(Memory, DestroysInstancesNewestFirstAndNamesRefusals)
+TEST_F(Memory, destroys_instances_newest_first_and_names_refusals)
 {
     int objects[3];
     soap_instance_register(&ctx, &objects[0], 1, -1, note_destruction);
@@ -203,7 +192,7 @@ TEST_F(Memory, DestroysInstancesNewestFirstAndNamesRefusals)
     EXPECT_EQ(ctx.fault, nullptr);
 }
 
-TEST_F(Memory, WhatIsTakenOutOfManagementIsTheCallers)
+TEST_F(Memory, what_is_taken_out_of_management_is_the_callers)
 {
     int object = 0;
     char *text = soap_string_dup(&ctx, "kept");
@@ -223,7 +212,7 @@ TEST_F(Memory, WhatIsTakenOutOfManagementIsTheCallers)
     std::free(text);
 }
 
-TEST_F(Memory, BlocksAndInstancesMoveToAnotherContext)
+TEST_F(Memory, blocks_and_instances_move_to_another_context)
 {
     auto *source = new soap;
     char *own = soap_string_dup(&ctx, "own");
@@ -243,7 +232,7 @@ TEST_F(Memory, BlocksAndInstancesMoveToAnotherContext)
     EXPECT_EQ(GetCapturedStderr(), "");
 }
 
-TEST_F(Memory, ADamagedBlockStopsTheMove)
+TEST_F(Memory, a_damaged_block_stops_the_move)
 {
     soap target;
     char *block = soap_string_dup(&ctx, "12345"); // six bytes: the canary follows at once
@@ -262,7 +251,7 @@ void append_block(soap *ctx, const char *text)
     std::memcpy(soap_block_stack_grow(ctx, nullptr, std::strlen(text)), text, std::strlen(text));
 }
 
-TEST_F(Memory, ABlockStackGathersInOrderAndIsReadOldestFirst)
+TEST_F(Memory, a_block_stack_gathers_in_order_and_is_read_oldest_first)
 {
     EXPECT_EQ(soap_block_stack_grow(&ctx, nullptr, 8), nullptr) << "there is no stack";
     EXPECT_EQ(soap_block_stack_first(&ctx, nullptr), nullptr);
@@ -295,7 +284,7 @@ TEST_F(Memory, ABlockStackGathersInOrderAndIsReadOldestFirst)
     EXPECT_EQ(ctx.block_stack, nullptr);
 }
 
-TEST_F(Memory, GrowingTextDoublesFrom256)
+TEST_F(Memory, growing_text_doubles_from256)
 {
     const std::string text(200, 'a'), more(1000, 'b');
     EXPECT_EQ(soap_text_buffer_put(&ctx, text.data(), text.size()), 0);
@@ -309,7 +298,7 @@ TEST_F(Memory, GrowingTextDoublesFrom256)
     EXPECT_EQ(std::string(ctx.label_buffer, ctx.label_index), "c");
 }
 
-TEST_F(Memory, SizesBeyondTheAddressSpaceAreOutOfMemory)
+TEST_F(Memory, sizes_beyond_the_address_space_are_out_of_memory)
 {
     const auto expect_refusal = [this] {
         EXPECT_EQ(ctx.error, SOAP_OUT_OF_MEMORY);
@@ -330,34 +319,24 @@ TEST_F(Memory, SizesBeyondTheAddressSpaceAreOutOfMemory)
     expect_refusal();
 }
 
-TEST(MemoryExhausted, TextsAndGatheredBlocksGiveAnErrorAndLeaveNothing)
+TEST(MemoryExhausted, texts_and_gathered_blocks_give_an_error_and_leave_nothing)
 {
-    bool (*const runs[])(soap * ctx) = {
-        // each says whether it failed
-        [](soap *ctx) { return soap_wide_string_dup(ctx, U"abc") == nullptr; },
-        [](soap *ctx) { return soap_text_buffer_put(ctx, "abc", 3) != 0; },
-        [](soap *ctx) {
-            return soap_block_stack_push(ctx) == nullptr ||
-                   soap_block_stack_grow(ctx, nullptr, 8) == nullptr ||
-                   soap_block_stack_save(ctx, nullptr, nullptr, 0) == nullptr;
+    int (*const runs[])(soap & ctx) = {
+        [](soap &ctx) { return soap_wide_string_dup(&ctx, U"abc") == nullptr ? ctx.error : 0; },
+        [](soap &ctx) { return soap_text_buffer_put(&ctx, "abc", 3); },
+        [](soap &ctx) {
+            const bool saved = soap_block_stack_push(&ctx) && soap_block_stack_grow(&ctx, nullptr, 8) &&
+                               soap_block_stack_save(&ctx, nullptr, nullptr, 0);
+            return saved ? 0 : ctx.error;
         }};
-    for (const auto run : runs) {
-        std::unique_ptr<soap> ctx = std::make_unique<soap>();
-        bool failed = false;
-        CaptureStderr();
-        const std::size_t refusals = failing_malloc::at_each_allocation(
-            failing_malloc::refuse::one, [&] { failed = run(ctx.get()); },
-            [&](bool refused) {
-                EXPECT_EQ(failed, refused);
-                EXPECT_EQ(ctx->error, refused ? SOAP_OUT_OF_MEMORY : 0);
-                ctx = std::make_unique<soap>();
-            });
-        EXPECT_GT(refusals, 0u);
-        EXPECT_EQ(GetCapturedStderr(), "");
-    }
+    CaptureStderr();
+    for (const auto run : runs)
+        expect_out_of_memory_at_each_allocation(
+            1, [] { return std::make_unique<soap>(); }, run);
+    EXPECT_EQ(GetCapturedStderr(), "");
 }
 
-TEST(MemoryExhausted, AMoveFailsWholeOrNotAtAll)
+TEST(MemoryExhausted, a_move_fails_whole_or_not_at_all)
 {
     soap source, target;
     for (int i = 0; i < 600; ++i) {

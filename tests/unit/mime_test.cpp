@@ -1,15 +1,8 @@
 // MIME and MTOM messages on the wire and back: delimiters at every place, heads, lazy reading, references.
-#include "support/attachment_checks.h"
-
-#include <algorithm>
 #include <chrono>
 #include <regex>
-#include <set>
 
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_tcp.h>
-
+#include "support/attachment_checks.h"
 #include "support/host_streams.h"
 
 using namespace attachment_exchange;
@@ -163,8 +156,8 @@ TEST(mime_in, reads_part_heads)
     EXPECT_EQ(read.wire->mime.list, read.wire->mime.root);
     std::string summary;
     for (const soap_attachment *p = read.wire->mime.list->next; p != nullptr; p = p->next)
-        summary += text(p->id) + "|" + text(p->location) + "|" + text(p->type) + "|" + text(p->description) +
-                   "|" + std::to_string(p->encoding) + "|" + p->content + "\n";
+        summary += text_of(p->id) + "|" + text_of(p->location) + "|" + text_of(p->type) + "|" +
+                   text_of(p->description) + "|" + std::to_string(p->encoding) + "|" + p->content + "\n";
     EXPECT_EQ(summary, "<1>|there|a/b; c=d|what|" + std::to_string(MIME_BASE64) +
                            "|one\n"
                            "two|(null)|(null)|(null)|0|two\n(null)|(null)|(null)|(null)|0|no head\n"
@@ -198,7 +191,7 @@ TEST(mime_in, takes_a_delimiter_at_every_place_around_the_end_of_the_buffer)
     const std::string start = root("<data href=\"cid:a\"/>") + "\r\n--bb\r\nContent-ID: <a>\r\n\r\n";
     for (std::size_t at = SOAP_BUFFER_SIZE - 12; at <= SOAP_BUFFER_SIZE + 4; ++at) {
         std::string data(at - start.size(), '.');
-        data.replace(data.size() - 7, 7, "\r\n--b\r\r"); // nearly one, right ahead of it
+        data.replace(data.size() - 7, 7, "\r\n--b\r\r"); // nearly one, right before it
         reception read(start + data + "\r\n--bb\r\nContent-ID: <b>\r\n\r\nnext" + END);
         ASSERT_EQ(read.run(), 0) << at;
         ASSERT_TRUE(read.values[0].bytes() == data) << at;
@@ -229,10 +222,8 @@ TEST(mime_in, reports_what_is_wrong_with_a_message)
     };
     for (const wrong_case &c : cases)
         EXPECT_EQ(reception(root("<data href=\"cid:a\"/>") + c.rest).run(), c.error) << c.rule;
-    std::string fields;
-    for (int i = 0; i < 1100; ++i)
-        fields += "Content-ID: <a>\r\n";
-    EXPECT_EQ(reception(root("") + part(fields, "x") + END).run(), SOAP_MIME_ERROR);
+    const std::string endless = part(repeat_text("Content-ID: <a>\r\n", 1100), "x");
+    EXPECT_EQ(reception(root("") + endless + END).run(), SOAP_MIME_ERROR);
 }
 
 TEST(mime_in, mtom_needs_no_mode_of_the_host_when_the_part_or_the_message_says_so)
@@ -357,7 +348,7 @@ TEST(cid, means_an_id_in_several_spellings)
     memory_wire wire;
     for (const auto &c : cases)
         EXPECT_EQ(soap_cid_compare(&wire, c.href, c.id) == 0, c.same)
-            << text(c.href) << " and " << text(c.id);
+            << text_of(c.href) << " and " << text_of(c.id);
 }
 
 TEST(references, are_answered_in_linear_time_in_any_order_and_spelling)
@@ -473,10 +464,10 @@ TEST(values, over_one_buffer_go_out_each_in_its_form)
                 for (std::size_t i = 0; i < 3; ++i) {
                     const value &sent = values[i], &got = read.values[i];
                     EXPECT_EQ(got.bytes(), sent.bytes()) << wire.sent();
-                    EXPECT_EQ(text(got.type), text(sent.type)) << wire.sent();
+                    EXPECT_EQ(text_of(got.type), text_of(sent.type)) << wire.sent();
                     const bool has_id = sent.id != nullptr && *sent.id != '\0';
                     EXPECT_EQ(got.id != nullptr, has_id || sent.type != nullptr) << wire.sent();
-                    EXPECT_TRUE(!has_id || text(sent.id) == got.id) << wire.sent();
+                    EXPECT_TRUE(!has_id || text_of(sent.id) == got.id) << wire.sent();
                     EXPECT_EQ(got.options != nullptr, sent.options != nullptr && (mode & MODE_MTOM) == 0);
                 }
                 attachments.erase(0);
@@ -536,11 +527,8 @@ TEST(attachments, of_one_id_are_refused_by_the_writer)
 // What the callbacks of the host do wrong, and that a stream once opened is closed.
 TEST(streams, of_the_host_that_misbehave_are_told_apart)
 {
-    struct stream {
-        std::string data;
-        std::size_t excess;
-        int opened, closed;
-    };
+    static std::size_t excess;
+    static int opened;
     static const auto open = [](soap *ctx, void *handle, const char *id, const char *,
                                 const char *) -> void * {
         if (std::strstr(id, "memory") != nullptr)
@@ -549,17 +537,12 @@ TEST(streams, of_the_host_that_misbehave_are_told_apart)
             ctx->error = 55;
         if (std::strstr(id, "null") != nullptr || ctx->error != 0)
             return nullptr;
-        static_cast<stream *>(handle)->opened++;
+        ++opened;
         return handle;
     };
-    static const auto read = [](soap *, void *handle, char *buffer, std::size_t length) {
-        auto &source = *static_cast<stream *>(handle);
-        const std::size_t part = std::min(length, source.data.size());
-        std::memcpy(buffer, source.data.data(), part);
-        source.data.erase(0, part);
-        return part + source.excess;
+    static const auto read = [](soap *ctx, void *handle, char *buffer, std::size_t length) {
+        return stream_host::read(ctx, handle, buffer, length) + excess;
     };
-    static const auto close = [](soap *, void *handle) { static_cast<stream *>(handle)->closed++; };
     const struct {
         const char *id;
         std::size_t has, excess, size; // bytes: in the stream, more than asked for, as told
@@ -569,7 +552,7 @@ TEST(streams, of_the_host_that_misbehave_are_told_apart)
     } cases[] = {
         {"fine", 3000, 0, 3000, MODE_BUFFERED, 0, ""},
         {"unknown", 3000, 0, 0, MODE_CHUNKED, 0, ""},
-        {"memory", 0, 0, sizeof(stream), MODE_BUFFERED, 0, ""},
+        {"memory", 0, 0, sizeof(host_stream), MODE_BUFFERED, 0, ""},
         {"no content, null", 0, 0, 0, MODE_BUFFERED, 0, ""}, // an empty attachment
         {"no content, memory", 0, 0, 1, MODE_BUFFERED, SOAP_USER_ERROR, "has a length and no content"},
         {"null", 0, 0, 3000, MODE_BUFFERED, SOAP_USER_ERROR, "open callback gave null for \"null\""},
@@ -584,11 +567,14 @@ TEST(streams, of_the_host_that_misbehave_are_told_apart)
     for (const std::uint32_t form : {MODE_DIME, MTOM, MODE_MIME})
         for (const auto &c : cases) {
             SCOPED_TRACE(std::string(c.id) + " " + std::to_string(form));
-            stream source = {std::string(c.has, 'x'), c.excess, 0, 0};
+            host_stream source = {std::string(c.has, 'x'), 0, SOAP_BUFFER_SIZE};
+            stream_host host;
             memory_wire wire(0, c.framing | MODE_BARE_XML | form);
+            host.serve(wire);
             wire.dime_read_open = wire.mime_read_open = open;
             wire.dime_read = wire.mime_read = read;
-            wire.dime_read_close = wire.mime_read_close = close;
+            excess = c.excess;
+            opened = 0;
             const bool has_content = std::strstr(c.id, "no content") == nullptr;
             char *const handle = has_content ? reinterpret_cast<char *>(&source) : nullptr;
             if (form == MODE_DIME)
@@ -596,7 +582,7 @@ TEST(streams, of_the_host_that_misbehave_are_told_apart)
             else
                 soap_mime_attach(&wire, handle, c.size, MIME_BINARY, "a/b", c.id, nullptr, nullptr);
             EXPECT_EQ(send(wire, {}, false), c.error);
-            EXPECT_EQ(source.closed, source.opened);
+            EXPECT_EQ(source.closed, opened);
             char told[1024] = "";
             soap_fault_print_text(&wire, told, sizeof told);
             EXPECT_NE(std::string(told).find(c.text), std::string::npos) << told;

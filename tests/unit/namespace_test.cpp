@@ -1,11 +1,6 @@
 // The namespace table's working copy and the prefixes in scope.
 #include <chrono>
-#include <set>
-#include <string>
 
-#include <zuv_client_pro/soap_error.h>
-
-#include "support/failing_malloc.h"
 #include "support/writer_fixture.h"
 #include "xml/namespace.h"
 

@@ -1,22 +1,8 @@
 // number_test.cpp - numbers: what the parsers accept and refuse, texts of values, independence of the locale.
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_primitive.h>
-
 #include <bit>
 #include <clocale>
 #include <cmath>
-#include <cstdlib>
-#include <cstring>
-#include <filesystem>
-#include <fstream>
-#include <memory>
-#include <random>
-#include <string>
-#include <vector>
-
 #include <unistd.h>
-
-#include <gtest/gtest.h>
 
 #include "support/python_batch.h"
 
@@ -39,7 +25,7 @@ protected:
     }
 };
 
-TEST_F(Numbers, TakeTheWholeTextWithinTheirRange)
+TEST_F(Numbers, take_the_whole_text_within_their_range)
 {
     EXPECT_EQ(parsed(soap_byte_parse, "-128"), "0 -128");
     EXPECT_EQ(parsed(soap_byte_parse, "128"), "4 -128");
@@ -75,7 +61,7 @@ TEST_F(Numbers, TakeTheWholeTextWithinTheirRange)
     EXPECT_EQ(parsed(soap_ulong64_parse, ""), "4 77");
 }
 
-TEST_F(Numbers, AFailedLookUpStandsForAMissingAttribute)
+TEST_F(Numbers, a_failed_look_up_stands_for_a_missing_attribute)
 {
     std::int32_t value = 3;
     ctx->error = SOAP_REQUIRED;
@@ -84,7 +70,7 @@ TEST_F(Numbers, AFailedLookUpStandsForAMissingAttribute)
     EXPECT_EQ(soap_int_parse(ctx.get(), "4", &value), 0) << "an old error is not the parser's";
 }
 
-TEST_F(Numbers, FloatingTextIsWhatTheCLibraryTakesAndNamesInAnyCase)
+TEST_F(Numbers, floating_text_is_what_the_c_library_takes_and_names_in_any_case)
 {
     constexpr double NONE = -77; // refused
     const struct {
@@ -121,7 +107,7 @@ TEST_F(Numbers, FloatingTextIsWhatTheCLibraryTakesAndNamesInAnyCase)
     EXPECT_STREQ(soap_double_text(ctx.get(), HUGE_VAL), "INF");
 }
 
-TEST_F(Numbers, TheHostsLocaleDoesNotReachTheWire)
+TEST_F(Numbers, the_hosts_locale_does_not_reach_the_wire)
 {
     // A locale of our own, as glibc keeps it, whose decimal point is "~": no machine need have it.
     static const char CATEGORY[] =
@@ -150,7 +136,7 @@ TEST_F(Numbers, TheHostsLocaleDoesNotReachTheWire)
     EXPECT_STREQ(soap_double_text(ctx.get(), 5), "1.5");
 }
 
-TEST_F(Numbers, TextsGoThroughTheContextsFormats)
+TEST_F(Numbers, texts_go_through_the_contexts_formats)
 {
     EXPECT_STREQ(soap_long_text(ctx.get(), INT64_MIN), "-9223372036854775808");
     EXPECT_STREQ(soap_ulong_text(ctx.get(), UINT64_MAX), "18446744073709551615");
@@ -161,7 +147,7 @@ TEST_F(Numbers, TextsGoThroughTheContextsFormats)
 }
 
 // Python prints and reads the nearest value, as the engine must.
-TEST_F(Numbers, RandomValuesAgreeWithPython)
+TEST_F(Numbers, random_values_agree_with_python)
 {
     std::mt19937_64 random(1);
     std::vector<double> values;

@@ -1,14 +1,5 @@
 // plugin_test.cpp - the registry of plug-ins: finding, copying, deleting.
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_plugin.h>
-
-#include <string>
-#include <vector>
-
-#include <gtest/gtest.h>
-
-#include "support/failing_malloc.h"
+#include "support/testing.h"
 
 namespace {
 
@@ -61,7 +52,7 @@ protected:
     void SetUp() override { deleted.clear(); }
 };
 
-TEST_F(Plugin, TheNewestOfAnIdIsFoundByContent)
+TEST_F(Plugin, the_newest_of_an_id_is_found_by_content)
 {
     soap ctx;
     EXPECT_EQ(add(&ctx, {"id", "old", nullptr}), 0);
@@ -75,7 +66,7 @@ TEST_F(Plugin, TheNewestOfAnIdIsFoundByContent)
     EXPECT_STREQ(static_cast<char *>(soap_plugin_find(&ctx, "other")), "x");
 }
 
-TEST_F(Plugin, OneThatFailsOrCannotBeDeletedIsNotKept)
+TEST_F(Plugin, one_that_fails_or_cannot_be_deleted_is_not_kept)
 {
     testing::internal::CaptureStderr();
     {
@@ -88,7 +79,7 @@ TEST_F(Plugin, OneThatFailsOrCannotBeDeletedIsNotKept)
     EXPECT_TRUE(deleted.empty());
 }
 
-TEST_F(Plugin, TheyAreDeletedNewestFirst)
+TEST_F(Plugin, they_are_deleted_newest_first)
 {
     {
         soap ctx;
@@ -98,7 +89,7 @@ TEST_F(Plugin, TheyAreDeletedNewestFirst)
     EXPECT_EQ(deleted, (std::vector<std::string>{"second", "first"}));
 }
 
-TEST_F(Plugin, ACopyReversesThemAndDeletesOnlyWhatItCopied)
+TEST_F(Plugin, a_copy_reverses_them_and_deletes_only_what_it_copied)
 {
     soap source;
     add(&source, {"shared", "shared", nullptr});
@@ -113,7 +104,7 @@ TEST_F(Plugin, ACopyReversesThemAndDeletesOnlyWhatItCopied)
     EXPECT_EQ(deleted, std::vector<std::string>{"copied"});
 }
 
-TEST_F(Plugin, ARefusalFailsTheCopyWithoutALeak)
+TEST_F(Plugin, a_refusal_fails_the_copy_without_a_leak)
 {
     testing::internal::CaptureStderr();
     {
@@ -132,7 +123,7 @@ TEST_F(Plugin, ARefusalFailsTheCopyWithoutALeak)
     EXPECT_EQ(deleted, (std::vector<std::string>{"copied", "copied", "c", "r"}));
 }
 
-TEST_F(Plugin, RegistrationWithoutMemoryGivesItsError)
+TEST_F(Plugin, registration_without_memory_gives_its_error)
 {
     soap ctx;
     const failing_malloc::scope armed(1, failing_malloc::refuse::all_from);

@@ -4,30 +4,15 @@
 // One row for each operation; the port descriptions tell which there must be. The golden files are composed
 // by hand from the contract, never recorded; a request is read from its file and must go out as it stands
 // there. The rules of the cycle itself: call_cycle_test.cpp.
-#include <gtest/gtest.h>
-
-#include <deque>
-#include <filesystem>
-#include <functional>
-#include <memory>
 #include <regex>
-#include <set>
-
 #include <zuv_client_pro/InventoryReportSoapBindingProxy.h>
 #include <zuv_client_pro/ProblemReportSoapBinding.h>
-#include <zuv_client_pro/ProfileSoapBindingProxy.h>
 #include <zuv_client_pro/StatusReportSoapBindingProxy.h>
 #include <zuv_client_pro/UpdateOrderSoapBindingProxy.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_identity.h>
-#include <zuv_client_pro/soap_io.h>
-#include <zuv_client_pro/soap_tcp.h>
-#include <zuv_client_pro/soap_xml.h>
-#include <zuv_client_pro/type_ids.h>
 
 #include "support/call_wire.h"
 #include "support/golden.h"
+#include "support/testing.h"
 
 namespace {
 
@@ -52,13 +37,7 @@ struct operation {
     std::function<void()> expect_answer = {}; // the response holds what answer_content says
 
     std::string tag() const { return "protocol" + port + ":" + name; }
-    std::string golden_name() const
-    {
-        std::string low = port;
-        std::transform(low.begin(), low.end(), low.begin(), [](char c) { return c < 'a' ? c + 32 : c; });
-        return low + "_" + name + ".txt";
-    }
-    golden::message golden() const { return golden::read(golden_name()); }
+    golden::message golden() const { return golden::read(port, name); }
 
     // The connection from now on, with one answer.
     void connect(std::string answer)
@@ -74,7 +53,7 @@ struct operation {
     }
 };
 
-// The request of a row, read from its golden file, with its header. What the reader misses is missed in what
+// The request of a row, read from its golden form, with its header. What the reader misses is missed in what
 // is sent.
 template <class R> R *request_of(const operation &row, soap *ctx)
 {
@@ -277,7 +256,7 @@ TEST(Ports, have_a_row_for_every_operation_that_their_descriptions_name)
             named.insert(file.path().stem().string() + "." + it->str(1));
     }
     for (const auto &row : all_rows()) {
-        EXPECT_TRUE(rows.insert(row.port + "." + row.name).second) << row.golden_name();
+        EXPECT_TRUE(rows.insert(row.port + "." + row.name).second) << row.tag();
         const std::string wrapper = "-" + row.tag();
         EXPECT_STREQ(wrapper.c_str(), soap_type_name(row.request_id));
         EXPECT_STREQ((wrapper + "Response").c_str(), soap_type_name(row.response_id));
@@ -288,7 +267,7 @@ TEST(Ports, have_a_row_for_every_operation_that_their_descriptions_name)
 TEST(Ports, send_the_golden_request_and_read_the_answer_into_its_class)
 {
     for (operation &row : all_rows()) {
-        SCOPED_TRACE(row.golden_name());
+        SCOPED_TRACE(row.tag());
         const golden::message request = row.golden();
         row.connect(answer(row));
         const outcome got = row.call(row, nullptr, true);
@@ -327,7 +306,7 @@ TEST(Ports, read_every_fault_into_its_member_of_the_detail)
         const bool version_12 = i >= std::size(spelled);
         const std::string name =
             std::regex_replace(spelled[i % std::size(spelled)], std::regex("_x002e"), ".");
-        SCOPED_TRACE(row.golden_name() + " " + name);
+        SCOPED_TRACE(row.tag() + " " + name);
         const bool client = name.rfind("Client", 0) == 0;
         const std::string detail = "<c:" + name + "><c:subcode>s</c:subcode><c:description>why " + name +
                                    "</c:description></c:" + name + ">";

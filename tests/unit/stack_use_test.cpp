@@ -2,22 +2,11 @@
 // writing.
 //
 // Meaningful in an optimised build only: others are skipped.
-#include <gtest/gtest.h>
-
+#include <pthread.h>
 #include <sys/mman.h>
 
-#include <algorithm>
-#include <cstdio>
-#include <deque>
-#include <functional>
-#include <string>
-
-#include <pthread.h>
-
-#include <zuv_client_pro/ProfileSoapBindingProxy.h>
-#include <zuv_client_pro/protocol.h>
-
 #include "support/call_wire.h"
+#include "support/testing.h"
 
 namespace {
 
@@ -49,31 +38,13 @@ std::size_t stack_used_by(std::function<void()> work)
     return static_cast<std::size_t>(end - deepest);
 }
 
-std::string repeated(const std::string &text, std::size_t times)
-{
-    std::string all;
-    for (std::size_t i = 0; i < times; ++i)
-        all += text;
-    return all;
-}
-
-std::string answer(const std::string &content)
-{
-    return http_answer("<E:Envelope xmlns:E=\"http://schemas.xmlsoap.org/soap/envelope/\""
-                       " xmlns:p=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0/Profile\""
-                       " xmlns:c=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0\"><E:Body><p:setResponse>" +
-                       content + "</p:setResponse></E:Body></E:Envelope>");
-}
-
 // Sends the request, which is answered by `content`.
 int set(protocolProfile__ProfileContent &request, const std::string &content)
 {
-    call_wire wire;
-    ProfileSoapBindingProxy proxy;
-    wire.carry(proxy);
-    wire.answers.push_back(answer(content));
-    __protocolProfile__setResponse response{};
-    return proxy.set(&request, response);
+    profile_call call(0);
+    call.wire.answers = {
+        http_answer(answer_envelope("<E:Body><p:setResponse>" + content + "</p:setResponse></E:Body>"))};
+    return call.proxy.set(&request, call.held);
 }
 
 // A level more costs no more than the limit.
@@ -102,8 +73,8 @@ TEST(StackUse, of_reading_one_level)
     for (const auto &c : cases)
         expect_bounded(c.rule, [&c](std::size_t levels) {
             protocolProfile__ProfileContent request;
-            EXPECT_EQ(0, set(request, c.around_begin + repeated(c.begin, levels) + repeated(c.end, levels) +
-                                          c.around_end))
+            EXPECT_EQ(0, set(request, c.around_begin + repeat_text(c.begin, levels) +
+                                          repeat_text(c.end, levels) + c.around_end))
                 << c.rule;
         });
 }

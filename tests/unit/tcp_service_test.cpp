@@ -1,13 +1,5 @@
 // tcp_service_test.cpp - datagrams, the way through a proxy, and the accepting side.
-#include <cerrno>
 #include <fcntl.h>
-#include <string>
-#include <tuple>
-
-#include <gtest/gtest.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_tcp.h>
 
 #include "support/tcp_client.h"
 

@@ -1,20 +1,9 @@
 // tcp_test.cpp - stream sockets of a context against peers on the loopback.
 //
 // Elsewhere: datagrams, proxies and the accepting side (tcp_service_test.cpp).
-#include <cerrno>
-#include <climits>
 #include <fcntl.h>
 #include <netinet/tcp.h>
 #include <optional>
-#include <sstream>
-#include <vector>
-
-#include <gtest/gtest.h>
-#include <zuv_client_pro/soap_attachment.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_tcp.h>
-#include <zuv_client_pro/soap_tls.h>
 
 #include "net/tcp_socket.h"
 #include "support/tcp_client.h"
@@ -277,39 +266,6 @@ TEST_F(tcp, descriptors_that_select_cannot_serve_are_refused)
 
 // --- bytes ---
 
-TEST_F(tcp, a_large_message_arrives_whole_in_both_modes)
-{
-    const std::string message(3 << 20, 'm');
-    for (const int limit : {0, 5}) {
-        std::string arrived;
-        {
-            const peer server([&](int client) { arrived = loopback::read_bytes(client, message.size()); });
-            context ctx;
-            ctx->send_timeout = limit;
-            ASSERT_GE(open_to(ctx, server.port()), 0);
-            EXPECT_EQ(tcp_send(ctx.get(), message.data(), message.size()), 0);
-            EXPECT_EQ(receive(ctx), "");
-            EXPECT_EQ(ctx->errno_value, 0) << "the peer's end is no failure";
-        }
-        EXPECT_TRUE(arrived == message);
-    }
-}
-
-TEST_F(tcp, a_peer_that_is_gone_gives_an_error_and_no_signal)
-{
-    const peer server([](int client) {
-        const linger reset{1, 0};
-        loopback::read_bytes(client, 1);
-        setsockopt(client, SOL_SOCKET, SO_LINGER, &reset, sizeof reset);
-    });
-    connected ctx(server.port());
-    EXPECT_EQ(tcp_send(ctx.get(), "x", 1), 0);
-    EXPECT_EQ(receive(ctx), "");
-    EXPECT_EQ(ctx->errno_value, ECONNRESET);
-    EXPECT_EQ(tcp_send(ctx.get(), "x", 1), -1);
-    EXPECT_EQ(ctx->errno_value, EPIPE);
-}
-
 TEST_F(tcp, a_receive_gives_up_after_so_many_false_alarms_but_not_for_signals)
 {
     const peer server([](int client) {
@@ -540,41 +496,6 @@ TEST_F(tcp, hooks_may_refuse_the_release)
     EXPECT_EQ(soap_socket_release(ctx.get()), 78);
     EXPECT_EQ(ctx->error, 78);
     ctx->on_close = tcp_disconnect;
-}
-
-TEST_F(tcp, an_abandoned_socket_is_neither_used_nor_closed_again)
-{
-    // The second server starts late: its thread would have the number reserved that is given up here.
-    const peer server(wait_for_end);
-    std::optional<peer> next_server;
-    {
-        context ctx;
-        EXPECT_EQ(soap_force_close(ctx.get()), 0);
-        const int number = open_to(ctx, server.port());
-        ASSERT_GE(number, 0);
-        int ends[2];
-        ASSERT_EQ(socketpair(AF_UNIX, SOCK_STREAM, 0, ends), 0);
-        ctx->keep_alive = 1;
-        EXPECT_EQ(soap_force_close(ctx.get()), 0);
-        EXPECT_EQ(ctx->socket, number);
-        EXPECT_EQ(ctx->keep_alive, 0);
-        EXPECT_FALSE(soap_socket_open(ctx.get()));
-        ASSERT_EQ(dup2(ends[0], number), number) << "the number now belongs to somebody else";
-        next_server.emplace(wait_for_end);
-        EXPECT_EQ(soap_force_close(ctx.get()), 0);
-        EXPECT_EQ(tcp_send(ctx.get(), "x", 1), -1);
-        EXPECT_EQ(ctx->errno_value, EBADF);
-        write_text(ends[1], "y");
-        EXPECT_EQ(receive(ctx), "");
-        EXPECT_EQ(tcp_peek(ctx.get()), 0);
-        EXPECT_EQ(soap_socket_release(ctx.get()), 0);
-        EXPECT_EQ(ctx->socket, -1);
-        EXPECT_GE(open_to(ctx, next_server->port()), 0);
-        EXPECT_TRUE(soap_socket_open(ctx.get()));
-        EXPECT_EQ(loopback::read_bytes(number, 1), "y");
-        for (const int descriptor : {number, ends[0], ends[1]})
-            EXPECT_EQ(close(descriptor), 0);
-    }
 }
 
 TEST_F(tcp, socket_errors_have_texts_by_their_mode)

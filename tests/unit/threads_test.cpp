@@ -3,15 +3,7 @@
 //
 // In an ordinary build this looks at the answers; the preset "tsan" looks at the memory as well.
 #include <atomic>
-#include <functional>
-#include <memory>
-#include <string>
 #include <thread>
-#include <vector>
-
-#include <gtest/gtest.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_plugin.h>
 
 #include "support/scripted_client.h"
 #include "support/socket_calls.h"

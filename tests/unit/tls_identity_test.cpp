@@ -1,13 +1,7 @@
 // tls_identity_test.cpp - which certificates are accepted: a table of certificates by flags, under TLS 1.2
 // and 1.3. The outcome of a connection is one letter.
-#include <algorithm>
-#include <regex>
-#include <string>
-
-#include <gtest/gtest.h>
 #include <openssl/ssl.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_tls.h>
+#include <regex>
 
 #include "net/tls_connection.h"
 #include "support/socket_calls.h"
@@ -186,9 +180,7 @@ TEST_F(tls_identity, is_decided_by_certificate_and_flags)
 TEST_F(tls_identity, the_reason_of_a_refusal_is_short_and_harmless_text)
 {
     const std::string label(60, 'x'), evil = "<a>&\r\n\x01\xC3\xA4'\"";
-    std::string names = "DNS:" + label;
-    for (int i = 0; i < 100; ++i)
-        names += ",DNS:" + label;
+    const std::string names = "DNS:" + label + repeat_text(",DNS:" + label, 100);
     for (const subject &who : {subject{evil, ""}, subject{evil, names}, subject{evil, "", -2 * DAY, -DAY}}) {
         tls_peer server(server_for(who), echo);
         context ctx;

@@ -1,16 +1,7 @@
 // tls_setup_test.cpp - the set-up of TLS, and the library's own server side.
 #include <future>
-#include <string>
-#include <vector>
-
-#include <gtest/gtest.h>
 #include <openssl/err.h>
 #include <openssl/ssl.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_io.h>
-#include <zuv_client_pro/soap_tcp.h>
-#include <zuv_client_pro/soap_tls.h>
 
 #include "support/socket_calls.h"
 #include "support/tls_peer.h"
@@ -122,13 +113,7 @@ TEST_F(tls_setup, new_rules_take_force_at_the_next_call_of_the_context_that_has_
             SCOPED_TRACE(std::string(c.rule) + (version == TLS1_2_VERSION ? ", 1.2" : ", 1.3"));
             std::vector<int> resumed;
             {
-                tls_peer server(
-                    server_for(c.server, version),
-                    [&](SSL *connection) {
-                        resumed.push_back(SSL_session_reused(connection));
-                        answer_each(connection);
-                    },
-                    10);
+                tls_peer server(server_for(c.server, version), noting(resumed, answer_each), 10);
                 context ctx(MODE_KEEP_ALIVE);
                 ASSERT_EQ(set_up_client(ctx, c.first_flags), 0);
                 EXPECT_EQ(get(ctx.get(), server.port()), 0) << ctx.fault_text();
@@ -157,7 +142,7 @@ TEST_F(tls_setup, a_kept_connection_carries_calls_of_its_own_rules_only)
         const char *rule;
         void (*change)(soap &ctx);
         std::uint32_t legacy;
-        int connections;
+        std::size_t connections;
     } cases[] = {
         {"nothing changes", [](soap &) {}, 0, 1},
         {"flags", [](soap &ctx) { ctx.tls_flags |= TLS_STRICT_HOST_CHECK; }, 0, 2},
@@ -172,15 +157,9 @@ TEST_F(tls_setup, a_kept_connection_carries_calls_of_its_own_rules_only)
          0, 2},
     };
     for (const auto &c : cases) {
-        int connections = 0;
+        std::vector<int> resumed;
         {
-            tls_peer server(
-                server_for(BY_NAME),
-                [&](SSL *connection) {
-                    ++connections;
-                    answer_each(connection);
-                },
-                2);
+            tls_peer server(server_for(BY_NAME), noting(resumed, answer_each), 2);
             context ctx(MODE_KEEP_ALIVE);
             ctx->legacy = c.legacy;
             ASSERT_EQ(set_up_client(ctx), 0);
@@ -188,7 +167,7 @@ TEST_F(tls_setup, a_kept_connection_carries_calls_of_its_own_rules_only)
             c.change(*ctx.get());
             EXPECT_EQ(get(ctx.get(), server.port()), 0) << c.rule;
         }
-        EXPECT_EQ(connections, c.connections) << c.rule;
+        EXPECT_EQ(resumed.size(), c.connections) << c.rule;
     }
 }
 

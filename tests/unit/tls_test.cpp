@@ -2,23 +2,13 @@
 //
 // Elsewhere: who the peer is (tls_identity_test.cpp), set-up and the library's server side
 // (tls_setup_test.cpp).
-#include <cerrno>
 #include <future>
-#include <optional>
-#include <string>
-#include <tuple>
-#include <vector>
-
-#include <gtest/gtest.h>
 #include <openssl/ssl.h>
-#include <zuv_client_pro/soap_attachment.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_http.h>
-#include <zuv_client_pro/soap_tcp.h>
-#include <zuv_client_pro/soap_tls.h>
+#include <optional>
 
 #include "net/tcp_socket.h"
 #include "net/tls_connection.h"
+#include "support/scripted_server.h"
 #include "support/socket_calls.h"
 #include "support/tls_peer.h"
 
@@ -149,22 +139,23 @@ TEST_F(tls, a_tunnel_through_a_proxy_leads_to_the_host_behind_it)
 
 // --- sessions ---
 
-TEST_F(tls, a_session_is_resumed_by_its_own_host_only)
+TEST_F(tls, a_session_is_resumed_by_its_own_host_and_port_only)
 {
     for (const int version : {TLS1_2_VERSION, TLS1_3_VERSION}) {
         std::vector<int> reused;
         {
-            tls_peer server(
-                server_for({"*.test", ""}, version),
-                [&](SSL *connection) {
-                    reused.push_back(SSL_session_reused(connection));
-                    echo(connection);
-                },
-                5);
+            server_context made = server_for({"*.test", ""}, version);
+            SSL_CTX_up_ref(made.get());
+            tls_peer one(server_context(made.get()), noting(reused), 6),
+                other(std::move(made), noting(reused));
+            const std::pair<const char *, int> calls[] = {{"a.test", one.port()}, {"a.test", one.port()},
+                                                          {"b.test", one.port()}, {"a.test", one.port()},
+                                                          {"a.test", one.port()}, {"a.test", other.port()},
+                                                          {"a.test", one.port()}};
             context ctx;
             ASSERT_EQ(set_up_client(ctx), 0);
-            for (const char *host : {"a.test", "a.test", "b.test", "a.test", "a.test"}) {
-                ASSERT_GE(open_to(ctx, server.port(), host), 0) << ctx.fault_text();
+            for (const auto &[host, port] : calls) {
+                ASSERT_GE(open_to(ctx, port, host), 0) << ctx.fault_text();
                 EXPECT_EQ(ctx->tls_session, nullptr) << "used once";
                 EXPECT_EQ(exchange(ctx, "x"), "x");
                 // The next endpoint may be parsed before this connection is closed.
@@ -172,58 +163,12 @@ TEST_F(tls, a_session_is_resumed_by_its_own_host_only)
                 EXPECT_EQ(tcp_disconnect(ctx.get()), 0);
                 EXPECT_NE(ctx->tls_session, nullptr);
                 EXPECT_STREQ(ctx->session_host, host);
-                EXPECT_EQ(ctx->session_port, server.port());
+                EXPECT_EQ(ctx->session_port, port);
                 EXPECT_EQ(ctx->tls_connection, nullptr);
             }
         }
-        EXPECT_EQ(reused, (std::vector<int>{0, 1, 0, 0, 1})) << version;
+        EXPECT_EQ(reused, (std::vector<int>{0, 1, 0, 0, 1, 0, 0})) << version;
     }
-}
-
-TEST_F(tls, a_session_is_not_offered_to_another_port_of_its_host)
-{
-    for (const int version : {TLS1_2_VERSION, TLS1_3_VERSION}) {
-        std::vector<int> reused;
-        {
-            const auto serve = [&](SSL *connection) {
-                reused.push_back(SSL_session_reused(connection));
-                echo(connection);
-            };
-            server_context made = server_for(BY_NAME, version);
-            SSL_CTX_up_ref(made.get());
-            tls_peer one(server_context(made.get()), serve, 2), other(std::move(made), serve);
-            context ctx;
-            ASSERT_EQ(set_up_client(ctx), 0);
-            for (const int port : {one.port(), one.port(), other.port()}) {
-                ASSERT_GE(open_to(ctx, port), 0) << ctx.fault_text();
-                EXPECT_EQ(exchange(ctx, "x"), "x");
-                EXPECT_EQ(tcp_disconnect(ctx.get()), 0);
-            }
-        }
-        EXPECT_EQ(reused, (std::vector<int>{0, 1, 0})) << version;
-    }
-}
-
-TEST_F(tls, a_session_accepted_under_former_rules_is_not_resumed)
-{
-    std::vector<int> reused;
-    {
-        tls_peer server(
-            server_for(EXPIRED),
-            [&](SSL *connection) {
-                reused.push_back(SSL_session_reused(connection));
-                echo(connection);
-            },
-            2);
-        context ctx;
-        ASSERT_EQ(set_up_client(ctx, VERIFIED | TLS_ALLOW_EXPIRED), 0);
-        ASSERT_GE(open_to(ctx, server.port()), 0);
-        EXPECT_EQ(exchange(ctx, "x"), "x");
-        EXPECT_EQ(tcp_disconnect(ctx.get()), 0);
-        ASSERT_EQ(set_up_client(ctx), 0);
-        EXPECT_EQ(open_to(ctx, server.port()), -1);
-    }
-    EXPECT_EQ(reused, std::vector<int>{0});
 }
 
 // --- transfers ---
@@ -243,31 +188,6 @@ TEST_F(tls, a_call_on_a_kept_connection_costs_three_system_calls_and_two_more_wi
             EXPECT_EQ(socket_calls::counts.all(), limit == 0 ? 3 : 5);
             EXPECT_EQ(socket_calls::counts.clock == 0, limit == 0);
         }
-    }
-}
-
-TEST_F(tls, a_large_message_arrives_whole_in_both_modes)
-{
-    const std::string message(1 << 20, 'm');
-    for (const int limit : {0, 5}) {
-        std::string arrived;
-        {
-            tls_peer server(server_for(BY_NAME), [&](SSL *connection) {
-                std::vector<char> buffer(16384);
-                int count;
-                while (arrived.size() < message.size() &&
-                       (count = SSL_read(connection, buffer.data(), static_cast<int>(buffer.size()))) > 0)
-                    arrived.append(buffer.data(), static_cast<std::size_t>(count));
-                SSL_write(connection, "done", 4);
-            });
-            connected ctx(server.port(), limit);
-            EXPECT_EQ(tcp_send(ctx.get(), message.data(), message.size()), 0);
-            char answer[8];
-            EXPECT_EQ(tcp_recv(ctx.get(), answer, sizeof answer), 4u);
-            EXPECT_EQ(tcp_recv(ctx.get(), answer, sizeof answer), 0u);
-            EXPECT_EQ(ctx->errno_value, 0);
-        }
-        EXPECT_TRUE(arrived == message);
     }
 }
 
@@ -310,25 +230,6 @@ TEST_F(tls, messages_of_the_protocol_alone_are_read_no_longer_than_the_call_may_
     socket_calls::reset();
     EXPECT_LE(socket_calls::counts.recv, 2);
     EXPECT_STREQ(soap_eof_text(ctx.get()), "Operation interrupted or timed out (1000 s call limit)");
-}
-
-TEST_F(tls, a_peer_that_is_gone_gives_an_error_and_no_signal)
-{
-    tls_peer server(server_for(BY_NAME), [](SSL *connection) {
-        const linger reset{1, 0};
-        char byte;
-        SSL_read(connection, &byte, 1);
-        setsockopt(SSL_get_fd(connection), SOL_SOCKET, SO_LINGER, &reset, sizeof reset);
-    });
-    connected ctx(server.port());
-    signal(SIGPIPE, SIG_DFL);
-    EXPECT_EQ(exchange(ctx, "x"), "");
-    EXPECT_EQ(ctx->errno_value, ECONNRESET);
-    while (tcp_send(ctx.get(), "x", 1) == 0) {
-    }
-    tcp_disconnect(ctx.get());
-    signal(SIGPIPE, SIG_IGN);
-    EXPECT_EQ(ctx->socket, -1);
 }
 
 // --- liveness and the end ---
@@ -386,25 +287,101 @@ TEST_F(tls, neither_the_question_nor_the_end_waits_for_a_peer_that_reads_nothing
     }
 }
 
-TEST_F(tls, an_abandoned_socket_is_left_alone)
+// --- the same over TCP and TLS ---
+
+using scripted::line;
+using scripted::server;
+
+int open_to(context &ctx, const server &to, bool secure, int transfer_limit = 0)
 {
-    // The second server starts late: its thread would have the number reserved that is given up here.
-    tls_peer server(server_for(BY_NAME), echo);
-    std::optional<tls_peer> next_server;
-    connected ctx(server.port());
-    const int number = ctx->socket;
-    int ends[2];
-    ASSERT_EQ(socketpair(AF_UNIX, SOCK_STREAM, 0, ends), 0);
-    EXPECT_EQ(soap_force_close(ctx.get()), 0);
-    ASSERT_EQ(dup2(ends[0], number), number) << "the number now belongs to somebody else";
-    next_server.emplace(server_for(BY_NAME), echo);
-    EXPECT_EQ(tcp_send(ctx.get(), "x", 1), -1);
-    EXPECT_EQ(soap_socket_release(ctx.get()), 0);
-    EXPECT_EQ(recv(ends[1], ends, 1, MSG_DONTWAIT), -1) << "not a byte went to the new owner of the number";
-    EXPECT_GE(open_to(ctx, next_server->port()), 0);
-    EXPECT_EQ(exchange(ctx, "x"), "x");
-    for (const int descriptor : {number, ends[0], ends[1]})
-        EXPECT_EQ(close(descriptor), 0);
+    ctx->send_timeout = ctx->recv_timeout = transfer_limit;
+    if (secure) {
+        EXPECT_EQ(set_up_client(ctx), 0);
+    }
+    return tcp_connect(ctx.get(), to.endpoint().c_str(), "peer.test", to.port());
+}
+
+TEST_F(tls, and_tcp_bring_a_large_message_whole_with_limits_and_without)
+{
+    const std::string message(3 << 20, 'm');
+    for (const bool secure : {false, true})
+        for (const int limit : {0, 5}) {
+            std::string arrived;
+            {
+                const server one(
+                    [&](line &end) {
+                        arrived = end.bytes(message.size());
+                        end.send("done");
+                    },
+                    secure);
+                context ctx;
+                ASSERT_GE(open_to(ctx, one, secure, limit), 0) << secure;
+                EXPECT_EQ(tcp_send(ctx.get(), message.data(), message.size()), 0);
+                char answer[8];
+                EXPECT_EQ(tcp_recv(ctx.get(), answer, sizeof answer), 4u);
+                EXPECT_EQ(tcp_recv(ctx.get(), answer, sizeof answer), 0u);
+                EXPECT_EQ(ctx->errno_value, 0) << "the peer's end is no failure";
+            }
+            EXPECT_TRUE(arrived == message) << secure << limit;
+        }
+}
+
+TEST_F(tls, and_tcp_give_an_error_and_no_signal_when_the_peer_is_gone)
+{
+    for (const bool secure : {false, true}) {
+        const server one([](line &end) { end.bytes(1), end.reset(); }, secure);
+        context ctx;
+        ASSERT_GE(open_to(ctx, one, secure), 0) << secure;
+        signal(SIGPIPE, SIG_DFL);
+        EXPECT_EQ(exchange(ctx, "x"), "");
+        EXPECT_EQ(ctx->errno_value, ECONNRESET) << secure;
+        while (tcp_send(ctx.get(), "x", 1) == 0) {
+        }
+        EXPECT_EQ(ctx->errno_value, EPIPE) << secure;
+        tcp_disconnect(ctx.get());
+        signal(SIGPIPE, SIG_IGN);
+        EXPECT_EQ(ctx->socket, -1);
+    }
+}
+
+TEST_F(tls, and_tcp_neither_use_nor_close_an_abandoned_socket)
+{
+    for (const bool secure : {false, true}) {
+        SCOPED_TRACE(secure);
+        // The second server starts late: its thread would have the number reserved that is given up here.
+        const auto echoing = [](line &end) { end.send(end.bytes(1)), end.await_end(); };
+        const server one(echoing, secure);
+        std::optional<server> next;
+        context ctx;
+        EXPECT_EQ(soap_force_close(ctx.get()), 0);
+        const int number = open_to(ctx, one, secure);
+        ASSERT_GE(number, 0);
+        int ends[2];
+        ASSERT_EQ(socketpair(AF_UNIX, SOCK_STREAM, 0, ends), 0);
+        ctx->keep_alive = 1;
+        EXPECT_EQ(soap_force_close(ctx.get()), 0);
+        EXPECT_EQ(ctx->socket, number);
+        EXPECT_EQ(ctx->keep_alive, 0);
+        EXPECT_FALSE(soap_socket_open(ctx.get()));
+        ASSERT_EQ(dup2(ends[0], number), number) << "the number now belongs to somebody else";
+        next.emplace(echoing, secure);
+        EXPECT_EQ(soap_force_close(ctx.get()), 0);
+        EXPECT_EQ(tcp_send(ctx.get(), "x", 1), -1);
+        EXPECT_EQ(ctx->errno_value, EBADF);
+        loopback::write_text(ends[1], "y");
+        char byte;
+        EXPECT_EQ(tcp_recv(ctx.get(), &byte, 1), 0u);
+        EXPECT_EQ(tcp_peek(ctx.get()), 0);
+        EXPECT_EQ(soap_socket_release(ctx.get()), 0);
+        EXPECT_EQ(ctx->socket, -1);
+        EXPECT_EQ(recv(ends[1], &byte, 1, MSG_DONTWAIT), -1) << "not a byte went to the number's new owner";
+        EXPECT_GE(open_to(ctx, *next, secure), 0);
+        EXPECT_TRUE(soap_socket_open(ctx.get()));
+        EXPECT_EQ(exchange(ctx, "x"), "x");
+        EXPECT_EQ(loopback::read_bytes(number, 1), "y");
+        for (const int descriptor : {number, ends[0], ends[1]})
+            EXPECT_EQ(close(descriptor), 0);
+    }
 }
 
 } // namespace

@@ -1,20 +1,9 @@
 // trace_log_test.cpp - the trace files of a context, and certificates taken out of message texts.
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_log.h>
-
-#include <cstring>
-#include <filesystem>
-#include <fstream>
-#include <memory>
-#include <sstream>
-#include <string>
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <gtest/gtest.h>
-
-#include "support/failing_malloc.h"
 #include "support/memory_wire.h"
+#include "support/testing.h"
 
 namespace {
 
@@ -49,7 +38,7 @@ protected:
     std::string directory;
 };
 
-TEST_F(TraceLog, BothDirectionsGoToTheDefaultFileAtTheirFirstByte)
+TEST_F(TraceLog, both_directions_go_to_the_default_file_at_their_first_byte)
 {
     soap ctx;
     set_default(path("later.log"));
@@ -64,7 +53,7 @@ TEST_F(TraceLog, BothDirectionsGoToTheDefaultFileAtTheirFirstByte)
     EXPECT_EQ(content_of(path("default.log")), std::string("out\0put;input;!", 15)) << "appended";
 }
 
-TEST_F(TraceLog, AChannelFollowsItsOwnPath)
+TEST_F(TraceLog, a_channel_follows_its_own_path)
 {
     soap ctx;
     write(ctx, SOAP_LOG_SENT, "a");
@@ -78,7 +67,7 @@ TEST_F(TraceLog, AChannelFollowsItsOwnPath)
     EXPECT_EQ(ctx.log_streams[SOAP_LOG_RECEIVED], nullptr);
 }
 
-TEST_F(TraceLog, HoldsTheBytesOnTheWireAndWhatTheyUnpackTo)
+TEST_F(TraceLog, holds_the_bytes_on_the_wire_and_what_they_unpack_to)
 {
     const std::string sent = path("sent.log"), received = path("received.log"), body = "<plain/>";
     memory_wire wire(0, MODE_BUFFERED | MODE_BARE_XML | MODE_DEFLATE);
@@ -94,7 +83,7 @@ TEST_F(TraceLog, HoldsTheBytesOnTheWireAndWhatTheyUnpackTo)
     EXPECT_EQ(content_of(received), wire.sent() + body);
 }
 
-TEST_F(TraceLog, ANewFileIsForItsOwnerAloneAndAnOldOneIsLeftAsItIs)
+TEST_F(TraceLog, a_new_file_is_for_its_owner_alone_and_an_old_one_is_left_as_it_is)
 {
     const mode_t before = umask(0);
     std::ofstream(path("old.log")) << "old;";
@@ -112,7 +101,7 @@ TEST_F(TraceLog, ANewFileIsForItsOwnerAloneAndAnOldOneIsLeftAsItIs)
     EXPECT_EQ(content_of(path("old.log")), "old;more");
 }
 
-TEST_F(TraceLog, AFileThatCannotBeOpenedIsTriedAgain)
+TEST_F(TraceLog, a_file_that_cannot_be_opened_is_tried_again)
 {
     soap ctx;
     soap_log_set_sent(&ctx, path("missing/sent.log").c_str());
@@ -123,7 +112,7 @@ TEST_F(TraceLog, AFileThatCannotBeOpenedIsTriedAgain)
     EXPECT_EQ(content_of(path("missing/sent.log")), "kept");
 }
 
-TEST_F(TraceLog, ADefaultWithoutTextOrTerminatorIsSafe)
+TEST_F(TraceLog, a_default_without_text_or_terminator_is_safe)
 {
     set_default("");
     {
@@ -135,7 +124,7 @@ TEST_F(TraceLog, ADefaultWithoutTextOrTerminatorIsSafe)
     EXPECT_EQ(std::strlen(ctx.log_paths[SOAP_LOG_SENT]), SOAP_LOG_PATH_SIZE);
 }
 
-TEST_F(TraceLog, WithoutMemoryForAPathTheChannelIsOff)
+TEST_F(TraceLog, without_memory_for_a_path_the_channel_is_off)
 {
     soap ctx;
     {
@@ -147,7 +136,7 @@ TEST_F(TraceLog, WithoutMemoryForAPathTheChannelIsOff)
 
 std::string redacted(const std::string &message)
 {
-    const std::unique_ptr<char[]> copy(new char[message.size()]); // no terminator behind the message
+    const std::unique_ptr<char[]> copy(new char[message.size()]); // no terminator after the message
     std::memcpy(copy.get(), message.data(), message.size());
     std::int32_t length = -1;
     const std::unique_ptr<char[]> result(
@@ -155,7 +144,7 @@ std::string redacted(const std::string &message)
     return std::string(result.get(), static_cast<std::size_t>(length));
 }
 
-TEST(Redaction, BlanksCertificatesOfTheTwoPrefixes)
+TEST(Redaction, blanks_certificates_of_the_two_prefixes)
 {
     static const struct {
         const char *rule, *message, *expected;

@@ -1,10 +1,6 @@
 // xml_read_test.cpp - elements on input: tags, attributes, namespaces, the envelope's frame.
 #include "support/reader_input.h"
 
-#include <zuv_client_pro/soap_error.h>
-
-#include "support/failing_malloc.h"
-
 using namespace reader_input;
 
 namespace {
@@ -79,7 +75,7 @@ TEST(XmlRead, elements_and_attributes_come_out_as_they_stand)
         {"no name but a value", "<a \"1\"/>", "a \"1\"; !-1"},
     };
     expect_readings(rows, tree);
-    // With bytes to spare behind them, tags are read in blocks where they aren't cut.
+    // With bytes to spare after them, tags are read in blocks where they aren't cut.
     for (const reading &row : rows)
         every_reading(row.document + "<!--" + std::string(80, '.') + "-->", row.mode, tree);
 }
@@ -163,7 +159,7 @@ TEST(XmlRead, a_held_tag_answers_every_question_until_it_is_consumed)
 TEST(XmlRead, names_are_compared_by_namespace_row)
 {
     const struct {
-        // As sent, behind declarations of p: urn:one, q: urn:two, u: unknown, default: urn:one.
+        // As sent, after declarations of p: urn:one, q: urn:two, u: unknown, default: urn:one.
         const char *tag;
         const char *asked;
         int expected;
@@ -366,16 +362,11 @@ TEST(XmlRead, unknown_elements_are_dropped_whole)
 
 TEST(XmlRead, skipping_deep_content_takes_no_stack_and_no_memory)
 {
-    constexpr int depth = 300000;
-    std::string document = "<a>";
-    for (int i = 0; i < depth; ++i)
-        document += "<b>";
+    const std::string document = "<a>" + repeat_text("<b>", 300000);
     reception cut(document);
     cut->max_depth = 0;
     EXPECT_EQ(soap_element_skip(cut.in_root()), SOAP_EOF);
-    for (int i = 0; i < depth; ++i)
-        document += "</b>";
-    reception in(document + "</a>");
+    reception in(document + repeat_text("</b>", 300000) + "</a>");
     in->max_depth = 0;
     in.in_root();
     const std::size_t before = failing_malloc::allocations();
@@ -485,21 +476,16 @@ TEST(XmlRead, every_allocation_may_fail)
 {
     const std::string document = "<p:a xmlns:p='urn:one' long='" + std::string(2000, 'x') + "&amp;'><p:b>" +
                                  std::string(600, 'y') + "&lt;</p:b><p:c>\xC3\xA9</p:c></p:a>";
-    auto in = std::make_unique<reception>(document);
-    const auto read = [&] {
-        soap *const ctx = *in;
+    const auto make = [&] { return std::make_unique<reception>(document); };
+    expect_out_of_memory_at_each_allocation(6, make, [](reception &in) {
         char *text = nullptr;
         char32_t *wide = nullptr;
-        if (begin(ctx, "one:a") == 0 &&
-            soap_string_element_in(ctx, "one:b", &text, nullptr, 4, 1, -1, -1) != nullptr &&
-            soap_wide_string_element_in(ctx, "one:c", &wide, nullptr, 4, 1, -1, -1) != nullptr)
-            soap_element_in_end(ctx, "one:a");
-    };
-    const auto check = [&](bool refused) {
-        EXPECT_EQ((*in)->error, refused ? SOAP_OUT_OF_MEMORY : 0);
-        in = std::make_unique<reception>(document);
-    };
-    EXPECT_GT(failing_malloc::at_each_allocation(failing_malloc::refuse::one, read, check), 5u);
+        if (begin(in, "one:a") == 0 &&
+            soap_string_element_in(in, "one:b", &text, nullptr, 4, 1, -1, -1) != nullptr &&
+            soap_wide_string_element_in(in, "one:c", &wide, nullptr, 4, 1, -1, -1) != nullptr)
+            soap_element_in_end(in, "one:a");
+        return in.error;
+    });
 }
 
 } // namespace

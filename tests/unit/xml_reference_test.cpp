@@ -4,16 +4,9 @@
 // most of them style sheets of a text processor. Texts, attribute values and the order of tags are compared.
 // Left out of account: line ends and white space in attributes, which the reader keeps as they stand, and
 // entities that a document declares for itself.
-#include <filesystem>
-#include <fstream>
-#include <random>
-#include <set>
-#include <sstream>
-
 #include <libxml/xmlreader.h>
 
 #include "support/reader_input.h"
-
 #include "xml/xml_text.h"
 
 using reader_input::reception;

@@ -1,8 +1,5 @@
 // xml_text_test.cpp - text of elements: the forms of strings, raw XML, wide strings, simple values.
 #include "support/reader_input.h"
-
-#include <zuv_client_pro/soap_error.h>
-
 #include "xml/tag_view.h"
 #include "xml/xml_text.h"
 
@@ -148,14 +145,9 @@ TEST(XmlText, strings_hold_what_they_are_said_to_hold_whatever_the_message_is_en
     for (const auto &row : rows)
         for (const bool deep : {false, true}) { // past the end of a search's stride, and of its window
             SCOPED_TRACE(row.rule);
-            std::string before, latin, utf8;
-            for (int i = 0; deep && i < 400; ++i) {
-                before += row.declaration.empty() ? "\xC3\xBC" : "\xFC";
-                latin += "\xFC";
-                utf8 += "\xC3\xBC";
-            }
-            latin += row.latin;
-            utf8 += row.utf8;
+            const auto umlauts = [deep](const char *one) { return repeat_text(one, deep ? 400 : 0); };
+            const std::string before = umlauts(row.declaration.empty() ? "\xC3\xBC" : "\xFC"),
+                              latin = umlauts("\xFC") + row.latin, utf8 = umlauts("\xC3\xBC") + row.utf8;
             const auto read = [&](std::uint32_t mode) {
                 return in_all_forms(row.declaration, before + row.bytes, mode, !deep);
             };

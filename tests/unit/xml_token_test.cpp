@@ -1,9 +1,5 @@
 // xml_token_test.cpp - tokens, references and encodings of XML input.
 #include "support/reader_input.h"
-
-#include <zuv_client_pro/soap_envelope.h>
-#include <zuv_client_pro/soap_error.h>
-
 #include "xml/xml_token.h"
 
 using namespace reader_input;
