@@ -2,7 +2,7 @@
 file(GLOB ZUV_SOURCES CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/src/*/*.cpp)
 if(ZUV_SHARED_OBJECTS) # bound to itself: what it asks for can be told from what a test asks for
     add_library(zuv_objects SHARED ${ZUV_SOURCES})
-    target_link_options(zuv_objects PRIVATE LINKER:-Bsymbolic)
+    target_link_options(zuv_objects PRIVATE LINKER:-Bsymbolic-functions)
 else()
     add_library(zuv_objects STATIC ${ZUV_SOURCES})
 endif()

@@ -1,4 +1,5 @@
 // boundary_test.cpp - values at the bounds of their types and tables.
+#include <climits>
 #include <cstdint>
 #include <limits>
 #include <string>
@@ -6,6 +7,7 @@
 #include <gtest/gtest.h>
 
 #include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_identity.h>
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_primitive.h>
@@ -77,6 +79,47 @@ TEST(Boundary, an_array_is_found_for_its_id_by_content_and_sizes)
     EXPECT_EQ(id_of(longer, 7), 7);
     EXPECT_EQ(id_of(stranger, -1), 0);
     EXPECT_EQ(id_of(first, 0), 0);
+}
+
+// Offsets of an array's elements fit an int to its last value, and no further.
+TEST(Boundary, the_last_offset_of_an_array_is_the_largest_int)
+{
+    const int one_row[] = {1}, rows[] = {0, 1 << 15};
+    EXPECT_EQ(soap_array_offset_parse("[2147483647]", one_row, nullptr, 1), INT_MAX);
+    EXPECT_EQ(soap_array_offset_parse("[2147483648]", one_row, nullptr, 1), -1);
+    EXPECT_EQ(soap_array_offset_parse("[65535,32767]", rows, nullptr, 2), INT_MAX);
+    EXPECT_EQ(soap_array_offset_parse("[65535,32768]", rows, nullptr, 2), -1);
+    int numbers[SOAP_POSITIONS_MAX];
+    EXPECT_EQ(soap_position_parse("[-2147483648,2147483647,2147483648]", numbers), 2);
+    EXPECT_EQ(numbers[0], INT_MIN);
+    EXPECT_EQ(numbers[1], INT_MAX);
+}
+
+// The rows of prefixes are kept by a few places, which prefixes of other lengths share: none at all among
+// them.
+TEST(Boundary, a_name_without_prefix_is_never_taken_for_one_with)
+{
+    const soap_namespace table[] = {{"a", "urn:a", nullptr, nullptr}, {nullptr, nullptr, nullptr, nullptr}};
+    for (char letter = 'b'; letter <= 'w'; ++letter) {
+        const std::string prefix(1, letter);
+        memory_wire ctx;
+        soap_set_namespaces(&ctx, table);
+        ctx.receive("<" + prefix + ":v xmlns:" + prefix + "=\"urn:a\"><v/></" + prefix + ":v>");
+        ASSERT_EQ(soap_element_in_begin(&ctx, "a:v", 0, nullptr), 0) << prefix;
+        EXPECT_EQ(soap_element_in_begin(&ctx, "a:v", 0, nullptr), SOAP_TAG_MISMATCH) << prefix;
+        EXPECT_EQ(soap_element_in_begin(&ctx, "v", 0, nullptr), 0) << prefix;
+    }
+}
+
+TEST(Boundary, without_a_callback_a_head_has_no_lines)
+{
+    memory_wire ctx(0, MODE_BUFFERED);
+    ctx.mode = MODE_BUFFERED;
+    ctx.status = STATUS_POST;
+    ctx.on_header_line = nullptr;
+    EXPECT_EQ(http_write_request(&ctx, "http://host/path", "host", 80, "path", "urn:a", 1), 0);
+    EXPECT_EQ(soap_send_flush(&ctx), 0);
+    EXPECT_EQ(ctx.sent(), "");
 }
 
 } // namespace
