@@ -1,6 +1,7 @@
 // fault_detail_test.cpp - each fault that a detail may bring, as a service writes it and a client reads it:
 // whole, met twice, cut short, and with each allocation refused.
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -28,6 +29,14 @@ const soap_namespace *table_of(std::int16_t version)
     if (version == 2)
         rows[0].uri = "http://www.w3.org/2003/05/soap-envelope";
     return rows.data();
+}
+
+const char *uri_of_prefix(std::string_view prefix)
+{
+    const soap_namespace *row = table_of(1);
+    while (row->prefix != prefix)
+        ++row;
+    return row->uri;
 }
 
 SOAP_ENV__Detail *detail_of(const soap &ctx)
@@ -151,6 +160,20 @@ TEST(FaultDetail, refers_to_what_was_marked_twice)
         ASSERT_EQ(out.put(marked), 0);
         EXPECT_EQ(out.sent().find("href=") != std::string::npos, marked) << out.sent();
     }
+}
+
+TEST(FaultDetail, counts_once_even_if_it_is_nil)
+{
+    memory_wire in;
+    ASSERT_EQ(
+        read_fault(in, 1,
+                   std::string("<E:Fault xmlns:E=\"http://schemas.xmlsoap.org/soap/envelope/\" xmlns:c=\"") +
+                       uri_of_prefix("protocol") +
+                       "\" xmlns:x=\"http://www.w3.org/2001/XMLSchema-instance\"><detail x:nil=\"true\">"
+                       "</detail><detail><c:Client/></detail></E:Fault>"),
+        0);
+    ASSERT_NE(in.fault, nullptr);
+    EXPECT_EQ(in.fault->detail, nullptr);
 }
 
 } // namespace
