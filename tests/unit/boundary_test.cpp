@@ -6,6 +6,7 @@
 
 #include <gtest/gtest.h>
 
+#include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_identity.h>
@@ -120,6 +121,24 @@ TEST(Boundary, without_a_callback_a_head_has_no_lines)
     EXPECT_EQ(http_write_request(&ctx, "http://host/path", "host", 80, "path", "urn:a", 1), 0);
     EXPECT_EQ(soap_send_flush(&ctx), 0);
     EXPECT_EQ(ctx.sent(), "");
+}
+
+TEST(Boundary, the_header_callback_judges_a_header_that_was_read)
+{
+    static int asked;
+    asked = 0;
+    memory_wire ctx;
+    EXPECT_STREQ(ctx.language, "en");
+    ctx.on_soap_header = [](soap *) { return ++asked == 1 ? 0 : 77; };
+    for (const int judged : {0, 77}) {
+        soap_reset_call(&ctx);
+        ctx.receive(
+            "<E:Envelope "
+            "xmlns:E=\"http://schemas.xmlsoap.org/soap/envelope/\"><E:Header/><E:Body/></E:Envelope>");
+        EXPECT_EQ(soap_receive_begin(&ctx) || soap_envelope_in_begin(&ctx), 0);
+        EXPECT_EQ(soap_header_get(&ctx), judged);
+    }
+    EXPECT_EQ(asked, 2);
 }
 
 } // namespace
