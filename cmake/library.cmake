@@ -1,6 +1,11 @@
 # The library: all of src/ once as objects, for the shared object and for the tests alike.
 file(GLOB ZUV_SOURCES CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/src/*/*.cpp)
-add_library(zuv_objects STATIC ${ZUV_SOURCES})
+if(ZUV_SHARED_OBJECTS) # bound to itself: what it asks for can be told from what a test asks for
+    add_library(zuv_objects SHARED ${ZUV_SOURCES})
+    target_link_options(zuv_objects PRIVATE LINKER:-Bsymbolic-functions)
+else()
+    add_library(zuv_objects STATIC ${ZUV_SOURCES})
+endif()
 target_include_directories(zuv_objects PUBLIC ${PROJECT_SOURCE_DIR}/include PRIVATE ${PROJECT_SOURCE_DIR}/src)
 target_link_libraries(zuv_objects PUBLIC OpenSSL::SSL OpenSSL::Crypto ZLIB::ZLIB PRIVATE zuv_flags zuv_hardening)
 

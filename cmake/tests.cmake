@@ -6,6 +6,16 @@ target_include_directories(zuv_test_support PUBLIC ${PROJECT_SOURCE_DIR}/tests $
     ${PROJECT_SOURCE_DIR}/include)
 target_link_libraries(zuv_test_support PUBLIC zuv_flags GTest::gtest Threads::Threads)
 
+# For script/torture: what a test is linked with, and a service that it starts loads.
+if(ZUV_SHARED_OBJECTS)
+    target_compile_definitions(zuv_test_support PRIVATE ZUV_SHARED_OBJECTS)
+    add_library(zuv_torture SHARED ${PROJECT_SOURCE_DIR}/tests/support/failing_malloc.cpp
+        ${PROJECT_SOURCE_DIR}/tests/support/torture.cpp)
+    target_include_directories(zuv_torture PRIVATE ${PROJECT_SOURCE_DIR}/tests)
+    target_compile_definitions(zuv_torture PRIVATE ZUV_SHARED_OBJECTS)
+    target_compile_options(zuv_torture PRIVATE -ftls-model=initial-exec)
+endif()
+
 # ThreadSanitizer wants its addresses free, which the layouts of newer kernels don't always leave; and memory is asked for ahead
 # of its own start.
 set(ZUV_TEST_LAUNCHER)

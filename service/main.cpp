@@ -133,6 +133,8 @@ void serve_until_signal(const options &o)
 int run(int argc, char **argv)
 {
     g_TraceLogFile[0] = '\0'; // no trace unless asked for
+    std::signal(SIGXFSZ,
+                SIG_IGN); // a file at its limit is refused, as by a full disk, and the program goes on
     CLI::App app("zuv-service: the reference service of the zuv protocol");
     options o;
     declare(app, o);

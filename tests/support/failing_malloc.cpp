@@ -6,6 +6,8 @@
 #include <cerrno>
 #include <cstring>
 
+#include "support/torture.h"
+
 extern "C" {
 void *__libc_malloc(std::size_t size);
 void *__libc_calloc(std::size_t count, std::size_t size);
@@ -23,6 +25,8 @@ extern "C" __attribute__((visibility("default"))) const char *__asan_default_opt
     return "allocator_may_return_null=1";
 }
 
+#define CALLER __builtin_return_address(0)
+
 namespace {
 
 struct thread_state {
@@ -38,9 +42,11 @@ struct thread_state {
 
 constinit thread_local thread_state state;
 
-bool refuse_this_one()
+bool refuse_this_one(const void *caller)
 {
     ++state.asked;
+    if (torture::refuses(caller))
+        return true;
     if (state.refuse_from == 0 || state.asked < state.refuse_from || state.asked > state.refuse_to)
         return false;
     ++state.refused;
@@ -48,44 +54,49 @@ bool refuse_this_one()
     return true;
 }
 
-void *counted(void *block)
+void *counted(void *block, const void *caller)
 {
     state.held += block != nullptr;
-    return block;
+    return torture::given(block, caller);
 }
 
 } // namespace
 
 extern "C" __attribute__((visibility("default"))) void *malloc(std::size_t size)
 {
-    if (refuse_this_one())
+    if (refuse_this_one(CALLER))
         return nullptr;
-    return counted(__interceptor_malloc != nullptr ? __interceptor_malloc(size) : __libc_malloc(size));
+    return counted(__interceptor_malloc != nullptr ? __interceptor_malloc(size) : __libc_malloc(size),
+                   CALLER);
 }
 
 extern "C" __attribute__((visibility("default"))) void *calloc(std::size_t count, std::size_t size)
 {
-    if (refuse_this_one())
+    if (refuse_this_one(CALLER))
         return nullptr;
     return counted(__interceptor_calloc != nullptr ? __interceptor_calloc(count, size)
-                                                   : __libc_calloc(count, size));
+                                                   : __libc_calloc(count, size),
+                   CALLER);
 }
 
 extern "C" __attribute__((visibility("default"))) void *realloc(void *block, std::size_t size)
 {
-    if (refuse_this_one())
+    if (refuse_this_one(CALLER))
         return nullptr;
     void *const moved =
         __interceptor_realloc != nullptr ? __interceptor_realloc(block, size) : __libc_realloc(block, size);
     if (block == nullptr)
-        return counted(moved);
+        return counted(moved, CALLER);
     state.held -= moved == nullptr && size == 0;
-    return moved;
+    if (moved != nullptr || size == 0)
+        torture::taken_back(block);
+    return torture::given(moved, CALLER);
 }
 
 extern "C" __attribute__((visibility("default"))) void free(void *block)
 {
     state.held -= block != nullptr;
+    torture::taken_back(block);
     if (block != nullptr && block == state.watched) {
         std::memcpy(state.last_sight, block, state.sight_length);
         state.watched = nullptr;

@@ -28,6 +28,7 @@
 #include <zuv_client_pro/soap.h>
 #include <zuv_client_pro/soap_attachment.h>
 #include <zuv_client_pro/soap_binary.h>
+#include <zuv_client_pro/soap_call.h>
 #include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>

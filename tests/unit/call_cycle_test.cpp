@@ -207,9 +207,11 @@ TEST_F(CallCycle, reads_the_detail_into_typed_members_then_an_object_then_raw_te
                            "<detail><c:Client.ObjectNotFound><c:description>gone</c:description><c:uri>urn:1"
                            "</c:uri><c:uri>urn:2</c:uri></c:Client.ObjectNotFound>"
                            "<c:Contact><c:name>Ada</c:name></c:Contact><x><y>z</y></x></detail>")));
+    ASSERT_NE(nullptr, proxy.soap_fault());
     const SOAP_ENV__Detail *detail = proxy.soap_fault()->detail;
     ASSERT_NE(nullptr, detail);
     ASSERT_NE(nullptr, detail->Client_x002eObjectNotFound);
+    ASSERT_NE(nullptr, detail->Client_x002eObjectNotFound->description);
     EXPECT_EQ("gone", *detail->Client_x002eObjectNotFound->description);
     EXPECT_EQ((std::vector<std::string>{"urn:1", "urn:2"}), detail->Client_x002eObjectNotFound->uri);
     ASSERT_EQ(SOAP_TYPE_protocol__Contact, detail->__type);

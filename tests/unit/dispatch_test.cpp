@@ -1,6 +1,8 @@
 // dispatch_test.cpp - what is done by type id alone, over every id there is.
 //
 // Elsewhere: objects that are shared (tests/classes/graph_test.cpp).
+#include <stdexcept>
+
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
 #include <zuv_client_pro/protocolProfile.h>
 #include <zuv_client_pro/type_ids.h>
@@ -17,14 +19,22 @@ class Dispatch : public testing::Test {
 protected:
     Dispatch() { soap_set_namespaces(&ctx, ProfileSoapBindingProxy().namespaces); }
 
+    // What a test can't go on without.
+    static void *given(void *made)
+    {
+        if (made == nullptr)
+            throw std::runtime_error("nothing was made");
+        return made;
+    }
+
     // A new object with one thing in it where the kind holds things: an item, a target, a text.
     void *filled(int type)
     {
         const type_entry &entry = type_entries[type];
-        void *object = soap_instantiate(&ctx, type, nullptr, nullptr, nullptr);
+        void *object = given(soap_instantiate(&ctx, type, nullptr, nullptr, nullptr));
         switch (entry.kind) {
         case type_kind::chars:
-            return soap_string_dup(&ctx, "xsd:chars"); // text, and a qualified name
+            return given(soap_string_dup(&ctx, "xsd:chars")); // text, and a qualified name
         case type_kind::text:
             *static_cast<std::string *>(object) = "text";
             break;
@@ -41,7 +51,7 @@ protected:
         case type_kind::object:
             if (type == SOAP_TYPE_xsd__base64Binary) { // one without content isn't written
                 auto *const bytes = static_cast<xsd__base64Binary *>(object);
-                bytes->content = static_cast<unsigned char *>(soap_block_alloc(&ctx, 1));
+                bytes->content = static_cast<unsigned char *>(given(soap_block_alloc(&ctx, 1)));
                 bytes->content[0] = 'b';
                 bytes->size = 1;
             }

@@ -96,6 +96,7 @@ TEST_F(Plugin, a_copy_reverses_them_and_deletes_only_what_it_copied)
     add(&source, {"own", "own", accept_copy});
     {
         soap copy(source);
+        ASSERT_TRUE(copy.plugin_list != nullptr && copy.plugin_list->next != nullptr);
         EXPECT_STREQ(copy.plugin_list->id, "shared");
         EXPECT_STREQ(copy.plugin_list->next->id, "own");
         EXPECT_STREQ(static_cast<char *>(soap_plugin_lookup(&copy, "own")), "copied");
@@ -111,7 +112,10 @@ TEST_F(Plugin, a_refusal_fails_the_copy_without_a_leak)
         soap source;
         add(&source, {"refuses", "r", refuse_copy});
         add(&source, {"copies", "c", accept_copy});
-        EXPECT_EQ(soap_context_copy(&source), nullptr);
+        soap *const made = soap_context_copy(&source);
+        EXPECT_EQ(made, nullptr);
+        if (made != nullptr)
+            soap_context_free(made);
         EXPECT_EQ(deleted, std::vector<std::string>{"copied"}) << "what was built before the refusal";
         soap target;
         soap_engine_done(&target);

@@ -139,7 +139,7 @@ operation proxy_row(operation row, int (P::*short_form)(R *, S &),
     return row;
 }
 
-// An operation of the port without a proxy: the cycle as a host would write it.
+// An operation of the port without a proxy.
 template <class W, class S> operation host_row(operation row)
 {
     using response_class = std::remove_pointer_t<decltype(S::result)>;
@@ -147,32 +147,13 @@ template <class W, class S> operation host_row(operation row)
     row.ctx = std::make_shared<soap>();
     row.call = [response](const operation &own, const char *action, bool reads) {
         soap *const ctx = own.ctx.get();
-        const int id = own.request_id;
-        W wrapper{request_of<std::remove_pointer_t<decltype(W::request)>>(own, ctx)};
-        const auto write = [&] {
-            return soap_envelope_out_begin(ctx) || soap_header_put(ctx) || soap_body_out_begin(ctx) ||
-                   soap_write_element(ctx, &wrapper, nullptr, 0, id) || soap_body_out_end(ctx) ||
-                   soap_envelope_out_end(ctx);
-        };
-        response->result = nullptr;
-        ctx->encoding_style = nullptr; // a literal message
-        soap_reset_call(ctx);
-        soap_mark_header(ctx);
-        soap_mark_object(ctx, &wrapper, id);
         const char *endpoint = action ? OTHER_PLACE : "http://127.0.0.1:9080/zuv/v1.0/services/ProblemReport";
-        if (soap_count_begin(ctx) || ((ctx->mode & MODE_COUNTING) && write()) || soap_count_end(ctx) ||
-            soap_server_connect(ctx, endpoint, action ? action : "") || write() || soap_send_finish(ctx) ||
-            !reads || soap_receive_begin(ctx) || soap_envelope_in_begin(ctx) || soap_header_get(ctx) ||
-            soap_body_in_begin(ctx))
-            return outcome{soap_socket_release(ctx), false};
-        auto *result = static_cast<response_class *>(
-            soap_instantiate(ctx, response_class().soap_type(), nullptr, nullptr, nullptr));
-        if (!result->soap_get(ctx, (own.tag() + "Response").c_str(), nullptr))
-            return outcome{soap_fault_receive(ctx, 0), false};
-        response->result = result;
-        if (soap_body_in_end(ctx) == 0 && soap_envelope_in_end(ctx) == 0)
-            soap_receive_finish(ctx);
-        return outcome{soap_socket_release(ctx), true};
+        void *made = &made; // a failure leaves null there
+        const int error = soap_call(ctx, endpoint, action, {own.request_id, own.response_id},
+                                    request_of<std::remove_pointer_t<decltype(W::request)>>(own, ctx),
+                                    reads ? &made : nullptr);
+        response->result = reads ? static_cast<response_class *>(made) : nullptr;
+        return outcome{error, response->result != nullptr};
     };
     set_answer(row, response);
     return row;
@@ -336,6 +317,19 @@ TEST(Ports, read_every_fault_into_its_member_of_the_detail)
         EXPECT_EQ("why " + name, *found[0]->description);
         EXPECT_EQ(nullptr, place->__any);
         EXPECT_EQ(nullptr, place->fault);
+    }
+}
+
+TEST(ports, ids_that_are_no_operation_end_the_call_before_anything_is_sent)
+{
+    const int request = SOAP_TYPE___protocolProfile__set, response = SOAP_TYPE___protocolProfile__setResponse;
+    for (const soap_operation &wrong :
+         {soap_operation{response, request}, {request, request}, {0, response}, {request, 1 << 20}}) {
+        memory_wire wire;
+        void *made = &wire;
+        EXPECT_EQ(SOAP_NO_METHOD, soap_call(&wire, "http://127.0.0.1:9/", nullptr, wrong, nullptr, &made));
+        EXPECT_EQ(nullptr, made);
+        EXPECT_EQ("", wire.sent);
     }
 }
 

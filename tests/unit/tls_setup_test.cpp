@@ -302,6 +302,7 @@ TEST_F(tls_setup, a_client_certificate_is_asked_for_and_verified)
         const accept_outcome end = outcome.get();
         EXPECT_EQ(end.result, c.accepted ? 0 : SOAP_TLS_ERROR) << end.text;
         EXPECT_EQ(end.closed, !c.accepted);
+        EXPECT_EQ((service->input_mode & MODE_TLS) != 0, c.accepted) << "addresses would begin with http:";
         if (!c.accepted) {
             EXPECT_EQ(end.detail, c.detail);
         }

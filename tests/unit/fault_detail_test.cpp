@@ -1,0 +1,179 @@
+// fault_detail_test.cpp - each fault that a detail may bring, as a service writes it and a client reads it:
+// whole, met twice, cut short, and with each allocation refused.
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+#include <zuv_client_pro/ProfileSoapBindingProxy.h>
+#include <zuv_client_pro/protocol.h>
+#include <zuv_client_pro/soap_envelope.h>
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include "support/failing_malloc.h"
+#include "support/memory_wire.h"
+
+namespace {
+
+// The service's prefixes with the envelope of a version.
+const soap_namespace *table_of(std::int16_t version)
+{
+    static std::vector<soap_namespace> tables[2];
+    std::vector<soap_namespace> &rows = tables[version - 1];
+    const soap_namespace *row = rows.empty() ? ProfileSoapBindingProxy().namespaces : nullptr;
+    for (; row != nullptr; row = row->prefix ? row + 1 : nullptr)
+        rows.push_back(*row);
+    if (version == 2)
+        rows[0].uri = "http://www.w3.org/2003/05/soap-envelope";
+    return rows.data();
+}
+
+const char *uri_of_prefix(std::string_view prefix)
+{
+    const soap_namespace *row = table_of(1);
+    while (row->prefix != prefix)
+        ++row;
+    return row->uri;
+}
+
+SOAP_ENV__Detail *detail_of(const soap &ctx)
+{
+    return ctx.soap_version == 1 ? ctx.fault->detail : ctx.fault->Detail;
+}
+
+// A context in which a message has begun.
+struct sender : memory_wire {
+    explicit sender(std::int16_t version, std::uint32_t mode_of_xml = 0)
+    {
+        soap_set_namespaces(this, table_of(version));
+        soap_version = version;
+        mode = mode_of_xml;
+        *soap_fault_code_field(this) = version == 1 ? "SOAP-ENV:Client" : "SOAP-ENV:Sender";
+        *soap_fault_string_field(this) = "so";
+        *soap_fault_detail_field(this) = nullptr;
+    }
+    int put(bool marked)
+    {
+        if (marked)
+            soap_mark_fault(this);
+        return soap_fault_put(this);
+    }
+};
+
+void begin_reading(memory_wire &ctx, std::int16_t version, const std::string &xml)
+{
+    soap_set_namespaces(&ctx, table_of(version));
+    soap_reset_call(&ctx);
+    ctx.receive(xml);
+    soap_receive_begin(&ctx);
+    ctx.soap_version = version;
+}
+
+int read_fault(memory_wire &ctx, std::int16_t version, const std::string &xml)
+{
+    begin_reading(ctx, version, xml);
+    return soap_fault_read(&ctx);
+}
+
+template <class F> void goes_both_ways(F *SOAP_ENV__Detail::*member, std::int16_t version)
+{
+    F fault;
+    std::string why = "why";
+    fault.description = &why;
+    sender out(version);
+    detail_of(out)->*member = &fault;
+    ASSERT_EQ(out.put(true), 0);
+    const std::string xml = out.sent();
+    memory_wire in;
+    ASSERT_EQ(read_fault(in, version, xml), 0) << xml;
+    const F *read = detail_of(in)->*member;
+    ASSERT_NE(read, nullptr) << xml;
+    EXPECT_EQ(*read->description, why);
+
+    for (std::size_t sends = 0; sends < out.sends.size(); ++sends) {
+        sender failing(version);
+        failing.send_limit = sends;
+        detail_of(failing)->*member = &fault;
+        EXPECT_NE(failing.put(false), 0) << "after " << sends << " pieces";
+    }
+    for (std::size_t cut = xml.find("Client"); cut != xml.npos; cut = xml.find('>', cut + 1))
+        EXPECT_TRUE(read_fault(in, version, xml.substr(0, cut)) != 0 || in.fault == nullptr)
+            << xml.substr(0, cut);
+    for (std::size_t nth = 1, refused = 1; refused != 0; ++nth) {
+        memory_wire fresh;
+        begin_reading(fresh, version, xml);
+        {
+            const failing_malloc::scope armed(nth);
+            soap_fault_read(&fresh);
+            refused = armed.refused();
+        }
+        EXPECT_TRUE(fresh.error != 0 || fresh.fault == nullptr || detail_of(fresh)->*member != nullptr)
+            << "without memory a fault isn't another, allocation " << nth;
+    }
+}
+
+TEST(FaultDetail, brings_every_fault_in_both_versions)
+{
+    for (const std::int16_t version : {std::int16_t{1}, std::int16_t{2}}) {
+#define BOTH_WAYS(name)                                                                                      \
+    {                                                                                                        \
+        SCOPED_TRACE(#name);                                                                                 \
+        goes_both_ways(&SOAP_ENV__Detail::name, version);                                                    \
+    }
+        SOAP_DETAIL_FAULTS(BOTH_WAYS)
+#undef BOTH_WAYS
+    }
+}
+
+// What the detail's own members don't take: another class of the registry, and raw text.
+TEST(FaultDetail, brings_an_object_of_any_class_and_raw_text)
+{
+    protocol__Contact contact;
+    std::string name = "n";
+    contact.name = &name;
+    sender out(1);
+    out.fault->detail->__type = contact.soap_type();
+    out.fault->detail->fault = &contact;
+    *soap_fault_detail_field(&out) = "<raw/>";
+    ASSERT_EQ(out.put(true), 0);
+    memory_wire in;
+    ASSERT_EQ(read_fault(in, 1, out.sent()), 0);
+    ASSERT_EQ(in.fault->detail->__type, contact.soap_type()) << out.sent();
+    EXPECT_EQ(*static_cast<protocol__Contact *>(in.fault->detail->fault)->name, name);
+    EXPECT_NE(std::string(soap_fault_detail_value(&in)).find("raw"), std::string::npos);
+}
+
+TEST(FaultDetail, refers_to_what_was_marked_twice)
+{
+    for (const bool marked : {false, true}) {
+        protocol__Client fault;
+        protocol__FaultDetail shared;
+        fault.detail = &shared;
+        protocol__Server other;
+        other.detail = &shared;
+        sender out(1, SOAP_XML_GRAPH);
+        out.fault->detail->Client = &fault;
+        out.fault->detail->Server = &other;
+        ASSERT_EQ(out.put(marked), 0);
+        EXPECT_EQ(out.sent().find("href=") != std::string::npos, marked) << out.sent();
+    }
+}
+
+TEST(FaultDetail, counts_once_even_if_it_is_nil)
+{
+    memory_wire in;
+    ASSERT_EQ(
+        read_fault(in, 1,
+                   std::string("<E:Fault xmlns:E=\"http://schemas.xmlsoap.org/soap/envelope/\" xmlns:c=\"") +
+                       uri_of_prefix("protocol") +
+                       "\" xmlns:x=\"http://www.w3.org/2001/XMLSchema-instance\"><detail x:nil=\"true\">"
+                       "</detail><detail><c:Client/></detail></E:Fault>"),
+        0);
+    ASSERT_NE(in.fault, nullptr);
+    EXPECT_EQ(in.fault->detail, nullptr);
+}
+
+} // namespace
