@@ -12,6 +12,7 @@
 
 #include "support/call_wire.h"
 #include "support/golden.h"
+#include "support/memory_wire.h"
 #include "support/testing.h"
 
 namespace {
