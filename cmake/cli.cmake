@@ -16,7 +16,7 @@ set(ZUV_CLI_ENVIRONMENT "ZUV_SOURCE_DIR=${PROJECT_SOURCE_DIR}" "ZUV_BUILD_DIR=${
 # Pictures of the page of a trace, in screenshots/ of the build tree. Needs chromium.
 add_custom_target(docs_screenshots
     COMMAND ${CMAKE_COMMAND} -E env ${ZUV_CLI_ENVIRONMENT}
-        /usr/bin/python3 -B ${PROJECT_SOURCE_DIR}/tests/cli/screenshots.py ${PROJECT_BINARY_DIR}/screenshots
+        /usr/bin/python3 -B ${PROJECT_SOURCE_DIR}/script/lib/screenshots.py ${PROJECT_BINARY_DIR}/screenshots
     DEPENDS zuv zuv-service
     VERBATIM)
 

@@ -27,7 +27,7 @@ set_tests_properties(interop_client_ports interop_nginx_profile PROPERTIES FIXTU
 if(ZUV_SANITIZE OR ZUV_FUZZ)
     return()
 endif()
-add_test(NAME transfer COMMAND /usr/bin/python3 -B ${INTEROP}/transfer.py 40000000 $<TARGET_FILE:file_host>
+add_test(NAME transfer COMMAND /usr/bin/python3 -B ${PROJECT_SOURCE_DIR}/script/lib/transfer.py 40000000 $<TARGET_FILE:file_host>
     $<TARGET_FILE:zuv-service> $<TARGET_FILE:zuv>)
 set_tests_properties(transfer PROPERTIES LABELS soak TIMEOUT 300)
 

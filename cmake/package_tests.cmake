@@ -6,7 +6,7 @@ endif()
 set(PACKAGE_TESTS ${PROJECT_SOURCE_DIR}/tests/package)
 set(TEST_PACKAGES ${PROJECT_BINARY_DIR}/package_tests/packages)
 
-add_test(NAME library_surface COMMAND /usr/bin/python3 -B ${PROJECT_SOURCE_DIR}/tests/abi/surface.py
+add_test(NAME library_surface COMMAND /usr/bin/python3 -B ${PROJECT_SOURCE_DIR}/script/lib/abi_surface.py
     $<TARGET_FILE:zuv_client_pro> ${PROJECT_SOURCE_DIR}/docs/interface/exported_names.txt
     ${PROJECT_SOURCE_DIR}/include/zuv_client_pro ${ZUV_GENERATED_DIR}/include/zuv_client_pro)
 

@@ -1,6 +1,6 @@
 """Makes an abidw dump small enough to keep: what no host can link with is taken out.
 
-Usage: slim_dump.py < DUMP > SLIM
+Usage: abi_slim_dump.py < DUMP > SLIM
 
 Taken out: inline functions, which have no symbol (nearly all of them members of std::vector and std::string), types that are
 named within classes, and then all types that nothing left refers to. Layouts, tables of virtual operations, and the

@@ -1,6 +1,6 @@
 """What the shared object exports and needs.
 
-Usage: surface.py LIBRARY NAMES HEADERS... [--renew]
+Usage: abi_surface.py LIBRARY NAMES HEADERS... [--renew]
 
 Checks soname, symbol version, needed libraries, what is left to the host's OpenSSL and zlib, that each exported function and
 object is declared in a public header (of the directories HEADERS) and each declared one exported, and that the exported names
