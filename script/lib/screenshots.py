@@ -9,9 +9,8 @@ import shutil
 import sys
 import tempfile
 
-sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "..", "tests", "cli"))
-import browser  # noqa: E402  of the tests of the command line, as is zuv
-import zuv  # noqa: E402
+import browser  # of the tests of the command line, as is zuv
+import zuv
 
 PROFILE = """<p:ProfileContent xmlns:p="%s" xmlns:c="%s"><c:identity><c:type>organization</c:type><c:name>Ada's workshop</c:name>
 </c:identity><c:contact><c:name>Ada</c:name><c:email>ada@workshop.example</c:email></c:contact></p:ProfileContent>""" % (
