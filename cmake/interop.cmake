@@ -1,5 +1,5 @@
-# Independent peers: other toolkits call the service, the library calls a service on another toolkit, a proxy between them.
-# And endurance. To be included behind service.cmake.
+# Independent peers: other toolkits call the service, the library calls a service on another toolkit. And endurance. To be
+# included after service.cmake.
 set(INTEROP ${PROJECT_SOURCE_DIR}/tests/interop)
 set(ZUV_SCHEMA ${PROJECT_SOURCE_DIR}/schema)
 
@@ -20,8 +20,7 @@ zuv_add_interop(zeep_ports $<TARGET_FILE:zuv-service>)
 zuv_add_interop(contract_handed_out $<TARGET_FILE:zuv-service>)
 zuv_add_interop(client_ports $<TARGET_FILE:zuv> $<TARGET_FILE:care_host> $<TARGET_FILE:problem_report_host>
     $<TARGET_FILE:zuv-service> ${NPM_SERVICE})
-zuv_add_interop(nginx_profile $<TARGET_FILE:zuv> $<TARGET_FILE:zuv-service> ${NPM_SERVICE})
-set_tests_properties(interop_client_ports interop_nginx_profile PROPERTIES FIXTURES_REQUIRED npm_service)
+set_tests_properties(interop_client_ports PROPERTIES FIXTURES_REQUIRED npm_service)
 
 # What follows looks at memory itself, which a sanitizer changes.
 if(ZUV_SANITIZE OR ZUV_FUZZ)

@@ -108,6 +108,16 @@ class http(unittest.TestCase):
             answer = old.send(post("Profile", CREATE, version="1.0")).receive()
             self.assertEqual((answer.status, "chunked" in answer, old.ended()), (200, False, True), answer)
 
+    def test_a_peer_that_waits_for_leave_gets_it_before_its_body(self):
+        long = envelope("Profile", request("create", "<profileAuthority>%s</profileAuthority>" % (5000000 * "a")))
+        with zuv.service() as address, Connection(address) as peer:
+            for body, framing in (long, "Content-Length: %d" % len(long)), ("%x\r\n%s\r\n0\r\n\r\n" % (len(long), long),
+                                                                           "Transfer-Encoding: chunked"):
+                self.assertEqual(peer.send(get(PORT, "Expect: 100-continue", framing, method="POST")).receive().head,
+                                 b"HTTP/1.1 100 Continue\r\n\r\n")
+                answer = peer.send(body).receive()
+                self.assertEqual((answer.status, len(answer.first("profileAuthority"))), (200, 5000000), framing)
+
     def test_a_connection_ends_with_bytes_after_a_request(self):
         """A second request right after the first can't be told from bytes that belong to nobody: the first is answered."""
         with zuv.service() as address:
