@@ -1,5 +1,5 @@
 # The documents: the target "docs" makes the API reference, with the page about the command line and its pictures, and the wire
-# reference in docs/ of the build; the tests compile and run what the pages show. To be included behind cli.cmake.
+# reference in docs/ of the build; the tests compile and run what the pages show. To be included after cli.cmake.
 configure_file(${PROJECT_SOURCE_DIR}/docs/Doxyfile.in Doxyfile @ONLY)
 file(MAKE_DIRECTORY ${PROJECT_BINARY_DIR}/docs)
 set(ZUV_WIRE_REFERENCE /usr/bin/python3 -B ${PROJECT_SOURCE_DIR}/tools/wire_reference/wire_reference.py

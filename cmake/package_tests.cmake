@@ -1,5 +1,5 @@
-# The shared object as a stranger gets it: what it exports and needs, and hosts built from the packages alone. To be
-# included behind install.cmake and packages.cmake.
+# The shared object as a user gets it: what it exports and needs, and hosts built from the packages alone. To be
+# included after install.cmake and packages.cmake.
 if(ZUV_SANITIZE OR ZUV_THREADS OR ZUV_FUZZ OR ZUV_COVERAGE)
     return() # such objects are not what is handed out
 endif()
