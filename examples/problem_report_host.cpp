@@ -68,7 +68,7 @@ int write_message(soap *ctx, void *wrapper, int wrapper_type)
     return 0;
 }
 
-// Finds the length of the message, which stands ahead of it. Nothing leaves yet.
+// Finds the length of the message, which is sent before it. Nothing is sent yet.
 int count_message(soap *ctx, void *wrapper, int wrapper_type)
 {
     if (soap_count_begin(ctx))
@@ -201,7 +201,7 @@ private:
 
     void submit()
     {
-        // An action is told by its class, which goes along as xsi:type.
+        // The class of an action tells its kind; it is sent as xsi:type.
         std::string title = "Z database stops", what = "It ends with a deadlock, once a day.", severity = "2";
         std::string tried = "Restarted it.", product = "ZDB";
         protocolProblemReport__Action_x002eReboot action;
@@ -222,7 +222,7 @@ private:
         expect(kept.thisURI.size() == 1 && kept.state != nullptr &&
                    *kept.state == protocolProblemReport__ProblemReportState::open,
                "the report has a name and is open");
-        uri_ = kept.thisURI.front(); // a copy: the answer goes with the next call
+        uri_ = kept.thisURI.front(); // a copy: the next call frees the answer
         for (const protocolProblemReport__Answer *one : kept.answer) {
             expect(one != nullptr && one->description != nullptr, "an answer has a text");
             std::printf("%14s%s: %s\n", "", soap_type_name(one->soap_type()), one->description->c_str());

@@ -7,7 +7,7 @@ object is declared in a public header (of the directories HEADERS) and each decl
 are those of the file NAMES. --renew writes that file instead.
 
 In the file a line is one function or object by its full signature, or a class. A class by itself has the operations of every
-data class, its vtable and its type information; what more or less a class has is named behind it.
+data class, its vtable and its type information; what more or less a class has is listed after it.
 """
 import collections
 import pathlib

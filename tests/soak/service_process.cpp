@@ -10,10 +10,12 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-static constexpr int START_LIMIT_MS = 60000; // patience with a machine that does other things too
+namespace {
+
+constexpr int START_LIMIT_MS = 60000; // patience with a machine that does other things too
 
 // Reads the first line of the pipe; what came until the time was up if there is none.
-static std::string read_line(int pipe)
+std::string read_line(int pipe)
 {
     std::string line;
     for (;;) {
@@ -24,6 +26,8 @@ static std::string read_line(int pipe)
         line.push_back(c);
     }
 }
+
+} // namespace
 
 service_process::service_process() : folder_(std::filesystem::temp_directory_path() / "zuv-soak-XXXXXX")
 {
