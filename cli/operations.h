@@ -13,7 +13,7 @@ namespace cli {
 
 struct port {
     const char *name;            // "Profile"
-    const char *default_address; // null: the caller has to name one
+    const char *default_address; // null: the caller must give one
     const char *path;            // of the usual address, "/zuv/v1.0/services/Profile"
     const char *documentation;
 };
@@ -32,7 +32,7 @@ struct operation {
     // Reads the element that comes next as the request's class, whatever its name. An object of the context,
     // or null.
     void *(*read_request)(soap *ctx);
-    // One call. 0, or the error that stands in the context; the response is the context's.
+    // One call. SOAP_OK, or an error code that the context holds too; the response is the context's.
     int (*call)(soap *ctx, const char *endpoints, const char *action, void *request, void **response);
     // Writes the response as an element of its own.
     int (*write_response)(soap *ctx, const void *response);
