@@ -3,7 +3,7 @@
 //
 // For each size of document: bytes per second of CPU time (the best of the repetitions), what that is
 // relative to the peers, and blocks and most memory taken for one document. ZUV_BENCH_HUGE=1 adds a document
-// of 100 MB. Ahead of measuring, all ways must agree on what the document says.
+// of 100 MB. Before measuring, all ways must agree on what the document says.
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>

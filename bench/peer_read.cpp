@@ -9,7 +9,7 @@ namespace peer {
 
 namespace {
 
-// Behind the prefix: the sender's prefixes are taken on trust.
+// The name without its prefix: the sender's prefixes are trusted.
 const char *local_name(const char *name)
 {
     const char *colon = std::strchr(name, ':');

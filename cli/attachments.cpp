@@ -24,7 +24,7 @@ std::string reason()
     return std::generic_category().message(errno);
 }
 
-// Takes ",key=value" off the end of a specification; the empty text if it is not there.
+// Removes ",key=value" from the end of a specification; the empty text if it is not there.
 std::string take_parameter(std::string &specification, const std::string &key)
 {
     const std::size_t at = specification.rfind("," + key + "=");
@@ -35,7 +35,7 @@ std::string take_parameter(std::string &specification, const std::string &key)
     return value;
 }
 
-// A file name from what a peer says: no path, nothing hidden, nothing that a shell or terminal minds.
+// A safe file name from what a peer sent: no path, not hidden, no special characters of a shell or terminal.
 std::string file_name(unsigned number, const char *id)
 {
     std::string name;
@@ -49,7 +49,7 @@ std::string file_name(unsigned number, const char *id)
     return std::to_string(number) + (name.empty() ? "" : "-" + name);
 }
 
-// True if there is nothing to read: some files of the system have bytes and tell a size of 0.
+// True if there is nothing to read: some system files have bytes although their size is 0.
 bool is_empty(std::FILE *file)
 {
     std::rewind(file);

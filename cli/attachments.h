@@ -1,4 +1,4 @@
-// attachments.h - attachments of messages: files that go out, files that come in, a stretch at a time.
+// attachments.h - attachments of messages: files that are sent and files that are received, piece by piece.
 #pragma once
 
 #include <cstdio>
@@ -23,15 +23,15 @@ using file_handle = std::unique_ptr<std::FILE, file_closer>;
 // it.
 class attachment_files {
 public:
-    // An empty `save_folder` keeps nothing; otherwise it is made where needed. failure if a file can't be
+    // An empty `save_folder` keeps nothing; otherwise it is created if needed. failure if a file can't be
     // opened.
     attachment_files(const message_options &options, bool quiet);
     attachment_files(const attachment_files &) = delete;
     attachment_files &operator=(const attachment_files &) = delete;
 
     void prepare(soap *ctx);
-    // Gives the next message its form and hands it the files. std::bad_alloc if the context has no memory for
-    // that.
+    // Sets the form of the next message and attaches the files. std::bad_alloc if the context has no memory
+    // for that.
     void attach(soap *ctx);
 
     // What was saved since the last call of it, a line each; and what went wrong with a file here, empty for

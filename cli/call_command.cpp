@@ -40,7 +40,7 @@ const port &port_of(const operation &op)
                          [&](const port &p) { return std::strcmp(p.name, op.port) == 0; });
 }
 
-// An address with the port's usual path where it has none.
+// An address, with the port's usual path if it has none.
 std::string full_address(const std::string &address, const port &of)
 {
     refuse_user(address);
@@ -55,8 +55,8 @@ std::string full_address(const std::string &address, const port &of)
     return address.substr(0, slash) + of.path;
 }
 
-// All addresses as the library takes them: with blanks between, each tried when the one before can't be
-// reached.
+// All addresses in the form that the library expects: separated by blanks, each tried when the previous one
+// can't be reached.
 std::string addresses(const call_options &options, const port &of)
 {
     std::vector<std::string> given = options.endpoints;
@@ -119,7 +119,7 @@ private:
     int call_once()
     {
         soap *const ctx = context_.get();
-        soap_discard_objects(ctx, nullptr); // the answer before
+        soap_discard_objects(ctx, nullptr); // the previous answer
         soap_discard_all(ctx);
         prepare_message(ctx, options_.message, namespaces_);
         connection_.renew(ctx);
@@ -189,7 +189,7 @@ private:
     attachment_files files_;
     document_reader reader_;
     void *request_;
-    std::unique_ptr<soap> context_; // ends ahead of all that it borrows
+    std::unique_ptr<soap> context_; // freed before all that it borrows
     void *response_ = nullptr;
     durations times_;
 };

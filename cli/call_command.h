@@ -1,4 +1,5 @@
-// call_command.h - one operation called from the command line: request in, calls made, answer out.
+// call_command.h - one operation called from the command line: the request is read, the calls are made, the
+// answer is printed.
 #pragma once
 
 #include "call_options.h"

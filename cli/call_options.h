@@ -13,11 +13,11 @@ namespace cli {
 
 // How to reach a service; also for data ports.
 struct connection_options {
-    std::string user, password_file; // HTTP Basic; the password may also stand in ZUV_PASSWORD
+    std::string user, password_file; // HTTP Basic; the password may also come from ZUV_PASSWORD
     std::string ca_file, ca_path, crl_file, key_file, key_password_file; // ... in ZUV_KEY_PASSWORD
     bool no_host_check = false, allow_expired = false;
     std::string proxy, proxy_user, proxy_password_file; // ... in ZUV_PROXY_PASSWORD
-    double connect_limit = 30, silence_limit = 300;     // seconds; 0 none
+    double connect_limit = 30, silence_limit = 300;     // seconds; 0: none
     std::string trace_file;
     bool quiet = false;
 

@@ -235,7 +235,7 @@ private:
         check_element(child, *member, depth + 1);
     }
 
-    // The member that may have been meant: of the same local name.
+    // The member that may have been meant: one with the same local name.
     static std::string suggestion(const contract::data_class &type, std::string_view name)
     {
         for (const contract::data_class *one : contract::lineage(type))

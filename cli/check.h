@@ -1,4 +1,4 @@
-// check.h - a document held against the contract: what is wrong, where, and why.
+// check.h - checks a document against the contract: what is wrong, where, and why.
 //
 // Elsewhere: the command that prints it (check_command.cpp), the library's own reader (documents.h).
 //
@@ -20,11 +20,11 @@ struct finding {
     std::string text;
 };
 
-constexpr std::size_t FINDINGS_MAX = 100; // what is found behind these is not told
+constexpr std::size_t FINDINGS_MAX = 100; // further ones are not reported
 
 struct checked_document {
     std::string root;                           // name of the root element, with the contract's prefix
-    const contract::data_class *type = nullptr; // of the root element; null if nobody knows it
+    const contract::data_class *type = nullptr; // of the root element; null if it is unknown
     std::vector<finding> findings;
 };
 

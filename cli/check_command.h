@@ -8,8 +8,9 @@
 
 namespace cli {
 
-// Prints what is wrong with each file to standard error as "FILE:LINE:COLUMN: reason", what is right to
-// standard output. `class_name` empty: the root element tells the class. EXIT_DOCUMENT if something is wrong.
+// Prints what is wrong with each file to standard error as "FILE:LINE:COLUMN: reason", the valid ones to
+// standard output. `class_name` empty: the root element determines the class. EXIT_DOCUMENT if something is
+// wrong.
 exit_code check_files(const std::vector<std::string> &files, const std::string &class_name);
 
 } // namespace cli

@@ -7,7 +7,7 @@ namespace cli {
 
 namespace {
 
-// The command that the words ahead of the last lead to.
+// The command that the words before the last one lead to.
 const CLI::App *command_of(const CLI::App *app, const std::vector<std::string> &words)
 {
     for (std::size_t i = 0; i + 1 < words.size(); ++i)

@@ -8,8 +8,8 @@
 
 namespace cli {
 
-// Candidates for the last of the words behind the program's name: commands, options, classes. None where a
-// file or a text is wanted.
+// Candidates for the last of the words after the program's name: commands, options, classes. None where a
+// file or a text is expected.
 std::vector<std::string> completions(const CLI::App &app, const std::vector<std::string> &words);
 
 } // namespace cli

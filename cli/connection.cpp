@@ -33,7 +33,7 @@ const char *text_or_null(const std::string &text)
     return text.empty() ? nullptr : text.c_str();
 }
 
-// A time limit as the engine wants it.
+// A time limit in the engine's form: seconds, or microseconds as a negative number.
 int limit_of(double seconds)
 {
     if (seconds > MICROSECONDS_MAX || seconds == std::floor(seconds))
@@ -80,7 +80,7 @@ void connection::prepare(soap *ctx) const
     prepare_tls(ctx);
 }
 
-// The library's rules for the peer are those of this program, but for the host check, which is strict here.
+// The peer is checked by the library's rules, except for the host name, which is checked strictly here.
 void connection::prepare_tls(soap *ctx) const
 {
     unsigned flags = TLS_VERIFY_PEER | TLS_NO_SSLV3 | TLS_NO_TLSV1;

@@ -18,9 +18,9 @@ public:
     connection(const connection &) = delete;
     connection &operator=(const connection &) = delete;
 
-    // Settings that last.
+    // Settings that stay.
     void prepare(soap *ctx) const;
-    // HTTP credentials, which a received head clears: to be called ahead of each call.
+    // HTTP credentials, which a received head clears: to be called before each call.
     void renew(soap *ctx) const;
 
     bool quiet() const { return options_.quiet; }
@@ -32,7 +32,7 @@ private:
     int proxy_port_ = 0;
 };
 
-// Throws a failure for an address that names a user, whose password nobody should read on.
+// Throws a failure for an address with a user in it: its password would be visible in process lists.
 void refuse_user(const std::string &address);
 
 // The modes of a message. `rows` takes the namespaces of SOAP 1.2, which the context borrows.

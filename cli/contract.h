@@ -4,7 +4,7 @@
 // Here: the records, and looking them up by name. Elsewhere: the data itself (contract_description.cpp,
 // generated), the operations (operations.h).
 //
-// Always: texts are constants of the program. Types go by their XML names, "protocol:Identity" or
+// Always: texts are constants of the program. Types are named by their XML names, "protocol:Identity" or
 // "xsd:string".
 #pragma once
 
@@ -58,8 +58,8 @@ extern const std::span<const enumeration> enumerations;
 const data_class *find_class(std::string_view xml_name);
 const enumeration *find_enumeration(std::string_view xml_name);
 
-// The classes that a person may mean: by XML name, C++ name, or the name without its prefix, the case of
-// letters aside.
+// The classes that a user may mean: by XML name, C++ name, or the name without its prefix, ignoring
+// case.
 std::vector<const data_class *> classes_meant(std::string_view name);
 
 // The class and its bases, the root class first.
@@ -71,7 +71,7 @@ const member *find_member(const data_class &of, std::string_view tag);
 const attribute *find_attribute(const data_class &of, std::string_view name);
 bool holds_text(const data_class &of);
 
-// The name behind the colon.
+// The name after the colon; all of a name without a prefix.
 std::string_view local_name(std::string_view name);
 
 } // namespace contract

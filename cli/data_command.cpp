@@ -108,7 +108,7 @@ private:
         return true;
     }
 
-    // The body, framing and compression undone. False if it broke off.
+    // The body, framing and compression undone. False if it is cut off.
     bool receive_into(std::FILE *file)
     {
         soap *const ctx = context_.get();

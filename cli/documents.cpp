@@ -46,7 +46,7 @@ bool uses_prefix(std::string_view xml, std::string_view prefix)
     return false;
 }
 
-// Takes the declarations that nothing uses off the root element, which has them all.
+// Removes unused declarations from the root element, which has all of them.
 std::string without_idle_declarations(std::string xml)
 {
     constexpr std::string_view DECLARATION = "xmlns:";
@@ -55,14 +55,14 @@ std::string without_idle_declarations(std::string xml)
     for (std::size_t at = xml.find(DECLARATION, root); at < end && end != std::string_view::npos;
          at = xml.find(DECLARATION, at)) {
         const std::size_t name = at + DECLARATION.size(), equals = xml.find('=', name);
-        const std::size_t behind = xml.find('"', equals + 2) + 1;
+        const std::size_t value_end = xml.find('"', equals + 2) + 1;
         const std::string_view all = xml, prefix = all.substr(name, equals - name);
-        if (uses_prefix(all.substr(root, at - root), prefix) || uses_prefix(all.substr(behind), prefix)) {
-            at = behind;
+        if (uses_prefix(all.substr(root, at - root), prefix) || uses_prefix(all.substr(value_end), prefix)) {
+            at = value_end;
             continue;
         }
         at = xml.find_last_not_of(" \t\r\n", at - 1) + 1;
-        xml.erase(at, behind - at);
+        xml.erase(at, value_end - at);
         end = xml.find('>', root);
     }
     return xml;

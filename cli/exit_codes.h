@@ -1,4 +1,4 @@
-// exit_codes.h - what the program ends with. Scripts rely on these numbers; docs/man/zuv.1 tells them.
+// exit_codes.h - exit codes of the program. Scripts rely on these numbers; docs/man/zuv.1 lists them.
 #pragma once
 
 namespace cli {

@@ -1,4 +1,4 @@
-// failure.h - what ends a command ahead of its end: an exit code and words for standard error.
+// failure.h - what stops a command early: an exit code and words for standard error.
 #pragma once
 
 #include <stdexcept>

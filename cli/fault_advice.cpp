@@ -39,7 +39,7 @@ constexpr failure_words KINDS[] = {
     {EXIT_TLS, "this side and the service don't trust each other",
      "name the authority by --ca-file; the certificate must be made out to the host in the address (see "
      "--no-host-check)"},
-    {EXIT_HTTP, "the HTTP server ahead of the service",
+    {EXIT_HTTP, "the HTTP server in front of the service",
      "check the path of the address, and the service's log"},
     {EXIT_ANSWER, "the service's answer can't be read",
      "keep a trace by --trace FILE and look at it by zuv trace FILE"},

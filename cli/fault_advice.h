@@ -20,7 +20,7 @@ const failure_words &words_of(exit_code code);
 // from; null for others.
 const char *advice_for(const std::string &fault);
 
-// What to try after an HTTP status; null for those that tell nothing more.
+// What to try after an HTTP status; null if there is nothing to add.
 const char *http_advice(int status);
 
 } // namespace cli

@@ -12,6 +12,7 @@
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_registry.h>
 
+#include "contract.h"
 #include "documents.h"
 #include "fault_advice.h"
 #include "text_files.h"
@@ -20,7 +21,7 @@ namespace cli {
 
 namespace {
 
-constexpr std::size_t RAW_DETAIL_MAX = 500; // bytes of a detail that nobody knows
+constexpr std::size_t RAW_DETAIL_MAX = 500; // bytes of an unknown detail
 constexpr int DETAIL_DEPTH_MAX = 20;
 constexpr int HTTP_OK = 200, HTTP_FIRST = 201, HTTP_LAST = 599;
 
@@ -46,9 +47,7 @@ std::vector<typed_fault> typed_faults(const SOAP_ENV__Detail *detail)
         faults.push_back({"", detail->fault, detail->__type});
     for (typed_fault &fault : faults) {
         const char *const name = soap_type_name(fault.type);
-        fault.name = name == nullptr
-                         ? ""
-                         : name + (std::strchr(name, ':') == nullptr ? 0 : std::strcspn(name, ":") + 1);
+        fault.name = contract::local_name(name == nullptr ? "" : name);
     }
     return faults;
 }
@@ -62,8 +61,8 @@ void add_leaves(const pugi::xml_node &element, const std::string &path, int dept
         if (child.type() != pugi::node_element || depth >= DETAIL_DEPTH_MAX)
             continue;
         leaf = false;
-        const std::string_view name = child.name();
-        add_leaves(child, (path.empty() ? "" : path + " / ") + std::string(name.substr(name.find(':') + 1)),
+        add_leaves(child,
+                   (path.empty() ? "" : path + " / ") + std::string(contract::local_name(child.name())),
                    depth + 1, lines);
     }
     if (leaf && !path.empty() && *element.text().get() != '\0')

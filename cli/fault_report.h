@@ -1,4 +1,4 @@
-// fault_report.h - why a call failed, told to a person: what, who, where, the typed detail, what to try.
+// fault_report.h - why a call failed, explained to the user: what, who, where, the typed detail, what to try.
 #pragma once
 
 #include <string>
@@ -9,7 +9,7 @@
 
 namespace cli {
 
-// What the program ends with after an error of the engine.
+// The program's exit code for an error of the engine.
 exit_code exit_code_of(soap *ctx);
 
 // The report, lines with ends, fit for a terminal.

@@ -16,7 +16,7 @@
 
 namespace cli {
 
-// `xml`: a document as the library writes it, of the class. The JSON is indented, with a line end behind it.
+// `xml`: a document as the library writes it, of the class. The JSON is indented, with a line end after it.
 std::string json_of(const std::string &xml, const contract::data_class &type);
 
 } // namespace cli

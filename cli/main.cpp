@@ -1,4 +1,4 @@
-// main.cpp - zuv, the command line: its commands, and what becomes of failures.
+// main.cpp - zuv, the command line: its commands, and how failures are reported.
 //
 // Elsewhere: what the commands do, one file each (call_command.h, data_command.h, new_command.h,
 // check_command.h, trace_command.h).

@@ -11,10 +11,10 @@
 
 namespace cli {
 
-// The declarations in force while the elements of a document are walked through.
+// The declarations in force while the elements of a document are traversed.
 class namespace_scope {
 public:
-    // Takes the declarations of an element; `leave` forgets them.
+    // Adds the declarations of an element; `leave` removes them.
     void enter(const pugi::xml_node &element);
     void leave();
     // "protocol:identity" for whatever prefix the document uses. A namespace that isn't the contract's gives

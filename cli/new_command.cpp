@@ -1,7 +1,7 @@
 // new_command.cpp - see new_command.h.
 //
-// Always: the document is valid. A member that must be there stands as an element, the others in comments,
-// ready to be taken out of them.
+// Always: the document is valid. Required members are elements, the others are in comments,
+// ready to be uncommented.
 #include "new_command.h"
 
 #include <cstdio>
@@ -23,7 +23,7 @@ namespace {
 constexpr std::size_t COLUMNS = 110;
 constexpr const char XSI_URI[] = "http://www.w3.org/2001/XMLSchema-instance";
 
-// A comment of one or more lines; "--" may not stand in one.
+// A comment of one or more lines; "--" is not allowed in one.
 std::string comment(const std::string &indent, const std::string &text)
 {
     std::istringstream words(text);
@@ -54,7 +54,7 @@ std::string occurrence_words(const contract::member &member)
     return member.minimum != 0 ? "at least " + std::to_string(member.minimum) : "any number";
 }
 
-// An element to begin with: of a class it holds nothing yet.
+// An initial element; one of a class is empty.
 std::string first_element(const contract::member &member)
 {
     const std::string tag = member.tag;
@@ -75,7 +75,7 @@ std::string member_text(const contract::member &member)
     return text;
 }
 
-// The prefixes of the members, and what they stand for.
+// The prefixes of the members, and their namespaces.
 std::string declarations(const contract::data_class &of)
 {
     std::set<std::string> prefixes = {"xsi"};

@@ -9,10 +9,11 @@
 namespace cli {
 
 // Both print to standard output.
-exit_code print_new_document(const std::string &class_name); // throws failure for a name that isn't clear
+exit_code
+print_new_document(const std::string &class_name); // throws failure for an unknown or ambiguous name
 exit_code print_classes();
 
-// The class that a person means. failure with EXIT_USAGE if that is none or several.
+// The class that the user means. failure with EXIT_USAGE if there is none or several.
 const contract::data_class &class_named(const std::string &name);
 
 } // namespace cli

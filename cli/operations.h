@@ -13,7 +13,7 @@ namespace cli {
 
 struct port {
     const char *name;            // "Profile"
-    const char *default_address; // null: the caller has to name one
+    const char *default_address; // null: the caller must give one
     const char *path;            // of the usual address, "/zuv/v1.0/services/Profile"
     const char *documentation;
 };

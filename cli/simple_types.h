@@ -6,10 +6,10 @@
 
 namespace cli {
 
-// Empty if `value`, blanks around it aside, is one of the XML type; else what it should be: "a whole number".
+// Empty if `value` without blanks around it is one of the XML type; else what it should be: "a whole number".
 std::string value_problem(std::string_view type, std::string_view value);
 
-// How a value of the type looks, in words for a person: "text", "date and time, 2024-05-01T12:00:00Z".
+// How a value of the type looks, for the user to read: "text", "date and time, 2024-05-01T12:00:00Z".
 std::string value_words(std::string_view type);
 
 // A value of the type, to begin with; empty for texts.

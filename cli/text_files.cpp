@@ -39,7 +39,7 @@ std::string read_all(std::FILE *file, const std::string &path)
     return bytes;
 }
 
-// Bytes of the UTF-8 character at the head of a text, and its code; 0 if there is none.
+// Bytes of the UTF-8 character at the beginning of a text, and its code; 0 if there is none.
 std::size_t decode(std::string_view text, std::uint32_t &code)
 {
     const auto byte = [&](std::size_t i) { return static_cast<unsigned char>(text[i]); };
@@ -63,7 +63,7 @@ std::size_t decode(std::string_view text, std::uint32_t &code)
     return code < LEAST[length] || surrogate || code > 0x10FFFF ? 0 : length;
 }
 
-// What hides or turns text around belongs to the control characters too.
+// Characters that hide or reverse text count as control characters too.
 bool steers(std::uint32_t code)
 {
     return code < 0x20 || (code >= 0x7F && code < 0xA0) || (code >= 0x202A && code <= 0x202E) ||

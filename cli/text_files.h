@@ -1,4 +1,4 @@
-// text_files.h - whole files in and out, and text made fit for a terminal.
+// text_files.h - reads and writes whole files, and makes text safe for a terminal.
 #pragma once
 
 #include <string>
@@ -12,10 +12,10 @@ std::string read_file(const std::string &path);
 // The first line of a file, without its end: a password. failure with EXIT_FILE.
 std::string read_secret(const std::string &path);
 
-// Puts a file in the place of one that may be there; "-" is standard output. failure with EXIT_FILE.
+// Writes a file, replacing one that exists; "-" is standard output. failure with EXIT_FILE.
 void write_file(const std::string &path, std::string_view bytes);
 
-// Text from elsewhere without what could steer a terminal: control characters become "?", broken UTF-8 too.
+// Foreign text without what could control a terminal: control characters become "?", broken UTF-8 too.
 // Line ends and tabs stay if `lines`, else they become blanks.
 std::string printable(std::string_view text, bool lines = false);
 

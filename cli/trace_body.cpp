@@ -13,7 +13,7 @@ namespace {
 
 constexpr std::size_t CERTAIN = 16; // bytes of plain text that can't follow raw bytes by chance
 
-// Tells framing bytes from data, a byte at a time.
+// Separates framing bytes from data, a byte at a time.
 class deframer {
 public:
     explicit deframer(const body_framing &framing)
@@ -45,7 +45,7 @@ private:
     void take_framing(char c)
     {
         switch (state_) {
-        case state::line_end: // behind a chunk
+        case state::line_end: // after a chunk
             broken_ = broken_ || (c != '\r' && c != '\n');
             if (c == '\n')
                 begin_size();
@@ -93,7 +93,7 @@ private:
     std::size_t line_length_ = 0;
 };
 
-// Undoes gzip, zlib or bare deflate, whichever the first bytes are.
+// Decompresses gzip, zlib or bare deflate, whichever the first bytes are.
 class inflater {
 public:
     inflater() = default;
@@ -106,7 +106,7 @@ public:
     }
     bool ended() const { return ended_; }
 
-    // Appends what a stretch of raw bytes gives. False if it is no compressed data, or too much.
+    // Appends what a piece of raw bytes decompresses to. False if it is no compressed data, or too much.
     bool feed(std::string_view raw, std::string &out, trace_budget &budget)
     {
         if (ended_ || raw.empty())
@@ -168,7 +168,8 @@ trace_body inflated(trace_body body, trace_budget &budget)
     return body;
 }
 
-// Raw bytes with plain copies between. After each byte the text made since the last copy is looked for.
+// Raw bytes with plain copies between. After each byte it is checked whether the text made since the last
+// copy follows.
 trace_body read_with_copies(std::string_view trace, std::size_t begin, const body_framing &framing,
                             trace_budget &budget)
 {

@@ -1,7 +1,7 @@
 // trace_body.h - bodies of traced messages: framing and compression undone.
 //
-// A received message that is compressed stands in a trace twice: each stretch of raw bytes is followed by the
-// plain text made of it. What was sent stands as it went out.
+// A trace holds a compressed received message twice: each piece of raw bytes is followed by the plain text
+// decoded from it. What was sent is there as it was sent.
 #pragma once
 
 #include <cstddef>
@@ -21,11 +21,11 @@ struct body_framing {
 
 struct trace_body {
     std::string bytes;
-    std::size_t end = 0;  // behind the body and its plain copies
-    bool complete = true; // framing and compression held to the end
+    std::size_t end = 0;  // after the body and its plain copies
+    bool complete = true; // framing and compression were intact to the end
 };
 
-// What reading may cost in all; bounds the work that a file can ask for.
+// What reading may cost in total; bounds the work that a file can cause.
 struct trace_budget {
     std::uint64_t inflated = 256U << 20;  // bytes
     std::uint64_t compared = 1024U << 20; // bytes

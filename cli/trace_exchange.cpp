@@ -3,6 +3,7 @@
 
 #include <algorithm>
 
+#include "contract.h"
 #include "xml_tokens.h"
 
 namespace cli {
@@ -11,11 +12,6 @@ namespace {
 
 constexpr std::size_t PARTS_MAX = 1000;
 constexpr std::size_t FAULT_MAX = 300; // bytes of a fault's text
-
-std::string_view local(std::string_view name)
-{
-    return name.substr(name.find(':') + 1);
-}
 
 bool looks_like_xml(std::string_view bytes)
 {
@@ -83,7 +79,7 @@ std::vector<body_part> mime_parts(std::string_view body, const std::string &boun
     return parts;
 }
 
-// Reads the SOAP message for what the exchange is about.
+// Takes operation and fault of the exchange from the SOAP message.
 void read_message(std::string_view xml, bool request, exchange &found)
 {
     xml_tokens tokens(xml);
@@ -95,7 +91,7 @@ void read_message(std::string_view xml, bool request, exchange &found)
         in_text = false;
         if (token.kind != xml_kind::start && token.kind != xml_kind::empty)
             continue;
-        const std::string_view name = local(token.name);
+        const std::string_view name = contract::local_name(token.name);
         if (name == "Envelope" && token.source.find("2003/05/soap-envelope") != std::string_view::npos)
             found.soap12 = true;
         if (name == "Body" && !in_body) {

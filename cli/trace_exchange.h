@@ -9,9 +9,9 @@
 
 namespace cli {
 
-// One part of a body: the whole of it, or what MIME puts side by side.
+// One part of a body: the whole of it, or one of several MIME parts.
 struct body_part {
-    std::string type;       // media type, as told
+    std::string type;       // media type, as stated
     std::string id;         // Content-ID; empty for none
     std::string_view bytes; // of the message
     bool xml = false;

@@ -15,9 +15,9 @@ namespace cli {
 
 namespace {
 
-constexpr std::size_t XML_SHOWN_MAX = 400000; // bytes of one document; the rest is told by its size
+constexpr std::size_t XML_SHOWN_MAX = 400000; // bytes of one document; of the rest only the size is shown
 constexpr std::size_t FOLDED_FROM = 3;        // namespace declarations of one tag
-constexpr std::size_t INDENT_MAX = 40;        // levels; deeper ones stand below each other
+constexpr std::size_t INDENT_MAX = 40;        // levels; deeper ones are not indented further
 
 std::string escaped(std::string_view text, bool lines = true)
 {
@@ -51,7 +51,7 @@ std::string span(const char *kind, std::string_view text)
     return std::string("<span class=\"") + kind + "\">" + escaped(text) + "</span>";
 }
 
-// A document laid out and coloured: an element a line, unless it holds a text alone.
+// A document laid out and coloured: one line per element, or per element with text only.
 class xml_layout {
 public:
     explicit xml_layout(bool show_secrets) : show_secrets_(show_secrets) {}
@@ -121,7 +121,7 @@ private:
         out_ += span("x", token.source);
     }
 
-    // A secret ends with the end tag of the name that it began with, whatever stands inside.
+    // A secret ends with the end tag of the element that it began with, whatever is inside.
     void hide_within(std::string_view name)
     {
         if (hides())

@@ -1,4 +1,4 @@
-// trace_page.h - exchanges of a trace as one HTML page that needs nothing beside itself, and runs no script.
+// trace_page.h - exchanges of a trace as one HTML page that needs no other file and runs no script.
 #pragma once
 
 #include <string>

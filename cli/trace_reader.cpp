@@ -20,7 +20,7 @@ bool is_digit(std::string_view text, std::size_t at)
     return at < text.size() && text[at] >= '0' && text[at] <= '9';
 }
 
-// "HTTP/1.1 200" at this place.
+// True if "HTTP/1.1 200" or its like begins here.
 bool is_status_line(std::string_view text, std::size_t at)
 {
     return text.substr(at).starts_with(VERSION) && is_digit(text, at + 7) &&
@@ -45,7 +45,7 @@ bool is_start_line(std::string_view text, std::size_t at)
     return is_status_line(text, at) || is_request_line(text, at);
 }
 
-// The request line whose version stands at `version`; NOT_FOUND if there is none.
+// The request line whose version is at `version`; NOT_FOUND if there is none.
 std::size_t request_line_before(std::string_view text, std::size_t from, std::size_t version)
 {
     const std::size_t least = std::max(from, version > START_LINE_MAX ? version - START_LINE_MAX : 0);
@@ -58,7 +58,7 @@ std::size_t request_line_before(std::string_view text, std::size_t from, std::si
     return best;
 }
 
-// Where the next message begins; the end if there is none. No byte is looked at for two request lines.
+// Where the next message begins; the end if there is none. No byte is examined for two request lines.
 std::size_t next_start(std::string_view text, std::size_t from)
 {
     std::size_t line = from;
@@ -79,7 +79,7 @@ std::string_view trimmed(std::string_view text)
     return first == NOT_FOUND ? "" : text.substr(first, text.find_last_not_of(" \t\r") - first + 1);
 }
 
-// Reads the head at `at`, which moves behind it.
+// Reads the head at `at`, which moves to its end.
 void read_head(std::string_view trace, std::size_t &at, trace_message &message)
 {
     bool first = true;
@@ -124,7 +124,7 @@ body_framing framing_of(const trace_message &message)
     return framing;
 }
 
-// Reads the body. One that is not followed by a message, or whose length nobody told, ends where the next
+// Reads the body. One that is not followed by a message, or whose length is unknown, ends where the next
 // message begins.
 void read_body(std::string_view trace, std::size_t &at, trace_message &message, trace_budget &budget)
 {
@@ -132,8 +132,8 @@ void read_body(std::string_view trace, std::size_t &at, trace_message &message, 
     const std::size_t begin = at;
     if (framing.chunked || framing.length_known) {
         trace_body body = read_trace_body(trace, begin, framing, budget);
-        const std::size_t behind = std::min(trace.find_first_not_of("\r\n", body.end), trace.size());
-        if (body.complete && (behind == trace.size() || is_start_line(trace, behind))) {
+        const std::size_t next = std::min(trace.find_first_not_of("\r\n", body.end), trace.size());
+        if (body.complete && (next == trace.size() || is_start_line(trace, next))) {
             message.body = std::move(body.bytes);
             at = body.end;
             return;

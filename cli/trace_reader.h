@@ -1,9 +1,9 @@
-// trace_reader.h - a trace file as messages: requests and answers in the order in which they stand there.
+// trace_reader.h - a trace file as messages: requests and answers in their order in the file.
 //
 // Elsewhere: framing and compression (trace_body.h), what belongs together and what it means
 // (trace_exchange.h).
 //
-// Always: any bytes may be read. What follows no rule is kept as a message without a start line. Time grows
+// Always: any bytes may be read. What can't be parsed is kept as a message without a start line. Time grows
 // with the file's size.
 #pragma once
 
@@ -17,11 +17,11 @@ namespace cli {
 
 struct trace_message {
     bool request = false;
-    std::string start_line; // empty for what no HTTP head goes before
+    std::string start_line; // empty for bytes without an HTTP head before them
     std::vector<std::pair<std::string, std::string>> headers;
     std::string body;          // framing and compression undone
     std::size_t wire_size = 0; // bytes in the trace
-    bool complete = true;      // false: it broke off, or its body can't be made out
+    bool complete = true;      // false: it is cut off, or its body can't be decoded
 
     int status() const; // of an answer; 0 for none
     // Value of a header by its name, any case; empty for none.
@@ -30,6 +30,6 @@ struct trace_message {
 
 std::vector<trace_message> read_trace(std::string_view trace);
 
-bool same_name(std::string_view a, std::string_view b); // the case of letters aside
+bool same_name(std::string_view a, std::string_view b); // ignoring case
 
 } // namespace cli

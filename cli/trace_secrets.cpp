@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <cctype>
 
+#include "contract.h"
 #include "trace_reader.h"
 
 namespace cli {
@@ -20,7 +21,7 @@ constexpr std::string_view SECRET_HEADERS[] = {"Authorization", "Proxy-Authoriza
 
 bool is_secret_name(std::string_view qname)
 {
-    std::string name(qname.substr(qname.find(':') + 1));
+    std::string name(contract::local_name(qname));
     std::transform(name.begin(), name.end(), name.begin(),
                    [](unsigned char c) { return static_cast<char>(std::tolower(c)); });
     return name == "key" ||

@@ -11,7 +11,7 @@ inline constexpr std::string_view BLANKED = "[not shown]";
 // True if the content of an element, or the value of an attribute, of this name is secret.
 bool is_secret_name(std::string_view qname);
 
-// The value of a header fit to be shown.
+// The value of a header, without secrets.
 std::string shown_header(std::string_view name, std::string_view value, bool show_secrets);
 
 // A start line without what follows the "?" of its URL, which may hold a token.

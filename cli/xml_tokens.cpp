@@ -9,14 +9,14 @@ namespace {
 
 constexpr std::string_view BLANKS = " \t\r\n";
 
-// Bytes up to and with a text; all of them if it is not there.
+// Bytes up to the end of a text; all of them if it is not there.
 std::size_t through(std::string_view text, std::string_view end, std::size_t from)
 {
     const std::size_t at = text.find(end, from);
     return at == std::string_view::npos ? text.size() : at + end.size();
 }
 
-// Bytes of a tag: to the ">" that stands outside of quotes.
+// Bytes of a tag: to the ">" outside of quotes.
 std::size_t tag_size(std::string_view text)
 {
     char quote = 0;

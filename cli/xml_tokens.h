@@ -1,4 +1,4 @@
-// xml_tokens.h - XML cut into tags and texts without asking whether it is well-formed: to show what came,
+// xml_tokens.h - XML cut into tags and texts without asking whether it is well-formed: to show what arrived,
 // broken or not.
 #pragma once
 
@@ -10,7 +10,7 @@ enum class xml_kind { start, empty, end, text, other }; // other: declarations, 
 
 struct xml_token {
     xml_kind kind;
-    std::string_view source; // as it stands, brackets included
+    std::string_view source; // unchanged, brackets included
     std::string_view name;   // of a tag, "p:identity"
 };
 
@@ -25,8 +25,8 @@ private:
     std::string_view rest_;
 };
 
-// The next attribute of a tag's source, which is cut behind it; false if there is none.
-//   gap    what stands ahead of it
+// The next attribute of a tag's source, which is cut to what follows it; false if there is none.
+//   gap    what is before it
 //   value  with its quotes; empty for none
 bool next_attribute(std::string_view &tag, std::string_view &gap, std::string_view &name,
                     std::string_view &value);

@@ -1,4 +1,4 @@
-# The benchmark of calls, with -DZUV_BUILD_BENCH=ON: the library beside sockets by hand and libcurl.
+# The benchmark of calls, with -DZUV_BUILD_BENCH=ON: the library, sockets by hand and libcurl.
 find_package(CURL REQUIRED)
 find_package(pugixml REQUIRED)
 find_package(CLI11 REQUIRED)

@@ -1,4 +1,4 @@
-# The files of the contract as text within zuv-service, which hands them out. To be included ahead of service.cmake.
+# The files of the contract as text within zuv-service, which hands them out. To be included before service.cmake.
 #
 # zuv_embed_contract(schema target_file): writes a source that defines what service/contract_files.h declares.
 function(zuv_embed_contract schema target_file)

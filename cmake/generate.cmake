@@ -8,59 +8,20 @@ target_link_libraries(contract_translator PUBLIC pugixml::pugixml PRIVATE zuv_fl
 add_executable(contract2cpp ${PROJECT_SOURCE_DIR}/tools/contract2cpp/main.cpp)
 target_link_libraries(contract2cpp PRIVATE contract_translator zuv_flags)
 
-# As in tools/contract2cpp/layout.h.
-set(CLASSES_PER_UNIT 40)
-set(PORTS_WITHOUT_PROXY ProblemReport)
-
-# The files that contract2cpp writes below `out` for the contract in `schema`: public headers into `headers`, sources and
-# private headers into `sources`.
-function(zuv_contract_outputs schema out headers sources)
-    file(STRINGS ${schema}/type_ids.txt rows REGEX "^[0-9]+ +(class|enum) ")
-    set(prefixes)
-    foreach(row ${rows})
-        if(row MATCHES "^[0-9]+ +class +_?([A-Za-z0-9]+)__")
-            list(APPEND prefixes ${CMAKE_MATCH_1})
-            math(EXPR count_${CMAKE_MATCH_1} "0${count_${CMAKE_MATCH_1}} + 1")
-        elseif(row MATCHES "^[0-9]+ +enum +([A-Za-z0-9]+):")
-            list(APPEND prefixes ${CMAKE_MATCH_1})
-        endif()
-    endforeach()
-    list(REMOVE_DUPLICATES prefixes)
-    set(public ${out}/include/zuv_client_pro/type_ids.h)
-    set(private ${out}/src/class_list.h ${out}/src/registry_tables.cpp ${out}/src/contract_namespaces.cpp ${out}/src/contract_namespaces.h)
-    foreach(prefix ${prefixes})
-        list(APPEND public ${out}/include/zuv_client_pro/${prefix}.h)
-        list(APPEND private ${out}/src/traits_${prefix}.h)
-        set(units 1)
-        if(DEFINED count_${prefix})
-            math(EXPR units "(${count_${prefix}} + ${CLASSES_PER_UNIT} - 1) / ${CLASSES_PER_UNIT}")
-        endif()
-        foreach(unit RANGE 1 ${units})
-            list(APPEND private ${out}/src/classes_${prefix}_${unit}.cpp)
-        endforeach()
-    endforeach()
-    file(GLOB_RECURSE ports CONFIGURE_DEPENDS ${schema}/*.wsdl)
-    foreach(path ${ports})
-        get_filename_component(port ${path} NAME_WE)
-        if(port IN_LIST PORTS_WITHOUT_PROXY)
-            list(APPEND public ${out}/include/zuv_client_pro/${port}SoapBinding.h)
-        else()
-            list(APPEND public ${out}/include/zuv_client_pro/${port}SoapBindingProxy.h)
-            list(APPEND private ${out}/src/${port}SoapBindingProxy.cpp)
-        endif()
-    endforeach()
-    set(${headers} ${public} PARENT_SCOPE)
-    set(${sources} ${private} PARENT_SCOPE)
-endfunction()
-
-# Translates the contract in `schema` while building, below `out`. What is written: see zuv_contract_outputs, and what the
-# command line is made from, in out/tools. Further arguments go to the generator.
+# Translates the contract in `schema` while building, below `out`: public headers into `headers`, sources and private headers
+# into `sources`, and into out/tools what the command line is made from. Which files these are is in outputs.txt next to the
+# contract, against which the generator checks what it writes. Further arguments go to the generator.
 function(zuv_translate_contract schema out headers sources)
-    zuv_contract_outputs(${schema} ${out} public private)
+    file(STRINGS ${schema}/outputs.txt outputs)
+    list(TRANSFORM outputs PREPEND ${out}/)
+    set(public ${outputs})
+    set(private ${outputs})
+    list(FILTER public INCLUDE REGEX "^${out}/include/")
+    list(FILTER private INCLUDE REGEX "^${out}/src/")
     file(GLOB_RECURSE contract CONFIGURE_DEPENDS ${schema}/*.xsd ${schema}/*.wsdl ${schema}/*.txt)
-    set_property(DIRECTORY APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS ${schema}/type_ids.txt)
+    set_property(DIRECTORY APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS ${schema}/outputs.txt)
     add_custom_command(
-        OUTPUT ${public} ${private} ${out}/tools/operation_list.h ${out}/tools/contract_description.cpp
+        OUTPUT ${outputs}
         COMMAND contract2cpp --schema ${schema} --out ${out} ${ARGN}
         DEPENDS contract2cpp ${contract}
         COMMENT "Translating the contract in ${schema}"

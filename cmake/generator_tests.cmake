@@ -27,7 +27,7 @@ target_link_libraries(public_headers_alone PRIVATE zuv_flags)
 add_dependencies(public_headers_alone zuv_generated)
 
 # One of everything, translated, compiled and sent through the rules. Its registry and its namespaces stand in for the
-# library's: being objects of the program, they come ahead of those in the archive.
+# library's: being objects of the program, they come before those in the archive.
 zuv_translate_contract(${GENERATOR_TESTS}/everything ${PROJECT_BINARY_DIR}/everything everything_headers everything_sources)
 add_custom_target(everything_generated DEPENDS ${everything_headers} ${everything_sources})
 add_executable(everything_test ${GENERATOR_TESTS}/everything_test.cpp ${everything_sources} ${everything_headers})

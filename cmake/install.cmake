@@ -1,5 +1,5 @@
 # What `cmake --install` lays down, in three components: runtime, development, tools. Packages of them: packages.cmake. To be
-# included behind whatever makes a program.
+# included after all that adds programs.
 include(CMakePackageConfigHelpers)
 set(ZUV_CMAKE_DIR ${CMAKE_INSTALL_LIBDIR}/cmake/zuv_client_pro)
 

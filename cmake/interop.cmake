@@ -1,5 +1,5 @@
-# Independent peers: other toolkits call the service, the library calls a service on another toolkit, a proxy between them.
-# And endurance. To be included behind service.cmake.
+# Independent peers: other toolkits call the service, the library calls a service on another toolkit. And endurance. To be
+# included after service.cmake.
 set(INTEROP ${PROJECT_SOURCE_DIR}/tests/interop)
 set(ZUV_SCHEMA ${PROJECT_SOURCE_DIR}/schema)
 
@@ -20,19 +20,19 @@ zuv_add_interop(zeep_ports $<TARGET_FILE:zuv-service>)
 zuv_add_interop(contract_handed_out $<TARGET_FILE:zuv-service>)
 zuv_add_interop(client_ports $<TARGET_FILE:zuv> $<TARGET_FILE:care_host> $<TARGET_FILE:problem_report_host>
     $<TARGET_FILE:zuv-service> ${NPM_SERVICE})
-zuv_add_interop(nginx_profile $<TARGET_FILE:zuv> $<TARGET_FILE:zuv-service> ${NPM_SERVICE})
-set_tests_properties(interop_client_ports interop_nginx_profile PROPERTIES FIXTURES_REQUIRED npm_service)
+set_tests_properties(interop_client_ports PROPERTIES FIXTURES_REQUIRED npm_service)
 
 # What follows looks at memory itself, which a sanitizer changes.
 if(ZUV_SANITIZE OR ZUV_FUZZ)
     return()
 endif()
-add_test(NAME transfer COMMAND /usr/bin/python3 -B ${INTEROP}/transfer.py 40000000 $<TARGET_FILE:file_host>
+add_test(NAME transfer COMMAND /usr/bin/python3 -B ${PROJECT_SOURCE_DIR}/script/lib/transfer.py 40000000 $<TARGET_FILE:file_host>
     $<TARGET_FILE:zuv-service> $<TARGET_FILE:zuv>)
 set_tests_properties(transfer PROPERTIES LABELS soak TIMEOUT 300)
 
-zuv_add_test(soak_test ${PROJECT_SOURCE_DIR}/tests/soak/soak_test.cpp) # script/soak makes more calls
-target_link_libraries(soak_test PRIVATE zuv_service_test_support)
+zuv_add_test(soak_test ${PROJECT_SOURCE_DIR}/tests/soak/soak_test.cpp
+    ${PROJECT_SOURCE_DIR}/tests/soak/service_process.cpp) # script/soak makes more calls
+target_compile_definitions(soak_test PRIVATE ZUV_SERVICE_PROGRAM="$<TARGET_FILE:zuv-service>")
 add_dependencies(soak_test zuv-service)
 set_tests_properties(soak_test PROPERTIES LABELS soak)
 

@@ -15,7 +15,7 @@ target_compile_options(zuv_objects PRIVATE -fno-strict-aliasing -fno-delete-null
     -fno-semantic-interposition
     -ffile-prefix-map=${PROJECT_SOURCE_DIR}/=)
 
-# The shared object: soname and file bear the whole version. OpenSSL and zlib come from the host's link line, where the
+# The shared object: soname and file name have the whole version. OpenSSL and zlib come from the host's link line, where the
 # target brings them.
 add_library(zuv_client_pro SHARED ${PROJECT_SOURCE_DIR}/cmake/empty.cpp)
 set_target_properties(zuv_client_pro PROPERTIES

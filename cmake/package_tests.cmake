@@ -1,12 +1,12 @@
-# The shared object as a stranger gets it: what it exports and needs, and hosts built from the packages alone. To be
-# included behind install.cmake and packages.cmake.
+# The shared object as a user gets it: what it exports and needs, and hosts built from the packages alone. To be
+# included after install.cmake and packages.cmake.
 if(ZUV_SANITIZE OR ZUV_THREADS OR ZUV_FUZZ OR ZUV_COVERAGE)
     return() # such objects are not what is handed out
 endif()
 set(PACKAGE_TESTS ${PROJECT_SOURCE_DIR}/tests/package)
 set(TEST_PACKAGES ${PROJECT_BINARY_DIR}/package_tests/packages)
 
-add_test(NAME library_surface COMMAND /usr/bin/python3 -B ${PROJECT_SOURCE_DIR}/tests/abi/surface.py
+add_test(NAME library_surface COMMAND /usr/bin/python3 -B ${PROJECT_SOURCE_DIR}/script/lib/abi_surface.py
     $<TARGET_FILE:zuv_client_pro> ${PROJECT_SOURCE_DIR}/docs/interface/exported_names.txt
     ${PROJECT_SOURCE_DIR}/include/zuv_client_pro ${ZUV_GENERATED_DIR}/include/zuv_client_pro)
 

@@ -1,4 +1,4 @@
-# zuv-service: the program, its parts as a library for the tests, and the tests. To be included behind tests.cmake.
+# zuv-service: the program, its parts as a library for the tests, and their tests. To be included after tests.cmake.
 find_package(SQLite3 REQUIRED)
 find_package(CLI11 REQUIRED)
 file(GLOB ZUV_SERVICE_SOURCES CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/service/*.cpp)
@@ -13,17 +13,11 @@ add_dependencies(zuv_service_parts zuv_generated)
 add_executable(zuv-service ${PROJECT_SOURCE_DIR}/service/main.cpp)
 target_link_libraries(zuv-service PRIVATE zuv_service_parts CLI11::CLI11 zuv_flags zuv_hardening)
 
-if(ZUV_BUILD_TESTS)
+if(ZUV_BUILD_TESTS) # of its parts; those of the program are run with those of the command line
     file(GLOB ZUV_SERVICE_TESTS CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/tests/service/*_test.cpp)
-    file(GLOB ZUV_SERVICE_TEST_SUPPORT CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/tests/service/*.cpp)
-    list(REMOVE_ITEM ZUV_SERVICE_TEST_SUPPORT ${ZUV_SERVICE_TESTS})
-    add_library(zuv_service_test_support STATIC ${ZUV_SERVICE_TEST_SUPPORT})
-    target_link_libraries(zuv_service_test_support PUBLIC zuv_test_support zuv_service_parts)
-    target_compile_definitions(zuv_service_test_support PUBLIC ZUV_SERVICE_PROGRAM="$<TARGET_FILE:zuv-service>")
     foreach(source ${ZUV_SERVICE_TESTS})
         get_filename_component(name ${source} NAME_WE)
         zuv_add_test(service_${name} ${source})
-        target_link_libraries(service_${name} PRIVATE zuv_service_test_support)
-        add_dependencies(service_${name} zuv-service)
+        target_link_libraries(service_${name} PRIVATE zuv_service_parts)
     endforeach()
 endif()

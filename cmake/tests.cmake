@@ -16,8 +16,8 @@ if(ZUV_SHARED_OBJECTS)
     target_compile_options(zuv_torture PRIVATE -ftls-model=initial-exec)
 endif()
 
-# ThreadSanitizer wants its addresses free, which the layouts of newer kernels don't always leave; and memory is asked for ahead
-# of its own start.
+# ThreadSanitizer wants its addresses free, which the layouts of newer kernels don't always leave; and memory is allocated before
+# its own start.
 set(ZUV_TEST_LAUNCHER)
 if(ZUV_THREADS)
     execute_process(COMMAND setarch -R true RESULT_VARIABLE refused ERROR_QUIET)
@@ -45,7 +45,7 @@ endforeach()
 target_compile_definitions(zuv_test_support PUBLIC ZUV_GOLDEN_DIR="${PROJECT_SOURCE_DIR}/tests/golden"
     ZUV_SCHEMA_DIR="${PROJECT_SOURCE_DIR}/schema" ZUV_SAMPLE_DIR="${PROJECT_SOURCE_DIR}/tests/samples")
 
-# Another parser beside the reader.
+# Another parser, to compare the reader with.
 find_package(LibXml2 REQUIRED)
 target_link_libraries(xml_reference_test PRIVATE LibXml2::LibXml2)
 if(ZUV_FUZZ OR ZUV_SANITIZE)

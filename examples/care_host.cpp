@@ -201,11 +201,11 @@ void report_status(const host_options &options, machine &array)
     status.call("create", &proxy::create, report, state::open, "open");
 
     protocol__Attachment configuration;
-    protocol__DataPortPreference wish;
-    wish.transport = {protocol__Transport::HTTP};
+    protocol__DataPortPreference preference;
+    preference.transport = {protocol__Transport::HTTP};
     _protocolStatusReport__attachRequest attach;
     attach.attachment = &configuration;
-    attach.dataPortPreference = &wish;
+    attach.dataPortPreference = &preference;
     const auto &offered = status.call("attach", &proxy::attach, attach, state::open, "open");
     expect(offered.attachment.size() == 1 && offered.attachment[0]->dataPort.size() == 1 &&
                offered.attachment[0]->thisURI != nullptr &&

@@ -1,10 +1,10 @@
-// file_host.cpp - a host that hands a file to the service beside a message, and fetches it back. The file may
+// file_host.cpp - a host that sends a file to the service with a message, and fetches it back. The file may
 // be of any size: its bytes go through callbacks, and never lie in memory as a whole.
 //
 // Usage: file_host [--mtom | --mime | --dime] [--chunked] SERVICE FILE COPY, SERVICE being
 // "http://HOST:PORT".
 //   --mtom, --mime, --dime  the form of the messages; MTOM unless told otherwise
-//   --chunked               the size isn't told ahead, as for data that is made while it is sent
+//   --chunked               the size isn't told beforehand, as for data that is made while it is sent
 // No trace file is written.
 //
 // Who owns what: the host its files, whose addresses are the handles of the attachments; the library hands

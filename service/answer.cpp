@@ -41,7 +41,7 @@ int write_message(soap *ctx, const content &body)
     return 0;
 }
 
-// What the request left in the context must not shape the answer.
+// Resets what the request set in the context, so that it does not affect the answer.
 void forget_request_framing(soap *ctx)
 {
     ctx->error = SOAP_OK;
@@ -66,9 +66,9 @@ int write_head(soap *ctx, std::uint64_t length)
     return 0;
 }
 
-int send_counted(soap *ctx, const content &body, enclosures *beside)
+int send_counted(soap *ctx, const content &body, enclosures *enclosed)
 {
-    if ((beside != nullptr && beside->attach_all(ctx)) || soap_count_begin(ctx))
+    if ((enclosed != nullptr && enclosed->attach_all(ctx)) || soap_count_begin(ctx))
         return ctx->error;
     if ((ctx->mode & MODE_COUNTING) && write_message(ctx, body))
         return ctx->error;
@@ -80,23 +80,23 @@ int send_counted(soap *ctx, const content &body, enclosures *beside)
     return soap_send_finish(ctx);
 }
 
-int send_message(soap *ctx, int http_status, const content &body, enclosures *beside)
+int send_message(soap *ctx, int http_status, const content &body, enclosures *enclosed)
 {
     forget_request_framing(ctx);
     ctx->status = http_status;
     const std::uint32_t output_mode = ctx->output_mode;
-    if (beside != nullptr)
-        ctx->output_mode |= beside->answer_form();
-    const int result = send_counted(ctx, body, beside);
+    if (enclosed != nullptr)
+        ctx->output_mode |= enclosed->answer_form();
+    const int result = send_counted(ctx, body, enclosed);
     ctx->output_mode = output_mode;
     return result;
 }
 
 } // namespace
 
-int send_response(soap *ctx, const operation &op, const void *response, enclosures &beside)
+int send_response(soap *ctx, const operation &op, const void *response, enclosures &enclosed)
 {
-    return send_message(ctx, OK, {put_response, &op, response}, &beside);
+    return send_message(ctx, OK, {put_response, &op, response}, &enclosed);
 }
 
 int send_fault(soap *ctx, int http_status)
@@ -149,10 +149,10 @@ void settle_version(soap *ctx)
 int fault_from_refusal(soap *ctx, const refusal &refused)
 {
     settle_version(ctx);
-    const bool is_clients = refused.is_clients();
+    const bool is_client_fault = refused.is_client_fault();
     ctx->fault = nullptr;
     const char *const text = text_of(refused.fault->description).c_str();
-    if (is_clients)
+    if (is_client_fault)
         soap_fault_sender(ctx, text, nullptr, SOAP_FAULT);
     else
         soap_fault_receiver(ctx, text, nullptr, SOAP_FAULT);
@@ -162,7 +162,7 @@ int fault_from_refusal(soap *ctx, const refusal &refused)
     SOAP_ENV__Detail *const detail = ctx->soap_version == 1 ? ctx->fault->detail : ctx->fault->Detail;
     if (detail != nullptr)
         refused.place(*detail, refused.fault);
-    return is_clients && ctx->soap_version == 2 ? BAD_REQUEST : INTERNAL_ERROR;
+    return is_client_fault && ctx->soap_version == 2 ? BAD_REQUEST : INTERNAL_ERROR;
 }
 
 } // namespace service

@@ -1,7 +1,7 @@
-// answer.h - messages on their way back: a response, a fault, a file.
+// answer.h - sends answers: a response, a fault, a file.
 //
-// Always: results are 0 or the code that also stands in ctx->error. The connection is neither kept nor closed
-// here.
+// Always: results are SOAP_OK, or an error code that ctx->error holds too. Whether the connection is kept is
+// decided elsewhere (exchange.h).
 #pragma once
 
 #include <cstdint>
@@ -16,20 +16,20 @@
 namespace service {
 
 // Sends the response of an operation in the SOAP version of the request, with ctx->header as its header, and
-// the files that go with it.
-int send_response(soap *ctx, const operation &op, const void *response, enclosures &beside);
+// the files that are attached to it.
+int send_response(soap *ctx, const operation &op, const void *response, enclosures &enclosed);
 
 // Sends ctx->fault under an HTTP status, with ctx->header as its header.
 int send_fault(soap *ctx, int http_status);
 
-// Sends bytes of a media type as they are. SOAP_STOP: the request is dealt with.
+// Sends bytes of a media type as they are. SOAP_STOP: the request is answered.
 int send_file(soap *ctx, const char *type, const std::string &bytes);
 
-// The same for so many bytes that `read` gives piece by piece; it returns 0 where it has no more.
+// The same for so many bytes that `read` gives piece by piece; it returns 0 at the end.
 int send_file(soap *ctx, const char *type, std::uint64_t size,
               const std::function<std::size_t(char *buffer, std::size_t length)> &read);
 
-// Makes ctx->fault of a refusal: code, text and typed detail in the SOAP version of the request.
+// Makes ctx->fault from a refusal: code, text and typed detail in the SOAP version of the request.
 // The HTTP status to send it under.
 int fault_from_refusal(soap *ctx, const refusal &refused);
 

@@ -18,7 +18,7 @@ namespace {
 using state = protocol__AttachmentState;
 
 constexpr double ALL = 100;                  // per cent
-constexpr std::size_t REFERENCES_MAX = 1000; // attachments of one request that refer to data beside it
+constexpr std::size_t REFERENCES_MAX = 1000; // attachments of one request that refer to data sent with it
 
 template <class T> bool admits(const std::vector<T> &wanted, std::initializer_list<T> offered)
 {
@@ -62,7 +62,7 @@ bool holds_data(const protocol__Attachment &attachment)
 }
 
 // ---------------------------------------------------------------------------------------------
-// Data beside the message. What the service keeps is referred to by its name.
+// Data sent with the message. What the service keeps is referred to by its name.
 
 constexpr std::string_view SCHEME = "cid:";
 
@@ -89,7 +89,7 @@ template <class Use> void each_attachment(const attachments &list, const Use &us
     }
 }
 
-// All names under which the service may keep data of the attachments: of those that came beside a message,
+// All names under which the service may keep data of the attachments: of those that came with a message,
 // and of those that came through a data port.
 std::set<std::string> names_in(const attachments &list)
 {
@@ -112,17 +112,17 @@ struct kept_data {
     std::uint64_t size;
 };
 
-// Keeps data that came beside the message under a fresh name.
+// Keeps data that came with the message under a new name.
 kept_data keep_enclosed(call &c, const std::string &reference)
 {
     enclosed_data data{};
-    if (!c.beside.find(c.ctx, reference, data))
+    if (!c.enclosed.find(c.ctx, reference, data))
         refuse<protocol__Client_x002eInvalidInformation>(
             c.ctx, "Nothing came with the message under the reference " + reference + ".");
     kept_data kept{fresh_uuid(), data.size};
     c.documents.expect_data(kept.name);
     c.documents.note_data(kept.name, data.size);
-    c.beside.keep(data, kept.name);
+    c.enclosed.keep(data, kept.name);
     return kept;
 }
 
@@ -135,7 +135,7 @@ void refer_to(call &c, protocol__Attachment &attachment, const kept_data &kept)
     attachment.dataPort.front()->attachmentURI = attachment.thisURI;
 }
 
-// A document is kept as plain XML, where binary values stand in place.
+// A document is kept as plain XML, with binary values inline.
 void put_values_in_place(const protocol__Attachment &attachment)
 {
     for (protocol__DataPort *port : attachment.dataPort)
@@ -188,18 +188,18 @@ protocol__DataPort *make_data_port(const call &c, protocol__Direction direction,
     return port;
 }
 
-bool serves(const call &c, const protocol__DataPortPreference *wish, protocol__Direction direction)
+bool serves(const call &c, const protocol__DataPortPreference *preference, protocol__Direction direction)
 {
-    return wish == nullptr || (admits_uri(wish->dataURIType) &&
-                               admits(wish->direction, {direction, protocol__Direction::inout}) &&
-                               admits(wish->transport, {protocol__Transport::HTTP}) &&
-                               admits(wish->authentication, {authentication_of(c)}));
+    return preference == nullptr || (admits_uri(preference->dataURIType) &&
+                                     admits(preference->direction, {direction, protocol__Direction::inout}) &&
+                                     admits(preference->transport, {protocol__Transport::HTTP}) &&
+                                     admits(preference->authentication, {authentication_of(c)}));
 }
 
 protocol__Client_x002eDataPortIncompatibility *
-incompatibility(const call &c, const protocol__DataPortPreference *wish, protocol__Direction direction)
+incompatibility(const call &c, const protocol__DataPortPreference *preference, protocol__Direction direction)
 {
-    if (serves(c, wish, direction))
+    if (serves(c, preference, direction))
         return nullptr;
     auto *const fault = make_fault<protocol__Client_x002eDataPortIncompatibility>(
         c.ctx, "The service has no data port of the kind preferred.");
@@ -210,7 +210,7 @@ incompatibility(const call &c, const protocol__DataPortPreference *wish, protoco
 }
 
 void take_attachment(call &c, attachments &held, protocol__Attachment *given,
-                     const protocol__DataPortPreference *wish)
+                     const protocol__DataPortPreference *preference)
 {
     if (given == nullptr)
         refuse<protocol__Client_x002eInsufficientInformation>(c.ctx, "The request holds no attachment.");
@@ -221,7 +221,7 @@ void take_attachment(call &c, attachments &held, protocol__Attachment *given,
     attachments taken = {given};
     take_references(c, taken);
     if (!holds_data(*given)) {
-        if (auto *const fault = incompatibility(c, wish, protocol__Direction::in))
+        if (auto *const fault = incompatibility(c, preference, protocol__Direction::in))
             refuse(fault);
         c.documents.expect_data(name);
         protocol__DataPort *const port = make_data_port(c, protocol__Direction::in, name);
@@ -256,7 +256,7 @@ void take_references(call &c, attachments &given, const attachments *held)
             return;
         if (++references > REFERENCES_MAX)
             refuse<protocol__Client_x002eInvalidInformation>(
-                c.ctx, "Too many attachments of the request refer to data beside it.");
+                c.ctx, "Too many attachments of the request refer to data sent with it.");
         const std::string &reference = *attachment.dataHandler;
         auto place = kept.find(reference);
         if (place == kept.end())
@@ -266,12 +266,12 @@ void take_references(call &c, attachments &given, const attachments *held)
 }
 
 void settle_references(call &c, attachments &answered,
-                       const std::function<bool(const protocol__Attachment &)> &goes)
+                       const std::function<bool(const protocol__Attachment &)> &is_sent)
 {
     each_attachment(answered, [&](protocol__Attachment &attachment) {
         const std::string name = name_of(attachment.dataHandler);
-        const bool enclosed = !name.empty() && c.beside.has_form() && goes(attachment) &&
-                              c.documents.data_size(name) && c.beside.enclose(name);
+        const bool enclosed = !name.empty() && c.enclosed.has_form() && is_sent(attachment) &&
+                              c.documents.data_size(name) && c.enclosed.enclose(name);
         if (!enclosed)
             attachment.dataHandler = nullptr;
     });

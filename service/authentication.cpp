@@ -12,8 +12,8 @@ namespace {
 using request = protocolUpdateOrder__AuthenticateRequest;
 using response = protocolUpdateOrder__AuthenticateResponse;
 
-// Requests may refer to each other: nested ones may be more than there are in the message, or without end,
-// and their answers name the same user again and again.
+// Requests may refer to each other: so there may be more nested ones than the message has, or endlessly many,
+// and their answers may repeat one long user name.
 constexpr unsigned DEPTH_MAX = 100;
 constexpr std::uint64_t ANSWER_BYTES = 1000; // of one nested answer, the user's name left out
 
@@ -49,7 +49,7 @@ protocol__Fault *fault_with(call &c, protocol__Credentials *credentials)
                                                                                "The user is not known.");
 }
 
-// What is told of the credentials: whose they are, not the secret.
+// What the answer says of the credentials: the user, not the secret.
 protocol__Credentials *without_secret(call &c, const protocol__Credentials *given, bool good)
 {
     if (given == nullptr)
@@ -61,7 +61,7 @@ protocol__Credentials *without_secret(call &c, const protocol__Credentials *give
     return told;
 }
 
-// `left`: bytes that the answers may still come to.
+// `left`: bytes that the answers may still take.
 response *answer(call &c, const request &asked, unsigned depth, std::uint64_t &left)
 {
     const std::uint64_t bytes =

@@ -53,7 +53,7 @@ template <class Reference> bool names(const Reference *reference, const update_r
            text_of(reference->updateIdQualifier) == text_of(update.updateIdQualifier);
 }
 
-// Adds an update unless it is there.
+// Adds an update unless it is there already.
 void add(updates &list, const update_record *update)
 {
     if (update != nullptr && std::find(list.begin(), list.end(), update) == list.end())
@@ -85,7 +85,7 @@ template <class Reference> updates catalogue::follow(const std::vector<Reference
     return found;
 }
 
-// Each relation may be told at either end.
+// Each relation may be stated at either end.
 updates catalogue::superseding(const update_record &update) const
 {
     updates found = follow(update.superseding);

@@ -1,7 +1,7 @@
 // catalogue.h - the updates that the service offers, and the tree of product collections that they belong to.
 //
-// Here: reading the catalogue and finding one's way in it. Elsewhere: its text (catalogue_text.cpp), what an
-// order makes of it (expansion.h).
+// Here: reading the catalogue and looking up updates in it. Elsewhere: its text (catalogue_text.cpp), what an
+// order selects from it (expansion.h).
 //
 // Always: the catalogue is read once and never changed, so threads share it.
 #pragma once
@@ -34,7 +34,7 @@ public:
     updates required(const update_record &update) const;
     updates patches(const update_record &update) const;      // that patch it
     updates contained(const update_record &update) const;    // that it groups
-    updates replacements(const update_record &update) const; // to be taken in its place under some condition
+    updates replacements(const update_record &update) const; // that replace it under some condition
 
 private:
     template <class Reference> updates follow(const std::vector<Reference *> &references) const;
@@ -43,7 +43,7 @@ private:
     updates all_;
 };
 
-// The one catalogue; read at the first call, which throws if it can't be.
+// The one catalogue, read by the first call, which throws if that fails.
 const catalogue &the_catalogue();
 
 // XML of the updates: the content of an UpdateMetaData, in prefixes of its own.

@@ -81,7 +81,7 @@ constexpr const char *TOOL = R"(
 struct update_row {
     const char *id, *name, *description, *status;
     const char *subject, *further_subject; // XML
-    const char *rest;                      // XML of the members behind the subjects
+    const char *rest;                      // XML of the members after the subjects
 };
 
 constexpr update_row UPDATES[] = {

@@ -18,7 +18,7 @@ bool is_digit(char c)
     return c >= '0' && c <= '9';
 }
 
-// Takes the digits at the head of a text, without leading zeros.
+// Removes the digits at the beginning of a text, without leading zeros.
 std::string_view take_number(std::string_view &text)
 {
     const std::size_t end = std::min(text.find_first_not_of("0123456789"), text.size());
@@ -46,7 +46,7 @@ bool is_word_byte(char c)
     return !is_ascii(c) || std::isalnum(static_cast<unsigned char>(c)) != 0;
 }
 
-// The words of a text in turn, with blanks ahead of, between and behind them; empty without a word.
+// The words of a text in turn, with blanks before, between and after them; empty without a word.
 std::string words_of(std::string_view text, bool case_sensitive)
 {
     std::string words;
@@ -63,7 +63,7 @@ std::string words_of(std::string_view text, bool case_sensitive)
     return words;
 }
 
-// Takes the first word off what words_of made; empty at the end.
+// Removes the first word from what words_of made; empty at the end.
 std::string_view take_word(std::string_view &words)
 {
     words.remove_prefix(std::min<std::size_t>(words.size(), 1));

@@ -33,27 +33,27 @@ enum class text_operator {
 enum class set_operator { equal, not_equal, subset_of, superset_of };
 enum class moment_operator { equal, on, not_equal, not_on, before, after, on_or_before, on_or_after };
 
-// Order by what people mean: runs of digits compare as numbers, so that 10.2 comes behind 9.7. Below 0, 0, or
+// Natural order: runs of digits compare as numbers, so that 10.2 comes after 9.7. Below 0, 0, or
 // above.
 int compare_naturally(std::string_view one, std::string_view other);
 
-// Searches for words take no account of the case of ASCII letters; all else does.
+// Searches for words ignore the case of ASCII letters; the other operators don't.
 bool text_holds(text_operator op, const values &held, std::string_view wanted);
 
-// One of the three searches for words in running text. What it searches for is taken apart once.
+// One of the three searches for words in running text. What it searches for is split into words once.
 class word_search {
 public:
     word_search(text_operator op, std::string_view wanted, bool case_sensitive);
     word_search(const word_search &) = delete;
     word_search &operator=(const word_search &) = delete;
 
-    // Never if no word was wanted.
+    // False if there is no word to search for.
     bool found_in(std::string_view text) const;
 
 private:
     text_operator op_;
     bool case_sensitive_;
-    std::string asked_;                   // the words in turn, with blanks ahead of, between and behind them
+    std::string asked_;                   // the words in turn, with blanks before, between and after them
     std::vector<std::string_view> words_; // within asked_, each once, in order
 };
 

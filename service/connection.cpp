@@ -34,7 +34,7 @@ void let_peer_read(int socket)
     }
 }
 
-// A large exchange leaves its memory to the system and not to the next ones, which are small as a rule.
+// After a large exchange memory goes back to the system: the next ones are usually small.
 void free_memory(soap *ctx, const reception &received)
 {
     soap_discard_objects(ctx, nullptr);
@@ -46,9 +46,9 @@ void free_memory(soap *ctx, const reception &received)
 
 } // namespace
 
-void serve_connection(soap *ctx, const settings &config, session &lent)
+void serve_connection(soap *ctx, const settings &config, session &borrowed)
 {
-    reception received(ctx, config, lent);
+    reception received(ctx, config, borrowed);
     bool more = true;
     while (more) {
         more = serve_exchange(ctx, received);

@@ -8,6 +8,6 @@
 namespace service {
 
 // Serves the requests of a connection in turn until its end, then closes it. `ctx` holds the socket.
-void serve_connection(soap *ctx, const settings &config, session &lent);
+void serve_connection(soap *ctx, const settings &config, session &borrowed);
 
 } // namespace service

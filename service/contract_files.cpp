@@ -15,7 +15,7 @@ namespace {
 constexpr std::string_view USUAL_ROOT = "http://127.0.0.1:9080"; // as the contract has it
 constexpr std::string_view LOCATION = "schemaLocation=\"", NAMESPACE = "targetNamespace=\"";
 
-// The text of an attribute that begins there.
+// The value of the attribute that begins there.
 std::string_view value_at(std::string_view text, std::size_t at)
 {
     return text.substr(at, text.find('"', at) - at);
@@ -51,7 +51,7 @@ std::string wsdl_url(const port &described, const std::string &root)
     return root + std::string(SERVICES_PATH).append(described.name) + "?wsdl";
 }
 
-// Hands each port that has a WSDL to `use`, with it.
+// Calls `use` with each port that has a WSDL, and the WSDL.
 template <class Use> void each_wsdl(const Use &use)
 {
     for (const port *described : all_ports())

@@ -18,7 +18,7 @@ struct contract_file {
     std::string_view text;
 };
 
-// All files of the contract, for ever; the build makes them part of the program.
+// All files of the contract; the build makes them part of the program, so they live as long as it.
 std::span<const contract_file> contract_files();
 
 // A document of XML: a file below CONTRACT_PATH; at the path of a port its WSDL, with the query "wsdl" in

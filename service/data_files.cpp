@@ -27,7 +27,7 @@ std::string path_of(const std::string &directory, std::string_view name)
     throw std::system_error(errno, std::generic_category(), path);
 }
 
-// A name lives in its directory, which has to be on the disk as well.
+// A file's name is part of its directory, which must be written to the disk as well.
 void flush_directory(const std::string &directory)
 {
     const int descriptor = open(directory.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);

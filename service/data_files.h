@@ -13,7 +13,7 @@
 
 namespace service {
 
-// A file that is being written, without a name that anybody would look for.
+// A file that is being written, under a temporary name.
 class arriving_file {
 public:
     explicit arriving_file(const std::string &directory);
@@ -22,10 +22,11 @@ public:
     arriving_file &operator=(const arriving_file &) = delete;
 
     void write(const char *data, std::size_t length);
-    void flush(); // no more bytes: puts them on the disk, which takes its time, and gives the descriptor back
+    void
+    flush(); // no more bytes follow: writes them to the disk, which may take long, and closes the descriptor
     std::uint64_t size() const { return size_; }
 
-    // Gives it a name, flushed or not; takes the place of the file that had the name.
+    // Renames it, flushed or not; replaces the file that had the name.
     void keep_as(std::string_view name);
 
 private:
@@ -36,7 +37,7 @@ private:
     std::uint64_t size_ = 0;
 };
 
-// A file that was kept, for reading. It can be read to its end whatever happens to its name.
+// A kept file, for reading; it can be read to its end even if it is renamed or removed meanwhile.
 class kept_file {
 public:
     kept_file(const std::string &directory, std::string_view name);
@@ -54,14 +55,13 @@ private:
     std::uint64_t size_ = 0, position_ = 0;
 };
 
-// Makes the directory unless it is there, for its owner alone (mode 0700) whatever the umask is.
+// Creates the directory unless it exists, for its owner alone (mode 0700) whatever the umask is.
 void open_data_directory(const std::string &directory);
 
-// Removes a file; nothing if it isn't there.
+// Removes a file, if it exists.
 void remove_data(const std::string &directory, std::string_view name);
 
-// Removes what an end without warning has left: files that were arriving, and those that `known` doesn't
-// know.
+// Removes what a killed process has left: files that were arriving, and those for which `known` is false.
 void sweep_data(const std::string &directory, const std::function<bool(std::string_view name)> &known);
 
 } // namespace service

@@ -23,8 +23,8 @@ namespace {
 constexpr int BAD_REQUEST = 400, NOT_FOUND = 404;
 constexpr char MEDIA_TYPE[] = "application/octet-stream";
 
-// The body, framing and compression undone. False if less came than was announced; the size is reception's to
-// limit.
+// The body, framing and compression undone. False if less arrived than was announced; the size is limited by
+// reception.cpp.
 bool read_body(soap *ctx, arriving_file &file)
 {
     const bool length_known =

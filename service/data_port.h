@@ -12,8 +12,8 @@
 
 namespace service {
 
-// Both serve a name below DATA_PATH, once the head was read. They answer a request that succeeds and return
-// SOAP_STOP; otherwise an HTTP status or an error of the engine, which also stands in ctx->error, and nothing
+// Both serve a name below DATA_PATH, after the head was read. They answer a request that succeeds and return
+// SOAP_STOP; otherwise an HTTP status or an error of the engine, which ctx->error holds too, and nothing
 // was sent.
 int send_data(soap *ctx, store &documents, std::string_view name);
 int receive_data(soap *ctx, store &documents, std::string_view name); // after soap_receive_begin

@@ -60,8 +60,9 @@ std::size_t document_codec::give_input(soap *ctx, char *buffer, std::size_t leng
     return given;
 }
 
-// A binary value that came beside its message is written as a reference again, which here leads to nothing.
-bool document_codec::refers_beside()
+// A binary value that came with its message as an attachment is written as a reference again, which here
+// leads to nothing.
+bool document_codec::refers_to_attachment()
 {
     if (context_.dime.first == nullptr && context_.mime.first == nullptr)
         return false;
@@ -78,8 +79,8 @@ std::string document_codec::write_with(int (*put)(soap *ctx, const void *object)
     output_.clear();
     too_large_ = false;
     if (soap_count_begin(&context_) != SOAP_OK || soap_count_end(&context_) != SOAP_OK ||
-        soap_send_begin(&context_) != SOAP_OK || put(&context_, object) != SOAP_OK || refers_beside() ||
-        soap_send_finish(&context_) != SOAP_OK) {
+        soap_send_begin(&context_) != SOAP_OK || put(&context_, object) != SOAP_OK ||
+        refers_to_attachment() || soap_send_finish(&context_) != SOAP_OK) {
         if (too_large_)
             throw document_error("The document is larger than the service keeps.", 0, write_limit_);
         fail(context_);
@@ -100,7 +101,7 @@ void document_codec::read_with(bool (*get)(soap *ctx, void *object), void *objec
         fail(context_);
 }
 
-void document_codec::forget()
+void document_codec::reset()
 {
     soap_discard_objects(&context_, nullptr);
     soap_discard_all(&context_);

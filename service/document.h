@@ -1,7 +1,7 @@
 // document.h - documents as XML and as objects, and where they are kept.
 //
-// Here: the codec, which puts the library's own writer and reader to work on plain XML, and the shelf of one
-// port. Elsewhere: rows (store.h), what operations do with documents (the ports).
+// Here: the codec, which writes and reads plain XML with the library's own writer and reader, and the
+// repository of one port. Elsewhere: rows (store.h), what operations do with documents (the ports).
 #pragma once
 
 #include <algorithm>
@@ -18,8 +18,8 @@
 
 namespace service {
 
-// A document that can't be written or read again; `error` is the engine's code, 0 for one over a limit of the
-// service, which is told by `limit`, bytes.
+// A document that can't be written or read again; `error` is the engine's code, 0 if the document exceeds a
+// limit of the service: `limit`, in bytes.
 struct document_error : std::runtime_error {
     document_error(const std::string &text, int code, std::uint64_t bytes = 0)
         : std::runtime_error(text), error(code), limit(bytes)
@@ -28,14 +28,15 @@ struct document_error : std::runtime_error {
     std::uint64_t limit;
 };
 
-// Objects may refer to one object from many places, and what is written of them holds it that often. So many
-// bytes may come of so many that arrived: enough for what the service adds, and for other names and prefixes.
+// Several objects may refer to one object, which is then written as many times. So many
+// bytes may result from so many that arrived: room for what the service adds, and for other names and
+// prefixes.
 constexpr std::uint64_t grown(std::uint64_t bytes)
 {
     return (1ULL << 20) + 8 * bytes;
 }
 
-// A context of its own, as the exchange's one buffer is busy with the exchange. Serves one thread at a time.
+// Has a context of its own, since the exchange uses its context's only buffer. For one thread at a time.
 class document_codec {
 public:
     // Documents of more bytes, or of more open elements, are refused, and so are further ones once the
@@ -53,7 +54,7 @@ public:
             &object);
     }
 
-    // The object, which lives until `forget`.
+    // The object, which lives until `reset`.
     template <class T> T *read(std::string_view xml)
     {
         T *const object = make<T>(&context_);
@@ -63,14 +64,14 @@ public:
         return object;
     }
 
-    // Frees all objects read.
-    void forget();
+    // Frees all objects read, for the next exchange.
+    void reset();
     std::uint64_t held() const { return held_; } // bytes that they take
 
 private:
     std::string write_with(int (*put)(soap *ctx, const void *object), const void *object);
     void read_with(bool (*get)(soap *ctx, void *object), void *object, std::string_view xml);
-    bool refers_beside();
+    bool refers_to_attachment();
     static int take_output(soap *ctx, const char *data, std::size_t length);
     static std::size_t give_input(soap *ctx, char *buffer, std::size_t length);
 

@@ -18,7 +18,7 @@ constexpr int TOO_LARGE = 413, INTERNAL_ERROR = 500;
 constexpr std::size_t ATTACHMENTS_MAX = 1000; // of one request
 constexpr std::size_t ENCLOSED_MAX = 100;     // of one answer: each is an open file until it is sent
 constexpr std::size_t VALUES_MAX =
-    64; // elements that wait for their bytes; beyond, all attachments go to memory
+    64; // elements that wait for their bytes; with more, all attachments are kept in memory
 constexpr char MEDIA_TYPE[] = "application/octet-stream";
 
 // True if an element of the message waits for the attachment's bytes: then they are a part of the document.
@@ -52,7 +52,7 @@ int refuse_encoding(soap *ctx, const transfer_decoder &decoder)
 
 } // namespace
 
-void enclosures::expect_next()
+void enclosures::reset()
 {
     form_ = 0;
     arrived_bytes_ = 0;
@@ -71,7 +71,7 @@ void enclosures::discard_arrived()
 }
 
 // ---------------------------------------------------------------------------------------------
-// In. The library calls these, and nothing may be thrown through it.
+// Receiving. The library calls these; they must not throw.
 
 void *enclosures::open(soap *ctx, const char *id, int encoding)
 {
@@ -127,7 +127,7 @@ void enclosures::close(soap *ctx, void *handle)
         if (part.decoder != nullptr && ctx->error == SOAP_OK)
             end_decoding(ctx, part);
         if (part.file)
-            part.file->flush(); // now, as nobody waits for this connection
+            part.file->flush(); // now, since no other connection waits for it
     } catch (const std::exception &failure) {
         const int error = failed(failure);
         ctx->error = ctx->error == SOAP_OK ? error : ctx->error;
@@ -184,7 +184,7 @@ void enclosures::keep(const enclosed_data &data, std::string_view name)
 }
 
 // ---------------------------------------------------------------------------------------------
-// Out.
+// Sending.
 
 bool enclosures::enclose(const std::string &name)
 {

@@ -1,4 +1,4 @@
-// enclosures.h - attachments that travel beside messages: those of a request go into files while they arrive,
+// enclosures.h - attachments that travel with messages: those of a request go into files while they arrive,
 // those of an answer come out of files.
 //
 // Here: the context's callbacks for them, and their limits. Elsewhere: the files (data_files.h), what
@@ -23,7 +23,7 @@
 namespace service {
 
 // An attachment that came with the request, out of its transfer encoding: in a file, or in memory if it stood
-// ahead of the message or is the value of an element.
+// before the message or is the value of an element.
 struct enclosed_data {
     arriving_file *file; // null: in memory
     const char *content;
@@ -36,9 +36,9 @@ public:
         : config_(config), directory_(std::move(directory))
     {}
 
-    // Forgets the exchange before; files that nobody has kept go.
-    void expect_next();
-    // Such files go now, and those that were kept meanwhile, since the request is refused.
+    // Forgets the previous exchange; files that nobody has kept are removed.
+    void reset();
+    // The request is refused: removes such files now, and those that were kept meanwhile.
     void discard_arrived();
     // What was kept stays: what refers to it is on the disk.
     void confirm_kept() { kept_.clear(); }
@@ -59,7 +59,7 @@ public:
         return static_cast<const arriving_part *>(handle)->file.has_value();
     }
 
-    // For what goes out: the handle if it is one of a file; the bytes of a value are left to the library.
+    // For what is sent: the handle if it is one of a file; the bytes of a value are left to the library.
     void *reopen(soap *ctx, void *handle);
     static std::size_t read(void *handle, char *buffer, std::size_t length);
 
@@ -71,12 +71,12 @@ public:
     // Keeps it under a name.
     void keep(const enclosed_data &data, std::string_view name);
 
-    // A kept file goes with the answer, once, under the id of its name. False for a request without form, and
-    // if too many files go already.
+    // Sends a kept file with the answer, once, with its name as id. False for a request without form, and
+    // if too many files are sent already.
     bool enclose(const std::string &name);
 
-    // The modes of the answer, 0 without enclosures; adds the files to a message about to be counted. 0
-    // or 20.
+    // The modes of the answer, 0 without enclosures; adds the files to a message about to be counted:
+    // SOAP_OK or SOAP_OUT_OF_MEMORY.
     std::uint32_t answer_form() const { return outgoing_.empty() ? 0 : form_; }
     int attach_all(soap *ctx);
 

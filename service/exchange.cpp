@@ -25,7 +25,7 @@ constexpr int BAD_REQUEST = 400, REQUEST_TIMEOUT = 408, TOO_LARGE = 413, INTERNA
 constexpr int HTTP_STATUS_MIN = 400, HTTP_STATUS_MAX = 599;
 constexpr int METHOD_NOT_ALLOWED = 405;
 
-// The engine could not read the request; ctx->error tells why.
+// The engine could not read the request; ctx->error says why.
 struct unreadable {};
 
 void demand(int result)
@@ -75,7 +75,7 @@ request read_request(soap *ctx, const port &target)
     if (object == nullptr)
         throw unreadable{};
     if (soap_read_independents(ctx) == SOAP_TAG_MISMATCH)
-        ctx->error = SOAP_OK; // nobody knows it: the end of the Body skips it
+        ctx->error = SOAP_OK; // unknown: the end of the Body skips it
     demand(ctx->error);
     demand(soap_body_in_end(ctx));
     demand(soap_envelope_in_end(ctx));
@@ -113,7 +113,7 @@ void check_credentials(soap *ctx, const protocol__Header *header)
 // ---------------------------------------------------------------------------------------------
 // Answering.
 
-// The answer's header names the exchange as the request did; with nothing to name there is none.
+// The answer's header names the exchange as the request did; without such a name there is no header.
 void settle_header(soap *ctx)
 {
     const protocol__Header *const received = header_of(ctx);
@@ -152,7 +152,7 @@ int status_of_error(const soap *ctx, const reception &received)
     }
 }
 
-// Puts the typed fault of an unreadable request beside the text that the engine made.
+// Adds the typed fault of an unreadable request to the text that the engine made.
 void describe_unreadable(soap *ctx)
 {
     const char *const *const text = soap_fault_string_field(ctx);
@@ -191,7 +191,7 @@ void answer_refusal(soap *ctx, const refusal &refused)
     send_fault(ctx, fault_from_refusal(ctx, refused));
 }
 
-// The request is fine, and the service failed on it. What happened is the operator's to know.
+// The request is fine, and the service failed on it. What happened is for the operator, not for the client.
 void answer_failure(soap *ctx, const char *what)
 {
     std::fprintf(stderr, "zuv-service: %s\n", what);
@@ -218,7 +218,7 @@ protocol__Server_x002eDataTooLarge *too_large(soap *ctx, const char *text, std::
     refuse(too_large(ctx, error.what(), error.limit));
 }
 
-// The answer could not be sent. Where counting found it too large nothing has gone out yet, and the client
+// The answer could not be sent. Where counting found it too large nothing has been sent yet, and the client
 // can be told.
 void answer_unsent(soap *ctx)
 {
@@ -238,15 +238,15 @@ const void *run(soap *ctx, const request &asked, reception &received)
 {
     const protocol__Header *const header = header_of(ctx);
     check_credentials(ctx, header);
-    session &lent = received.lent();
+    session &borrowed = received.borrowed();
     call c{ctx,
-           lent.documents,
-           lent.codec,
+           borrowed.documents,
+           borrowed.codec,
            received.config(),
            header,
            received.root(),
            received.enclosed(),
-           lent.judged,
+           borrowed.judged,
            received.message_bytes(),
            {{ctx}}};
     try {
@@ -260,10 +260,10 @@ void receive_and_answer(soap *ctx, reception &received)
 {
     const int begun = soap_receive_begin(ctx);
     if (begun == SOAP_STOP)
-        return; // answered with the head
+        return; // answered when the head was read
     demand(begun);
     if (!received.data_name().empty()) {
-        demand(receive_data(ctx, received.lent().documents, received.data_name()));
+        demand(receive_data(ctx, received.borrowed().documents, received.data_name()));
         return;
     }
     if (received.target() == nullptr) { // XML without an HTTP head
@@ -275,7 +275,7 @@ void receive_and_answer(soap *ctx, reception &received)
     const void *const response = run(ctx, asked, received);
     received.enclosed().confirm_kept();
     if (ctx->response_unfinished)
-        ctx->keep_alive = 0; // something stands behind the request, which can't be told from a next one
+        ctx->keep_alive = 0; // bytes follow the request, which can't be distinguished from a next one
     settle_header(ctx);
     if (send_response(ctx, *asked.op, response, received.enclosed()) != SOAP_OK)
         answer_unsent(ctx);
@@ -301,7 +301,7 @@ void serve(soap *ctx, reception &received)
 
 bool serve_exchange(soap *ctx, reception &received)
 {
-    received.expect_next();
+    received.reset();
     try {
         serve(ctx, received);
     } catch (const std::exception &failure) { // not even an answer could be made
@@ -309,9 +309,9 @@ bool serve_exchange(soap *ctx, reception &received)
         ctx->keep_alive = 0;
     }
     received.note_memory(ctx->memory_held);
-    received.lent().codec.forget();
-    received.lent().judged.forget();
-    received.enclosed().expect_next();
+    received.borrowed().codec.reset();
+    received.borrowed().judged.reset();
+    received.enclosed().reset();
     if (!received.started() || (ctx->error != SOAP_OK && ctx->error != SOAP_STOP))
         ctx->keep_alive = 0;
     return ctx->keep_alive != 0;

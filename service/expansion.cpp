@@ -1,7 +1,7 @@
 // expansion.cpp - see expansion.h.
 //
-// The order of the steps: what the order names itself; groups; then patches, conditional replacements and
-// superseding updates of that; and at last what all of these require, and what that requires.
+// The order of the steps: what the order itself names; groups; then patches, conditional replacements and
+// superseding updates of that; and finally what all of these require, directly or not.
 #include "expansion.h"
 
 #include <algorithm>
@@ -18,8 +18,8 @@ using order = protocolUpdateOrder__UpdateOrderContent;
 using scope = protocolUpdateOrderFilter__FilterScope;
 using exclusion = protocolUpdateOrder__SelectImplicitExclusions;
 
-// Which updates stand for a related one; the members of all "select" enumerations, of which two lack the
-// first.
+// Which updates are selected for a related one; the members of all "select" enumerations, of which two lack
+// the first.
 enum class selection { as_indicated, all, all_superseding, last, first, shared, all_superseded };
 
 template <class Code> selection selection_of(const Code *code, selection first_code)
@@ -218,9 +218,9 @@ private:
         }
     }
 
-    // --- what goes along ---
+    // --- what is added to the updates asked for ---
 
-    // Those that stand for `update` by a selection; itself, when no other does.
+    // Those selected for `update`; itself, if there is no other.
     updates stand_ins(const update_record *update, selection how, const updates &peers) const
     {
         updates found;
@@ -288,7 +288,7 @@ private:
     void add_requisites()
     {
         const selection how = selection_of(order_.selectRequisites, selection::as_indicated);
-        // NOLINTNEXTLINE(modernize-loop-convert): the list grows as it is walked
+        // NOLINTNEXTLINE(modernize-loop-convert): the list grows in the loop
         for (std::size_t i = 0; i < result_.chosen.size(); ++i)
             choose_stand_ins(offered_.required(*result_.chosen[i].update), update_role::requisite, how);
     }

@@ -1,7 +1,7 @@
-// expansion.h - what an update order comes to: the updates that it names, narrowed by its filters and joined
-// by those that it wants along.
+// expansion.h - which updates an order selects: those that it names, restricted by its filters, and those
+// that it asks for in addition.
 //
-// Elsewhere: the answer made of it (update_order_port.cpp).
+// Elsewhere: the answer made from it (update_order_port.cpp).
 #pragma once
 
 #include <string>

@@ -15,7 +15,7 @@ namespace service {
 
 struct filter_error; // filter.h
 
-// Puts a fault in the place that a detail has for its class.
+// Sets the member of a detail that is of the fault's class.
 #define SERVICE_FAULT_PLACE(name)                                                                            \
     inline void place_fault(SOAP_ENV__Detail &detail, protocol__##name *fault)                               \
     {                                                                                                        \
@@ -29,7 +29,7 @@ struct refusal {
     protocol__Fault *fault;
     void (*place)(SOAP_ENV__Detail &detail, protocol__Fault *fault);
 
-    bool is_clients() const { return dynamic_cast<const protocol__Client *>(fault) != nullptr; }
+    bool is_client_fault() const { return dynamic_cast<const protocol__Client *>(fault) != nullptr; }
 };
 
 // A fault of a class of the tree, with the class's own name as its subcode.
@@ -57,7 +57,7 @@ template <class F> [[noreturn]] void refuse(soap *ctx, std::string description)
 // No document has the name.
 [[noreturn]] void refuse_not_found(soap *ctx, const std::string &uri);
 
-// What a filter that can't be judged is told by, and the refusal of a request for it.
+// The fault for a filter that can't be evaluated, and the refusal of a request because of it.
 protocol__Fault *fault_of(soap *ctx, const filter_error &error);
 [[noreturn]] void refuse_filter(soap *ctx, const filter_error &error);
 

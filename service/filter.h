@@ -12,7 +12,7 @@
 namespace service {
 
 // Throw filter_error. Objects of a request may refer to each other, so an expression may have more nodes than
-// it has bytes, or no end at all; beyond the limits (filter_work.h) it is too complex.
+// it has bytes, or no end at all; beyond the limits (filter_work.h) it is refused as too complex.
 bool filter_holds(const protocolUpdateOrderFilter__Filter &filter, const filter_facts &facts);
 bool filter_holds(const protocolPRFilter__Filter &filter, const filter_facts &facts);
 

@@ -1,5 +1,5 @@
-// filter_facts.h - what is known of an item that a filter judges, and how the values of one kind are gathered
-// from it.
+// filter_facts.h - what is known about an item that a filter judges, and how the values of one kind are
+// collected from it.
 //
 // Elsewhere: which kind a comparison asks for (filter_tables.h).
 #pragma once
@@ -16,7 +16,8 @@
 
 namespace service {
 
-// The item: an update, a problem report, or something smaller told as one of them. Absent parts are null.
+// The item: an update, a problem report, or something smaller described as one of them. Absent parts are
+// null.
 struct filter_facts {
     filter_work *work = nullptr; // of the request
     std::size_t size = 0;        // bytes of the item's XML, if it isn't the service's own
@@ -97,7 +98,7 @@ template <class Use> void each_meta(const filter_facts &facts, protocolUpdateOrd
         use(*facts.update);
 }
 
-// Meta data of any kind, wherever it stands.
+// Meta data of any kind, of the subjects and of the update.
 struct any_meta;
 template <class Use> void each_meta(const filter_facts &facts, any_meta *, Use use)
 {

@@ -18,26 +18,22 @@ template <auto Member> void report_texts(const filter_facts &facts, values &out)
 #define SERVICE_FILTER(name)      protocolPRFilter__##name
 #define SERVICE_FILTER_TYPE(name) SOAP_TYPE_protocolPRFilter__##name
 
+// clang-format off: one row per line
 constexpr comparison_row<filter_node> ROWS[] = {
-    SERVICE_COMMON_ROWS SERVICE_TEXT_ROW(SubmitterCustomerNumberComparison, customerNumber,
-                                         party_texts<&report::submitter, &protocol__Identity::customerNumber>)
-        SERVICE_TEXT_ROW(SubmitterCountryComparison, country,
-                         party_texts<&report::submitter, &protocol__Identity::country>)
-            SERVICE_TEXT_ROW(BeneficiaryCustomerNumberComparison, customerNumber,
-                             beneficiary_texts<&protocol__Identity::customerNumber>)
-                SERVICE_TEXT_ROW(BeneficiaryCountryComparison, country,
-                                 beneficiary_texts<&protocol__Identity::country>){
-                    SERVICE_FILTER_TYPE(ReportTextComparison),
-                    compare_running_text<filter_node, SERVICE_FILTER(ReportTextComparison)>},
-    {SERVICE_FILTER_TYPE(SubmitDateTimeComparison),
-     compare_moments<filter_node, SERVICE_FILTER(SubmitDateTimeComparison),
-                     &SERVICE_FILTER(SubmitDateTimeComparison)::submitDateTime,
-                     report_texts<&report::submitDateTime>>},
-    {SERVICE_FILTER_TYPE(LastModifiedDateTimeComparison),
-     compare_moments<filter_node, SERVICE_FILTER(LastModifiedDateTimeComparison),
-                     &SERVICE_FILTER(LastModifiedDateTimeComparison)::lastModifiedDateTime,
-                     report_texts<&report::lastModifiedDateTime>>},
+    SERVICE_COMMON_ROWS,
+    SERVICE_TEXT_ROW(SubmitterCustomerNumberComparison, customerNumber,
+                     party_texts<&report::submitter, &protocol__Identity::customerNumber>),
+    SERVICE_TEXT_ROW(SubmitterCountryComparison, country,
+                     party_texts<&report::submitter, &protocol__Identity::country>),
+    SERVICE_TEXT_ROW(BeneficiaryCustomerNumberComparison, customerNumber,
+                     beneficiary_texts<&protocol__Identity::customerNumber>),
+    SERVICE_TEXT_ROW(BeneficiaryCountryComparison, country, beneficiary_texts<&protocol__Identity::country>),
+    SERVICE_RUNNING_TEXT_ROW(ReportTextComparison),
+    SERVICE_MOMENT_ROW(SubmitDateTimeComparison, submitDateTime, report_texts<&report::submitDateTime>),
+    SERVICE_MOMENT_ROW(LastModifiedDateTimeComparison, lastModifiedDateTime,
+                       report_texts<&report::lastModifiedDateTime>),
 };
+// clang-format on
 
 struct report_language {
     using filter_node = protocolPRFilter__FilterNode;

@@ -1,7 +1,7 @@
 // filter_tables.h - what the two filter languages have in common: the tree of operators, and the rows that
 // say what a comparison class compares.
 //
-// Always: the languages' classes are told apart by type id; a row is found by it.
+// Always: classes are distinguished by type id, by which a row is found.
 #pragma once
 
 #include <algorithm>
@@ -236,59 +236,64 @@ template <class Node, class C> bool compare_running_text(const Node &node, const
     return search.found_in(text);
 }
 
-// --- rows; SERVICE_FILTER(name) gives the language's class of that name, filter_node its base ---
+// --- rows of a table. The language's file defines SERVICE_FILTER(name), its class of that name,
+// SERVICE_FILTER_TYPE(name), that class's type id, and filter_node, the base of its classes. Each macro
+// stands for the rows without a comma at the end.
 
+#define SERVICE_ROW(name, ...)                                                                               \
+    {                                                                                                        \
+        SERVICE_FILTER_TYPE(name), __VA_ARGS__                                                               \
+    }
 #define SERVICE_TEXT_ROW(name, wanted, ...)                                                                  \
-    {SERVICE_FILTER_TYPE(name),                                                                              \
-     compare_texts<filter_node, SERVICE_FILTER(name), &SERVICE_FILTER(name)::wanted, __VA_ARGS__>},
+    SERVICE_ROW(                                                                                             \
+        name, compare_texts<filter_node, SERVICE_FILTER(name), &SERVICE_FILTER(name)::wanted, __VA_ARGS__>)
+#define SERVICE_SUBJECT_ROW(Name, member)                                                                    \
+    SERVICE_TEXT_ROW(Name##Comparison, member, subject_texts<&protocol__Identity::member>)
 #define SERVICE_NAMED_ROW(name, ...)                                                                         \
-    {SERVICE_FILTER_TYPE(name), compare_named_texts<filter_node, SERVICE_FILTER(name), __VA_ARGS__>},
+    SERVICE_ROW(name, compare_named_texts<filter_node, SERVICE_FILTER(name), __VA_ARGS__>)
 #define SERVICE_EXCLUSION_ROW(name, Meta)                                                                    \
-    {SERVICE_FILTER_TYPE(name), compare_exclusion<filter_node, SERVICE_FILTER(name), Meta>},
+    SERVICE_ROW(name, compare_exclusion<filter_node, SERVICE_FILTER(name), Meta>)
 #define SERVICE_RESTRICTIONS_ROW(name, Meta)                                                                 \
-    {SERVICE_FILTER_TYPE(name), compare_restrictions<filter_node, SERVICE_FILTER(name), Meta>},
+    SERVICE_ROW(name, compare_restrictions<filter_node, SERVICE_FILTER(name), Meta>)
 #define SERVICE_NAMED_MOMENT_ROW(name, Meta)                                                                 \
-    {SERVICE_FILTER_TYPE(name), compare_named_moments<filter_node, SERVICE_FILTER(name), Meta>},
+    SERVICE_ROW(name, compare_named_moments<filter_node, SERVICE_FILTER(name), Meta>)
+#define SERVICE_MOMENT_ROW(name, wanted, ...)                                                                \
+    SERVICE_ROW(                                                                                             \
+        name,                                                                                                \
+        compare_moments<filter_node, SERVICE_FILTER(name), &SERVICE_FILTER(name)::wanted, __VA_ARGS__>)
+#define SERVICE_RUNNING_TEXT_ROW(name)                                                                       \
+    SERVICE_ROW(name, compare_running_text<filter_node, SERVICE_FILTER(name)>)
 
-// The four kinds of meta data that both languages know.
+// Comparisons that each kind of meta data has.
 #define SERVICE_META_ROWS(Kind)                                                                              \
     SERVICE_NAMED_ROW(Kind##MetaDataRestrictionNameValuePairComparison,                                      \
-                      restriction_pairs<protocol__##Kind##MetaData>)                                         \
-    SERVICE_NAMED_ROW(Kind##MetaDataNameValuePairComparison, named_pairs<protocol__##Kind##MetaData>)        \
-    SERVICE_EXCLUSION_ROW(Kind##MetaDataImplicitExclusionComparison, protocol__##Kind##MetaData)             \
-    SERVICE_RESTRICTIONS_ROW(Kind##MetaDataRestrictionTypeSetComparison, protocol__##Kind##MetaData)
+                      restriction_pairs<protocol__##Kind##MetaData>),                                        \
+        SERVICE_NAMED_ROW(Kind##MetaDataNameValuePairComparison, named_pairs<protocol__##Kind##MetaData>),   \
+        SERVICE_EXCLUSION_ROW(Kind##MetaDataImplicitExclusionComparison, protocol__##Kind##MetaData),        \
+        SERVICE_RESTRICTIONS_ROW(Kind##MetaDataRestrictionTypeSetComparison, protocol__##Kind##MetaData)
 #define SERVICE_META_MOMENT_ROW(Kind)                                                                        \
     SERVICE_NAMED_MOMENT_ROW(Kind##MetaDataNameDateTimePairComparison, protocol__##Kind##MetaData)
+#define SERVICE_PRODUCT_META_ROW(Name, member)                                                               \
+    SERVICE_TEXT_ROW(ProductMetaData##Name##Comparison, member,                                              \
+                     meta_texts<protocol__ProductMetaData, &protocol__ProductMetaData::member>)
 
+// Comparisons that both languages have.
 #define SERVICE_COMMON_ROWS                                                                                  \
-    SERVICE_TEXT_ROW(ProductComparison, product, subject_texts<&protocol__Identity::product>)                \
-    SERVICE_TEXT_ROW(ProductNameComparison, productName, subject_texts<&protocol__Identity::productName>)    \
-    SERVICE_TEXT_ROW(ProductMetaDataProductClassComparison, productClass,                                    \
-                     meta_texts<protocol__ProductMetaData, &protocol__ProductMetaData::productClass>)        \
-    SERVICE_TEXT_ROW(ProductMetaDataAttachableToProductComparison, attachableToProduct, attachable_products) \
-    SERVICE_TEXT_ROW(ProductMetaDataOptionComparison, option,                                                \
-                     meta_texts<protocol__ProductMetaData, &protocol__ProductMetaData::option>)              \
-    SERVICE_TEXT_ROW(VersionComparison, version, subject_texts<&protocol__Identity::version>)                \
-    SERVICE_TEXT_ROW(LevelComparison, level, subject_texts<&protocol__Identity::level>)                      \
-    SERVICE_TEXT_ROW(ServiceLevelComparison, serviceLevel, subject_texts<&protocol__Identity::serviceLevel>) \
-    SERVICE_TEXT_ROW(PlatformComparison, platform, subject_texts<&protocol__Identity::platform>)             \
-    SERVICE_TEXT_ROW(PlatformNameComparison, platformName, subject_texts<&protocol__Identity::platformName>) \
-    SERVICE_TEXT_ROW(PlatformVersionComparison, platformVersion,                                             \
-                     subject_texts<&protocol__Identity::platformVersion>)                                    \
-    SERVICE_TEXT_ROW(ComponentComparison, component, subject_texts<&protocol__Identity::component>)          \
-    SERVICE_TEXT_ROW(ComponentNameComparison, componentName,                                                 \
-                     subject_texts<&protocol__Identity::componentName>)                                      \
-    SERVICE_META_ROWS(Product)                                                                               \
-    SERVICE_META_ROWS(Version)                                                                               \
-    SERVICE_META_ROWS(Level)                                                                                 \
-    SERVICE_META_ROWS(ServiceLevel)                                                                          \
-    SERVICE_META_MOMENT_ROW(Product)                                                                         \
-    SERVICE_META_MOMENT_ROW(Version)                                                                         \
-    SERVICE_META_MOMENT_ROW(Level)                                                                           \
-    SERVICE_META_MOMENT_ROW(ServiceLevel)                                                                    \
-    SERVICE_NAMED_ROW(RestrictionNameValuePairComparison, restriction_pairs<any_meta>)                       \
-    SERVICE_EXCLUSION_ROW(ImplicitExclusionComparison, any_meta)                                             \
-    SERVICE_RESTRICTIONS_ROW(RestrictionTypeSetComparison, any_meta)                                         \
-    SERVICE_NAMED_MOMENT_ROW(NameDateTimePairComparison, any_meta)
+    SERVICE_SUBJECT_ROW(Product, product), SERVICE_SUBJECT_ROW(ProductName, productName),                    \
+        SERVICE_SUBJECT_ROW(Version, version), SERVICE_SUBJECT_ROW(Level, level),                            \
+        SERVICE_SUBJECT_ROW(ServiceLevel, serviceLevel), SERVICE_SUBJECT_ROW(Platform, platform),            \
+        SERVICE_SUBJECT_ROW(PlatformName, platformName),                                                     \
+        SERVICE_SUBJECT_ROW(PlatformVersion, platformVersion), SERVICE_SUBJECT_ROW(Component, component),    \
+        SERVICE_SUBJECT_ROW(ComponentName, componentName),                                                   \
+        SERVICE_PRODUCT_META_ROW(ProductClass, productClass), SERVICE_PRODUCT_META_ROW(Option, option),      \
+        SERVICE_TEXT_ROW(ProductMetaDataAttachableToProductComparison, attachableToProduct,                  \
+                         attachable_products),                                                               \
+        SERVICE_META_ROWS(Product), SERVICE_META_ROWS(Version), SERVICE_META_ROWS(Level),                    \
+        SERVICE_META_ROWS(ServiceLevel), SERVICE_META_MOMENT_ROW(Product), SERVICE_META_MOMENT_ROW(Version), \
+        SERVICE_META_MOMENT_ROW(Level), SERVICE_META_MOMENT_ROW(ServiceLevel),                               \
+        SERVICE_NAMED_ROW(RestrictionNameValuePairComparison, restriction_pairs<any_meta>),                  \
+        SERVICE_EXCLUSION_ROW(ImplicitExclusionComparison, any_meta),                                        \
+        SERVICE_RESTRICTIONS_ROW(RestrictionTypeSetComparison, any_meta),                                    \
+        SERVICE_NAMED_MOMENT_ROW(NameDateTimePairComparison, any_meta)
 
 } // namespace service

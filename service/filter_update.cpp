@@ -11,7 +11,7 @@ using update = protocolUpdateOrder__UpdateMetaData;
 using platform = protocol__OperatingPlatform;
 using collection_meta = protocol__ProductCollectionMetaData;
 
-// The place of the item's product collections beside the one asked for.
+// Where the item's product collections are in the hierarchy, relative to the one asked for.
 bool compare_collections(const filter_node &node, const filter_facts &facts)
 {
     const auto &comparison =
@@ -67,51 +67,54 @@ bool compare_language(const filter_node &node, const filter_facts &facts)
     SERVICE_TEXT_ROW(OperatingPlatform##Name##Comparison, member, platform_texts<&platform::member>)
 #define UPDATE_ROW(Name, member)                                                                             \
     SERVICE_TEXT_ROW(UpdateMetaData##Name##Comparison, member, meta_texts<update, &update::member>)
+#define CODE_ROW(name, Meta, member)                                                                         \
+    SERVICE_TEXT_ROW(name, member, code_texts<Meta, &protocol__OCCode::member>)
+#define TRUTH_ROW(name, member)                                                                              \
+    SERVICE_ROW(name,                                                                                        \
+                compare_update_truth<SERVICE_FILTER(name), &SERVICE_FILTER(name)::member, &update::member>)
 
+// clang-format off: one row per line
 constexpr comparison_row<filter_node> ROWS[] = {
-    SERVICE_COMMON_ROWS PLATFORM_ROW(DisplayName, displayName) PLATFORM_ROW(Name, name) PLATFORM_ROW(
-        Version, version) PLATFORM_ROW(FixPack, fixPack) PLATFORM_ROW(FamilyName, familyName)
-        PLATFORM_ROW(HardwareName, hardwareName) PLATFORM_ROW(EditionName, editionName) PLATFORM_ROW(
-            BitWidth, bitWidth) SERVICE_TEXT_ROW(ProductCollectionComparison, productCollection,
-                                                 subject_texts<&protocol__Identity::productCollection>)
-            SERVICE_TEXT_ROW(ProductCollectionNameComparison, productCollectionName,
-                             subject_texts<&protocol__Identity::productCollectionName>)
-                SERVICE_TEXT_ROW(ProductCollectionMetaDataOCCodeComparison, ocCode,
-                                 code_texts<collection_meta, &protocol__OCCode::ocCode>)
-                    SERVICE_TEXT_ROW(ProductCollectionMetaDataOCCodeTypeComparison, type,
-                                     code_texts<collection_meta, &protocol__OCCode::type>)
-                        SERVICE_TEXT_ROW(ProductMetaDataOCCodeComparison, ocCode,
-                                         code_texts<protocol__ProductMetaData, &protocol__OCCode::ocCode>)
-                            SERVICE_TEXT_ROW(ProductMetaDataOCCodeTypeComparison, type,
-                                             code_texts<protocol__ProductMetaData, &protocol__OCCode::type>)
-                                UPDATE_ROW(Name, name) UPDATE_ROW(Version, version) UPDATE_ROW(Level, level)
-                                    UPDATE_ROW(ServiceLevel, serviceLevel) UPDATE_ROW(Status, status)
-                                        UPDATE_ROW(Type, type)
-                                            SERVICE_TEXT_ROW(CategoryComparison, category,
-                                                             meta_texts<update, &update::category>){
-                                                SERVICE_FILTER_TYPE(LanguageComparison), compare_language},
-    SERVICE_TEXT_ROW(LanguageNameComparison, languageName, language_name_texts) SERVICE_TEXT_ROW(
-        AttributeNameComparison, name, attribute_name_texts) SERVICE_TEXT_ROW(AttachmentDescriptorComparison,
-                                                                              descriptor, descriptor_texts)
-        SERVICE_TEXT_ROW(AttachmentTypeComparison, type, attachment_type_texts) SERVICE_NAMED_ROW(
-            UpdateMetaDataRestrictionNameValuePairComparison, restriction_pairs<update>)
-            SERVICE_META_ROWS(ProductCollection) SERVICE_NAMED_ROW(AttributeComparison, attribute_texts)
-                SERVICE_EXCLUSION_ROW(UpdateMetaDataImplicitExclusionComparison, update){
-                    SERVICE_FILTER_TYPE(UpdateMetaDataBaseComparison),
-                    compare_update_truth<SERVICE_FILTER(UpdateMetaDataBaseComparison),
-                                         &SERVICE_FILTER(UpdateMetaDataBaseComparison)::base, &update::base>},
-    {SERVICE_FILTER_TYPE(UpdateMetaDataServiceComparison),
-     compare_update_truth<SERVICE_FILTER(UpdateMetaDataServiceComparison),
-                          &SERVICE_FILTER(UpdateMetaDataServiceComparison)::service, &update::service>},
-    SERVICE_RESTRICTIONS_ROW(UpdateMetaDataRestrictionTypeSetComparison, update){
-        SERVICE_FILTER_TYPE(ProductCollectionHierarchicalComparison), compare_collections},
-    {SERVICE_FILTER_TYPE(MetaDataTextComparison),
-     compare_running_text<filter_node, SERVICE_FILTER(MetaDataTextComparison)>},
-    {SERVICE_FILTER_TYPE(ReleaseDateTimeComparison),
-     compare_moments<filter_node, SERVICE_FILTER(ReleaseDateTimeComparison),
-                     &SERVICE_FILTER(ReleaseDateTimeComparison)::releaseDateTime,
-                     meta_texts<update, &update::releaseDateTime>>},
+    SERVICE_COMMON_ROWS,
+    PLATFORM_ROW(DisplayName, displayName),
+    PLATFORM_ROW(Name, name),
+    PLATFORM_ROW(Version, version),
+    PLATFORM_ROW(FixPack, fixPack),
+    PLATFORM_ROW(FamilyName, familyName),
+    PLATFORM_ROW(HardwareName, hardwareName),
+    PLATFORM_ROW(EditionName, editionName),
+    PLATFORM_ROW(BitWidth, bitWidth),
+    SERVICE_SUBJECT_ROW(ProductCollection, productCollection),
+    SERVICE_SUBJECT_ROW(ProductCollectionName, productCollectionName),
+    CODE_ROW(ProductCollectionMetaDataOCCodeComparison, collection_meta, ocCode),
+    CODE_ROW(ProductCollectionMetaDataOCCodeTypeComparison, collection_meta, type),
+    CODE_ROW(ProductMetaDataOCCodeComparison, protocol__ProductMetaData, ocCode),
+    CODE_ROW(ProductMetaDataOCCodeTypeComparison, protocol__ProductMetaData, type),
+    UPDATE_ROW(Name, name),
+    UPDATE_ROW(Version, version),
+    UPDATE_ROW(Level, level),
+    UPDATE_ROW(ServiceLevel, serviceLevel),
+    UPDATE_ROW(Status, status),
+    UPDATE_ROW(Type, type),
+    SERVICE_TEXT_ROW(CategoryComparison, category, meta_texts<update, &update::category>),
+    SERVICE_ROW(LanguageComparison, compare_language),
+    SERVICE_TEXT_ROW(LanguageNameComparison, languageName, language_name_texts),
+    SERVICE_TEXT_ROW(AttributeNameComparison, name, attribute_name_texts),
+    SERVICE_TEXT_ROW(AttachmentDescriptorComparison, descriptor, descriptor_texts),
+    SERVICE_TEXT_ROW(AttachmentTypeComparison, type, attachment_type_texts),
+    SERVICE_NAMED_ROW(UpdateMetaDataRestrictionNameValuePairComparison, restriction_pairs<update>),
+    SERVICE_META_ROWS(ProductCollection),
+    SERVICE_NAMED_ROW(AttributeComparison, attribute_texts),
+    SERVICE_EXCLUSION_ROW(UpdateMetaDataImplicitExclusionComparison, update),
+    TRUTH_ROW(UpdateMetaDataBaseComparison, base),
+    TRUTH_ROW(UpdateMetaDataServiceComparison, service),
+    SERVICE_RESTRICTIONS_ROW(UpdateMetaDataRestrictionTypeSetComparison, update),
+    SERVICE_ROW(ProductCollectionHierarchicalComparison, compare_collections),
+    SERVICE_RUNNING_TEXT_ROW(MetaDataTextComparison),
+    SERVICE_MOMENT_ROW(ReleaseDateTimeComparison, releaseDateTime,
+                       meta_texts<update, &update::releaseDateTime>),
 };
+// clang-format on
 
 struct update_language {
     using filter_node = protocolUpdateOrderFilter__FilterNode;

@@ -23,7 +23,7 @@ namespace {
 struct options {
     service::settings config;
     std::vector<std::string> accounts; // "user:password"
-    std::string port_file;             // takes the port once the service listens
+    std::string port_file;             // gets the port once the service listens
 };
 
 void declare(CLI::App &app, options &o)
@@ -92,7 +92,7 @@ private:
     std::filesystem::path path_;
 };
 
-// Whoever sees the file sees the whole number.
+// A reader never sees part of the number.
 void write_port_file(const std::string &path, int port)
 {
     const std::string unfinished = path + ".new";

@@ -1,7 +1,7 @@
 // make.h - managed values for answers: objects, texts, codes.
 //
-// Always: what is made belongs to the context and dies with the exchange's objects; lack of memory throws
-// std::bad_alloc, which ends as a fault of the server.
+// Always: what is made belongs to the context and is freed with the exchange's objects; lack of memory throws
+// std::bad_alloc, which becomes a fault of the server.
 #pragma once
 
 #include <new>

@@ -1,4 +1,4 @@
-// moment.h - points in time as the contract's dateTime texts, and fresh names.
+// moment.h - points in time as the contract's dateTime texts, and new names.
 #pragma once
 
 #include <ctime>
@@ -13,7 +13,7 @@ namespace service {
 std::string moment_text(soap *ctx, std::time_t seconds);
 std::string now_text(soap *ctx);
 
-// Seconds since 1970 of a dateTime; nothing for a text that is none. Leaves ctx->error alone.
+// Seconds since 1970 of a dateTime; nothing for any other text. ctx->error stays unchanged.
 std::optional<std::time_t> moment_of(soap *ctx, const std::string &text);
 
 // A random identifier, "123e4567-e89b-42d3-a456-426614174000". Throws std::runtime_error without random

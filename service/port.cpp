@@ -3,8 +3,8 @@
 
 namespace service {
 
-static const port *const PORTS[] = {&profile_port,      &status_report_port,  &inventory_report_port,
-                                    &update_order_port, &problem_report_port, &query_port};
+const port *const PORTS[] = {&profile_port,      &status_report_port,  &inventory_report_port,
+                             &update_order_port, &problem_report_port, &query_port};
 
 const port *find_port(std::string_view path)
 {

@@ -36,7 +36,7 @@ struct call {
     const settings &config;
     const protocol__Header *header; // null if the request has none
     std::string root;       // URL of this service as the client named it, "http://host:9080"; may be empty
-    enclosures &beside;     // attachments that came with the request, and those to go with the answer
+    enclosures &enclosed;   // attachments that came with the request, and those to be sent with the answer
     document_codec &judged; // for documents that only a filter looks at; forgotten after each
     std::uint64_t bytes;    // of the request, framing and compression undone, without what went to files
     request_work work;

@@ -28,7 +28,7 @@ bool finds(text_operator op, const std::string &wanted, std::string_view text)
     return word_search(op, wanted, false).found_in(text);
 }
 
-// How sure the service is that an update helps, in per cent; null if it doesn't.
+// How sure the service is that an update helps, in percent; null if it doesn't.
 const char *confidence_of(std::string_view text, const update_record &update)
 {
     if (finds(text_operator::contains_phrase, text_of(update.updateId), text))

@@ -3,7 +3,7 @@
 #include <zuv_client_pro/protocolProfile.h>
 
 #include "port.h"
-#include "shelf.h"
+#include "repository.h"
 
 namespace service {
 
@@ -15,7 +15,7 @@ using state = protocolProfile__ProfileState;
 constexpr std::time_t CREDENTIALS_LIFE =
     std::time_t{365} * 24 * 3600; // seconds that refreshed credentials are valid
 
-shelf<profile> shelf_of(call &c)
+repository<profile> repository_of(call &c)
 {
     return {c, "Profile", "profile"};
 }
@@ -24,18 +24,18 @@ profile *create(call &c, profile &request)
 {
     if (request.state == nullptr)
         request.state = make_value(c.ctx, state::active);
-    shelf_of(c).keep(request);
+    repository_of(c).keep(request);
     return &request;
 }
 
 profile *get(call &c, _protocolProfile__getRequest &)
 {
-    return shelf_of(c).find(target_of(c));
+    return repository_of(c).find(target_of(c));
 }
 
 profile *set(call &c, profile &request)
 {
-    return shelf_of(c).change(target_of(c, &request.thisURI), [&](profile *held) {
+    return repository_of(c).change(target_of(c, &request.thisURI), [&](profile *held) {
         request.thisURI = held->thisURI;
         if (request.state == nullptr)
             request.state = held->state;
@@ -56,7 +56,7 @@ template <class T> void fill(T *&held, T *added)
 
 profile *add(call &c, profile &request)
 {
-    return shelf_of(c).change(target_of(c, &request.thisURI), [&](profile *held) {
+    return repository_of(c).change(target_of(c, &request.thisURI), [&](profile *held) {
         fill(held->state, request.state);
         fill(held->contentInterpretation, request.contentInterpretation);
         fill(held->profileAuthority, request.profileAuthority);
@@ -90,7 +90,7 @@ profile *refresh_credentials(call &c, _protocolProfile__refreshCredentialsReques
     if (request.credentials == nullptr)
         refuse<protocol__Client_x002eInsufficientInformation>(c.ctx,
                                                               "The request holds no credentials to refresh.");
-    return shelf_of(c).change(target_of(c), [&](profile *held) {
+    return repository_of(c).change(target_of(c), [&](profile *held) {
         protocol__Credentials *const refreshed = credentials_like(*held, request.credentials);
         refreshed->state = make_value(c.ctx, protocol__CredentialsState::valid);
         refreshed->token = make_text(c.ctx, fresh_uuid());
@@ -101,7 +101,7 @@ profile *refresh_credentials(call &c, _protocolProfile__refreshCredentialsReques
 
 profile *remove(call &c, profile &request)
 {
-    profile *const removed = shelf_of(c).take(target_of(c, &request.thisURI));
+    profile *const removed = repository_of(c).remove(target_of(c, &request.thisURI));
     removed->state = make_value(c.ctx, state::closed);
     return removed;
 }

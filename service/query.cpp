@@ -49,7 +49,7 @@ void add_report(call &c, std::vector<report *> &found, report *passing)
     found.push_back(passing);
 }
 
-// A query looks through all documents, and each may be asked for by many queries of the request.
+// A query looks through all documents, and a request may hold many queries.
 void spend(call &c, std::uint64_t &left, std::size_t bytes, const char *refused)
 {
     if (bytes > left)
@@ -62,7 +62,7 @@ bool report_passes(call &c, const protocolPRFilter__Filter *filter, std::string_
 {
     if (filter == nullptr)
         return true;
-    c.judged.forget();
+    c.judged.reset();
     return filter_holds(*filter, facts_of(c.work.filters, *c.judged.read<report>(xml), xml.size()));
 }
 
@@ -81,7 +81,7 @@ protocol__QueryResponse *query_reports(call &c, const protocolProblemReport__Que
     return response;
 }
 
-// Patterns of problems are those that updates are known to correct.
+// Problem patterns: the problems that updates are known to correct.
 protocol__QueryResponse *query_patterns(call &c,
                                         const protocolProblemReport__QueryPatternReportsRequest &request)
 {

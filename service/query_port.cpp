@@ -1,4 +1,4 @@
-// query_port.cpp - queries and pings over the wire. No operation of the contract carries them; here a Body
+// query_port.cpp - queries and pings over the wire. The contract has no operations for them; here a Body
 // holds one of them in an element that states its type or has its type's name.
 #include "query.h"
 

@@ -28,14 +28,14 @@ char REALM[] = "zuv";
 // Attachments may be long, and at this pace their bytes don't count in the time that a request may take.
 constexpr std::chrono::microseconds ATTACHED_BYTE_TIME(10);
 
-// Compares in a time that tells nothing of the place where the texts differ.
+// Compares in a time that does not reveal where the texts differ.
 bool same_secret(const char *given, const std::string &expected)
 {
     const std::string_view text = given == nullptr ? std::string_view() : given;
     return text.size() == expected.size() && CRYPTO_memcmp(text.data(), expected.data(), text.size()) == 0;
 }
 
-// A request that should have no body is at its end. A body that it has all the same, or bytes behind it,
+// A request that should have no body is at its end. A body that it has all the same, or bytes after it,
 // would be taken for the next request.
 void end_without_body(soap *ctx)
 {
@@ -46,7 +46,7 @@ void end_without_body(soap *ctx)
         ctx->response_unfinished = false;
 }
 
-// Chunks are for peers that know them; who they are is told by the start line alone.
+// Chunks are only for peers that know them: those whose start line says HTTP/1.1.
 void settle_framing(soap *ctx, bool chunks_wanted)
 {
     const bool old = std::string_view(ctx->message_text).ends_with("HTTP/1.0");
@@ -56,8 +56,8 @@ void settle_framing(soap *ctx, bool chunks_wanted)
 
 } // namespace
 
-reception::reception(soap *ctx, const settings &config, session &lent)
-    : config_(config), lent_(lent), enclosures_(config, lent.documents.data_directory())
+reception::reception(soap *ctx, const settings &config, session &borrowed)
+    : config_(config), borrowed_(borrowed), enclosures_(config, borrowed.documents.data_directory())
 {
     ctx->user = this;
     ctx->on_read_head = read_head;
@@ -81,7 +81,7 @@ void reception::install_attachment_hooks(soap *ctx)
     ctx->dime_write = ctx->mime_write = [](soap *c, void *handle, const char *data, std::size_t length) {
         reception &self = of(c);
         if (enclosures::is_in_file(handle)) {
-            self.body_bytes_ -= std::min<std::uint64_t>(length, self.body_bytes_); // it stays in no memory
+            self.body_bytes_ -= std::min<std::uint64_t>(length, self.body_bytes_); // it is not kept in memory
             self.deadline_ += ATTACHED_BYTE_TIME * static_cast<long>(length);
         }
         return self.enclosures_.write(c, handle, data, length);
@@ -96,19 +96,19 @@ void reception::install_attachment_hooks(soap *ctx)
     };
 }
 
-void reception::expect_next()
+void reception::reset()
 {
     started_ = too_slow_ = false;
     body_bytes_ = 0;
     target_ = nullptr;
     where_ = {};
-    enclosures_.expect_next();
+    enclosures_.reset();
 }
 
 // ---------------------------------------------------------------------------------------------
 // Bytes.
 
-// The silence ahead of a request is bounded by the idle limit, the request itself by its own as well.
+// The silence before a request is bounded by the idle limit, the request itself by its own as well.
 std::size_t reception::receive(soap *ctx, char *buffer, std::size_t length)
 {
     using namespace std::chrono;
@@ -143,8 +143,7 @@ int reception::count_body(soap *ctx, const char *, std::size_t length)
 // ---------------------------------------------------------------------------------------------
 // Heads.
 
-// Looks at what the request is for, then answers it. The library calls the hooks, and nothing may be thrown
-// through it.
+// Determines the target of the request, then answers it. The library calls the hooks; they must not throw.
 template <class Answer> int reception::answered(soap *ctx, Answer answer)
 {
     reception &self = of(ctx);
@@ -182,19 +181,19 @@ bool reception::knows_sender(const soap *ctx) const
     return user && password;
 }
 
-// Takes the URL that the request is for, and says what keeps the request from being looked at: 0 or an HTTP
+// Takes the URL that the request is for, and says why the request can't be handled: 0 or an HTTP
 // status.
 int reception::settle_request(soap *ctx)
 {
     where_ = parse_target(ctx->endpoint, ctx->socket);
     target_ = find_port(where_.path);
-    ctx->max_message = data_name().empty() ? config_.message_limit() : 0; // data goes to a file
+    ctx->max_message = data_name().empty() ? config_.message_limit() : 0; // data is written to a file
     if (!knows_sender(ctx)) {
         ctx->auth_realm = REALM;
         return UNAUTHORIZED;
     }
-    const std::uint64_t beside = enclosures_.has_form() ? config_.attachment_limit : 0;
-    return ctx->content_length > body_limit() + beside ? TOO_LARGE : 0;
+    const std::uint64_t attached = enclosures_.has_form() ? config_.attachment_limit : 0;
+    return ctx->content_length > body_limit() + attached ? TOO_LARGE : 0;
 }
 
 std::string_view reception::data_name() const
@@ -213,17 +212,17 @@ int reception::write_line(soap *ctx, const char *key, const char *value)
 }
 
 // ---------------------------------------------------------------------------------------------
-// Methods other than POST, answered with the head.
+// Methods other than POST, answered as soon as the head is read.
 
 int reception::answer_get(soap *ctx)
 {
     if (!data_name().empty())
-        return send_data(ctx, lent_.documents, data_name());
+        return send_data(ctx, borrowed_.documents, data_name());
     const std::string contract = contract_document(where_);
     if (!contract.empty())
         return send_file(ctx, "text/xml; charset=utf-8", contract);
     if (target_ != nullptr)
-        return ctx->error = METHOD_NOT_ALLOWED; // ports are called, not fetched
+        return ctx->error = METHOD_NOT_ALLOWED; // a port has nothing to fetch
     if (where_.path != "/" && where_.path != SERVICES_PATH && where_.path != CONTRACT_PATH)
         return ctx->error = NOT_FOUND;
     return send_file(ctx, "text/html; charset=utf-8", contract_page(where_));

@@ -1,5 +1,5 @@
-// reception.h - what a request may be before anything is read of its content: its path, who sends it, how
-// large and how slow it is.
+// reception.h - what is checked before the content of a request is read: its path, its sender, its size and
+// its pace.
 //
 // Here: the hooks of the context that watch the arriving bytes and the head. Elsewhere: the content
 // (exchange.cpp).
@@ -20,19 +20,19 @@
 
 namespace service {
 
-// What is known of the request that arrives on a context; ctx->user points here.
+// What is known about the request that arrives on a context; ctx->user points here.
 class reception {
 public:
     // Installs the hooks; the context must not be used longer than this object.
-    reception(soap *ctx, const settings &config, session &lent);
+    reception(soap *ctx, const settings &config, session &borrowed);
     reception(const reception &) = delete;
     reception &operator=(const reception &) = delete;
 
-    // Forgets the request before.
-    void expect_next();
+    // Forgets the previous request.
+    void reset();
 
     const settings &config() const { return config_; }
-    session &lent() const { return lent_; }
+    session &borrowed() const { return borrowed_; }
     bool started() const { return started_; } // some byte has arrived
     bool too_large() const { return body_bytes_ > body_limit() || enclosures_.too_large(); }
     bool too_slow() const { return too_slow_; }
@@ -42,13 +42,16 @@ public:
     const std::string &root() const { return where_.root; }
     enclosures &enclosed() { return enclosures_; }
 
-    // What the exchange held in its context, beside the documents that were read for it.
-    void note_memory(std::int64_t bytes) { memory_ = bytes + static_cast<std::int64_t>(lent_.codec.held()); }
+    // What the exchange held in its context, and the documents that were read for it.
+    void note_memory(std::int64_t bytes)
+    {
+        memory_ = bytes + static_cast<std::int64_t>(borrowed_.codec.held());
+    }
     std::int64_t memory() const { return memory_; }
 
 private:
-    // Bytes of a body that belong to no file; all of the data that comes to a data port does. Bytes that
-    // just came into the buffer are counted before it shows whether they are an attachment's.
+    // Bytes of a body that belong to no file; all data sent to a data port does. Bytes that
+    // just arrived in the buffer are counted before it is known whether they belong to an attachment.
     std::uint64_t body_limit() const
     {
         if (!data_name().empty())
@@ -71,7 +74,7 @@ private:
     template <class Answer> static int answered(soap *ctx, Answer answer);
 
     const settings &config_;
-    session &lent_;
+    session &borrowed_;
     bool started_ = false, too_slow_ = false;
     std::uint64_t body_bytes_ = 0;
     std::int64_t memory_ = 0;

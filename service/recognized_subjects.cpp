@@ -122,7 +122,7 @@ private:
         });
     }
 
-    // Null if the filter doesn't let the collection pass.
+    // Null if the collection doesn't pass the filter.
     collection *tell(const collection_row &row)
     {
         std::string id(row.id), name(row.name);

@@ -1,4 +1,4 @@
-// recognized_subjects.h - the subjects and product collections that the service recognizes, as answers tell
+// recognized_subjects.h - the subjects and product collections that the service recognizes, as answers list
 // them.
 #pragma once
 
@@ -14,7 +14,7 @@
 namespace service {
 
 // What updates are made for, each product once. Those that only implicitly excluded updates are made for are
-// left out unless asked for.
+// omitted unless asked for.
 std::vector<const protocol__Identity *> known_subjects(bool with_excluded);
 
 // True if an item passes a filter of either language, or if there is none. Throws filter_error, also for a

@@ -7,7 +7,7 @@
 #include <type_traits>
 
 #include "attachments.h"
-#include "shelf.h"
+#include "repository.h"
 
 namespace service {
 
@@ -15,23 +15,23 @@ template <class Document> class report_rules {
 public:
     using state = std::remove_pointer_t<decltype(Document::state)>;
 
-    report_rules(call &c, const char *port, const char *kind) : call_(c), shelf_(c, port, kind) {}
+    report_rules(call &c, const char *port, const char *kind) : call_(c), repository_(c, port, kind) {}
 
-    shelf<Document> &documents() { return shelf_; }
+    repository<Document> &documents() { return repository_; }
 
     void set_state(Document &document, state s) { document.state = make_value(call_.ctx, s); }
 
-    // Names a document afresh and keeps it, with the data that came beside it.
+    // Gives a document a new name and keeps it, with the data that came with it.
     Document *keep(Document &request)
     {
-        shelf_.keep(request, [&] { take_references(call_, request.attachment); });
+        repository_.keep(request, [&] { take_references(call_, request.attachment); });
         return answer(&request);
     }
 
     // The document comes with the data of its attachments.
     Document *get()
     {
-        return answer(shelf_.find(target_of(call_)), [](const protocol__Attachment &) { return true; });
+        return answer(repository_.find(target_of(call_)), [](const protocol__Attachment &) { return true; });
     }
 
     Document *create(Document &request)
@@ -44,10 +44,10 @@ public:
     Document *submit(Document &request)
     {
         settle(request);
-        if (!is_aimed())
+        if (!has_target())
             return keep(request);
         attachments before;
-        Document *const kept = shelf_.change(target_of(call_), [&](Document *held) {
+        Document *const kept = repository_.change(target_of(call_), [&](Document *held) {
             refuse_ended(*held);
             before = held->attachment;
             take_references(call_, request.attachment, &before);
@@ -58,10 +58,10 @@ public:
         return answer(kept);
     }
 
-    // Closes or cancels; to be done once.
+    // Closes or cancels, which can be done once.
     Document *end(state last)
     {
-        return answer(shelf_.change(target_of(call_), [&](Document *held) {
+        return answer(repository_.change(target_of(call_), [&](Document *held) {
             refuse_ended(*held);
             set_state(*held, last);
             return held;
@@ -70,17 +70,17 @@ public:
 
     Document *remove(const Document &request)
     {
-        Document *const removed = shelf_.take(target_of(call_, &request.thisURI));
+        Document *const removed = repository_.remove(target_of(call_, &request.thisURI));
         forget_data(call_, removed->attachment);
         set_state(*removed, state::closed);
         return answer(removed);
     }
 
-    Document *attach(protocol__Attachment *given, const protocol__DataPortPreference *wish)
+    Document *attach(protocol__Attachment *given, const protocol__DataPortPreference *preference)
     {
-        return answer(shelf_.change(target_of(call_), [&](Document *held) {
+        return answer(repository_.change(target_of(call_), [&](Document *held) {
             refuse_ended(*held);
-            take_attachment(call_, held->attachment, given, wish);
+            take_attachment(call_, held->attachment, given, preference);
             return held;
         }));
     }
@@ -89,7 +89,7 @@ public:
     Document *note_progress(const protocol__AttachStatusRequest &report)
     {
         const protocol__Attachment *meant = nullptr;
-        Document *const changed = shelf_.change(target_of(call_), [&](Document *held) {
+        Document *const changed = repository_.change(target_of(call_), [&](Document *held) {
             meant = &find_attachment(call_, held->attachment, report);
             service::note_progress(call_, held->attachment, report);
             if (held->state != nullptr && *held->state == state::processing)
@@ -102,9 +102,10 @@ public:
     }
 
 private:
-    template <class Goes> Document *answer(Document *document, const Goes &goes)
+    // `is_sent` tells of an attachment whether its data goes with the answer.
+    template <class Predicate> Document *answer(Document *document, const Predicate &is_sent)
     {
-        settle_references(call_, document->attachment, goes);
+        settle_references(call_, document->attachment, is_sent);
         return document;
     }
     Document *answer(Document *document)
@@ -112,7 +113,7 @@ private:
         return answer(document, [](const protocol__Attachment &) { return false; });
     }
 
-    bool is_aimed() const
+    bool has_target() const
     {
         const protocol__Header *const header = call_.header;
         return header != nullptr && (header->targetURI != nullptr || header->compoundTargetURI != nullptr);
@@ -131,7 +132,7 @@ private:
     }
 
     call &call_;
-    shelf<Document> shelf_;
+    repository<Document> repository_;
 };
 
 } // namespace service

@@ -1,4 +1,4 @@
-// request_target.h - what a request is for: the URL that its head tells, taken apart.
+// request_target.h - what a request is for: the URL in its head, parsed.
 #pragma once
 
 #include <string>
@@ -9,12 +9,11 @@ namespace service {
 struct request_target {
     std::string root;  // "http://host:9080", of this service as the client named it
     std::string path;  // percent-encoded letters and the like decoded, segments "." and ".." resolved
-    std::string query; // behind the "?"
+    std::string query; // after the "?"
 };
 
-// `url`: root, path and query; the root is from the Host header or an absolute target. One that is missing,
-// or is not plainly a scheme, a host and a port, which documents may hold as it stands, gives way to
-// root_of(socket).
+// `url`: root, path and query; the root is from the Host header or an absolute target. If it is missing,
+// or anything but a scheme, a host and a port, which documents can hold unchanged, it is root_of(socket).
 request_target parse_target(std::string_view url, int socket);
 
 // The URL of a socket's own end, such as "http://127.0.0.1:9080", and its port. Throw std::runtime_error.

@@ -23,7 +23,7 @@ namespace {
 constexpr int BACKLOG = 128;                  // connections that may wait to be accepted
 constexpr std::chrono::seconds STOP_LIMIT(5); // time that requests under way get at the end
 constexpr std::chrono::milliseconds
-    ACCEPT_PAUSE(100); // after a failed accept, such as for want of descriptors
+    ACCEPT_PAUSE(100); // after a failed accept, for example without free descriptors
 
 std::uint32_t mode_of(const settings &config)
 {
@@ -42,7 +42,7 @@ std::string error_text(soap *ctx)
 server::server(const settings &config, database &place)
     : config_(config), place_(place), master_(MODE_KEEP_ALIVE | MODE_UTF_STRINGS, mode_of(config))
 {
-    idle_sessions_.push_back(std::make_unique<session>(place, config)); // a useless database shows now
+    idle_sessions_.push_back(std::make_unique<session>(place, config)); // an unusable database fails now
     store &documents = idle_sessions_.back()->documents;
     open_data_directory(place.data_directory);
     sweep_data(place.data_directory,
@@ -82,7 +82,7 @@ bool server::wait_for_room(std::unique_lock<std::mutex> &lock)
                std::any_of(connections_.begin(), connections_.end(),
                            [](const connection &c) { return c.done; });
     });
-    reap(lock);
+    join_finished(lock);
     return !stopping_;
 }
 
@@ -94,7 +94,7 @@ void server::accept_all()
         const int accepted = soap_accept(&master_);
         soap *const copy = accepted < 0 ? nullptr : soap_context_copy(&master_);
         if (copy != nullptr)
-            master_.socket = -1; // the copy's from here on; without one, the next accept would lose it
+            master_.socket = -1; // now owned by the copy; without a copy, the next accept would leak it
         else if (accepted >= 0)
             tcp_disconnect(&master_);
         lock.lock();
@@ -120,14 +120,14 @@ void server::open_connection(soap *copy)
     }
 }
 
-std::unique_ptr<session> server::borrow_session()
+std::unique_ptr<session> server::acquire_session()
 {
     {
         const std::lock_guard<std::mutex> lock(mutex_);
         if (!idle_sessions_.empty()) {
-            std::unique_ptr<session> lent = std::move(idle_sessions_.back());
+            std::unique_ptr<session> borrowed = std::move(idle_sessions_.back());
             idle_sessions_.pop_back();
-            return lent;
+            return borrowed;
         }
     }
     return std::make_unique<session>(place_, config_);
@@ -135,23 +135,23 @@ std::unique_ptr<session> server::borrow_session()
 
 void server::serve(soap *copy, std::list<connection>::iterator place)
 {
-    std::unique_ptr<session> lent;
+    std::unique_ptr<session> borrowed;
     try {
-        lent = borrow_session();
-        serve_connection(copy, config_, *lent);
+        borrowed = acquire_session();
+        serve_connection(copy, config_, *borrowed);
     } catch (const std::exception &failure) {
         std::fprintf(stderr, "zuv-service: %s\n", failure.what());
     }
     soap_context_free(copy);
     const std::lock_guard<std::mutex> lock(mutex_);
-    if (lent)
-        idle_sessions_.push_back(std::move(lent));
+    if (borrowed)
+        idle_sessions_.push_back(std::move(borrowed));
     place->done = true;
     changed_.notify_all();
 }
 
 // Joins the threads that are done.
-void server::reap(std::unique_lock<std::mutex> &lock)
+void server::join_finished(std::unique_lock<std::mutex> &lock)
 {
     std::list<connection> ended;
     for (auto place = connections_.begin(); place != connections_.end();) {
@@ -169,7 +169,8 @@ void server::reap(std::unique_lock<std::mutex> &lock)
 // ---------------------------------------------------------------------------------------------
 // The end.
 
-// A thread may have closed its socket already: then the number is nobody's or another's who has to end too.
+// A thread may have closed its socket already: then the number is unused or belongs to another connection,
+// which has to end too.
 void server::shut_connections(int how)
 {
     for (const connection &c : connections_)
@@ -197,7 +198,7 @@ void server::stop()
         shut_connections(SHUT_RDWR);
         changed_.wait(lock, all_done);
     }
-    reap(lock);
+    join_finished(lock);
 }
 
 } // namespace service

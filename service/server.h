@@ -22,7 +22,7 @@ namespace service {
 
 class server {
 public:
-    // Listens from here on. Throws std::runtime_error if the address can't be had, and store_error.
+    // Starts to listen. Throws std::runtime_error if the address is not available, and store_error.
     server(const settings &config, database &place);
     ~server(); // as `stop`
 
@@ -45,9 +45,9 @@ private:
     bool wait_for_room(std::unique_lock<std::mutex> &lock);
     void open_connection(soap *copy);
     void serve(soap *copy, std::list<connection>::iterator place);
-    void reap(std::unique_lock<std::mutex> &lock);
+    void join_finished(std::unique_lock<std::mutex> &lock);
     void shut_connections(int how);
-    std::unique_ptr<session> borrow_session();
+    std::unique_ptr<session> acquire_session();
 
     const settings &config_;
     database &place_;

@@ -1,4 +1,4 @@
-// session.h - what a connection's thread works with; lent to one connection at a time.
+// session.h - what a connection's thread works with: used by one connection at a time, then by another.
 #pragma once
 
 #include "document.h"

@@ -15,11 +15,11 @@ struct settings {
     std::string host = "127.0.0.1";
     int port = 9080;            // 0: any free port
     std::string database;       // file; empty: one that ends with the program
-    std::string user, password; // HTTP Basic credentials asked of clients; empty user: none
+    std::string user, password; // HTTP Basic credentials that clients need; empty user: none
     std::vector<std::pair<std::string, std::string>>
         accounts;                           // further users and passwords that authenticate
     bool indent = false;                    // answers are indented
-    bool chunked = false;                   // answers go out in chunks in place of a Content-Length
+    bool chunked = false;                   // answers are sent in chunks instead of with a Content-Length
     std::string trace;                      // file that takes a copy of all bytes; empty: none
     std::uint64_t body_limit = 64ULL << 20; // bytes of a request, framing and compression undone; 413 beyond
     std::uint64_t attachment_limit =
@@ -36,7 +36,7 @@ struct settings {
     int request_seconds = 120;       // time that a request may take to arrive
 
 private:
-    // `value` times `factor`, or `least` if that is more; 0, which is no limit, where no number can tell it.
+    // `value` times `factor`, or `least` if that is more; 0, which is no limit, if the result overflows.
     static std::uint64_t at_least(std::uint64_t least, std::uint64_t value, std::uint64_t factor)
     {
         if (value > std::numeric_limits<std::uint64_t>::max() / factor)

@@ -40,18 +40,17 @@ void bind_blob(sqlite3_stmt *prepared, int place, std::string_view bytes)
 }
 
 // Documents hold names and credentials: a new database is its owner's alone whatever the umask is, and so are
-// the files that SQLite keeps beside it, which take its mode. One that is there keeps the mode that it was
-// given.
+// the files that SQLite keeps next to it, which take its mode. One that exists keeps its mode.
 void create_private(const std::string &path)
 {
     const int descriptor = open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, S_IRUSR | S_IWUSR);
     if (descriptor < 0)
-        return; // it is there, or can't be had, of which SQLite tells
+        return; // it exists, or can't be created, which SQLite reports
     fchmod(descriptor, S_IRUSR | S_IWUSR);
     close(descriptor);
 }
 
-// Gives the statement back for its next use, whatever happens.
+// Resets the statement for its next use, whatever happens.
 struct rewinder {
     sqlite3_stmt *prepared;
     ~rewinder()

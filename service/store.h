@@ -34,7 +34,7 @@ struct database {
 
 class store {
 public:
-    // Opens the file; makes it, for its owner alone (mode 0600), and its tables unless they are there.
+    // Opens the file; creates it, for its owner alone (mode 0600), and its tables unless they exist.
     explicit store(database &place);
     ~store();
     store(const store &) = delete;
@@ -43,11 +43,11 @@ public:
     // XML of a document, or nothing.
     std::optional<std::string> find(std::string_view port, std::string_view uri);
 
-    // Hands each document of a port to `use`, in the order of their names, until it returns false.
+    // Calls `use` with each document of a port, in the order of their names, until it returns false.
     void each(std::string_view port, const std::function<bool(std::string_view xml)> &use);
 
-    // Bytes of an attachment's data, which lie in a file of the name: nothing for a name that was never given
-    // out, 0 until data came.
+    // Bytes of an attachment's data, which are in a file of that name: nothing for a name that was never
+    // issued, 0 until data has arrived.
     std::optional<std::uint64_t> data_size(std::string_view name);
     const std::string &data_directory() const { return place_.data_directory; }
 

@@ -12,8 +12,8 @@ namespace service {
 
 namespace {
 
-// Line breaks and blanks may stand anywhere; another character, bytes behind the padding or a last group that
-// isn't whole refuse it.
+// Line breaks and blanks may stand anywhere; another character, bytes after the padding or an incomplete last
+// group are errors.
 class base64_decoder : public transfer_decoder {
 public:
     base64_decoder() : state_(EVP_ENCODE_CTX_new())
@@ -55,7 +55,7 @@ private:
         if (ended_)
             return is_blank;
         if (std::memchr(data, '-', static_cast<std::size_t>(length)) != nullptr)
-            return false; // which would pass for the end
+            return false; // which would look like the end
         unsigned char decoded[STRETCH];
         int count = 0;
         const int result = EVP_DecodeUpdate(state_.get(), decoded, &count,
@@ -72,7 +72,7 @@ private:
 };
 
 // Lines may be longer than an encoder makes them; an equals sign that begins neither a byte nor a soft line
-// break refuses it.
+// break is an error.
 class quoted_printable_decoder : public transfer_decoder {
 public:
     const char *name() const override { return "quoted-printable"; }
@@ -105,7 +105,7 @@ private:
         switch (state_) {
         case state::text:
             return take_text(c, out);
-        case state::line_end: // behind a carriage return
+        case state::line_end: // after a carriage return
             state_ = state::text;
             if (c != '\n')
                 flush(out);
@@ -131,7 +131,7 @@ private:
         return false;
     }
 
-    // Blanks at the end of a line were put there on the way.
+    // Blanks at the end of a line were added in transport.
     bool take_text(char c, std::string &out)
     {
         if (c == ' ' || c == '\t') {

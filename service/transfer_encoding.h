@@ -1,8 +1,8 @@
-// transfer_encoding.h - undoes the base64 or quoted-printable in which a MIME part may come, stretch by
-// stretch.
+// transfer_encoding.h - decodes the base64 or quoted-printable in which a MIME part may arrive, piece by
+// piece.
 //
-// Always: what is held between two stretches is bounded, and a stretch never decodes to more bytes than it
-// has, but for those that were held.
+// Always: what is held between two pieces is bounded, and a piece never decodes to more bytes than it
+// has and were held.
 #pragma once
 
 #include <cstddef>
@@ -24,7 +24,7 @@ public:
     virtual ~transfer_decoder() = default;
 
     virtual const char *name() const = 0;
-    // Appends what a stretch decodes to. False: it isn't of this encoding, and nothing more is to be decoded.
+    // Appends what a piece decodes to. False: it isn't in this encoding; nothing more may be decoded.
     virtual bool decode(const char *data, std::size_t length, std::string &out) = 0;
     // The same for the end of the part.
     virtual bool finish(std::string &out) = 0;

@@ -1,6 +1,6 @@
 // update_order_port.cpp - the operations on update orders.
 //
-// Elsewhere: which updates an order comes to (expansion.cpp), authentication (authentication.cpp).
+// Elsewhere: which updates an order selects (expansion.cpp), authentication (authentication.cpp).
 #include <zuv_client_pro/protocolUpdateOrder.h>
 
 #include "authentication.h"
@@ -38,7 +38,7 @@ template <class T> T *copy_of(call &c, const T &original)
     return copy;
 }
 
-// The record of an update as far as the order wants it.
+// The record of an update, with the parts that the order asks for.
 update_record *meta_data_for(call &c, const order &o, const update_record &update)
 {
     update_record *const told = copy_of(c, update);
@@ -57,7 +57,7 @@ update_record *meta_data_for(call &c, const order &o, const update_record &updat
     return told;
 }
 
-void tell_chosen(call &c, order &o, const update_record &update)
+void list_chosen(call &c, order &o, const update_record &update)
 {
     o.updateIdExpansion.push_back(text_of(update.updateId));
     if (!o.includeUpdateIdExpansionDetail)
@@ -70,9 +70,8 @@ void tell_chosen(call &c, order &o, const update_record &update)
     o.updateIdExpansionDetail.push_back(told);
 }
 
-// An update that isn't known is told whether details are wanted or not: it is what keeps the order from being
-// complete.
-void tell_unknown(call &c, order &o, const unknown_update &unknown)
+// An unknown update is listed even if no details are wanted: it is why the order is not complete.
+void list_unknown(call &c, order &o, const unknown_update &unknown)
 {
     auto *const told = make<detail>(c.ctx);
     told->updateId = make_text(c.ctx, unknown.id);
@@ -85,21 +84,22 @@ void tell_unknown(call &c, order &o, const unknown_update &unknown)
     o.updateIdExpansionDetail.push_back(told);
 }
 
-bool wants_physical(const protocolUpdateOrder__DeliveryPreference &wish)
+bool wants_physical(const protocolUpdateOrder__DeliveryPreference &preference)
 {
-    return wish.medium != nullptr && *wish.medium == protocol__Medium::physical;
+    return preference.medium != nullptr && *preference.medium == protocol__Medium::physical;
 }
 
 // Null if the service can deliver as one of the preferences asks; otherwise what is wrong with the last.
 protocol__Fault *undeliverable(call &c, const order &o)
 {
     const protocolUpdateOrder__DeliveryPreference *last = nullptr;
-    for (const protocolUpdateOrder__DeliveryPreference *wish : o.deliveryPreference) {
-        if (wish == nullptr)
+    for (const protocolUpdateOrder__DeliveryPreference *preference : o.deliveryPreference) {
+        if (preference == nullptr)
             continue;
-        if (!wants_physical(*wish) && serves(c, wish->dataPortPreference, protocol__Direction::out))
+        if (!wants_physical(*preference) &&
+            serves(c, preference->dataPortPreference, protocol__Direction::out))
             return nullptr;
-        last = wish;
+        last = preference;
     }
     if (last == nullptr || !wants_physical(*last))
         return last == nullptr ? nullptr
@@ -142,7 +142,7 @@ state deliver(call &c, order &o, const expansion &found)
                                  : state::complete_x002eavailable_x002epartial;
 }
 
-// Each name and each wish costs the service more than the client that repeats it.
+// Each name and each preference costs the service more than the client that repeats it.
 void refuse_endless(call &c, const order &o)
 {
     if (o.updateId.size() + o.updateIdQualified.size() + o.updateScope.size() > NAMES_MAX)
@@ -171,9 +171,9 @@ order *submit(call &c, order &request)
     request.updateIdExpansionDetail.clear();
     request.error.clear();
     for (const chosen_update &chosen : found.chosen)
-        tell_chosen(c, request, *chosen.update);
+        list_chosen(c, request, *chosen.update);
     for (const unknown_update &unknown : found.unknown)
-        tell_unknown(c, request, unknown);
+        list_unknown(c, request, unknown);
     request.state = make_value(c.ctx, deliver(c, request, found));
     rules_of(c).documents().keep(request);
     return &request;

@@ -1,6 +1,6 @@
-// main.cpp - call_bench: calls per second and latency of a call with an answer of 2 KB, beside other ways to
-// make it. All ways take turns in short rounds, so a busy machine slows all of them; the ratios are medians
-// over rounds.
+// main.cpp - call_bench: calls per second and latency of a call with an answer of 2 KB, compared with other
+// ways to make it. All ways take turns in short rounds, so a busy machine slows all of them; the ratios are
+// medians over rounds.
 #include <algorithm>
 #include <chrono>
 #include <cstdio>
@@ -83,7 +83,7 @@ int main(int argc, char **argv)
 {
     int rounds = 40, calls = 250;
     std::string only;
-    CLI::App app("Measures calls beside other ways to make them");
+    CLI::App app("Measures calls, and other ways to make them");
     app.add_option("--rounds", rounds, "Rounds in which all ways take their turn")->capture_default_str();
     app.add_option("--calls", calls, "Calls of a way in a round, a tenth of them with new connections")
         ->capture_default_str();

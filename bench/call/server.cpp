@@ -23,17 +23,17 @@ namespace {
 // One connection: the bytes of requests come in by `receive` and answers leave by `send`.
 template <class Receive, class Send> void serve(const std::string &answer, Receive receive, Send send)
 {
-    std::string room(65536, '\0');
+    std::string bytes(65536, '\0');
     for (std::size_t have = 0;;) {
-        const ssize_t count = receive(room.data() + have, room.size() - have);
+        const ssize_t count = receive(bytes.data() + have, bytes.size() - have);
         if (count <= 0)
             return;
         have += static_cast<std::size_t>(count);
-        const std::string_view text(room.data(), have);
+        const std::string_view text(bytes.data(), have);
         const std::size_t head = text.find("\r\n\r\n");
         const std::size_t length = text.find("Content-Length: ");
         if (head == text.npos || length == text.npos ||
-            have < head + 4 + std::strtoul(room.data() + length + 16, nullptr, 10))
+            have < head + 4 + std::strtoul(bytes.data() + length + 16, nullptr, 10))
             continue;
         have = 0;
         if (send(answer.data(), answer.size()) <= 0)
@@ -44,7 +44,7 @@ template <class Receive, class Send> void serve(const std::string &answer, Recei
 void serve_plain(int socket, const std::string &answer)
 {
     serve(
-        answer, [&](char *to, std::size_t room) { return recv(socket, to, room, 0); },
+        answer, [&](char *to, std::size_t size) { return recv(socket, to, size, 0); },
         [&](const char *from, std::size_t length) { return send(socket, from, length, MSG_NOSIGNAL); });
     close(socket);
 }
@@ -56,7 +56,7 @@ void serve_tls(int socket, const std::string &answer, SSL_CTX *context)
     if (SSL_accept(ssl) == 1) {
         serve(
             answer,
-            [&](char *to, std::size_t room) -> ssize_t { return SSL_read(ssl, to, static_cast<int>(room)); },
+            [&](char *to, std::size_t size) -> ssize_t { return SSL_read(ssl, to, static_cast<int>(size)); },
             [&](const char *from, std::size_t length) -> ssize_t {
                 return SSL_write(ssl, from, static_cast<int>(length));
             });

@@ -109,9 +109,9 @@ public:
     {
         expect(::send(socket_, bytes.data(), bytes.size(), 0) == static_cast<ssize_t>(bytes.size()), "send");
     }
-    std::size_t recv(char *to, std::size_t room)
+    std::size_t recv(char *to, std::size_t size)
     {
-        const ssize_t count = ::recv(socket_, to, room, 0);
+        const ssize_t count = ::recv(socket_, to, size, 0);
         expect(count > 0, "recv");
         return static_cast<std::size_t>(count);
     }

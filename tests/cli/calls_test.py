@@ -153,6 +153,7 @@ class calls(unittest.TestCase):
                 (5, "can't be set up", ["profile", "get", "--ca-file", wrong]),
                 (2, "--endpoint", ["profile", "get", "-e", "ftp://x"]),
                 (2, "--user", ["profile", "get", "-e", "http://u:p@x"]),
+                (2, "excludes", ["statusreport", "get", "--mime", "--dime"]),
                 (4, 'No call can go to "http://:9/', ["profile", "get", "-e", "http://:9"]),
                 (4, 'No call can go to "https://x:65536/', ["problemreport", "get", "-e", "http://x", "-e", "https://x:65536"]),
                 (4, 'No call can go to "http://x:0/"', ["data", "get", "http://x:0/"]),
@@ -204,21 +205,6 @@ class calls(unittest.TestCase):
             self.assertEqual([(part["Content-ID"], part.get_content_type(), part["Content-Description"]) for part in sent[1:]],
                              [("<pic>", "image/png", "one.bin"), ("<attachment-2>", "application/octet-stream", "two.txt")])
             self.assertIn(b"\r\n\r\n" + data + b"\r\n--", requests[0])
-
-    def test_a_service_keeps_attachments_and_gives_them_back(self):
-        data = random.Random(4).randbytes(200000)
-        source = self.file("source", data)
-        report = ('<s:createRequest xmlns:s="%s/StatusReport" xmlns:c="%s"><c:attachment><c:dataHandler>cid:it</c:dataHandler>'
-                  "</c:attachment></s:createRequest>" % (zuv.COMMON, zuv.COMMON))
-        with zuv.service() as address:
-            for form in ("--mime", "--mtom", "--dime"):
-                created = zuv.run("statusreport", "create", "-", form, "--attach", source + ",id=it", "--json", "-e", address, given=report)
-                target = json.loads(self.expect(created, 0).stdout)["thisURI"][0]
-                kept = os.path.join(self.folder, form)
-                self.expect(zuv.run("statusreport", "get", form, "-t", target, "--save-attachments", kept, "-e", address), 0, "saved ")
-                with open(os.path.join(kept, *os.listdir(kept)), "rb") as file:
-                    self.assertEqual(file.read(), data, form)
-            self.expect(zuv.run("statusreport", "get", "--mime", "--dime", "-e", address), 2, "excludes")
 
     def test_data_ports_are_read_and_written(self):
         data = random.Random(2).randbytes(300000)

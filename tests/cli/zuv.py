@@ -4,11 +4,9 @@ import os
 import socket
 import ssl
 import subprocess
-import sys
 import threading
 
-sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "interop"))
-import zuv_service  # noqa: E402  the reference service, as the interoperability tests start it
+import zuv_service  # the reference service, as the interoperability tests start it
 
 SOURCE = os.environ["ZUV_SOURCE_DIR"]
 PROGRAM, SERVICE = os.environ["ZUV_PROGRAM"], os.environ["ZUV_SERVICE_PROGRAM"]
@@ -92,5 +90,5 @@ def peer(*answers, certificate=None):
         thread.join(LIMIT_S)
 
 
-def service(*options):
-    return zuv_service.running(SERVICE, *options)
+def service(*options, **how):
+    return zuv_service.running(SERVICE, *options, **how)

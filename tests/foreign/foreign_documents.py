@@ -16,6 +16,9 @@ import tempfile
 
 from lxml import etree
 
+sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), '..', '..', 'tools', 'wire_reference'))
+import contract  # noqa: E402  the schemas, as the wire reference reads them
+
 XSD = '{http://www.w3.org/2001/XMLSchema}'
 XSI = 'http://www.w3.org/2001/XMLSchema-instance'
 STRICT, UTF_STRINGS = 0x1000, 0x2000000
@@ -25,9 +28,16 @@ DEPTH = 3
 # ---- the contract
 
 class Class:
-    def __init__(self, name, base, text, members, attributes, wildcard):
-        self.name, self.base, self.text = name, base, text
-        self.own_members, self.own_attributes, self.own_wildcard = members, attributes, wildcard
+    def __init__(self, type_):
+        self.base, self.own_members, self.own_attributes = named(type_.base), [], []
+        self.text, self.own_wildcard = False, type_.wildcard
+        for m in type_.members:
+            if m.value:
+                self.text = True
+            elif m.attribute:
+                self.own_attributes.append((m.name, named(m.type), m.least == 1))
+            else:
+                self.own_members.append(Member(m))
 
     def chain(self):
         return (CLASSES[self.base].chain() if self.base else []) + [self]
@@ -43,18 +53,18 @@ class Class:
 
 
 class Member:
-    def __init__(self, tag, kind, least, many, nillable, default):
-        self.tag, self.kind, self.least, self.many = tag, kind, least, many
-        self.nillable, self.default = nillable, default
+    def __init__(self, member):
+        self.tag, self.least, self.many, self.default = member.name, member.least, member.most != 1, member.default
+        self.kind, self.nillable = (named(member.type), member.nillable) if member.type else ELEMENTS[member.name]
 
 
 CLASSES, SIMPLE, ELEMENTS, DERIVED = {}, {}, {}, {}
 PREFIXES = {}  # of the contract, by namespace
+NAMES = {}  # of types without a name, by their keys in the contract: those of their elements, of a member "Class-member"
 
 
-def named(node, text):
-    prefix, _, local = text.rpartition(':')
-    return '{%s}%s' % (node.nsmap[prefix or None], local)
+def named(key):
+    return NAMES.get(key, key)
 
 
 def spelled(name):
@@ -62,73 +72,20 @@ def spelled(name):
     return '%s:%s' % (PREFIXES[namespace], local)
 
 
-def add_simple(name, node):
-    restriction = node.find(XSD + 'restriction')
-    words = [e.get('value') for e in restriction.findall(XSD + 'enumeration')]
-    SIMPLE[name] = words or named(restriction, restriction.get('base'))
-
-
-def add_class(name, node, space):
-    extension = node.find('.//%sextension' % XSD)
-    body = node if extension is None else extension
-    base, text = None, False
-    if extension is not None:
-        base = named(extension, extension.get('base'))
-        text = extension.getparent().tag == XSD + 'simpleContent'
-    members = [member(e, space, name) for e in body.findall(XSD + 'sequence/' + XSD + 'element')]
-    attributes = [(a.get('name'), named(a, a.get('type')), a.get('use') == 'required')
-                  for a in body.findall(XSD + 'attribute')]
-    wildcard = body.find(XSD + 'anyAttribute') is not None
-    CLASSES[name] = Class(name, None if text else base, text, members, attributes, wildcard)
-
-
-def member(node, space, owner):
-    many = node.get('maxOccurs', '1') != '1'
-    least = int(node.get('minOccurs', '1'))
-    if node.get('ref'):
-        tag = named(node, node.get('ref'))
-        return Member(tag, None, least, many, False, None)
-    tag = '{%s}%s' % (space, node.get('name'))
-    return Member(tag, kind_of(node, owner), least, many, node.get('nillable') == 'true', node.get('default'))
-
-
-def kind_of(node, owner):  # a type without a name is called after its place
-    if node.get('type'):
-        return named(node, node.get('type'))
-    name = '%s-%s' % (owner, node.get('name'))
-    if node.find(XSD + 'simpleType') is not None:
-        add_simple(name, node.find(XSD + 'simpleType'))
-    else:
-        add_class(name, node.find(XSD + 'complexType'), owner[1:].split('}')[0])
-    return name
-
-
 def load(directory):
-    for line in open(os.path.join(directory, 'namespaces.txt')):
-        words = line.split()
-        if words and words[0] != '#':
-            PREFIXES[words[1]] = words[0]
-    for place, _, files in sorted(os.walk(directory)):
-        for file in sorted(f for f in files if f.endswith('.xsd')):
-            root = etree.parse(os.path.join(place, file)).getroot()
-            space = root.get('targetNamespace')
-            for node in root:
-                name = '{%s}%s' % (space, node.get('name'))
-                if node.tag == XSD + 'simpleType':
-                    add_simple(name, node)
-                elif node.tag == XSD + 'complexType':
-                    add_class(name, node, space)
-                elif node.tag == XSD + 'element' and node.get('type'):
-                    ELEMENTS[name] = (named(node, node.get('type')), node.get('nillable') == 'true')
-                elif node.tag == XSD + 'element':
-                    add_class(name, node.find(XSD + 'complexType'), space)
-                    ELEMENTS[name] = (name, False)
-    for c in CLASSES.values():
-        for m in c.own_members:
-            if m.kind is None:
-                m.kind, m.nillable = ELEMENTS[m.tag]
-        for b in c.chain():
-            DERIVED.setdefault(b.name, []).append(c.name)
+    read = contract.Contract(directory)
+    PREFIXES.update(read.prefixes)
+    for key, type_ in read.types.items():
+        NAMES.setdefault(key, type_.name)
+        for member in type_.members:
+            if member.type.endswith('()'):
+                NAMES[member.type] = '%s-%s' % (type_.name, contract.local(member.name))
+    ELEMENTS.update((name, (named(key), name in read.nillable)) for name, key in read.elements.items())
+    SIMPLE.update((named(key), type_.words or type_.base) for key, type_ in read.types.items() if not type_.is_class)
+    CLASSES.update((named(key), Class(type_)) for key, type_ in read.types.items() if type_.is_class)
+    for name, c in CLASSES.items():
+        for base in c.chain():
+            DERIVED.setdefault(next(n for n, other in CLASSES.items() if other is base), []).append(name)
 
 
 # ---- meanings: (tag, xsi:type or None, {attribute: word}, text or list of meanings); nil has None for content

@@ -156,6 +156,15 @@ TEST(program, tells_success_refusal_and_wrong_use_apart)
               std::string::npos);
     std::filesystem::remove_all(out);
 
+    EXPECT_EQ(run(everything + " --list").said, file_text(DATA / "everything/outputs.txt"));
+    std::filesystem::copy(DATA / "everything", out);
+    std::ofstream(out / "outputs.txt", std::ios::app) << "src/one_more.cpp\n";
+    const run_result unlisted = run("--schema " + out.string() + " --out " + (out / "made").string());
+    EXPECT_EQ(unlisted.status, 1);
+    EXPECT_TRUE(unlisted.said.starts_with("outputs.txt: ")) << unlisted.said;
+    EXPECT_FALSE(std::filesystem::exists(out / "made"));
+    std::filesystem::remove_all(out);
+
     const run_result dumped = run(everything + " --dump-model");
     EXPECT_EQ(dumped.status, 0);
     EXPECT_EQ(dumped.said, expected.model);

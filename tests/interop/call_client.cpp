@@ -3,7 +3,6 @@
 //
 // Usage: call_client ENDPOINT [options]; see declare. A line for each call; the program ends with 1 if an
 // answer isn't the one to its request, or if a descriptor is left open.
-#include <chrono>
 #include <cstdio>
 #include <filesystem>
 #include <iostream>
@@ -13,11 +12,11 @@
 #include <CLI/CLI.hpp>
 #include <openssl/ssl.h>
 
-#include <zuv_client_pro/ProfileSoapBindingProxy.h>
-#include <zuv_client_pro/protocol.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_log.h>
 #include <zuv_client_pro/soap_tls.h>
+
+#include "support/create_call.h"
 
 namespace {
 
@@ -132,21 +131,13 @@ public:
 
 private:
     struct outcome {
-        int code, connection;
-        long milliseconds;
+        created came;
+        int connection;
         std::string fault;
     };
 
     void call(int number)
     {
-        using namespace std::chrono;
-        std::string name = "call-" + std::to_string(number), text(options_.size, 'x');
-        protocol__Identity identity;
-        identity.name = &name;
-        protocolProfile__ProfileContent request;
-        request.identity = &identity;
-        request.profileAuthority = &text;
-        __protocolProfile__createResponse response{};
         proxy_.destroy();
         if (options_.forget_sessions)
             forget_session();
@@ -154,20 +145,11 @@ private:
             proxy_.auth_user = user_.user.c_str();
             proxy_.auth_password = user_.password.c_str();
         }
-        const auto began = steady_clock::now();
-        const int code = proxy_.create(&request, response);
-        const long took = duration_cast<milliseconds>(steady_clock::now() - began).count();
-        if (code == 0 && !is_own(response.result, name, text))
+        const created came =
+            call_create(proxy_, "call-" + std::to_string(number), std::string(options_.size, 'x'));
+        if (came.code == 0 && !(options_.size == 0 ? came.own : came.whole))
             ++others_answers_;
-        outcomes_.push_back({code, connections_, took, code == 0 ? "" : fault()});
-    }
-
-    static bool is_own(const protocolProfile__ProfileContent *answer, const std::string &name,
-                       const std::string &text)
-    {
-        return answer != nullptr && answer->identity != nullptr && answer->identity->name != nullptr &&
-               *answer->identity->name == name &&
-               (text.empty() || (answer->profileAuthority != nullptr && *answer->profileAuthority == text));
+        outcomes_.push_back({came, connections_, came.code == 0 ? "" : fault()});
     }
 
     void forget_session()
@@ -189,8 +171,8 @@ private:
     void report()
     {
         for (const outcome &o : outcomes_)
-            std::printf("code=%d ms=%ld connection=%d fault=%s\n", o.code, o.milliseconds, o.connection,
-                        o.fault.c_str());
+            std::printf("code=%d ms=%d connection=%d fault=%s\n", o.came.code, o.came.milliseconds,
+                        o.connection, o.fault.c_str());
         std::fflush(stdout);
         outcomes_.clear();
     }

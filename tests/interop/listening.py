@@ -12,9 +12,14 @@ def _first_line(process):
     return process.stdout.readline() if ready else ""
 
 
+class Address(str):
+    """That of a program which listens, such as http://127.0.0.1:40001."""
+    process = None  # subprocess.Popen
+
+
 @contextlib.contextmanager
 def started(command, end_status=0, **options):
-    """Gives the address, such as http://127.0.0.1:40001, of a program that is stopped at the end of the block.
+    """Gives the Address of a program that is stopped at the end of the block.
 
     end_status is what it has to end with when it is told to terminate; options are those of subprocess.Popen.
     """
@@ -23,7 +28,9 @@ def started(command, end_status=0, **options):
         line = _first_line(process)
         if not line.startswith(READY):
             raise RuntimeError("%s did not start: %r" % (command[0], line))
-        yield line[len(READY):].strip()
+        address = Address(line[len(READY):].strip())
+        address.process = process
+        yield address
     finally:
         process.terminate()
         try:

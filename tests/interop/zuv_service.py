@@ -8,11 +8,12 @@ import listening
 
 
 @contextlib.contextmanager
-def running(program, *options):
-    """Gives the address, such as http://127.0.0.1:40001, of a zuv-service that stops at the end of the block."""
+def running(program, *options, **how):
+    """Gives the address of a zuv-service that stops at the end of the block; `how` is for listening.started. Its documents go
+    with it unless the options name a database."""
     with tempfile.TemporaryDirectory() as folder:
-        database = os.path.join(folder, "zuv.db")
-        with listening.started([program, "--port", "0", "--database", database, *options]) as address:
+        place = [] if "--database" in options else ["--database", os.path.join(folder, "zuv.db")]
+        with listening.started([program, "--port", "0", *place, *options], **how) as address:
             yield address
 
 

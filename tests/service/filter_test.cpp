@@ -128,6 +128,10 @@ TEST(UpdateFilter, CombinesWithAndOrNot)
     EXPECT_EQ(passing(node("expression", "And", firmware + german)), "FW-120");
     EXPECT_EQ(passing(node("expression", "Or", firmware + german)), "FW-100 FW-110 FW-120 DB-10 TAPE-7");
     EXPECT_EQ(passing(node("expression", "And", firmware + not_german)), "FW-100 FW-110 TAPE-7");
+    std::string many; // a filter may be as wide as it likes, but not as deep
+    for (int i = 0; i < 200; ++i)
+        many += german;
+    EXPECT_EQ(passing(node("expression", "Or", many)), "FW-120 DB-10");
 }
 
 TEST(UpdateFilter, RefusesWhatItCannotJudge)

@@ -17,8 +17,8 @@
 #include <zuv_client_pro/soap_registry.h>
 #include <zuv_client_pro/type_ids.h>
 
-#include "binding/traits_binary.h"
 #include "binding/registry.h"
+#include "binding/traits_binary.h"
 
 namespace random_objects {
 

@@ -4,9 +4,9 @@
 
 #include <atomic>
 #include <chrono>
-#include <zuv_client_pro/ProfileSoapBindingProxy.h>
-#include <zuv_client_pro/protocol.h>
+#include <string>
 
+#include "support/create_call.h"
 #include "support/library.h"
 #include "support/scripted_server.h"
 
@@ -44,25 +44,11 @@ public:
     int call(std::size_t padding = 0) { return call_through(proxy, padding); }
     int call_through(ProfileSoapBindingProxy &any, std::size_t padding = 0)
     {
-        using namespace std::chrono;
-        std::string name = "call-" + std::to_string(++names_), text(padding, 'p');
-        protocol__Identity identity;
-        identity.name = &name;
-        protocolProfile__ProfileContent request;
-        request.identity = &identity;
-        request.profileAuthority = &text;
-        __protocolProfile__createResponse response{};
         any.destroy();
         any.endpoint = endpoint.c_str();
-        const auto began = steady_clock::now();
-        const int code = any.create(&request, response);
-        milliseconds =
-            static_cast<int>(duration_cast<std::chrono::milliseconds>(steady_clock::now() - began).count());
-        if (code != 0)
-            return code;
-        const bool own = response.result && response.result->identity && response.result->identity->name &&
-                         *response.result->identity->name == name;
-        return own ? 0 : OTHERS_ANSWER;
+        const created came = call_create(any, "call-" + std::to_string(++names_), std::string(padding, 'p'));
+        milliseconds = came.milliseconds;
+        return came.code == 0 && !came.own ? OTHERS_ANSWER : came.code;
     }
 
     std::string endpoint;

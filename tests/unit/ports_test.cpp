@@ -330,7 +330,7 @@ TEST(ports, ids_that_are_no_operation_end_the_call_before_anything_is_sent)
         void *made = &wire;
         EXPECT_EQ(SOAP_NO_METHOD, soap_call(&wire, "http://127.0.0.1:9/", nullptr, wrong, nullptr, &made));
         EXPECT_EQ(nullptr, made);
-        EXPECT_EQ("", wire.sent);
+        EXPECT_EQ("", wire.sent());
     }
 }
 

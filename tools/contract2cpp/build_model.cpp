@@ -299,7 +299,7 @@ namespace {
 
 } // namespace
 
-// The C++ expression of a value's start; texts have none, and start empty.
+// The C++ expression of an initial value; texts have none, and are initially empty.
 std::string model_builder::initial_of(const place &at, const known_type &type,
                                       const std::optional<std::string> &text)
 {
@@ -342,7 +342,7 @@ const known_type &model_builder::member_type(const std::string &uri, const std::
     return types.at({uri, owner + "-" + declared.name});
 }
 
-// How the member is held follows from how often it may stand there, a default, and the mark in appinfo.
+// How the member is held follows from how often it may occur, its default, and the mark in appinfo.
 void model_builder::give_form(const element_declaration &declared, const known_type &type,
                               class_member &member)
 {
@@ -374,7 +374,7 @@ void model_builder::give_form(const element_declaration &declared, const known_t
     member.initial = initial_of(declared.at, type, declared.initial);
 }
 
-// A reference takes name and type of a top-level element, which may be another namespace's.
+// A reference has the name and type of a top-level element, which may be another namespace's.
 void model_builder::resolve_reference(const element_declaration &declared, class_member &member,
                                       const element_declaration *&typed, std::string &uri) const
 {
@@ -475,7 +475,7 @@ enumeration model_builder::build_enumeration(const known_type &type)
     return made;
 }
 
-// The types that elements of a class have for themselves.
+// The anonymous types of a class's elements.
 void model_builder::add_anonymous(service_namespace &service, const std::string &uri,
                                   const complex_declaration &type)
 {

@@ -1,4 +1,4 @@
-// declarations.h - the contract as its files say it: nothing resolved, every piece with its place.
+// declarations.h - the contract as declared in its files: nothing resolved, every item with its place.
 //
 // Here: the records that the read stage fills. Elsewhere: reading (read_*.cpp), what they mean
 // (build_model.cpp).
@@ -43,7 +43,7 @@ struct attribute_declaration {
 
 struct complex_declaration;
 
-// An element: top-level, or in the sequence of a class. One of reference, type, simple and complex tells its
+// An element: top-level, or in the sequence of a class. One of reference, type, simple and complex gives its
 // type.
 struct element_declaration {
     place at;

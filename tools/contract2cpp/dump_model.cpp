@@ -1,4 +1,4 @@
-// dump_model.cpp - the model as text, for people and for the tests of the first two stages.
+// dump_model.cpp - the model as text, for the reader and for the tests of the first two stages.
 #include <ostream>
 
 #include "model.h"

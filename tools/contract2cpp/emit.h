@@ -34,7 +34,7 @@ std::vector<emitted_file> emit_namespace_table(const contract_model &model, cons
 std::vector<emitted_file> emit_port(const port &port);
 std::vector<emitted_file> emit_description(const contract_model &model);
 
-// Writes a file below a directory, which is made where needed. contract_error if that fails.
+// Writes a file below a directory, which is created if needed. contract_error if that fails.
 void write_file(const std::filesystem::path &directory, const emitted_file &file);
 
 inline constexpr std::string_view CONTRACT_AUTHORITY = "http://www.zuv.example";
@@ -43,7 +43,7 @@ inline constexpr std::string_view CONTRACT_AUTHORITY = "http://www.zuv.example";
 std::string opening(std::string_view file, const std::string &source, const std::string &about);
 // Text as lines of comment, wrapped; empty for no text.
 std::string comment(const std::string &text, std::string_view indent = "");
-// A declaration with its comment: behind it if the line has room, else above.
+// A declaration with its comment: after it if the line is long enough, else above.
 std::string documented(const std::string &declaration, const std::string &text, std::string_view indent);
 // A string literal of C++.
 std::string string_literal(std::string_view text);

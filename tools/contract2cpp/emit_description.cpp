@@ -1,5 +1,5 @@
-// emit_description.cpp - the contract told to the command line: its operations as a list of macros, its types
-// as data with their documentation.
+// emit_description.cpp - the contract as data for the command line: its operations as a list of macros, its
+// types as data with their documentation.
 //
 // Elsewhere: the records that the data fills, and what is done with them (cli/contract.h).
 #include <map>
@@ -11,7 +11,7 @@ namespace {
 
 constexpr std::string_view LIST = "operation_list.h", DESCRIPTION = "contract_description.cpp";
 
-// A literal of a text with its white space made single blanks.
+// A literal of a text, each run of white space as one blank.
 std::string words_literal(const std::string &text)
 {
     std::istringstream words(text);

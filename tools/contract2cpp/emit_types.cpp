@@ -49,7 +49,9 @@ std::string type_row(const identified_type &type)
 
 std::string type_table(const contract_model &model)
 {
-    std::string text = "constinit const type_entry type_entries[TYPE_ID_MAX + 1] = {\n";
+    std::string text = "static_assert(TYPE_ID_MAX == " + std::to_string(TYPE_ID_MAX) +
+                       ");\n\n"
+                       "constinit const type_entry type_entries[TYPE_ID_MAX + 1] = {\n";
     auto next = model.types.begin();
     for (int id = 0; id <= TYPE_ID_MAX; ++id) {
         const bool named = next != model.types.end() && next->id == id;
@@ -66,8 +68,8 @@ bool is_element_name(const identified_type &type)
            type.xml_name.find('-') == std::string::npos;
 }
 
-// XML types by which xsi:type or an element's name can tell a type. Where one has two ids, the normal form
-// counts.
+// XML types by which xsi:type or an element's name can name a type. If one has two ids, the normal form
+// is used.
 bool is_type_name(const contract_model &model, const identified_type &type)
 {
     if (type.kind == id_kind::primitive) {

@@ -1,6 +1,5 @@
-// layout.h - how the output is cut into files: what the build has to know before the generator runs.
-//
-// cmake/generate.cmake lists the same files; both count the classes of a prefix by the rows of type_ids.txt.
+// layout.h - how the output is cut into files. Which files that gives is in outputs.txt next to the
+// contract, for the build to know before the generator runs.
 #pragma once
 
 #include <cstddef>

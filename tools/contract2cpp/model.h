@@ -1,9 +1,9 @@
-// model.h - the contract as the program will hold it: every name resolved, every type with its id.
+// model.h - the contract as the generated code will hold it: every name resolved, every type with its id.
 //
 // Here: the records that the emitters print. Elsewhere: making them (build_model.cpp), printing them
 // (dump_model.cpp).
 //
-// Always: vectors stand in the order of emission, which comes from the files alone.
+// Always: vectors are in the order of emission, which depends on the files alone.
 #pragma once
 
 #include <iosfwd>
@@ -15,7 +15,7 @@
 // How the value of a member is held.
 enum class held { text, boolean, int32, float64, binary, code, object };
 
-// How often a member stands on the wire, and so how it is held.
+// How often a member occurs on the wire, and so how it is held.
 enum class occurs {
     optional, // a pointer
     required, // a pointer
@@ -113,7 +113,7 @@ struct port {
 
 enum class id_kind { primitive, text, binary, object, code, vector, envelope, response, request, pointer };
 
-// A type id, with what dispatch by id has to know.
+// A type id, with what dispatch by id needs to know.
 struct identified_type {
     int id = 0;
     id_kind kind = id_kind::primitive;

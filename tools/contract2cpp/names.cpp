@@ -25,6 +25,14 @@ constexpr std::string_view KEYWORDS[] = {
 
 } // namespace
 
+std::pair<std::string_view, std::string_view> split_name(std::string_view name)
+{
+    const auto colon = name.find(':');
+    if (colon == std::string_view::npos)
+        return {{}, name};
+    return {name.substr(0, colon), name.substr(colon + 1)};
+}
+
 std::string spelled(std::string_view local)
 {
     std::string name;
@@ -58,8 +66,6 @@ std::string type_name(std::string_view prefix, std::string_view local)
 
 std::string type_name(std::string_view xml_type)
 {
-    const auto colon = xml_type.find(':');
-    if (colon == std::string_view::npos)
-        return spelled(xml_type);
-    return type_name(spelled(xml_type.substr(0, colon)), xml_type.substr(colon + 1));
+    const auto [prefix, local] = split_name(xml_type);
+    return prefix.empty() ? spelled(local) : type_name(spelled(prefix), local);
 }

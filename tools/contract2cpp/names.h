@@ -5,6 +5,10 @@
 
 #include <string>
 #include <string_view>
+#include <utility>
+
+// Prefix and local name of a qualified name; without a colon the prefix is empty.
+std::pair<std::string_view, std::string_view> split_name(std::string_view name);
 
 // A local name spelled for C++: "." as _x002e, "-" as "_". Empty if it holds anything but letters, digits and
 // these.

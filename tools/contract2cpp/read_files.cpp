@@ -6,7 +6,7 @@
 
 namespace {
 
-// The words of each line that says something; "#" begins a comment line.
+// The words of each line that isn't empty; "#" begins a comment line.
 template <class F> void each_row(const std::filesystem::path &path, const std::string &name, F &&row)
 {
     std::istringstream lines(read_bytes(path, name));

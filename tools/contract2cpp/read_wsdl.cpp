@@ -1,7 +1,7 @@
 // read_wsdl.cpp - one WSDL to the declaration of its port.
 //
 // Read: messages, the one port type, and name and address of the binding for SOAP 1.1. Bindings are all alike
-// (document style, literal use), so their operations are not looked into; faults are dispatched by their
+// (document style, literal use), so their operations are not read; faults are dispatched by their
 // classes.
 #include <map>
 

@@ -14,7 +14,7 @@
 
 namespace {
 
-constexpr std::string_view BINDING_SOURCE = "urn:zuv:binding"; // appinfo that speaks to this generator
+constexpr std::string_view BINDING_SOURCE = "urn:zuv:binding"; // appinfo for this generator
 
 class xsd_reader {
 public:
@@ -43,8 +43,8 @@ private:
     const xml_file &xml;
 };
 
-// Hands each child of XSD's own to `handle`; what that doesn't take can't be translated. Annotations that it
-// leaves alone are passed over.
+// Calls `handle` with each XSD child; what that does not accept can't be translated. Annotations that it does
+// not accept are skipped.
 void xsd_reader::each_child(pugi::xml_node parent, const handler &handle) const
 {
     for (const pugi::xml_node child : parent.children()) {
@@ -94,7 +94,7 @@ void xsd_reader::restriction(pugi::xml_node node, simple_declaration &type) cons
             type.literals.push_back(std::move(literal));
             return true;
         }
-        // A text is carried as it stands, so its facets bind whoever fills it, not this program.
+        // A text is passed on unchanged; its facets are for those who set it to obey.
         faceted = faceted || local != "annotation";
         return std::find(std::begin(facets), std::end(facets), local) != std::end(facets);
     });
@@ -140,7 +140,7 @@ attribute_declaration xsd_reader::attribute(pugi::xml_node node) const
     return attribute;
 }
 
-// Attributes of other namespaces are passed over by the reader of every class, so leave for them needs no
+// The reader of every class skips attributes of other namespaces, so a wildcard for them needs no
 // code.
 void xsd_reader::any_attribute(pugi::xml_node node) const
 {

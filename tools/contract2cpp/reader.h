@@ -1,7 +1,7 @@
 // reader.h - the read stage: the files of the contract to declarations.
 //
-// Always: what can't be translated is refused where it stands. Whatever isn't known to be harmless counts as
-// such.
+// Always: what can't be translated is refused, with its place. Whatever isn't known to be harmless is
+// refused too.
 #pragma once
 
 #include <filesystem>

@@ -5,6 +5,7 @@
 #include <fstream>
 #include <sstream>
 
+#include "names.h"
 #include "reader.h"
 
 namespace {
@@ -15,18 +16,6 @@ std::vector<std::size_t> line_ends_of(const std::string &bytes)
     for (std::size_t at = bytes.find('\n'); at != std::string::npos; at = bytes.find('\n', at + 1))
         ends.push_back(at);
     return ends;
-}
-
-std::string_view prefix_of(std::string_view name)
-{
-    const auto colon = name.find(':');
-    return colon == std::string_view::npos ? std::string_view() : name.substr(0, colon);
-}
-
-std::string_view local_of(std::string_view name)
-{
-    const auto colon = name.find(':');
-    return colon == std::string_view::npos ? name : name.substr(colon + 1);
 }
 
 } // namespace
@@ -52,7 +41,7 @@ xml_file::xml_file(const std::filesystem::path &path, const std::string &file_na
                              std::string("not well-formed: ") + result.description());
 }
 
-// Offsets that the parser can't tell count as the file's start.
+// Offsets that the parser doesn't know count as the file's start.
 std::size_t xml_file::line_at(std::ptrdiff_t offset) const
 {
     const auto at = static_cast<std::size_t>(std::max<std::ptrdiff_t>(offset, 0));
@@ -79,8 +68,8 @@ std::string xml_file::uri_of(pugi::xml_node node, std::string_view prefix) const
 
 qualified_name xml_file::name_of(pugi::xml_node element) const
 {
-    const std::string_view text = element.name();
-    return {uri_of(element, prefix_of(text)), std::string(local_of(text)), at(element)};
+    const auto [prefix, local] = split_name(element.name());
+    return {uri_of(element, prefix), std::string(local), at(element)};
 }
 
 bool xml_file::is(pugi::xml_node element, std::string_view uri, std::string_view local) const
@@ -92,7 +81,8 @@ bool xml_file::is(pugi::xml_node element, std::string_view uri, std::string_view
 qualified_name xml_file::qualified(pugi::xml_node node, const char *attribute) const
 {
     const std::string text = required(node, attribute);
-    return {uri_of(node, prefix_of(text)), std::string(local_of(text)), at(node)};
+    const auto [prefix, local] = split_name(text);
+    return {uri_of(node, prefix), std::string(local), at(node)};
 }
 
 std::string xml_file::required(pugi::xml_node node, const char *attribute) const

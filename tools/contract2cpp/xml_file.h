@@ -28,7 +28,7 @@ public:
     bool is(pugi::xml_node element, std::string_view uri, std::string_view local) const;
     // The value of an attribute that holds a qualified name. contract_error if its prefix isn't declared.
     qualified_name qualified(pugi::xml_node node, const char *attribute) const;
-    // The value of an attribute that must be there.
+    // The value of a required attribute.
     std::string required(pugi::xml_node node, const char *attribute) const;
 
     // Refuses any attribute but these and namespace declarations.

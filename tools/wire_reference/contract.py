@@ -26,11 +26,12 @@ class Member:
     text: str
     attribute: bool = False
     value: bool = False      # the text content itself
+    default: str = None
 
 
 @dataclasses.dataclass
 class Type:
-    name: str                # qualified; of an anonymous type that of its element, behind that of the class around it
+    name: str                # qualified; of an anonymous type that of its element, after that of the class around it
     anonymous: bool
     text: str
     base: str = ""           # qualified, of a derived class or of simple content
@@ -85,7 +86,7 @@ class Contract:
 
     def __init__(self, folder):
         self.prefixes, self.titles, self.types, self.elements, self.ports = {}, {}, {}, {}, []
-        self.element_texts = {}
+        self.element_texts, self.nillable = {}, set()  # texts by name; names of elements
         with open(os.path.join(folder, "namespaces.txt"), encoding="utf-8") as rows:
             for row in rows:
                 if row.strip() and not row.startswith("#"):
@@ -125,6 +126,8 @@ class Contract:
             self.types[name] = self.read_type(node, name, False)
             return
         self.element_texts[name] = documentation(node)
+        if node.get("nillable") == "true":
+            self.nillable.add(name)
         if node.get("type"):
             self.elements[name] = qualified(node, node.get("type"))
             return
@@ -174,7 +177,8 @@ class Contract:
         else:
             least, most = int(node.get("minOccurs", "1")), node.get("maxOccurs", "1")
             most = UNBOUNDED if most == "unbounded" else int(most)
-        return Member(name, type_, least, most, node.get("nillable") == "true", documentation(node), attribute)
+        return Member(name, type_, least, most, node.get("nillable") == "true", documentation(node), attribute,
+                      default=node.get("default"))
 
     def type_of(self, member):
         """The qualified name of a member's type, through the element that it refers to if it does."""

@@ -1,13 +1,13 @@
 """What the shared object exports and needs.
 
-Usage: surface.py LIBRARY NAMES HEADERS... [--renew]
+Usage: abi_surface.py LIBRARY NAMES HEADERS... [--renew]
 
 Checks soname, symbol version, needed libraries, what is left to the host's OpenSSL and zlib, that each exported function and
 object is declared in a public header (of the directories HEADERS) and each declared one exported, and that the exported names
 are those of the file NAMES. --renew writes that file instead.
 
 In the file a line is one function or object by its full signature, or a class. A class by itself has the operations of every
-data class, its vtable and its type information; what more or less a class has is named behind it.
+data class, its vtable and its type information; what more or less a class has is listed after it.
 """
 import collections
 import pathlib

@@ -1,5 +1,5 @@
 """A file of any size goes to the service and comes back through a host's callbacks, in all forms of messages: whole, and in
-flat memory on both sides. curl carries the same file to and from a data port of the same service, beside it.
+flat memory on both sides. For comparison curl carries the same file to and from a data port of the same service.
 
 Usage: transfer.py BYTES FILE_HOST ZUV_SERVICE ZUV"""
 import contextlib

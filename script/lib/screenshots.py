@@ -9,7 +9,7 @@ import shutil
 import sys
 import tempfile
 
-import browser
+import browser  # of the tests of the command line, as is zuv
 import zuv
 
 PROFILE = """<p:ProfileContent xmlns:p="%s" xmlns:c="%s"><c:identity><c:type>organization</c:type><c:name>Ada's workshop</c:name>

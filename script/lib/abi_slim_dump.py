@@ -1,8 +1,8 @@
-"""Makes an abidw dump small enough to keep: what no host can link with is taken out.
+"""Makes an abidw dump small enough to keep: what no host can link with is removed.
 
-Usage: slim_dump.py < DUMP > SLIM
+Usage: abi_slim_dump.py < DUMP > SLIM
 
-Taken out: inline functions, which have no symbol (nearly all of them members of std::vector and std::string), types that are
+Removed: inline functions, which have no symbol (nearly all of them members of std::vector and std::string), types that are
 named within classes, and then all types that nothing left refers to. Layouts, tables of virtual operations, and the
 signatures of exported functions stay.
 """
@@ -38,7 +38,7 @@ def main():
             if element.get(name):
                 (used_by.setdefault(owner, set()) if owner else roots).add(element.get(name))
         for child in element:
-            if child.tag == "member-type":  # goes where its class goes, but does not hold anything by itself
+            if child.tag == "member-type":  # kept with its class, but keeps nothing itself
                 for inner in child:
                     used_by.setdefault(inner.get("id"), set()).add(owner)
             walk(child, owner if child.tag != "member-type" else None)

@@ -1,4 +1,4 @@
-// shelf.h - the documents of one port: named, kept, found, changed, taken away.
+// repository.h - the documents of one port: named, kept, found, changed, removed.
 //
 // Here: what the ports' documents have in common (thisURI, state, a row of the store). Elsewhere: their
 // contents.
@@ -19,19 +19,19 @@ namespace service {
 // either is refused.
 std::string target_of(const call &c, const std::vector<std::string> *own_names = nullptr);
 
-template <class Document> class shelf {
+template <class Document> class repository {
 public:
     //   port  name of the port
     //   kind  part of the names given to its documents
-    shelf(call &c, const char *port, const char *kind) : call_(c), port_(port), kind_(kind) {}
+    repository(call &c, const char *port, const char *kind) : call_(c), port_(port), kind_(kind) {}
 
-    // Names a document afresh and keeps it.
+    // Gives a document a new name and keeps it.
     void keep(Document &document)
     {
         keep(document, [] {});
     }
 
-    // The same; `prepare` is done first, within the transaction.
+    // The same; `prepare` is called first, within the transaction.
     template <class Prepare> void keep(Document &document, const Prepare &prepare)
     {
         document.thisURI = {std::string("urn:zuv:") + kind_ + ":" + fresh_uuid()};
@@ -67,14 +67,14 @@ public:
         return changed;
     }
 
-    // Takes the document away.
-    Document *take(const std::string &uri)
+    // Removes the document; it is this function's result.
+    Document *remove(const std::string &uri)
     {
         store::writing transaction(call_.documents);
-        Document *const taken = find(uri);
+        Document *const removed = find(uri);
         call_.documents.remove(port_, uri);
         transaction.commit();
-        return taken;
+        return removed;
     }
 
 private:

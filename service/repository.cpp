@@ -1,5 +1,5 @@
-// shelf.cpp - see shelf.h.
-#include "shelf.h"
+// repository.cpp - see repository.h.
+#include "repository.h"
 
 namespace service {
 
