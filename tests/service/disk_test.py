@@ -16,19 +16,19 @@ class disk(unittest.TestCase):
     def setUp(self):
         folder = self.enterContext(tempfile.TemporaryDirectory())
         self.database = os.path.join(folder, "documents.db")
-        self.log = open(os.path.join(folder, "log"), "w+", encoding="utf-8")
-        self.addCleanup(self.log.close)
+        self.log, written = os.pipe()  # no file, which would be limited too
+        self.addCleanup(os.close, self.log)
+        self.stderr = self.enterContext(os.fdopen(written, "w"))
 
     def expect_failure(self, answer, logged):
         self.assertEqual(answer.status, 500, answer)
-        self.log.seek(0)
-        self.assertIn(logged, self.log.read())
+        self.assertIn(logged, os.read(self.log, 1 << 16).decode())
 
     def limit_files(self, address, size):
         resource.prlimit(address.process.pid, resource.RLIMIT_FSIZE, (size, resource.RLIM_INFINITY))
 
     def test_a_full_one_refuses_what_has_to_be_written(self):
-        with zuv.service("--database", self.database, stderr=self.log) as address:
+        with zuv.service("--database", self.database, stderr=self.stderr) as address:
             report = call(address, "StatusReport", "create").first("thisURI")
             url = call(address, "StatusReport", "attach", ATTACH, target(report)).first("dataURI")
             data = "POST %s HTTP/1.1\r\nContent-Length: 6\r\n\r\nsignal" % url.removeprefix(address)
@@ -46,7 +46,7 @@ class disk(unittest.TestCase):
             self.assertEqual(exchange(address, data).status, 200)
 
     def test_a_locked_database_can_be_read(self):
-        with zuv.service("--database", self.database, stderr=self.log) as address:
+        with zuv.service("--database", self.database, stderr=self.stderr) as address:
             profile = call(address, "Profile", "create").first("thisURI")
             other = sqlite3.connect(self.database, isolation_level=None)
             self.addCleanup(other.close)
