@@ -348,9 +348,11 @@ TEST_F(tls, and_tcp_neither_use_nor_close_an_abandoned_socket)
 {
     for (const bool secure : {false, true}) {
         SCOPED_TRACE(secure);
-        // The second server starts late: its thread would have the number reserved that is given up here.
+        // A thread that accepts has the lowest free number reserved, and that would be the one given up here: the first
+        // server holds its connection until the number is taken, and the second starts after that.
+        std::promise<void> taken;
+        const server one([&](line &) { taken.get_future().wait_for(std::chrono::seconds(60)); }, secure);
         const auto echoing = [](line &end) { end.send(end.bytes(1)), end.await_end(); };
-        const server one(echoing, secure);
         std::optional<server> next;
         context ctx;
         EXPECT_EQ(soap_force_close(ctx.get()), 0);
@@ -363,7 +365,9 @@ TEST_F(tls, and_tcp_neither_use_nor_close_an_abandoned_socket)
         EXPECT_EQ(ctx->socket, number);
         EXPECT_EQ(ctx->keep_alive, 0);
         EXPECT_FALSE(soap_socket_open(ctx.get()));
-        ASSERT_EQ(dup2(ends[0], number), number) << "the number now belongs to somebody else";
+        const int duplicate = dup2(ends[0], number);
+        taken.set_value();
+        ASSERT_EQ(duplicate, number) << "the number now belongs to somebody else";
         next.emplace(echoing, secure);
         EXPECT_EQ(soap_force_close(ctx.get()), 0);
         EXPECT_EQ(tcp_send(ctx.get(), "x", 1), -1);
