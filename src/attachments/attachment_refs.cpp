@@ -180,8 +180,8 @@ void soap_attachment_bind(soap *ctx, soap_attachment *attachment)
         answer_in_list(ctx, attachment);
         return;
     }
-    // A reference is filed under its decoded text without scheme; an id answers as it stands, without
-    // brackets, or decoded.
+    // References are indexed by their decoded text without scheme; an id matches literally, without brackets,
+    // or decoded.
     const std::uint64_t seed = ctx->mtom_index->seed;
     const std::uint64_t keys[] = {id_hash(bare_id(attachment->id, false), seed),
                                   id_hash(bare_id(attachment->id, true), seed),

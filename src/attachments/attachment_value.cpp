@@ -15,7 +15,7 @@
 #include "attachments/attachment_list.h"
 #include "attachments/dime.h"
 #include "core/failure.h"
-#include "identity/pointer_table.h"
+#include "identity/multiref.h"
 #include "xml/xml_input.h"
 
 namespace {

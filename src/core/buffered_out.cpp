@@ -63,14 +63,14 @@ int buffer_datagram(soap *ctx, const char *data, std::size_t length)
 
 int buffer_bytes(soap *ctx, const char *data, std::size_t length)
 {
-    std::size_t room = SOAP_BUFFER_SIZE - ctx->buffer_index;
-    while (length >= room) {
-        std::memcpy(ctx->buffer + ctx->buffer_index, data, room);
-        data += room;
-        length -= room;
+    std::size_t space = SOAP_BUFFER_SIZE - ctx->buffer_index;
+    while (length >= space) {
+        std::memcpy(ctx->buffer + ctx->buffer_index, data, space);
+        data += space;
+        length -= space;
         if (flush_full(ctx) != SOAP_OK)
             return ctx->error;
-        room = SOAP_BUFFER_SIZE;
+        space = SOAP_BUFFER_SIZE;
     }
     std::memcpy(ctx->buffer + ctx->buffer_index, data, length);
     ctx->buffer_index += length;

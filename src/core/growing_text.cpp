@@ -19,11 +19,11 @@ static std::size_t capacity_for(const soap *ctx, std::size_t needed)
     return capacity;
 }
 
-int soap_text_buffer_reserve(soap *ctx, std::size_t room)
+int soap_text_buffer_reserve(soap *ctx, std::size_t bytes)
 {
-    if (room > SIZE_MAX - ctx->label_index)
+    if (bytes > SIZE_MAX - ctx->label_index)
         return fail(ctx, SOAP_OUT_OF_MEMORY);
-    const std::size_t needed = ctx->label_index + room;
+    const std::size_t needed = ctx->label_index + bytes;
     if (needed <= ctx->label_size)
         return SOAP_OK;
     const std::size_t capacity = capacity_for(ctx, needed);

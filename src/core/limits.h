@@ -1,6 +1,6 @@
 // limits.h - what one message may cost: bytes of its XML, memory, copies, raw bytes that bring nothing.
 //
-// Here: counting, and the one place where a limit's error is born. Elsewhere: the text that tells it
+// Here: counting, and the one place where a limit's error is set. Elsewhere: the text of that error
 // (exchange/error_text.cpp), open elements (soap::max_depth, in xml), heads (net).
 //
 // Always: counting costs an addition. Received bytes and memory are compared with their limits once for each
@@ -13,7 +13,7 @@
 constexpr std::uint64_t EXTRA_BYTES = std::uint64_t{1} << 20; // of copies, or raw bytes, for any message
 constexpr std::uint64_t EXTRA_FACTOR = 8;                     // further ones for each byte of the message
 
-// The end of a received message ahead: nothing was counted yet.
+// Before a message is received: nothing is counted yet.
 void limits_reset(soap *ctx);
 
 // The message went beyond a limit of `value` bytes. `name` is a literal. SOAP_LENGTH, also in ctx->error.
@@ -54,9 +54,9 @@ inline void memory_charge(soap *ctx, std::size_t size)
     ctx->memory_held += static_cast<std::int64_t>(allocation_size(size));
 }
 
-// The same for the characters of a std::string with room for `room`, when it takes `length` of them.
-inline void text_charge(soap *ctx, std::size_t length, std::size_t room)
+// The same for the characters of a std::string of that capacity, when `length` of them are stored.
+inline void text_charge(soap *ctx, std::size_t length, std::size_t capacity)
 {
-    if (length > room)
+    if (length > capacity)
         memory_charge(ctx, length + 1);
 }

@@ -15,7 +15,7 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "core/failure.h"
-#include "identity/pointer_table.h"
+#include "identity/multiref.h"
 
 struct soap_pointer_block {
     soap_pointer_block *next;
@@ -449,7 +449,7 @@ int write_round(soap *ctx, soap_pointer_block **blocks, std::size_t count, std::
 
 } // namespace
 
-int soap_pointer_each_apart(soap *ctx, int (*write)(soap *, const soap_pointer_record &))
+int soap_multiref_each(soap *ctx, int (*write)(soap *, const soap_pointer_record &))
 {
     std::size_t count = 0;
     const std::size_t newest_used = ctx->pointer_block_used;

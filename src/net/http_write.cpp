@@ -28,7 +28,7 @@ constexpr const char *DEFAULT_REALM = "zuv Web Service";
 constexpr std::size_t HEAD_TEXT_LIMIT = 944; // characters; longer parts of a head are refused or left out
 constexpr std::size_t CREDENTIALS_LIMIT =
     761; // user and password together; what base64 can carry in one scratch text
-constexpr std::size_t ACTION_LIMIT = 1021; // characters; from here on the two quotes leave no room
+constexpr std::size_t ACTION_LIMIT = 1021; // characters; more don't fit between the two quotes
 constexpr std::size_t REALM_LIMIT = 1010;  // characters
 constexpr std::size_t VERSION_LIMIT = 5;   // characters of http_version
 
@@ -37,7 +37,7 @@ std::size_t length_of(const char *text)
     return text == nullptr ? 0 : std::strlen(text);
 }
 
-// A text put together in a fixed room; once it doesn't fit, it stays unfit.
+// A text composed in a buffer of fixed size; once something didn't fit, it stays marked as not fitting.
 struct bounded_text {
     char text[2 * SOAP_TEXT_SIZE];
     std::size_t length = 0;
@@ -238,7 +238,7 @@ int write_host(soap *ctx, const char *host, int port)
     return line(ctx, "Host", value.text);
 }
 
-// Credentials that don't fit are left out; no copy of them stays behind but in the buffer, on its way out.
+// Credentials that don't fit are left out; the only copy of them that remains is in the buffer, about to be sent.
 int write_credentials(soap *ctx, const char *key, const char *user, const char *password)
 {
     track_secret(ctx, user);

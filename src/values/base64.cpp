@@ -86,11 +86,11 @@ inline std::uint32_t quartet(const char *text)
 
 class decoder {
 public:
-    // Where the bytes go; `room` of them at most.
-    void set_target(unsigned char *target, std::size_t room)
+    // Where the bytes go; `capacity` of them at most.
+    void set_target(unsigned char *target, std::size_t capacity)
     {
         out = target;
-        out_end = target + room;
+        out_end = target + capacity;
     }
     const unsigned char *written() const { return out; }
     bool full() const { return out == out_end; }

@@ -16,8 +16,8 @@ constexpr std::size_t SHORT_NAME = 64;
 // that are names are UTF-8 though strings are Latin-1, until they have been applied.
 int xml_attributes_read(soap *ctx, bool *names_wide);
 
-// Sets the context's fields from the attributes that the engine itself understands, white space around them
-// apart. Clears the error.
+// Sets the context's fields from the attributes that the library itself understands, without the white space
+// around them. Clears the error.
 void xml_attributes_apply(soap *ctx, bool names_wide);
 
 // Reads a character of a name from 128 on, and appends it to the `kept` bytes of `name` if it fits.
@@ -39,8 +39,8 @@ template <template <bool> class Stop> std::size_t xml_name_read(soap *ctx, char 
             input_consume(ctx, stop);
             return found;
         }
-        const std::size_t room = SOAP_TEXT_SIZE - 1 - kept;
-        const std::size_t taken = found < room ? found : room;
+        const std::size_t space = SOAP_TEXT_SIZE - 1 - kept;
+        const std::size_t taken = found < space ? found : space;
         std::memcpy(name + kept, here, taken);
         kept += taken;
         input_consume(ctx, stop);

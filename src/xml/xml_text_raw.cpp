@@ -1,4 +1,4 @@
-// xml_text_raw.cpp - the content of an element as it stands: raw XML in a byte string.
+// xml_text_raw.cpp - the content of an element unchanged: raw XML in a byte string.
 //
 // Here: the states that tell text from CDATA sections, comments and instructions. Elsewhere: decoded text
 // (xml_text.cpp).
@@ -19,10 +19,10 @@ namespace {
 // Appends to scratch_text as long as two bytes stay free for the end of the tag.
 void append(soap *ctx, std::size_t *length, std::string_view text)
 {
-    const std::size_t room = SOAP_TEXT_SIZE - 3 - *length;
+    const std::size_t space = SOAP_TEXT_SIZE - 3 - *length;
     std::size_t taken = text.size();
-    if (taken > room)
-        taken = (ctx->mode & MODE_UTF_STRINGS) != 0 ? utf8_whole(text.data(), room) : room;
+    if (taken > space)
+        taken = (ctx->mode & MODE_UTF_STRINGS) != 0 ? utf8_whole(text.data(), space) : space;
     std::memcpy(ctx->scratch_text + *length, text.data(), taken);
     *length += taken;
 }
@@ -230,7 +230,7 @@ int put_raw(soap *ctx, raw_state state, std::int32_t byte)
     return put_token(ctx, soap_char_next_utf8(ctx));
 }
 
-// What stands after an "&" is copied, unless it is a number that stands for no character.
+// The text after an "&" is copied, unless it is the number of no character.
 int copy_reference(soap *ctx)
 {
     xml_reference reference;

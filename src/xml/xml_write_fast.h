@@ -3,7 +3,7 @@
 // Here: inline forms for callers that know a tag's length, such as generated code. Elsewhere: every case that
 // needs more than "<tag>" (xml_write.cpp), framing and hooks (soap_io.h), to which each short way falls back.
 //
-// Always: the bytes, the counts and the state left behind are those of the long way.
+// Always: the bytes, the counts and the state afterwards are those of the general path.
 #pragma once
 
 #include <cstddef>
@@ -26,7 +26,7 @@ inline bool xml_only_counts(const soap *ctx)
 }
 
 // Room for `length` bytes in the send buffer, which count as sent; the caller fills all of it at once. Null
-// if the bytes must go through soap_send_bytes: counting, unbuffered, filtered, or no room left.
+// if the bytes must go through soap_send_bytes: counting, unbuffered, filtered, or not enough space in the buffer.
 inline char *xml_reserve(soap *ctx, std::size_t length)
 {
     if ((ctx->mode & MODE_COUNTING) || (ctx->mode & MODE_IO_MASK) == MODE_DIRECT ||

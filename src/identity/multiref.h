@@ -1,4 +1,4 @@
-// pointer_table.h - the pointer table beyond soap_identity.h: entries known by value, and objects written
+// multiref.h - the pointer table beyond soap_identity.h: entries known by value, and objects written
 // after the one that refers to them (encoded SOAP 1.1).
 #pragma once
 
@@ -9,9 +9,10 @@ soap_pointer_record *soap_pointer_find_value(soap *ctx, std::uint32_t hash, int 
                                              bool (*same)(soap *ctx, const void *one, const void *other),
                                              const void *value);
 
-// Enters a value, which must stay as long as the table. Null with error 20.
+// Enters a value, which must stay as long as the table. Null with SOAP_OUT_OF_MEMORY.
 soap_pointer_record *soap_pointer_add_value(soap *ctx, std::uint32_t hash, int type, const void *value);
 
-// Calls `write` for each object of the pointer table that is to be written apart in this pass, in the order
-// of their numbers, until none is left: writing one may set others apart. 0, the error of `write`, or 20.
-int soap_pointer_each_apart(soap *ctx, int (*write)(soap *ctx, const soap_pointer_record &record));
+// Calls `write` for each object of the pointer table that this pass writes as a multi-reference element, in the
+// order of their numbers, until none is left: writing one may add others. SOAP_OK, the error of `write`, or
+// SOAP_OUT_OF_MEMORY.
+int soap_multiref_each(soap *ctx, int (*write)(soap *ctx, const soap_pointer_record &record));

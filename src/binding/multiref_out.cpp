@@ -1,10 +1,10 @@
-// put_finish.cpp - encoded SOAP 1.1: the objects that others refer to, written as elements of their own.
+// multiref_out.cpp - encoded SOAP 1.1: multi-reference elements, the objects that others refer to.
 #include <zuv_client_pro/soap_binary.h>
 #include <zuv_client_pro/soap_identity.h>
 #include <zuv_client_pro/soap_registry.h>
 
 #include "binding/registry.h"
-#include "identity/pointer_table.h"
+#include "identity/multiref.h"
 
 namespace binding {
 
@@ -21,7 +21,7 @@ void *object_of(const soap_pointer_record &record)
     return const_cast<char *>(static_cast<const char *>(record.array) - offset);
 }
 
-int write_apart(soap *ctx, const soap_pointer_record &record)
+int write_multiref(soap *ctx, const soap_pointer_record &record)
 {
     return soap_write_element(ctx, object_of(record), nullptr, record.id, record.type);
 }
@@ -35,5 +35,5 @@ int soap_put_finish(soap *ctx)
     const bool encoded = ctx->soap_version == 1 && ctx->encoding_style != nullptr;
     if (!encoded || (ctx->mode & (SOAP_XML_TREE | SOAP_XML_GRAPH)))
         return 0;
-    return soap_pointer_each_apart(ctx, &binding::write_apart);
+    return soap_multiref_each(ctx, &binding::write_multiref);
 }
