@@ -116,7 +116,7 @@ void attachment_files::prepare(soap *ctx)
         return of(c).write(c, *static_cast<incoming *>(handle), data, length);
     };
     ctx->mime_write_close = ctx->dime_write_close = [](soap *c, void *handle) {
-        of(c).end_writing(*static_cast<incoming *>(handle));
+        of(c).end_writing(c, *static_cast<incoming *>(handle));
     };
 }
 
@@ -168,9 +168,10 @@ void *attachment_files::begin_writing(soap *ctx, const char *id, const char *typ
     incoming &one = in_.emplace_back();
     one.path = (std::filesystem::path(folder_) / file_name(++count_, id)).string();
     one.description = printable(type == nullptr || *type == '\0' ? "no type given" : type);
-    one.file.reset(std::fopen(one.path.c_str(), "wb"));
-    if (!one.file) {
-        problem_ = one.path + ": can't be opened: " + reason();
+    try {
+        one.file = std::make_unique<replaced_file>(one.path);
+    } catch (const failure &problem) { // not through the library, which throws nothing
+        problem_ = problem.what();
         ctx->error = SOAP_USER_ERROR;
         return nullptr;
     }
@@ -180,7 +181,7 @@ void *attachment_files::begin_writing(soap *ctx, const char *id, const char *typ
 
 int attachment_files::write(soap *ctx, incoming &to, const char *data, std::size_t length)
 {
-    if (std::fwrite(data, 1, length, to.file.get()) != length) {
+    if (std::fwrite(data, 1, length, to.file->stream()) != length) {
         problem_ = to.path + ": can't be written: " + reason();
         return ctx->error = SOAP_USER_ERROR;
     }
@@ -189,18 +190,26 @@ int attachment_files::write(soap *ctx, incoming &to, const char *data, std::size
     return SOAP_OK;
 }
 
-void attachment_files::end_writing(incoming &to)
+// An attachment that was cut off leaves no file.
+void attachment_files::end_writing(const soap *ctx, incoming &to)
 {
     to.shown.reset();
-    if (std::fclose(to.file.release()) != 0)
-        problem_ = to.path + ": can't be written: " + reason();
+    try {
+        if (ctx->error == SOAP_OK) {
+            to.file->commit();
+            to.complete = true;
+        }
+    } catch (const failure &problem) {
+        problem_ = problem.what();
+    }
+    to.file.reset();
 }
 
 std::vector<std::string> attachment_files::saved()
 {
     std::vector<std::string> lines;
     for (const incoming &one : in_)
-        if (!one.file)
+        if (one.complete)
             lines.push_back(one.path + ": " + size_words(one.size) + ", " + one.description);
     in_.clear();
     return lines;

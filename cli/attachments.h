@@ -11,6 +11,7 @@
 
 #include "call_options.h"
 #include "progress.h"
+#include "replaced_file.h"
 
 namespace cli {
 
@@ -49,14 +50,15 @@ private:
     struct incoming {
         std::string path, description;
         unsigned long long size = 0;
-        file_handle file;
+        bool complete = false;
+        std::unique_ptr<replaced_file> file;
         std::unique_ptr<progress> shown;
     };
     void *begin_reading(soap *ctx, const void *handle);
     std::size_t read(outgoing &from, char *buffer, std::size_t length);
     void *begin_writing(soap *ctx, const char *id, const char *type);
     int write(soap *ctx, incoming &to, const char *data, std::size_t length);
-    void end_writing(incoming &to);
+    void end_writing(const soap *ctx, incoming &to);
     static attachment_files &of(soap *ctx) { return *static_cast<attachment_files *>(ctx->user); }
 
     std::list<outgoing> out_; // stable addresses: the engine holds them as handles

@@ -46,7 +46,8 @@ void connection_options::declare(CLI::App &app)
         ->capture_default_str()
         ->type_name("SECONDS")
         ->group("Connection");
-    app.add_option("--trace", trace_file, "Append what goes over the wire to this file; see zuv trace")
+    app.add_option("--trace", trace_file,
+                   "Append what goes over the wire to this file, \"-\" for standard output; see zuv trace")
         ->type_name("FILE")
         ->group("Output");
     app.add_flag("-q,--quiet", quiet, "Show no progress")->group("Output");
@@ -92,7 +93,7 @@ void message_options::declare(CLI::App &app)
     app.add_flag("--gzip", gzip, "Compress the request")->group("Message");
     app.add_flag("--chunked", chunked, "Send the request in chunks")->group("Message");
     app.add_flag("--keep-alive", keep_alive, "Keep the connection from call to call")->group("Message");
-    app.add_option("--repeat", repeat, "Make the call this often, and tell how long the calls took")
+    app.add_option("--repeat", repeat, "Make the call this often, and print how long the calls took")
         ->check(CLI::Range(1U, 100000000U))
         ->type_name("N")
         ->group("Message");

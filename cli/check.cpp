@@ -41,7 +41,8 @@ public:
             check_message(root);
         else if (result_.type == nullptr)
             note(root, "<" + std::string(root.name()) +
-                           "> is neither a class of the contract nor the request or answer of an operation");
+                           "> is neither a class of the contract nor the request or answer of an operation" +
+                           missing_namespace(root));
         else
             check_class_content(root, *result_.type, 1);
         scope_.leave();
@@ -59,6 +60,17 @@ private:
         return found == nullptr ? nullptr
                                 : contract::find_class(soap_type_name(is_request ? found->request_type
                                                                                  : found->response_type));
+    }
+
+    // For a root element that lacks nothing but its namespace: what it might be.
+    static std::string missing_namespace(const pugi::xml_node &root)
+    {
+        if (std::strchr(root.name(), ':') != nullptr || root.attribute("xmlns"))
+            return "";
+        std::string names;
+        for (const contract::data_class *type : contract::classes_meant(root.name()))
+            names += (names.empty() ? "" : " or ") + std::string(type->name);
+        return names.empty() ? "" : ": it has no namespace (xmlns), " + names + " has";
     }
 
     void note(std::ptrdiff_t offset, const std::string &text)

@@ -1,9 +1,13 @@
 // connection.cpp - see connection.h.
 #include "connection.h"
 
+#include <cerrno>
 #include <charconv>
 #include <cmath>
 #include <cstdlib>
+#include <system_error>
+
+#include <unistd.h>
 
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_log.h>
@@ -41,6 +45,14 @@ int limit_of(double seconds)
     return -std::max(1, static_cast<int>(seconds * 1e6));
 }
 
+// OpenSSL tells neither which file it couldn't read nor why.
+void require_readable(const char *option, const std::string &path)
+{
+    if (!path.empty() && access(path.c_str(), R_OK) != 0)
+        throw failure(EXIT_FILE, std::string(option) + ": " + printable(path) + ": " +
+                                     std::generic_category().message(errno));
+}
+
 void split_proxy(const std::string &proxy, std::string &host, int &port)
 {
     const std::size_t colon = proxy.rfind(':');
@@ -74,8 +86,8 @@ void connection::prepare(soap *ctx) const
         ctx->proxy_user = options_.proxy_user.c_str();
         ctx->proxy_password = proxy_password_.c_str();
     }
-    if (soap_log_set_received(ctx, text_or_null(options_.trace_file)) != SOAP_OK ||
-        soap_log_set_sent(ctx, text_or_null(options_.trace_file)) != SOAP_OK)
+    const char *const trace = options_.trace_file == "-" ? "/dev/stdout" : text_or_null(options_.trace_file);
+    if (soap_log_set_received(ctx, trace) != SOAP_OK || soap_log_set_sent(ctx, trace) != SOAP_OK)
         throw std::bad_alloc();
     prepare_tls(ctx);
 }
@@ -83,6 +95,10 @@ void connection::prepare(soap *ctx) const
 // The peer is checked by the library's rules, except for the host name, which is checked strictly here.
 void connection::prepare_tls(soap *ctx) const
 {
+    require_readable("--ca-file", options_.ca_file);
+    require_readable("--ca-path", options_.ca_path);
+    require_readable("--crl-file", options_.crl_file);
+    require_readable("--key-file", options_.key_file);
     unsigned flags = TLS_VERIFY_PEER | TLS_NO_SSLV3 | TLS_NO_TLSV1;
     flags |= options_.no_host_check ? TLS_SKIP_HOST_CHECK : TLS_STRICT_HOST_CHECK;
     if (options_.allow_expired)

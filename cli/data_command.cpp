@@ -7,6 +7,7 @@
 #include <filesystem>
 #include <limits>
 #include <memory>
+#include <optional>
 #include <system_error>
 #include <utility>
 
@@ -20,6 +21,7 @@
 #include "failure.h"
 #include "fault_report.h"
 #include "progress.h"
+#include "replaced_file.h"
 #include "text_files.h"
 
 namespace cli {
@@ -45,14 +47,16 @@ public:
 
     exit_code fetch()
     {
-        const file_handle opened(options_.file == "-" ? nullptr : std::fopen(options_.file.c_str(), "wb"));
-        std::FILE *const file = options_.file == "-" ? stdout : opened.get();
-        if (file == nullptr)
-            fail_file("can't be opened");
+        std::optional<replaced_file> replaced;
+        if (options_.file != "-")
+            replaced.emplace(options_.file);
         soap *const ctx = context_.get();
-        if (begin(STATUS_GET, 0) != SOAP_OK || soap_receive_begin(ctx) != SOAP_OK)
-            return finish("data get", ctx->status == HTTP_OK && ctx->error == SOAP_NO_DATA);
-        return finish("data get", receive_into(file));
+        const bool begun = begin(STATUS_GET, 0) == SOAP_OK && soap_receive_begin(ctx) == SOAP_OK;
+        const bool whole = begun ? receive_into(replaced ? replaced->stream() : stdout)
+                                 : ctx->status == HTTP_OK && ctx->error == SOAP_NO_DATA;
+        if (whole && replaced)
+            replaced->commit();
+        return finish("data get", whole);
     }
 
     exit_code deliver()

@@ -110,6 +110,30 @@ std::string text_of(const char *text)
     return text == nullptr ? "" : printable(std::string_view(text).substr(0, RAW_DETAIL_MAX));
 }
 
+// The first element of a local name below another, or an empty node.
+pugi::xml_node descendant(const pugi::xml_node &of, std::string_view name)
+{
+    return of.find_node(
+        [name](const pugi::xml_node &node) { return contract::local_name(node.name()) == name; });
+}
+
+// What an HTTP server sent with an error status: the code and text of a SOAP fault, or the page's title, rather than
+// markup.
+std::string page_words(const char *page)
+{
+    pugi::xml_document document;
+    if (page == nullptr || !document.load_string(page))
+        return text_of(page);
+    if (const pugi::xml_node fault = descendant(document, "Fault")) {
+        const pugi::xml_node code = descendant(fault, "faultcode"), value = descendant(fault, "Value"),
+                             text = descendant(fault, "faultstring"), reason = descendant(fault, "Text");
+        return text_of((text ? text : reason).text().get()) + " (" +
+               text_of((code ? code : value).text().get()) + ")";
+    }
+    const pugi::xml_node title = descendant(document, "title");
+    return text_of(title ? title.text().get() : page);
+}
+
 bool has_record(const soap *ctx)
 {
     return ctx->fault != nullptr;
@@ -171,7 +195,8 @@ std::string fault_report(soap *ctx, const std::string &what, const std::string &
         lines.add("moved to", printable(ctx->endpoint));
     for (const typed_fault &fault : faults)
         lines.add_all("detail", detail_lines(fault));
-    lines.add("detail", text_of(soap_fault_detail_value(ctx)));
+    const char *const detail = soap_fault_detail_value(ctx);
+    lines.add("detail", kind == EXIT_HTTP ? page_words(detail) : text_of(detail));
     if (advice == nullptr && !faults.empty())
         advice = advice_for(faults.front().name);
     if (advice == nullptr)

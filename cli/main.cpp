@@ -18,6 +18,7 @@
 #include "completion.h"
 #include "data_command.h"
 #include "failure.h"
+#include "nearest.h"
 #include "new_command.h"
 #include "trace_command.h"
 
@@ -143,8 +144,15 @@ int run(int argc, char **argv)
     }
     try {
         app.parse(argc, argv);
+    } catch (const CLI::Success &asked_for_help) {
+        return app.exit(asked_for_help);
     } catch (const CLI::ParseError &error) {
-        return app.exit(error) == 0 ? EXIT_DONE : EXIT_USAGE;
+        const std::string unknown = misspelled(app, std::vector<std::string>(argv + 1, argv + argc));
+        if (unknown.empty())
+            app.exit(error);
+        else
+            std::fprintf(stderr, "zuv: %s\nRun with --help for more information.\n", unknown.c_str());
+        return EXIT_USAGE;
     }
     return chosen();
 }

@@ -6,9 +6,11 @@
 #include <cstdio>
 #include <cstring>
 #include <memory>
+#include <optional>
 #include <system_error>
 
 #include "failure.h"
+#include "replaced_file.h"
 
 namespace cli {
 
@@ -90,15 +92,14 @@ std::string read_secret(const std::string &path)
 
 void write_file(const std::string &path, std::string_view bytes)
 {
-    const bool standard = path == "-";
-    open_file opened(standard ? nullptr : std::fopen(path.c_str(), "wb"));
-    std::FILE *const file = standard ? stdout : opened.get();
-    if (file == nullptr)
-        fail(path, "can't be opened");
+    std::optional<replaced_file> replaced;
+    if (path != "-")
+        replaced.emplace(path);
+    std::FILE *const file = replaced ? replaced->stream() : stdout;
     if (std::fwrite(bytes.data(), 1, bytes.size(), file) != bytes.size() || std::fflush(file) != 0)
-        fail(standard ? "standard output" : path, "can't be written");
-    if (!standard && std::fclose(opened.release()) != 0)
-        fail(path, "can't be written");
+        fail(replaced ? path : "standard output", "can't be written");
+    if (replaced)
+        replaced->commit();
 }
 
 std::string printable(std::string_view text, bool lines)

@@ -12,7 +12,7 @@ std::string read_file(const std::string &path);
 // The first line of a file, without its end: a password. failure with EXIT_FILE.
 std::string read_secret(const std::string &path);
 
-// Writes a file, replacing one that exists; "-" is standard output. failure with EXIT_FILE.
+// Writes a file, replacing one that exists once all is written; "-" is standard output. failure with EXIT_FILE.
 void write_file(const std::string &path, std::string_view bytes);
 
 // Foreign text without what could control a terminal: control characters become "?", broken UTF-8 too.

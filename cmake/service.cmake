@@ -11,6 +11,7 @@ target_link_libraries(zuv_service_parts PUBLIC zuv_objects SQLite::SQLite3 Threa
 add_dependencies(zuv_service_parts zuv_generated)
 
 add_executable(zuv-service ${PROJECT_SOURCE_DIR}/service/main.cpp)
+target_compile_definitions(zuv-service PRIVATE ZUV_VERSION="${PROJECT_VERSION}")
 target_link_libraries(zuv-service PRIVATE zuv_service_parts CLI11::CLI11 zuv_flags zuv_hardening)
 
 if(ZUV_BUILD_TESTS) # of its parts; those of the program are run with those of the command line

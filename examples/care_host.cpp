@@ -191,7 +191,7 @@ void report_status(const host_options &options, machine &array)
     using state = protocolStatusReport__StatusReportState;
     port<proxy> status("StatusReport", options);
 
-    // Why the report is made is told by the reason's class.
+    // Why the report is made is expressed by the reason's class.
     std::string when = "2024-02-29T12:00:00Z";
     protocolStatusReport__Reason_x002eEvent_x002eConfiguration_x002eChanged reason;
     reason.occurrenceDateTime = &when;

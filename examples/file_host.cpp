@@ -3,8 +3,8 @@
 //
 // Usage: file_host [--mtom | --mime | --dime] [--chunked] SERVICE FILE COPY, SERVICE being
 // "http://HOST:PORT".
-//   --mtom, --mime, --dime  the form of the messages; MTOM unless told otherwise
-//   --chunked               the size isn't told beforehand, as for data that is made while it is sent
+//   --mtom, --mime, --dime  the form of the messages; MTOM unless given otherwise
+//   --chunked               the size isn't known beforehand, as for data that is made while it is sent
 // No trace file is written.
 //
 // Who owns what: the host its files, whose addresses are the handles of the attachments; the library hands
@@ -167,7 +167,7 @@ struct form {
             soap_mime_start(ctx, nullptr, nullptr);
     }
 
-    // The id is told in the XML as "cid:file". A stream of length 0 is one of unknown length, so an empty
+    // The XML refers to it by the id "cid:file". A stream of length 0 is one of unknown length, so an empty
     // file goes without one.
     void attach(soap *ctx, transfer &source, std::size_t file_size) const
     {

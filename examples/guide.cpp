@@ -2,13 +2,14 @@
 //
 // Usage: guide ENDPOINT, the Profile port of a service. Each function is one section of the guide; the
 // guide's blocks stand here word for word. Ends with 1 at the first call that goes another way than the guide
-// tells.
+// says.
 #include <chrono>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <string>
 #include <thread>
+#include <utility>
 #include <vector>
 
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
@@ -43,7 +44,7 @@ std::string make_profile()
     profile.identity = &identity;
     __protocolProfile__createResponse created;
     expect(proxy.create(&profile, created) == 0, "a profile is created");
-    return created.result->thisURI.at(0);
+    return created.result && !created.result->thisURI.empty() ? created.result->thisURI[0] : "";
 }
 
 void life_of_a_proxy(std::string uri)
@@ -55,8 +56,10 @@ void life_of_a_proxy(std::string uri)
         proxy.soap_header(&header); // for the next call only
         _protocolProfile__getRequest request;
         __protocolProfile__getResponse response;
-        if (proxy.get(&request, response) == 0)
-            std::printf("%s\n", response.result->identity->name->c_str());
+        const int error = proxy.get(&request, response);
+        const auto *profile = error == 0 ? response.result : nullptr;
+        if (profile && profile->identity && profile->identity->name) // whatever is optional may be null
+            std::printf("%s\n", profile->identity->name->c_str());
         proxy.destroy(); // response.result is gone; the connection is not
     }
     expect(proxy.error == 0, "three calls are answered");
@@ -72,11 +75,13 @@ void ownership(std::string uri)
     __protocolProfile__getResponse response;
     expect(proxy.get(&request, response) == 0, "the profile is there");
 
-    std::string *name = response.result->identity->name;
+    std::string *name = nullptr;
+    if (response.result && response.result->identity)
+        std::swap(name, response.result->identity->name);
     soap_block_unlink(&proxy, name); // from here on it is ours
-    response.result->identity->name = nullptr;
     proxy.destroy();
-    std::printf("still here: %s\n", name->c_str());
+    if (name)
+        std::printf("still here: %s\n", name->c_str());
     delete name;
 }
 
@@ -116,7 +121,7 @@ void errors_and_faults()
     case SOAP_FAULT:        // a fault with another code
         if (const SOAP_ENV__Fault *fault = proxy.soap_fault(); fault != nullptr && fault->detail != nullptr) {
             if (const auto *missing = fault->detail->Client_x002eObjectNotFound)
-                std::printf("not found: %s\n", missing->uri.at(0).c_str());
+                std::printf("not found: %s\n", missing->uri.empty() ? "" : missing->uri[0].c_str());
         }
         std::printf("the service: %s\n", proxy.soap_fault_string());
         break;

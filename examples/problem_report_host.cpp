@@ -112,7 +112,7 @@ private:
 
     void submit()
     {
-        // An action is told by its class, which goes along as xsi:type.
+        // The kind of an action is its class, which goes along as xsi:type.
         std::string title = "Z database stops", what = "It ends with a deadlock, once a day.", severity = "2";
         std::string tried = "Restarted it.", product = "ZDB";
         protocolProblemReport__Action_x002eReboot action;

@@ -1,5 +1,5 @@
 #!/usr/bin/env python3
-"""Checks that the layers of src/ depend on each other as told here, by what is included and by what is linked.
+"""Checks that the layers of src/ depend on each other as listed here, by what is included and by what is linked.
 
 Usage: script/layers.py [BUILD]    BUILD: a build with the objects of the library; build/release without argument.
 Exit status 1 if a layer uses one that it may not; each line names both ends.

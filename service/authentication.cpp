@@ -54,11 +54,11 @@ protocol__Credentials *without_secret(call &c, const protocol__Credentials *give
 {
     if (given == nullptr)
         return nullptr;
-    auto *const told = make<protocol__Credentials>(c.ctx);
-    told->username = given->username;
-    told->state =
+    auto *const result = make<protocol__Credentials>(c.ctx);
+    result->username = given->username;
+    result->state =
         make_value(c.ctx, good ? protocol__CredentialsState::valid : protocol__CredentialsState::invalid);
-    return told;
+    return result;
 }
 
 // `left`: bytes that the answers may still take.

@@ -141,15 +141,16 @@ void enclosures::end_decoding(soap *ctx, arriving_part &part)
         refuse_encoding(ctx, *part.decoder);
         return;
     }
-    soap_attachment &told = *ctx->mime.last;
-    told.encoding = MIME_BINARY;
+    soap_attachment &attachment = *ctx->mime.last;
+    attachment.encoding = MIME_BINARY;
     if (part.file) {
         part.file->write(part.memory.data(), part.memory.size());
-        told.size = static_cast<std::size_t>(part.file->size());
+        attachment.size = static_cast<std::size_t>(part.file->size());
         return;
     }
-    told.size = part.memory.size();
-    told.content = soap_string_dup_n(ctx, part.memory.data(), part.memory.size()); // null: out of memory
+    attachment.size = part.memory.size();
+    attachment.content =
+        soap_string_dup_n(ctx, part.memory.data(), part.memory.size()); // null: out of memory
     part.memory = std::string();
 }
 

@@ -219,13 +219,13 @@ protocol__Server_x002eDataTooLarge *too_large(soap *ctx, const char *text, std::
 }
 
 // The answer could not be sent. Where counting found it too large nothing has been sent yet, and the client
-// can be told.
+// gets a fault.
 void answer_unsent(soap *ctx)
 {
-    const bool told = ctx->exceeded != nullptr && (ctx->mode & MODE_COUNTING) != 0;
+    const bool was_counting = ctx->exceeded != nullptr && (ctx->mode & MODE_COUNTING) != 0;
     const std::uint64_t limit = ctx->exceeded_value;
     ctx->keep_alive = 0;
-    if (!told)
+    if (!was_counting)
         return;
     ctx->error = SOAP_OK;
     answer_refusal(ctx, {too_large(ctx, "The answer is larger than the service sends.", limit),

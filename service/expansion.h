@@ -38,7 +38,7 @@ bool names_updates(const protocolUpdateOrder__UpdateOrderContent &order);
 expansion expand(filter_work &work, const catalogue &offered,
                  const protocolUpdateOrder__UpdateOrderContent &order);
 
-// What the data of updates is told as.
+// How the data of updates is answered.
 const protocol__Attachment &update_package();
 
 } // namespace service

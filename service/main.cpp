@@ -16,14 +16,18 @@
 #include <zuv_client_pro/soap_log.h>
 
 #include "catalogue.h"
+#include "port.h"
 #include "server.h"
 
 namespace {
+
+constexpr int WRONG_USAGE = 2; // exit status
 
 struct options {
     service::settings config;
     std::vector<std::string> accounts; // "user:password"
     std::string port_file;             // gets the port once the service listens
+    bool json = false;                 // announce the service's addresses as JSON
 };
 
 void declare(CLI::App &app, options &o)
@@ -45,6 +49,7 @@ void declare(CLI::App &app, options &o)
     app.add_flag("--chunked", s.chunked, "Send answers in chunks");
     app.add_option("--trace", s.trace, "File that takes a copy of all bytes received and sent");
     app.add_option("--port-file", o.port_file, "File that takes the port once the service listens");
+    app.add_flag("--json", o.json, "Print the addresses of the ports as one line of JSON, in place of words");
     app.add_option("--max-body", s.body_limit, "Largest request, in bytes")->capture_default_str();
     app.add_option("--max-attachments", s.attachment_limit, "Largest attachments of a request, in bytes")
         ->capture_default_str();
@@ -100,13 +105,30 @@ void write_port_file(const std::string &path, int port)
     std::filesystem::rename(unfinished, path);
 }
 
+// For scripts: one line, before the first request is taken.
+void print_json(const std::string &address, int port)
+{
+    std::string ports;
+    for (const service::port *one : service::all_ports()) {
+        const std::string name(one->name);
+        ports += (ports.empty() ? "\"" : ", \"") + name + "\": \"" + address +
+                 std::string(service::SERVICES_PATH) + name + "\"";
+    }
+    std::printf("{\"address\": \"%s\", \"port\": %d, \"ports\": {%s}}\n", address.c_str(), port,
+                ports.c_str());
+}
+
 void announce(const options &o, int port)
 {
     if (!o.port_file.empty())
         write_port_file(o.port_file, port);
     const bool v6 = o.config.host.find(':') != std::string::npos;
-    std::printf(v6 ? "listening on http://[%s]:%d\n" : "listening on http://%s:%d\n", o.config.host.c_str(),
-                port);
+    const std::string address =
+        "http://" + (v6 ? "[" + o.config.host + "]" : o.config.host) + ":" + std::to_string(port);
+    if (o.json)
+        print_json(address, port);
+    else
+        std::printf("listening on %s\n", address.c_str());
     std::fflush(stdout);
 }
 
@@ -137,8 +159,13 @@ int run(int argc, char **argv)
                 SIG_IGN); // a file at its limit is refused, as by a full disk, and the program goes on
     CLI::App app("zuv-service: the reference service of the zuv protocol");
     options o;
+    app.set_version_flag("--version", "zuv-service " ZUV_VERSION);
     declare(app, o);
-    CLI11_PARSE(app, argc, argv);
+    try {
+        app.parse(argc, argv);
+    } catch (const CLI::ParseError &error) {
+        return app.exit(error) == 0 ? 0 : WRONG_USAGE;
+    }
     split_accounts(o);
     service::the_catalogue(); // read now, while there is only one thread
     serve_until_signal(o);

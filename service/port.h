@@ -23,8 +23,8 @@ namespace service {
 // What a request may still make the service do, however small it is itself.
 struct request_work {
     filter_work filters;
-    std::uint64_t read = 256ULL << 20; // bytes of documents that queries look through
-    std::uint64_t told = 16ULL << 20;  // bytes of documents in their answers
+    std::uint64_t read = 256ULL << 20;    // bytes of documents that queries look through
+    std::uint64_t answered = 16ULL << 20; // bytes of documents in their answers
 };
 
 // What a handler works with. Requests and answers belong to the context `ctx`, documents read from the store

@@ -73,7 +73,7 @@ protocol__QueryResponse *query_reports(call &c, const protocolProblemReport__Que
         spend(c, c.work.read, xml.size(),
               "There are more reports than the queries of one request look through.");
         if (report_passes(c, request.inclusionFilter, xml)) {
-            spend(c, c.work.told, xml.size(), "The reports that pass are too large for one answer.");
+            spend(c, c.work.answered, xml.size(), "The reports that pass are too large for one answer.");
             add_report(c, response->problemReport, c.codec.read<report>(xml));
         }
         return true;
@@ -111,13 +111,13 @@ protocol__QueryResponse *query_subjects(call &c, const protocol__QueryRecognized
 protocol__QueryResponse *query_languages(call &c, const protocol__QueryRecognizedLanguagesRequest &request)
 {
     auto *const response = make<protocol__QueryRecognizedLanguagesResponse>(c.ctx);
-    std::set<std::string> told;
+    std::set<std::string> seen;
     for (const update_record *update : the_catalogue().all()) {
         for (protocol__LanguageDetail *detail : update->languageDetail) {
             update_record judged;
             judged.languageDetail.push_back(detail);
             if (!passes(request.inclusionFilter, facts_of(c.work.filters, judged)) ||
-                !told.insert(detail->language->value).second)
+                !seen.insert(detail->language->value).second)
                 continue;
             auto *const language = make<protocol__RecognizedLanguage>(c.ctx);
             language->language = detail->language;
@@ -174,9 +174,9 @@ query_attributes(call &c, const protocolUpdateOrder__QueryRecognizedAttributesRe
             judged.attribute.push_back(known);
             if (!passes(request.inclusionFilter, facts_of(c.work.filters, judged)))
                 continue;
-            auto *const told = make<protocolUpdateOrder__RecognizedAttribute>(c.ctx);
-            told->attribute = known;
-            response->recognizedAttribute.push_back(told);
+            auto *const entry = make<protocolUpdateOrder__RecognizedAttribute>(c.ctx);
+            entry->attribute = known;
+            response->recognizedAttribute.push_back(entry);
         }
     }
     return response;

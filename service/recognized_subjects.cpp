@@ -76,8 +76,8 @@ public:
     {
         std::vector<collection *> listed;
         for (const collection_row &row : collections())
-            if (collection *const told = tell(row); told != nullptr && !pruned(*told))
-                listed.push_back(told);
+            if (collection *const described = describe(row); described != nullptr && !pruned(*described))
+                listed.push_back(described);
         return listed;
     }
 
@@ -99,19 +99,20 @@ public:
 private:
     void add_branch(const collection_row &row, std::vector<collection *> &place)
     {
-        collection *const told = tell(row);
-        std::vector<collection *> &below = told == nullptr ? place : told->recognizedProductCollection;
+        collection *const described = describe(row);
+        std::vector<collection *> &below =
+            described == nullptr ? place : described->recognizedProductCollection;
         for (const collection_row &child : collections())
             if (child.parent == row.id)
                 add_branch(child, below);
-        if (told != nullptr && !pruned(*told))
-            place.push_back(told);
+        if (described != nullptr && !pruned(*described))
+            place.push_back(described);
     }
 
-    bool pruned(const collection &told) const
+    bool pruned(const collection &described) const
     {
         return is_true(request_.recursivelyPruneEmptyProductCollectionLeaves) &&
-               told.recognizedProductCollection.empty() && !has_subjects(*told.productCollection);
+               described.recognizedProductCollection.empty() && !has_subjects(*described.productCollection);
     }
 
     bool has_subjects(const std::string &id) const
@@ -123,7 +124,7 @@ private:
     }
 
     // Null if the collection doesn't pass the filter.
-    collection *tell(const collection_row &row)
+    collection *describe(const collection_row &row)
     {
         std::string id(row.id), name(row.name);
         protocol__Identity judged;
@@ -131,23 +132,23 @@ private:
         judged.productCollectionName = &name;
         if (!subject_passes(work_, request_.productCollectionInclusionFilter, judged))
             return nullptr;
-        auto *const told = make<collection>(ctx_);
-        told->productCollection = make_text(ctx_, id);
-        told->productCollectionName = make_text(ctx_, name);
+        auto *const described = make<collection>(ctx_);
+        described->productCollection = make_text(ctx_, id);
+        described->productCollectionName = make_text(ctx_, name);
         if (is_true(request_.includeSubjects))
-            tell_subjects(*told);
-        return told;
+            add_subjects(*described);
+        return described;
     }
 
-    void tell_subjects(collection &told)
+    void add_subjects(collection &described)
     {
         auto *const meta = make<protocolUpdateOrder__RecognizedProductCollectionMetaData>(ctx_);
         for (const protocol__Identity *subject : subjects_)
-            if (text_of(subject->productCollection) == *told.productCollection &&
+            if (text_of(subject->productCollection) == *described.productCollection &&
                 subject_passes(work_, request_.subjectInclusionFilter, *subject))
                 meta->recognizedSubject.push_back(recognized(ctx_, *subject, wanted_));
         if (!meta->recognizedSubject.empty())
-            told.recognizedProductCollectionMetaData = meta;
+            described.recognizedProductCollectionMetaData = meta;
     }
 
     soap *ctx_;
@@ -193,15 +194,15 @@ bool subject_passes(filter_work &work, const protocol__Filter *filter, const pro
 protocol__RecognizedSubject *recognized(soap *ctx, const protocol__Identity &subject,
                                         const subject_properties &wanted)
 {
-    auto *const told = make<protocol__RecognizedSubject>(ctx);
+    auto *const described = make<protocol__RecognizedSubject>(ctx);
     if (wanted.empty())
-        static_cast<protocol__Identity &>(*told) = subject;
+        static_cast<protocol__Identity &>(*described) = subject;
     else
         for (const property each : wanted)
-            copy_property(ctx, each, subject, *told);
-    told->soap = ctx;
-    told->authorized = make_value(ctx, true);
-    return told;
+            copy_property(ctx, each, subject, *described);
+    described->soap = ctx;
+    described->authorized = make_value(ctx, true);
+    return described;
 }
 
 protocol__QueryResponse *query_collections(call &c, const collection_query &request)

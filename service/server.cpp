@@ -8,6 +8,7 @@
 
 #include <sys/socket.h>
 
+#include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_log.h>
 #include <zuv_client_pro/soap_tcp.h>
@@ -31,10 +32,12 @@ std::uint32_t mode_of(const settings &config)
     return config.indent ? mode | MODE_INDENT : mode;
 }
 
-std::string error_text(soap *ctx)
+// Why listening failed, in the system's words where they are known.
+std::string listen_failure(soap *ctx, const settings &config)
 {
-    char text[512] = "";
-    return soap_fault_print_text(ctx, text, sizeof text);
+    const char *const text = *soap_fault_string_field(ctx);
+    return "can't listen on " + config.host + " port " + std::to_string(config.port) + ": " +
+           (text == nullptr ? "error " + std::to_string(ctx->error) : text);
 }
 
 } // namespace
@@ -57,7 +60,7 @@ server::server(const settings &config, database &place)
         soap_log_set_sent(&master_, config.trace.c_str());
     }
     if (soap_bind(&master_, config.host.c_str(), config.port, BACKLOG) < 0)
-        throw std::runtime_error(error_text(&master_));
+        throw std::runtime_error(listen_failure(&master_, config));
     port_ = port_of(master_.master_socket);
 }
 

@@ -41,12 +41,12 @@ template <class T> T *copy_of(call &c, const T &original)
 // The record of an update, with the parts that the order asks for.
 update_record *meta_data_for(call &c, const order &o, const update_record &update)
 {
-    update_record *const told = copy_of(c, update);
+    update_record *const answered = copy_of(c, update);
     if (!is_true(o.includeCorrected))
-        told->corrected.clear();
+        answered->corrected.clear();
     if (o.includeOperatingPlatforms && is_true(o.includeFixableComponents))
-        return told;
-    for (protocol__Identity *&subject : told->subject) {
+        return answered;
+    for (protocol__Identity *&subject : answered->subject) {
         subject = copy_of(c, *subject);
         if (!o.includeOperatingPlatforms)
             subject->operatingPlatform = nullptr;
@@ -54,7 +54,7 @@ update_record *meta_data_for(call &c, const order &o, const update_record &updat
             subject->fixableComponent = subject->fixableComponentName = subject->fixableComponentVersion =
                 nullptr;
     }
-    return told;
+    return answered;
 }
 
 void list_chosen(call &c, order &o, const update_record &update)
@@ -62,26 +62,26 @@ void list_chosen(call &c, order &o, const update_record &update)
     o.updateIdExpansion.push_back(text_of(update.updateId));
     if (!o.includeUpdateIdExpansionDetail)
         return;
-    auto *const told = make<detail>(c.ctx);
-    told->updateId = update.updateId;
-    told->updateIdQualifier = update.updateIdQualifier;
+    auto *const answered = make<detail>(c.ctx);
+    answered->updateId = update.updateId;
+    answered->updateIdQualifier = update.updateIdQualifier;
     if (o.includeMetaData)
-        told->metaData.push_back(meta_data_for(c, o, update));
-    o.updateIdExpansionDetail.push_back(told);
+        answered->metaData.push_back(meta_data_for(c, o, update));
+    o.updateIdExpansionDetail.push_back(answered);
 }
 
 // An unknown update is listed even if no details are wanted: it is why the order is not complete.
 void list_unknown(call &c, order &o, const unknown_update &unknown)
 {
-    auto *const told = make<detail>(c.ctx);
-    told->updateId = make_text(c.ctx, unknown.id);
+    auto *const answered = make<detail>(c.ctx);
+    answered->updateId = make_text(c.ctx, unknown.id);
     if (!unknown.qualifier.empty())
-        told->updateIdQualifier = make_text(c.ctx, unknown.qualifier);
+        answered->updateIdQualifier = make_text(c.ctx, unknown.qualifier);
     auto *const fault = make_fault<protocol__Client_x002eObjectNotFound>(
         c.ctx, "No update has the identifier " + unknown.id + ".");
     fault->uri.push_back(unknown.id);
-    told->error = fault;
-    o.updateIdExpansionDetail.push_back(told);
+    answered->error = fault;
+    o.updateIdExpansionDetail.push_back(answered);
 }
 
 bool wants_physical(const protocolUpdateOrder__DeliveryPreference &preference)

@@ -71,6 +71,8 @@ static const char *prefixed_eof_text(soap *ctx)
 
 static const char *unlisted_text(soap *ctx)
 {
+    if (ctx->error == 200)
+        return "HTTP status 200, but the answer is not a SOAP message";
     if (ctx->error >= 201 && ctx->error <= 599)
         std::snprintf(ctx->message_text, sizeof ctx->message_text, "HTTP Error: %d %s", ctx->error,
                       http_reason(ctx->error));

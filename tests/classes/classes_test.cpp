@@ -43,9 +43,12 @@ namespace {
 
 constexpr int DEPTH = 3;
 
-class Classes : public testing::Test {
+class every_class : public testing::Test {
 protected:
-    Classes() : ctx(0, MODE_BARE_XML | MODE_BUFFERED) { soap_set_namespaces(&ctx, soap_program_namespaces); }
+    every_class() : ctx(0, MODE_BARE_XML | MODE_BUFFERED)
+    {
+        soap_set_namespaces(&ctx, soap_program_namespaces);
+    }
 
     void begin_message(const binding::class_ops &ops, const void *object)
     {
@@ -124,7 +127,7 @@ protected:
     memory_wire ctx;
 };
 
-TEST_F(Classes, come_back_equal_from_every_framing_and_mode)
+TEST_F(every_class, come_back_equal_from_every_framing_and_mode)
 {
     const std::uint32_t modes[] = {MODE_BUFFERED,
                                    MODE_STORE,
@@ -156,7 +159,7 @@ TEST_F(Classes, come_back_equal_from_every_framing_and_mode)
 }
 
 // A peer that goes away, or whose message breaks off, at every place that a class can be left at.
-TEST_F(Classes, end_in_an_error_wherever_their_bytes_stop)
+TEST_F(every_class, end_in_an_error_wherever_their_bytes_stop)
 {
     each_class([&](int id, const binding::class_ops &ops) {
         source random(&ctx, static_cast<unsigned>(id));
@@ -181,7 +184,7 @@ TEST_F(Classes, end_in_an_error_wherever_their_bytes_stop)
 }
 
 // One run of xmllint over all documents, against one schema that imports all namespaces.
-TEST_F(Classes, are_valid_by_their_schemas)
+TEST_F(every_class, are_valid_by_their_schemas)
 {
     if (std::system("xmllint --version >/dev/null 2>&1") != 0)
         GTEST_SKIP() << "xmllint is not installed";

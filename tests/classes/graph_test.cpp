@@ -47,7 +47,7 @@ const soap_namespace *table_12()
     return rows.data();
 }
 
-class Graphs : public testing::Test {
+class graphs : public testing::Test {
 protected:
     int put(const binding::class_ops &ops, const void *object)
     {
@@ -106,7 +106,7 @@ std::size_t references_in(const std::string &message, const form &how)
     return count;
 }
 
-TEST_F(Graphs, come_back_with_the_same_sharing)
+TEST_F(graphs, come_back_with_the_same_sharing)
 {
     std::size_t references = 0, classes = 0;
     for (int id = 1; id <= binding::TYPE_ID_MAX; ++id) {

@@ -8,6 +8,7 @@ import json
 import os
 import random
 import re
+import signal
 import socket
 import subprocess
 import tempfile
@@ -125,7 +126,9 @@ class calls(unittest.TestCase):
             (6, zuv.answer("", "401 Unauthorized"), "--user"),
             (6, zuv.answer("<html>gone</html>", "302 Found", ["Location: http://else/"]), "moved to  http://else/"),
             (6, zuv.answer("", "503 Service Unavailable"), "try again later"),
-            (7, zuv.answer("<html>"), "--trace"),
+            (6, zuv.answer(zuv.envelope(fault % ("E:Client", "never heard", "")), "404 No"), "detail    never heard (E:Client)\n"),
+            (6, zuv.answer("<html><title>Please log in</title><p>x</p></html>", "403 No"), "detail    Please log in\n"),
+            (7, zuv.answer("<html>"), "not a SOAP message"),
             (4, zuv.answer(GOT[:-40]), "--silence-limit"),
             (7, zuv.answer(zuv.envelope("<p:getResponse/>", 3)), "--soap12"),
             (7, zuv.answer(zuv.envelope("<p:setResponse/>")), "tag name or namespace mismatch"),
@@ -151,13 +154,18 @@ class calls(unittest.TestCase):
                 (11, "can't be opened", ["profile", "set", os.path.join(self.folder, "none.xml")]),
                 (11, "can't be attached", ["profile", "set", "--attach", self.folder]),
                 (5, "can't be set up", ["profile", "get", "--ca-file", wrong]),
+                (11, "--ca-file: /none: No such file", ["profile", "get", "--ca-file", "/none"]),
+                (11, "--key-file: /none: No such file", ["data", "get", "--key-file", "/none", "http://x/"]),
                 (2, "--endpoint", ["profile", "get", "-e", "ftp://x"]),
                 (2, "--user", ["profile", "get", "-e", "http://u:p@x"]),
                 (2, "excludes", ["statusreport", "get", "--mime", "--dime"]),
                 (4, 'No call can go to "http://:9/', ["profile", "get", "-e", "http://:9"]),
                 (4, 'No call can go to "https://x:65536/', ["problemreport", "get", "-e", "http://x", "-e", "https://x:65536"]),
                 (4, 'No call can go to "http://x:0/"', ["data", "get", "http://x:0/"]),
-                (2, "", ["profile", "nothing"]), (2, "", ["profile", "get", "--repeat", "0"]), (2, "", [])):
+                (2, '"profle"; did you mean "profile"?', ["profle", "get"]),
+                (2, '"nothing"; there are create, ', ["profile", "nothing"]),
+                (2, '"--endpont"; did you mean "--endpoint"?', ["profile", "get", "--endpont=x"]),
+                (2, "--repeat", ["profile", "get", "--repeat", "0"]), (2, "a command is missing: inventoryreport, ", [])):
             with self.subTest(arguments=arguments):
                 self.expect(zuv.run(*arguments), code, words)
 
@@ -222,6 +230,34 @@ class calls(unittest.TestCase):
             self.expect(zuv.run("data", "get", uri + "-not"), 6, "404")
         with zuv.peer(zuv.answer(b"x" * 5)[:-2]) as (address, _):
             self.expect(zuv.run("data", "get", address + "/d"), 4)
+
+    def test_what_does_not_arrive_whole_replaces_no_file(self):
+        held, before = self.file("held", b"precious"), 0o640
+        os.chmod(held, before)
+        cut = zuv.answer(b"x" * 100000)[:-2]
+        with zuv.peer(cut, zuv.answer(b"new")) as (address, _):
+            self.expect(zuv.run("data", "get", address + "/d", "-o", held), 4)
+            self.assertEqual((os.listdir(self.folder), open(held, "rb").read()), (["held"], b"precious"))
+            link = os.path.join(self.folder, "link")
+            os.symlink(held, link)
+            self.expect(zuv.run("data", "get", address + "/d", "-o", link), 0)
+        self.assertEqual((os.path.islink(link), open(held, "rb").read(), os.stat(held).st_mode & 0o777), (True, b"new", before))
+        os.unlink(link)
+        listener = socket.create_server(("127.0.0.1", 0))
+        with listener, subprocess.Popen([zuv.PROGRAM, "data", "get", "-o", held, "http://127.0.0.1:%d/d" % listener.getsockname()[1]],
+                                        stderr=subprocess.DEVNULL) as program:
+            connection, _ = listener.accept()
+            with connection:
+                connection.sendall(cut)
+                connection.recv(1)  # it is past the start, and waits for the rest
+                program.send_signal(signal.SIGINT)
+                self.assertEqual(program.wait(zuv.LIMIT_S), -signal.SIGINT)
+        self.assertEqual((os.listdir(self.folder), open(held, "rb").read()), (["held"], b"new"))
+        parts = (b"--B\r\nContent-ID: <r>\r\nContent-Type: text/xml\r\n\r\n%s\r\n--B\r\nContent-ID: <a>\r\n\r\n%s" % (GOT.encode(), b"y" * 100000))
+        kept = os.path.join(self.folder, "kept")
+        with zuv.peer(zuv.answer(parts, headers=['Content-Type: multipart/related; boundary="B"; type="text/xml"; start="<r>"'])) as (address, _):
+            zuv.run("profile", "get", "-e", address, "--save-attachments", kept)
+        self.assertEqual(os.listdir(kept), [])
 
     def test_whatever_comes_back_ends_in_a_documented_code(self):
         rows = random.Random(3)

@@ -21,6 +21,8 @@ class documents(unittest.TestCase):
     def test_the_new_document_of_every_class_is_valid(self):
         classes = [line.split("\t") for line in zuv.run("new", "--list").stdout.splitlines()]
         self.assertGreater(len(classes), 400)
+        if os.environ.get("ZUV_SANITIZED"):  # such a program takes long to start
+            classes = classes[::8]
         with tempfile.TemporaryDirectory() as folder:
             for name, documentation in classes:
                 run = zuv.run("new", name)
@@ -91,6 +93,7 @@ class documents(unittest.TestCase):
         wrong = check(message % (zuv.PROFILE, zuv.COMMON, "<p:odd/>"))
         self.assertIn("<p:odd> is no member", wrong.stderr)
         self.assertEqual(check("<x/>").returncode, 3)
+        self.assertIn("it has no namespace (xmlns), protocolProfile:ProfileContent has", check("<ProfileContent/>").stderr)
 
     def test_the_library_s_examples_of_messages_are_what_the_contract_allows(self):
         seeds = glob.glob(os.path.join(zuv.SOURCE, "tests", "fuzz", "corpus", "*", "*"))

@@ -13,6 +13,7 @@ import zuv
 import programs  # of the interoperability tests: servers and certificates
 
 MANUAL = os.path.join(zuv.SOURCE, "docs", "man", "zuv.1")
+SERVICE_MANUAL = os.path.join(zuv.SOURCE, "docs", "man", "zuv-service.1")
 PAGE = os.path.join(zuv.SOURCE, "docs", "command-line.md")
 COMPLETION = os.path.join(zuv.SOURCE, "cli", "completion", "zuv.bash")
 HELPERS = "/usr/share/bash-completion/bash_completion"
@@ -52,6 +53,11 @@ class manual(unittest.TestCase):
         for command in ("profile get", "data get", "data put", "new", "check", "trace"):
             listed |= set(re.findall(r"(?m)^  (?:-\w,)?--([a-z0-9-]+)", zuv.run(*command.split(), "--help").stdout))
         self.assertEqual(told, listed - {"help"})
+        with open(SERVICE_MANUAL) as file:
+            told = set(re.findall(r"Fl Fl ([a-z0-9-]+)", file.read()))
+        run = subprocess.run([zuv.SERVICE, "--help"], capture_output=True, text=True, timeout=zuv.LIMIT_S)
+        self.assertEqual(told, set(re.findall(r"(?m)^  (?:-\w,)?--([a-z0-9-]+)", run.stdout)) - {"help"})
+        self.assertEqual(subprocess.run([zuv.SERVICE, "--no"], capture_output=True, timeout=zuv.LIMIT_S).returncode, 2)
         codes = exit_codes()
         self.assertEqual(re.findall(r"(?m)^\.It (\d+)$", source()), codes)
         self.assertEqual(re.findall(r"(\d+) [a-zA-Z]", zuv.run("--help").stdout.split("Exit:")[1]), codes)
@@ -59,7 +65,7 @@ class manual(unittest.TestCase):
     def test_the_page_is_well_made(self):
         if not shutil.which("mandoc"):
             self.skipTest("mandoc is not installed")
-        run = subprocess.run(["mandoc", "-T", "lint", "-W", "warning", MANUAL], capture_output=True, text=True)
+        run = subprocess.run(["mandoc", "-T", "lint", "-W", "warning", MANUAL, SERVICE_MANUAL], capture_output=True, text=True)
         self.assertEqual((run.returncode, run.stdout), (0, ""))
 
     def test_bash_completes_commands_options_and_classes(self):

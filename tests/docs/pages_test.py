@@ -4,11 +4,14 @@ links lead somewhere.
 
 Usage: pages_test.py SOURCE_DIR ZUV_SERVICE GUIDE README_HOST. The programs call a zuv-service started here.
 """
+import http.server
 import os
 import re
 import subprocess
 import sys
 import tempfile
+import threading
+import zlib
 
 sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "interop"))
 import listening
@@ -102,6 +105,50 @@ def check_run(program, arguments, expected, **environment):
         assert re.search(pattern, run.stdout, re.M), "not printed: %s\n%s" % (pattern, run.stdout)
 
 
+class BarePeer(http.server.BaseHTTPRequestHandler):
+    """Answers each request by a response, or a fault, in which everything optional is missing."""
+    protocol_version, content = "HTTP/1.1", ""
+
+    def do_POST(self):
+        if "Content-Length" in self.headers:
+            body = self.rfile.read(int(self.headers["Content-Length"]))
+        else:
+            body = b""
+            while size := int(self.rfile.readline(), 16):
+                body += self.rfile.read(size)
+                self.rfile.readline()
+            self.rfile.readline()
+        text = (zlib.decompress(body, 47) if "Content-Encoding" in self.headers else body).decode()
+        operation = re.search(r"<[\w-]+:(\w+)Request[ />]", text)[1]
+        nil = ' xmlns:i="http://www.w3.org/2001/XMLSchema-instance" i:nil="true"' if self.content == "nil" else ""
+        held = "<p:%sResponse%s/>" % (operation, nil)
+        if "urn:not:there" in text:
+            held = "<E:Fault><faultcode>E:Client</faultcode><detail><c:Client.ObjectNotFound/></detail></E:Fault>"
+        answer = ('<E:Envelope xmlns:E="%s" xmlns:p="%s" xmlns:c="%s"><E:Body>%s</E:Body></E:Envelope>' % (
+            re.search(r'"(http://[^"]*envelope/?)"', text)[1], messages.namespace("Profile"), messages.COMMON, held)).encode()
+        self.send_response(500 if "Fault" in held else 200)
+        self.send_header("Content-Type", "text/xml; charset=utf-8")
+        self.send_header("Content-Length", str(len(answer)))
+        self.end_headers()
+        self.wfile.write(answer)
+
+    def log_message(self, *_):
+        pass
+
+
+def check_bare_answers(guide, readme_host):
+    """No sample takes for granted what an answer may lack."""
+    for content in "empty", "nil":
+        with http.server.ThreadingHTTPServer(("127.0.0.1", 0), type("Peer", (BarePeer,), {"content": content})) as peer:
+            threading.Thread(target=peer.serve_forever).start()
+            endpoint = "http://127.0.0.1:%d/" % peer.server_address[1]
+            try:
+                check_run(guide, [endpoint], [r"^not found: $", r"^\d+ bytes$"])
+                check_run(readme_host, [], [], ZUV_README_ENDPOINT=endpoint)
+            finally:
+                peer.shutdown()
+
+
 def main():
     source, service, guide, readme_host = sys.argv[1:]
     pages = subprocess.run(["git", "ls-files", "*.md"], cwd=source, text=True, capture_output=True).stdout.split()
@@ -115,6 +162,7 @@ def main():
         check_run(guide, [endpoint], [r"^Ada's workshop$", r"^still here: Ada's workshop$", r"^not found: urn:not:there$",
                                       r"^\d+ bytes$"])
         check_run(readme_host, [], [r"^kept as urn:zuv:profile:"], ZUV_README_ENDPOINT=endpoint)
+    check_bare_answers(guide, readme_host)
     print("%d pages, the guide's code, the README's host and commands" % len(pages))
 
 

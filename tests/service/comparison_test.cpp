@@ -5,7 +5,7 @@
 
 using namespace service;
 
-TEST(Comparison, OrdersNumbersWithinTextsAsNumbers)
+TEST(comparison, orders_numbers_within_texts_as_numbers)
 {
     const char *const ascending[] = {"",   "1",   "1.0", "1.0.1", "1.2", "1.10", "2",
                                      "10", "10a", "a",   "a2",    "a10", "b"};
@@ -19,7 +19,7 @@ TEST(Comparison, OrdersNumbersWithinTextsAsNumbers)
     EXPECT_LT(compare_naturally("99999999999999999999998", "99999999999999999999999"), 0) << "of any length";
 }
 
-TEST(Comparison, OfText)
+TEST(comparison, of_text)
 {
     using op = text_operator;
     const struct {
@@ -70,7 +70,7 @@ TEST(Comparison, OfText)
     EXPECT_TRUE(word_search(op::contains_all_words, "disk", false).found_in("Disk"));
 }
 
-TEST(Comparison, OfSetsTruthAndTime)
+TEST(comparison, of_sets_truth_and_time)
 {
     using set = std::set<std::string_view>;
     EXPECT_TRUE(set_holds(set_operator::equal, {"a", "b"}, {"b", "a"}));

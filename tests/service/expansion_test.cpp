@@ -34,7 +34,7 @@ std::string members(const std::string &words)
 
 } // namespace
 
-TEST(Expansion, FollowsTheOrder)
+TEST(expansion, follows_the_order)
 {
     const std::string data = "DB-10 DB-10-P1 DB-11 PACK-DB PACK-2024";
     const struct {
@@ -90,7 +90,7 @@ TEST(Expansion, FollowsTheOrder)
     }
 }
 
-TEST(Expansion, FiltersByTheUpdatesRole)
+TEST(expansion, filters_by_the_updates_role)
 {
     soap ctx;
     filter_work work{&ctx};
@@ -113,7 +113,7 @@ TEST(Expansion, FiltersByTheUpdatesRole)
     EXPECT_FALSE(names_updates(order()));
 }
 
-TEST(Catalogue, IsWhole)
+TEST(catalogue, is_whole)
 {
     const catalogue &offered = the_catalogue();
     for (const update_record *update : offered.all()) {

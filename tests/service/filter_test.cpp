@@ -47,7 +47,7 @@ std::string comparison(const std::string &type, const std::string &op, const std
 
 } // namespace
 
-TEST(UpdateFilter, ComparesWhatTheClassNames)
+TEST(update_filter, compares_what_the_class_names)
 {
     const std::string disk = "FW-100 FW-110 FW-120 BIOS-20 BIOS-30 DRV-5 PACK-2024";
     const std::string data = "DB-10 DB-10-P1 DB-11 PACK-DB PACK-2024";
@@ -119,7 +119,7 @@ TEST(UpdateFilter, ComparesWhatTheClassNames)
             << r.type << ' ' << r.op << ' ' << r.content;
 }
 
-TEST(UpdateFilter, CombinesWithAndOrNot)
+TEST(update_filter, combines_with_and_or_not)
 {
     const std::string firmware =
         node("operand", "UpdateMetaDataTypeComparison", text("type", "firmware"), "equal");
@@ -134,7 +134,7 @@ TEST(UpdateFilter, CombinesWithAndOrNot)
     EXPECT_EQ(passing(node("expression", "Or", many)), "FW-120 DB-10");
 }
 
-TEST(UpdateFilter, RefusesWhatItCannotJudge)
+TEST(update_filter, refuses_what_it_cannot_judge)
 {
     struct row {
         const char *rule;
@@ -165,7 +165,7 @@ TEST(UpdateFilter, RefusesWhatItCannotJudge)
 }
 
 // Nodes that refer to each other stand for more nodes than can be looked at.
-TEST(UpdateFilter, GivesUpOnExpressionsThatGrowWithoutEnd)
+TEST(update_filter, gives_up_on_expressions_that_grow_without_end)
 {
     protocolUpdateOrderFilter__And cycle;
     cycle.operand = {&cycle, &cycle};
@@ -186,7 +186,7 @@ TEST(UpdateFilter, GivesUpOnExpressionsThatGrowWithoutEnd)
 }
 
 // Every comparison that can be sent has a row: none is taken for a node that does not state what it compares.
-TEST(Filters, JudgeEveryComparisonOfBothLanguages)
+TEST(filters, judge_every_comparison_of_both_languages)
 {
     soap ctx;
     filter_work work{&ctx};
@@ -222,7 +222,7 @@ TEST(Filters, JudgeEveryComparisonOfBothLanguages)
     EXPECT_EQ(judged, 76 + 44) << "comparisons of the two languages, the abstract bases not counted";
 }
 
-TEST(ReportFilter, ComparesWhatTheClassNames)
+TEST(report_filter, compares_what_the_class_names)
 {
     const std::string p = "protocolPRFilter";
     const parsed<protocolProblemReport__ProblemReportContent> report(

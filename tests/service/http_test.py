@@ -1,5 +1,6 @@
 #!/usr/bin/python3
 """The service as an HTTP server: statuses, framings, versions, connections, and the files that it keeps."""
+import json
 import os
 import stat
 import subprocess
@@ -136,9 +137,21 @@ class http(unittest.TestCase):
 
     def test_it_does_not_start_without_what_it_needs(self):
         with zuv.service() as address:
-            for options in ["--port", address.rpartition(":")[2]], ["--port", "0", "--database", "/nowhere/x.db"]:
+            port = address.rpartition(":")[2]
+            for options, words in ((["--port", port], "can't listen on 127.0.0.1 port %s: Address already in use" % port),
+                                   (["--port", "0", "--database", "/nowhere/x.db"], "/nowhere/x.db")):
                 run = subprocess.run([zuv.SERVICE, *options], capture_output=True, text=True, timeout=zuv.LIMIT_S)
                 self.assertEqual((run.returncode, run.stdout), (1, ""), run)
+                self.assertIn(words, run.stderr)
+
+    def test_its_addresses_are_printed_for_scripts_too(self):
+        with subprocess.Popen([zuv.SERVICE, "--port", "0", "--json"], stdout=subprocess.PIPE) as program:
+            try:
+                printed = json.loads(program.stdout.readline())
+                self.assertEqual(exchange(printed["address"], post("Profile", CREATE)).status, 200)
+                self.assertEqual((len(printed["ports"]), printed["ports"]["Profile"]), (6, printed["address"] + PORT))
+            finally:
+                program.terminate()
 
     def test_its_files_are_for_their_owner_alone(self):
         """Whatever the umask is; what was there before stays as it was."""

@@ -130,9 +130,9 @@ template <class Call> void soak(Call call, pid_t service = 0)
 }
 
 // A document with something of everything that a call allocates.
-class Soak : public testing::Test {
+class long_run : public testing::Test {
 protected:
-    Soak()
+    long_run()
     {
         identity.name = &name;
         contact.name = &name;
@@ -148,7 +148,7 @@ protected:
     protocolProfile__ProfileContent document;
 };
 
-TEST_F(Soak, with_the_service)
+TEST_F(long_run, with_the_service)
 {
     service_process service;
     ASSERT_NE(service.port(), 0);
@@ -180,7 +180,7 @@ TEST_F(Soak, with_the_service)
 }
 
 // The server is a thread of this process and is watched with it.
-TEST_F(Soak, over_TLS)
+TEST_F(long_run, over_tls)
 {
     const scripted::server server(scripted::serve_well, true);
     scripted::client caller(server);
@@ -194,7 +194,7 @@ TEST_F(Soak, over_TLS)
     EXPECT_EQ(caller.connections, calls() / ANEW);
 }
 
-TEST_F(Soak, in_memory)
+TEST_F(long_run, in_memory)
 {
     call_wire wire;
     ProfileSoapBindingProxy proxy(static_cast<int>(MODE_KEEP_ALIVE));

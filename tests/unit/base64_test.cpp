@@ -17,7 +17,7 @@ std::string random_bytes(std::mt19937 &random, std::size_t count)
     return bytes;
 }
 
-class Base64 : public testing::Test {
+class base64 : public testing::Test {
 protected:
     memory_wire ctx;
 
@@ -64,7 +64,7 @@ struct text_case {
     const char *bytes; // "refused", or the bytes in brackets
 };
 
-TEST_F(Base64, whole_texts_are_decoded_up_to_padding)
+TEST_F(base64, whole_texts_are_decoded_up_to_padding)
 {
     const text_case cases[] = {
         {"one byte left over", "Zg==", "[f]"},
@@ -85,7 +85,7 @@ TEST_F(Base64, whole_texts_are_decoded_up_to_padding)
     EXPECT_EQ(length, 0);
 }
 
-TEST_F(Base64, a_target_is_filled_and_not_overrun)
+TEST_F(base64, a_target_is_filled_and_not_overrun)
 {
     char target[8];
     for (std::size_t capacity = 0; capacity <= 7; capacity++) {
@@ -98,7 +98,7 @@ TEST_F(Base64, a_target_is_filled_and_not_overrun)
     EXPECT_EQ(decoded("Zm9vYmFy!", target, 3), "[foo]") << "what has no room is not looked at";
 }
 
-TEST_F(Base64, bytes_are_encoded_into_a_target_or_none)
+TEST_F(base64, bytes_are_encoded_into_a_target_or_none)
 {
     char target[9];
     EXPECT_EQ(soap_s2base64(&ctx, bytes_of("foobar"), target, 6), target);
@@ -107,7 +107,7 @@ TEST_F(Base64, bytes_are_encoded_into_a_target_or_none)
     EXPECT_STREQ(soap_s2base64(&ctx, bytes_of("x"), nullptr, -1), "");
 }
 
-TEST_F(Base64, content_of_a_message_reads_the_same_at_every_cut)
+TEST_F(base64, content_of_a_message_reads_the_same_at_every_cut)
 {
     const struct {
         text_case text;
@@ -141,7 +141,7 @@ TEST_F(Base64, content_of_a_message_reads_the_same_at_every_cut)
     EXPECT_EQ(length, 0) << "an empty element has no content to read";
 }
 
-TEST_F(Base64, hex_texts_are_taken_on_trust)
+TEST_F(base64, hex_texts_are_taken_on_trust)
 {
     int length = -1;
     EXPECT_STREQ(soap_hex_decode(&ctx, "666F6f7", nullptr, 0, &length), "foo");
@@ -153,7 +153,7 @@ TEST_F(Base64, hex_texts_are_taken_on_trust)
     EXPECT_STREQ(soap_hex_encode(&ctx, bytes_of("\xaf\x01"), nullptr, 2), "af01");
 }
 
-TEST_F(Base64, random_bytes_agree_with_python)
+TEST_F(base64, random_bytes_agree_with_python)
 {
     std::mt19937 random(1);
     std::vector<std::string> inputs, hex;
@@ -179,7 +179,7 @@ TEST_F(Base64, random_bytes_agree_with_python)
     }
 }
 
-TEST_F(Base64, writing_stops_at_the_first_error)
+TEST_F(base64, writing_stops_at_the_first_error)
 {
     ctx.send_limit = 1;
     const std::string bytes(5000, 'x');

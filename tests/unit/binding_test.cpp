@@ -16,9 +16,9 @@
 namespace {
 
 // A context that reads documents whose prefixes are the service's own, and writes bare XML.
-class Binding : public testing::Test {
+class binding : public testing::Test {
 protected:
-    Binding() : ctx(0, MODE_BARE_XML | MODE_BUFFERED)
+    binding() : ctx(0, MODE_BARE_XML | MODE_BUFFERED)
     {
         soap_set_namespaces(&ctx, ProfileSoapBindingProxy().namespaces);
     }
@@ -64,13 +64,13 @@ protected:
     memory_wire ctx;
 };
 
-TEST_F(Binding, refuses_what_must_be_understood_and_is_unknown)
+TEST_F(binding, refuses_what_must_be_understood_and_is_unknown)
 {
     EXPECT_EQ(nullptr, read<protocol__Contact>("<c><x SOAP-ENV:mustUnderstand=\"1\"/></c>"));
     EXPECT_EQ(SOAP_MUST_UNDERSTAND, ctx.error);
 }
 
-TEST_F(Binding, xsi_type_makes_the_derived_class_and_an_unknown_one_the_base)
+TEST_F(binding, xsi_type_makes_the_derived_class_and_an_unknown_one_the_base)
 {
     const auto *query = read<protocolUpdateOrder__UpdateIdExpansionDetail>(
         "<d><protocolUpdateOrder:metaData "
@@ -112,7 +112,7 @@ TEST_F(Binding, xsi_type_makes_the_derived_class_and_an_unknown_one_the_base)
     EXPECT_EQ(SOAP_TYPE_MISMATCH, ctx.error);
 }
 
-TEST_F(Binding, always_written_members_have_their_defaults_when_they_are_not_there)
+TEST_F(binding, always_written_members_have_their_defaults_when_they_are_not_there)
 {
     const auto *order = read<protocolUpdateOrder__UpdateOrderContent>(
         "<o><protocolUpdateOrder:includeRequisites>1</protocolUpdateOrder:includeRequisites></o>");
@@ -121,7 +121,7 @@ TEST_F(Binding, always_written_members_have_their_defaults_when_they_are_not_the
     EXPECT_EQ(nullptr, order->includePatches);
 }
 
-TEST_F(Binding, a_code_without_a_word_goes_out_as_its_number)
+TEST_F(binding, a_code_without_a_word_goes_out_as_its_number)
 {
     protocol__DeliverySupported supported;
     protocol__Medium medium = static_cast<protocol__Medium>(99);
@@ -129,7 +129,7 @@ TEST_F(Binding, a_code_without_a_word_goes_out_as_its_number)
     EXPECT_EQ("<d><protocol:medium>99</protocol:medium></d>", write(supported, "d"));
 }
 
-TEST_F(Binding, codes_are_numbers_of_32_bits_and_in_strict_mode_those_of_words)
+TEST_F(binding, codes_are_numbers_of_32_bits_and_in_strict_mode_those_of_words)
 {
     const struct {
         const char *text;
@@ -146,7 +146,7 @@ TEST_F(Binding, codes_are_numbers_of_32_bits_and_in_strict_mode_those_of_words)
         }
 }
 
-TEST_F(Binding, a_type_of_the_schema_or_the_encoding_tells_a_simple_value_nothing_outside_strict_mode)
+TEST_F(binding, a_type_of_the_schema_or_the_encoding_tells_a_simple_value_nothing_outside_strict_mode)
 {
     const struct {
         const char *type;
@@ -184,7 +184,7 @@ TEST_F(Binding, a_type_of_the_schema_or_the_encoding_tells_a_simple_value_nothin
     EXPECT_EQ(SOAP_TYPE_MISMATCH, ctx.error) << "the text decides";
 }
 
-TEST_F(Binding, required_members_are_nil_when_null_and_attributes_come_first)
+TEST_F(binding, required_members_are_nil_when_null_and_attributes_come_first)
 {
     protocolPRFilter__Not negation;
     EXPECT_EQ("<f xsi:type=\"protocolPRFilter:Not\"><protocolPRFilter:operand xsi:nil=\"true\"/></f>",
@@ -207,7 +207,7 @@ TEST_F(Binding, required_members_are_nil_when_null_and_attributes_come_first)
     EXPECT_EQ(nullptr, read<protocol__Data>("<d/>")->encoding);
 }
 
-TEST_F(Binding, nil_is_a_null_pointer_and_nil_mode_writes_it_back)
+TEST_F(binding, nil_is_a_null_pointer_and_nil_mode_writes_it_back)
 {
     const auto *contact = read<protocol__Contact>(
         "<c><protocol:name xsi:nil=\"true\"/><protocol:nameDetails xsi:nil=\"1\"/></c>");
@@ -238,7 +238,7 @@ TEST_F(Binding, nil_is_a_null_pointer_and_nil_mode_writes_it_back)
               nil);
 }
 
-TEST_F(Binding, empty_values_are_there_and_absent_ones_are_not)
+TEST_F(binding, empty_values_are_there_and_absent_ones_are_not)
 {
     for (const char *form : {"<protocol:certificate/>", "<protocol:certificate></protocol:certificate>",
                              "<protocol:certificate> </protocol:certificate>"}) {
@@ -266,7 +266,7 @@ TEST_F(Binding, empty_values_are_there_and_absent_ones_are_not)
     EXPECT_EQ("<a></a>", write(*nil, "a", MODE_NULL_STRINGS));
 }
 
-TEST_F(Binding, references_forward_and_back_share_one_object)
+TEST_F(binding, references_forward_and_back_share_one_object)
 {
     const auto *profile = read<protocolProfile__ProfileContent>(
         "<p><protocol:contact href=\"#c\"/><protocol:contact id=\"c\"><protocol:name "
@@ -297,7 +297,7 @@ TEST_F(Binding, references_forward_and_back_share_one_object)
     }
 }
 
-TEST_F(Binding, strict_reading_takes_no_object_with_wanted_members_by_reference)
+TEST_F(binding, strict_reading_takes_no_object_with_wanted_members_by_reference)
 {
     const auto code_of = [this]<class T>(const T &) {
         EXPECT_EQ(nullptr, read<T>("<f href=\"#f\"/>", MODE_STRICT));
@@ -308,7 +308,7 @@ TEST_F(Binding, strict_reading_takes_no_object_with_wanted_members_by_reference)
     EXPECT_EQ(SOAP_MISSING_ID, code_of(protocol__Contact())) << "neither";
 }
 
-TEST_F(Binding, graph_mode_writes_shared_objects_once_and_literal_mode_each_time)
+TEST_F(binding, graph_mode_writes_shared_objects_once_and_literal_mode_each_time)
 {
     std::string name = "Ada";
     protocol__Contact contact;
@@ -322,7 +322,7 @@ TEST_F(Binding, graph_mode_writes_shared_objects_once_and_literal_mode_each_time
               write(profile, "p", SOAP_XML_GRAPH));
 }
 
-TEST_F(Binding, the_registry_makes_finds_and_destroys_by_id)
+TEST_F(binding, the_registry_makes_finds_and_destroys_by_id)
 {
     auto *identity = static_cast<protocol__Identity *>(
         soap_instantiate_array(&ctx, SOAP_TYPE_protocol__Identity, 3, nullptr, nullptr, nullptr));
@@ -343,7 +343,7 @@ TEST_F(Binding, the_registry_makes_finds_and_destroys_by_id)
     EXPECT_EQ(0, soap_write_element(&ctx, identity, "x", 0, 878));
 }
 
-TEST_F(Binding, a_vector_named_by_a_reference_is_filled_through_its_id)
+TEST_F(binding, a_vector_named_by_a_reference_is_filled_through_its_id)
 {
     auto *texts = static_cast<std::vector<std::string> *>(
         soap_instantiate(&ctx, SOAP_TYPE_vector_of_xsd__string, nullptr, nullptr, nullptr));
@@ -359,7 +359,7 @@ TEST_F(Binding, a_vector_named_by_a_reference_is_filled_through_its_id)
     EXPECT_EQ((std::vector<std::string>{"urn:1", "urn:1"}), read_back->thisURI);
 }
 
-TEST_F(Binding, nesting_stops_at_the_limit_of_open_elements)
+TEST_F(binding, nesting_stops_at_the_limit_of_open_elements)
 {
     EXPECT_EQ(nullptr, read<protocolProfile__ProfileContent>(
                            "<p>" + repeat_text("<protocolProfile:profile>", 5000) +

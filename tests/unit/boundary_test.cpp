@@ -42,7 +42,7 @@ void element_holds(int (*write)(soap *, const char *, int, const T *, const char
     }
 }
 
-TEST(Boundary, every_number_is_written_and_read)
+TEST(boundary, every_number_is_written_and_read)
 {
     element_holds(soap_byte_out, soap_byte_in, "-129");
     element_holds(soap_short_out, soap_short_in, "32768");
@@ -57,7 +57,7 @@ TEST(Boundary, every_number_is_written_and_read)
 }
 
 // An array is the same by its content and sizes, wherever its holder is.
-TEST(Boundary, an_array_is_found_for_its_id_by_content_and_sizes)
+TEST(boundary, an_array_is_found_for_its_id_by_content_and_sizes)
 {
     struct holder {
         const char *content;
@@ -83,7 +83,7 @@ TEST(Boundary, an_array_is_found_for_its_id_by_content_and_sizes)
 }
 
 // Offsets of an array's elements fit an int to its last value, and no further.
-TEST(Boundary, the_last_offset_of_an_array_is_the_largest_int)
+TEST(boundary, the_last_offset_of_an_array_is_the_largest_int)
 {
     const int one_row[] = {1}, rows[] = {0, 1 << 15};
     EXPECT_EQ(soap_array_offset_parse("[2147483647]", one_row, nullptr, 1), INT_MAX);
@@ -98,7 +98,7 @@ TEST(Boundary, the_last_offset_of_an_array_is_the_largest_int)
 
 // The rows of prefixes are kept by a few places, which prefixes of other lengths share: none at all among
 // them.
-TEST(Boundary, a_name_without_prefix_is_never_taken_for_one_with)
+TEST(boundary, a_name_without_prefix_is_never_taken_for_one_with)
 {
     const soap_namespace table[] = {{"a", "urn:a", nullptr, nullptr}, {nullptr, nullptr, nullptr, nullptr}};
     for (char letter = 'b'; letter <= 'w'; ++letter) {
@@ -112,7 +112,7 @@ TEST(Boundary, a_name_without_prefix_is_never_taken_for_one_with)
     }
 }
 
-TEST(Boundary, without_a_callback_a_head_has_no_lines)
+TEST(boundary, without_a_callback_a_head_has_no_lines)
 {
     memory_wire ctx(0, MODE_BUFFERED);
     ctx.mode = MODE_BUFFERED;
@@ -123,7 +123,7 @@ TEST(Boundary, without_a_callback_a_head_has_no_lines)
     EXPECT_EQ(ctx.sent(), "");
 }
 
-TEST(Boundary, the_header_callback_judges_a_header_that_was_read)
+TEST(boundary, the_header_callback_judges_a_header_that_was_read)
 {
     static int asked;
     asked = 0;

@@ -101,7 +101,7 @@ bool refuse(const call_case &c, std::size_t nth, failing_malloc::refuse how)
     return refused != 0;
 }
 
-TEST(AllocationFailure, of_a_call_gives_a_code_and_leaves_nothing_behind)
+TEST(allocation_failure, of_a_call_gives_a_code_and_leaves_nothing_behind)
 {
     const call_case cases[] = {
         {"get", &trial::get, rich_answer("get"), 0, 0},
@@ -150,7 +150,7 @@ struct host_memory {
 };
 host_memory *host_memory::current = nullptr;
 
-TEST(AllocationFailure, of_the_hosts_own_allocator_is_told_wherever_it_is_met)
+TEST(allocation_failure, of_the_hosts_own_allocator_is_told_wherever_it_is_met)
 {
     const call_case cases[] = {
         {"get", &trial::get, rich_answer("get"), 0, 0},
@@ -182,7 +182,7 @@ TEST(AllocationFailure, of_the_hosts_own_allocator_is_told_wherever_it_is_met)
 }
 
 // Memory in use stays where it was, whatever the number of calls.
-TEST(ManyCalls, leave_a_proxy_as_small_as_it_was)
+TEST(many_calls, leave_a_proxy_as_small_as_it_was)
 {
     profile_call calls;
     const std::string answer = http_answer(rich_answer("get"));

@@ -28,9 +28,9 @@ std::string fault_12(const std::string &code)
            "</E:Detail></E:Fault>";
 }
 
-class CallCycle : public testing::Test, public profile_call {
+class call_cycle : public testing::Test, public profile_call {
 protected:
-    CallCycle() : profile_call(0) {}
+    call_cycle() : profile_call(0) {}
 
     int get(const std::string &body, const std::string &uri = ENVELOPE_11)
     {
@@ -40,7 +40,7 @@ protected:
     __protocolProfile__getResponse &response = got;
 };
 
-TEST_F(CallCycle, goes_to_the_default_endpoint_until_one_is_given_and_then_stays_there)
+TEST_F(call_cycle, goes_to_the_default_endpoint_until_one_is_given_and_then_stays_there)
 {
     EXPECT_EQ(0, get(OK));
     EXPECT_EQ("http://127.0.0.1:9080/zuv/v1.0/services/Profile", wire.opened_at);
@@ -54,7 +54,7 @@ TEST_F(CallCycle, goes_to_the_default_endpoint_until_one_is_given_and_then_stays
     EXPECT_STREQ("http://one.example/x", proxy.endpoint);
 }
 
-TEST_F(CallCycle, refuses_an_endpoint_that_leads_nowhere_before_anything_is_sent)
+TEST_F(call_cycle, refuses_an_endpoint_that_leads_nowhere_before_anything_is_sent)
 {
     static const char *const taken[] = {"http://h/",
                                         "HTTPS://h",
@@ -123,7 +123,7 @@ TEST_F(CallCycle, refuses_an_endpoint_that_leads_nowhere_before_anything_is_sent
     EXPECT_EQ(0, call_at("")) << "by descriptor, or the hooks in its place";
 }
 
-TEST_F(CallCycle, a_failure_is_never_told_by_the_fault_of_an_earlier_call)
+TEST_F(call_cycle, a_failure_is_never_told_by_the_fault_of_an_earlier_call)
 {
     static const struct {
         const char *rule;
@@ -163,7 +163,7 @@ TEST_F(CallCycle, a_failure_is_never_told_by_the_fault_of_an_earlier_call)
     }
 }
 
-TEST_F(CallCycle, an_answer_cut_anywhere_is_an_error_until_its_envelope_is_whole_and_ends_the_connection)
+TEST_F(call_cycle, an_answer_cut_anywhere_is_an_error_until_its_envelope_is_whole_and_ends_the_connection)
 {
     proxy.input_mode = proxy.output_mode = MODE_KEEP_ALIVE;
     const std::string body = envelope(OK), chunked = "HTTP/1.1 200 OK\r\nTransfer-Encoding: chunked\r\n\r\n";
@@ -176,7 +176,7 @@ TEST_F(CallCycle, an_answer_cut_anywhere_is_an_error_until_its_envelope_is_whole
         }
 }
 
-TEST_F(CallCycle, maps_fault_codes_in_both_versions)
+TEST_F(call_cycle, maps_fault_codes_in_both_versions)
 {
     static const struct {
         const char *version, *code;
@@ -200,7 +200,7 @@ TEST_F(CallCycle, maps_fault_codes_in_both_versions)
     }
 }
 
-TEST_F(CallCycle, reads_the_detail_into_typed_members_then_an_object_then_raw_text)
+TEST_F(call_cycle, reads_the_detail_into_typed_members_then_an_object_then_raw_text)
 {
     EXPECT_EQ(SOAP_CLIENT_FAULT,
               get(fault_11("E:Client",
@@ -245,7 +245,7 @@ std::string told_by(const SOAP_ENV__Detail *detail)
 }
 
 // Neither does it end the connection: the next call goes through it.
-TEST_F(CallCycle, a_bad_value_does_not_hide_the_fault)
+TEST_F(call_cycle, a_bad_value_does_not_hide_the_fault)
 {
     const std::string port = "<c:Client.DataPortIncompatibility><c:description>d</c:description>",
                       port_end = "<c:transport>HTTP</c:transport></c:Client.DataPortIncompatibility>",
@@ -298,7 +298,7 @@ TEST_F(CallCycle, a_bad_value_does_not_hide_the_fault)
 }
 
 // Parts of a fault may stand after it, as those of any object.
-TEST_F(CallCycle, the_references_of_a_fault_are_followed)
+TEST_F(call_cycle, the_references_of_a_fault_are_followed)
 {
     const std::string detail = "<c:Client.ObjectNotFound><c:uri>u</c:uri></c:Client.ObjectNotFound>",
                       code = "<faultcode>E:Server</faultcode>", text = "<faultstring>t</faultstring>",
@@ -346,7 +346,7 @@ TEST_F(CallCycle, the_references_of_a_fault_are_followed)
     }
 }
 
-TEST_F(CallCycle, an_answer_without_the_response_ends_with_the_readers_error)
+TEST_F(call_cycle, an_answer_without_the_response_ends_with_the_readers_error)
 {
     static const struct {
         const char *rule, *body;
@@ -363,7 +363,7 @@ TEST_F(CallCycle, an_answer_without_the_response_ends_with_the_readers_error)
     }
 }
 
-TEST_F(CallCycle, skips_what_follows_the_response_in_both_versions)
+TEST_F(call_cycle, skips_what_follows_the_response_in_both_versions)
 {
     for (const char *version : {ENVELOPE_11, ENVELOPE_12}) {
         EXPECT_EQ(0, get(OK + "<p:unknown><deep>x</deep></p:unknown>", version));
@@ -372,7 +372,7 @@ TEST_F(CallCycle, skips_what_follows_the_response_in_both_versions)
     }
 }
 
-TEST_F(CallCycle, a_reference_behind_the_response_leaves_no_place_waiting_on_the_stack)
+TEST_F(call_cycle, a_reference_behind_the_response_leaves_no_place_waiting_on_the_stack)
 {
     for (const char *where : {"#t", "#nobody"}) {
         const int error = get("<p:getResponse><p:thisURI href=\"" + std::string(where) +
@@ -382,7 +382,7 @@ TEST_F(CallCycle, a_reference_behind_the_response_leaves_no_place_waiting_on_the
     }
 }
 
-TEST_F(CallCycle, sends_a_received_header_back_until_told_otherwise)
+TEST_F(call_cycle, sends_a_received_header_back_until_told_otherwise)
 {
     const std::string header =
         "<E:Header><c:header><c:transactionId>t-9</c:transactionId></c:header></E:Header>";
@@ -407,7 +407,7 @@ TEST_F(CallCycle, sends_a_received_header_back_until_told_otherwise)
     EXPECT_EQ(std::string::npos, wire.sent.find("SOAP-ENV:Header"));
 }
 
-TEST_F(CallCycle, answers_outlive_later_calls_until_destroy)
+TEST_F(call_cycle, answers_outlive_later_calls_until_destroy)
 {
     ASSERT_EQ(0, get(OK));
     const protocolProfile__ProfileContent *first = response.result;
@@ -416,7 +416,7 @@ TEST_F(CallCycle, answers_outlive_later_calls_until_destroy)
     EXPECT_EQ("urn:2", response.result->thisURI.at(0));
 }
 
-TEST_F(CallCycle, what_cannot_be_written_is_refused_before_anything_is_sent)
+TEST_F(call_cycle, what_cannot_be_written_is_refused_before_anything_is_sent)
 {
     protocolProfile__ProfileContent cyclic, unspeakable;
     cyclic.profile = {&cyclic};
@@ -437,7 +437,7 @@ TEST_F(CallCycle, what_cannot_be_written_is_refused_before_anything_is_sent)
 }
 
 // As after any other failure: attachments belong to one call.
-TEST_F(CallCycle, attachments_that_are_refused_are_gone_for_the_next_call)
+TEST_F(call_cycle, attachments_that_are_refused_are_gone_for_the_next_call)
 {
     proxy.output_mode = MODE_DIME;
     for (int i = 0; i < 2; ++i)
@@ -449,7 +449,7 @@ TEST_F(CallCycle, attachments_that_are_refused_are_gone_for_the_next_call)
     EXPECT_EQ(std::string::npos, wire.sent.find("one"));
 }
 
-TEST(Proxy, takes_endpoint_and_modes_and_is_a_copy_of_an_engine)
+TEST(proxy, takes_endpoint_and_modes_and_is_a_copy_of_an_engine)
 {
     const ProfileSoapBindingProxy plain, one(MODE_KEEP_ALIVE), two(MODE_STRICT, MODE_CHUNKED),
         at("http://h/"), at_mode("http://h/", MODE_STORE), copy(static_cast<const soap &>(two));

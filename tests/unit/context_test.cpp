@@ -13,7 +13,7 @@ namespace {
 using testing::internal::CaptureStderr;
 using testing::internal::GetCapturedStderr;
 
-TEST(Context, ends_quietly_and_only_once_and_may_start_again)
+TEST(context, ends_quietly_and_only_once_and_may_start_again)
 {
     CaptureStderr();
     {
@@ -41,7 +41,7 @@ TEST(Context, ends_quietly_and_only_once_and_may_start_again)
     EXPECT_NE(fcntl(1, F_GETFD), -1);
 }
 
-TEST(Context, the_end_closes_what_the_context_opened)
+TEST(context, the_end_closes_what_the_context_opened)
 {
     int pair[2];
     ASSERT_EQ(socketpair(AF_UNIX, SOCK_STREAM, 0, pair), 0);
@@ -65,7 +65,7 @@ struct derived : soap {
 };
 int derived::ended = 0;
 
-TEST(Context, leaves_derived_classes_alone)
+TEST(context, leaves_derived_classes_alone)
 {
     auto made = std::make_unique<derived>();
     made->first_member = 'k';
@@ -86,7 +86,7 @@ TEST(Context, leaves_derived_classes_alone)
     EXPECT_EQ(derived::ended, 2);
 }
 
-TEST(Context, reset_clears_the_message_and_keeps_the_connection)
+TEST(context, reset_clears_the_message_and_keeps_the_connection)
 {
     soap ctx(MODE_KEEP_ALIVE, 0);
     const auto message = [&ctx] {
@@ -116,7 +116,7 @@ TEST(Context, reset_clears_the_message_and_keeps_the_connection)
     EXPECT_EQ(connection(), none);
 }
 
-TEST(Context, the_scratch_of_a_call_is_freed_whole)
+TEST(context, the_scratch_of_a_call_is_freed_whole)
 {
     CaptureStderr();
     {
@@ -146,7 +146,7 @@ int count_hook(soap_instance *instance)
     return 0;
 }
 
-TEST(Context, discard_forgets_instances_that_the_destructor_destroys)
+TEST(context, discard_forgets_instances_that_the_destructor_destroys)
 {
     int destroyed = 0;
     {
@@ -160,7 +160,7 @@ TEST(Context, discard_forgets_instances_that_the_destructor_destroys)
     EXPECT_EQ(destroyed, 1);
 }
 
-TEST(ContextCopy, refuses_what_is_no_context)
+TEST(context_copy, refuses_what_is_no_context)
 {
     soap ended;
     soap_engine_done(&ended);
@@ -176,7 +176,7 @@ TEST(ContextCopy, refuses_what_is_no_context)
     EXPECT_EQ(of_ended.state, 0);
 }
 
-TEST(ContextCopy, keeps_settings_and_shares_nothing_that_is_owned)
+TEST(context_copy, keeps_settings_and_shares_nothing_that_is_owned)
 {
     CaptureStderr();
     {
@@ -210,7 +210,7 @@ TEST(ContextCopy, keeps_settings_and_shares_nothing_that_is_owned)
     EXPECT_EQ(GetCapturedStderr(), "");
 }
 
-TEST(ContextCopy, outlives_its_source)
+TEST(context_copy, outlives_its_source)
 {
     CaptureStderr();
     auto source = std::make_unique<soap>();
@@ -225,7 +225,7 @@ TEST(ContextCopy, outlives_its_source)
     EXPECT_EQ(GetCapturedStderr(), "");
 }
 
-TEST(ContextCopy, shares_the_tls_context_whichever_of_them_ends_first)
+TEST(context_copy, shares_the_tls_context_whichever_of_them_ends_first)
 {
     auto source = std::make_unique<soap>();
     source->tls_context = SSL_CTX_new(TLS_client_method());
@@ -237,7 +237,7 @@ TEST(ContextCopy, shares_the_tls_context_whichever_of_them_ends_first)
     SSL_free(connection);
 }
 
-TEST(ContextCopy, frees_what_its_target_held_and_the_tls_context_that_it_makes)
+TEST(context_copy, frees_what_its_target_held_and_the_tls_context_that_it_makes)
 {
     const soap source;
     const auto held_by = [](const std::function<void()> &round) {
@@ -302,7 +302,7 @@ void expect_no_connection(const soap &made, const char *how)
     EXPECT_STREQ(made.log_paths[SOAP_LOG_SENT], "/dev/null") << how;
 }
 
-TEST(ContextCopy, starts_without_a_connection_however_it_is_made)
+TEST(context_copy, starts_without_a_connection_however_it_is_made)
 {
     static const struct {
         const char *how;
@@ -339,7 +339,7 @@ TEST(ContextCopy, starts_without_a_connection_however_it_is_made)
     }
 }
 
-TEST(ContextMove, takes_all_but_the_connection)
+TEST(context_move, takes_all_but_the_connection)
 {
     CaptureStderr();
     static int closed;
@@ -371,7 +371,7 @@ TEST(ContextMove, takes_all_but_the_connection)
     EXPECT_EQ(GetCapturedStderr(), "") << "nothing leaks, nothing is freed twice";
 }
 
-TEST(ContextCopy, serves_the_connection_that_its_source_accepted_and_closes_only_that)
+TEST(context_copy, serves_the_connection_that_its_source_accepted_and_closes_only_that)
 {
     soap service(MODE_KEEP_ALIVE), client;
     ASSERT_GE(soap_bind(&service, "127.0.0.1", 0, 5), 0);
@@ -409,7 +409,7 @@ TEST(ContextCopy, serves_the_connection_that_its_source_accepted_and_closes_only
     EXPECT_TRUE(is_open(service.master_socket));
 }
 
-TEST(ContextExhausted, start_and_copy_survive_every_refusal)
+TEST(context_exhausted, start_and_copy_survive_every_refusal)
 {
     for (const auto how : {failing_malloc::refuse::one, failing_malloc::refuse::all_from}) {
         CaptureStderr();

@@ -14,7 +14,7 @@ struct local_zone {
     }
 };
 
-class Dates : public testing::Test {
+class dates : public testing::Test {
 protected:
     std::unique_ptr<soap> ctx = std::make_unique<soap>();
 
@@ -30,7 +30,7 @@ protected:
     }
 };
 
-TEST_F(Dates, are_read_in_all_forms_and_zones)
+TEST_F(dates, are_read_in_all_forms_and_zones)
 {
     const struct {
         const char *text;
@@ -64,7 +64,7 @@ TEST_F(Dates, are_read_in_all_forms_and_zones)
     EXPECT_EQ(kept, 5);
 }
 
-TEST_F(Dates, without_a_zone_are_local_time_and_are_written_in_utc)
+TEST_F(dates, without_a_zone_are_local_time_and_are_written_in_utc)
 {
     const local_zone eastern("EST5EDT,M3.2.0,M11.1.0");
     EXPECT_EQ(parsed("2009-02-13T18:31:30"), "1234567890");
@@ -74,7 +74,7 @@ TEST_F(Dates, without_a_zone_are_local_time_and_are_written_in_utc)
     EXPECT_STREQ(soap_datetime_text(ctx.get(), INT64_MAX), "1969-12-31T23:59:59Z");
 }
 
-TEST_F(Dates, random_dates_agree_with_python)
+TEST_F(dates, random_dates_agree_with_python)
 {
     const std::vector<std::string> answers = python_batch(
         "import random\n"

@@ -15,9 +15,9 @@ using namespace binding;
 
 namespace {
 
-class Dispatch : public testing::Test {
+class dispatch : public testing::Test {
 protected:
-    Dispatch() { soap_set_namespaces(&ctx, ProfileSoapBindingProxy().namespaces); }
+    dispatch() { soap_set_namespaces(&ctx, ProfileSoapBindingProxy().namespaces); }
 
     // What a test can't go on without.
     static void *given(void *made)
@@ -116,7 +116,7 @@ protected:
     memory_wire ctx;
 };
 
-TEST_F(Dispatch, what_is_written_by_id_is_read_by_id_and_written_alike)
+TEST_F(dispatch, what_is_written_by_id_is_read_by_id_and_written_alike)
 {
     int kinds[static_cast<int>(type_kind::pointer) + 1] = {};
     for_each_type([&](int type, const std::string &text) {
@@ -138,7 +138,7 @@ TEST_F(Dispatch, what_is_written_by_id_is_read_by_id_and_written_alike)
         EXPECT_GT(kinds[kind], 0) << kind;
 }
 
-TEST_F(Dispatch, an_absent_item_writes_nothing_and_a_nil_record_is_null)
+TEST_F(dispatch, an_absent_item_writes_nothing_and_a_nil_record_is_null)
 {
     std::vector<protocol__Identity *> items = {
         nullptr, soap_instantiate_protocol__Identity(&ctx, -1, nullptr, nullptr, nullptr)};
@@ -152,7 +152,7 @@ TEST_F(Dispatch, an_absent_item_writes_nothing_and_a_nil_record_is_null)
     EXPECT_STREQ("SOAP-ENV:Sender", code->Value);
 }
 
-TEST_F(Dispatch, what_is_cut_short_is_refused)
+TEST_F(dispatch, what_is_cut_short_is_refused)
 {
     for_each_type([&](int type, const std::string &text) {
         for (std::size_t length = 0; length < text.size(); ++length) {
@@ -164,7 +164,7 @@ TEST_F(Dispatch, what_is_cut_short_is_refused)
     });
 }
 
-TEST_F(Dispatch, a_refused_allocation_is_an_error_and_nothing_else)
+TEST_F(dispatch, a_refused_allocation_is_an_error_and_nothing_else)
 {
     std::size_t refusals = 0;
     for_each_type([&](int type, const std::string &text) {
@@ -182,7 +182,7 @@ TEST_F(Dispatch, a_refused_allocation_is_an_error_and_nothing_else)
     EXPECT_GT(refusals, 0u);
 }
 
-TEST_F(Dispatch, arrays_are_made_of_whatever_may_stand_in_one)
+TEST_F(dispatch, arrays_are_made_of_whatever_may_stand_in_one)
 {
     for (int type = 1; type <= TYPE_ID_MAX; ++type) {
         const type_entry &entry = type_entries[type];
@@ -200,7 +200,7 @@ TEST_F(Dispatch, arrays_are_made_of_whatever_may_stand_in_one)
     EXPECT_EQ(nullptr, ctx.instance_list);
 }
 
-TEST_F(Dispatch, elements_nobody_asked_for_are_known_by_type_name_or_id)
+TEST_F(dispatch, elements_nobody_asked_for_are_known_by_type_name_or_id)
 {
     const struct {
         const char *rule, *xml;

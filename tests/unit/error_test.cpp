@@ -54,7 +54,7 @@ std::string filled_text(int error)
     return *soap_fault_string_field(&ctx);
 }
 
-TEST(ErrorText, is_composed_of_what_is_known)
+TEST(error_text, is_composed_of_what_is_known)
 {
     static const struct {
         int error;
@@ -75,7 +75,7 @@ TEST(ErrorText, is_composed_of_what_is_known)
         {26, "Validation constraint violation: incompatible object type ref/id pair #id7 in element 't:tag'"},
         {31, "Zlib/gzip error: ''"},
         {46, "Maximum number of open connections was reached (no define HAVE_POLL): increase FD_SETSIZE"},
-        {200, "Error 200"},
+        {200, "HTTP status 200, but the answer is not a SOAP message"},
         {201, "HTTP Error: 201 Created"},
         {404, "HTTP Error: 404 Not Found"},
         {599, "HTTP Error: 599 "},
@@ -87,7 +87,7 @@ TEST(ErrorText, is_composed_of_what_is_known)
         EXPECT_EQ(filled_text(c.error), c.text) << c.error;
 }
 
-TEST(ErrorText, every_code_has_a_text_of_its_own)
+TEST(error_text, every_code_has_a_text_of_its_own)
 {
     std::set<std::string> texts;
     for (int error = 1; error <= 48; ++error) {
@@ -99,7 +99,7 @@ TEST(ErrorText, every_code_has_a_text_of_its_own)
     }
 }
 
-TEST(ErrorText, constraint_text_names_the_element_if_there_is_one)
+TEST(error_text, constraint_text_names_the_element_if_there_is_one)
 {
     soap ctx;
     EXPECT_STREQ(soap_constraint_text(&ctx, "wrong ", "value"),
@@ -110,7 +110,7 @@ TEST(ErrorText, constraint_text_names_the_element_if_there_is_one)
         << "cut to the buffer";
 }
 
-TEST(Fault, the_code_follows_the_version_unless_the_error_has_its_own)
+TEST(fault, the_code_follows_the_version_unless_the_error_has_its_own)
 {
     static const struct {
         int error;
@@ -139,7 +139,7 @@ TEST(Fault, the_code_follows_the_version_unless_the_error_has_its_own)
     }
 }
 
-TEST(Fault, what_is_set_stays_and_the_hook_comes_first)
+TEST(fault, what_is_set_stays_and_the_hook_comes_first)
 {
     soap ctx;
     EXPECT_EQ(soap_fault_receiver(&ctx, "own text", "own detail", 5), 5);
@@ -159,7 +159,7 @@ TEST(Fault, what_is_set_stays_and_the_hook_comes_first)
     EXPECT_STREQ(*soap_fault_string_field(&hooked), "from the hook");
 }
 
-TEST(Fault, setters_store_what_is_given)
+TEST(fault, setters_store_what_is_given)
 {
     soap ctx;
     ctx.soap_version = 2;
@@ -173,7 +173,7 @@ TEST(Fault, setters_store_what_is_given)
     EXPECT_EQ(ctx.error, SOAP_FAULT);
 }
 
-TEST(Fault, the_three_print_forms_agree)
+TEST(fault, the_three_print_forms_agree)
 {
     soap ctx;
     EXPECT_EQ(printed(&ctx), "") << "error 0";
@@ -189,7 +189,7 @@ TEST(Fault, the_three_print_forms_agree)
               "SOAP 1.1 fault: SOAP-ENV:Client [no subcode]\n\"[no reason]\"\nDetail: [no detail]\n");
 }
 
-TEST(Fault, the_buffer_form_keeps_to_its_length)
+TEST(fault, the_buffer_form_keeps_to_its_length)
 {
     soap ctx;
     ctx.error = SOAP_SYNTAX_ERROR;
@@ -205,7 +205,7 @@ TEST(Fault, the_buffer_form_keeps_to_its_length)
     }
 }
 
-TEST(Fault, a_context_that_has_ended_says_so)
+TEST(fault, a_context_that_has_ended_says_so)
 {
     soap ended;
     soap_engine_done(&ended);
@@ -226,7 +226,7 @@ std::string location(soap *ctx, std::size_t position, const std::string &input)
     return printed;
 }
 
-TEST(FaultLocation, shows_the_input_around_the_place)
+TEST(fault_location, shows_the_input_around_the_place)
 {
     soap ctx;
     EXPECT_EQ(location(&ctx, 3, "<a>bc"), "") << "error 0";
@@ -244,7 +244,7 @@ TEST(FaultLocation, shows_the_input_around_the_place)
     EXPECT_EQ(location(&ctx, SOAP_BUFFER_SIZE, full), full + "\n<!-- ** HERE ** -->\n");
 }
 
-TEST(Fault, without_memory_a_fault_is_still_printed)
+TEST(fault, without_memory_a_fault_is_still_printed)
 {
     soap ctx;
     ctx.error = SOAP_SYNTAX_ERROR;

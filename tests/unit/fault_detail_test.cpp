@@ -115,7 +115,7 @@ template <class F> void goes_both_ways(F *SOAP_ENV__Detail::*member, std::int16_
     }
 }
 
-TEST(FaultDetail, brings_every_fault_in_both_versions)
+TEST(fault_detail, brings_every_fault_in_both_versions)
 {
     for (const std::int16_t version : {std::int16_t{1}, std::int16_t{2}}) {
 #define BOTH_WAYS(name)                                                                                      \
@@ -129,7 +129,7 @@ TEST(FaultDetail, brings_every_fault_in_both_versions)
 }
 
 // What the detail's own members don't take: another class of the registry, and raw text.
-TEST(FaultDetail, brings_an_object_of_any_class_and_raw_text)
+TEST(fault_detail, brings_an_object_of_any_class_and_raw_text)
 {
     protocol__Contact contact;
     std::string name = "n";
@@ -146,7 +146,7 @@ TEST(FaultDetail, brings_an_object_of_any_class_and_raw_text)
     EXPECT_NE(std::string(soap_fault_detail_value(&in)).find("raw"), std::string::npos);
 }
 
-TEST(FaultDetail, refers_to_what_was_marked_twice)
+TEST(fault_detail, refers_to_what_was_marked_twice)
 {
     for (const bool marked : {false, true}) {
         protocol__Client fault;
@@ -162,7 +162,7 @@ TEST(FaultDetail, refers_to_what_was_marked_twice)
     }
 }
 
-TEST(FaultDetail, counts_once_even_if_it_is_nil)
+TEST(fault_detail, counts_once_even_if_it_is_nil)
 {
     memory_wire in;
     ASSERT_EQ(

@@ -52,9 +52,9 @@ int child_that(const child_row &row, std::unique_ptr<client> &own)
     return WIFEXITED(status) ? WEXITSTATUS(status) : -WTERMSIG(status);
 }
 
-class Fork : public tls_peers::tls_test {};
+class forked : public tls_peers::tls_test {};
 
-TEST_F(Fork, a_child_leaves_the_connections_of_its_parent_alone)
+TEST_F(forked, a_child_leaves_the_connections_of_its_parent_alone)
 {
     for (const bool tls : {false, true})
         for (const child_row &row : CHILDREN) {
@@ -72,7 +72,7 @@ TEST_F(Fork, a_child_leaves_the_connections_of_its_parent_alone)
 }
 
 // The pattern of servers that fork for each client.
-TEST_F(Fork, a_child_serves_the_client_that_its_parent_accepted)
+TEST_F(forked, a_child_serves_the_client_that_its_parent_accepted)
 {
     context serving;
     ASSERT_GE(soap_bind(serving.get(), "127.0.0.1", 0, 1), 0);

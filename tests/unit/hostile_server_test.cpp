@@ -14,7 +14,7 @@ namespace {
 using namespace scripted;
 
 constexpr int BRIEF_US = -200000; // as a time limit: microseconds
-constexpr int SLACK_MS = 5000;    // for a machine that is busy
+constexpr int SLACK_MS = 60000;   // for a machine that is busy: what has no limit takes for ever
 
 class hostile_server : public tls_peers::tls_test {};
 
@@ -290,6 +290,7 @@ TEST_F(hostile_server, meets_a_call_before_its_answer)
         EXPECT_GE(milliseconds, o.least_ms) << o.name;
         EXPECT_LT(milliseconds, o.least_ms + SLACK_MS) << o.name;
         caller.endpoint = good;
+        caller.proxy.connect_timeout = caller.proxy.send_timeout = 0; // they were for the obstacle
         EXPECT_EQ(caller.call(), 0) << o.name;
     }
 }

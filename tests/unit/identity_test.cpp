@@ -15,7 +15,7 @@ void expect_empty_table(const soap &ctx)
         ASSERT_EQ(head, nullptr);
 }
 
-TEST(PointerTable, finds_objects_by_address_and_type_at_every_size)
+TEST(pointer_table, finds_objects_by_address_and_type_at_every_size)
 {
     soap ctx;
     std::vector<std::array<char, 64>> objects(30000);
@@ -34,7 +34,7 @@ TEST(PointerTable, finds_objects_by_address_and_type_at_every_size)
     expect_empty_table(ctx);
 }
 
-TEST(PointerTable, finds_arrays_by_content_and_sizes)
+TEST(pointer_table, finds_arrays_by_content_and_sizes)
 {
     struct holder {
         const char *content;
@@ -58,7 +58,7 @@ TEST(PointerTable, finds_arrays_by_content_and_sizes)
     expect_empty_table(ctx);
 }
 
-TEST(MarkPass, enters_an_object_once_and_then_knows_it_is_shared)
+TEST(mark_pass, enters_an_object_once_and_then_knows_it_is_shared)
 {
     soap ctx;
     int shared = 0, single = 0, unseen = 0;
@@ -78,7 +78,7 @@ TEST(MarkPass, enters_an_object_once_and_then_knows_it_is_shared)
     EXPECT_EQ(soap_pointer_find(&ctx, &unseen, 30, nullptr), 0);
 }
 
-TEST(MarkPass, ends_where_memory_does)
+TEST(mark_pass, ends_where_memory_does)
 {
     soap ctx;
     int object = 0, second = 0;
@@ -98,7 +98,7 @@ TEST(MarkPass, ends_where_memory_does)
 enum style { LITERAL, ENCODED };
 enum pass { COUNT, SEND };
 
-class Forms : public testing::Test {
+class forms : public testing::Test {
 protected:
     memory_wire ctx;
     int object = 0;
@@ -158,7 +158,7 @@ const form_case FORMS[] = {
     {"graph over encoded 1.1", 1, ENCODED, SOAP_XML_GRAPH, PART_BODY, 2, -1, 1, 1, 1, 1},
 };
 
-TEST_F(Forms, follow_version_style_and_mode)
+TEST_F(forms, follow_version_style_and_mode)
 {
     for (const form_case &row : FORMS)
         for (const pass phase : {COUNT, SEND}) {
@@ -176,7 +176,7 @@ TEST_F(Forms, follow_version_style_and_mode)
         }
 }
 
-TEST_F(Forms, unknown_and_null_objects_have_none)
+TEST_F(forms, unknown_and_null_objects_have_none)
 {
     int stranger = 0;
     begin(2, ENCODED, 0, PART_BODY, SEND, 2);
@@ -189,7 +189,7 @@ TEST_F(Forms, unknown_and_null_objects_have_none)
     EXPECT_EQ(soap_pointer_is_single(&ctx, nullptr), 0);
 }
 
-TEST_F(Forms, an_independent_object_is_begun_once)
+TEST_F(forms, an_independent_object_is_begun_once)
 {
     begin(2, ENCODED, 0, PART_BODY, SEND, 2);
     EXPECT_EQ(multiref(), 1);
@@ -225,7 +225,7 @@ std::vector<std::string> texts_of_one_bucket(std::size_t count)
     return texts;
 }
 
-TEST(IdTable, many_ids_of_one_bucket_stay_apart_and_cheap)
+TEST(id_table, many_ids_of_one_bucket_stay_apart_and_cheap)
 {
     constexpr std::size_t COUNT = 200000;
     soap ctx;
@@ -253,7 +253,7 @@ struct pair_value {
     std::uint64_t one, two;
 };
 
-class Ids : public testing::Test {
+class id_numbers : public testing::Test {
 public:
     soap ctx;
 
@@ -274,7 +274,7 @@ public:
     }
 };
 
-TEST_F(Ids, registering_makes_the_object_if_none_is_given)
+TEST_F(id_numbers, registering_makes_the_object_if_none_is_given)
 {
     void *made = put("#a", nullptr);
     ASSERT_NE(made, nullptr);
@@ -292,7 +292,7 @@ TEST_F(Ids, registering_makes_the_object_if_none_is_given)
     EXPECT_EQ(soap_id_lookup(&ctx, "#b")->size, 3U);
 }
 
-TEST_F(Ids, disagreement_and_repetition_are_errors)
+TEST_F(id_numbers, disagreement_and_repetition_are_errors)
 {
     struct step {
         enum { PUT, COPY, REFER } what;
@@ -337,7 +337,7 @@ TEST_F(Ids, disagreement_and_repetition_are_errors)
     }
 }
 
-TEST_F(Ids, pointers_are_filled_through_their_indirections)
+TEST_F(id_numbers, pointers_are_filled_through_their_indirections)
 {
     for (const bool with_direct : {true, false}) {
         pair_value object = {1, 2};
@@ -362,7 +362,7 @@ TEST_F(Ids, pointers_are_filled_through_their_indirections)
     }
 }
 
-TEST_F(Ids, a_missing_id_is_an_error_unless_it_lies_outside)
+TEST_F(id_numbers, a_missing_id_is_an_error_unless_it_lies_outside)
 {
     void *outside[2] = {&ctx, &ctx}, *missing = &ctx;
     refer("cid:part", &outside[0]);
@@ -377,7 +377,7 @@ TEST_F(Ids, a_missing_id_is_an_error_unless_it_lies_outside)
     EXPECT_EQ(missing, nullptr);
 }
 
-TEST_F(Ids, small_values_and_hooks_are_copied_late)
+TEST_F(id_numbers, small_values_and_hooks_are_copied_late)
 {
     std::int32_t source = 0, places[2] = {7, 7};
     copy("#n", &places[0], 1, sizeof source);
@@ -393,7 +393,7 @@ TEST_F(Ids, small_values_and_hooks_are_copied_late)
     EXPECT_EQ(soap_forward_has_pending(&ctx, places, places + 2), 0);
 }
 
-TEST_F(Ids, copies_are_dropped_when_the_level_of_an_id_falls)
+TEST_F(id_numbers, copies_are_dropped_when_the_level_of_an_id_falls)
 {
     pair_value object = {5, 6}, place = {7, 8};
     void *far = nullptr, *near = nullptr;
@@ -408,7 +408,7 @@ TEST_F(Ids, copies_are_dropped_when_the_level_of_an_id_falls)
     EXPECT_EQ(*static_cast<void **>(far), &object);
 }
 
-TEST_F(Ids, long_chains_of_copies_are_filled_in_any_order)
+TEST_F(id_numbers, long_chains_of_copies_are_filled_in_any_order)
 {
     constexpr std::size_t COUNT = 100000;
     std::vector<pair_value> values(COUNT);
@@ -423,7 +423,7 @@ TEST_F(Ids, long_chains_of_copies_are_filled_in_any_order)
         ASSERT_EQ(value.two, 12U);
 }
 
-TEST_F(Ids, what_waits_moves_with_its_block)
+TEST_F(id_numbers, what_waits_moves_with_its_block)
 {
     constexpr std::size_t COUNT = 6; // elements
     constexpr std::size_t WIDTH = 6; // words: pointer, two of a value, a small value, two of a value
@@ -461,7 +461,7 @@ TEST_F(Ids, what_waits_moves_with_its_block)
 
 // A message of values, each of its own or a copy of another, and of composites of two values that are copied
 // whole. The elements arrive in random order. Graphs of pointers are those of tests/classes/graph_test.cpp.
-TEST_F(Ids, random_graphs_resolve_as_a_model_does)
+TEST_F(id_numbers, random_graphs_resolve_as_a_model_does)
 {
     struct composite {
         pair_value left, right;
@@ -533,7 +533,7 @@ TEST_F(Ids, random_graphs_resolve_as_a_model_does)
     }
 }
 
-TEST_F(Ids, every_allocation_may_fail)
+TEST_F(id_numbers, every_allocation_may_fail)
 {
     constexpr std::size_t COUNT = 3000; // enough for the index of many ids
     std::vector<std::string> ids;

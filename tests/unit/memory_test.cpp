@@ -24,14 +24,14 @@ int note_destruction(soap_instance *instance)
     return instance->type_id < 0 ? 1 : 0; // negative: refuses
 }
 
-class Memory : public testing::Test {
+class memory : public testing::Test {
 protected:
     void SetUp() override { destroyed.clear(); }
 
     soap ctx;
 };
 
-TEST_F(Memory, names_frees_of_blocks_that_are_not_live_and_leaks)
+TEST_F(memory, names_frees_of_blocks_that_are_not_live_and_leaks)
 {
     char outside = 0;
     auto *other = new soap;
@@ -54,7 +54,7 @@ TEST_F(Memory, names_frees_of_blocks_that_are_not_live_and_leaks)
     std::free(leaked);
 }
 
-TEST_F(Memory, remembers_many_blocks_and_a_bounded_number_of_freed_ones)
+TEST_F(memory, remembers_many_blocks_and_a_bounded_number_of_freed_ones)
 {
     constexpr std::size_t COUNT = 100000;
     std::vector<void *> blocks;
@@ -71,7 +71,7 @@ TEST_F(Memory, remembers_many_blocks_and_a_bounded_number_of_freed_ones)
                                        ") double free of pointer malloced at a(1)\n");
 }
 
-TEST_F(Memory, calls_reuse_what_earlier_calls_needed)
+TEST_F(memory, calls_reuse_what_earlier_calls_needed)
 {
     const auto call = [this] {
         for (int i = 0; i < 1000; ++i) {
@@ -91,7 +91,7 @@ TEST_F(Memory, calls_reuse_what_earlier_calls_needed)
         << "one for each block, none for the book-keeping";
 }
 
-TEST_F(Memory, managed_blocks_keep_their_size_alignment_and_canary)
+TEST_F(memory, managed_blocks_keep_their_size_alignment_and_canary)
 {
     for (std::size_t size = 1; size <= 70; ++size) {
         auto *block = static_cast<char *>(soap_block_alloc(&ctx, size));
@@ -105,7 +105,7 @@ TEST_F(Memory, managed_blocks_keep_their_size_alignment_and_canary)
     }
 }
 
-TEST_F(Memory, an_empty_block_is_shared_and_the_hosts_allocator_takes_the_place_of_others)
+TEST_F(memory, an_empty_block_is_shared_and_the_hosts_allocator_takes_the_place_of_others)
 {
     static char area[16];
     ctx.on_malloc = [](soap *, std::size_t size) -> void * { return size <= sizeof area ? area : nullptr; };
@@ -126,7 +126,7 @@ TEST_F(Memory, an_empty_block_is_shared_and_the_hosts_allocator_takes_the_place_
     EXPECT_EQ(std::u32string(soap_wide_string_dup(&ctx, U"\U0001F600x")), U"\U0001F600x");
 }
 
-TEST_F(Memory, one_byte_into_the_padding_is_harmless_one_past_it_is_reported)
+TEST_F(memory, one_byte_into_the_padding_is_harmless_one_past_it_is_reported)
 {
     auto *padded = static_cast<char *>(soap_block_alloc(&ctx, 3)); // spans 8: three bytes of padding
     padded[5] = 'x';
@@ -152,7 +152,7 @@ TEST_F(Memory, one_byte_into_the_padding_is_harmless_one_past_it_is_reported)
     damaged[6] = canary;
 }
 
-TEST_F(Memory, frees_one_block_or_one_instance_by_address_and_then_all_with_the_fields_that_live_there)
+TEST_F(memory, frees_one_block_or_one_instance_by_address_and_then_all_with_the_fields_that_live_there)
 {
     void *first = soap_block_alloc(&ctx, 8);
     ctx.action = ctx.auth_user = ctx.mime.boundary = soap_string_dup(&ctx, "a");
@@ -176,7 +176,7 @@ TEST_F(Memory, frees_one_block_or_one_instance_by_address_and_then_all_with_the_
     EXPECT_EQ(ctx.allocation_list, nullptr);
 }
 
-TEST_F(Memory, destroys_instances_newest_first_and_names_refusals)
+TEST_F(memory, destroys_instances_newest_first_and_names_refusals)
 {
     int objects[3];
     soap_instance_register(&ctx, &objects[0], 1, -1, note_destruction);
@@ -192,7 +192,7 @@ TEST_F(Memory, destroys_instances_newest_first_and_names_refusals)
     EXPECT_EQ(ctx.fault, nullptr);
 }
 
-TEST_F(Memory, what_is_taken_out_of_management_is_the_callers)
+TEST_F(memory, what_is_taken_out_of_management_is_the_callers)
 {
     int object = 0;
     char *text = soap_string_dup(&ctx, "kept");
@@ -212,7 +212,7 @@ TEST_F(Memory, what_is_taken_out_of_management_is_the_callers)
     std::free(text);
 }
 
-TEST_F(Memory, blocks_and_instances_move_to_another_context)
+TEST_F(memory, blocks_and_instances_move_to_another_context)
 {
     auto *source = new soap;
     char *own = soap_string_dup(&ctx, "own");
@@ -232,7 +232,7 @@ TEST_F(Memory, blocks_and_instances_move_to_another_context)
     EXPECT_EQ(GetCapturedStderr(), "");
 }
 
-TEST_F(Memory, a_damaged_block_stops_the_move)
+TEST_F(memory, a_damaged_block_stops_the_move)
 {
     soap target;
     char *block = soap_string_dup(&ctx, "12345"); // six bytes: the canary follows at once
@@ -251,7 +251,7 @@ void append_block(soap *ctx, const char *text)
     std::memcpy(soap_block_stack_grow(ctx, nullptr, std::strlen(text)), text, std::strlen(text));
 }
 
-TEST_F(Memory, a_block_stack_gathers_in_order_and_is_read_oldest_first)
+TEST_F(memory, a_block_stack_gathers_in_order_and_is_read_oldest_first)
 {
     EXPECT_EQ(soap_block_stack_grow(&ctx, nullptr, 8), nullptr) << "there is no stack";
     EXPECT_EQ(soap_block_stack_first(&ctx, nullptr), nullptr);
@@ -284,7 +284,7 @@ TEST_F(Memory, a_block_stack_gathers_in_order_and_is_read_oldest_first)
     EXPECT_EQ(ctx.block_stack, nullptr);
 }
 
-TEST_F(Memory, growing_text_doubles_from256)
+TEST_F(memory, growing_text_doubles_from256)
 {
     const std::string text(200, 'a'), more(1000, 'b');
     EXPECT_EQ(soap_text_buffer_put(&ctx, text.data(), text.size()), 0);
@@ -298,7 +298,7 @@ TEST_F(Memory, growing_text_doubles_from256)
     EXPECT_EQ(std::string(ctx.label_buffer, ctx.label_index), "c");
 }
 
-TEST_F(Memory, sizes_beyond_the_address_space_are_out_of_memory)
+TEST_F(memory, sizes_beyond_the_address_space_are_out_of_memory)
 {
     const auto expect_refusal = [this] {
         EXPECT_EQ(ctx.error, SOAP_OUT_OF_MEMORY);
@@ -319,7 +319,7 @@ TEST_F(Memory, sizes_beyond_the_address_space_are_out_of_memory)
     expect_refusal();
 }
 
-TEST(MemoryExhausted, texts_and_gathered_blocks_give_an_error_and_leave_nothing)
+TEST(memory_exhausted, texts_and_gathered_blocks_give_an_error_and_leave_nothing)
 {
     int (*const runs[])(soap & ctx) = {
         [](soap &ctx) { return soap_wide_string_dup(&ctx, U"abc") == nullptr ? ctx.error : 0; },
@@ -336,7 +336,7 @@ TEST(MemoryExhausted, texts_and_gathered_blocks_give_an_error_and_leave_nothing)
     EXPECT_EQ(GetCapturedStderr(), "");
 }
 
-TEST(MemoryExhausted, a_move_fails_whole_or_not_at_all)
+TEST(memory_exhausted, a_move_fails_whole_or_not_at_all)
 {
     soap source, target;
     for (int i = 0; i < 600; ++i) {

@@ -1,6 +1,6 @@
 // The namespace table's working copy and the prefixes in scope.
-#include <chrono>
 
+#include "support/cpu_time.h"
 #include "support/writer_fixture.h"
 #include "xml/namespace.h"
 
@@ -174,11 +174,11 @@ TEST(namespaces, many_prefixes_in_scope_are_found_fast_and_bounded)
         ASSERT_EQ(declare(ctx, ("p" + std::to_string(i)).c_str(), ("urn:" + std::to_string(i)).c_str()), -1);
     EXPECT_EQ(soap_prefix_push_in(ctx, "more", "urn:more"), nullptr);
     EXPECT_EQ(ctx->error, SOAP_LENGTH);
-    const auto begin = std::chrono::steady_clock::now();
+    const double begin = cpu_time();
     for (int i = 0; i < 100000; ++i)
         ASSERT_TRUE(xml_prefix_find(ctx, "p0"));
     // A walk over all of them would take a hundred times as long.
-    EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::seconds(2));
+    EXPECT_LT(cpu_time() - begin, 2.0);
     EXPECT_EQ(uri_of(ctx, "p777:x"), "urn:777");
     soap_prefix_pop(ctx);
     EXPECT_EQ(xml_prefix_find(ctx, "p777"), nullptr);

@@ -8,7 +8,7 @@
 
 namespace {
 
-class Numbers : public testing::Test {
+class numbers : public testing::Test {
 protected:
     std::unique_ptr<soap> ctx = std::make_unique<soap>();
 
@@ -25,7 +25,7 @@ protected:
     }
 };
 
-TEST_F(Numbers, take_the_whole_text_within_their_range)
+TEST_F(numbers, take_the_whole_text_within_their_range)
 {
     EXPECT_EQ(parsed(soap_byte_parse, "-128"), "0 -128");
     EXPECT_EQ(parsed(soap_byte_parse, "128"), "4 -128");
@@ -61,7 +61,7 @@ TEST_F(Numbers, take_the_whole_text_within_their_range)
     EXPECT_EQ(parsed(soap_ulong64_parse, ""), "4 77");
 }
 
-TEST_F(Numbers, a_failed_look_up_stands_for_a_missing_attribute)
+TEST_F(numbers, a_failed_look_up_stands_for_a_missing_attribute)
 {
     std::int32_t value = 3;
     ctx->error = SOAP_REQUIRED;
@@ -70,7 +70,7 @@ TEST_F(Numbers, a_failed_look_up_stands_for_a_missing_attribute)
     EXPECT_EQ(soap_int_parse(ctx.get(), "4", &value), 0) << "an old error is not the parser's";
 }
 
-TEST_F(Numbers, floating_text_is_what_the_c_library_takes_and_names_in_any_case)
+TEST_F(numbers, floating_text_is_what_the_c_library_takes_and_names_in_any_case)
 {
     constexpr double NONE = -77; // refused
     const struct {
@@ -107,7 +107,7 @@ TEST_F(Numbers, floating_text_is_what_the_c_library_takes_and_names_in_any_case)
     EXPECT_STREQ(soap_double_text(ctx.get(), HUGE_VAL), "INF");
 }
 
-TEST_F(Numbers, the_hosts_locale_does_not_reach_the_wire)
+TEST_F(numbers, the_hosts_locale_does_not_reach_the_wire)
 {
     // A locale of our own, as glibc keeps it, whose decimal point is "~": no machine need have it.
     static const char CATEGORY[] =
@@ -136,7 +136,7 @@ TEST_F(Numbers, the_hosts_locale_does_not_reach_the_wire)
     EXPECT_STREQ(soap_double_text(ctx.get(), 5), "1.5");
 }
 
-TEST_F(Numbers, texts_go_through_the_contexts_formats)
+TEST_F(numbers, texts_go_through_the_contexts_formats)
 {
     EXPECT_STREQ(soap_long_text(ctx.get(), INT64_MIN), "-9223372036854775808");
     EXPECT_STREQ(soap_ulong_text(ctx.get(), UINT64_MAX), "18446744073709551615");
@@ -147,7 +147,7 @@ TEST_F(Numbers, texts_go_through_the_contexts_formats)
 }
 
 // Python prints and reads the nearest value, as the engine must.
-TEST_F(Numbers, random_values_agree_with_python)
+TEST_F(numbers, random_values_agree_with_python)
 {
     std::mt19937_64 random(1);
     std::vector<double> values;

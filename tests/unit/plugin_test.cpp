@@ -47,12 +47,12 @@ int add(soap *ctx, wanted want)
     return soap_register_plugin_arg(ctx, create, &want);
 }
 
-class Plugin : public testing::Test {
+class plugin : public testing::Test {
 protected:
     void SetUp() override { deleted.clear(); }
 };
 
-TEST_F(Plugin, the_newest_of_an_id_is_found_by_content)
+TEST_F(plugin, the_newest_of_an_id_is_found_by_content)
 {
     soap ctx;
     EXPECT_EQ(add(&ctx, {"id", "old", nullptr}), 0);
@@ -66,7 +66,7 @@ TEST_F(Plugin, the_newest_of_an_id_is_found_by_content)
     EXPECT_STREQ(static_cast<char *>(soap_plugin_find(&ctx, "other")), "x");
 }
 
-TEST_F(Plugin, one_that_fails_or_cannot_be_deleted_is_not_kept)
+TEST_F(plugin, one_that_fails_or_cannot_be_deleted_is_not_kept)
 {
     testing::internal::CaptureStderr();
     {
@@ -79,7 +79,7 @@ TEST_F(Plugin, one_that_fails_or_cannot_be_deleted_is_not_kept)
     EXPECT_TRUE(deleted.empty());
 }
 
-TEST_F(Plugin, they_are_deleted_newest_first)
+TEST_F(plugin, they_are_deleted_newest_first)
 {
     {
         soap ctx;
@@ -89,7 +89,7 @@ TEST_F(Plugin, they_are_deleted_newest_first)
     EXPECT_EQ(deleted, (std::vector<std::string>{"second", "first"}));
 }
 
-TEST_F(Plugin, a_copy_reverses_them_and_deletes_only_what_it_copied)
+TEST_F(plugin, a_copy_reverses_them_and_deletes_only_what_it_copied)
 {
     soap source;
     add(&source, {"shared", "shared", nullptr});
@@ -105,7 +105,7 @@ TEST_F(Plugin, a_copy_reverses_them_and_deletes_only_what_it_copied)
     EXPECT_EQ(deleted, std::vector<std::string>{"copied"});
 }
 
-TEST_F(Plugin, a_refusal_fails_the_copy_without_a_leak)
+TEST_F(plugin, a_refusal_fails_the_copy_without_a_leak)
 {
     testing::internal::CaptureStderr();
     {
@@ -127,7 +127,7 @@ TEST_F(Plugin, a_refusal_fails_the_copy_without_a_leak)
     EXPECT_EQ(deleted, (std::vector<std::string>{"copied", "copied", "c", "r"}));
 }
 
-TEST_F(Plugin, registration_without_memory_gives_its_error)
+TEST_F(plugin, registration_without_memory_gives_its_error)
 {
     soap ctx;
     const failing_malloc::scope armed(1, failing_malloc::refuse::all_from);

@@ -220,7 +220,7 @@ std::string answer(const operation &row)
     return message(row, "<" + tag + ">" + row.answer_content + "</" + tag + ">");
 }
 
-TEST(Ports, have_a_row_for_every_operation_that_their_descriptions_name)
+TEST(ports, have_a_row_for_every_operation_that_their_descriptions_name)
 {
     std::set<std::string> named, rows;
     for (const auto &file : std::filesystem::recursive_directory_iterator(ZUV_SCHEMA_DIR)) {
@@ -246,7 +246,7 @@ TEST(Ports, have_a_row_for_every_operation_that_their_descriptions_name)
     EXPECT_EQ(named, rows);
 }
 
-TEST(Ports, send_the_golden_request_and_read_the_answer_into_its_class)
+TEST(ports, send_the_golden_request_and_read_the_answer_into_its_class)
 {
     for (operation &row : all_rows()) {
         SCOPED_TRACE(row.tag());
@@ -274,7 +274,7 @@ TEST(Ports, send_the_golden_request_and_read_the_answer_into_its_class)
 }
 
 // Rows and faults go around together, so that each fault of the contract is met in both versions.
-TEST(Ports, read_every_fault_into_its_member_of_the_detail)
+TEST(ports, read_every_fault_into_its_member_of_the_detail)
 {
     static const char *const spelled[] = {
 #define NAME(fault) #fault,

@@ -16,7 +16,7 @@ const soap_namespace TABLE[] = {
 const std::string DECLARED = " xmlns:xsi=\"http://www.w3.org/2001/XMLSchema-instance\""
                              " xmlns:s=\"http://www.w3.org/2001/XMLSchema\"";
 
-class Elements : public testing::Test {
+class elements : public testing::Test {
 protected:
     memory_wire ctx;
 
@@ -41,7 +41,7 @@ template <auto Read> bool reads(soap *ctx, const char *type)
 }
 
 // Each reader with the types that it takes besides its own, and one that it must refuse.
-TEST_F(Elements, accept_the_types_that_fit_their_reader)
+TEST_F(elements, accept_the_types_that_fit_their_reader)
 {
     const struct {
         const char *own;
@@ -85,7 +85,7 @@ TEST_F(Elements, accept_the_types_that_fit_their_reader)
     EXPECT_EQ(*seconds, 1234567890);
 }
 
-TEST_F(Elements, values_come_with_their_end_tag_and_errors_without)
+TEST_F(elements, values_come_with_their_end_tag_and_errors_without)
 {
     receive("<v> 12 <x>dropped</x></v>");
     std::int32_t value = 0;
@@ -104,7 +104,7 @@ TEST_F(Elements, values_come_with_their_end_tag_and_errors_without)
     EXPECT_EQ(soap_int_in(&ctx, "w", &value, "xsd:int", 1), &value);
 }
 
-TEST_F(Elements, references_are_filled_at_the_end)
+TEST_F(elements, references_are_filled_at_the_end)
 {
     receive("<n href=\"#n\"/><d href=\"#d\"></d><n id=\"n\">7</n><d id=\"d\">2.5</d><n href=\"#d\"/>");
     std::int32_t number = 0, other = 0;
@@ -120,7 +120,7 @@ TEST_F(Elements, references_are_filled_at_the_end)
     EXPECT_EQ(value, 2.5);
 }
 
-TEST_F(Elements, are_written_with_type_and_text)
+TEST_F(elements, are_written_with_type_and_text)
 {
     ctx.namespace_state = 1;
     const std::int8_t byte = -1;
@@ -137,7 +137,7 @@ TEST_F(Elements, are_written_with_type_and_text)
     EXPECT_NE(soap_byte_out(&ctx, "a:v", -1, &byte, "", 3), 0);
 }
 
-TEST_F(Elements, array_types_may_be_any_type)
+TEST_F(elements, array_types_may_be_any_type)
 {
     receive("");
     for (const std::string type : {"", "s:int", "s:anyType", "s:ur-type", "s:string"}) {
@@ -148,7 +148,7 @@ TEST_F(Elements, array_types_may_be_any_type)
 
 // --- QNames ---
 
-TEST_F(Elements, q_names_are_mapped_to_the_table)
+TEST_F(elements, q_names_are_mapped_to_the_table)
 {
     const struct {
         const char *rule;
@@ -195,7 +195,7 @@ TEST_F(Elements, q_names_are_mapped_to_the_table)
     EXPECT_STREQ(mapped, "p:x y") << "without declarations nothing is mapped";
 }
 
-TEST_F(Elements, q_names_go_out_under_the_prefixes_of_the_table)
+TEST_F(elements, q_names_go_out_under_the_prefixes_of_the_table)
 {
     receive("");
     soap_attr_table_reset(&ctx);
@@ -211,7 +211,7 @@ TEST_F(Elements, q_names_go_out_under_the_prefixes_of_the_table)
 
 // --- tables ---
 
-TEST_F(Elements, tables_of_names_are_searched_exactly)
+TEST_F(elements, tables_of_names_are_searched_exactly)
 {
     const soap_code_row table[] = {{1, "one"}, {2, "two"}, {4, "four"}, {6, "both"}, {0, nullptr}};
     EXPECT_EQ(soap_name_to_code(table, "two", -1), 2);
@@ -233,7 +233,7 @@ TEST_F(Elements, tables_of_names_are_searched_exactly)
 
 // --- arrays ---
 
-TEST_F(Elements, array_sizes_multiply_within_their_bound)
+TEST_F(elements, array_sizes_multiply_within_their_bound)
 {
     const struct {
         const char *text;
@@ -261,7 +261,7 @@ TEST_F(Elements, array_sizes_multiply_within_their_bound)
     }
 }
 
-TEST_F(Elements, offsets_count_from_the_start_of_the_array)
+TEST_F(elements, offsets_count_from_the_start_of_the_array)
 {
     const struct {
         const char *text, *offset_text;
@@ -288,7 +288,7 @@ TEST_F(Elements, offsets_count_from_the_start_of_the_array)
     EXPECT_EQ(soap_array_offset_parse("[999999,999999,999999]", huge, nullptr, 3), -1);
 }
 
-TEST_F(Elements, positions_are_read_up_to_their_limit)
+TEST_F(elements, positions_are_read_up_to_their_limit)
 {
     int numbers[SOAP_POSITIONS_MAX] = {};
     EXPECT_EQ(soap_position_parse("[3,-4]", numbers), 2);

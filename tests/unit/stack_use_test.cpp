@@ -61,7 +61,7 @@ void expect_bounded(const char *rule, const std::function<void(std::size_t)> &wi
     std::printf("%s: %zu bytes of stack a level\n", rule, bytes);
 }
 
-TEST(StackUse, of_reading_one_level)
+TEST(stack_use, of_reading_one_level)
 {
     static const struct {
         const char *rule, *begin, *end, *around_begin, *around_end;
@@ -79,7 +79,7 @@ TEST(StackUse, of_reading_one_level)
         });
 }
 
-TEST(StackUse, of_writing_one_level)
+TEST(stack_use, of_writing_one_level)
 {
     expect_bounded("a list", [](std::size_t levels) {
         std::deque<protocolProfile__ProfileContent> profiles(levels);

@@ -91,9 +91,9 @@ void call_all(client &own)
     EXPECT_EQ(own.connections, CALLS / ANEW);
 }
 
-class Threads : public tls_peers::tls_test, public testing::WithParamInterface<bool> {};
+class proxy_threads : public tls_peers::tls_test, public testing::WithParamInterface<bool> {};
 
-TEST_P(Threads, call_by_proxies_of_their_own)
+TEST_P(proxy_threads, call_by_proxies_of_their_own)
 {
     const crowd_server server(GetParam());
     on_threads([&] {
@@ -103,7 +103,7 @@ TEST_P(Threads, call_by_proxies_of_their_own)
     EXPECT_EQ(server.connections(), THREADS * (CALLS / ANEW));
 }
 
-TEST_P(Threads, call_by_copies_of_one_context)
+TEST_P(proxy_threads, call_by_copies_of_one_context)
 {
     const crowd_server server(GetParam());
     const client settings(server);
@@ -114,7 +114,7 @@ TEST_P(Threads, call_by_copies_of_one_context)
     EXPECT_EQ(settings.connections, 0);
 }
 
-TEST_P(Threads, share_a_plug_in)
+TEST_P(proxy_threads, share_a_plug_in)
 {
     const crowd_server server(GetParam());
     for (const auto create : {share, share_and_note}) {
@@ -132,7 +132,7 @@ TEST_P(Threads, share_a_plug_in)
     }
 }
 
-INSTANTIATE_TEST_SUITE_P(, Threads, testing::Bool(),
+INSTANTIATE_TEST_SUITE_P(, proxy_threads, testing::Bool(),
                          [](const auto &row) { return std::string(row.param ? "TLS" : "plain"); });
 
 } // namespace

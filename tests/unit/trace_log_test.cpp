@@ -15,7 +15,7 @@ std::string content_of(const std::string &path)
     return text.str();
 }
 
-class TraceLog : public testing::Test {
+class trace_log : public testing::Test {
 protected:
     void SetUp() override
     {
@@ -38,7 +38,7 @@ protected:
     std::string directory;
 };
 
-TEST_F(TraceLog, both_directions_go_to_the_default_file_at_their_first_byte)
+TEST_F(trace_log, both_directions_go_to_the_default_file_at_their_first_byte)
 {
     soap ctx;
     set_default(path("later.log"));
@@ -53,7 +53,7 @@ TEST_F(TraceLog, both_directions_go_to_the_default_file_at_their_first_byte)
     EXPECT_EQ(content_of(path("default.log")), std::string("out\0put;input;!", 15)) << "appended";
 }
 
-TEST_F(TraceLog, a_channel_follows_its_own_path)
+TEST_F(trace_log, a_channel_follows_its_own_path)
 {
     soap ctx;
     write(ctx, SOAP_LOG_SENT, "a");
@@ -67,7 +67,7 @@ TEST_F(TraceLog, a_channel_follows_its_own_path)
     EXPECT_EQ(ctx.log_streams[SOAP_LOG_RECEIVED], nullptr);
 }
 
-TEST_F(TraceLog, holds_the_bytes_on_the_wire_and_what_they_unpack_to)
+TEST_F(trace_log, holds_the_bytes_on_the_wire_and_what_they_unpack_to)
 {
     const std::string sent = path("sent.log"), received = path("received.log"), body = "<plain/>";
     memory_wire wire(0, MODE_BUFFERED | MODE_BARE_XML | MODE_DEFLATE);
@@ -83,7 +83,7 @@ TEST_F(TraceLog, holds_the_bytes_on_the_wire_and_what_they_unpack_to)
     EXPECT_EQ(content_of(received), wire.sent() + body);
 }
 
-TEST_F(TraceLog, a_new_file_is_for_its_owner_alone_and_an_old_one_is_left_as_it_is)
+TEST_F(trace_log, a_new_file_is_for_its_owner_alone_and_an_old_one_is_left_as_it_is)
 {
     const mode_t before = umask(0);
     std::ofstream(path("old.log")) << "old;";
@@ -101,7 +101,7 @@ TEST_F(TraceLog, a_new_file_is_for_its_owner_alone_and_an_old_one_is_left_as_it_
     EXPECT_EQ(content_of(path("old.log")), "old;more");
 }
 
-TEST_F(TraceLog, a_file_that_cannot_be_opened_is_tried_again)
+TEST_F(trace_log, a_file_that_cannot_be_opened_is_tried_again)
 {
     soap ctx;
     soap_log_set_sent(&ctx, path("missing/sent.log").c_str());
@@ -112,7 +112,7 @@ TEST_F(TraceLog, a_file_that_cannot_be_opened_is_tried_again)
     EXPECT_EQ(content_of(path("missing/sent.log")), "kept");
 }
 
-TEST_F(TraceLog, a_default_without_text_or_terminator_is_safe)
+TEST_F(trace_log, a_default_without_text_or_terminator_is_safe)
 {
     set_default("");
     {
@@ -124,7 +124,7 @@ TEST_F(TraceLog, a_default_without_text_or_terminator_is_safe)
     EXPECT_EQ(std::strlen(ctx.log_paths[SOAP_LOG_SENT]), SOAP_LOG_PATH_SIZE);
 }
 
-TEST_F(TraceLog, without_memory_for_a_path_the_channel_is_off)
+TEST_F(trace_log, without_memory_for_a_path_the_channel_is_off)
 {
     soap ctx;
     {
@@ -144,7 +144,7 @@ std::string redacted(const std::string &message)
     return std::string(result.get(), static_cast<std::size_t>(length));
 }
 
-TEST(Redaction, blanks_certificates_of_the_two_prefixes)
+TEST(redaction, blanks_certificates_of_the_two_prefixes)
 {
     static const struct {
         const char *rule, *message, *expected;

@@ -47,7 +47,7 @@ std::string tree(soap *ctx)
     return ctx->error == SOAP_NO_TAG ? text : text + failure(ctx);
 }
 
-TEST(XmlRead, elements_and_attributes_come_out_as_they_stand)
+TEST(xml_read, elements_and_attributes_come_out_as_they_stand)
 {
     // What is well-formed is compared with another parser, in xml_reference_test.cpp.
     const reading rows[] = {
@@ -80,7 +80,7 @@ TEST(XmlRead, elements_and_attributes_come_out_as_they_stand)
         every_reading(row.document + "<!--" + std::string(80, '.') + "-->", row.mode, tree);
 }
 
-TEST(XmlRead, names_are_cut_and_values_grow)
+TEST(xml_read, names_are_cut_and_values_grow)
 {
     const std::string name(3000, 'n');
     reception in("<" + name + " " + name + "='" + name + "'>x</" + name + ">", 700, 700);
@@ -91,7 +91,7 @@ TEST(XmlRead, names_are_cut_and_values_grow)
     EXPECT_EQ(std::string(in->tag), name.substr(0, 1023));
 }
 
-TEST(XmlRead, a_message_of_ever_new_names_does_not_grow_the_table)
+TEST(xml_read, a_message_of_ever_new_names_does_not_grow_the_table)
 {
     std::string document = "<a>";
     for (int i = 0; i < 2000; ++i)
@@ -108,7 +108,7 @@ TEST(XmlRead, a_message_of_ever_new_names_does_not_grow_the_table)
     EXPECT_LE(in->memory_held, held);
 }
 
-TEST(XmlRead, many_attributes_of_an_element_are_told_apart)
+TEST(xml_read, many_attributes_of_an_element_are_told_apart)
 {
     std::string tag;
     for (int i = 0; i + 1 < SOAP_ATTRIBUTES_MAX; ++i)
@@ -133,7 +133,7 @@ TEST(XmlRead, many_attributes_of_an_element_are_told_apart)
     }
 }
 
-TEST(XmlRead, a_held_tag_answers_every_question_until_it_is_consumed)
+TEST(xml_read, a_held_tag_answers_every_question_until_it_is_consumed)
 {
     const reading row[] = {{"held", "<a><b/>x</a>", ""}};
     expect_readings(row, [](soap *ctx) {
@@ -156,7 +156,7 @@ TEST(XmlRead, a_held_tag_answers_every_question_until_it_is_consumed)
     });
 }
 
-TEST(XmlRead, names_are_compared_by_namespace_row)
+TEST(xml_read, names_are_compared_by_namespace_row)
 {
     const struct {
         // As sent, after declarations of p: urn:one, q: urn:two, u: unknown, default: urn:one.
@@ -212,7 +212,7 @@ std::string fields(const soap *ctx)
     return text;
 }
 
-TEST(XmlRead, attributes_of_the_engine_are_understood_by_version)
+TEST(xml_read, attributes_of_the_engine_are_understood_by_version)
 {
     const auto name_of = [](std::size_t length) { return std::string(length, 'n'); };
     const struct {
@@ -273,7 +273,7 @@ TEST(XmlRead, attributes_of_the_engine_are_understood_by_version)
     EXPECT_EQ(fields(in), "");
 }
 
-TEST(XmlRead, consuming_checks_type_nil_actor_and_depth)
+TEST(xml_read, consuming_checks_type_nil_actor_and_depth)
 {
     const struct {
         const char *attribute;
@@ -297,7 +297,7 @@ TEST(XmlRead, consuming_checks_type_nil_actor_and_depth)
     }
 }
 
-TEST(XmlRead, attribute_queries_follow_the_occurrence_rule)
+TEST(xml_read, attribute_queries_follow_the_occurrence_rule)
 {
     const struct {
         const char *name;
@@ -323,7 +323,7 @@ TEST(XmlRead, attribute_queries_follow_the_occurrence_rule)
     }
 }
 
-TEST(XmlRead, unknown_elements_are_dropped_whole)
+TEST(xml_read, unknown_elements_are_dropped_whole)
 {
     const char *const unknown[] = {
         "<u/>",
@@ -360,7 +360,7 @@ TEST(XmlRead, unknown_elements_are_dropped_whole)
     EXPECT_EQ(skip("e:mustUnderstand='1' e:actor='urn:you'", 0, PART_HEADER), 0);
 }
 
-TEST(XmlRead, skipping_deep_content_takes_no_stack_and_no_memory)
+TEST(xml_read, skipping_deep_content_takes_no_stack_and_no_memory)
 {
     const std::string document = "<a>" + repeat_text("<b>", 300000);
     reception cut(document);
@@ -375,7 +375,7 @@ TEST(XmlRead, skipping_deep_content_takes_no_stack_and_no_memory)
     EXPECT_EQ(soap_element_in_end(in, "a"), 0);
 }
 
-TEST(XmlRead, skipped_elements_count_as_open)
+TEST(xml_read, skipped_elements_count_as_open)
 {
     for (const char *content : {"<b><c><d>x</d></c></b>", "x<b><e/><c><d/><d>x</d></c></b>"}) {
         for (const std::uint32_t limit : {0U, 4U, 3U}) {
@@ -399,7 +399,7 @@ TEST(XmlRead, skipped_elements_count_as_open)
     EXPECT_EQ(soap_element_skip(in.in_root()), SOAP_LENGTH);
 }
 
-TEST(XmlRead, strict_reading_compares_end_tags)
+TEST(xml_read, strict_reading_compares_end_tags)
 {
     const struct {
         const char *content_and_end;
@@ -417,7 +417,7 @@ TEST(XmlRead, strict_reading_compares_end_tags)
     }
 }
 
-TEST(XmlRead, the_envelope_settles_the_version)
+TEST(xml_read, the_envelope_settles_the_version)
 {
     const struct {
         const char *uri;
@@ -472,7 +472,7 @@ TEST(XmlRead, the_envelope_settles_the_version)
     }
 }
 
-TEST(XmlRead, every_allocation_may_fail)
+TEST(xml_read, every_allocation_may_fail)
 {
     const std::string document = "<p:a xmlns:p='urn:one' long='" + std::string(2000, 'x') + "&amp;'><p:b>" +
                                  std::string(600, 'y') + "&lt;</p:b><p:c>\xC3\xA9</p:c></p:a>";

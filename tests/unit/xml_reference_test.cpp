@@ -197,7 +197,7 @@ private:
     std::mt19937 random_;
 };
 
-TEST(XmlReference, random_documents_read_the_same)
+TEST(xml_reference, random_documents_read_the_same)
 {
     for (unsigned seed = 1; seed <= 400; ++seed) {
         const std::string document = grammar(seed).document();
@@ -218,7 +218,7 @@ bool comparable(const std::string &document)
            document.find("encoding=\"UTF-16") == std::string::npos && document.size() < 5000000;
 }
 
-TEST(XmlReference, files_of_the_system_read_the_same)
+TEST(xml_reference, files_of_the_system_read_the_same)
 {
     int compared = 0;
     for (const char *place : {"/usr/share/xml", "/usr/share/mime/packages", "/usr/share/metainfo"}) {

@@ -40,7 +40,7 @@ std::string narrow(const char32_t *text)
     return result;
 }
 
-TEST(XmlText, strings_hold_characters_and_nested_elements)
+TEST(xml_text, strings_hold_characters_and_nested_elements)
 {
     const reading bodies[] = {
         {"empty", "", ""},
@@ -116,7 +116,7 @@ std::string in_all_forms(const std::string &declaration, const std::string &piec
     return first;
 }
 
-TEST(XmlText, strings_hold_what_they_are_said_to_hold_whatever_the_message_is_encoded_in)
+TEST(xml_text, strings_hold_what_they_are_said_to_hold_whatever_the_message_is_encoded_in)
 {
     const std::string LATIN = "<?xml version='1.0' encoding='ISO-8859-1'?>",
                       WINDOWS = "<?xml version='1.0' encoding='windows-1252'?>";
@@ -161,7 +161,7 @@ TEST(XmlText, strings_hold_what_they_are_said_to_hold_whatever_the_message_is_en
         }
 }
 
-TEST(XmlText, raw_xml_is_copied_as_it_stands)
+TEST(xml_text, raw_xml_is_copied_as_it_stands)
 {
     const reading bodies[] = {
         {"references stay", "&lt;&#65;&unknown;&&#x;", "&lt;&#65;&unknown;&&#x;"},
@@ -180,7 +180,7 @@ TEST(XmlText, raw_xml_is_copied_as_it_stands)
         EXPECT_EQ(string_text(body.document, body.mode, RAW), body.expected) << body.rule;
 }
 
-TEST(XmlText, length_is_bounded_in_characters)
+TEST(xml_text, length_is_bounded_in_characters)
 {
     EXPECT_EQ(string_text("abc", 0, CHARACTERS, 3, 3), "abc");
     EXPECT_EQ(string_text("abc", 0, CHARACTERS, 4, -1), "!45");
@@ -192,7 +192,7 @@ TEST(XmlText, length_is_bounded_in_characters)
     EXPECT_EQ(string_text("<b/>", 0, RAW, -1, 3), "!45");
 }
 
-TEST(XmlText, a_held_tag_begins_the_text)
+TEST(xml_text, a_held_tag_begins_the_text)
 {
     const reading rows[] = {
         {"one after the other", "<a><b x=\"1\">t<c/></b> <d/><e>&lt;</e></a>",
@@ -217,7 +217,7 @@ TEST(XmlText, a_held_tag_begins_the_text)
     EXPECT_EQ(std::string(text), "<b " + std::string(1018, 'n') + "/>");
 }
 
-TEST(XmlText, simple_values_are_trimmed_and_bounded)
+TEST(xml_text, simple_values_are_trimmed_and_bounded)
 {
     const reading bodies[] = {
         {"blanks", " \n 42\t", "42"},
@@ -244,7 +244,7 @@ TEST(XmlText, simple_values_are_trimmed_and_bounded)
     EXPECT_STREQ(soap_simple_value_read(empty.in_root()), "");
 }
 
-TEST(XmlText, wide_strings_hold_code_points)
+TEST(xml_text, wide_strings_hold_code_points)
 {
     const struct {
         const char *body;
@@ -279,7 +279,7 @@ TEST(XmlText, wide_strings_hold_code_points)
     }
 }
 
-TEST(XmlText, string_elements_tell_absent_nil_and_empty_apart)
+TEST(xml_text, string_elements_tell_absent_nil_and_empty_apart)
 {
     const struct {
         const char *document;
@@ -312,7 +312,7 @@ TEST(XmlText, string_elements_tell_absent_nil_and_empty_apart)
     }
 }
 
-TEST(XmlText, raw_elements_give_their_content)
+TEST(xml_text, raw_elements_give_their_content)
 {
     const reading rows[] = {
         {"content", "<r><b>&lt;</b></r><w>x<c/></w>", "<b>&lt;</b>|x<c/>"},
@@ -331,7 +331,7 @@ TEST(XmlText, raw_elements_give_their_content)
     });
 }
 
-TEST(XmlText, a_leaf_in_place_counts_as_an_open_element_and_is_for_lenient_reading)
+TEST(xml_text, a_leaf_in_place_counts_as_an_open_element_and_is_for_lenient_reading)
 {
     const struct {
         std::uint32_t max_depth, mode;

@@ -41,7 +41,7 @@ std::string raw_tokens(soap *ctx)
 }
 
 // What is well-formed is compared with another parser, in xml_reference_test.cpp.
-TEST(XmlTokens, markup_is_folded_into_tokens_and_comments_are_invisible)
+TEST(xml_tokens, markup_is_folded_into_tokens_and_comments_are_invisible)
 {
     const reading rows[] = {
         {"blanks behind the bracket", "< a>< / b>", "[<]a[>][</]#32b[>][eof]"},
@@ -63,7 +63,7 @@ TEST(XmlTokens, markup_is_folded_into_tokens_and_comments_are_invisible)
     expect_readings(rows, raw_tokens);
 }
 
-TEST(XmlTokens, references_give_their_character_and_never_markup)
+TEST(xml_tokens, references_give_their_character_and_never_markup)
 {
     const reading rows[] = {
         {"named", "&lt;&gt;&amp;&quot;&apos;", "{<}{>}{&}{\"}{'}[eof]"},
@@ -90,7 +90,7 @@ TEST(XmlTokens, references_give_their_character_and_never_markup)
 }
 
 // What becomes of them in strings is told in xml_text_test.cpp.
-TEST(XmlTokens, bytes_are_decoded_by_the_encoding)
+TEST(xml_tokens, bytes_are_decoded_by_the_encoding)
 {
     const reading rows[] = {
         {"five and six bytes", "\xF8\x88\x80\x80\x80\xFC\x84\x80\x80\x80\x80|", "??|[eof]"},
@@ -104,7 +104,7 @@ TEST(XmlTokens, bytes_are_decoded_by_the_encoding)
     expect_readings(rows, utf8_tokens);
 }
 
-TEST(XmlTokens, the_declaration_chooses_the_encoding)
+TEST(xml_tokens, the_declaration_chooses_the_encoding)
 {
     const reading rows[] = {
         {"double quotes", "<?xml version='1.0' encoding=\"ISO-8859-1\"?>x", "latin1"},

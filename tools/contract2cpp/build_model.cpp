@@ -46,6 +46,7 @@ private:
     void collect_prefixes();
     void collect_type_ids();
     void add_type_id(const type_id_declaration &row);
+    std::string free_id() const;
     const std::string &type_id_of(const place &at, const std::string &kind, const std::string &name,
                                   const std::string &what);
     void refuse_unused_type_ids() const;
@@ -131,6 +132,11 @@ void model_builder::add_type_id(const type_id_declaration &row)
     const auto kind = kinds.find(row.kind);
     if (kind == kinds.end())
         throw contract_error(row.at, "unknown kind \"" + row.kind + "\"");
+    if (row.id > DISPATCH_ID_MAX && kind->second < id_kind::envelope)
+        throw contract_error(row.at, "type id " + std::to_string(row.id) +
+                                         " is for a request or a response: a " + row.kind +
+                                         " is read and written by ids up to " +
+                                         std::to_string(DISPATCH_ID_MAX) + "; " + free_id() + " is free");
     if (!ids.emplace(std::pair(row.kind, row.name), model.types.size()).second)
         throw contract_error(row.at, row.kind + " " + row.name + " has two type ids");
 
@@ -141,6 +147,19 @@ void model_builder::add_type_id(const type_id_declaration &row)
     type.xml_name = row.name;
     type.constant = "SOAP_TYPE_" + type.name;
     model.types.push_back(std::move(type));
+}
+
+// An id for a new type.
+std::string model_builder::free_id() const
+{
+    const auto taken = [&](int id) {
+        return std::any_of(contract.type_ids.begin(), contract.type_ids.end(),
+                           [&](const type_id_declaration &row) { return row.id == id; });
+    };
+    int id = FIRST_NEW_ID;
+    while (taken(id))
+        ++id;
+    return std::to_string(id);
 }
 
 void model_builder::collect_type_ids()
@@ -164,7 +183,7 @@ const std::string &model_builder::type_id_of(const place &at, const std::string 
     const auto found = ids.find({kind, name});
     if (found == ids.end())
         throw contract_error(at, "no type id for " + what + ": type_ids.txt has no row \"" + kind + " " +
-                                     name + "\"");
+                                     name + "\"; " + free_id() + " is free");
     used_ids.insert(found->second);
     return model.types[found->second].constant;
 }

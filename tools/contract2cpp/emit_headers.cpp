@@ -29,7 +29,7 @@ std::string start_of(const class_member &member)
     return member.initial.empty() ? "" : " = " + member.initial;
 }
 
-std::string told(const class_member &member)
+std::string comment_of(const class_member &member)
 {
     std::string text = member.documentation;
     const auto add = [&](const std::string &more) { text += (text.empty() ? "" : " ") + more; };
@@ -67,7 +67,8 @@ std::string class_text(const data_class &type)
         text += documented(declaration, attribute.documentation, "    ");
     }
     for (const class_member &member : type.members)
-        text += documented(held_type(member) + member.name + start_of(member) + ";", told(member), "    ");
+        text +=
+            documented(held_type(member) + member.name + start_of(member) + ";", comment_of(member), "    ");
     if (root)
         text += "    struct soap *soap = nullptr; // the context that made the object, or null\n";
     text += type.members.empty() && type.attributes.empty() && !root ? "    " : "\n    ";

@@ -50,6 +50,7 @@ std::string type_row(const identified_type &type)
 std::string type_table(const contract_model &model)
 {
     std::string text = "static_assert(TYPE_ID_MAX == " + std::to_string(TYPE_ID_MAX) +
+                       " && DISPATCH_ID_MAX == " + std::to_string(DISPATCH_ID_MAX) +
                        ");\n\n"
                        "constinit const type_entry type_entries[TYPE_ID_MAX + 1] = {\n";
     auto next = model.types.begin();

@@ -111,6 +111,7 @@ struct port {
     std::vector<operation> operations;
 };
 
+// Those before `envelope` are read and written by id.
 enum class id_kind { primitive, text, binary, object, code, vector, envelope, response, request, pointer };
 
 // A type id, with what dispatch by id needs to know.
@@ -133,7 +134,9 @@ struct contract_model {
     std::vector<identified_type> types; // by id
 };
 
-constexpr int TYPE_ID_MAX = 892;
+constexpr int TYPE_ID_MAX = 892;     // the last id
+constexpr int DISPATCH_ID_MAX = 877; // the last id by which the library reads and writes objects
+constexpr int FIRST_NEW_ID = 582;    // new types take the free ids from here on
 
 // Resolves the declarations. contract_error for whatever has no translation.
 contract_model build_model(const contract_declarations &contract);

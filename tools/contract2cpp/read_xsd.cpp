@@ -168,10 +168,10 @@ void xsd_reader::occurrence(pugi::xml_node node, element_declaration &element) c
 
 void xsd_reader::one_type(pugi::xml_node node, const element_declaration &element) const
 {
-    const int told = (element.type ? 1 : 0) + (element.simple ? 1 : 0) + (element.complex ? 1 : 0);
-    if (told == 0)
+    const int forms = (element.type ? 1 : 0) + (element.simple ? 1 : 0) + (element.complex ? 1 : 0);
+    if (forms == 0)
         xml.refuse(node, "element \"" + element.name + "\" has no type");
-    if (told > 1)
+    if (forms > 1)
         xml.refuse(node, "element \"" + element.name + "\" has two types");
 }
 

@@ -38,7 +38,7 @@ class Pages:
         return self.contract.prefixes[uri] + ".html"
 
     def link(self, name):
-        """A type's short name, leading to where it is told."""
+        """A type's short name, linked to its description."""
         if uri_of(name) == XSD_URI:
             return "<code>xsd:%s</code>" % local(name)
         type_ = self.contract.types[name]
@@ -59,19 +59,19 @@ class Pages:
         name = contract.cpp(type_)
         parts = ['<h2 id="%s"><code>%s</code></h2>' % (name, escape(contract.short(type_.name))),
                  "<p>%s</p>" % escape(type_.text)]
-        told = [("Class" if type_.is_class else "Enumeration" if type_.words else "Type", "<code>%s</code>" % name)]
+        facts = [("Class" if type_.is_class else "Enumeration" if type_.words else "Type", "<code>%s</code>" % name)]
         bases = contract.chain(type_)[:-1]
         if bases:
-            told.append(("Extends", " › ".join(self.link(base.name) for base in bases)))
+            facts.append(("Extends", " › ".join(self.link(base.name) for base in bases)))
         derived = contract.derived(key)
         if derived:
-            told.append(("Extended by", ", ".join(self.link(each.name) for each in derived)))
+            facts.append(("Extended by", ", ".join(self.link(each.name) for each in derived)))
         elements = [element for element, of in contract.elements.items() if of == key]
         if elements:
-            told.append(("Elements", ", ".join("<code>%s</code>" % escape(contract.short(each)) for each in elements)))
+            facts.append(("Elements", ", ".join("<code>%s</code>" % escape(contract.short(each)) for each in elements)))
         if type_.wildcard:
-            told.append(("Besides", "attributes of other namespaces"))
-        parts.append("<p>" + "<br>".join('<span class="quiet">%s:</span> %s' % row for row in told) + "</p>")
+            facts.append(("Besides", "attributes of other namespaces"))
+        parts.append("<p>" + "<br>".join('<span class="quiet">%s:</span> %s' % row for row in facts) + "</p>")
         if type_.words:
             parts.append("<table><tr><th>Code<th>Word" + "".join(
                 "<tr><td>%d<td><code>%s</code>" % row for row in enumerate(map(escape, type_.words))) + "</table>")
