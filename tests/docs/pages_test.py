@@ -4,18 +4,20 @@ links lead somewhere.
 
 Usage: pages_test.py SOURCE_DIR ZUV_SERVICE GUIDE README_HOST. The programs call a zuv-service started here.
 """
+import http.server
 import os
 import re
 import subprocess
 import sys
 import tempfile
+import threading
 
 sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "interop"))
 import listening
 import messages
 import zuv_service
 
-COMMAND = re.compile(r"^(?:script/|cmake |ctest |g\+\+ |zuv|\.ci/)")
+COMMAND = re.compile(r"^(?:script/|cmake |ctest |g\+\+ |zuv(?!::)|\.ci/)")
 # The README's commands: the file that runs each, a script or a test that takes it from the text, and how it stands there.
 RUN_BY = {
     "script/demo": (".ci/run", "script/demo\n"),
@@ -102,6 +104,32 @@ def check_run(program, arguments, expected, **environment):
         assert re.search(pattern, run.stdout, re.M), "not printed: %s\n%s" % (pattern, run.stdout)
 
 
+def check_bare_response(program):
+    """The README's host gets a response without any of its optional parts, and no response at all."""
+    class bare(http.server.BaseHTTPRequestHandler):
+        def do_POST(self):
+            self.rfile.read(int(self.headers["Content-Length"]))
+            body = (b'<E:Envelope xmlns:E="http://schemas.xmlsoap.org/soap/envelope/"><E:Body><p:createResponse '
+                    b'xmlns:p="http://www.zuv.example/xmlns/b2b/zuv/v1.0/Profile"/></E:Body></E:Envelope>')
+            self.send_response(200 if self.path == "/bare" else 404)
+            self.send_header("Content-Type", "text/xml")
+            self.send_header("Content-Length", str(len(body)))
+            self.end_headers()
+            self.wfile.write(body)
+
+        def log_message(self, *_):
+            pass
+
+    with http.server.ThreadingHTTPServer(("127.0.0.1", 0), bare) as server:
+        threading.Thread(target=server.serve_forever, daemon=True).start()
+        address = "http://127.0.0.1:%d" % server.server_port
+        check_run(program, [], [r"^kept as \(no URI\)$"], ZUV_README_ENDPOINT=address + "/bare")
+        failed = subprocess.run([program], text=True, capture_output=True, timeout=60,
+                                env={**os.environ, "ZUV_README_ENDPOINT": address + "/elsewhere"})
+        assert failed.returncode == 0 and failed.stderr.startswith("create failed: ") and "404" in failed.stderr, failed
+        server.shutdown()
+
+
 def main():
     source, service, guide, readme_host = sys.argv[1:]
     pages = subprocess.run(["git", "ls-files", "*.md"], cwd=source, text=True, capture_output=True).stdout.split()
@@ -115,6 +143,7 @@ def main():
         check_run(guide, [endpoint], [r"^Ada's workshop$", r"^still here: Ada's workshop$", r"^not found: urn:not:there$",
                                       r"^\d+ bytes$"])
         check_run(readme_host, [], [r"^kept as urn:zuv:profile:"], ZUV_README_ENDPOINT=endpoint)
+    check_bare_response(readme_host)
     print("%d pages, the guide's code, the README's host and commands" % len(pages))
 
 
