@@ -553,6 +553,8 @@ struct ZUV_CLASS soap {
     const struct soap_upcalls *upcalls;  // what lower layers ask of the exchange of messages; private
     int (*attachment_stage)(soap *ctx); // input: where soap_recv_more gets bytes from while the message comes
                                         // in chunks of DIME records; null otherwise; private
+    std::uint32_t bare_declarations;    // reader: declarations of the held element, the innermost ones in
+                                        // scope, that have no attribute record yet; private
 
     // --- construction ---
 

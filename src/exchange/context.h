@@ -219,6 +219,7 @@ enum class field_fate { SETTING, CALLBACK, STATE, MESSAGE, CONNECTION, RESOURCE 
     X(prefix_cache_valid, MESSAGE, {}) \
     X(prefix_cache_list, MESSAGE, {}) \
     X(attribute_list, MESSAGE, {}) \
+    X(bare_declarations, MESSAGE, {}) \
     X(error, MESSAGE, {}) \
     X(dime, MESSAGE, {}) \
     X(mime, MESSAGE, {}) \

@@ -39,9 +39,10 @@ const soap_namespace *table_row(const soap *ctx, int row)
     return table != nullptr ? table + row : nullptr;
 }
 
+// Prefixes that come in turn should have places of their own: "protocol" and those of each port do.
 std::size_t cache_place(const char *prefix, std::size_t length)
 {
-    return length == 0 ? 0 : (static_cast<unsigned char>(prefix[length - 1]) + length) & (CACHE_SIZE - 1);
+    return length == 0 ? 0 : (static_cast<unsigned char>(prefix[length - 1]) ^ length) & (CACHE_SIZE - 1);
 }
 
 // Neighbouring tags mostly have one prefix: that of the tag resolved last is tried first. True: it is the

@@ -14,6 +14,7 @@
 #include "core/failure.h"
 #include "xml/attributes.h"
 #include "xml/namespace.h"
+#include "xml/root_head.h"
 
 namespace {
 
@@ -36,6 +37,7 @@ void forget_tag(soap *ctx)
 {
     ctx->peeked = 1;
     ctx->tag_resolved = false;
+    ctx->bare_declarations = 0;
     ctx->element_id[0] = '\0';
     ctx->element_href[0] = '\0';
     ctx->element_type[0] = '\0';
@@ -216,12 +218,18 @@ int read_tag_end(soap *ctx)
         ctx->has_body = 1;
         return ctx->error = 0;
     }
-    bool names_wide = false;
-    const int error = xml_attributes_read(ctx, &names_wide);
+    const bool root = root_head_stands_alone(ctx);
+    if (root && root_head_resume(ctx))
+        return ctx->error = 0;
+    const char *const start = input_here(ctx);
+    bool names_wide = false, all_taken = false;
+    const int error = xml_attributes_read(ctx, &names_wide, &all_taken);
     if (error != 0)
         return no_tag(ctx, error == SOAP_EOF ? end_of_input(ctx) : error);
     if (read_tag_end(ctx) != 0)
         return ctx->error;
+    if (root && all_taken)
+        root_head_learn(ctx, start);
     if (ctx->attributes_set != 0)
         xml_attributes_apply(ctx, names_wide);
     return ctx->error = 0;
@@ -452,6 +460,8 @@ const char *soap_attr_get(soap *ctx, const char *name, int occurrence)
     const bool strict = (ctx->mode & MODE_STRICT) != 0;
     if (*name == '-')
         return "";
+    if (xml_attributes_complete(ctx) != 0)
+        return nullptr;
     if (ctx->attributes_set != 0) {
         for (const soap_attribute *p = ctx->attribute_list; p != nullptr; p = p->next) {
             if (p->visible == 0 || soap_tag_compare(ctx, p->name, name) != 0)

@@ -6,6 +6,7 @@
 // Always: text runs in stretches between two special bytes; only those go through the tokens. Gathered text
 // stands in the growing text and is copied once to managed memory.
 #include "xml/xml_text.h"
+#include "xml/xml_read.h"
 
 #include <cstring>
 
@@ -42,6 +43,8 @@ int gather_plain(soap *ctx)
 int gather_text(soap *ctx, text_limits &limits)
 {
     std::size_t length;
+    if (ctx->peeked != 0 && xml_attributes_complete(ctx) != 0)
+        return ctx->error;
     text_depth depth = text_take_held_tag(ctx, &length);
     ctx->label_index = 0;
     if (text_put(ctx, ctx->scratch_text, length) != 0)

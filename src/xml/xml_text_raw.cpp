@@ -11,6 +11,7 @@
 #include <zuv_client_pro/soap_error.h>
 
 #include "core/failure.h"
+#include "xml/xml_read.h"
 #include "xml/xml_scan.h"
 #include "xml/xml_text.h"
 
@@ -389,6 +390,8 @@ int gather_content(soap *ctx, text_depth &depth, raw_state &state, bool *end)
 int text_gather_raw(soap *ctx, text_limits &limits)
 {
     std::size_t length;
+    if (ctx->peeked != 0 && xml_attributes_complete(ctx) != 0)
+        return ctx->error;
     text_depth depth = text_take_held_tag(ctx, &length);
     raw_state state = raw_state::content;
     ctx->label_index = 0;
