@@ -110,9 +110,9 @@ void print_json(const std::string &address, int port)
 {
     std::string ports;
     for (const service::port *one : service::all_ports()) {
-        const std::string name(one->name);
-        ports += (ports.empty() ? "\"" : ", \"") + name + "\": \"" + address +
-                 std::string(service::SERVICES_PATH) + name + "\"";
+        ports += ports.empty() ? "\"" : ", \"";
+        ports.append(one->name).append("\": \"").append(address);
+        ports.append(service::SERVICES_PATH).append(one->name).append("\"");
     }
     std::printf("{\"address\": \"%s\", \"port\": %d, \"ports\": {%s}}\n", address.c_str(), port,
                 ports.c_str());
