@@ -131,13 +131,16 @@ bool outcome::detach()
     return true;
 }
 
-// The client has ended: its context becomes that of the result.
+// The client ends, and memory lacks for another context: its own becomes that of the result. What the host
+// program's callbacks work on may be gone by then.
 void outcome::adopt(engine *ended)
 {
     from_ = nullptr;
     ended->holder = nullptr;
     ended->keep_alive = 0;
     soap_socket_release(ended);
+    ended->on_disconnect = nullptr;
+    ended->on_close = nullptr;
     own_ = ended;
 }
 
@@ -219,8 +222,9 @@ client::~client()
 void client::end()
 {
     engine *const ended = std::exchange(engine_, nullptr);
-    if (ended != nullptr && ended->holder != nullptr)
-        ended->holder->adopt(ended);
+    outcome *const holder = ended != nullptr ? ended->holder : nullptr;
+    if (holder != nullptr && !holder->detach())
+        holder->adopt(ended);
     else
         delete ended;
 }

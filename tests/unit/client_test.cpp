@@ -119,6 +119,11 @@ TEST(client_results, are_kept_or_refused_when_memory_runs_out)
             refill();
         });
     EXPECT_GE(refusals, 8U);
+    auto ended = std::make_unique<wired_client>();
+    const profile_result outliving = ended->get(named_answer("outliving"));
+    failing_malloc::at_each_allocation(
+        failing_malloc::refuse::one, [&] { ended.reset(); },
+        [&](bool) { EXPECT_EQ(name_of(outliving), "outliving"); });
 }
 
 TEST(client_failures, tell_what_happened_and_what_to_do)
