@@ -50,6 +50,7 @@ constexpr std::size_t SOAP_LOG_CHANNELS = 3;         // received, sent, third
 constexpr std::uint32_t SOAP_MAX_DEPTH = 4096;       // default of soap::max_depth
 constexpr std::uint64_t SOAP_MAX_MESSAGE = std::uint64_t{1} << 30;  // bytes; default of soap::max_message
 constexpr std::uint64_t SOAP_MAX_MEMORY = std::uint64_t{512} << 20; // bytes; default of soap::max_memory
+constexpr std::uint64_t SOAP_POOL_LIMIT = std::uint64_t{1} << 20;   // bytes; default of soap::pool_limit
 
 // --- mode flags ---
 //
@@ -125,8 +126,8 @@ struct soap_namespace {
     const char *prefix;  // the prefix written on the wire and used in all tag comparisons
     const char *uri;     // the namespace's own URI
     const char *pattern; // further URIs accepted, under soap_tag_match; null for none
-    // URI last received under the pattern; null for none. In soap::local_namespaces a block of SOAP_MALLOC
-    // (soap_memory.h) that is freed with the table; in static tables always null.
+    // URI last received under the pattern; null for none. In soap::local_namespaces it belongs to the context
+    // and goes with the table; in static tables always null.
     char *received;
 };
 
@@ -555,6 +556,9 @@ struct ZUV_CLASS soap {
                                         // in chunks of DIME records; null otherwise; private
     std::uint32_t bare_declarations;    // reader: declarations of the held element, the innermost ones in
                                         // scope, that have no attribute record yet; private
+    // Most bytes of released objects, texts and blocks that are kept for messages to come, so that a steady
+    // caller's call allocates nothing; 0 none. See soap_memory.h.
+    std::uint64_t pool_limit;
 
     // --- construction ---
 

@@ -13,6 +13,7 @@
 #include "binding/member_read.h"
 #include "binding/registry.h"
 #include "core/failure.h"
+#include "core/instance_pool.h"
 #include "core/limits.h"
 #include "xml/namespace_scope.h"
 #include "xml/tag_view.h"
@@ -42,13 +43,16 @@ void *class_instantiate(soap *ctx, const class_ops &ops, int count, const char *
         if (named != nullptr && class_descends(named, &ops))
             actual = named;
     }
-    soap_instance *entry = soap_instance_register(ctx, nullptr, actual->type_id, count, soap_delete_object);
-    if (entry == nullptr)
-        return nullptr;
-    entry->object = actual->create(ctx, count);
-    if (entry->object == nullptr) {
-        // NOLINTNEXTLINE(clang-analyzer-core.NullDereference): no call lacks a context
-        return fail_null(ctx, SOAP_OUT_OF_MEMORY);
+    soap_instance *entry = count < 0 ? instance_reuse(ctx, actual->type_id) : nullptr;
+    if (entry == nullptr) {
+        entry = soap_instance_register(ctx, nullptr, actual->type_id, count, soap_delete_object);
+        if (entry == nullptr)
+            return nullptr;
+        entry->object = actual->create(ctx, count);
+        if (entry->object == nullptr) {
+            // NOLINTNEXTLINE(clang-analyzer-core.NullDereference): no call lacks a context
+            return fail_null(ctx, SOAP_OUT_OF_MEMORY);
+        }
     }
     const std::size_t bytes = actual->size * static_cast<std::size_t>(count < 0 ? 1 : count);
     memory_charge(ctx, bytes);

@@ -69,6 +69,9 @@ struct class_ops {
     std::string *(*text)(void *object);       // simple content
     void (*copy_hook)(soap *ctx, int type, int place_type, void *place, std::size_t length,
                       const void *source, std::size_t size);
+    // Makes an object as new for the next message of its context; what its vectors and texts have allocated
+    // stays. The bytes that it holds.
+    std::size_t (*recycle)(void *object, soap *owner);
 };
 
 // True if `derived` is `base` or descends from it.

@@ -10,6 +10,7 @@
 
 #include "core/context_state.h"
 #include "core/failure.h"
+#include "core/instance_pool.h"
 #include "core/limits.h"
 #include "core/tracking.h"
 
@@ -41,9 +42,24 @@ soap_instance *soap_instance_register(soap *ctx, void *object, int type_id, int 
                    : enter_in_new_slab(ctx, object, type_id, array_size, hook);
 }
 
+// True if the object waits for the next message.
+static bool keep_instance(soap *ctx, soap_instance *instance)
+{
+    if (instance->array_size >= 0 || instance->object == nullptr || instance->type_id <= IDLE_SHELLS ||
+        instance->type_id >= IDLE_TYPES || !idle_has_room(ctx, instance->type_id, 1))
+        return false;
+    const std::size_t bytes = ctx->upcalls->recycle(ctx, instance);
+    if (bytes == 0 || !idle_has_room(ctx, instance->type_id, bytes))
+        return false;
+    idle_give(ctx, instance->type_id, instance, bytes);
+    return true;
+}
+
 // The record must be out of the list: a destructor may come back to it.
 static void destroy_instance(soap *ctx, soap_instance *instance)
 {
+    if (keep_instance(ctx, instance))
+        return;
     if (instance->delete_hook != nullptr && instance->delete_hook(instance) != 0)
         std::fprintf(stderr, "new(object type = %d) = %p not freed: deletion callback failed\n",
                      instance->type_id, instance->object);
@@ -52,6 +68,7 @@ static void destroy_instance(soap *ctx, soap_instance *instance)
 
 static void destroy_all(soap *ctx)
 {
+    idle_release_begin(ctx);
     while (ctx->instance_list != nullptr) {
         soap_instance *instance = ctx->instance_list;
         ctx->instance_list = instance->next;
@@ -59,6 +76,7 @@ static void destroy_all(soap *ctx)
             __builtin_prefetch(instance->next->object);
         destroy_instance(ctx, instance);
     }
+    idle_release_end(ctx);
     ctx->header = nullptr;
     ctx->fault = nullptr;
 }
@@ -71,6 +89,7 @@ void soap_discard_objects(soap *ctx, void *object)
         destroy_all(ctx);
         return;
     }
+    idle_release_begin(ctx);
     for (soap_instance **link = &ctx->instance_list; *link != nullptr; link = &(*link)->next) {
         soap_instance *instance = *link;
         if (instance->object == object) {

@@ -15,6 +15,7 @@
 
 #include "core/context_state.h"
 #include "core/failure.h"
+#include "core/instance_pool.h"
 #include "core/limits.h"
 #include "core/memory.h"
 #include "core/tracking.h"
@@ -58,12 +59,73 @@ static bool entry_is_live(soap_block_trailer *trailer)
     return trailer->entry->address == block_start(trailer) && track_is_live(trailer->entry);
 }
 
+// The list of idle blocks of this span, or null if there is none.
+static idle_list<soap_block_trailer> *idle_blocks(soap *ctx, std::size_t span)
+{
+    const std::size_t place = span / 8 - 1;
+    return ctx->pools != nullptr && place < IDLE_BLOCK_SPANS ? &ctx->pools->idle.blocks[place] : nullptr;
+}
+
+static std::size_t idle_bytes(const soap_block_trailer *trailer)
+{
+    return trailer->span + sizeof *trailer;
+}
+
+// True if the block waits for its next use.
+static bool keep_block(soap *ctx, soap_block_trailer *trailer)
+{
+    idle_list<soap_block_trailer> *list = idle_blocks(ctx, trailer->span);
+    if (list == nullptr || !idle_has_room(ctx->pools->idle, *list, idle_bytes(trailer)))
+        return false;
+    track_rest(ctx, trailer->entry);
+    list->push(trailer, ctx->pools->idle.large);
+    ctx->pools->idle.bytes += idle_bytes(trailer);
+    return true;
+}
+
+static soap_track_entry *reuse_block(soap *ctx, std::size_t span)
+{
+    idle_list<soap_block_trailer> *list = idle_blocks(ctx, span);
+    if (list == nullptr || list->first == nullptr)
+        return nullptr;
+    soap_block_trailer *trailer = list->pop();
+    ctx->pools->idle.bytes -= idle_bytes(trailer);
+    track_wake(ctx, trailer->entry, idle_bytes(trailer));
+    return trailer->entry;
+}
+
+static void free_idle_blocks(soap *ctx, soap_block_trailer *first)
+{
+    while (first != nullptr) {
+        soap_block_trailer *trailer = first;
+        first = trailer->next;
+        ctx->pools->idle.bytes -= idle_bytes(trailer);
+        track_free_resting(ctx, trailer->entry);
+    }
+}
+
+void idle_blocks_drop(soap *ctx)
+{
+    for (idle_list<soap_block_trailer> &list : ctx->pools->idle.blocks) {
+        soap_block_trailer *first = list.first;
+        list = {};
+        free_idle_blocks(ctx, first);
+    }
+}
+
+void idle_blocks_thin(soap *ctx)
+{
+    for (idle_list<soap_block_trailer> &list : ctx->pools->idle.blocks)
+        free_idle_blocks(ctx, list.thin());
+}
+
 static void free_block(soap *ctx, soap_block_trailer *trailer)
 {
     if (entry_is_live(trailer)) {
         if (track_is_secret(trailer->entry))
             OPENSSL_cleanse(block_start(trailer), trailer->span - sizeof CANARY);
-        track_free(ctx, trailer->entry);
+        if (!keep_block(ctx, trailer))
+            track_free(ctx, trailer->entry);
     } else // damaged: tracking reports the address
         SOAP_FREE(ctx, block_start(trailer));
 }
@@ -87,7 +149,9 @@ void *soap_block_alloc(soap *ctx, std::size_t size)
     if (size > SIZE_MAX - BLOCK_OVERHEAD)
         return out_of_memory(ctx);
     const std::size_t span = (size + sizeof CANARY + 7) & ~std::size_t{7};
-    soap_track_entry *entry = track_alloc(ctx, __FILE__, __LINE__, span + sizeof(soap_block_trailer));
+    soap_track_entry *entry = reuse_block(ctx, span);
+    if (entry == nullptr)
+        entry = track_alloc(ctx, __FILE__, __LINE__, span + sizeof(soap_block_trailer));
     if (entry == nullptr)
         return out_of_memory(ctx);
     char *start = static_cast<char *>(entry->address);
@@ -143,6 +207,7 @@ void soap_block_free(soap *ctx, void *address)
         return;
     track_secret(ctx, ctx->auth_user); // also what was set and never sent
     track_secret(ctx, ctx->auth_password);
+    idle_release_begin(ctx);
     if (address == nullptr) {
         free_all_blocks(ctx);
         return;

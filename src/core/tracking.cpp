@@ -12,6 +12,7 @@
 
 #include <zuv_client_pro/soap_memory.h>
 
+#include "core/instance_pool.h"
 #include "core/limits.h"
 
 static constexpr std::size_t LOAD_MAX = 1; // entries for each chain before the table doubles
@@ -112,6 +113,8 @@ static soap_track_entry *entry_for(soap *ctx, void *address)
     soap_memory_pools *pools = ctx->pools;
     soap_track_entry *entry = find_entry(ctx, address);
     if (entry != nullptr) {
+        if (entry->life == TRACK_IDLE)
+            return nullptr; // malloc gives no block that it has given already
         if (!track_is_live(entry))
             pools->dead[entry->life - TRACK_DEAD] = nullptr;
         else // freed behind our back
@@ -172,6 +175,24 @@ void track_free(soap *ctx, soap_track_entry *entry)
     std::free(address);
 }
 
+void track_rest(soap *ctx, soap_track_entry *entry)
+{
+    ctx->memory_held -= bytes_held(entry);
+    entry->life = TRACK_IDLE;
+}
+
+void track_wake(soap *ctx, soap_track_entry *entry, std::size_t size)
+{
+    set_live(ctx, entry, size);
+}
+
+void track_free_resting(soap *ctx, soap_track_entry *entry)
+{
+    void *address = entry->address;
+    drop_entry(ctx, entry);
+    std::free(address);
+}
+
 void track_secret(soap *ctx, const void *address)
 {
     soap_track_entry *entry = find_entry(ctx, address);
@@ -215,6 +236,7 @@ void tracked_free(soap *ctx, const char *source_file, int source_line, void *add
 
 void track_end(soap *ctx)
 {
+    idle_drop(ctx);
     for (std::size_t i = 0; i <= ctx->track_chain_mask; ++i) {
         for (const soap_track_entry *entry = ctx->track_chains[i]; entry != nullptr; entry = entry->next) {
             if (track_is_live(entry))

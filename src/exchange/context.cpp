@@ -175,14 +175,6 @@ void soap_reset_call(soap *ctx)
 // ---------------------------------------------------------------------------------------------
 // Release.
 
-static void free_growing_text(soap *ctx)
-{
-    SOAP_FREE(ctx, ctx->label_buffer);
-    ctx->label_buffer = nullptr;
-    ctx->label_size = 0;
-    ctx->label_index = 0;
-}
-
 static void free_attachment_references(soap *ctx)
 {
     while (ctx->mtom_list != nullptr) {
@@ -200,7 +192,7 @@ void soap_call_scratch_free(soap *ctx)
     while (ctx->block_stack != nullptr)
         soap_block_stack_drop(ctx, nullptr);
     xml_attributes_drop(ctx);
-    free_growing_text(ctx);
+    growing_text_free(ctx);
     soap_namespace_table_drop(ctx);
     free_attachment_references(ctx);
     soap_pointer_table_reset(ctx);

@@ -20,6 +20,7 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "core/context_state.h"
+#include "core/instance_pool.h"
 #include "core/memory.h"
 #include "core/tracking.h"
 #include "exchange/context.h"
@@ -225,6 +226,7 @@ soap::soap(soap &&other) noexcept
     if (!context_is_alive(&other))
         return;
     hang_up(&other);
+    idle_drop(&other); // objects that wait name the context that they wait in
     soap_context_assign(this, &other);
     if (fault != nullptr && *soap_fault_string_field(this) == other.message_text)
         *soap_fault_string_field(this) = message_text;

@@ -10,6 +10,7 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_memory.h>
 
+#include "binding/member_release.h"
 #include "core/context_state.h"
 #include "core/failure.h"
 #include "exchange/fault.h"
@@ -131,7 +132,7 @@ static fault_texts read_fault(soap *ctx)
     return {*soap_fault_code_field(ctx), *soap_fault_string_field(ctx), soap_fault_detail_value(ctx)};
 }
 
-const soap_upcalls fault_upcalls = {make_fault, read_fault};
+const soap_upcalls fault_upcalls = {make_fault, read_fault, binding::instance_recycle};
 
 // ---------------------------------------------------------------------------------------------
 // Printing.

@@ -6,6 +6,7 @@
 // Always: one token can be pushed back in look_ahead; a construct may be cut by a refill at any byte.
 #include "xml/xml_token.h"
 
+#include <algorithm>
 #include <cstring>
 #include <string_view>
 
@@ -248,10 +249,16 @@ std::int32_t soap_pi_read(soap *ctx)
 {
     char text[INSTRUCTION_TEXT_MAX + 1];
     std::size_t kept = 0;
-    std::int32_t byte;
-    while ((byte = soap_recv_byte(ctx)) != XML_EOF && byte != '?') {
-        if (kept < INSTRUCTION_TEXT_MAX)
-            text[kept++] = static_cast<char>(byte < ' ' ? ' ' : byte);
+    std::int32_t byte = XML_EOF;
+    while (byte == XML_EOF && input_ready(ctx)) {
+        const char *const here = input_here(ctx), *const end = input_end(ctx);
+        const char *const stop = std::find(here, end, '?');
+        const auto taken = std::min(static_cast<std::size_t>(stop - here), INSTRUCTION_TEXT_MAX - kept);
+        std::transform(here, here + taken, text + kept,
+                       [](char c) { return static_cast<unsigned char>(c) < ' ' ? ' ' : c; });
+        kept += taken;
+        byte = stop != end ? '?' : XML_EOF;
+        input_consume(ctx, stop != end ? stop + 1 : end);
     }
     text[kept] = '\0';
     const std::string_view encoding = declared_encoding(text);
