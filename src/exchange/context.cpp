@@ -25,6 +25,7 @@
 
 #include "core/context_state.h"
 #include "core/memory.h"
+#include "core/message_store.h"
 #include "core/trace_log.h"
 #include "core/tracking.h"
 #include "exchange/context.h"
@@ -277,6 +278,7 @@ void soap_engine_done(soap *ctx)
     close_master_socket(ctx);
     end_tls(ctx);
     end_compression(ctx);
+    message_store_free(ctx);
     credentials_wipe(ctx);
     trace_log_end(ctx);
     ctx->state = 0;
