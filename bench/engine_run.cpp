@@ -12,6 +12,8 @@
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "core/message_store.h"
+#include "exchange/request.h"
 #include "traits_protocolProblemReport.h"
 
 engine_run::engine_run()
@@ -48,27 +50,18 @@ std::size_t engine_run::give(soap *ctx, char *buffer, std::size_t length)
     return length;
 }
 
-int engine_run::write_message(const void *object)
-{
-    if (soap_envelope_out_begin(this) || soap_header_put(this) || soap_body_out_begin(this) ||
-        binding::class_pointer_out(this, ops, element, -1, object, "") || soap_body_out_end(this) ||
-        soap_envelope_out_end(this))
-        return error;
-    return 0;
-}
-
 std::size_t engine_run::write(const void *object)
 {
     sent = 0;
     encoding_style = nullptr;
     soap_reset_call(this);
-    soap_mark_header(this);
-    binding::class_pointer_mark(this, ops, object);
-    if (soap_count_begin(this) || !(mode & MODE_COUNTING) || write_message(object) || soap_count_end(this))
+    request_message message{element, &ops, object};
+    if (request_count(this, message) || !(mode & MODE_COUNTING))
         return 0;
     const std::size_t counted = static_cast<std::size_t>(soap_message_length(this));
-    if (soap_send_begin(this) || write_message(object) || soap_send_finish(this))
+    if (soap_send_begin(this) || request_write(this, message) || soap_send_finish(this))
         return 0;
+    message_store_wipe(this);
     return sent == counted ? sent : 0;
 }
 

@@ -29,7 +29,6 @@ public:
 private:
     static int take(soap *ctx, const char *data, std::size_t length);
     static std::size_t give(soap *ctx, char *buffer, std::size_t length);
-    int write_message(const void *object);
 
     const binding::class_ops &ops;
     const char *element;

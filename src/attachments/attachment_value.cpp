@@ -15,6 +15,7 @@
 #include "attachments/attachment_list.h"
 #include "attachments/dime.h"
 #include "core/failure.h"
+#include "core/message_store.h"
 #include "identity/multiref.h"
 #include "xml/xml_input.h"
 
@@ -191,6 +192,8 @@ int soap_attachment_ref_out(soap *ctx, const char *tag, int id, const void *addr
     if (address == nullptr || bytes == nullptr || bytes->content == nullptr ||
         (id_text == nullptr && type == nullptr))
         return soap_element_ref(ctx, tag, id, address, holder, dimensions, type_text, type_id);
+    if (marks_require(ctx) != SOAP_OK) // they switch attachments on
+        return ALL_WRITTEN;
     soap_pointer_record *const record = find_or_add(ctx, value_of(holder, id_text, type, options));
     if (record == nullptr)
         return ALL_WRITTEN;

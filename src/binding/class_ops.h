@@ -9,6 +9,7 @@
 #include <cstdint>
 #include <string>
 #include <string_view>
+#include <typeinfo>
 
 #include <zuv_client_pro/soap.h>
 
@@ -56,9 +57,11 @@ struct class_ops {
     void *(*create)(soap *owner, int count); // count < 0: one object; null if memory runs out
     void (*destroy)(void *object, int count);
     void (*assign)(void *target, const void *source);
-    void (*reset)(void *object, soap *owner);    // virtual soap_default
-    int (*type_of)(const void *object);          // virtual soap_type
-    void (*mark)(const void *object, soap *ctx); // virtual soap_serialize
+    void (*reset)(void *object, soap *owner);               // virtual soap_default
+    int (*type_of)(const void *object);                     // virtual soap_type
+    const std::type_info *(*type_info)(const void *object); // of the object, which a host may have derived
+    const std::type_info *own_type_info;                    // of the class
+    void (*mark)(const void *object, soap *ctx);            // virtual soap_serialize
     int (*out)(const void *object, soap *ctx, const char *tag, int id, const char *type); // virtual soap_out
     int (*write_content)(soap *ctx, const void *object,
                          const char *tag); // members, or the text of simple content

@@ -355,6 +355,11 @@ template <class T> int type_of_object(const void *object)
     return static_cast<const T *>(object)->soap_type();
 }
 
+template <class T> const std::type_info *type_info_of(const void *object)
+{
+    return &typeid(*static_cast<const T *>(object));
+}
+
 template <class T> void mark_object(const void *object, soap *ctx)
 {
     static_cast<const T *>(object)->soap_serialize(ctx);
@@ -422,6 +427,8 @@ template <class T> constexpr class_ops make_ops()
             &assign<T>,
             &reset_object<T>,
             &type_of_object<T>,
+            &type_info_of<T>,
+            &typeid(T),
             &mark_object<T>,
             &out_object<T>,
             content_writer<T>(),

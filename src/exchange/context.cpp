@@ -25,10 +25,12 @@
 
 #include "core/context_state.h"
 #include "core/memory.h"
+#include "core/message_store.h"
 #include "core/trace_log.h"
 #include "core/tracking.h"
 #include "exchange/context.h"
 #include "exchange/fault.h"
+#include "net/head_memory.h"
 #include "xml/attributes.h"
 
 // ---------------------------------------------------------------------------------------------
@@ -269,6 +271,8 @@ void soap_engine_done(soap *ctx)
     close_master_socket(ctx);
     end_tls(ctx);
     end_compression(ctx);
+    message_store_free(ctx);
+    head_memory_free(ctx);
     credentials_wipe(ctx);
     trace_log_end(ctx);
     ctx->state = 0;

@@ -240,6 +240,9 @@ constexpr std::uint64_t POOL_LIMIT_DEFAULT = SOAP_POOL_LIMIT;
     X(mtom_list, MESSAGE, {}) \
     X(mtom_index, MESSAGE, {}) \
     X(attachment_stage, MESSAGE, {}) \
+    X(store_end, MESSAGE, {}) \
+    X(store_space, MESSAGE, {}) \
+    X(mark_state, MESSAGE, {}) \
     X(filter_stop, CONNECTION, {}) \
     X(socket, CONNECTION, -1) \
     X(opened_by, CONNECTION, {}) \
@@ -265,6 +268,8 @@ constexpr std::uint64_t POOL_LIMIT_DEFAULT = SOAP_POOL_LIMIT;
     X(track_chains, RESOURCE, {}) \
     X(track_chain_mask, RESOURCE, {}) \
     X(pools, RESOURCE, {}) \
+    X(store, RESOURCE, {}) \
+    X(head_memory, RESOURCE, {}) \
     X(tls_bio, RESOURCE, {}) \
     X(tls_connection, RESOURCE, {}) \
     X(tls_session, RESOURCE, {}) \

@@ -227,7 +227,7 @@ TEST(many_calls, leave_a_proxy_as_small_as_it_was_and_allocate_nothing)
         ASSERT_EQ(0U, calls.call(3)) << i;
 }
 
-TEST(ReleasedObjects, of_a_large_message_leave_the_pool_as_it_was)
+TEST(released_objects, of_a_large_message_leave_the_pool_as_it_was)
 {
     steady_calls calls(64 << 10);
     calls.call(1000); // makes the book-keeping as large as it gets
@@ -245,7 +245,7 @@ TEST(ReleasedObjects, of_a_large_message_leave_the_pool_as_it_was)
     EXPECT_GT(calls.call(5), 20U);
 }
 
-TEST(ReleasedObjects, that_nobody_needs_any_more_go_by_and_by)
+TEST(released_objects, that_nobody_needs_any_more_go_by_and_by)
 {
     steady_calls calls;
     calls.call(1);
@@ -264,7 +264,7 @@ TEST(ReleasedObjects, that_nobody_needs_any_more_go_by_and_by)
 }
 
 // The host may take objects out and delete them, and give objects in with a hook of its own.
-TEST(ReleasedObjects, are_blocks_of_their_own_and_a_hosts_hook_has_its_way)
+TEST(released_objects, are_blocks_of_their_own_and_a_hosts_hook_has_its_way)
 {
     steady_calls calls;
     static int deleted;
@@ -290,7 +290,7 @@ TEST(ReleasedObjects, are_blocks_of_their_own_and_a_hosts_hook_has_its_way)
 }
 
 // What waits in the pool holds nothing of the message, and none of it goes to a copy of the context.
-TEST(ReleasedObjects, are_wiped_and_stay_in_their_context)
+TEST(released_objects, are_wiped_and_stay_in_their_context)
 {
     steady_calls calls;
     const std::string secret = "a password that is too long for its place";
