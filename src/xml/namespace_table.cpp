@@ -177,10 +177,13 @@ void give_received(soap *ctx, char *received)
     SOAP_FREE(ctx, received);
 }
 
-// A row's URI is about to change: declarations of the held element that are bound to it become attributes
-// while it still tells what they said. 0 or 20.
-int keep_declared(soap *ctx, const soap_namespace &row)
+// A row is about to stand for another URI: declarations of the held element that are bound to it become
+// attributes while it still tells what they said. 0 or 20.
+int keep_declared(soap *ctx, const soap_namespace &row, const char *uri)
 {
+    const char *const before = xml_row_uri(row);
+    if (before != nullptr && uri != nullptr && std::strcmp(before, uri) == 0)
+        return 0;
     const soap_prefix *record = ctx->prefix_list;
     for (std::uint32_t left = ctx->bare_declarations; left > 0 && record != nullptr; --left) {
         if (record->index >= 0 && &ctx->local_namespaces[record->index] == &row)
@@ -297,7 +300,7 @@ int xml_received_set(soap *ctx, soap_namespace &row, const char *uri)
 {
     if (row.received != nullptr && std::strcmp(row.received, uri) == 0)
         return 0;
-    if (keep_declared(ctx, row) != 0)
+    if (keep_declared(ctx, row, uri) != 0)
         return ctx->error;
     const std::size_t size = std::strlen(uri) + 1;
     char *copy = take_received(ctx, size);
@@ -313,7 +316,7 @@ void xml_received_drop(soap *ctx, soap_namespace &row)
 {
     if (row.received == nullptr)
         return;
-    keep_declared(ctx, row); // without memory the attribute tells the row's next URI
+    keep_declared(ctx, row, row.uri); // without memory the attribute tells the row's next URI
     if (ctx->encoding_style == row.received)
         ctx->encoding_style = "";
     give_received(ctx, row.received);
