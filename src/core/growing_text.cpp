@@ -13,10 +13,12 @@
 #include "core/memory.h"
 #include "core/tracking.h"
 
-static constexpr std::size_t CAPACITY_AT_START = 256; // bytes
-static constexpr std::size_t SPARE_TEXT_MAX = 4096;   // bytes of an area that waits for the next message
+namespace {
 
-static std::size_t capacity_for(const soap *ctx, std::size_t needed)
+constexpr std::size_t CAPACITY_AT_START = 256; // bytes
+constexpr std::size_t SPARE_TEXT_MAX = 4096;   // bytes of an area that waits for the next message
+
+std::size_t capacity_for(const soap *ctx, std::size_t needed)
 {
     std::size_t capacity = ctx->label_size == 0 ? CAPACITY_AT_START : ctx->label_size;
     while (capacity < needed)
@@ -25,7 +27,7 @@ static std::size_t capacity_for(const soap *ctx, std::size_t needed)
 }
 
 // The area of an earlier message becomes the text's first one if `needed` bytes fit it.
-static bool reuse_area(soap *ctx, std::size_t needed)
+bool reuse_area(soap *ctx, std::size_t needed)
 {
     if (ctx->label_buffer != nullptr || ctx->pools == nullptr || ctx->pools->spare_text_size < needed)
         return false;
@@ -33,6 +35,8 @@ static bool reuse_area(soap *ctx, std::size_t needed)
     ctx->label_size = std::exchange(ctx->pools->spare_text_size, 0);
     return true;
 }
+
+} // namespace
 
 void growing_text_free(soap *ctx)
 {

@@ -10,7 +10,9 @@
 #include "core/limits.h"
 #include "core/tracking.h"
 
-static void destroy_idle(soap *ctx, soap_instance *instance)
+namespace {
+
+void destroy_idle(soap *ctx, soap_instance *instance)
 {
     ctx->pools->idle.bytes -= static_cast<std::size_t>(instance->array_size);
     instance->array_size = -1;
@@ -18,7 +20,7 @@ static void destroy_idle(soap *ctx, soap_instance *instance)
     ctx->pools->instances.give(instance);
 }
 
-static void destroy_list(soap *ctx, soap_instance *first)
+void destroy_list(soap *ctx, soap_instance *first)
 {
     while (first != nullptr) {
         soap_instance *instance = first;
@@ -27,7 +29,7 @@ static void destroy_list(soap *ctx, soap_instance *first)
     }
 }
 
-static void thin_out(soap *ctx)
+void thin_out(soap *ctx)
 {
     idle_pool &idle = ctx->pools->idle;
     for (std::size_t word = 0; word < std::size(idle.used); ++word) {
@@ -38,6 +40,8 @@ static void thin_out(soap *ctx)
     }
     idle_blocks_thin(ctx);
 }
+
+} // namespace
 
 void idle_release_begin(soap *ctx)
 {

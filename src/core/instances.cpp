@@ -14,8 +14,10 @@
 #include "core/limits.h"
 #include "core/tracking.h"
 
-static soap_instance *enter_instance(soap *ctx, void *object, int type_id, int array_size,
-                                     int (*hook)(soap_instance *instance))
+namespace {
+
+soap_instance *enter_instance(soap *ctx, void *object, int type_id, int array_size,
+                              int (*hook)(soap_instance *instance))
 {
     soap_instance *instance = ctx->pools->instances.take();
     *instance = {ctx->instance_list, object, type_id, array_size, hook};
@@ -23,6 +25,8 @@ static soap_instance *enter_instance(soap *ctx, void *object, int type_id, int a
     memory_charge(ctx, sizeof *instance);
     return instance;
 }
+
+} // namespace
 
 // With no idle record at hand. Out of line, so that the usual way saves no registers for it.
 [[gnu::noinline]] static soap_instance *
@@ -42,8 +46,10 @@ soap_instance *soap_instance_register(soap *ctx, void *object, int type_id, int 
                    : enter_in_new_slab(ctx, object, type_id, array_size, hook);
 }
 
+namespace {
+
 // True if the object waits for the next message.
-static bool keep_instance(soap *ctx, soap_instance *instance)
+bool keep_instance(soap *ctx, soap_instance *instance)
 {
     if (instance->array_size >= 0 || instance->object == nullptr || instance->type_id <= IDLE_SHELLS ||
         instance->type_id >= IDLE_TYPES || !idle_has_room(ctx, instance->type_id, 1))
@@ -56,7 +62,7 @@ static bool keep_instance(soap *ctx, soap_instance *instance)
 }
 
 // The record must be out of the list: a destructor may come back to it.
-static void destroy_instance(soap *ctx, soap_instance *instance)
+void destroy_instance(soap *ctx, soap_instance *instance)
 {
     if (keep_instance(ctx, instance))
         return;
@@ -66,7 +72,7 @@ static void destroy_instance(soap *ctx, soap_instance *instance)
     ctx->pools->instances.give(instance);
 }
 
-static void destroy_all(soap *ctx)
+void destroy_all(soap *ctx)
 {
     idle_release_begin(ctx);
     while (ctx->instance_list != nullptr) {
@@ -80,6 +86,8 @@ static void destroy_all(soap *ctx)
     ctx->header = nullptr;
     ctx->fault = nullptr;
 }
+
+} // namespace
 
 void soap_discard_objects(soap *ctx, void *object)
 {

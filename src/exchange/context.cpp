@@ -177,7 +177,9 @@ void soap_reset_call(soap *ctx)
 // ---------------------------------------------------------------------------------------------
 // Release.
 
-static void free_attachment_references(soap *ctx)
+namespace {
+
+void free_attachment_references(soap *ctx)
 {
     while (ctx->mtom_list != nullptr) {
         soap_attachment_ref *reference = ctx->mtom_list;
@@ -185,6 +187,8 @@ static void free_attachment_references(soap *ctx)
         SOAP_FREE(ctx, reference);
     }
 }
+
+} // namespace
 
 void soap_call_scratch_free(soap *ctx)
 {
@@ -212,8 +216,10 @@ void soap_discard_all(soap *ctx)
     trace_log_close_all(ctx);
 }
 
+namespace {
+
 // A copy's plug-ins without a copy hook share their data with the source, which deletes it.
-static void end_plugins(soap *ctx)
+void end_plugins(soap *ctx)
 {
     while (ctx->plugin_list != nullptr) {
         soap_plugin_record *record = ctx->plugin_list;
@@ -224,14 +230,14 @@ static void end_plugins(soap *ctx)
     }
 }
 
-static void close_master_socket(soap *ctx)
+void close_master_socket(soap *ctx)
 {
     if (!ctx->master_shared && ctx->master_socket != -1)
         ctx->on_close_socket(ctx, ctx->master_socket);
     ctx->master_socket = -1;
 }
 
-static void end_tls(soap *ctx)
+void end_tls(soap *ctx)
 {
     SSL_SESSION_free(ctx->tls_session);
     ctx->tls_session = nullptr;
@@ -245,13 +251,15 @@ static void end_tls(soap *ctx)
     ERR_clear_error(); // OpenSSL frees the thread's error state itself when the thread ends
 }
 
-static void end_compression(soap *ctx)
+void end_compression(soap *ctx)
 {
     SOAP_FREE(ctx, ctx->zlib_stream);
     ctx->zlib_stream = nullptr;
     SOAP_FREE(ctx, ctx->zlib_buffer);
     ctx->zlib_buffer = nullptr;
 }
+
+} // namespace
 
 void soap_engine_done(soap *ctx)
 {

@@ -22,7 +22,7 @@ int write_message(soap *ctx, const request_message &message)
         binding::class_pointer_out(ctx, *message.ops, message.element, -1, message.object, "") ||
         soap_body_out_end(ctx) || soap_envelope_out_end(ctx))
         return ctx->error;
-    return 0;
+    return SOAP_OK;
 }
 
 // True if nobody can tell whether the message is written once or twice, and with marks or without: a tree with

@@ -160,7 +160,7 @@ void xml_attributes_hide(soap *ctx)
 int xml_attribute_room(soap *ctx, soap_attribute *record, std::size_t size)
 {
     if (record->size >= size)
-        return 0;
+        return SOAP_OK;
     size = std::max(size, USUAL_VALUE);
     SOAP_FREE(ctx, record->value);
     record->size = 0;
@@ -168,7 +168,7 @@ int xml_attribute_room(soap *ctx, soap_attribute *record, std::size_t size)
     if (record->value == nullptr)
         return fail(ctx, SOAP_OUT_OF_MEMORY);
     record->size = size;
-    return 0;
+    return SOAP_OK;
 }
 
 int xml_attribute_store(soap *ctx, soap_attribute *record, std::string_view value)
@@ -176,7 +176,7 @@ int xml_attribute_store(soap *ctx, soap_attribute *record, std::string_view valu
     if (xml_attribute_room(ctx, record, value.size() + 1))
         return ctx->error;
     *std::copy(value.begin(), value.end(), record->value) = '\0';
-    return 0;
+    return SOAP_OK;
 }
 
 void xml_attribute_free(soap *ctx, soap_attribute *record)
@@ -203,10 +203,10 @@ void xml_attributes_drop(soap *ctx)
 int soap_attr_set(soap *ctx, const char *name, const char *value, int escape)
 {
     if (*name == '-')
-        return 0;
+        return SOAP_OK;
     soap_attribute *record = xml_attribute_record(ctx, name);
     if (record != nullptr && record->visible != 0)
-        return 0;
+        return SOAP_OK;
     if (ctx->attributes_set == std::numeric_limits<std::int16_t>::max())
         return fail(ctx, SOAP_LENGTH);
     if (record == nullptr || (value != nullptr && xml_attribute_store(ctx, record, value)))
@@ -216,7 +216,7 @@ int soap_attr_set(soap *ctx, const char *name, const char *value, int escape)
     ++ctx->attributes_set;
     if (value != nullptr && std::strcmp(name, "wsu:Id") == 0)
         announce_wsu_id(ctx, value);
-    return 0;
+    return SOAP_OK;
 }
 
 void soap_attr_table_reset(soap *ctx)

@@ -281,13 +281,13 @@ int soap_prefix_push_out(soap *ctx, const char *prefix, const char *uri, int sta
 {
     if (is_canonical(ctx) && ctx->canonical_exclude != nullptr &&
         xml_list_names(ctx->canonical_exclude, prefix))
-        return 0;
+        return SOAP_OK;
     if (state == DECLARED) {
         const soap_prefix *known = xml_prefix_find(ctx, prefix);
         if (known != nullptr && (known->uri == nullptr || same_uri(known->uri, uri))) {
             const bool declared_here = known->uri != nullptr && known->level >= ctx->nesting_level;
             if (declared_here || known->index != TO_DECLARE)
-                return 0;
+                return SOAP_OK;
         }
         // Known without a URI: the element has used it and now says what it stands for. Known with another
         // URI: the element gives the prefix a new meaning, which must be written here to hold.
@@ -303,10 +303,10 @@ int soap_prefix_use(soap *ctx, const char *name)
     const std::string_view prefix = xml_prefix_of(name);
     const soap_prefix *known = xml_prefix_find(ctx, prefix);
     if (known != nullptr ? known->index != DECLARED : prefix.starts_with("xml"))
-        return 0;
+        return SOAP_OK;
     if (is_canonical(ctx) && ctx->canonical_exclude != nullptr && !prefix.empty() &&
         xml_list_names(ctx->canonical_exclude, prefix))
-        return 0;
+        return SOAP_OK;
     const char *uri = known != nullptr ? known->uri : nullptr;
     const std::size_t length = uri != nullptr ? std::strlen(uri) : 0;
     return push(ctx, prefix, uri, length, TO_DECLARE) != nullptr ? 0 : ctx->error;

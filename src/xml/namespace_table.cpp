@@ -85,7 +85,7 @@ int describe_rows(soap *ctx, const soap_namespace *table, std::size_t count)
         return ctx->error;
     if (scope->rows != nullptr && scope->row_count == count &&
         std::equal(table, table + count, scope->rows, same_texts))
-        return 0;
+        return SOAP_OK;
     forget_rows(ctx, scope);
     void *place = SOAP_MALLOC(ctx, (count + 1) * (sizeof(soap_namespace) + sizeof(namespace_lengths)));
     if (place == nullptr)
@@ -102,7 +102,7 @@ int describe_rows(soap *ctx, const soap_namespace *table, std::size_t count)
     scope->lengths = lengths;
     scope->row_count = count;
     index_uris(scope);
-    return 0;
+    return SOAP_OK;
 }
 
 bool is_declared(const soap_namespace &row)
@@ -183,14 +183,14 @@ int keep_declared(soap *ctx, const soap_namespace &row, const char *uri)
 {
     const char *const before = xml_row_uri(row);
     if (before != nullptr && uri != nullptr && std::strcmp(before, uri) == 0)
-        return 0;
+        return SOAP_OK;
     const soap_prefix *record = ctx->prefix_list;
     for (std::uint32_t left = ctx->bare_declarations; left > 0 && record != nullptr; --left) {
         if (record->index >= 0 && &ctx->local_namespaces[record->index] == &row)
             return xml_attributes_complete(ctx);
         record = record->next;
     }
-    return 0;
+    return SOAP_OK;
 }
 
 } // namespace
@@ -240,7 +240,7 @@ void soap_namespace_scope_free(soap *ctx)
 int soap_namespace_table_copy(soap *ctx)
 {
     if (ctx->local_namespaces != nullptr || ctx->namespaces == nullptr)
-        return 0;
+        return SOAP_OK;
     const bool measured = is_measured(ctx->namespace_scope, ctx->namespaces);
     const std::size_t count = measured ? ctx->namespace_scope->row_count : count_rows(ctx->namespaces);
     if (!measured && describe_rows(ctx, ctx->namespaces, count))
@@ -263,7 +263,7 @@ int soap_namespace_table_copy(soap *ctx)
     if (count > 0)
         ctx->soap_version =
             (rows[0].uri != nullptr) && std::strcmp(rows[0].uri, SOAP_11_ENVELOPE) == 0 ? 1 : 2;
-    return 0;
+    return SOAP_OK;
 }
 
 void soap_namespace_table_drop(soap *ctx)
@@ -299,7 +299,7 @@ int soap_set_namespaces(soap *ctx, const soap_namespace *table)
 int xml_received_set(soap *ctx, soap_namespace &row, const char *uri)
 {
     if (row.received != nullptr && std::strcmp(row.received, uri) == 0)
-        return 0;
+        return SOAP_OK;
     if (keep_declared(ctx, row, uri) != 0)
         return ctx->error;
     const std::size_t size = std::strlen(uri) + 1;
@@ -309,7 +309,7 @@ int xml_received_set(soap *ctx, soap_namespace &row, const char *uri)
     std::memcpy(copy, uri, size);
     xml_received_drop(ctx, row);
     row.received = copy;
-    return 0;
+    return SOAP_OK;
 }
 
 void xml_received_drop(soap *ctx, soap_namespace &row)

@@ -12,6 +12,7 @@
 #include <string_view>
 #include <utility>
 
+#include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_primitive.h>
 
 #include "xml/attributes.h"
@@ -57,7 +58,7 @@ int store_value(soap *ctx, soap_attribute *record, const char *text, std::size_t
     std::memcpy(record->value, text, length);
     record->value[length] = '\0';
     record->visible = 2;
-    return 0;
+    return SOAP_OK;
 }
 
 // ------------------------------------------------------------------------------------------ values
@@ -108,7 +109,7 @@ template <template <bool> class Stop> int gather_value(soap *ctx)
         if (stop == input_end(ctx))
             continue;
         if (!is_special(*stop))
-            return 0;
+            return SOAP_OK;
         const int error = gather_special(ctx);
         if (error != 0)
             return error;
@@ -148,7 +149,7 @@ template <template <bool> class Stop> int read_value(soap *ctx, soap_attribute *
         *names_wide = true;
     else
         narrow_value(record);
-    return 0;
+    return SOAP_OK;
 }
 
 int read_quoted(soap *ctx, soap_attribute *record, char quote, bool *names_wide)
@@ -208,7 +209,7 @@ int take_declarations(soap *ctx, int &count)
         while (here != input_end(ctx) && is_blank(static_cast<unsigned char>(*here)))
             ++here;
         if (!find_declaration(here, input_end(ctx), found))
-            return 0;
+            return SOAP_OK;
         char &end = ctx->buffer[found.uri_end - ctx->buffer];
         const char quote = std::exchange(end, '\0');
         const soap_prefix *record =
@@ -220,7 +221,7 @@ int take_declarations(soap *ctx, int &count)
         input_consume(ctx, found.uri_end + 1);
         ++ctx->bare_declarations;
     }
-    return 0;
+    return SOAP_OK;
 }
 
 // The end of the tag comes next and is in the buffer.
@@ -258,7 +259,7 @@ int show_declarations(soap *ctx, attribute_order &order)
     }
     ctx->bare_declarations = 0;
     ctx->attributes_set = 1;
-    return 0;
+    return SOAP_OK;
 }
 
 int read_attribute(soap *ctx, attribute_order &order, bool *names_wide)
@@ -275,7 +276,7 @@ int read_attribute(soap *ctx, attribute_order &order, bool *names_wide)
         order.put(record);
     record->visible = 1; // the last of one name counts
     if (input_skip_blanks(ctx) != '=')
-        return 0;
+        return SOAP_OK;
     ctx->buffer_index++;
     const std::int32_t first = input_skip_blanks(ctx);
     if (first == XML_EOF)
@@ -287,7 +288,7 @@ int read_attribute(soap *ctx, attribute_order &order, bool *names_wide)
         return error;
     const char *prefix = declared_prefix(record);
     if (prefix == nullptr)
-        return 0;
+        return SOAP_OK;
     return soap_prefix_push_in(ctx, prefix, record->value) != nullptr ? 0 : ctx->error;
 }
 
@@ -482,7 +483,7 @@ int xml_attributes_read(soap *ctx, bool *names_wide, bool *all_taken)
     for (;; ++count) {
         const std::int32_t byte = input_skip_blanks(ctx);
         if (byte == XML_EOF || byte == '>' || byte == '/')
-            return 0;
+            return SOAP_OK;
         int error = count < SOAP_ATTRIBUTES_MAX ? 0 : SOAP_SYNTAX_ERROR;
         if (error == 0 && ctx->bare_declarations != 0)
             error = show_declarations(ctx, order);
@@ -496,7 +497,7 @@ int xml_attributes_read(soap *ctx, bool *names_wide, bool *all_taken)
 int xml_attributes_complete(soap *ctx)
 {
     if (ctx->bare_declarations == 0)
-        return 0;
+        return SOAP_OK;
     attribute_order order(ctx);
     return show_declarations(ctx, order);
 }

@@ -295,14 +295,18 @@ int xml_skip_tag(soap *ctx)
     return XML_EOF;
 }
 
+namespace {
+
 // An element begins, with content, within `depth` others that are skipped: true if it is one too many.
-static bool skips_too_deep(soap *ctx, std::uint64_t depth)
+bool skips_too_deep(soap *ctx, std::uint64_t depth)
 {
     if (ctx->max_depth == 0 || ctx->nesting_level + depth < ctx->max_depth)
         return false;
     fail(ctx, SOAP_LENGTH);
     return true;
 }
+
+} // namespace
 
 int xml_skip_content(soap *ctx, std::uint64_t depth)
 {
@@ -314,7 +318,7 @@ int xml_skip_content(soap *ctx, std::uint64_t depth)
         else if (!too_deep && skip_past(ctx, '<') != XML_EOF)
             token = xml_markup_next(ctx);
         if (token == XML_END && depth-- == 0)
-            return 0;
+            return SOAP_OK;
         if (token == XML_START) {
             token = xml_skip_tag(ctx);
             too_deep = token == 0 && skips_too_deep(ctx, depth++);
