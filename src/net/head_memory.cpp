@@ -78,10 +78,8 @@ memory *memory_of(soap *ctx)
     if (ctx->head_memory != nullptr)
         return ctx->head_memory;
     ctx->head_memory = static_cast<memory *>(SOAP_MALLOC(ctx, sizeof(memory)));
-    if (ctx->head_memory != nullptr) {
-        ctx->head_memory->end = 0;
-        ctx->head_memory->endpoint.text[0] = '\0';
-    }
+    if (ctx->head_memory != nullptr)
+        *ctx->head_memory = {};
     return ctx->head_memory;
 }
 
