@@ -24,7 +24,7 @@ constexpr std::size_t SPARE_ATTRIBUTE_SIZE =
     1024; // bytes of value; a record with a larger one is freed at once
 
 constexpr std::size_t URI_SLOTS = 64;        // power of two
-constexpr std::size_t ROOT_BYTES_MAX = 4096; // of a remembered root element's declarations
+constexpr std::size_t ROOT_BYTES_MAX = 4096; // for a remembered root element
 constexpr std::size_t RECEIVED_SIZE = 128;   // bytes; longer received URIs have blocks of their own
 constexpr std::size_t RECEIVED_KEPT = 4;     // blocks for received URIs that stay from call to call
 constexpr std::size_t ROOT_RECEIVED_MAX = 8; // rows that took a URI in it
@@ -37,7 +37,8 @@ struct namespace_lengths {
 
 // The declarations of the last message's root element, with what became of them; see root_head.h.
 struct remembered_root {
-    char *bytes;        // from after the tag's name up to and with its ">"; owned; null until first use
+    // From after the tag's name up to and with its ">"; after that the URIs received, terminated.
+    char bytes[ROOT_BYTES_MAX];
     std::size_t length; // 0: nothing is remembered
     bool empty_tag;     // the tag ends in "/>"
     soap_prefix *first; // the innermost of its records; null without any
@@ -45,7 +46,7 @@ struct remembered_root {
     std::size_t received_count;
     struct {
         std::int16_t row;
-        char *uri; // owned
+        const char *uri; // in `bytes`
     } received[ROOT_RECEIVED_MAX];
 };
 

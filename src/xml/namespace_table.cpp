@@ -17,7 +17,6 @@
 #include "xml/attributes.h"
 #include "xml/namespace.h"
 #include "xml/namespace_scope.h"
-#include "xml/root_head.h"
 #include "xml/xml_read.h"
 
 namespace {
@@ -230,7 +229,6 @@ void soap_namespace_scope_free(soap *ctx)
         scope->spare_attributes = next;
     }
     forget_rows(ctx, scope);
-    root_head_free(ctx, scope->root);
     for (char *block : scope->received)
         SOAP_FREE(ctx, block);
     SOAP_FREE(ctx, scope);

@@ -3,37 +3,29 @@
 
 #include <cstring>
 
-#include <zuv_client_pro/soap_memory.h>
-
 #include "xml/namespace.h"
 #include "xml/namespace_scope.h"
 #include "xml/xml_input.h"
 
 namespace {
 
-// Notes the URIs that rows have received. False if they are too many or memory runs out.
-bool note_received(soap *ctx, remembered_root &root)
+// Notes the URIs that rows have received. False if they don't fit.
+bool note_received(const soap *ctx, remembered_root &root, std::size_t used)
 {
+    root.received_count = 0;
     for (std::size_t i = 0; ctx->local_namespaces[i].prefix != nullptr; ++i) {
         const char *uri = ctx->local_namespaces[i].received;
         if (uri == nullptr)
             continue;
-        if (root.received_count == ROOT_RECEIVED_MAX)
-            return false;
         const std::size_t size = std::strlen(uri) + 1;
-        auto *copy = static_cast<char *>(SOAP_MALLOC(ctx, size));
-        if (copy == nullptr)
+        if (root.received_count == ROOT_RECEIVED_MAX || size > ROOT_BYTES_MAX - used)
             return false;
-        std::memcpy(copy, uri, size);
-        root.received[root.received_count++] = {static_cast<std::int16_t>(i), copy};
+        root.received[root.received_count++] = {
+            static_cast<std::int16_t>(i),
+            static_cast<const char *>(std::memcpy(root.bytes + used, uri, size))};
+        used += size;
     }
     return true;
-}
-
-void drop_received(soap *ctx, remembered_root &root)
-{
-    while (root.received_count > 0)
-        SOAP_FREE(ctx, root.received[--root.received_count].uri);
 }
 
 } // namespace
@@ -83,22 +75,11 @@ void root_head_learn(soap *ctx, const char *start)
     root.length = 0;
     if (length > ROOT_BYTES_MAX)
         return;
-    if (root.bytes == nullptr)
-        root.bytes = static_cast<char *>(SOAP_MALLOC(ctx, ROOT_BYTES_MAX));
-    drop_received(ctx, root);
-    if (root.bytes == nullptr || !note_received(ctx, root))
+    if (!note_received(ctx, root, length))
         return;
     std::memcpy(root.bytes, start, length);
     root.length = length;
     root.empty_tag = ctx->has_body == 0;
     root.first = ctx->prefix_list;
     root.count = ctx->namespace_scope->in_scope;
-}
-
-void root_head_free(soap *ctx, remembered_root &root)
-{
-    drop_received(ctx, root);
-    SOAP_FREE(ctx, root.bytes);
-    root.bytes = nullptr;
-    root.length = 0;
 }

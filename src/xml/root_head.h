@@ -11,8 +11,6 @@
 
 #include <zuv_client_pro/soap.h>
 
-struct remembered_root;
-
 // Nothing stands before the element whose tag is being read: no prefix in scope, no URI received for a row.
 bool root_head_stands_alone(const soap *ctx);
 
@@ -22,7 +20,5 @@ bool root_head_stands_alone(const soap *ctx);
 bool root_head_resume(soap *ctx);
 
 // Remembers the bytes from `start` on, which have just been read, all plain declarations, in an element that
-// stood alone. Without memory nothing is remembered.
+// stood alone. What is too long is not remembered.
 void root_head_learn(soap *ctx, const char *start);
-
-void root_head_free(soap *ctx, remembered_root &root);
