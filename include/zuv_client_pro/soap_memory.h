@@ -174,7 +174,7 @@ ZUV_API void soap_block_stack_drop(soap *ctx, soap_block_stack *stack);
 ZUV_API int soap_text_buffer_put(soap *ctx, const char *text, std::size_t length);
 ZUV_API int soap_text_buffer_reset_put(soap *ctx, const char *text, std::size_t length);
 // Makes space for more bytes after label_index without using them.
-//   room  bytes
+//   bytes  that will be appended
 //   SOAP_OK
 //   SOAP_OUT_OF_MEMORY
-ZUV_API int soap_text_buffer_reserve(soap *ctx, std::size_t room);
+ZUV_API int soap_text_buffer_reserve(soap *ctx, std::size_t bytes);

@@ -77,7 +77,7 @@ std::uint32_t hash_of(const outgoing_value &value)
     return static_cast<std::uint32_t>(hash >> 32 ^ hash);
 }
 
-// The entry of the attachment that a value goes out as. Null with error 20.
+// The entry of the attachment that a value goes out as. Null with SOAP_OUT_OF_MEMORY.
 soap_pointer_record *find_or_add(soap *ctx, const outgoing_value &value)
 {
     const std::uint32_t hash = hash_of(value);

@@ -24,7 +24,7 @@ struct member_entry {
     std::string_view local; // its local part
     member_reader read;
     bool single;   // taken once; a further occurrence is unknown
-    bool required; // in strict mode its absence is error 44 (single members)
+    bool required; // in strict mode its absence is SOAP_OCCURS (single members)
 };
 
 constexpr std::size_t MEMBERS_MAX = 64; // members of a class, inherited ones included: bits of a mask
@@ -105,10 +105,10 @@ int class_pointer_out(soap *ctx, const class_ops &ops, const char *tag, int id, 
 void class_pointer_mark(soap *ctx, const class_ops &ops, const void *object);
 
 // A reference is to be filled by a copy of an object of `size` bytes with `content` bytes beside it. False
-// with error 45.
+// with SOAP_LENGTH.
 bool object_copy_allowed(soap *ctx, std::size_t size, std::size_t content);
 
-// Makes a managed object of the class, or of the derived class that xsi_type names. Null with error 20.
+// Makes a managed object of the class, or of the derived class that xsi_type names. Null with SOAP_OUT_OF_MEMORY.
 void *class_instantiate(soap *ctx, const class_ops &ops, int count, const char *xsi_type, std::size_t *size,
                         const class_ops **made);
 

@@ -37,7 +37,7 @@ bool ends(soap *ctx, const char *tag, bool body)
     return !body || soap_element_in_end(ctx, tag) == 0;
 }
 
-// A new text of the context. Null with error 20.
+// A new text of the context. Null with SOAP_OUT_OF_MEMORY.
 std::string *new_text(soap *ctx, std::string_view content = {})
 {
     soap_instance *instance = instance_reuse(ctx, TEXT_TYPE_ID);

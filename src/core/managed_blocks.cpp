@@ -47,7 +47,7 @@ int corruption(soap *ctx)
     return fail(ctx, SOAP_CORRUPTION);
 }
 
-// 0, or error 21 for a block whose end was overwritten.
+// SOAP_OK or SOAP_CORRUPTION for a block whose end was overwritten.
 int check_canary(soap *ctx, soap_block_trailer *trailer)
 {
     std::uint16_t found;

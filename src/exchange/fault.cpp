@@ -156,7 +156,7 @@ const char *text_or(const char *text, const char *otherwise)
     return text == nullptr ? otherwise : text;
 }
 
-// Hands the printed form to `put`, piece by piece; nothing for error 0.
+// Hands the printed form to `put`, piece by piece; nothing for SOAP_OK.
 template <class Put> void print_fault(soap *ctx, Put put)
 {
     if (ctx->error == SOAP_OK)

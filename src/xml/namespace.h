@@ -23,7 +23,7 @@ bool xml_row_is_shadowed(const soap_namespace *rows, const struct namespace_leng
                          std::size_t row);
 
 // Keeps a copy of `uri` as the one received for a row of the working copy; "" of encoding_style is renewed
-// with it. An equal URI is not copied again. 0 or SOAP_OUT_OF_MEMORY.
+// with it. An equal URI is not copied again. SOAP_OK or SOAP_OUT_OF_MEMORY.
 int xml_received_set(soap *ctx, soap_namespace &row, const char *uri);
 void xml_received_drop(soap *ctx, soap_namespace &row);
 

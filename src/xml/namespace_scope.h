@@ -80,7 +80,7 @@ struct soap_namespace_scope {
     bool declarations_plain;       // no URI needs an escape
 };
 
-// The context's record, made now if need be. Null if memory runs out, with error 20.
+// The context's record, made now if need be. Null if memory runs out, with SOAP_OUT_OF_MEMORY.
 soap_namespace_scope *namespace_scope_of(soap *ctx);
 
 // True if the row has a prefix of this length; false too when that isn't known.

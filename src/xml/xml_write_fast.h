@@ -41,7 +41,7 @@ inline char *xml_reserve(soap *ctx, std::size_t length)
     return place;
 }
 
-// Raises the element depth for a start tag. 0, or SOAP_LENGTH past ctx->max_depth open elements.
+// Raises the element depth for a start tag. SOAP_OK or SOAP_LENGTH past ctx->max_depth open elements.
 inline int xml_enter(soap *ctx)
 {
     ++ctx->nesting_level;
