@@ -248,7 +248,7 @@ struct told {
     bool operator==(const told &) const = default;
 };
 
-class Requests : public Classes {
+class requests : public every_class {
 protected:
     static constexpr char HEAD[] = "POST / HTTP/1.1\r\n\r\n";
 
@@ -305,7 +305,7 @@ protected:
     protocol__Contact contact;
 };
 
-TEST_F(Requests, written_once_are_those_written_twice)
+TEST_F(requests, written_once_are_those_written_twice)
 {
     const std::uint32_t modes[] = {0,
                                    MODE_BUFFERED,
@@ -339,7 +339,7 @@ TEST_F(Requests, written_once_are_those_written_twice)
     });
 }
 
-TEST_F(Requests, of_any_length_are_the_same_both_ways)
+TEST_F(requests, of_any_length_are_the_same_both_ways)
 {
     const binding::class_ops &ops = binding::traits<protocol__Contact>::ops;
     send(true, ops, contact_with(0));
@@ -375,7 +375,7 @@ struct own_contact : protocol__Contact {
     }
 };
 
-TEST_F(Requests, go_the_long_way_where_somebody_could_tell)
+TEST_F(requests, go_the_long_way_where_somebody_could_tell)
 {
     const struct {
         const char *rule;
@@ -427,7 +427,7 @@ TEST_F(Requests, go_the_long_way_where_somebody_could_tell)
 }
 
 // Binary content is written in place unless it has an id or a type, which make an attachment of it.
-TEST_F(Requests, with_binary_content_turn_to_attachments_as_they_did)
+TEST_F(requests, with_binary_content_turn_to_attachments_as_they_did)
 {
     unsigned char bytes[] = {1, 2, 3};
     xsd__base64Binary binary;

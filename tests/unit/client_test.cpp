@@ -101,6 +101,7 @@ TEST(client_results, live_as_long_as_they_are_kept)
 TEST(client_results, are_kept_or_refused_when_memory_runs_out)
 {
     wired_client wired;
+    wired.client.context()->pool_limit = 0; // so that a call allocates
     const profile_result kept = wired.get(named_answer("kept"));
     const auto refill = [&] {
         wired.wire.answers.assign(1, named_answer("next"));

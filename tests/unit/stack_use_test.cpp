@@ -99,7 +99,7 @@ TEST(stack_use, of_writing_one_level)
     });
 }
 
-TEST(StackUse, of_a_call_beside_its_proxy_object)
+TEST(stack_use, of_a_call_besides_its_proxy_object)
 {
     const auto call = std::make_unique<profile_call>();
     protocol__Contact contact;
