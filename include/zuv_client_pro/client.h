@@ -80,7 +80,8 @@ class ZUV_CLASS outcome {
 public:
     // Moves what the call brought. Afterwards it depends neither on the client nor on its thread; `other` is
     // a failure with code 0. Where no memory is left for that, the result stays with its client as it was.
-    //   other  the result to move
+    //   other    the result to move
+    //   returns  this result
     outcome(outcome &&other) noexcept;
     outcome &operator=(outcome &&other) noexcept;
 
@@ -165,7 +166,8 @@ private:
 class ZUV_CLASS client {
 public:
     // Takes over settings and connection. `other` can't call any more: its calls fail with SOAP_USER_ERROR.
-    //   other  the client to move
+    //   other    the client to move
+    //   returns  this client
     client(client &&other) noexcept : engine_(std::exchange(other.engine_, nullptr)) {}
     client &operator=(client &&other) noexcept;
     // Closes the connection. A result that is still there stays valid.
