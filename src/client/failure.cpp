@@ -27,9 +27,9 @@ const std::error_category &error_category()
         const char *name() const noexcept override { return "zuv"; }
         std::string message(int code) const override
         {
-            const std::string told = listed(code);
-            if (!told.empty())
-                return told;
+            std::string text = listed(code);
+            if (!text.empty())
+                return text;
             if (code >= 100 && code <= 999)
                 return "HTTP status " + std::to_string(code) + (*http_reason(code) != '\0' ? " " : "") +
                        http_reason(code);
