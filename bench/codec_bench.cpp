@@ -106,7 +106,7 @@ void read_by_hand(document &doc)
 
 void write_engine(document &doc)
 {
-    if (doc.engine.write(*doc.objects) != doc.bytes.size())
+    if (doc.engine.write(doc.objects) != doc.bytes.size())
         refuse(doc, "the engine can't write it");
 }
 
@@ -176,7 +176,7 @@ void write_pugixml(document &doc)
 void check(document &doc)
 {
     const auto *report = doc.engine.read(doc.bytes);
-    if (!report || engine_run().written(*report) != doc.bytes)
+    if (!report || engine_run().written(report) != doc.bytes)
         refuse(doc, "read and written again by the engine it is another document");
     doc.engine.release();
     if (append_all(doc) != doc.bytes)
@@ -188,7 +188,7 @@ std::unique_ptr<document> make(const char *name, std::size_t size)
     auto doc = std::make_unique<document>();
     doc->name = name;
     doc->objects = make_document(&doc->owner, size);
-    doc->bytes = doc->engine.written(*doc->objects);
+    doc->bytes = doc->engine.written(doc->objects);
     const std::size_t begin = doc->bytes.find(std::string("<") + ELEMENT);
     const std::size_t end = doc->bytes.rfind("</SOAP-ENV:Body>");
     if (begin == std::string::npos || end == std::string::npos || !peer::read(doc->bytes, doc->structs) ||

@@ -12,29 +12,17 @@
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_xml.h>
 
-#include "binding/class_ops.h"
+#include "core/message_store.h"
+#include "exchange/request.h"
 #include "traits_protocolProblemReport.h"
 
-namespace {
+engine_run::engine_run()
+    : engine_run(binding::traits<protocolProblemReport__ProblemReportContent>::ops,
+                 "protocolProblemReport:submitRequest")
+{}
 
-using report_class = protocolProblemReport__ProblemReportContent;
-
-constexpr char ELEMENT[] = "protocolProblemReport:submitRequest";
-
-const binding::class_ops &ops = binding::traits<report_class>::ops;
-
-int write_message(soap *ctx, const report_class &report)
-{
-    if (soap_envelope_out_begin(ctx) || soap_header_put(ctx) || soap_body_out_begin(ctx) ||
-        binding::class_pointer_out(ctx, ops, ELEMENT, -1, &report, "") || soap_body_out_end(ctx) ||
-        soap_envelope_out_end(ctx))
-        return ctx->error;
-    return 0;
-}
-
-} // namespace
-
-engine_run::engine_run() : soap(0, MODE_BUFFERED)
+engine_run::engine_run(const binding::class_ops &object_class, const char *element_name)
+    : soap(0, MODE_BUFFERED), ops(object_class), element(element_name)
 {
     on_send = take;
     on_recv = give;
@@ -62,44 +50,43 @@ std::size_t engine_run::give(soap *ctx, char *buffer, std::size_t length)
     return length;
 }
 
-std::size_t engine_run::write(const report_class &report)
+std::size_t engine_run::write(const void *object)
 {
     sent = 0;
     encoding_style = nullptr;
     soap_reset_call(this);
-    soap_mark_header(this);
-    binding::class_pointer_mark(this, ops, &report);
-    if (soap_count_begin(this) || !(mode & MODE_COUNTING) || write_message(this, report) ||
-        soap_count_end(this))
+    request_message message{element, &ops, object};
+    if (request_count(this, message) || !(mode & MODE_COUNTING))
         return 0;
     const std::size_t counted = static_cast<std::size_t>(soap_message_length(this));
-    if (soap_send_begin(this) || write_message(this, report) || soap_send_finish(this))
+    if (soap_send_begin(this) || request_write(this, message) || soap_send_finish(this))
         return 0;
+    message_store_wipe(this);
     return sent == counted ? sent : 0;
 }
 
-std::string engine_run::written(const report_class &report)
+std::string engine_run::written(const void *object)
 {
     std::string message;
     kept = &message;
-    if (write(report) == 0)
+    if (write(object) == 0)
         message.clear();
     kept = nullptr;
     return message;
 }
 
-report_class *engine_run::read(const std::string &message)
+void *engine_run::read(const std::string &message)
 {
     unread = message.data();
     unread_length = message.size();
-    void *report = nullptr;
+    void *object = nullptr;
     soap_reset_call(this);
     if (soap_receive_begin(this) || soap_envelope_in_begin(this) || soap_header_get(this) ||
-        soap_body_in_begin(this) || !binding::class_pointer_in(this, ops, ELEMENT, &report) ||
+        soap_body_in_begin(this) || !binding::class_pointer_in(this, ops, element, &object) ||
         !binding::independents_read(this) || soap_body_in_end(this) || soap_envelope_in_end(this) ||
         soap_receive_finish(this))
         return nullptr;
-    return static_cast<report_class *>(report);
+    return object;
 }
 
 void engine_run::release()

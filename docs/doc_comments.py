@@ -50,8 +50,9 @@ class Comment:
     def row(self, name):
         return next((" ".join(text) for names, text in self.rows if name in names), None)
 
-    def lines(self, declared=None, others=()):
-        """For a declaration with these arguments; `others` are those of the declarations that share the comment."""
+    def lines(self, declared=None, others=(), templates=()):
+        """For a declaration with these arguments, also of its template; `others` are those of the declarations that share the
+        comment."""
         result = list(self.text)
         if declared and declared[0] in ("ctx", "ctx_") and self.row("ctx") is None:
             result.append("\\param %s the context" % declared[0])
@@ -59,6 +60,8 @@ class Comment:
             told = escaped(" ".join(text).strip())
             if declared is None:
                 result += ["", "- <b>%s</b> %s" % (escaped(", ".join(names)), told)]
+            elif names[0] in templates:
+                result += ["\\tparam %s %s" % (names[0], told)]
             elif any(name in declared for name in names):
                 result += ["\\param %s %s" % (",".join(name for name in names if name in declared), told)]
             elif names == ["returns"]:
@@ -85,8 +88,8 @@ def split_line(line):
 
 def arguments(declaration):
     """Names of a function's arguments; null if it is none."""
-    code = re.sub(r"\s+", " ", re.sub(r"//.*", "", declaration))
-    start = re.search(r"\w\(|operator=\(", code)
+    code = re.sub(r"\s+", " ", re.sub(r"//.*", "", re.sub(r'"(?:\\.|[^"\\])*"', '""', declaration)))
+    start = re.search(r"\w\(|operator[^\w\s(]+\(", code)
     if not start or re.match(r"\s*(#|using|typedef|constexpr|enum)", code):
         return None
     depth, pieces = 0, [""]
@@ -98,12 +101,18 @@ def arguments(declaration):
             pieces.append("")
         elif not (letter == "(" and depth == 1):
             pieces[-1] += letter
-    pointers = [re.search(r"\(\*(\w+)\)", piece) or re.search(r"(\w+)(?:\[\d*\])?$", piece.strip()) for piece in pieces]
+    names = [piece.partition("=")[0].strip() for piece in pieces]
+    pointers = [re.search(r"\(\*(\w+)\)", name) or re.search(r"(\w+)(?:\[\d*\])?$", name) for name in names]
     return [found[1] for found in pointers if found]
 
 
 def gives_nothing(declaration):
-    return re.search(r"\bvoid \w+\(", declaration) is not None
+    """A function without a result: void, a constructor, a destructor."""
+    return re.search(r"\bvoid \w+\(|^\s*(?:explicit )?~?\w+\(", declaration) is not None
+
+
+def template_arguments(declaration):
+    return re.findall(r"(?:class|typename)(?:\.\.\.)? (\w+)", declaration) if "template <" in declaration else []
 
 
 class Macro:
@@ -259,7 +268,7 @@ class Filter:
         doc = above or (None if trailing else shared)
         if doc:
             indent = re.match(r" *", lines[0])[0]
-            told = doc.lines(arguments(joined), self.shared_names)
+            told = doc.lines(arguments(joined), self.shared_names, template_arguments(joined))
             self.comment([line for line in told if not gives_nothing(joined) or not line.startswith("\\ret")], indent)
         several = re.match(r"(\s*)((?:const )?[\w:]+) ([^()=]+, [^()=]+);$", code[0] if len(code) == 1 else "")
         for number, each in enumerate(several[3].split(", ")) if several else [(0, None)]:

@@ -13,7 +13,11 @@
 #include <vector>
 
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
+#include <zuv_client_pro/client.h>
+#include <zuv_client_pro/client_attachment.h>
 #include <zuv_client_pro/protocol.h>
+#include <zuv_client_pro/protocolProfile.h>
+#include <zuv_client_pro/protocolStatusReport.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_log.h>
 #include <zuv_client_pro/soap_memory.h>
@@ -45,6 +49,53 @@ std::string make_profile()
     __protocolProfile__createResponse created;
     expect(proxy.create(&profile, created) == 0, "a profile is created");
     return created.result && !created.result->thisURI.empty() ? created.result->thisURI[0] : "";
+}
+
+void options_of_a_client()
+{
+    zuv::options wanted;
+    wanted.total_limit = std::chrono::seconds(60); // a call with its repetitions
+    wanted.ca_file = "/etc/agent/ca.pem";
+    wanted.proxy_from_environment = true; // http_proxy, https_proxy, no_proxy
+    zuv::profile_client client("https://care.example/zuv/v1.0/services/Profile", wanted);
+    expect(client.settings().ca_file == wanted.ca_file, "a client keeps its options");
+}
+
+void results_of_a_client(const std::string &uri)
+{
+    zuv::profile_client client(endpoint);
+    const auto got = client.get({}, zuv::extras().target(uri).repeatable());
+    if (!got) {
+        std::fprintf(stderr, "%s\n", got.failure().message().c_str());
+        for (const zuv::fault_info &fault : got.failure().faults())
+            if (const auto *missing = fault.as<protocol__Client_x002eObjectNotFound>())
+                std::printf("%zu not found\n", missing->uri.size());
+    }
+}
+
+void members_by_a_document()
+{
+    zuv::profile_client client(endpoint);
+    zuv::document document;
+    protocolProfile__ProfileContent profile;
+    zuv::set(zuv::make(profile.identity).name, "Ada's workshop");
+    zuv::set(zuv::add(profile.contact).name, "Ada");
+    const auto created = client.create(profile);
+    if (created && created->identity)
+        std::printf("kept for %s\n", zuv::text(created->identity->name, "nobody"));
+}
+
+// The endpoint is another port's and the file isn't there: the call fails.
+void attachments_of_a_client()
+{
+    zuv::status_report_client reports(endpoint);
+    protocolStatusReport__StatusReportContent report;
+    zuv::attachments files;
+    const zuv::part log =
+        zuv::file_part("agent.log"); // log.reference() goes into a member such as dataHandler
+    files.send(log).receive([](const zuv::received_part &) { return zuv::to_file("answer.bin"); });
+    const auto kept = reports.create(report, zuv::extras().carry(files));
+    expect(!kept && kept.failure().code(), "a file that isn't there can't be sent");
 }
 
 void life_of_a_proxy(std::string uri)
@@ -304,6 +355,11 @@ int main(int argc, char **argv)
     endpoint = argv[1];
     g_TraceLogFile[0] = '\0';
     const std::string uri = make_profile();
+    options_of_a_client();
+    results_of_a_client(uri);
+    results_of_a_client("urn:nobody");
+    members_by_a_document();
+    attachments_of_a_client();
     life_of_a_proxy(uri);
     ownership(uri);
     one_context_for_each_thread();

@@ -24,6 +24,7 @@ LAYERS = {
     "attachments": ["core", "xml", "identity"],
     "binding": ["core", "xml", "identity", "values", "attachments"],
     "exchange": ["core", "net", "xml", "identity", "values", "attachments", "binding"],
+    "client": ["core", "net", "xml", "identity", "values", "attachments", "binding", "exchange"],
 }
 LIBRARIES = ["-lssl", "-lcrypto", "-lz"]
 root = pathlib.Path(__file__).resolve().parent.parent

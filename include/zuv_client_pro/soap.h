@@ -27,6 +27,8 @@ struct soap;
 struct SOAP_ENV__Header;
 struct SOAP_ENV__Fault;
 
+struct soap_head_memory; // see soap::head_memory
+
 // Handles of OpenSSL and zlib: named here so that a host program needs none of their headers.
 struct bio_st;
 struct ssl_st;
@@ -46,10 +48,12 @@ constexpr std::size_t SOAP_POINTER_HASH_SIZE = 4096; // chains of the pointer ta
 constexpr std::size_t SOAP_TRACK_HASH_SIZE = 4096;   // chains of the memory tracking table at its start
 constexpr std::size_t SOAP_POINTER_BLOCK_SIZE = 32;  // pointer records in one block
 constexpr std::size_t SOAP_POSITIONS_MAX = 16;       // array positions kept for SOAP-ENC:position
+constexpr std::size_t SOAP_STORE_SIZE = 131072;      // bytes; longest message that a call writes but once
 constexpr std::size_t SOAP_LOG_CHANNELS = 3;         // received, sent, third
 constexpr std::uint32_t SOAP_MAX_DEPTH = 4096;       // default of soap::max_depth
 constexpr std::uint64_t SOAP_MAX_MESSAGE = std::uint64_t{1} << 30;  // bytes; default of soap::max_message
 constexpr std::uint64_t SOAP_MAX_MEMORY = std::uint64_t{512} << 20; // bytes; default of soap::max_memory
+constexpr std::uint64_t SOAP_POOL_LIMIT = std::uint64_t{1} << 20;   // bytes; default of soap::pool_limit
 
 // --- mode flags ---
 //
@@ -125,8 +129,8 @@ struct soap_namespace {
     const char *prefix;  // the prefix written on the wire and used in all tag comparisons
     const char *uri;     // the namespace's own URI
     const char *pattern; // further URIs accepted, under soap_tag_match; null for none
-    // URI last received under the pattern; null for none. In soap::local_namespaces a block of SOAP_MALLOC
-    // (soap_memory.h) that is freed with the table; in static tables always null.
+    // URI last received under the pattern; null for none. In soap::local_namespaces it belongs to the context
+    // and goes with the table; in static tables always null.
     char *received;
 };
 
@@ -553,6 +557,18 @@ struct ZUV_CLASS soap {
     const struct soap_upcalls *upcalls;  // what lower layers ask of the exchange of messages; private
     int (*attachment_stage)(soap *ctx); // input: where soap_recv_more gets bytes from while the message comes
                                         // in chunks of DIME records; null otherwise; private
+    std::uint32_t bare_declarations;    // reader: declarations of the held element, the innermost ones in
+                                        // scope, that have no attribute record yet; private
+    // Most bytes of released objects, texts and blocks that are kept for messages to come, so that a steady
+    // caller's call allocates nothing; 0 none. See soap_memory.h.
+    std::uint64_t pool_limit;
+    // Output: the bytes of a call's message as they are counted, to be sent without being written again;
+    // private. The store is owned, of SOAP_STORE_SIZE bytes, made by the first call that can use it.
+    char *store;
+    char *store_end;               // where its next byte goes
+    std::size_t store_space;       // bytes that it still takes; 0 unless a message is being stored
+    std::int16_t mark_state;       // output: whether the message's objects were marked; private
+    soap_head_memory *head_memory; // owned; the last request head, to be sent again; private
 
     // --- construction ---
 

@@ -76,6 +76,11 @@ inline int soap_send_bytes(soap *ctx, const char *data, std::size_t length)
         if ((ctx->mode & MODE_COUNTING) != 0) {
             if (ctx->on_send_prepare == nullptr) {
                 ctx->message_count += length;
+                if (length <= ctx->store_space) {
+                    std::memcpy(ctx->store_end, data, length);
+                    ctx->store_end += length;
+                    ctx->store_space -= length;
+                }
                 return 0;
             }
         } else if ((ctx->mode & MODE_IO_MASK) != MODE_DIRECT &&

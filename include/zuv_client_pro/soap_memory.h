@@ -11,6 +11,18 @@
 
 #include <zuv_client_pro/soap.h>
 
+// --- what waits for the next message ---
+//
+// Objects of data classes, texts and blocks of at most 512 bytes that a context releases are emptied and kept,
+// up to soap::pool_limit bytes, and its next messages take them, so that a steady caller's call takes nothing
+// from malloc. Each stays a single object or block, which soap_block_unlink gives out as ever. Texts are
+// wiped as they are emptied, and so are blocks that held credentials. Instances with a deletion hook of the
+// host program's are not kept. A message that holds more than pool_limit bytes (soap::max_memory counts them,
+// with those that it takes from here) leaves no more than it found. What no message has needed for 64
+// releases goes by halves; a lowered limit holds from the next release on, and the end of the context frees
+// all. In a library built with AddressSanitizer the limit is 0 unless it is set, so that late use is seen.
+// A copy of a context takes the limit, and nothing of what waits.
+
 // --- tracked allocation ---
 //
 // Finds leaks and double frees, which it reports on standard error.
@@ -162,7 +174,7 @@ ZUV_API void soap_block_stack_drop(soap *ctx, soap_block_stack *stack);
 ZUV_API int soap_text_buffer_put(soap *ctx, const char *text, std::size_t length);
 ZUV_API int soap_text_buffer_reset_put(soap *ctx, const char *text, std::size_t length);
 // Makes space for more bytes after label_index without using them.
-//   room  bytes
+//   bytes  that will be appended
 //   SOAP_OK
 //   SOAP_OUT_OF_MEMORY
-ZUV_API int soap_text_buffer_reserve(soap *ctx, std::size_t room);
+ZUV_API int soap_text_buffer_reserve(soap *ctx, std::size_t bytes);

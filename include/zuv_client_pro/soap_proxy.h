@@ -6,6 +6,11 @@
 // Always: a proxy object is one engine context: one thread at a time, at most one connection, one set of
 // managed objects. Responses, the fault and the received header belong to it and live until `destroy` or its
 // end.
+//
+// A proxy object is large: a context's buffers and tables are part of it, about 162 KB, at most
+// SOAP_CONTEXT_BYTES_MAX. On a thread with a small stack, 256 KB or less, make it with new or in static
+// storage. A call takes at most SOAP_CALL_STACK_BYTES of the stack besides, for objects that are nested less
+// than 20 deep; what TLS and the system's look-up of names take is not in that.
 #pragma once
 
 #include <cstddef>
@@ -15,6 +20,9 @@
 #include <zuv_client_pro/protocol.h>
 #include <zuv_client_pro/soap.h>
 #include <zuv_client_pro/soap_envelope.h>
+
+constexpr std::size_t SOAP_CONTEXT_BYTES_MAX = 170 * 1024; // bytes; more than sizeof of any proxy class
+constexpr std::size_t SOAP_CALL_STACK_BYTES = 64 * 1024;   // bytes
 
 // Members of a proxy class P. All may be called between calls only.
 //   endpoint

@@ -45,6 +45,7 @@ def surface(names):
     """Lines of the file for exported names: functions and objects, then classes."""
     plain, classes = set(), collections.defaultdict(set)
     for name in output("c++filt", text="\n".join(names)).splitlines():
+        name = name.removeprefix("zuv::")  # the one namespace
         about = re.fullmatch(r"(vtable|typeinfo name|typeinfo) for (\w+)", name)
         member = re.fullmatch(r"(\w+)::(.*)", name)
         if about:

@@ -15,6 +15,7 @@
 #include "attachments/attachment_list.h"
 #include "attachments/dime.h"
 #include "core/failure.h"
+#include "core/message_store.h"
 #include "identity/multiref.h"
 #include "xml/xml_input.h"
 
@@ -76,7 +77,7 @@ std::uint32_t hash_of(const outgoing_value &value)
     return static_cast<std::uint32_t>(hash >> 32 ^ hash);
 }
 
-// The entry of the attachment that a value goes out as. Null with error 20.
+// The entry of the attachment that a value goes out as. Null with SOAP_OUT_OF_MEMORY.
 soap_pointer_record *find_or_add(soap *ctx, const outgoing_value &value)
 {
     const std::uint32_t hash = hash_of(value);
@@ -191,6 +192,8 @@ int soap_attachment_ref_out(soap *ctx, const char *tag, int id, const void *addr
     if (address == nullptr || bytes == nullptr || bytes->content == nullptr ||
         (id_text == nullptr && type == nullptr))
         return soap_element_ref(ctx, tag, id, address, holder, dimensions, type_text, type_id);
+    if (marks_require(ctx) != SOAP_OK) // they switch attachments on
+        return ALL_WRITTEN;
     soap_pointer_record *const record = find_or_add(ctx, value_of(holder, id_text, type, options));
     if (record == nullptr)
         return ALL_WRITTEN;

@@ -518,8 +518,10 @@ int soap_mime_parts_read_all(soap *ctx)
     return SOAP_OK;
 }
 
+namespace {
+
 // Drops what stands before the first line that begins with "--".
-static int skip_to_boundary(soap *ctx)
+int skip_to_boundary(soap *ctx)
 {
     bool line_start = true;
     for (;;) {
@@ -533,6 +535,8 @@ static int skip_to_boundary(soap *ctx)
         line_start = c == '\n';
     }
 }
+
+} // namespace
 
 // Reads on to the part that holds the message; the parts before it are kept.
 int mime_message_begin(soap *ctx)

@@ -13,7 +13,9 @@
 #include "binding/member_read.h"
 #include "binding/registry.h"
 #include "core/failure.h"
+#include "core/instance_pool.h"
 #include "core/limits.h"
+#include "core/message_store.h"
 #include "xml/namespace_scope.h"
 #include "xml/tag_view.h"
 #include "xml/xml_scan.h"
@@ -42,13 +44,16 @@ void *class_instantiate(soap *ctx, const class_ops &ops, int count, const char *
         if (named != nullptr && class_descends(named, &ops))
             actual = named;
     }
-    soap_instance *entry = soap_instance_register(ctx, nullptr, actual->type_id, count, soap_delete_object);
-    if (entry == nullptr)
-        return nullptr;
-    entry->object = actual->create(ctx, count);
-    if (entry->object == nullptr) {
-        // NOLINTNEXTLINE(clang-analyzer-core.NullDereference): no call lacks a context
-        return fail_null(ctx, SOAP_OUT_OF_MEMORY);
+    soap_instance *entry = count < 0 ? instance_reuse(ctx, actual->type_id) : nullptr;
+    if (entry == nullptr) {
+        entry = soap_instance_register(ctx, nullptr, actual->type_id, count, soap_delete_object);
+        if (entry == nullptr)
+            return nullptr;
+        entry->object = actual->create(ctx, count);
+        if (entry->object == nullptr) {
+            // NOLINTNEXTLINE(clang-analyzer-core.NullDereference): no call lacks a context
+            return fail_null(ctx, SOAP_OUT_OF_MEMORY);
+        }
     }
     const std::size_t bytes = actual->size * static_cast<std::size_t>(count < 0 ? 1 : count);
     memory_charge(ctx, bytes);
@@ -73,6 +78,17 @@ bool is_empty_text(const class_ops &ops, const void *object)
 bool counted_too_much(const soap *ctx)
 {
     return ctx->message_count > ctx->xml_end_max && ctx->xml_end_max != 0 && (ctx->mode & MODE_COUNTING) != 0;
+}
+
+// False for an object of a class that a host derived: its own operations may have marks to make, and count how
+// often they are called.
+bool is_of_library(const class_ops &ops, const void *object)
+{
+    const std::type_info *const actual = ops.type_info(object);
+    if (actual == ops.own_type_info)
+        return true;
+    const type_entry *const entry = type_entry_of(ops.type_of(object));
+    return entry != nullptr && entry->ops != nullptr && entry->ops->own_type_info == actual;
 }
 
 } // namespace
@@ -104,6 +120,11 @@ int class_put(soap *ctx, const class_ops &ops, const void *object, const char *t
 int class_pointer_out(soap *ctx, const class_ops &ops, const char *tag, int id, const void *object,
                       const char *type)
 {
+    if (object != nullptr && (ctx->mode & SOAP_XML_TREE) != 0) {
+        if (ctx->mark_state != MARKS_MADE && !is_of_library(ops, object))
+            return marks_require(ctx);
+        return ops.out(object, ctx, tag, 0, type);
+    }
     id = soap_element_ref(ctx, tag, id, object, nullptr, 0, type,
                           object != nullptr ? ops.type_of(object) : ops.type_id);
     return id < 0 ? ctx->error : ops.out(object, ctx, tag, id, type);

@@ -9,6 +9,7 @@
 #include <cstdint>
 #include <string>
 #include <string_view>
+#include <typeinfo>
 
 #include <zuv_client_pro/soap.h>
 
@@ -23,7 +24,7 @@ struct member_entry {
     std::string_view local; // its local part
     member_reader read;
     bool single;   // taken once; a further occurrence is unknown
-    bool required; // in strict mode its absence is error 44 (single members)
+    bool required; // in strict mode its absence is SOAP_OCCURS (single members)
 };
 
 constexpr std::size_t MEMBERS_MAX = 64; // members of a class, inherited ones included: bits of a mask
@@ -56,9 +57,11 @@ struct class_ops {
     void *(*create)(soap *owner, int count); // count < 0: one object; null if memory runs out
     void (*destroy)(void *object, int count);
     void (*assign)(void *target, const void *source);
-    void (*reset)(void *object, soap *owner);    // virtual soap_default
-    int (*type_of)(const void *object);          // virtual soap_type
-    void (*mark)(const void *object, soap *ctx); // virtual soap_serialize
+    void (*reset)(void *object, soap *owner);               // virtual soap_default
+    int (*type_of)(const void *object);                     // virtual soap_type
+    const std::type_info *(*type_info)(const void *object); // of the object, which a host may have derived
+    const std::type_info *own_type_info;                    // of the class
+    void (*mark)(const void *object, soap *ctx);            // virtual soap_serialize
     int (*out)(const void *object, soap *ctx, const char *tag, int id, const char *type); // virtual soap_out
     int (*write_content)(soap *ctx, const void *object,
                          const char *tag); // members, or the text of simple content
@@ -69,6 +72,9 @@ struct class_ops {
     std::string *(*text)(void *object);       // simple content
     void (*copy_hook)(soap *ctx, int type, int place_type, void *place, std::size_t length,
                       const void *source, std::size_t size);
+    // Makes an object as new for the next message of its context; what its vectors and texts have allocated
+    // stays. The bytes that it holds.
+    std::size_t (*recycle)(void *object, soap *owner);
 };
 
 // True if `derived` is `base` or descends from it.
@@ -99,10 +105,10 @@ int class_pointer_out(soap *ctx, const class_ops &ops, const char *tag, int id, 
 void class_pointer_mark(soap *ctx, const class_ops &ops, const void *object);
 
 // A reference is to be filled by a copy of an object of `size` bytes with `content` bytes beside it. False
-// with error 45.
+// with SOAP_LENGTH.
 bool object_copy_allowed(soap *ctx, std::size_t size, std::size_t content);
 
-// Makes a managed object of the class, or of the derived class that xsi_type names. Null with error 20.
+// Makes a managed object of the class, or of the derived class that xsi_type names. Null with SOAP_OUT_OF_MEMORY.
 void *class_instantiate(soap *ctx, const class_ops &ops, int count, const char *xsi_type, std::size_t *size,
                         const class_ops **made);
 

@@ -13,6 +13,7 @@
 
 #include "binding/class_ops.h"
 #include "binding/member_read.h"
+#include "binding/member_release.h"
 #include "binding/member_write.h"
 #include "binding/traits.h"
 #include "core/failure.h"
@@ -327,9 +328,36 @@ template <class T> void reset_object(void *object, soap *owner)
     static_cast<T *>(object)->soap_default(owner);
 }
 
+template <class T> std::size_t release_members(soap *owner, T &object)
+{
+    std::size_t bytes = 0;
+    if constexpr (!std::is_void_v<typename traits<T>::base>)
+        bytes += release_members<member_class<typename traits<T>::base>>(owner, object);
+    if constexpr (traits<T>::text != nullptr)
+        bytes += release_value(owner, object.*traits<T>::text);
+    any_element<T>([&](auto index) {
+        bytes += release_value(owner, object.*std::get<index>(traits<T>::elements).member);
+        return false;
+    });
+    return bytes;
+}
+
+template <class T> std::size_t recycle(void *object, soap *owner)
+{
+    T &self = *static_cast<T *>(object);
+    const std::size_t bytes = sizeof(T) + release_members<member_class<T>>(owner, self);
+    self.T::soap_default(owner);
+    return bytes;
+}
+
 template <class T> int type_of_object(const void *object)
 {
     return static_cast<const T *>(object)->soap_type();
+}
+
+template <class T> const std::type_info *type_info_of(const void *object)
+{
+    return &typeid(*static_cast<const T *>(object));
 }
 
 template <class T> void mark_object(const void *object, soap *ctx)
@@ -399,6 +427,8 @@ template <class T> constexpr class_ops make_ops()
             &assign<T>,
             &reset_object<T>,
             &type_of_object<T>,
+            &type_info_of<T>,
+            &typeid(T),
             &mark_object<T>,
             &out_object<T>,
             content_writer<T>(),
@@ -407,7 +437,8 @@ template <class T> constexpr class_ops make_ops()
             has_attributes<T>() ? &read_attributes<T> : nullptr,
             has_minima<T>() ? &holds_minima<T> : nullptr,
             &text_of<T>,
-            &copy_hook<T>};
+            &copy_hook<T>,
+            &recycle<T>};
 }
 
 } // namespace binding

@@ -154,7 +154,7 @@ int write_vector(soap *ctx, const type_entry &entry, const char *tag, int id, co
                 : soap_write_element(ctx, item, tag, id, entry.item))
             return ctx->error;
     }
-    return 0;
+    return SOAP_OK;
 }
 
 int write_wrapper(soap *ctx, const type_entry &entry, const void *record)
@@ -193,7 +193,7 @@ int soap_write_element(soap *ctx, void *object, const char *tag, int id, int typ
 {
     const type_entry *entry = dispatched(type);
     if (entry == nullptr)
-        return 0;
+        return SOAP_OK;
     const char *name = tag != nullptr ? tag : entry->xml_name;
     switch (entry->kind) {
     case type_kind::chars:
@@ -222,7 +222,7 @@ int soap_write_element(soap *ctx, void *object, const char *tag, int id, int typ
     case type_kind::none:
         break;
     }
-    return 0;
+    return SOAP_OK;
 }
 
 void soap_mark_object(soap *ctx, void *object, int type)

@@ -268,7 +268,7 @@ template <class R> bool lone_record_in(soap *ctx, const char *tag, R **place)
 int chars_out(soap *ctx, const char *tag, char *text)
 {
     if (text == nullptr)
-        return 0;
+        return SOAP_OK;
     if (soap_element_out_begin(ctx, tag, -1, "") || soap_text_write(ctx, text, 0))
         return ctx->error;
     return soap_element_out_end(ctx, tag);
@@ -277,7 +277,7 @@ int chars_out(soap *ctx, const char *tag, char *text)
 int code_out(soap *ctx, const char *tag, const char *code)
 {
     if (code == nullptr)
-        return 0;
+        return SOAP_OK;
     const char *mapped = soap_qname_write_map(ctx, code);
     if (soap_element_out_begin(ctx, tag, -1, "") || soap_text_write(ctx, mapped, 0))
         return ctx->error;
@@ -303,7 +303,7 @@ int members_out(soap *ctx, const SOAP_ENV__Code &code)
 int members_out(soap *ctx, const SOAP_ENV__Reason &reason)
 {
     if (reason.Text == nullptr)
-        return 0;
+        return SOAP_OK;
     if (ctx->soap_version == 2 &&
         soap_attr_set(ctx, "xml:lang", ctx->language != nullptr ? ctx->language : "en", 1))
         return ctx->error;
@@ -336,7 +336,7 @@ int members_out(soap *ctx, const SOAP_ENV__Fault &fault)
 template <class R> int record_out(soap *ctx, const char *tag, const R *record, int id, const char *type)
 {
     if (!record)
-        return 0;
+        return SOAP_OK;
     if (soap_element_out_begin(ctx, tag, id, type) || members_out(ctx, *record))
         return ctx->error;
     return soap_element_out_end(ctx, tag);
@@ -466,12 +466,12 @@ void soap_mark_header(soap *ctx)
 int soap_header_put(soap *ctx)
 {
     if (ctx->header == nullptr)
-        return 0;
+        return SOAP_OK;
     ctx->message_part = PART_HEADER;
     if (record_out(ctx, "SOAP-ENV:Header", ctx->header))
         return ctx->error;
     ctx->message_part = PART_AFTER_HEADER;
-    return 0;
+    return SOAP_OK;
 }
 
 int soap_header_get(soap *ctx)

@@ -14,6 +14,7 @@
 
 #include "binding/registry.h"
 #include "core/failure.h"
+#include "core/instance_pool.h"
 #include "core/limits.h"
 #include "values/values.h"
 #include "xml/xml_text.h"
@@ -36,20 +37,20 @@ bool ends(soap *ctx, const char *tag, bool body)
     return !body || soap_element_in_end(ctx, tag) == 0;
 }
 
-int delete_text(soap_instance *instance)
-{
-    delete static_cast<std::string *>(instance->object);
-    return 0;
-}
-
-// A new text of the context. Null with error 20.
+// A new text of the context. Null with SOAP_OUT_OF_MEMORY.
 std::string *new_text(soap *ctx, std::string_view content = {})
 {
-    soap_instance *instance = soap_instance_register(ctx, nullptr, TEXT_TYPE_ID, -1, delete_text);
+    soap_instance *instance = instance_reuse(ctx, TEXT_TYPE_ID);
+    if (instance == nullptr)
+        instance = soap_instance_register(ctx, nullptr, TEXT_TYPE_ID, -1, soap_delete_object);
     if (instance == nullptr)
         return nullptr;
     try {
-        auto *text = new std::string(content);
+        auto *text = static_cast<std::string *>(instance->object);
+        if (text != nullptr)
+            text->assign(content);
+        else
+            text = new std::string(content);
         memory_charge(ctx, sizeof *text);
         text_charge(ctx, content.size(), text_in_place());
         instance->object = text;
@@ -60,12 +61,27 @@ std::string *new_text(soap *ctx, std::string_view content = {})
     }
 }
 
+// What is left of a text whose memory goes to a vector waits to take a text's memory back.
+struct idle_shell {
+    soap *ctx;
+    soap_instance *instance;
+    ~idle_shell() { idle_give(ctx, IDLE_SHELLS, instance, sizeof(std::string)); }
+};
+
 bool append_text(soap *ctx, std::vector<std::string> &vector, std::string_view content)
 {
     vector_charge(ctx, vector);
     text_charge(ctx, content.size(), text_in_place());
     try {
-        vector.emplace_back(content);
+        soap_instance *idle = content.size() > text_in_place() ? idle_take(ctx, TEXT_TYPE_ID) : nullptr;
+        if (idle == nullptr) {
+            vector.emplace_back(content);
+            return true;
+        }
+        auto *text = static_cast<std::string *>(idle->object);
+        const idle_shell shell = {ctx, idle};
+        text->assign(content);
+        vector.push_back(std::move(*text));
         return true;
     } catch (const std::bad_alloc &) {
         return out_of_memory(ctx);

@@ -3,7 +3,7 @@
 // Here: overloads by the member's C++ type, thin over the shared leaf operations of member_read.cpp.
 // Elsewhere: writing (member_write.h), which member an element belongs to (class_ops.cpp).
 //
-// Always: a reader that finds another element leaves it held and gives false with error 3 (or 6 at the end).
+// Always: a reader that finds another element leaves it held and gives false with SOAP_TAG_MISMATCH (or 6 at the end).
 #pragma once
 
 #include <algorithm>
@@ -42,8 +42,9 @@ bool read_vector_item_object(soap *ctx, const class_ops &ops, const char *tag, v
 // `present` is set to false for a nil item, for which there is no code: the vector goes without it.
 bool read_vector_item_code(soap *ctx, const char *tag, std::int32_t *code, bool *present,
                            const enum_table &names, void *vector, std::size_t index, int vector_type);
-bool copy_text(soap *ctx, std::string &target, const std::string &source); // false with error 20 or 45
-bool out_of_memory(soap *ctx);                                             // error 20; false
+bool copy_text(soap *ctx, std::string &target,
+               const std::string &source); // false with SOAP_OUT_OF_MEMORY or SOAP_LENGTH
+bool out_of_memory(soap *ctx);             // SOAP_OUT_OF_MEMORY; false
 
 // What the next item makes a vector grow by counts in max_memory.
 template <class V> void vector_charge(soap *ctx, const std::vector<V> &vector)
@@ -52,7 +53,7 @@ template <class V> void vector_charge(soap *ctx, const std::vector<V> &vector)
         memory_charge(ctx, std::max(vector.capacity() * sizeof(V), SMALLEST_ALLOCATION));
 }
 
-// One more item, a copy of what `item` points to, or empty. False with error 20.
+// One more item, a copy of what `item` points to, or empty. False with SOAP_OUT_OF_MEMORY.
 template <class V> bool append_item(soap *ctx, std::vector<V> &vector, const void *item)
 {
     vector_charge(ctx, vector);

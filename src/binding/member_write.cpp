@@ -5,6 +5,7 @@
 
 #include <cstring>
 
+#include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_identity.h>
 #include <zuv_client_pro/soap_primitive.h>
 #include <zuv_client_pro/soap_xml.h>
@@ -57,7 +58,7 @@ int write_text_pointer(soap *ctx, std::string_view tag, const std::string *text)
 int write_reference(soap *ctx, std::string_view tag, const void *address, int type_id)
 {
     if (ctx->mode & SOAP_XML_TREE)
-        return 0;
+        return SOAP_OK;
     return soap_element_ref(ctx, tag.data(), -1, address, nullptr, 0, "", type_id);
 }
 

@@ -1,5 +1,6 @@
 // multiref_out.cpp - encoded SOAP 1.1: multi-reference elements, the objects that others refer to.
 #include <zuv_client_pro/soap_binary.h>
+#include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_identity.h>
 #include <zuv_client_pro/soap_registry.h>
 
@@ -34,6 +35,6 @@ int soap_put_finish(soap *ctx)
 {
     const bool encoded = ctx->soap_version == 1 && ctx->encoding_style != nullptr;
     if (!encoded || (ctx->mode & (SOAP_XML_TREE | SOAP_XML_GRAPH)))
-        return 0;
+        return SOAP_OK;
     return soap_multiref_each(ctx, &binding::write_multiref);
 }

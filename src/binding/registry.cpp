@@ -14,6 +14,7 @@
 
 #include "binding/envelope.h"
 #include "core/failure.h"
+#include "core/instance_pool.h"
 #include "core/limits.h"
 #include "xml/namespace.h"
 #include "xml/tag_view.h"
@@ -164,10 +165,14 @@ void *make_block(soap *ctx, std::size_t size, int count)
 
 void *make_instance(soap *ctx, const type_entry &entry, int type, int count)
 {
-    soap_instance *instance = soap_instance_register(ctx, nullptr, type, count, soap_delete_object);
+    soap_instance *instance =
+        count < 0 && entry.kind == type_kind::text ? instance_reuse(ctx, type) : nullptr;
+    if (instance == nullptr)
+        instance = soap_instance_register(ctx, nullptr, type, count, soap_delete_object);
     if (instance == nullptr)
         return nullptr;
-    instance->object = make(entry, count);
+    if (instance->object == nullptr)
+        instance->object = make(entry, count);
     if (instance->object == nullptr)
         fail(ctx, SOAP_OUT_OF_MEMORY);
     memory_charge(ctx, plain_size(entry) * static_cast<std::size_t>(count < 0 ? 1 : count));

@@ -12,20 +12,24 @@
 
 static_assert(sizeof(soap_block) % 8 == 0, "data areas are aligned to 8");
 
-static void *out_of_memory(soap *ctx)
+namespace {
+
+void *out_of_memory(soap *ctx)
 {
     return fail_null(ctx, SOAP_OUT_OF_MEMORY);
 }
 
-static char *block_data(soap_block *block)
+char *block_data(soap_block *block)
 {
     return block == nullptr ? nullptr : reinterpret_cast<char *>(block + 1);
 }
 
-static soap_block_stack *stack_or_top(soap *ctx, soap_block_stack *stack)
+soap_block_stack *stack_or_top(soap *ctx, soap_block_stack *stack)
 {
     return stack != nullptr ? stack : ctx->block_stack;
 }
+
+} // namespace
 
 soap_block_stack *soap_block_stack_push(soap *ctx)
 {
@@ -100,8 +104,10 @@ std::size_t soap_block_stack_trim(soap *ctx, soap_block_stack *stack, std::size_
     return stack->total_size;
 }
 
+namespace {
+
 // Copies the blocks in order of age to `place`, freeing each as it goes.
-static void gather(soap *ctx, soap_block_stack *stack, char *place, block_moved moved)
+void gather(soap *ctx, soap_block_stack *stack, char *place, block_moved moved)
 {
     char *data = soap_block_stack_first(ctx, stack);
     while (data != nullptr) {
@@ -113,6 +119,8 @@ static void gather(soap *ctx, soap_block_stack *stack, char *place, block_moved 
         data = soap_block_stack_next(ctx, stack);
     }
 }
+
+} // namespace
 
 void *block_stack_gather(soap *ctx, soap_block_stack *stack, void *target, block_moved moved)
 {

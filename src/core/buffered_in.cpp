@@ -161,8 +161,10 @@ int soap_recv_refill(soap *ctx)
     return soap_recv_deliver(ctx);
 }
 
+namespace {
+
 // A filter may make more of its bytes than came, so those of later chunks must not lie after them.
-static int make_room_for_filter(soap *ctx)
+int make_room_for_filter(soap *ctx)
 {
     if (ctx->raw_aside || !input_is_chunked(ctx) || (ctx->mode & MODE_DEFLATE) != 0)
         return SOAP_OK;
@@ -171,6 +173,8 @@ static int make_room_for_filter(soap *ctx)
     soap_raw_move_aside(ctx);
     return SOAP_OK;
 }
+
+} // namespace
 
 int soap_recv_filtered(soap *ctx)
 {
@@ -232,8 +236,10 @@ int soap_gzip_skip_header(soap *ctx)
 // ---------------------------------------------------------------------------------------------
 // Blocks.
 
+namespace {
+
 // Copies `length` bytes of input. 0 or -1.
-static int recv_into(soap *ctx, char *target, std::size_t length)
+int recv_into(soap *ctx, char *target, std::size_t length)
 {
     if (length != 0 && ctx->look_ahead > 0) {
         *target++ = static_cast<char>(ctx->look_ahead);
@@ -253,7 +259,7 @@ static int recv_into(soap *ctx, char *target, std::size_t length)
 }
 
 // Gathers the bytes in steps: a length announced and never sent costs no memory.
-static int gather(soap *ctx, std::size_t length)
+int gather(soap *ctx, std::size_t length)
 {
     while (length != 0) {
         const std::size_t step = std::min(length, BLOCK_STEP);
@@ -270,6 +276,8 @@ static int gather(soap *ctx, std::size_t length)
     *terminator = '\0';
     return SOAP_OK;
 }
+
+} // namespace
 
 char *soap_recv_bytes_block(soap *ctx, std::size_t length)
 {

@@ -48,6 +48,9 @@ struct soap_upcalls {
     int (*make_fault)(soap *ctx, fault_side side, const char *text, const char *detail, int error);
     // Of the present fault; an empty one is made where there is none.
     fault_texts (*read_fault)(soap *ctx);
+    // Empties the object of an instance for its next use, if it is of a kind that can have one: the bytes that
+    // it goes on holding, 0 if it has to be destroyed.
+    std::size_t (*recycle)(soap *ctx, soap_instance *instance);
 };
 
 // Ends with an error that has texts of its own: as fail(), and the fault tells them. `text` and `detail` are

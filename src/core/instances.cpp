@@ -10,11 +10,14 @@
 
 #include "core/context_state.h"
 #include "core/failure.h"
+#include "core/instance_pool.h"
 #include "core/limits.h"
 #include "core/tracking.h"
 
-static soap_instance *enter_instance(soap *ctx, void *object, int type_id, int array_size,
-                                     int (*hook)(soap_instance *instance))
+namespace {
+
+soap_instance *enter_instance(soap *ctx, void *object, int type_id, int array_size,
+                              int (*hook)(soap_instance *instance))
 {
     soap_instance *instance = ctx->pools->instances.take();
     *instance = {ctx->instance_list, object, type_id, array_size, hook};
@@ -22,6 +25,8 @@ static soap_instance *enter_instance(soap *ctx, void *object, int type_id, int a
     memory_charge(ctx, sizeof *instance);
     return instance;
 }
+
+} // namespace
 
 // With no idle record at hand. Out of line, so that the usual way saves no registers for it.
 [[gnu::noinline]] static soap_instance *
@@ -41,17 +46,35 @@ soap_instance *soap_instance_register(soap *ctx, void *object, int type_id, int 
                    : enter_in_new_slab(ctx, object, type_id, array_size, hook);
 }
 
-// The record must be out of the list: a destructor may come back to it.
-static void destroy_instance(soap *ctx, soap_instance *instance)
+namespace {
+
+// True if the object waits for the next message.
+bool keep_instance(soap *ctx, soap_instance *instance)
 {
+    if (instance->array_size >= 0 || instance->object == nullptr || instance->type_id <= IDLE_SHELLS ||
+        instance->type_id >= IDLE_TYPES || !idle_has_room(ctx, instance->type_id, 1))
+        return false;
+    const std::size_t bytes = ctx->upcalls->recycle(ctx, instance);
+    if (bytes == 0 || !idle_has_room(ctx, instance->type_id, bytes))
+        return false;
+    idle_give(ctx, instance->type_id, instance, bytes);
+    return true;
+}
+
+// The record must be out of the list: a destructor may come back to it.
+void destroy_instance(soap *ctx, soap_instance *instance)
+{
+    if (keep_instance(ctx, instance))
+        return;
     if (instance->delete_hook != nullptr && instance->delete_hook(instance) != 0)
         std::fprintf(stderr, "new(object type = %d) = %p not freed: deletion callback failed\n",
                      instance->type_id, instance->object);
     ctx->pools->instances.give(instance);
 }
 
-static void destroy_all(soap *ctx)
+void destroy_all(soap *ctx)
 {
+    idle_release_begin(ctx);
     while (ctx->instance_list != nullptr) {
         soap_instance *instance = ctx->instance_list;
         ctx->instance_list = instance->next;
@@ -59,9 +82,12 @@ static void destroy_all(soap *ctx)
             __builtin_prefetch(instance->next->object);
         destroy_instance(ctx, instance);
     }
+    idle_release_end(ctx);
     ctx->header = nullptr;
     ctx->fault = nullptr;
 }
+
+} // namespace
 
 void soap_discard_objects(soap *ctx, void *object)
 {
@@ -71,6 +97,7 @@ void soap_discard_objects(soap *ctx, void *object)
         destroy_all(ctx);
         return;
     }
+    idle_release_begin(ctx);
     for (soap_instance **link = &ctx->instance_list; *link != nullptr; link = &(*link)->next) {
         soap_instance *instance = *link;
         if (instance->object == object) {

@@ -19,7 +19,7 @@ void limits_reset(soap *ctx);
 // The message went beyond a limit of `value` bytes. `name` is a literal. SOAP_LENGTH, also in ctx->error.
 int limit_exceeded(soap *ctx, const char *name, std::uint64_t value);
 
-// Compares what was received and what is held for it with max_message and max_memory. 0 or SOAP_LENGTH.
+// Compares what was received and what is held for it with max_message and max_memory. SOAP_OK or SOAP_LENGTH.
 int input_limits_check(soap *ctx);
 
 // `length` bytes are copied to another place of the received message, for a reference or a QName. 0, or
@@ -29,11 +29,11 @@ int copy_charge(soap *ctx, std::size_t length);
 // True if copies of `length` bytes more would still be allowed. Nothing is charged.
 bool copy_allowed(const soap *ctx, std::uint64_t length);
 
-// Raw bytes came in. 0, or SOAP_LENGTH when they are more than EXTRA_BYTES and EXTRA_FACTOR times the plain
+// Raw bytes came in. SOAP_OK or SOAP_LENGTH when they are more than EXTRA_BYTES and EXTRA_FACTOR times the plain
 // bytes that the message has had so far: framing or compression without contents.
 int raw_bytes_check(soap *ctx);
 
-// `length` bytes leave the send buffer. 0 or SOAP_LENGTH.
+// `length` bytes leave the send buffer. SOAP_OK or SOAP_LENGTH.
 int output_limit_check(soap *ctx, std::size_t length);
 
 // The XML of a message begins or ends in the output, at the present place. The end gives 0 or SOAP_LENGTH.

@@ -15,6 +15,7 @@
 
 #include "core/context_state.h"
 #include "core/failure.h"
+#include "core/instance_pool.h"
 #include "core/limits.h"
 #include "core/memory.h"
 #include "core/tracking.h"
@@ -25,27 +26,29 @@ struct soap_block_trailer {
     soap_track_entry *entry;  // spares the release of a block the look-up
 };
 
-static constexpr std::uint16_t CANARY = 0xC0DE;
-static constexpr std::size_t BLOCK_OVERHEAD = sizeof CANARY + 7 + sizeof(soap_block_trailer);
+namespace {
 
-static char *block_start(soap_block_trailer *trailer)
+constexpr std::uint16_t CANARY = 0xC0DE;
+constexpr std::size_t BLOCK_OVERHEAD = sizeof CANARY + 7 + sizeof(soap_block_trailer);
+
+char *block_start(soap_block_trailer *trailer)
 {
     return reinterpret_cast<char *>(trailer) - trailer->span;
 }
 
-static char *canary_place(soap_block_trailer *trailer)
+char *canary_place(soap_block_trailer *trailer)
 {
     return reinterpret_cast<char *>(trailer) - sizeof CANARY;
 }
 
-static int corruption(soap *ctx)
+int corruption(soap *ctx)
 {
     std::fprintf(stderr, "Data corruption in dynamic allocation (see logs)\n");
     return fail(ctx, SOAP_CORRUPTION);
 }
 
-// 0, or error 21 for a block whose end was overwritten.
-static int check_canary(soap *ctx, soap_block_trailer *trailer)
+// SOAP_OK or SOAP_CORRUPTION for a block whose end was overwritten.
+int check_canary(soap *ctx, soap_block_trailer *trailer)
 {
     std::uint16_t found;
     std::memcpy(&found, canary_place(trailer), sizeof found);
@@ -53,25 +56,92 @@ static int check_canary(soap *ctx, soap_block_trailer *trailer)
 }
 
 // False for a block that was given to tracked_free behind the list's back.
-static bool entry_is_live(soap_block_trailer *trailer)
+bool entry_is_live(soap_block_trailer *trailer)
 {
     return trailer->entry->address == block_start(trailer) && track_is_live(trailer->entry);
 }
 
-static void free_block(soap *ctx, soap_block_trailer *trailer)
+// The list of idle blocks of this span, or null if there is none.
+idle_list<soap_block_trailer> *idle_blocks(soap *ctx, std::size_t span)
+{
+    const std::size_t place = span / 8 - 1;
+    return ctx->pools != nullptr && place < IDLE_BLOCK_SPANS ? &ctx->pools->idle.blocks[place] : nullptr;
+}
+
+std::size_t idle_bytes(const soap_block_trailer *trailer)
+{
+    return trailer->span + sizeof *trailer;
+}
+
+// True if the block waits for its next use.
+bool keep_block(soap *ctx, soap_block_trailer *trailer)
+{
+    idle_list<soap_block_trailer> *list = idle_blocks(ctx, trailer->span);
+    if (list == nullptr || !idle_has_room(ctx->pools->idle, *list, idle_bytes(trailer)))
+        return false;
+    track_rest(ctx, trailer->entry);
+    list->push(trailer, ctx->pools->idle.large);
+    ctx->pools->idle.bytes += idle_bytes(trailer);
+    return true;
+}
+
+soap_track_entry *reuse_block(soap *ctx, std::size_t span)
+{
+    idle_list<soap_block_trailer> *list = idle_blocks(ctx, span);
+    if (list == nullptr || list->first == nullptr)
+        return nullptr;
+    soap_block_trailer *trailer = list->pop();
+    ctx->pools->idle.bytes -= idle_bytes(trailer);
+    track_wake(ctx, trailer->entry, idle_bytes(trailer));
+    return trailer->entry;
+}
+
+void free_idle_blocks(soap *ctx, soap_block_trailer *first)
+{
+    while (first != nullptr) {
+        soap_block_trailer *trailer = first;
+        first = trailer->next;
+        ctx->pools->idle.bytes -= idle_bytes(trailer);
+        track_free_resting(ctx, trailer->entry);
+    }
+}
+
+} // namespace
+
+void idle_blocks_drop(soap *ctx)
+{
+    for (idle_list<soap_block_trailer> &list : ctx->pools->idle.blocks) {
+        soap_block_trailer *first = list.first;
+        list = {};
+        free_idle_blocks(ctx, first);
+    }
+}
+
+void idle_blocks_thin(soap *ctx)
+{
+    for (idle_list<soap_block_trailer> &list : ctx->pools->idle.blocks)
+        free_idle_blocks(ctx, list.thin());
+}
+
+namespace {
+
+void free_block(soap *ctx, soap_block_trailer *trailer)
 {
     if (entry_is_live(trailer)) {
         if (track_is_secret(trailer->entry))
             OPENSSL_cleanse(block_start(trailer), trailer->span - sizeof CANARY);
-        track_free(ctx, trailer->entry);
+        if (!keep_block(ctx, trailer))
+            track_free(ctx, trailer->entry);
     } else // damaged: tracking reports the address
         SOAP_FREE(ctx, block_start(trailer));
 }
 
-static void *out_of_memory(soap *ctx)
+void *out_of_memory(soap *ctx)
 {
     return fail_null(ctx, SOAP_OUT_OF_MEMORY);
 }
+
+} // namespace
 
 void *soap_block_alloc(soap *ctx, std::size_t size)
 {
@@ -87,7 +157,9 @@ void *soap_block_alloc(soap *ctx, std::size_t size)
     if (size > SIZE_MAX - BLOCK_OVERHEAD)
         return out_of_memory(ctx);
     const std::size_t span = (size + sizeof CANARY + 7) & ~std::size_t{7};
-    soap_track_entry *entry = track_alloc(ctx, __FILE__, __LINE__, span + sizeof(soap_block_trailer));
+    soap_track_entry *entry = reuse_block(ctx, span);
+    if (entry == nullptr)
+        entry = track_alloc(ctx, __FILE__, __LINE__, span + sizeof(soap_block_trailer));
     if (entry == nullptr)
         return out_of_memory(ctx);
     char *start = static_cast<char *>(entry->address);
@@ -113,8 +185,10 @@ void credentials_wipe(soap *ctx)
     OPENSSL_cleanse(ctx->buffer + kept_to, sizeof ctx->buffer - kept_to);
 }
 
+namespace {
+
 // The fields whose values live in managed blocks.
-static void forget_managed_fields(soap *ctx)
+void forget_managed_fields(soap *ctx)
 {
 #define FIELD_FORGOTTEN(name) ctx->name = nullptr;
     CONTEXT_MANAGED_FIELDS(FIELD_FORGOTTEN)
@@ -125,7 +199,7 @@ static void forget_managed_fields(soap *ctx)
     ctx->mime = {};
 }
 
-static void free_all_blocks(soap *ctx)
+void free_all_blocks(soap *ctx)
 {
     while (ctx->allocation_list != nullptr && check_canary(ctx, ctx->allocation_list) == SOAP_OK) {
         soap_block_trailer *trailer = ctx->allocation_list;
@@ -137,12 +211,15 @@ static void free_all_blocks(soap *ctx)
     forget_managed_fields(ctx); // after a damaged block too: what they point to may be gone
 }
 
+} // namespace
+
 void soap_block_free(soap *ctx, void *address)
 {
     if (!context_is_alive(ctx))
         return;
     track_secret(ctx, ctx->auth_user); // also what was set and never sent
     track_secret(ctx, ctx->auth_password);
+    idle_release_begin(ctx);
     if (address == nullptr) {
         free_all_blocks(ctx);
         return;
@@ -160,8 +237,10 @@ void soap_block_free(soap *ctx, void *address)
     soap_discard_objects(ctx, address);
 }
 
+namespace {
+
 // True if a block starts at the address: it is then out of the list, and its bytes stay.
-static bool unlink_block(soap *ctx, const void *address)
+bool unlink_block(soap *ctx, const void *address)
 {
     for (soap_block_trailer **link = &ctx->allocation_list; *link != nullptr; link = &(*link)->next) {
         soap_block_trailer *trailer = *link;
@@ -174,6 +253,8 @@ static bool unlink_block(soap *ctx, const void *address)
     }
     return false;
 }
+
+} // namespace
 
 int soap_block_unlink(soap *ctx, const void *address)
 {
@@ -192,8 +273,10 @@ int soap_block_unlink(soap *ctx, const void *address)
     return -1;
 }
 
+namespace {
+
 // Room in the target's pools for all that the source holds, so that the move itself cannot fail half way.
-static int prepare_move(soap *source, soap *target)
+int prepare_move(soap *source, soap *target)
 {
     std::size_t blocks = 0, instances = 0;
     for (soap_block_trailer *trailer = source->allocation_list; trailer != nullptr; trailer = trailer->next) {
@@ -212,7 +295,7 @@ static int prepare_move(soap *source, soap *target)
     return SOAP_OK;
 }
 
-static void move_instances(soap *source, soap *target)
+void move_instances(soap *source, soap *target)
 {
     soap_instance **tail = &target->instance_list;
     while (*tail != nullptr)
@@ -228,6 +311,8 @@ static void move_instances(soap *source, soap *target)
         source->pools->instances.give(old);
     }
 }
+
+} // namespace
 
 void soap_blocks_move(soap *source, soap *target)
 {

@@ -27,6 +27,9 @@ using block_moved = void (*)(soap *ctx, const void *start, const void *end, char
 // soap_block_stack_save, which tells `moved` (may be null) of each block.
 void *block_stack_gather(soap *ctx, soap_block_stack *stack, void *target, block_moved moved);
 
+// Ends the growing text.
+void growing_text_free(soap *ctx);
+
 // Takes back all instance records without destroying their objects.
 void instance_records_release(soap *ctx);
 

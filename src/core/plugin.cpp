@@ -26,10 +26,14 @@ int soap_register_plugin_arg(soap *ctx, int (*create)(soap *ctx, soap_plugin_rec
     return SOAP_OK;
 }
 
-static bool same_id(const char *a, const char *b)
+namespace {
+
+bool same_id(const char *a, const char *b)
 {
     return a == b || (a != nullptr && b != nullptr && std::strcmp(a, b) == 0);
 }
+
+} // namespace
 
 void *soap_plugin_find(soap *ctx, const char *id)
 {

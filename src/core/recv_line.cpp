@@ -30,9 +30,14 @@ int end_of_input(soap *ctx)
     return ctx->error;
 }
 
-bool ends_stretch(char c)
+// The first CR or LF, or `stop`.
+const char *stretch_end(const char *start, const char *stop)
 {
-    return c == '\r' || c == '\n';
+    const auto find = [start](int c, const char *end) {
+        const void *const found = std::memchr(start, c, static_cast<std::size_t>(end - start));
+        return found != nullptr ? static_cast<const char *>(found) : end;
+    };
+    return find('\n', find('\r', stop)); // the search for a CR may go far only once for each line
 }
 
 // Moves what stands in the buffer up to a CR or LF, but no more than `left` bytes, to `end`, as far as that
@@ -43,7 +48,7 @@ std::size_t take_stretch(soap *ctx, char *&end, const char *limit, std::size_t l
         return 0;
     const char *const here = ctx->buffer + ctx->buffer_index;
     const char *const stop = here + std::min(left, ctx->buffer_length - ctx->buffer_index);
-    const auto length = static_cast<std::size_t>(std::find_if(here, stop, ends_stretch) - here);
+    const auto length = static_cast<std::size_t>(stretch_end(here, stop) - here);
     const std::size_t kept = std::min(length, static_cast<std::size_t>(limit - end));
     std::memcpy(end, here, kept);
     end += kept;

@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <cstdio>
+#include <cstring>
 
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
@@ -53,6 +54,10 @@ void text_encoding_by_type(soap *ctx, const char *type, std::uint32_t &mode)
 {
     if ((mode & MODE_LATIN1) != 0)
         return;
+    if (type != nullptr && std::strcmp(type, "text/xml; charset=utf-8") == 0) { // as nearly all say
+        mode &= ~ENCODING_MODES;
+        return;
+    }
     const char *name = soap_attr_value(ctx, type, "charset");
     if (name != nullptr && *name != '\0' && !text_encoding_set(mode, name))
         mode |= MODE_UNREAD_ENCODING;

@@ -18,16 +18,18 @@
 char g_TraceLogFile[SOAP_LOG_PATH_SIZE] = "wsTrace.log";
 char soapEnableDebug = 1;
 
-static constexpr mode_t NEW_FILE_MODE = 0600; // messages hold personal data and credentials
-static constexpr int CHANNELS = static_cast<int>(SOAP_LOG_CHANNELS);
+namespace {
 
-static bool is_channel(int channel)
+constexpr mode_t NEW_FILE_MODE = 0600; // messages hold personal data and credentials
+constexpr int CHANNELS = static_cast<int>(SOAP_LOG_CHANNELS);
+
+bool is_channel(int channel)
 {
     return channel >= 0 && channel < CHANNELS;
 }
 
 // Takes `length` bytes of a path that may lack a terminator.
-static int set_path(soap *ctx, int channel, const char *path, std::size_t length)
+int set_path(soap *ctx, int channel, const char *path, std::size_t length)
 {
     char *copy = nullptr;
     if (path != nullptr) {
@@ -44,6 +46,8 @@ static int set_path(soap *ctx, int channel, const char *path, std::size_t length
         return fail(ctx, SOAP_OUT_OF_MEMORY);
     return SOAP_OK;
 }
+
+} // namespace
 
 void trace_log_set_defaults(soap *ctx)
 {
@@ -161,9 +165,7 @@ const certificate_tag *certificate_tag_at(const char *text, std::size_t left)
     return nullptr;
 }
 
-} // namespace
-
-static void redact(const char *message, std::size_t size, bounded_output &output)
+void redact(const char *message, std::size_t size, bounded_output &output)
 {
     bool copying = true;
     std::size_t i = 0;
@@ -186,6 +188,8 @@ static void redact(const char *message, std::size_t size, bounded_output &output
         i = end;
     }
 }
+
+} // namespace
 
 char *soap_log_redact_certificates(const char *message, std::int32_t size, std::int32_t *result_length)
 {

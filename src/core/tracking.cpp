@@ -12,24 +12,29 @@
 
 #include <zuv_client_pro/soap_memory.h>
 
+#include "core/instance_pool.h"
 #include "core/limits.h"
 
-static constexpr std::size_t LOAD_MAX = 1; // entries for each chain before the table doubles
-// Book-keeping of a block: its entry, and its part of the table.
-static constexpr std::size_t BOOK_UNITS = (sizeof(soap_track_entry) + 2 * sizeof(void *)) / ALLOCATION_UNIT;
+namespace {
 
-static std::int64_t bytes_held(const soap_track_entry *entry)
+constexpr std::size_t LOAD_MAX = 1; // entries for each chain before the table doubles
+// Book-keeping of a block: its entry, and its part of the table.
+constexpr std::size_t BOOK_UNITS = (sizeof(soap_track_entry) + 2 * sizeof(void *)) / ALLOCATION_UNIT;
+
+std::int64_t bytes_held(const soap_track_entry *entry)
 {
     return static_cast<std::int64_t>(entry->life & ~TRACK_SECRET) *
            static_cast<std::int64_t>(ALLOCATION_UNIT);
 }
 
-static void set_live(soap *ctx, soap_track_entry *entry, std::size_t size)
+void set_live(soap *ctx, soap_track_entry *entry, std::size_t size)
 {
     const std::size_t units = allocation_size(size) / ALLOCATION_UNIT + BOOK_UNITS;
     entry->life = static_cast<std::uint32_t>(std::min<std::size_t>(units, TRACK_SECRET - 1));
     ctx->memory_held += bytes_held(entry);
 }
+
+} // namespace
 
 soap_memory_pools *memory_pools_make(soap *ctx)
 {
@@ -46,15 +51,17 @@ void track_table_clear(soap *ctx)
     ctx->pools = nullptr;
 }
 
+namespace {
+
 // Blocks of malloc stand at multiples of 16, so that only half of the first table's chains are used; in
 // larger tables all are. Neighbours stay neighbours, which the caches like.
-static soap_track_entry **chain_of(soap *ctx, const void *address)
+soap_track_entry **chain_of(soap *ctx, const void *address)
 {
     const int shift = ctx->track_chain_mask < SOAP_TRACK_HASH_SIZE ? 3 : 4;
     return &ctx->track_chains[(reinterpret_cast<std::uintptr_t>(address) >> shift) & ctx->track_chain_mask];
 }
 
-static soap_track_entry *find_entry(soap *ctx, const void *address)
+soap_track_entry *find_entry(soap *ctx, const void *address)
 {
     soap_track_entry *entry = *chain_of(ctx, address);
     while (entry != nullptr && entry->address != address)
@@ -62,14 +69,14 @@ static soap_track_entry *find_entry(soap *ctx, const void *address)
     return entry;
 }
 
-static void link_entry(soap *ctx, soap_track_entry *entry)
+void link_entry(soap *ctx, soap_track_entry *entry)
 {
     soap_track_entry **chain = chain_of(ctx, entry->address);
     entry->next = *chain;
     *chain = entry;
 }
 
-static void unlink_entry(soap *ctx, const soap_track_entry *entry)
+void unlink_entry(soap *ctx, const soap_track_entry *entry)
 {
     soap_track_entry **link = chain_of(ctx, entry->address);
     while (*link != entry)
@@ -78,7 +85,7 @@ static void unlink_entry(soap *ctx, const soap_track_entry *entry)
 }
 
 // Takes an entry out of the table and back into the pool.
-static void drop_entry(soap *ctx, soap_track_entry *entry)
+void drop_entry(soap *ctx, soap_track_entry *entry)
 {
     unlink_entry(ctx, entry);
     ctx->pools->entries.give(entry);
@@ -86,7 +93,7 @@ static void drop_entry(soap *ctx, soap_track_entry *entry)
 }
 
 // Doubles the table. Without memory the old one serves on, only slower.
-static void grow_table(soap *ctx)
+void grow_table(soap *ctx)
 {
     const std::size_t old_count = ctx->track_chain_mask + 1;
     soap_track_entry **old_chains = ctx->track_chains;
@@ -107,11 +114,13 @@ static void grow_table(soap *ctx)
 }
 
 // An entry in the chains for this address: the one that remembers a freed block there, or a new one.
-static soap_track_entry *entry_for(soap *ctx, void *address)
+soap_track_entry *entry_for(soap *ctx, void *address)
 {
     soap_memory_pools *pools = ctx->pools;
     soap_track_entry *entry = find_entry(ctx, address);
     if (entry != nullptr) {
+        if (entry->life == TRACK_IDLE)
+            return nullptr; // malloc gives no block that it has given already
         if (!track_is_live(entry))
             pools->dead[entry->life - TRACK_DEAD] = nullptr;
         else // freed behind our back
@@ -128,7 +137,7 @@ static soap_track_entry *entry_for(soap *ctx, void *address)
     return entry;
 }
 
-static soap_track_entry *enter(soap *ctx, const char *source_file, int source_line, void *address)
+soap_track_entry *enter(soap *ctx, const char *source_file, int source_line, void *address)
 {
     soap_track_entry *entry = entry_for(ctx, address);
     if (entry != nullptr) {
@@ -137,6 +146,8 @@ static soap_track_entry *enter(soap *ctx, const char *source_file, int source_li
     }
     return entry;
 }
+
+} // namespace
 
 soap_track_entry *track_alloc(soap *ctx, const char *source_file, int source_line, std::size_t size)
 {
@@ -169,6 +180,24 @@ void track_free(soap *ctx, soap_track_entry *entry)
 {
     void *address = entry->address;
     track_forget(ctx, entry);
+    std::free(address);
+}
+
+void track_rest(soap *ctx, soap_track_entry *entry)
+{
+    ctx->memory_held -= bytes_held(entry);
+    entry->life = TRACK_IDLE;
+}
+
+void track_wake(soap *ctx, soap_track_entry *entry, std::size_t size)
+{
+    set_live(ctx, entry, size);
+}
+
+void track_free_resting(soap *ctx, soap_track_entry *entry)
+{
+    void *address = entry->address;
+    drop_entry(ctx, entry);
     std::free(address);
 }
 
@@ -215,6 +244,7 @@ void tracked_free(soap *ctx, const char *source_file, int source_line, void *add
 
 void track_end(soap *ctx)
 {
+    idle_drop(ctx);
     for (std::size_t i = 0; i <= ctx->track_chain_mask; ++i) {
         for (const soap_track_entry *entry = ctx->track_chains[i]; entry != nullptr; entry = entry->next) {
             if (track_is_live(entry))

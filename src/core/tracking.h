@@ -6,6 +6,7 @@
 
 #include <zuv_client_pro/soap.h>
 
+#include "core/idle_list.h"
 #include "core/record_pool.h"
 
 struct soap_track_entry {
@@ -14,12 +15,14 @@ struct soap_track_entry {
     const char *source_file; // borrowed
     std::int32_t source_line;
     std::uint32_t life; // live: what the block counts in soap::memory_held, in units of ALLOCATION_UNIT, and
-                        // TRACK_SECRET; dead: TRACK_DEAD and its place in soap_memory_pools::dead
+                        // TRACK_SECRET; dead: TRACK_DEAD and its place in soap_memory_pools::dead; of a
+                        // block that waits for its next use: TRACK_IDLE
 };
 
 constexpr std::uint32_t TRACK_DEAD = 0x80000000;
 constexpr std::uint32_t TRACK_SECRET = 0x40000000; // a managed block of it is wiped when it is freed
-constexpr std::size_t TRACK_DEAD_MAX = 4096;       // freed blocks that a context remembers
+constexpr std::uint32_t TRACK_IDLE = TRACK_DEAD | (TRACK_DEAD - 1); // freed as far as its owner knows
+constexpr std::size_t TRACK_DEAD_MAX = 4096;                        // freed blocks that a context remembers
 
 inline bool track_is_live(const soap_track_entry *entry)
 {
@@ -34,8 +37,11 @@ inline bool track_is_secret(const soap_track_entry *entry)
 struct soap_memory_pools {
     record_pool<soap_track_entry> entries;
     record_pool<soap_instance> instances;
-    std::size_t entry_count = 0; // entries in the chains, live and dead
-    std::size_t dead_next = 0;   // the slot that the next freed block takes
+    idle_pool idle;
+    char *spare_text = nullptr;      // area for the growing text; a tracked block
+    std::size_t spare_text_size = 0; // bytes
+    std::size_t entry_count = 0;     // entries in the chains, live and dead
+    std::size_t dead_next = 0;       // the slot that the next freed block takes
     soap_track_entry *dead[TRACK_DEAD_MAX] =
         {}; // a ring in order of freeing; null where an address came back into use
 };
@@ -57,6 +63,12 @@ soap_track_entry *track_alloc(soap *ctx, const char *source_file, int source_lin
 // else.
 void track_free(soap *ctx, soap_track_entry *entry);
 void track_forget(soap *ctx, soap_track_entry *entry);
+
+// The block of a live entry waits for its next use, and is there again, with `size` bytes as before; or goes
+// back to malloc with its entry.
+void track_rest(soap *ctx, soap_track_entry *entry);
+void track_wake(soap *ctx, soap_track_entry *entry, std::size_t size);
+void track_free_resting(soap *ctx, soap_track_entry *entry);
 
 // Makes the live block that starts at `address` a secret. Other addresses, such as a text of the host's, are
 // ignored.

@@ -20,7 +20,7 @@ int soap_zlib_prepare(soap *ctx);
 // zlib's complaint.
 int soap_zlib_drop(soap *ctx);
 
-// The failure of either direction: error 31, and no more bytes come out of the stream. Returns the error.
+// The failure of either direction: SOAP_ZLIB_ERROR, and no more bytes come out of the stream. Returns the error.
 int soap_zlib_fail(soap *ctx);
 
 inline Bytef *zlib_bytes(const char *bytes)

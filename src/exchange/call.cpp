@@ -17,6 +17,8 @@
 #include "binding/envelope.h"
 #include "binding/registry.h"
 #include "core/failure.h"
+#include "core/message_store.h"
+#include "exchange/request.h"
 
 namespace {
 
@@ -35,28 +37,9 @@ body_part part_of(int record, binding::type_kind kind)
     return {entry->element, binding::type_entry_of(entry->item)->ops};
 }
 
-int write_message(soap *ctx, const body_part &body, const void *request)
+int send_message(soap *ctx, const char *endpoint, const char *action, const request_message &message)
 {
-    if (soap_envelope_out_begin(ctx) || soap_header_put(ctx) || soap_body_out_begin(ctx) ||
-        binding::class_pointer_out(ctx, *body.ops, body.element, -1, request, "") || soap_body_out_end(ctx) ||
-        soap_envelope_out_end(ctx))
-        return ctx->error;
-    return 0;
-}
-
-int count_message(soap *ctx, const body_part &body, const void *request)
-{
-    if (soap_count_begin(ctx))
-        return ctx->error;
-    if ((ctx->mode & MODE_COUNTING) && write_message(ctx, body, request))
-        return ctx->error;
-    return soap_count_end(ctx);
-}
-
-int send_message(soap *ctx, const char *endpoint, const char *action, const body_part &body,
-                 const void *request)
-{
-    if (soap_server_connect(ctx, endpoint, action) || write_message(ctx, body, request))
+    if (soap_server_connect(ctx, endpoint, action) || request_write(ctx, message))
         return ctx->error;
     return soap_send_finish(ctx);
 }
@@ -127,13 +110,14 @@ int run_call(soap *ctx, const char *endpoint, const char *action, const soap_ope
         return fail(ctx, SOAP_NO_METHOD);
     if (soap_endpoint_check(ctx, endpoint))
         return ctx->error;
-    soap_mark_header(ctx);
-    binding::class_pointer_mark(ctx, *sent.ops, request);
-    if (count_message(ctx, sent, request)) {
+    request_message message{sent.element, sent.ops, request};
+    if (request_count(ctx, message)) {
         attachments_forget(ctx); // they belong to this call, as they do when it fails later
         return ctx->exceeded != nullptr ? soap_socket_release(ctx) : ctx->error;
     }
-    if (send_message(ctx, endpoint, action != nullptr ? action : "", sent, request) || response == nullptr)
+    const int sending = send_message(ctx, endpoint, action != nullptr ? action : "", message);
+    message_store_wipe(ctx);
+    if (sending || response == nullptr)
         return soap_socket_release(ctx);
     *response = nullptr;
     if (begin_response(ctx))

@@ -25,10 +25,12 @@
 
 #include "core/context_state.h"
 #include "core/memory.h"
+#include "core/message_store.h"
 #include "core/trace_log.h"
 #include "core/tracking.h"
 #include "exchange/context.h"
 #include "exchange/fault.h"
+#include "net/head_memory.h"
 #include "xml/attributes.h"
 
 // ---------------------------------------------------------------------------------------------
@@ -175,15 +177,9 @@ void soap_reset_call(soap *ctx)
 // ---------------------------------------------------------------------------------------------
 // Release.
 
-static void free_growing_text(soap *ctx)
-{
-    SOAP_FREE(ctx, ctx->label_buffer);
-    ctx->label_buffer = nullptr;
-    ctx->label_size = 0;
-    ctx->label_index = 0;
-}
+namespace {
 
-static void free_attachment_references(soap *ctx)
+void free_attachment_references(soap *ctx)
 {
     while (ctx->mtom_list != nullptr) {
         soap_attachment_ref *reference = ctx->mtom_list;
@@ -191,6 +187,8 @@ static void free_attachment_references(soap *ctx)
         SOAP_FREE(ctx, reference);
     }
 }
+
+} // namespace
 
 void soap_call_scratch_free(soap *ctx)
 {
@@ -200,7 +198,7 @@ void soap_call_scratch_free(soap *ctx)
     while (ctx->block_stack != nullptr)
         soap_block_stack_drop(ctx, nullptr);
     xml_attributes_drop(ctx);
-    free_growing_text(ctx);
+    growing_text_free(ctx);
     soap_namespace_table_drop(ctx);
     free_attachment_references(ctx);
     soap_pointer_table_reset(ctx);
@@ -218,8 +216,10 @@ void soap_discard_all(soap *ctx)
     trace_log_close_all(ctx);
 }
 
+namespace {
+
 // A copy's plug-ins without a copy hook share their data with the source, which deletes it.
-static void end_plugins(soap *ctx)
+void end_plugins(soap *ctx)
 {
     while (ctx->plugin_list != nullptr) {
         soap_plugin_record *record = ctx->plugin_list;
@@ -230,14 +230,14 @@ static void end_plugins(soap *ctx)
     }
 }
 
-static void close_master_socket(soap *ctx)
+void close_master_socket(soap *ctx)
 {
     if (!ctx->master_shared && ctx->master_socket != -1)
         ctx->on_close_socket(ctx, ctx->master_socket);
     ctx->master_socket = -1;
 }
 
-static void end_tls(soap *ctx)
+void end_tls(soap *ctx)
 {
     SSL_SESSION_free(ctx->tls_session);
     ctx->tls_session = nullptr;
@@ -251,13 +251,15 @@ static void end_tls(soap *ctx)
     ERR_clear_error(); // OpenSSL frees the thread's error state itself when the thread ends
 }
 
-static void end_compression(soap *ctx)
+void end_compression(soap *ctx)
 {
     SOAP_FREE(ctx, ctx->zlib_stream);
     ctx->zlib_stream = nullptr;
     SOAP_FREE(ctx, ctx->zlib_buffer);
     ctx->zlib_buffer = nullptr;
 }
+
+} // namespace
 
 void soap_engine_done(soap *ctx)
 {
@@ -277,6 +279,8 @@ void soap_engine_done(soap *ctx)
     close_master_socket(ctx);
     end_tls(ctx);
     end_compression(ctx);
+    message_store_free(ctx);
+    head_memory_free(ctx);
     credentials_wipe(ctx);
     trace_log_end(ctx);
     ctx->state = 0;

@@ -19,6 +19,19 @@
 //   move RESOURCE    has its default first: the copy makes its own, or gets a reference of its own
 enum class field_fate { SETTING, CALLBACK, STATE, MESSAGE, CONNECTION, RESOURCE };
 
+#if defined(__has_feature)
+#define ZUV_HAS_FEATURE(name) __has_feature(name)
+#else
+#define ZUV_HAS_FEATURE(name) 0
+#endif
+
+// Under AddressSanitizer released memory goes back to it at once, so that late use is seen.
+#if defined(__SANITIZE_ADDRESS__) || ZUV_HAS_FEATURE(address_sanitizer)
+constexpr std::uint64_t POOL_LIMIT_DEFAULT = 0;
+#else
+constexpr std::uint64_t POOL_LIMIT_DEFAULT = SOAP_POOL_LIMIT;
+#endif
+
 // X(name, fate, default). The default {} is zero, null or empty. Without `state`, which tells whether the
 // others mean anything.
 // clang-format off
@@ -41,6 +54,7 @@ enum class field_fate { SETTING, CALLBACK, STATE, MESSAGE, CONNECTION, RESOURCE 
     X(legacy, SETTING, {}) \
     X(max_message, SETTING, SOAP_MAX_MESSAGE) \
     X(max_memory, SETTING, SOAP_MAX_MEMORY) \
+    X(pool_limit, SETTING, POOL_LIMIT_DEFAULT) \
     X(socket_flags, SETTING, {}) \
     X(connect_flags, SETTING, {}) \
     X(bind_flags, SETTING, {}) \
@@ -219,12 +233,16 @@ enum class field_fate { SETTING, CALLBACK, STATE, MESSAGE, CONNECTION, RESOURCE 
     X(prefix_cache_valid, MESSAGE, {}) \
     X(prefix_cache_list, MESSAGE, {}) \
     X(attribute_list, MESSAGE, {}) \
+    X(bare_declarations, MESSAGE, {}) \
     X(error, MESSAGE, {}) \
     X(dime, MESSAGE, {}) \
     X(mime, MESSAGE, {}) \
     X(mtom_list, MESSAGE, {}) \
     X(mtom_index, MESSAGE, {}) \
     X(attachment_stage, MESSAGE, {}) \
+    X(store_end, MESSAGE, {}) \
+    X(store_space, MESSAGE, {}) \
+    X(mark_state, MESSAGE, {}) \
     X(filter_stop, CONNECTION, {}) \
     X(socket, CONNECTION, -1) \
     X(opened_by, CONNECTION, {}) \
@@ -250,6 +268,8 @@ enum class field_fate { SETTING, CALLBACK, STATE, MESSAGE, CONNECTION, RESOURCE 
     X(track_chains, RESOURCE, {}) \
     X(track_chain_mask, RESOURCE, {}) \
     X(pools, RESOURCE, {}) \
+    X(store, RESOURCE, {}) \
+    X(head_memory, RESOURCE, {}) \
     X(tls_bio, RESOURCE, {}) \
     X(tls_connection, RESOURCE, {}) \
     X(tls_session, RESOURCE, {}) \

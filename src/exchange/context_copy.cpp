@@ -20,6 +20,7 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "core/context_state.h"
+#include "core/instance_pool.h"
 #include "core/memory.h"
 #include "core/tracking.h"
 #include "exchange/context.h"
@@ -42,8 +43,10 @@ void soap_context_assign(soap *target, const soap *source)
         target->track_chains = target->track_table;
 }
 
+namespace {
+
 // A text of the encoding style may lie in the source's working table, which goes with the source's call.
-static bool style_is_received(const soap *source)
+bool style_is_received(const soap *source)
 {
     if (source->local_namespaces == nullptr || source->encoding_style == nullptr)
         return false;
@@ -55,7 +58,7 @@ static bool style_is_received(const soap *source)
 }
 
 // Gives the fields of a fate their defaults.
-template <field_fate Fate> static void reset_fields(soap *ctx)
+template <field_fate Fate> void reset_fields(soap *ctx)
 {
 #define FIELD_DEFAULT(name, fate, value)                                                                     \
     if constexpr (field_fate::fate == Fate)                                                                  \
@@ -65,21 +68,21 @@ template <field_fate Fate> static void reset_fields(soap *ctx)
 }
 
 // Texts that belong to the source's managed memory.
-static void forget_managed_fields(soap *ctx)
+void forget_managed_fields(soap *ctx)
 {
 #define FIELD_FORGOTTEN(name) ctx->name = nullptr;
     CONTEXT_MANAGED_FIELDS(FIELD_FORGOTTEN)
 #undef FIELD_FORGOTTEN
 }
 
-static void forget_connection(soap *ctx)
+void forget_connection(soap *ctx)
 {
     reset_fields<field_fate::CONNECTION>(ctx);
     ctx->input_mode &= ~MODE_TLS;
     ctx->output_mode &= ~MODE_TLS;
 }
 
-static void forget_resources(soap *ctx)
+void forget_resources(soap *ctx)
 {
     reset_fields<field_fate::RESOURCE>(ctx);
     if (ctx->tls_context != nullptr)
@@ -88,7 +91,7 @@ static void forget_resources(soap *ctx)
 
 // The copy starts with the rows that the source has; the host's own table is what it falls back on later,
 // since the source's working table may go first.
-static int copy_namespaces(soap *target, const soap *source)
+int copy_namespaces(soap *target, const soap *source)
 {
     const soap_namespace *rows =
         source->local_namespaces != nullptr ? source->local_namespaces : source->namespaces;
@@ -98,7 +101,7 @@ static int copy_namespaces(soap *target, const soap *source)
     return SOAP_OK;
 }
 
-static int copy_plugin(soap *target, soap_plugin_record *old)
+int copy_plugin(soap *target, soap_plugin_record *old)
 {
     auto *record = static_cast<soap_plugin_record *>(SOAP_MALLOC(target, sizeof(soap_plugin_record)));
     if (record == nullptr)
@@ -114,7 +117,7 @@ static int copy_plugin(soap *target, soap_plugin_record *old)
     return SOAP_OK;
 }
 
-static int copy_plugins(soap *target, const soap *source)
+int copy_plugins(soap *target, const soap *source)
 {
     for (soap_plugin_record *old = source->plugin_list; old != nullptr; old = old->next) {
         const int result = copy_plugin(target, old);
@@ -126,7 +129,7 @@ static int copy_plugins(soap *target, const soap *source)
 
 // A copy without a connection, in a record that holds nothing. Null if `source` has ended, or as the error in
 // the copy tells.
-static soap *copy_settings(soap *target, const soap *source)
+soap *copy_settings(soap *target, const soap *source)
 {
     if (!context_is_alive(source))
         return nullptr;
@@ -150,7 +153,7 @@ static soap *copy_settings(soap *target, const soap *source)
 }
 
 // What soap_accept has stored is the copy's to serve, unless TLS is on it, which can't be shared.
-static soap *hand_over_accepted(soap *target, const soap *source)
+soap *hand_over_accepted(soap *target, const soap *source)
 {
     if (!source->socket_accepted || source->socket == -1 || source->socket_abandoned ||
         source->tls_bio != nullptr)
@@ -162,6 +165,8 @@ static soap *hand_over_accepted(soap *target, const soap *source)
     target->buffer_length = source->buffer_length;
     return target;
 }
+
+} // namespace
 
 soap *soap_context_copy(soap *target, const soap *source)
 {
@@ -198,8 +203,10 @@ soap *soap_context_copy(const soap *source)
 // ---------------------------------------------------------------------------------------------
 // Moving.
 
+namespace {
+
 // Ends the connection for good, whatever hooks say. A listening socket is none.
-static void hang_up(soap *ctx)
+void hang_up(soap *ctx)
 {
     const int error = ctx->error;
     const std::uint32_t output_mode = ctx->output_mode;
@@ -219,12 +226,15 @@ static void hang_up(soap *ctx)
     ctx->error = error;
 }
 
+} // namespace
+
 soap::soap(soap &&other) noexcept
 {
     context_fields_reset(this);
     if (!context_is_alive(&other))
         return;
     hang_up(&other);
+    idle_drop(&other); // objects that wait name the context that they wait in
     soap_context_assign(this, &other);
     if (fault != nullptr && *soap_fault_string_field(this) == other.message_text)
         *soap_fault_string_field(this) = message_text;

@@ -54,7 +54,7 @@ bool begins_mime_part(const soap *ctx)
 int put_mime_part_head(soap *ctx)
 {
     if (!begins_mime_part(ctx))
-        return 0;
+        return SOAP_OK;
     const std::string_view boundary(ctx->mime.boundary);
     const std::string_view start(ctx->mime.start);
     if (xml_put(ctx, "--") || xml_put(ctx, boundary) || xml_put(ctx, "\r\nContent-Type: ") ||
@@ -87,13 +87,13 @@ int prepare_dime_record(soap *ctx)
     const std::size_t type_length = std::strlen(ctx->dime.type);
     ctx->message_count +=
         DIME_HEADER + id_length + padding_of(id_length) + type_length + padding_of(type_length);
-    return 0;
+    return SOAP_OK;
 }
 
 int finish_dime_record(soap *ctx)
 {
     if (!has_modes(ctx, MODE_DIME, MODE_MTOM))
-        return 0;
+        return SOAP_OK;
     if ((ctx->mode & MODE_COUNTING) && prepare_dime_record(ctx))
         return ctx->error;
     return soap_send_bytes(ctx, "\0\0\0", padding_of(ctx->dime.size));
@@ -137,7 +137,7 @@ int soap_body_out_end(soap *ctx)
     if (soap_element_out_end(ctx, "SOAP-ENV:Body"))
         return ctx->error;
     ctx->message_part = PART_AFTER_BODY;
-    return 0;
+    return SOAP_OK;
 }
 
 namespace {
@@ -176,17 +176,17 @@ int settle_version(soap *ctx)
 {
     soap_namespace *rows = ctx->local_namespaces;
     if (rows == nullptr || rows[0].prefix == nullptr)
-        return 0;
+        return SOAP_OK;
     const char *uri = xml_row_uri(rows[0]);
     for (const soap_version_row &row : versions) {
         if (uri == nullptr || std::strcmp(uri, row.envelope) != 0)
             continue;
         ctx->soap_version = row.version;
         if (rows[1].prefix == nullptr)
-            return 0;
+            return SOAP_OK;
         return xml_received_set(ctx, rows[1], row.encoding);
     }
-    return 0;
+    return SOAP_OK;
 }
 
 // A head names an encoding that isn't read, and no declaration has said better.
@@ -223,7 +223,7 @@ int soap_body_in_begin(soap *ctx)
         return ctx->error;
     if (ctx->has_body == 0)
         ctx->message_part = PART_EMPTY_BODY;
-    return 0;
+    return SOAP_OK;
 }
 
 int soap_body_in_end(soap *ctx)
@@ -237,9 +237,9 @@ int soap_body_in_end(soap *ctx)
 int soap_result_check(soap *ctx)
 {
     if (ctx->soap_version != 2 || ctx->encoding_style == nullptr)
-        return 0;
+        return SOAP_OK;
     char *name = nullptr;
     if (soap_string_element_in(ctx, ":result", &name, nullptr, 0, 2, -1, -1) == nullptr)
         return ctx->error;
-    return 0;
+    return SOAP_OK;
 }

@@ -16,7 +16,9 @@
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_tcp.h>
 
-static const char *listed_text(int error)
+namespace {
+
+const char *listed_text(int error)
 {
     switch (error) {
 #define SOAP_ERROR_TEXT(name, value, text)                                                                   \
@@ -30,7 +32,7 @@ static const char *listed_text(int error)
 }
 
 // Puts the pieces together in message_text, cut to its size. No piece may lie there itself.
-static const char *compose(soap *ctx, std::initializer_list<std::string_view> pieces)
+const char *compose(soap *ctx, std::initializer_list<std::string_view> pieces)
 {
     std::size_t length = 0;
     for (const std::string_view piece : pieces)
@@ -40,12 +42,14 @@ static const char *compose(soap *ctx, std::initializer_list<std::string_view> pi
 }
 
 // A listed text whose one "%s" takes an argument.
-static const char *text_with(soap *ctx, const char *argument)
+const char *text_with(soap *ctx, const char *argument)
 {
     const std::string_view format = listed_text(ctx->error);
     const std::size_t mark = format.find("%s");
     return compose(ctx, {format.substr(0, mark), argument, format.substr(mark + 2)});
 }
+
+} // namespace
 
 const char *soap_constraint_text(soap *ctx, const char *text, const char *argument)
 {
@@ -57,8 +61,10 @@ const char *soap_constraint_text(soap *ctx, const char *text, const char *argume
     return compose(ctx, {violation, text, argument, " in element '", ctx->tag, "'"});
 }
 
+namespace {
+
 // The end-of-input text after its prefix, or alone if both together are too long.
-static const char *prefixed_eof_text(soap *ctx)
+const char *prefixed_eof_text(soap *ctx)
 {
     const std::string_view prefix = listed_text(SOAP_EOF);
     const std::size_t size = std::strlen(soap_eof_text(ctx)) + 1;
@@ -69,7 +75,7 @@ static const char *prefixed_eof_text(soap *ctx)
     return ctx->message_text;
 }
 
-static const char *unlisted_text(soap *ctx)
+const char *unlisted_text(soap *ctx)
 {
     if (ctx->error == 200)
         return "HTTP status 200, but the answer is not a SOAP message";
@@ -82,12 +88,14 @@ static const char *unlisted_text(soap *ctx)
 }
 
 // "max_memory: more than 1000 bytes".
-static const char *limit_text(soap *ctx)
+const char *limit_text(soap *ctx)
 {
     std::snprintf(ctx->message_text, sizeof ctx->message_text, "%s: more than %llu bytes", ctx->exceeded,
                   static_cast<unsigned long long>(ctx->exceeded_value));
     return ctx->message_text;
 }
+
+} // namespace
 
 const char *error_text(soap *ctx)
 {

@@ -10,22 +10,25 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_memory.h>
 
+#include "binding/member_release.h"
 #include "core/context_state.h"
 #include "core/failure.h"
 #include "exchange/fault.h"
 
-static const char *sender_code(const soap *ctx)
+namespace {
+
+const char *sender_code(const soap *ctx)
 {
     return ctx->soap_version == 2 ? "SOAP-ENV:Sender" : "SOAP-ENV:Client";
 }
 
-static const char *receiver_code(const soap *ctx)
+const char *receiver_code(const soap *ctx)
 {
     return ctx->soap_version == 2 ? "SOAP-ENV:Receiver" : "SOAP-ENV:Server";
 }
 
 // The code that the envelope's own rules give an error, or null.
-static const char *code_of_error(int error)
+const char *code_of_error(int error)
 {
     switch (error) {
     case SOAP_MUST_UNDERSTAND:
@@ -39,7 +42,7 @@ static const char *code_of_error(int error)
     }
 }
 
-static const char *subcode_of_error(int error)
+const char *subcode_of_error(int error)
 {
     if (error == SOAP_DUPLICATE_ID)
         return "SOAP-ENC:DuplicateID";
@@ -47,11 +50,13 @@ static const char *subcode_of_error(int error)
 }
 
 // SOAP 1.1 has no subcodes.
-static void store_subcode(soap *ctx, const char *subcode)
+void store_subcode(soap *ctx, const char *subcode)
 {
     if (subcode != nullptr && ctx->soap_version == 2)
         *soap_fault_subcode_field(ctx) = subcode;
 }
+
+} // namespace
 
 void soap_fault_text_fill(soap *ctx)
 {
@@ -80,12 +85,16 @@ int soap_fault_set(soap *ctx, const char *code, const char *subcode, const char 
     return fail(ctx, error);
 }
 
+namespace {
+
 // True unless memory ran out for the copy.
-static bool copy_text(soap *ctx, const char *text, const char **copy)
+bool copy_text(soap *ctx, const char *text, const char **copy)
 {
     *copy = soap_string_dup(ctx, text);
     return text == nullptr || *copy != nullptr;
 }
+
+} // namespace
 
 int soap_fault_set_copied(soap *ctx, const char *code, const char *subcode, const char *text,
                           const char *detail)
@@ -120,29 +129,35 @@ int soap_fault_receiver_copied(soap *ctx, const char *subcode, const char *text,
 // ---------------------------------------------------------------------------------------------
 // For lower layers.
 
-static int make_fault(soap *ctx, fault_side side, const char *text, const char *detail, int error)
+namespace {
+
+int make_fault(soap *ctx, fault_side side, const char *text, const char *detail, int error)
 {
     return side == fault_side::sender ? soap_fault_sender(ctx, text, detail, error)
                                       : soap_fault_receiver(ctx, text, detail, error);
 }
 
-static fault_texts read_fault(soap *ctx)
+fault_texts read_fault(soap *ctx)
 {
     return {*soap_fault_code_field(ctx), *soap_fault_string_field(ctx), soap_fault_detail_value(ctx)};
 }
 
-const soap_upcalls fault_upcalls = {make_fault, read_fault};
+} // namespace
+
+const soap_upcalls fault_upcalls = {make_fault, read_fault, binding::instance_recycle};
 
 // ---------------------------------------------------------------------------------------------
 // Printing.
 
-static const char *text_or(const char *text, const char *otherwise)
+namespace {
+
+const char *text_or(const char *text, const char *otherwise)
 {
     return text == nullptr ? otherwise : text;
 }
 
-// Hands the printed form to `put`, piece by piece; nothing for error 0.
-template <class Put> static void print_fault(soap *ctx, Put put)
+// Hands the printed form to `put`, piece by piece; nothing for SOAP_OK.
+template <class Put> void print_fault(soap *ctx, Put put)
 {
     if (ctx->error == SOAP_OK)
         return;
@@ -166,6 +181,8 @@ template <class Put> static void print_fault(soap *ctx, Put put)
     put(text_or(soap_fault_detail_value(ctx), "[no detail]"));
     put("\n");
 }
+
+} // namespace
 
 char *soap_fault_print_text(soap *ctx, char *buffer, std::size_t length)
 {

@@ -12,6 +12,7 @@
 
 // Everything of a proxy class P but its calls. `table`: the port's namespace table.
 #define PROXY_DEFINE_MEMBERS(P, table)                                                                       \
+    static_assert(sizeof(P) <= SOAP_CONTEXT_BYTES_MAX);                                                      \
     P::P()                                                                                                   \
     {                                                                                                        \
         P::P##_init(0, 0);                                                                                   \

@@ -60,7 +60,7 @@ inline bool within(const void *address, const void *start, const void *end)
 }
 
 // Puts `count` new cells between a place and its address: the place points to a cell, the cell to the next
-// one. Returns the last cell (the place itself for a count of 0), or null with error 20.
+// one. Returns the last cell (the place itself for a count of 0), or null with SOAP_OUT_OF_MEMORY.
 void *add_indirections(soap *ctx, void *place, unsigned count);
 
 // Empties a chain: every place on it holds null afterwards. Sets the head to null.

@@ -55,7 +55,7 @@ bool add_store_block(soap *ctx, soap_id_index *index, std::size_t bytes)
     return true;
 }
 
-// Zeroed memory until the reset; null with error 20.
+// Zeroed memory until the reset; null with SOAP_OUT_OF_MEMORY.
 void *store_alloc(soap *ctx, std::size_t bytes)
 {
     if (ctx->id_index == nullptr) {

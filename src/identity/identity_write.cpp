@@ -137,7 +137,7 @@ bool add_block(soap *ctx)
     return true;
 }
 
-// A new record with both marks "met once", or null with error 20.
+// A new record with both marks "met once", or null with SOAP_OUT_OF_MEMORY.
 soap_pointer_record *add_record(soap *ctx, const void *address, const void *array, int type,
                                 std::uint32_t hash)
 {
@@ -406,7 +406,7 @@ int soap_multiref_begin(soap *ctx, const void *address, const void *array, int d
 
 namespace {
 
-// The blocks of the table, oldest first, in an array of their number. Null with error 20.
+// The blocks of the table, oldest first, in an array of their number. Null with SOAP_OUT_OF_MEMORY.
 soap_pointer_block **blocks_in_order(soap *ctx, std::size_t *count)
 {
     *count = 0;

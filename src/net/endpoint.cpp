@@ -18,6 +18,7 @@
 
 #include "core/failure.h"
 #include "net/endpoint.h"
+#include "net/head_memory.h"
 #include "net/tcp_socket.h"
 #include "net/tcp_wait.h"
 #include "net/tls_connection.h"
@@ -35,29 +36,43 @@ void copy_field(char *field, const char *source, std::size_t length)
     field[copied] = '\0';
 }
 
-// Copies the host into its field; returns what follows it.
-const char *take_host(soap *ctx, const char *authority)
+endpoint_parts split_url(const char *url)
 {
+    const char *const colon = std::strchr(url, ':');
+    const bool has_scheme = colon != nullptr && colon[1] == '/' && colon[2] == '/';
+    const char *const authority = has_scheme ? colon + 3 : url;
     const bool bracketed = *authority == '[';
-    const char *start = bracketed ? authority + 1 : authority;
-    const std::size_t length = std::strcspn(start, bracketed ? "]" : "/:");
-    copy_field(ctx->host, start, length);
-    start += length;
-    return bracketed && *start == ']' ? start + 1 : start;
+    const char *const host = bracketed ? authority + 1 : authority;
+    const std::size_t host_length = std::strcspn(host, bracketed ? "]" : "/:");
+    const char *const end = host + host_length;
+    const char *const rest = bracketed && *end == ']' ? end + 1 : end;
+    const char *const path = std::strchr(rest, '/');
+    const int port = soap_tag_match(url, "https:*") == 0 ? HTTPS_PORT : HTTP_PORT;
+    const std::size_t length = std::strlen(url);
+    return {length, static_cast<std::size_t>(host - url), host_length,
+            path != nullptr ? static_cast<std::size_t>(path - url) : length,
+            *rest == ':' ? static_cast<int>(std::strtol(rest + 1, nullptr, 10)) : port};
 }
 
-void split_url(soap *ctx, const char *url)
+// The parts of an endpoint, which nearly always is that of the last call.
+endpoint_parts parts_of(soap *ctx, const char *url)
 {
-    if (soap_tag_match(url, "https:*") == 0)
-        ctx->port = HTTPS_PORT;
-    copy_field(ctx->endpoint, url, std::strlen(url));
-    const char *colon = std::strchr(url, ':');
-    const bool has_scheme = colon != nullptr && colon[1] == '/' && colon[2] == '/';
-    const char *rest = take_host(ctx, has_scheme ? colon + 3 : url);
-    if (*rest == ':')
-        ctx->port = static_cast<int>(std::strtol(rest + 1, nullptr, 10));
-    if (const char *path = std::strchr(rest, '/'))
-        copy_field(ctx->path, path, std::strlen(path));
+    endpoint_memory *const kept = endpoint_memory_keep(ctx, url);
+    if (kept == nullptr)
+        return split_url(url);
+    if (!kept->split)
+        kept->parts = split_url(url);
+    kept->split = true;
+    return kept->parts;
+}
+
+void store_parts(soap *ctx, const char *url, const endpoint_parts &parts)
+{
+    ctx->port = parts.port;
+    copy_field(ctx->endpoint, url, parts.length);
+    copy_field(ctx->host, url + parts.host, parts.host_length);
+    if (parts.path != parts.length)
+        copy_field(ctx->path, url + parts.path, parts.length - parts.path);
 }
 
 // --- the route of a connection ---
@@ -169,7 +184,7 @@ void soap_parse_endpoint(soap *ctx, const char *url)
     copy_field(ctx->path, "/", 1);
     ctx->port = HTTP_PORT;
     if (url != nullptr && *url != '\0')
-        split_url(ctx, url);
+        store_parts(ctx, url, parts_of(ctx, url));
 }
 
 // What is meant for nobody in particular doesn't go to whoever was called before.

@@ -14,6 +14,7 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "core/failure.h"
+#include "net/head_memory.h"
 
 namespace {
 
@@ -123,6 +124,9 @@ int soap_endpoint_check(soap *ctx, const char *endpoints)
     if ((ctx->legacy & LEGACY_ANY_ENDPOINT) != 0)
         return SOAP_OK;
     const std::string_view all = endpoints == nullptr ? "" : endpoints;
+    const endpoint_memory *const known = endpoint_memory_find(ctx, all.data());
+    if (known != nullptr && known->accepted)
+        return SOAP_OK;
     if (all.find_first_not_of(' ') == std::string_view::npos)
         return refuse(ctx, all, "there is no host");
     for (std::size_t start = all.find_first_not_of(' '); start != std::string_view::npos;) {
@@ -132,5 +136,7 @@ int soap_endpoint_check(soap *ctx, const char *endpoints)
             return refuse(ctx, item, why);
         start = all.find_first_not_of(' ', end);
     }
+    if (endpoint_memory *const kept = endpoint_memory_keep(ctx, all.data()))
+        kept->accepted = true;
     return SOAP_OK;
 }

@@ -18,6 +18,7 @@
 
 #include "core/failure.h"
 #include "core/tracking.h"
+#include "net/head_memory.h"
 #include "net/tcp_socket.h"
 #include "net/tls_connection.h"
 
@@ -295,6 +296,46 @@ int write_action(soap *ctx, const char *action)
     return line(ctx, "SOAPAction", value.text);
 }
 
+int write_request_head(soap *ctx, const char *endpoint, const char *host, int port, const char *path,
+                       const char *action, std::uint64_t count)
+{
+    if (write_request_line(ctx, endpoint, host, port, path) != SOAP_OK ||
+        write_host(ctx, host, port) != SOAP_OK || line(ctx, "User-Agent", PRODUCT) != SOAP_OK ||
+        http_write_entity_headers(ctx, 0, count) != SOAP_OK ||
+        line(ctx, "Accept-Encoding", "deflate") != SOAP_OK || write_service_credentials(ctx) != SOAP_OK ||
+        write_proxy_credentials(ctx, endpoint) != SOAP_OK || write_action(ctx, action) != SOAP_OK)
+        return ctx->error;
+    return line(ctx, nullptr, nullptr);
+}
+
+// --- the last request's head again ---
+
+// True if the head may be remembered, and sent again: it is a plain POST's, written by this file alone into the
+// buffer, and holds no credentials.
+bool is_memorable(const soap *ctx)
+{
+    constexpr std::uint32_t OTHER_TYPES = MODE_DIME | MODE_MIME | MODE_MTOM;
+    const bool proxied = ctx->proxy_host != nullptr;
+    return ctx->status == STATUS_POST && (ctx->mode & (OTHER_TYPES | MODE_COUNTING)) == 0 &&
+           (ctx->mode & MODE_IO_MASK) == MODE_BUFFERED && ctx->on_send_filter == nullptr &&
+           ctx->on_header_line == http_write_line && ctx->auth_user == nullptr &&
+           ctx->auth_password == nullptr &&
+           (!proxied || (ctx->proxy_user == nullptr && ctx->proxy_password == nullptr));
+}
+
+// All that the lines above look at in such a head.
+head_source source_of_head(const soap *ctx, const char *endpoint, const char *host, int port,
+                           const char *path, const char *action, std::uint64_t count)
+{
+    const bool chunked = output_is_chunked(ctx);
+    const std::uint32_t deflate = (ctx->output_mode & MODE_DEFLATE) == 0 ? 0U : ctx->zlib_out == 1 ? 1U : 2U;
+    const bool soap12 = ctx->soap_version == 2;
+    const std::uint32_t flags = deflate | (chunked ? 4U : 0U) | (soap12 ? 8U : 0U) |
+                                (soap12 && count != 0 ? 16U : 0U) | (ctx->keep_alive != 0 ? 32U : 0U) |
+                                (tls_active(ctx) ? 64U : 0U) | (ctx->proxy_host != nullptr ? 128U : 0U);
+    return {{endpoint, host, path, action, soap12 ? ctx->action : nullptr, ctx->http_version}, port, flags};
+}
+
 // --- the response's own lines ---
 
 const char *engine_error_status(soap *ctx, int status)
@@ -375,17 +416,22 @@ int http_write_entity_headers(soap *ctx, int status, std::uint64_t count)
 int http_write_request(soap *ctx, const char *endpoint, const char *host, int port, const char *path,
                        const char *action, std::uint64_t count)
 {
+    const head_source source = source_of_head(ctx, endpoint, host, port, path, action, count);
+    const bool keeps = is_memorable(ctx);
+    int result = SOAP_OK;
+    if (keeps && head_memory_send(ctx, source, count, &result))
+        return result;
     if (endpoint == nullptr || !is_http_scheme(endpoint))
         return SOAP_OK;
     if (std::strlen(endpoint) + std::strlen(ctx->http_version) > HEAD_TEXT_LIMIT)
         return fail(ctx, SOAP_OUT_OF_MEMORY);
-    if (write_request_line(ctx, endpoint, host, port, path) != SOAP_OK ||
-        write_host(ctx, host, port) != SOAP_OK || line(ctx, "User-Agent", PRODUCT) != SOAP_OK ||
-        http_write_entity_headers(ctx, 0, count) != SOAP_OK ||
-        line(ctx, "Accept-Encoding", "deflate") != SOAP_OK || write_service_credentials(ctx) != SOAP_OK ||
-        write_proxy_credentials(ctx, endpoint) != SOAP_OK || write_action(ctx, action) != SOAP_OK)
+    const std::size_t start = ctx->buffer_index;
+    const std::uint64_t before = ctx->plain_sent;
+    if (write_request_head(ctx, endpoint, host, port, path, action, count) != SOAP_OK)
         return ctx->error;
-    return line(ctx, nullptr, nullptr);
+    if (keeps && ctx->plain_sent == before) // all of it is in the buffer
+        head_memory_keep(ctx, source, count, ctx->buffer + start, ctx->buffer_index - start);
+    return SOAP_OK;
 }
 
 int http_write_response(soap *ctx, int status, std::uint64_t count)

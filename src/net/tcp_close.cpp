@@ -90,7 +90,7 @@ int tcp_disconnect(soap *ctx)
     if (tcp_inherited(ctx)) {
         tls_discard(ctx);
         tcp_drop_socket(ctx);
-        return 0;
+        return SOAP_OK;
     }
     const int tls_result = tls_close(ctx);
     if ((tcp_is_udp(ctx) || context_shares_socket(ctx)) && soap_socket_open(ctx))
@@ -152,10 +152,10 @@ int soap_force_close(soap *ctx)
 {
     ctx->keep_alive = 0;
     if (!soap_socket_open(ctx))
-        return 0;
+        return SOAP_OK;
     ctx->socket_abandoned = true;
     if (context_shares_socket(ctx))
-        return 0;
+        return SOAP_OK;
     if (ctx->master_socket == ctx->socket) // a UDP service has one socket in both fields
         ctx->master_socket = -1;
     return close(ctx->socket);

@@ -8,8 +8,10 @@
 
 #include "net/tcp_wait.h"
 
+namespace {
+
 // What a time limit adds to a text: "u" for microseconds, blank for seconds.
-static std::size_t append_limit(char *text, std::size_t size, const char *what, int timeout)
+std::size_t append_limit(char *text, std::size_t size, const char *what, int timeout)
 {
     if (timeout == 0)
         return 0;
@@ -17,6 +19,8 @@ static std::size_t append_limit(char *text, std::size_t size, const char *what, 
     const int written = std::snprintf(text, size, " (%ld%cs %s)", amount, timeout < 0 ? 'u' : ' ', what);
     return static_cast<std::size_t>(written);
 }
+
+} // namespace
 
 const char *soap_eof_text(soap *ctx)
 {

@@ -66,11 +66,11 @@ void tcp_settle_blocking(const soap *ctx, int socket);
 // errno_value takes errno.
 void tcp_save_errno(soap *ctx);
 
-// The caller's fault with the text of the socket error (or `text` in place of it) and error 28; closes
+// The caller's fault with the text of the socket error (or `text` in place of it) and SOAP_TCP_ERROR; closes
 // `socket` first. Returns -1.
 int tcp_fail(soap *ctx, int socket, const char *detail, const char *text = nullptr);
 
-// Closes a socket that select can't serve: error 46. True if it did.
+// Closes a socket that select can't serve: SOAP_FD_EXCEEDED. True if it did.
 bool tcp_refuse_large(soap *ctx, int socket);
 
 // A socket option to set, if it is wanted.

@@ -18,6 +18,7 @@
 
 #include <openssl/bio.h>
 
+#include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_tls.h>
 
@@ -39,7 +40,7 @@ int send_to_stream(soap *ctx, const char *data, std::size_t length)
     try {
         ctx->output_stream->write(data, static_cast<std::streamsize>(length));
         if (ctx->output_stream->good())
-            return 0;
+            return SOAP_OK;
     } catch (...) {
     }
     ctx->errno_value = 0;
@@ -89,7 +90,7 @@ int send_to_descriptor(soap *ctx, const char *data, std::size_t length)
             return -1;
         }
     }
-    return 0;
+    return SOAP_OK;
 }
 
 std::size_t recv_from_descriptor(soap *ctx, char *buffer, std::size_t length)
@@ -302,7 +303,7 @@ int send_to_socket(soap *ctx, const char *data, std::size_t length)
         if (sent <= 0 && settle_refused_send(ctx, wait_for, deadline) != 0)
             return -1;
     }
-    return 0;
+    return SOAP_OK;
 }
 
 } // namespace

@@ -24,7 +24,7 @@ bool tls_established(const soap *ctx);
 bool tls_has_own_rules(const soap *ctx);
 
 // --- tls_handshake.cpp ---
-// Client side on ctx->socket: handshake and check of the peer. 0, or -1 with error 28 or 30 and, save for a
+// Client side on ctx->socket: handshake and check of the peer. 0, or -1 with SOAP_TCP_ERROR or SOAP_TLS_ERROR and, save for a
 // lack of memory, a fault; the socket stays open then.
 int tls_connect(soap *ctx, const char *host, int port);
 

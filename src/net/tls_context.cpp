@@ -253,15 +253,15 @@ int soap_ssl_server_context(soap *ctx, std::uint16_t flags, const char *key_file
     if (const int error = set_up_by_flags(ctx, flags | (dh_file != nullptr ? 0u : TLS_RSA_EPHEMERAL)))
         return error;
     if (ctx->tls_context == nullptr) // the host's own set-up keeps it elsewhere
-        return 0;
+        return SOAP_OK;
     if (session_id == nullptr) {
         SSL_CTX_set_session_cache_mode(ctx->tls_context, SSL_SESS_CACHE_OFF);
         SSL_CTX_set_num_tickets(ctx->tls_context, 0); // nothing could redeem them
-        return 0;
+        return SOAP_OK;
     }
     if (SSL_CTX_set_session_id_context(ctx->tls_context, reinterpret_cast<const unsigned char *>(session_id),
                                        static_cast<unsigned>(std::strlen(session_id))) == 1)
-        return 0;
+        return SOAP_OK;
     forget_former_rules(ctx);
     return fail_setup(ctx, "Can't set session id");
 }
@@ -277,7 +277,7 @@ int tls_context_setup(soap *ctx)
     if (const char *failure = set_up(ctx, fresh.get()))
         return fail_setup(ctx, failure);
     ctx->tls_context = fresh.release();
-    return 0;
+    return SOAP_OK;
 }
 
 int tls_password_callback(char *buffer, int size, int, void *password)

@@ -76,7 +76,7 @@ int renew_connection(soap *ctx)
     tls_detach(ctx);
     if (tls_has_own_rules(ctx) && SSL_clear(ctx->tls_connection) == 1 &&
         SSL_set_session(ctx->tls_connection, nullptr) == 1)
-        return 0;
+        return SOAP_OK;
     SSL_free(ctx->tls_connection);
     ctx->tls_connection = ctx->tls_context != nullptr ? SSL_new(ctx->tls_context) : nullptr;
     return ctx->tls_connection != nullptr ? 0 : -1;
@@ -91,7 +91,7 @@ int attach(soap *ctx)
     SSL_set_bio(ctx->tls_connection, bio, bio);
     SSL_set_read_ahead(ctx->tls_connection, 1); // a record's head and body by one system call
     ctx->tls_bio = bio;
-    return 0;
+    return SOAP_OK;
 }
 
 void mark_tls(soap *ctx)
@@ -148,7 +148,7 @@ int check_client(soap *ctx)
     if (SSL_get0_peer_certificate(ctx->tls_connection) == nullptr)
         return fail_accept(ctx, "No SSL certificate was presented by the peer in soap_ssl_accept()",
                            "SSL/TLS error");
-    return 0;
+    return SOAP_OK;
 }
 
 } // namespace
@@ -173,7 +173,7 @@ int tls_connect(soap *ctx, const char *host, int port)
     if (outcome != handshake::done)
         return fail_connect(ctx, outcome, result, verdict);
     if ((ctx->tls_flags & TLS_VERIFY_PEER) == 0)
-        return 0;
+        return SOAP_OK;
     return tls_check_peer(ctx, host) == 0 ? 0 : -1;
 }
 
@@ -203,5 +203,5 @@ int soap_ssl_accept(soap *ctx)
             return error;
     tcp_settle_blocking(ctx, ctx->socket);
     mark_tls(ctx);
-    return 0;
+    return SOAP_OK;
 }

@@ -87,7 +87,7 @@ int tls_close(soap *ctx)
 {
     if (!tls_active(ctx) || !soap_socket_open(ctx)) {
         tls_discard(ctx);
-        return 0;
+        return SOAP_OK;
     }
     SSL *ssl = ctx->tls_connection;
     keep_session(ctx);

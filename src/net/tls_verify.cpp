@@ -348,7 +348,7 @@ int tls_check_peer(soap *ctx, const char *host)
                             {static_cast<int>(verdict)}),
             SOAP_TLS_ERROR);
     if ((ctx->tls_flags & TLS_SKIP_HOST_CHECK) != 0)
-        return 0;
+        return SOAP_OK;
     const std::unique_ptr<X509, certificate_delete> certificate(
         SSL_get1_peer_certificate(ctx->tls_connection));
     if (!certificate)

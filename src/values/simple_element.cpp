@@ -31,14 +31,14 @@ int type_accept(soap *ctx, const char *type, const char *const *also)
 {
     const char *received = ctx->element_type;
     if (*received == '\0' || type == nullptr)
-        return 0;
+        return SOAP_OK;
     const int error_before = ctx->error;
     bool accepted = soap_tag_compare(ctx, received, type) == 0;
     for (; !accepted && also != nullptr && *also != nullptr; also++)
         accepted = soap_tag_compare(ctx, received, *also) == 0;
     if (accepted) {
         ctx->error = error_before;
-        return 0;
+        return SOAP_OK;
     }
     soap_tag_unread(ctx);
     fail(ctx, SOAP_TYPE_MISMATCH);
@@ -70,12 +70,12 @@ int soap_float_type_check(soap *ctx, const char *type)
 int soap_array_type_check(soap *ctx, const char *type)
 {
     if (ctx->array_type[0] == '\0')
-        return 0;
+        return SOAP_OK;
     const int error_before = ctx->error;
     for (const char *accepted : {type, "xsd:anyType", "xsd:ur-type"}) {
         if (soap_tag_compare(ctx, ctx->array_type, accepted) == 0) {
             ctx->error = error_before;
-            return 0;
+            return SOAP_OK;
         }
     }
     return fail(ctx, SOAP_TAG_MISMATCH);

@@ -226,7 +226,7 @@ const char *literal_name(const soap *ctx, const char *tag)
 int open_literal(soap *ctx, const char *tag)
 {
     if (!has_own_tag(tag))
-        return 0;
+        return SOAP_OK;
     const char *name = literal_name(ctx, tag);
     if (name == tag)
         return soap_element_out_begin(ctx, tag, 0, nullptr);
@@ -274,7 +274,7 @@ int put_soap12_array(soap *ctx, const char *array_type)
     const char *bracket = std::strrchr(array_type, '[');
     const auto length = bracket != nullptr ? static_cast<std::size_t>(bracket - array_type) : SOAP_TEXT_SIZE;
     if (length >= SOAP_TEXT_SIZE)
-        return 0;
+        return SOAP_OK;
     char item_type[SOAP_TEXT_SIZE];
     *std::copy_n(array_type, length, item_type) = '\0';
     if (soap_attr_write(ctx, "SOAP-ENC:itemType", item_type))
@@ -335,7 +335,7 @@ int soap_result_out(soap *ctx, const char *name)
 {
     constexpr const char *TAG = "SOAP-RPC:result";
     if (ctx->soap_version != 2 || is_literal(ctx))
-        return 0;
+        return SOAP_OK;
     if (soap_element_open(ctx, TAG, 0, nullptr) || soap_attr_write(ctx, "xmlns:SOAP-RPC", SOAP_12_RPC))
         return ctx->error;
     if ((ctx->mode & MODE_CANONICAL) && soap_prefix_use(ctx, name))
@@ -348,7 +348,7 @@ int soap_result_out(soap *ctx, const char *name)
 int soap_literal_write(soap *ctx, const char *tag, char *const *text, const char *)
 {
     if (text == nullptr || *text == nullptr)
-        return 0;
+        return SOAP_OK;
     if (open_literal(ctx, tag) || xml_put_literal(ctx, *text))
         return ctx->error;
     return close_literal(ctx, tag);
@@ -357,16 +357,18 @@ int soap_literal_write(soap *ctx, const char *tag, char *const *text, const char
 int soap_wide_literal_write(soap *ctx, const char *tag, char32_t *const *text, const char *)
 {
     if (text == nullptr || *text == nullptr)
-        return 0;
+        return SOAP_OK;
     if (open_literal(ctx, tag) || xml_put_wide(ctx, *text))
         return ctx->error;
     return close_literal(ctx, tag);
 }
 
+namespace {
+
 // Asks for the id of a text held by pointer, which may go out as a reference, a null or an empty nil element
 // instead. True if the text itself is to be written.
 template <class Char>
-static bool begins_string(soap *ctx, const char *tag, int id, const Char *text, const char *type, int type_id)
+bool begins_string(soap *ctx, const char *tag, int id, const Char *text, const char *type, int type_id)
 {
     id = soap_element_ref(ctx, tag, id, text, nullptr, 0, type, type_id);
     if (id < 0 || !text)
@@ -377,6 +379,8 @@ static bool begins_string(soap *ctx, const char *tag, int id, const Char *text, 
     }
     return soap_element_out_begin(ctx, tag, id, type) == 0;
 }
+
+} // namespace
 
 int soap_string_element_out(soap *ctx, const char *tag, int id, char *const *text, const char *type,
                             int type_id)

@@ -9,7 +9,7 @@
 bool type_says_nothing(soap *ctx);
 
 // 0 if the held xsi:type is absent, is `type` (null: any), or is one of the list `also` (null for none),
-// which ends with null. Otherwise the start tag is given back: -1, error 4.
+// which ends with null. Otherwise the start tag is given back: -1, SOAP_TYPE_MISMATCH.
 int type_accept(soap *ctx, const char *type, const char *const *also);
 
 // As soap_qname_read_map without bounds, but the text is UTF-8 whatever the strings of the mode are.

@@ -25,40 +25,6 @@ constexpr std::size_t RECORDS_BEFORE_RENAMING = 256;
 constexpr std::size_t USUAL_VALUE = 64; // bytes of a first value buffer
 constexpr std::size_t USUAL_NAME = 64;  // room for a name in a new record, bytes
 
-template <class Word> std::uint64_t load(const char *bytes)
-{
-    Word word;
-    std::memcpy(&word, bytes, sizeof word);
-    return word;
-}
-
-// The last bytes of a name, all of it if it is short, as a number; where it takes two, they may overlap.
-std::uint64_t tail_of(std::string_view name)
-{
-    const char *const end = name.data() + name.size();
-    if (name.size() >= sizeof(std::uint64_t))
-        return load<std::uint64_t>(end - sizeof(std::uint64_t));
-    if (name.size() >= sizeof(std::uint32_t))
-        return load<std::uint32_t>(name.data()) << 32 | load<std::uint32_t>(end - sizeof(std::uint32_t));
-    std::uint64_t tail = 0;
-    for (const char c : name)
-        tail = tail << 8 | static_cast<unsigned char>(c);
-    return tail;
-}
-
-// The factor keeps a peer from choosing names that fall into one chain.
-std::uint32_t hash_of(const soap_namespace_scope *scope, std::string_view name)
-{
-    const std::uint64_t factor = scope->hash_factor * UINT64_C(0x9E3779B97F4A7C15);
-    std::uint64_t hash = name.size();
-    for (std::size_t done = sizeof(std::uint64_t); done < name.size(); done += sizeof(std::uint64_t)) {
-        hash = (hash ^ load<std::uint64_t>(name.data() + done - sizeof(std::uint64_t))) * factor;
-        hash ^= hash >> 32;
-    }
-    hash = (hash ^ tail_of(name)) * factor;
-    return static_cast<std::uint32_t>(hash ^ hash >> 32);
-}
-
 soap_attribute *&chain_of(soap_namespace_scope *scope, std::uint32_t hash)
 {
     return scope->attribute_chains[hash % ATTRIBUTE_CHAINS];
@@ -155,7 +121,7 @@ soap_attribute *xml_attribute_record(soap *ctx, std::string_view name)
     soap_namespace_scope *scope = namespace_scope_of(ctx);
     if (scope == nullptr)
         return nullptr;
-    const std::uint32_t hash = hash_of(scope, name);
+    const std::uint32_t hash = scope_hash(scope, name);
     if (soap_attribute *known = find(chain_of(scope, hash), hash, name))
         return known;
     soap_attribute *record = make_record(ctx, scope, name.size() + 1);
@@ -194,7 +160,7 @@ void xml_attributes_hide(soap *ctx)
 int xml_attribute_room(soap *ctx, soap_attribute *record, std::size_t size)
 {
     if (record->size >= size)
-        return 0;
+        return SOAP_OK;
     size = std::max(size, USUAL_VALUE);
     SOAP_FREE(ctx, record->value);
     record->size = 0;
@@ -202,7 +168,7 @@ int xml_attribute_room(soap *ctx, soap_attribute *record, std::size_t size)
     if (record->value == nullptr)
         return fail(ctx, SOAP_OUT_OF_MEMORY);
     record->size = size;
-    return 0;
+    return SOAP_OK;
 }
 
 int xml_attribute_store(soap *ctx, soap_attribute *record, std::string_view value)
@@ -210,7 +176,7 @@ int xml_attribute_store(soap *ctx, soap_attribute *record, std::string_view valu
     if (xml_attribute_room(ctx, record, value.size() + 1))
         return ctx->error;
     *std::copy(value.begin(), value.end(), record->value) = '\0';
-    return 0;
+    return SOAP_OK;
 }
 
 void xml_attribute_free(soap *ctx, soap_attribute *record)
@@ -237,10 +203,10 @@ void xml_attributes_drop(soap *ctx)
 int soap_attr_set(soap *ctx, const char *name, const char *value, int escape)
 {
     if (*name == '-')
-        return 0;
+        return SOAP_OK;
     soap_attribute *record = xml_attribute_record(ctx, name);
     if (record != nullptr && record->visible != 0)
-        return 0;
+        return SOAP_OK;
     if (ctx->attributes_set == std::numeric_limits<std::int16_t>::max())
         return fail(ctx, SOAP_LENGTH);
     if (record == nullptr || (value != nullptr && xml_attribute_store(ctx, record, value)))
@@ -250,7 +216,7 @@ int soap_attr_set(soap *ctx, const char *name, const char *value, int escape)
     ++ctx->attributes_set;
     if (value != nullptr && std::strcmp(name, "wsu:Id") == 0)
         announce_wsu_id(ctx, value);
-    return 0;
+    return SOAP_OK;
 }
 
 void soap_attr_table_reset(soap *ctx)

@@ -17,7 +17,7 @@ inline std::string_view xml_attribute_name(const soap_attribute *record)
 }
 
 // The record of this name, visible or idle; a new one is idle and may still have the value buffer of another
-// name. The cost does not depend on how many there are. Null if memory runs out, with error 20.
+// name. The cost does not depend on how many there are. Null if memory runs out, with SOAP_OUT_OF_MEMORY.
 soap_attribute *xml_attribute_record(soap *ctx, std::string_view name);
 
 // Puts an idle record into the attribute list, in the place that a link leads to. `visible`: 1 without a
@@ -31,7 +31,7 @@ void xml_attributes_hide(soap *ctx);
 // SOAP_OUT_OF_MEMORY.
 int xml_attribute_room(soap *ctx, soap_attribute *record, std::size_t size);
 
-// Copies a text to the record's value and terminates it. 0 or SOAP_OUT_OF_MEMORY.
+// Copies a text to the record's value and terminates it. SOAP_OK or SOAP_OUT_OF_MEMORY.
 int xml_attribute_store(soap *ctx, soap_attribute *record, std::string_view value);
 
 void xml_attribute_free(soap *ctx, soap_attribute *record);

@@ -14,8 +14,16 @@ constexpr const char *XML_NAMESPACE_URI = "http://www.w3.org/XML/1998/namespace"
 // Cost does not depend on how many are in scope.
 soap_prefix *xml_prefix_find(const soap *ctx, std::string_view prefix);
 
+// soap_prefix_push_in, with a terminated URI whose length is known.
+soap_prefix *xml_prefix_declare(soap *ctx, std::string_view prefix, std::string_view uri);
+
+// Row of a table's first `row` ones whose pattern takes the URI of the next, or the same URI: true if the row
+// isn't the first that a declaration of its URI could be bound to.
+bool xml_row_is_shadowed(const soap_namespace *rows, const struct namespace_lengths *lengths,
+                         std::size_t row);
+
 // Keeps a copy of `uri` as the one received for a row of the working copy; "" of encoding_style is renewed
-// with it. An equal URI is not copied again. 0 or SOAP_OUT_OF_MEMORY.
+// with it. An equal URI is not copied again. SOAP_OK or SOAP_OUT_OF_MEMORY.
 int xml_received_set(soap *ctx, soap_namespace &row, const char *uri);
 void xml_received_drop(soap *ctx, soap_namespace &row);
 
@@ -32,6 +40,9 @@ inline const char *xml_row_uri(const soap_namespace &row)
 //   Owned by the context, valid until the table changes. Null if they cannot be had as one stretch: no table,
 //   a URI was received in place of a row's own, a URI needs escapes, or memory ran out.
 const char *xml_root_declarations(soap *ctx, std::size_t rows_max, std::size_t *length);
+
+// Drops the records that are kept for the next message's root element; those in scope become ordinary ones.
+void xml_root_forget(soap *ctx);
 
 // Prefixes that wait to be declared by the element now being opened (records of index 1 with a URI).
 std::size_t xml_prefixes_waiting(const soap *ctx);

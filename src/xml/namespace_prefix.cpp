@@ -28,15 +28,7 @@ constexpr std::size_t USUAL_TEXTS = 128; // bytes of text in a new record
 
 std::uint16_t chain_of(const soap_namespace_scope *scope, std::string_view prefix)
 {
-    std::uint32_t hash = scope->hash_factor;
-    for (const char c : prefix)
-        hash = (hash ^ static_cast<unsigned char>(c)) * scope->hash_factor;
-    return static_cast<std::uint16_t>((hash >> 16) % PREFIX_CHAINS);
-}
-
-std::string_view text_of(const soap_prefix *record)
-{
-    return {record->prefix, record->prefix_length};
+    return static_cast<std::uint16_t>(scope_hash(scope, prefix) % PREFIX_CHAINS);
 }
 
 bool waits(const soap_prefix *record)
@@ -77,15 +69,31 @@ void drop_record(soap *ctx, soap_namespace_scope *scope, soap_prefix *record)
     ++scope->spare_count;
 }
 
-// Puts a prefix on the stack at the current depth. `uri` may be null.
-soap_prefix *push(soap *ctx, std::string_view prefix, const char *uri, std::int16_t index)
+// The remembered records that no message has in scope make room in the chains.
+void drop_remembered(soap *ctx, soap_namespace_scope *scope)
+{
+    while (soap_prefix *record = scope->root.first) {
+        scope->root.first = scope->root.count > 1 ? record->next : nullptr;
+        --scope->root.count;
+        scope->chains[record->hash] = nullptr;
+        drop_record(ctx, scope, record);
+    }
+    scope->root.length = 0;
+    xml_prefix_rows_forget(ctx);
+}
+
+// Puts a prefix on the stack at the current depth. `uri` may be null; it is terminated.
+soap_prefix *push(soap *ctx, std::string_view prefix, const char *uri, std::size_t uri_length,
+                  std::int16_t index)
 {
     soap_namespace_scope *scope = namespace_scope_of(ctx);
     if (scope == nullptr)
         return nullptr;
     if (scope->in_scope >= SOAP_PREFIXES_MAX || prefix.size() > std::numeric_limits<std::uint16_t>::max())
         return fail_null(ctx, SOAP_LENGTH);
-    const std::size_t uri_size = uri != nullptr ? std::strlen(uri) + 1 : 0;
+    if (ctx->prefix_list == nullptr && scope->root.first != nullptr)
+        drop_remembered(ctx, scope);
+    const std::size_t uri_size = uri != nullptr ? uri_length + 1 : 0;
     const std::size_t texts = prefix.size() + 1 + uri_size;
     soap_prefix *record = take_spare(scope, texts);
     if (record == nullptr && (record = make_record(ctx, texts)) == nullptr)
@@ -113,6 +121,12 @@ void pop_head(soap *ctx)
 {
     soap_namespace_scope *scope = ctx->namespace_scope;
     soap_prefix *record = ctx->prefix_list;
+    if (record == scope->root.first) { // the remembered ones stay together in their chains
+        ctx->prefix_list = nullptr;
+        scope->in_scope = 0;
+        ctx->tag_resolved = false;
+        return;
+    }
     ctx->prefix_list = record->next;
     scope->chains[record->hash] = record->chain;
     --scope->in_scope;
@@ -151,13 +165,34 @@ bool fits_pattern(const soap_namespace &row, const namespace_lengths *lengths, s
     return soap_tag_match(uri.data(), row.pattern) == 0;
 }
 
+// Row that a URI is bound to in any case, or UNBOUND if that depends on what was received.
+std::int16_t sure_row(const soap *ctx, std::string_view uri)
+{
+    const soap_namespace_scope *scope = ctx->namespace_scope;
+    if (scope == nullptr || scope->row_count == 0)
+        return UNBOUND;
+    std::uint32_t slot = scope_hash(scope, uri) % URI_SLOTS;
+    for (; scope->uri_slots[slot] != 0; slot = (slot + 1) % URI_SLOTS) {
+        const std::size_t row = scope->uri_slots[slot] - 1U;
+        const namespace_lengths *lengths = namespace_row_lengths(ctx, row);
+        if (lengths != nullptr && lengths->uri == uri.size() &&
+            same_name(scope->rows[row].uri, uri.data(), uri.size()))
+            return static_cast<std::int16_t>(row);
+    }
+    return UNBOUND;
+}
+
 // Row of the working copy that a declared URI belongs to, or UNBOUND. False if memory runs out.
-bool bind_uri(soap *ctx, const char *uri, std::int16_t *index)
+bool bind_uri(soap *ctx, std::string_view text, std::int16_t *index)
 {
     *index = UNBOUND;
     if (ctx->local_namespaces == nullptr)
         return true;
-    const std::string_view text(uri);
+    *index = sure_row(ctx, text);
+    if (*index != UNBOUND) {
+        xml_received_drop(ctx, ctx->local_namespaces[*index]);
+        return true;
+    }
     for (std::size_t i = 0; ctx->local_namespaces[i].prefix != nullptr; ++i) {
         soap_namespace &row = ctx->local_namespaces[i];
         const namespace_lengths *lengths = namespace_row_lengths(ctx, i);
@@ -169,7 +204,7 @@ bool bind_uri(soap *ctx, const char *uri, std::int16_t *index)
         } else {
             if (!fits_pattern(row, lengths, text))
                 continue;
-            if (xml_received_set(ctx, row, uri))
+            if (xml_received_set(ctx, row, text.data()))
                 return false;
         }
         *index = static_cast<std::int16_t>(i);
@@ -181,7 +216,8 @@ bool bind_uri(soap *ctx, const char *uri, std::int16_t *index)
 soap_prefix *find(const soap *ctx, std::string_view prefix)
 {
     soap_prefix *record = ctx->namespace_scope->chains[chain_of(ctx->namespace_scope, prefix)];
-    while (record != nullptr && text_of(record) != prefix)
+    while (record != nullptr && (record->prefix_length != prefix.size() ||
+                                 !same_name(record->prefix, prefix.data(), prefix.size())))
         record = record->chain;
     return record;
 }
@@ -245,20 +281,21 @@ int soap_prefix_push_out(soap *ctx, const char *prefix, const char *uri, int sta
 {
     if (is_canonical(ctx) && ctx->canonical_exclude != nullptr &&
         xml_list_names(ctx->canonical_exclude, prefix))
-        return 0;
+        return SOAP_OK;
     if (state == DECLARED) {
         const soap_prefix *known = xml_prefix_find(ctx, prefix);
         if (known != nullptr && (known->uri == nullptr || same_uri(known->uri, uri))) {
             const bool declared_here = known->uri != nullptr && known->level >= ctx->nesting_level;
             if (declared_here || known->index != TO_DECLARE)
-                return 0;
+                return SOAP_OK;
         }
         // Known without a URI: the element has used it and now says what it stands for. Known with another
         // URI: the element gives the prefix a new meaning, which must be written here to hold.
         if (known != nullptr)
             state = TO_DECLARE;
     }
-    return push(ctx, prefix, uri, static_cast<std::int16_t>(state)) != nullptr ? 0 : ctx->error;
+    const std::size_t length = uri != nullptr ? std::strlen(uri) : 0;
+    return push(ctx, prefix, uri, length, static_cast<std::int16_t>(state)) != nullptr ? 0 : ctx->error;
 }
 
 int soap_prefix_use(soap *ctx, const char *name)
@@ -266,29 +303,60 @@ int soap_prefix_use(soap *ctx, const char *name)
     const std::string_view prefix = xml_prefix_of(name);
     const soap_prefix *known = xml_prefix_find(ctx, prefix);
     if (known != nullptr ? known->index != DECLARED : prefix.starts_with("xml"))
-        return 0;
+        return SOAP_OK;
     if (is_canonical(ctx) && ctx->canonical_exclude != nullptr && !prefix.empty() &&
         xml_list_names(ctx->canonical_exclude, prefix))
-        return 0;
-    return push(ctx, prefix, known != nullptr ? known->uri : nullptr, TO_DECLARE) != nullptr ? 0 : ctx->error;
+        return SOAP_OK;
+    const char *uri = known != nullptr ? known->uri : nullptr;
+    const std::size_t length = uri != nullptr ? std::strlen(uri) : 0;
+    return push(ctx, prefix, uri, length, TO_DECLARE) != nullptr ? 0 : ctx->error;
 }
 
-soap_prefix *soap_prefix_push_in(soap *ctx, const char *prefix, const char *uri)
+soap_prefix *xml_prefix_declare(soap *ctx, std::string_view prefix, std::string_view uri)
 {
     std::int16_t index = UNBOUND;
     if (!bind_uri(ctx, uri, &index))
         return nullptr;
-    return push(ctx, prefix, index == UNBOUND ? uri : nullptr, index);
+    return push(ctx, prefix, index == UNBOUND ? uri.data() : nullptr, uri.size(), index);
+}
+
+soap_prefix *soap_prefix_push_in(soap *ctx, const char *prefix, const char *uri)
+{
+    return xml_prefix_declare(ctx, prefix, uri);
+}
+
+void xml_root_forget(soap *ctx)
+{
+    soap_namespace_scope *scope = ctx->namespace_scope;
+    if (scope == nullptr)
+        return;
+    if (ctx->prefix_list == nullptr)
+        drop_remembered(ctx, scope);
+    scope->root.first = nullptr; // in scope: ordinary records from now on
+    scope->root.count = 0;
+    scope->root.length = 0;
+}
+
+bool xml_row_is_shadowed(const soap_namespace *rows, const namespace_lengths *lengths, std::size_t row)
+{
+    const std::string_view uri = rows[row].uri;
+    for (std::size_t i = 0; i < row; ++i) {
+        if (is_row_uri(rows[i], &lengths[i], uri) || fits_pattern(rows[i], &lengths[i], uri))
+            return true;
+    }
+    return false;
 }
 
 void soap_prefix_pop(soap *ctx)
 {
+    ctx->bare_declarations = 0;
     while (ctx->prefix_list != nullptr && ctx->prefix_list->level >= ctx->nesting_level)
         pop_head(ctx);
 }
 
 void soap_prefix_stack_reset(soap *ctx)
 {
+    ctx->bare_declarations = 0;
     while (ctx->prefix_list != nullptr)
         pop_head(ctx);
 }

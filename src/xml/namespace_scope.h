@@ -7,6 +7,8 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <cstring>
+#include <string_view>
 
 #include <zuv_client_pro/soap.h>
 
@@ -21,10 +23,31 @@ constexpr std::size_t SPARE_ATTRIBUTES_MAX = 64;
 constexpr std::size_t SPARE_ATTRIBUTE_SIZE =
     1024; // bytes of value; a record with a larger one is freed at once
 
+constexpr std::size_t URI_SLOTS = 64;        // power of two
+constexpr std::size_t ROOT_BYTES_MAX = 4096; // for a remembered root element
+constexpr std::size_t RECEIVED_SIZE = 128;   // bytes; longer received URIs have blocks of their own
+constexpr std::size_t RECEIVED_KEPT = 4;     // blocks for received URIs that stay from call to call
+constexpr std::size_t ROOT_RECEIVED_MAX = 8; // rows that took a URI in it
+
 // Bytes in a row's own texts.
 struct namespace_lengths {
     std::size_t prefix, uri;
     std::size_t pattern_head; // of the pattern, before its first "*" or "-"
+};
+
+// The declarations of the last message's root element, with what became of them; see root_head.h.
+struct remembered_root {
+    // From after the tag's name up to and with its ">"; after that the URIs received, terminated.
+    char bytes[ROOT_BYTES_MAX];
+    std::size_t length; // 0: nothing is remembered
+    bool empty_tag;     // the tag ends in "/>"
+    soap_prefix *first; // the innermost of its records; null without any
+    std::uint32_t count;
+    std::size_t received_count;
+    struct {
+        std::int16_t row;
+        const char *uri; // in `bytes`
+    } received[ROOT_RECEIVED_MAX];
 };
 
 struct soap_namespace_scope {
@@ -41,17 +64,23 @@ struct soap_namespace_scope {
     soap_attribute *spare_attributes; // linked by next
     std::size_t spare_attribute_count;
     soap_namespace *spare_table; // room for row_count rows and their end; null while it is the working copy
-    std::uint8_t tag_prefix;     // the reader's last tag: place of its prefix in soap::prefix_cache
+    remembered_root root;
+    char *received[RECEIVED_KEPT]; // blocks of RECEIVED_SIZE for received URIs; owned; null until first use
+    unsigned received_used;        // bit n: a row has received[n]
+    std::uint8_t tag_prefix;       // the reader's last tag: place of its prefix in soap::prefix_cache
 
     const soap_namespace *rows;       // copy of the rows described, without received URIs; owned with lengths
     const namespace_lengths *lengths; // of each row
     std::size_t row_count;
+    // Index + 1 of the row that a URI is bound to whatever was received before, by hash of the URI; 0 for an
+    // empty slot. Open addressing.
+    std::uint8_t uri_slots[URI_SLOTS];
     char *declarations;            // the rows as attributes, in table order; null until first use
     std::size_t *declaration_ends; // bytes of `declarations` up to and with each row; in the same allocation
     bool declarations_plain;       // no URI needs an escape
 };
 
-// The context's record, made now if need be. Null if memory runs out, with error 20.
+// The context's record, made now if need be. Null if memory runs out, with SOAP_OUT_OF_MEMORY.
 soap_namespace_scope *namespace_scope_of(soap *ctx);
 
 // True if the row has a prefix of this length; false too when that isn't known.
@@ -80,4 +109,43 @@ inline const namespace_lengths *namespace_row_lengths(const soap *ctx, std::size
                        scope->rows[row].uri == ctx->local_namespaces[row].uri &&
                        scope->rows[row].pattern == ctx->local_namespaces[row].pattern;
     return known ? &scope->lengths[row] : nullptr;
+}
+
+namespace scope_hash_detail {
+
+template <class Word> std::uint64_t load(const char *bytes)
+{
+    Word word;
+    std::memcpy(&word, bytes, sizeof word);
+    return word;
+}
+
+// The last bytes of a name, all of it if it is short, as a number; where it takes two, they may overlap.
+inline std::uint64_t tail_of(std::string_view name)
+{
+    const char *const end = name.data() + name.size();
+    if (name.size() >= sizeof(std::uint64_t))
+        return load<std::uint64_t>(end - sizeof(std::uint64_t));
+    if (name.size() >= sizeof(std::uint32_t))
+        return load<std::uint32_t>(name.data()) << 32 | load<std::uint32_t>(end - sizeof(std::uint32_t));
+    std::uint64_t tail = 0;
+    for (const char c : name)
+        tail = tail << 8 | static_cast<unsigned char>(c);
+    return tail;
+}
+
+} // namespace scope_hash_detail
+
+// Hash of a name. The factor keeps a peer from choosing names that fall into one chain.
+inline std::uint32_t scope_hash(const soap_namespace_scope *scope, std::string_view name)
+{
+    namespace detail = scope_hash_detail;
+    const std::uint64_t factor = scope->hash_factor * UINT64_C(0x9E3779B97F4A7C15);
+    std::uint64_t hash = name.size();
+    for (std::size_t done = sizeof(std::uint64_t); done < name.size(); done += sizeof(std::uint64_t)) {
+        hash = (hash ^ detail::load<std::uint64_t>(name.data() + done - sizeof(std::uint64_t))) * factor;
+        hash ^= hash >> 32;
+    }
+    hash = (hash ^ detail::tail_of(name)) * factor;
+    return static_cast<std::uint32_t>(hash ^ hash >> 32);
 }

@@ -17,6 +17,7 @@
 #include "xml/attributes.h"
 #include "xml/namespace.h"
 #include "xml/namespace_scope.h"
+#include "xml/xml_read.h"
 
 namespace {
 
@@ -49,6 +50,7 @@ bool is_measured(const soap_namespace_scope *scope, const soap_namespace *table)
 
 void forget_rows(soap *ctx, soap_namespace_scope *scope)
 {
+    xml_root_forget(ctx);
     SOAP_FREE(ctx, scope->spare_table);
     scope->spare_table = nullptr;
     SOAP_FREE(ctx, scope->declarations);
@@ -59,6 +61,21 @@ void forget_rows(soap *ctx, soap_namespace_scope *scope)
     scope->declarations = nullptr;
 }
 
+// Enters the rows that no earlier one can take a declaration from. Those that don't fit are looked for in the
+// table.
+void index_uris(soap_namespace_scope *scope)
+{
+    std::memset(scope->uri_slots, 0, sizeof scope->uri_slots);
+    for (std::size_t i = 0; i < std::min(scope->row_count, URI_SLOTS / 2); ++i) {
+        if (scope->rows[i].uri == nullptr || xml_row_is_shadowed(scope->rows, scope->lengths, i))
+            continue;
+        std::uint32_t slot = scope_hash(scope, {scope->rows[i].uri, scope->lengths[i].uri}) % URI_SLOTS;
+        while (scope->uri_slots[slot] != 0)
+            slot = (slot + 1) % URI_SLOTS;
+        scope->uri_slots[slot] = static_cast<std::uint8_t>(i + 1);
+    }
+}
+
 // Measures the table's texts unless they are the ones measured last time.
 int describe_rows(soap *ctx, const soap_namespace *table, std::size_t count)
 {
@@ -67,7 +84,7 @@ int describe_rows(soap *ctx, const soap_namespace *table, std::size_t count)
         return ctx->error;
     if (scope->rows != nullptr && scope->row_count == count &&
         std::equal(table, table + count, scope->rows, same_texts))
-        return 0;
+        return SOAP_OK;
     forget_rows(ctx, scope);
     void *place = SOAP_MALLOC(ctx, (count + 1) * (sizeof(soap_namespace) + sizeof(namespace_lengths)));
     if (place == nullptr)
@@ -83,7 +100,8 @@ int describe_rows(soap *ctx, const soap_namespace *table, std::size_t count)
     scope->rows = rows;
     scope->lengths = lengths;
     scope->row_count = count;
-    return 0;
+    index_uris(scope);
+    return SOAP_OK;
 }
 
 bool is_declared(const soap_namespace &row)
@@ -130,6 +148,50 @@ bool compose_declarations(soap *ctx, soap_namespace_scope *scope)
     return true;
 }
 
+// Room for a received URI of so many bytes. Null if memory runs out.
+char *take_received(soap *ctx, std::size_t size)
+{
+    soap_namespace_scope *scope = ctx->namespace_scope;
+    for (unsigned i = 0; scope != nullptr && size <= RECEIVED_SIZE && i < RECEIVED_KEPT; ++i) {
+        if ((scope->received_used & 1U << i) != 0)
+            continue;
+        if (scope->received[i] == nullptr)
+            scope->received[i] = static_cast<char *>(SOAP_MALLOC(ctx, RECEIVED_SIZE));
+        if (scope->received[i] != nullptr)
+            scope->received_used |= 1U << i;
+        return scope->received[i];
+    }
+    return static_cast<char *>(SOAP_MALLOC(ctx, size));
+}
+
+void give_received(soap *ctx, char *received)
+{
+    soap_namespace_scope *scope = ctx->namespace_scope;
+    for (unsigned i = 0; scope != nullptr && i < RECEIVED_KEPT; ++i) {
+        if (scope->received[i] == received) {
+            scope->received_used &= ~(1U << i);
+            return;
+        }
+    }
+    SOAP_FREE(ctx, received);
+}
+
+// A row is about to stand for another URI: declarations of the held element that are bound to it become
+// attributes while it still tells what they said. 0 or 20.
+int keep_declared(soap *ctx, const soap_namespace &row, const char *uri)
+{
+    const char *const before = xml_row_uri(row);
+    if (before != nullptr && uri != nullptr && std::strcmp(before, uri) == 0)
+        return SOAP_OK;
+    const soap_prefix *record = ctx->prefix_list;
+    for (std::uint32_t left = ctx->bare_declarations; left > 0 && record != nullptr; --left) {
+        if (record->index >= 0 && &ctx->local_namespaces[record->index] == &row)
+            return xml_attributes_complete(ctx);
+        record = record->next;
+    }
+    return SOAP_OK;
+}
+
 } // namespace
 
 soap_namespace_scope *namespace_scope_of(soap *ctx)
@@ -154,6 +216,7 @@ void soap_namespace_scope_free(soap *ctx)
     if (scope == nullptr)
         return;
     soap_prefix_stack_reset(ctx);
+    xml_root_forget(ctx);
     while (scope->spare != nullptr) {
         soap_prefix *next = scope->spare->next;
         SOAP_FREE(ctx, scope->spare);
@@ -166,6 +229,8 @@ void soap_namespace_scope_free(soap *ctx)
         scope->spare_attributes = next;
     }
     forget_rows(ctx, scope);
+    for (char *block : scope->received)
+        SOAP_FREE(ctx, block);
     SOAP_FREE(ctx, scope);
     ctx->namespace_scope = nullptr;
 }
@@ -173,7 +238,7 @@ void soap_namespace_scope_free(soap *ctx)
 int soap_namespace_table_copy(soap *ctx)
 {
     if (ctx->local_namespaces != nullptr || ctx->namespaces == nullptr)
-        return 0;
+        return SOAP_OK;
     const bool measured = is_measured(ctx->namespace_scope, ctx->namespaces);
     const std::size_t count = measured ? ctx->namespace_scope->row_count : count_rows(ctx->namespaces);
     if (!measured && describe_rows(ctx, ctx->namespaces, count))
@@ -196,7 +261,7 @@ int soap_namespace_table_copy(soap *ctx)
     if (count > 0)
         ctx->soap_version =
             (rows[0].uri != nullptr) && std::strcmp(rows[0].uri, SOAP_11_ENVELOPE) == 0 ? 1 : 2;
-    return 0;
+    return SOAP_OK;
 }
 
 void soap_namespace_table_drop(soap *ctx)
@@ -232,24 +297,27 @@ int soap_set_namespaces(soap *ctx, const soap_namespace *table)
 int xml_received_set(soap *ctx, soap_namespace &row, const char *uri)
 {
     if (row.received != nullptr && std::strcmp(row.received, uri) == 0)
-        return 0;
+        return SOAP_OK;
+    if (keep_declared(ctx, row, uri) != 0)
+        return ctx->error;
     const std::size_t size = std::strlen(uri) + 1;
-    auto *copy = static_cast<char *>(SOAP_MALLOC(ctx, size));
+    char *copy = take_received(ctx, size);
     if (copy == nullptr)
         return fail(ctx, SOAP_OUT_OF_MEMORY);
     std::memcpy(copy, uri, size);
     xml_received_drop(ctx, row);
     row.received = copy;
-    return 0;
+    return SOAP_OK;
 }
 
 void xml_received_drop(soap *ctx, soap_namespace &row)
 {
     if (row.received == nullptr)
         return;
+    keep_declared(ctx, row, row.uri); // without memory the attribute tells the row's next URI
     if (ctx->encoding_style == row.received)
         ctx->encoding_style = "";
-    SOAP_FREE(ctx, row.received);
+    give_received(ctx, row.received);
     row.received = nullptr;
 }
 

@@ -39,9 +39,10 @@ const soap_namespace *table_row(const soap *ctx, int row)
     return table != nullptr ? table + row : nullptr;
 }
 
+// Prefixes that come in turn should have places of their own: "protocol" and those of each port do.
 std::size_t cache_place(const char *prefix, std::size_t length)
 {
-    return length == 0 ? 0 : (static_cast<unsigned char>(prefix[length - 1]) + length) & (CACHE_SIZE - 1);
+    return length == 0 ? 0 : (static_cast<unsigned char>(prefix[length - 1]) ^ length) & (CACHE_SIZE - 1);
 }
 
 // Neighbouring tags mostly have one prefix: that of the tag resolved last is tried first. True: it is the
@@ -144,9 +145,9 @@ int soap_prefix_compare(soap *ctx, const char *read, const char *asked, std::siz
 {
     const int row = xml_prefix_row(ctx, read, read_length);
     if ((ctx->mode & MODE_IGNORE_NAMESPACES) != 0)
-        return 0;
+        return SOAP_OK;
     if (is_xml_prefix(read, read_length) && is_xml_prefix(asked, asked_length) && row == TAG_ROW_UNBOUND)
-        return 0;
+        return SOAP_OK;
     if (row == TAG_ROW_UNDECLARED)
         return fail(ctx, SOAP_SYNTAX_ERROR);
     if (row < 0)
@@ -157,7 +158,7 @@ int soap_prefix_compare(soap *ctx, const char *read, const char *asked, std::siz
 int soap_tag_compare(soap *ctx, const char *read, const char *asked)
 {
     if (asked == nullptr || *asked == '\0')
-        return 0;
+        return SOAP_OK;
     if (read == nullptr)
         return SOAP_TAG_MISMATCH;
     const name_parts name = split_name(ctx, read);
@@ -168,7 +169,7 @@ int soap_tag_compare(soap *ctx, const char *read, const char *asked)
     if (!any_local && std::strcmp(name.local, asked_colon + 1) != 0)
         return SOAP_TAG_MISMATCH;
     if (asked_colon == asked)
-        return 0;
+        return SOAP_OK;
     const int error = soap_prefix_compare(ctx, read, asked, name.prefix_length,
                                           static_cast<std::size_t>(asked_colon - asked));
     return error == SOAP_NAMESPACE_ERROR ? SOAP_TAG_MISMATCH : error;

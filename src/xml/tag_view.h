@@ -9,9 +9,10 @@
 
 #include <zuv_client_pro/soap_xml.h>
 
-constexpr int TAG_ROW_UNBOUND = -1;    // the prefix is declared for a namespace that the table doesn't know
-constexpr int TAG_ROW_UNDECLARED = -2; // the prefix isn't declared: error 5 once the local name fits
-constexpr int TAG_ROW_NO_PREFIX = -3;  // no prefix, and no default namespace is declared
+constexpr int TAG_ROW_UNBOUND = -1; // the prefix is declared for a namespace that the table doesn't know
+constexpr int TAG_ROW_UNDECLARED =
+    -2;                               // the prefix isn't declared: SOAP_SYNTAX_ERROR once the local name fits
+constexpr int TAG_ROW_NO_PREFIX = -3; // no prefix, and no default namespace is declared
 
 struct tag_view {
     const char *local;          // in soap::tag, terminated; until the next tag is read

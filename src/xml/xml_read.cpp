@@ -11,9 +11,12 @@
 #include <cstring>
 #include <string_view>
 
+#include <zuv_client_pro/soap_error.h>
+
 #include "core/failure.h"
 #include "xml/attributes.h"
 #include "xml/namespace.h"
+#include "xml/root_head.h"
 
 namespace {
 
@@ -36,6 +39,7 @@ void forget_tag(soap *ctx)
 {
     ctx->peeked = 1;
     ctx->tag_resolved = false;
+    ctx->bare_declarations = 0;
     ctx->element_id[0] = '\0';
     ctx->element_href[0] = '\0';
     ctx->element_type[0] = '\0';
@@ -53,15 +57,15 @@ void forget_tag(soap *ctx)
 int pass_byte_order_mark(soap *ctx)
 {
     if (ctx->look_ahead < 0 || ctx->in_cdata != CDATA_OUTSIDE)
-        return 0;
+        return SOAP_OK;
     const std::int32_t first = soap_recv_byte(ctx);
     if (first < 0) { // the end of input
         ctx->look_ahead = XML_EOF;
-        return 0;
+        return SOAP_OK;
     }
     if (first != 0xEF && first != 0xFE && first != 0xFF) {
         ctx->look_ahead = first;
-        return 0;
+        return SOAP_OK;
     }
     const std::int32_t second = soap_recv_byte(ctx);
     if ((first == 0xFE && second == 0xFF) || (first == 0xFF && second == 0xFE))
@@ -70,7 +74,7 @@ int pass_byte_order_mark(soap *ctx)
         const std::int32_t third = soap_recv_byte(ctx);
         if (third == 0xBF) {
             ctx->mode &= ~ENCODING_MODES;
-            return 0;
+            return SOAP_OK;
         }
         // U+FEC0 and the following: pushed back as the one character that the three bytes are
         if (third == XML_EOF)
@@ -78,12 +82,12 @@ int pass_byte_order_mark(soap *ctx)
         else
             ctx->look_ahead = static_cast<std::int32_t>(
                 (0xFEC0u | (static_cast<std::uint32_t>(third) & 0x3F)) | XML_REFERENCE);
-        return 0;
+        return SOAP_OK;
     }
     if (second != XML_EOF)
         ctx->buffer_index--;
     ctx->look_ahead = first;
-    return 0;
+    return SOAP_OK;
 }
 
 // Token by token: refills, marks, comments, pushed-back tokens.
@@ -97,7 +101,7 @@ int find_start_tag_slow(soap *ctx)
         token = soap_char_next_utf8(ctx);
     while (is_blank(token));
     if (token == XML_START)
-        return 0;
+        return SOAP_OK;
     if (token == XML_EOF)
         return no_tag(ctx, end_of_input(ctx));
     token_push_back(ctx, token);
@@ -115,7 +119,7 @@ int find_start_tag(soap *ctx)
         if (end - p >= 2 && p[0] == '<') {
             if (static_cast<unsigned char>(p[1]) > '?') { // none of the marks that lead to something else
                 input_consume(ctx, p + 1);
-                return 0;
+                return SOAP_OK;
             }
             if (p[1] == '/') {
                 input_consume(ctx, p + 2);
@@ -165,7 +169,7 @@ int read_tag_name(soap *ctx)
         return no_tag(ctx, end_of_input(ctx));
     ctx->tag_length = static_cast<std::uint16_t>(xml_name_read<tag_name_stop>(ctx, ctx->tag));
     if (ctx->tag_length != 0)
-        return 0;
+        return SOAP_OK;
     return no_tag(ctx, xml_is_refused(ctx) ? ctx->error : static_cast<int>(SOAP_SYNTAX_ERROR));
 }
 
@@ -190,11 +194,11 @@ int read_tag_end(soap *ctx)
     ctx->buffer_index++;
     ctx->has_body = static_cast<std::int16_t>(byte != '/');
     if (byte != '/')
-        return 0;
+        return SOAP_OK;
     if (input_skip_blanks(ctx) == XML_EOF)
         return no_tag(ctx, end_of_input(ctx));
     ctx->buffer_index++; // the ">"
-    return 0;
+    return SOAP_OK;
 }
 
 // What the elements before this one have left: declarations of those that have ended, attributes of the last.
@@ -216,12 +220,18 @@ int read_tag_end(soap *ctx)
         ctx->has_body = 1;
         return ctx->error = 0;
     }
-    bool names_wide = false;
-    const int error = xml_attributes_read(ctx, &names_wide);
+    const bool root = root_head_stands_alone(ctx);
+    if (root && root_head_resume(ctx))
+        return ctx->error = 0;
+    const char *const start = input_here(ctx);
+    bool names_wide = false, all_taken = false;
+    const int error = xml_attributes_read(ctx, &names_wide, &all_taken);
     if (error != 0)
         return no_tag(ctx, error == SOAP_EOF ? end_of_input(ctx) : error);
     if (read_tag_end(ctx) != 0)
         return ctx->error;
+    if (root && all_taken)
+        root_head_learn(ctx, start);
     if (ctx->attributes_set != 0)
         xml_attributes_apply(ctx, names_wide);
     return ctx->error = 0;
@@ -230,11 +240,11 @@ int read_tag_end(soap *ctx)
 int enter_element(soap *ctx)
 {
     if (ctx->has_body == 0)
-        return 0;
+        return SOAP_OK;
     if (ctx->max_depth != 0 && ctx->nesting_level >= ctx->max_depth)
         return SOAP_LENGTH;
     ctx->nesting_level++;
-    return 0;
+    return SOAP_OK;
 }
 
 // The name of an end tag and its ">". 0, 5 when something else stands there, or why the input ended.
@@ -243,7 +253,7 @@ int read_end_tag_name(soap *ctx)
     ctx->tag_resolved = false;
     if (ctx->look_ahead == 0 && input_end(ctx) - input_here(ctx) >= static_cast<std::ptrdiff_t>(SHORT_NAME) &&
         take_plain_name<end_name_stop>(ctx, input_here(ctx)))
-        return 0;
+        return SOAP_OK;
     ctx->tag_length = static_cast<std::uint16_t>(xml_name_read<end_name_stop>(ctx, ctx->tag));
     const std::int32_t byte = input_skip_blanks(ctx);
     if (byte == XML_EOF)
@@ -251,7 +261,7 @@ int read_end_tag_name(soap *ctx)
     if (byte != '>')
         return SOAP_SYNTAX_ERROR;
     ctx->buffer_index++;
-    return 0;
+    return SOAP_OK;
 }
 
 // Drops content up to and including the "</" that ends the present element.
@@ -259,13 +269,13 @@ int find_end_tag(soap *ctx, std::uint64_t depth)
 {
     if (depth == 0 && ctx->look_ahead == XML_END) {
         ctx->look_ahead = 0;
-        return 0;
+        return SOAP_OK;
     }
     if (depth == 0 && ctx->look_ahead == 0 && ctx->in_cdata == CDATA_OUTSIDE) {
         const char *p = input_here(ctx);
         if (input_end(ctx) - p >= 2 && p[0] == '<' && p[1] == '/') {
             input_consume(ctx, p + 2);
-            return 0;
+            return SOAP_OK;
         }
     }
     return xml_skip_content(ctx, depth);
@@ -415,7 +425,7 @@ bool xml_leaf_in_place(soap *ctx, std::string_view *text)
 int soap_element_in_end(soap *ctx, const char *tag)
 {
     if (tag != nullptr && *tag == '-')
-        return 0;
+        return SOAP_OK;
     const bool any_name = tag == nullptr || (ctx->mode & MODE_STRICT) == 0;
     if (!any_name || !leaf_ends(ctx))
         return end_after_content(ctx, tag, any_name);
@@ -452,6 +462,8 @@ const char *soap_attr_get(soap *ctx, const char *name, int occurrence)
     const bool strict = (ctx->mode & MODE_STRICT) != 0;
     if (*name == '-')
         return "";
+    if (xml_attributes_complete(ctx) != 0)
+        return nullptr;
     if (ctx->attributes_set != 0) {
         for (const soap_attribute *p = ctx->attribute_list; p != nullptr; p = p->next) {
             if (p->visible == 0 || soap_tag_compare(ctx, p->name, name) != 0)

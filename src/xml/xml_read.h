@@ -12,9 +12,15 @@
 constexpr std::size_t SHORT_NAME = 64;
 
 // Reads the attributes after a tag's name up to the ">" or "/" that ends them, which stays unread: records
-// in the attribute table, declarations on the prefix stack. 0, -1, 5, 20 or 47. `names_wide` is set if values
+// in the attribute table, declarations on the prefix stack. Those that come first of all attributes have no
+// records until others follow; soap::bare_declarations counts them. 0, -1, 5, 20 or 47. `names_wide` is set if values
 // that are names are UTF-8 though strings are Latin-1, until they have been applied.
-int xml_attributes_read(soap *ctx, bool *names_wide);
+// `all_taken`: there were only such, whole in the buffer and with them the end of the tag.
+int xml_attributes_read(soap *ctx, bool *names_wide, bool *all_taken);
+
+// Makes attribute records of the held element's declarations, where none were needed yet: whoever looks at
+// the records themselves calls it first. 0 or 20.
+int xml_attributes_complete(soap *ctx);
 
 // Sets the context's fields from the attributes that the library itself understands, without the white space
 // around them. Clears the error.

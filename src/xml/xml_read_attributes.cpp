@@ -3,13 +3,16 @@
 // Here: the attribute loop, values of any size, and the attributes of SOAP and XSI. Elsewhere: the records
 // themselves (attributes.cpp), the tag (xml_read.cpp), the prefix stack (namespace_prefix.cpp).
 //
-// Always: an attribute costs the same however many the element has.
+// Always: an attribute costs the same however many the element has. The declarations of an element that has no
+// other attributes stand on the prefix stack alone; whoever asks for its attributes gets records made of them.
 #include <algorithm>
 #include <array>
 #include <climits>
 #include <cstring>
 #include <string_view>
+#include <utility>
 
+#include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_primitive.h>
 
 #include "xml/attributes.h"
@@ -32,7 +35,11 @@ struct attribute_order {
     soap *ctx;
     soap_attribute **end; // after the last one
 
-    explicit attribute_order(soap *context) : ctx(context), end(&context->attribute_list) {}
+    explicit attribute_order(soap *context) : ctx(context), end(&context->attribute_list)
+    {
+        while (*end != nullptr)
+            end = &(*end)->next;
+    }
 
     void put(soap_attribute *record)
     {
@@ -51,7 +58,7 @@ int store_value(soap *ctx, soap_attribute *record, const char *text, std::size_t
     std::memcpy(record->value, text, length);
     record->value[length] = '\0';
     record->visible = 2;
-    return 0;
+    return SOAP_OK;
 }
 
 // ------------------------------------------------------------------------------------------ values
@@ -102,7 +109,7 @@ template <template <bool> class Stop> int gather_value(soap *ctx)
         if (stop == input_end(ctx))
             continue;
         if (!is_special(*stop))
-            return 0;
+            return SOAP_OK;
         const int error = gather_special(ctx);
         if (error != 0)
             return error;
@@ -142,7 +149,7 @@ template <template <bool> class Stop> int read_value(soap *ctx, soap_attribute *
         *names_wide = true;
     else
         narrow_value(record);
-    return 0;
+    return SOAP_OK;
 }
 
 int read_quoted(soap *ctx, soap_attribute *record, char quote, bool *names_wide)
@@ -168,6 +175,93 @@ const char *declared_prefix(const soap_attribute *record)
     return name.size() == 5 ? record->name + 5 : record->name[5] == ':' ? record->name + 6 : nullptr;
 }
 
+// A declaration that stands whole in the buffer, as plain ASCII in quotes.
+struct plain_declaration {
+    const char *prefix, *prefix_end, *uri, *uri_end;
+};
+
+bool find_declaration(const char *here, const char *end, plain_declaration &found)
+{
+    constexpr std::string_view key = "xmlns";
+    if (end - here <= static_cast<std::ptrdiff_t>(key.size()) || !same_name(here, key.data(), key.size()))
+        return false;
+    const bool named = here[key.size()] == ':';
+    found.prefix = here + key.size() + (named ? 1 : 0);
+    found.prefix_end = named ? attribute_name_stop<true>::find(found.prefix, end) : found.prefix;
+    if (end - found.prefix_end < 3 || found.prefix_end[0] != '=' ||
+        (named && found.prefix == found.prefix_end) ||
+        found.prefix_end - here >= static_cast<std::ptrdiff_t>(SOAP_TEXT_SIZE))
+        return false;
+    const char quote = found.prefix_end[1];
+    if (quote != '"' && quote != '\'')
+        return false;
+    found.uri = found.prefix_end + 2;
+    found.uri_end =
+        quote == '"' ? quoted_stop<true>::find(found.uri, end) : apos_stop<true>::find(found.uri, end);
+    return found.uri_end != end && *found.uri_end == quote;
+}
+
+// Takes the declarations that come first of all attributes. 0, 20 or 47; `count` rises with each.
+int take_declarations(soap *ctx, int &count)
+{
+    for (plain_declaration found; count < SOAP_ATTRIBUTES_MAX; ++count) {
+        const char *here = input_here(ctx);
+        while (here != input_end(ctx) && is_blank(static_cast<unsigned char>(*here)))
+            ++here;
+        if (!find_declaration(here, input_end(ctx), found))
+            return SOAP_OK;
+        char &end = ctx->buffer[found.uri_end - ctx->buffer];
+        const char quote = std::exchange(end, '\0');
+        const soap_prefix *record =
+            xml_prefix_declare(ctx, {found.prefix, static_cast<std::size_t>(found.prefix_end - found.prefix)},
+                               {found.uri, static_cast<std::size_t>(found.uri_end - found.uri)});
+        end = quote;
+        if (record == nullptr)
+            return ctx->error;
+        input_consume(ctx, found.uri_end + 1);
+        ++ctx->bare_declarations;
+    }
+    return SOAP_OK;
+}
+
+// The end of the tag comes next and is in the buffer.
+bool ends_in_buffer(const soap *ctx)
+{
+    const char *here = input_here(ctx), *const end = input_end(ctx);
+    while (here != end && is_blank(static_cast<unsigned char>(*here)))
+        ++here;
+    return here != end && (*here == '>' || (end - here >= 2 && here[0] == '/' && here[1] == '>'));
+}
+
+// Makes attributes of the declarations that have none yet. 0 or 20.
+int show_declarations(soap *ctx, attribute_order &order)
+{
+    const soap_prefix *records[SOAP_ATTRIBUTES_MAX]; // innermost last
+    std::size_t left = ctx->bare_declarations;
+    const soap_prefix *record = ctx->prefix_list;
+    for (std::size_t i = left; i > 0; record = record->next)
+        records[--i] = record;
+    for (const soap_prefix *const *next = records; left > 0; --left) {
+        record = *next++;
+        char name[sizeof "xmlns:" + SOAP_TEXT_SIZE] = "xmlns";
+        const std::size_t prefix = record->prefix_length;
+        name[5] = ':';
+        std::memcpy(name + 6, record->prefix, prefix);
+        soap_attribute *shown = xml_attribute_record(ctx, {name, prefix != 0 ? prefix + 6 : 5});
+        if (shown == nullptr)
+            return ctx->error;
+        if (shown->visible == 0)
+            order.put(shown);
+        const char *uri =
+            record->uri != nullptr ? record->uri : xml_row_uri(ctx->local_namespaces[record->index]);
+        if (store_value(ctx, shown, uri, std::strlen(uri)) != 0)
+            return ctx->error;
+    }
+    ctx->bare_declarations = 0;
+    ctx->attributes_set = 1;
+    return SOAP_OK;
+}
+
 int read_attribute(soap *ctx, attribute_order &order, bool *names_wide)
 {
     char *name = ctx->scratch_text;
@@ -182,7 +276,7 @@ int read_attribute(soap *ctx, attribute_order &order, bool *names_wide)
         order.put(record);
     record->visible = 1; // the last of one name counts
     if (input_skip_blanks(ctx) != '=')
-        return 0;
+        return SOAP_OK;
     ctx->buffer_index++;
     const std::int32_t first = input_skip_blanks(ctx);
     if (first == XML_EOF)
@@ -194,7 +288,7 @@ int read_attribute(soap *ctx, attribute_order &order, bool *names_wide)
         return error;
     const char *prefix = declared_prefix(record);
     if (prefix == nullptr)
-        return 0;
+        return SOAP_OK;
     return soap_prefix_push_in(ctx, prefix, record->value) != nullptr ? 0 : ctx->error;
 }
 
@@ -377,20 +471,35 @@ void apply_attribute(soap *ctx, const soap_attribute *record)
 
 } // namespace
 
-int xml_attributes_read(soap *ctx, bool *names_wide)
+int xml_attributes_read(soap *ctx, bool *names_wide, bool *all_taken)
 {
     if (ctx->attribute_list != nullptr)
         xml_attributes_hide(ctx);
+    int count = 0;
+    if (take_declarations(ctx, count) != 0)
+        return ctx->error;
+    *all_taken = count != 0 && ctx->attributes_set == 0 && ends_in_buffer(ctx);
     attribute_order order(ctx);
-    for (int count = 0;; ++count) {
+    for (;; ++count) {
         const std::int32_t byte = input_skip_blanks(ctx);
         if (byte == XML_EOF || byte == '>' || byte == '/')
-            return 0;
-        const int error =
-            count < SOAP_ATTRIBUTES_MAX ? read_attribute(ctx, order, names_wide) : SOAP_SYNTAX_ERROR;
+            return SOAP_OK;
+        int error = count < SOAP_ATTRIBUTES_MAX ? 0 : SOAP_SYNTAX_ERROR;
+        if (error == 0 && ctx->bare_declarations != 0)
+            error = show_declarations(ctx, order);
+        if (error == 0)
+            error = read_attribute(ctx, order, names_wide);
         if (error != 0)
             return error;
     }
+}
+
+int xml_attributes_complete(soap *ctx)
+{
+    if (ctx->bare_declarations == 0)
+        return SOAP_OK;
+    attribute_order order(ctx);
+    return show_declarations(ctx, order);
 }
 
 void xml_attributes_apply(soap *ctx, bool names_wide)

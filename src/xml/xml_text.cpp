@@ -6,6 +6,7 @@
 // Always: text runs in stretches between two special bytes; only those go through the tokens. Gathered text
 // stands in the growing text and is copied once to managed memory.
 #include "xml/xml_text.h"
+#include "xml/xml_read.h"
 
 #include <cstring>
 
@@ -31,7 +32,7 @@ const char *plain_end(const soap *ctx, const char *here, const char *end)
 int gather_plain(soap *ctx)
 {
     if (ctx->look_ahead != 0 || ctx->in_cdata == CDATA_BRACKET_DUE || !input_ready(ctx))
-        return 0;
+        return SOAP_OK;
     const char *here = input_here(ctx);
     const char *stop = plain_end(ctx, here, input_end(ctx));
     input_consume(ctx, stop);
@@ -42,6 +43,8 @@ int gather_plain(soap *ctx)
 int gather_text(soap *ctx, text_limits &limits)
 {
     std::size_t length;
+    if (ctx->peeked != 0 && xml_attributes_complete(ctx) != 0)
+        return ctx->error;
     text_depth depth = text_take_held_tag(ctx, &length);
     ctx->label_index = 0;
     if (text_put(ctx, ctx->scratch_text, length) != 0)
@@ -126,12 +129,12 @@ const char *simple_value_by_tokens(soap *ctx)
 int text_put(soap *ctx, const char *text, std::size_t length)
 {
     if (length == 0)
-        return 0;
+        return SOAP_OK;
     if (ctx->label_size - ctx->label_index < length && soap_text_buffer_reserve(ctx, length) != 0)
         return ctx->error;
     std::memcpy(ctx->label_buffer + ctx->label_index, text, length);
     ctx->label_index += length;
-    return 0;
+    return SOAP_OK;
 }
 
 int text_put_code(soap *ctx, std::uint32_t code)

@@ -59,7 +59,7 @@ inline std::int32_t text_token(soap *ctx)
                : token;
 }
 
-// Appends to the growing text. 0 or error 20.
+// Appends to the growing text. SOAP_OK or SOAP_OUT_OF_MEMORY.
 int text_put(soap *ctx, const char *text, std::size_t length);
 
 // Appends a decoded character: as UTF-8 in a string of UTF-8; else as one byte, those above 255 as "?".
@@ -76,7 +76,7 @@ struct text_limits {
     std::size_t counted = 0; // bytes of the growing text that `count` covers
 };
 
-// Counts what was appended since the last call. 0, or error 45 when that is more than the maximum.
+// Counts what was appended since the last call. SOAP_OK or SOAP_LENGTH when that is more than the maximum.
 int text_limits_check(soap *ctx, text_limits &limits);
 
 // The same at the end of the text, against both bounds.

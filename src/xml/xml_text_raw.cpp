@@ -11,6 +11,7 @@
 #include <zuv_client_pro/soap_error.h>
 
 #include "core/failure.h"
+#include "xml/xml_read.h"
 #include "xml/xml_scan.h"
 #include "xml/xml_text.h"
 
@@ -123,14 +124,14 @@ void text_depth::tag_token(std::int32_t token)
 int text_limits_check(soap *ctx, text_limits &limits)
 {
     if (limits.maximum < 0 && limits.minimum <= 0)
-        return 0;
+        return SOAP_OK;
     if (ctx->label_index > limits.counted)
         limits.count +=
             characters(ctx, ctx->label_buffer + limits.counted, ctx->label_index - limits.counted);
     limits.counted = ctx->label_index;
     if (limits.maximum >= 0 && limits.count > static_cast<std::uint64_t>(limits.maximum))
         return fail(ctx, SOAP_LENGTH);
-    return 0;
+    return SOAP_OK;
 }
 
 int text_limits_finish(soap *ctx, text_limits &limits)
@@ -139,7 +140,7 @@ int text_limits_finish(soap *ctx, text_limits &limits)
         return ctx->error;
     if (limits.minimum > 0 && limits.count < static_cast<std::uint64_t>(limits.minimum))
         return fail(ctx, SOAP_LENGTH);
-    return 0;
+    return SOAP_OK;
 }
 
 namespace {
@@ -318,7 +319,7 @@ std::int32_t content_token(soap *ctx, std::int32_t byte, bool in_quotes, raw_sta
 int gather_plain(soap *ctx)
 {
     if (ctx->look_ahead != 0 || !input_ready(ctx))
-        return 0;
+        return SOAP_OK;
     const char *here = input_here(ctx);
     const char *stop = stretch_end<markup_stop>(ctx, here, input_end(ctx));
     input_consume(ctx, stop);
@@ -336,7 +337,7 @@ int put_content(soap *ctx, std::int32_t token)
 int resume_cdata(soap *ctx, raw_state &state)
 {
     if (ctx->in_cdata == CDATA_OUTSIDE)
-        return 0;
+        return SOAP_OK;
     if (put_text(ctx, CDATA_HEAD) != 0)
         return ctx->error;
     state = raw_state::cdata;
@@ -352,7 +353,7 @@ int resume_cdata(soap *ctx, raw_state &state)
             return ctx->error;
     }
     ctx->in_cdata = CDATA_OUTSIDE;
-    return 0;
+    return SOAP_OK;
 }
 
 int gather_construct(soap *ctx, raw_state &state, bool *end)
@@ -361,7 +362,7 @@ int gather_construct(soap *ctx, raw_state &state, bool *end)
     *end = byte == XML_EOF;
     if (*end) {
         ctx->look_ahead = XML_EOF;
-        return 0;
+        return SOAP_OK;
     }
     const int error = put_raw(ctx, state, byte);
     state = next_state(state, byte);
@@ -379,7 +380,7 @@ int gather_content(soap *ctx, text_depth &depth, raw_state &state, bool *end)
     *end = depth.ends_at(token);
     if (*end) {
         ctx->look_ahead = token;
-        return 0;
+        return SOAP_OK;
     }
     return put_content(ctx, token);
 }
@@ -389,6 +390,8 @@ int gather_content(soap *ctx, text_depth &depth, raw_state &state, bool *end)
 int text_gather_raw(soap *ctx, text_limits &limits)
 {
     std::size_t length;
+    if (ctx->peeked != 0 && xml_attributes_complete(ctx) != 0)
+        return ctx->error;
     text_depth depth = text_take_held_tag(ctx, &length);
     raw_state state = raw_state::content;
     ctx->label_index = 0;

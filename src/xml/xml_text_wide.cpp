@@ -5,6 +5,7 @@
 
 #include "core/failure.h"
 #include "core/memory.h"
+#include "xml/xml_read.h"
 #include "xml/xml_text.h"
 
 namespace {
@@ -86,6 +87,8 @@ int put_token(wide_sink &sink, std::int32_t token, bool raw)
 int gather_wide(soap *ctx, wide_sink &sink, bool raw)
 {
     std::size_t length;
+    if (ctx->peeked != 0 && xml_attributes_complete(ctx) != 0)
+        return ctx->error;
     text_depth depth = text_take_held_tag(ctx, &length);
     if (sink.put_text(ctx->scratch_text, length) != 0)
         return ctx->error;

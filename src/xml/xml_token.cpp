@@ -6,6 +6,7 @@
 // Always: one token can be pushed back in look_ahead; a construct may be cut by a refill at any byte.
 #include "xml/xml_token.h"
 
+#include <algorithm>
 #include <cstring>
 #include <string_view>
 
@@ -248,10 +249,16 @@ std::int32_t soap_pi_read(soap *ctx)
 {
     char text[INSTRUCTION_TEXT_MAX + 1];
     std::size_t kept = 0;
-    std::int32_t byte;
-    while ((byte = soap_recv_byte(ctx)) != XML_EOF && byte != '?') {
-        if (kept < INSTRUCTION_TEXT_MAX)
-            text[kept++] = static_cast<char>(byte < ' ' ? ' ' : byte);
+    std::int32_t byte = XML_EOF;
+    while (byte == XML_EOF && input_ready(ctx)) {
+        const char *const here = input_here(ctx), *const end = input_end(ctx);
+        const char *const stop = std::find(here, end, '?');
+        const auto taken = std::min(static_cast<std::size_t>(stop - here), INSTRUCTION_TEXT_MAX - kept);
+        std::transform(here, here + taken, text + kept,
+                       [](char c) { return static_cast<unsigned char>(c) < ' ' ? ' ' : c; });
+        kept += taken;
+        byte = stop != end ? '?' : XML_EOF;
+        input_consume(ctx, stop != end ? stop + 1 : end);
     }
     text[kept] = '\0';
     const std::string_view encoding = declared_encoding(text);
@@ -288,14 +295,18 @@ int xml_skip_tag(soap *ctx)
     return XML_EOF;
 }
 
+namespace {
+
 // An element begins, with content, within `depth` others that are skipped: true if it is one too many.
-static bool skips_too_deep(soap *ctx, std::uint64_t depth)
+bool skips_too_deep(soap *ctx, std::uint64_t depth)
 {
     if (ctx->max_depth == 0 || ctx->nesting_level + depth < ctx->max_depth)
         return false;
     fail(ctx, SOAP_LENGTH);
     return true;
 }
+
+} // namespace
 
 int xml_skip_content(soap *ctx, std::uint64_t depth)
 {
@@ -307,7 +318,7 @@ int xml_skip_content(soap *ctx, std::uint64_t depth)
         else if (!too_deep && skip_past(ctx, '<') != XML_EOF)
             token = xml_markup_next(ctx);
         if (token == XML_END && depth-- == 0)
-            return 0;
+            return SOAP_OK;
         if (token == XML_START) {
             token = xml_skip_tag(ctx);
             too_deep = token == 0 && skips_too_deep(ctx, depth++);

@@ -65,7 +65,7 @@ bool is_default_prefix(const soap *ctx, std::string_view prefix)
 int put_default_namespace(soap *ctx, std::string_view prefix)
 {
     if (is_default_prefix(ctx, prefix) || ctx->local_namespaces == nullptr)
-        return 0;
+        return SOAP_OK;
     for (const soap_namespace *row = ctx->local_namespaces; row->prefix != nullptr; ++row) {
         const char *uri = xml_row_uri(*row);
         if (uri == nullptr || prefix != row->prefix)
@@ -74,7 +74,7 @@ int put_default_namespace(soap *ctx, std::string_view prefix)
             return ctx->error;
         return soap_attr_write(ctx, "xmlns", uri);
     }
-    return 0;
+    return SOAP_OK;
 }
 
 bool drops_prefix(const soap *ctx, std::string_view tag)
@@ -97,7 +97,7 @@ int put_root_namespaces(soap *ctx)
     const std::size_t rows =
         has_default_namespaces(ctx) ? DEFAULT_NAMESPACE_ROWS : std::numeric_limits<std::size_t>::max();
     if (ctx->local_namespaces == nullptr)
-        return 0;
+        return SOAP_OK;
     if (has_mode(ctx, MODE_CANONICAL))
         return xml_canonical_root(ctx, rows);
     std::size_t length = 0;
@@ -112,13 +112,13 @@ int put_root_namespaces(soap *ctx)
             soap_text_write(ctx, uri, 1) || xml_put(ctx, "\""))
             return ctx->error;
     }
-    return 0;
+    return SOAP_OK;
 }
 
 int put_type(soap *ctx, const char *type)
 {
     if (type == nullptr || *type == '\0' || has_mode(ctx, MODE_NO_TYPE) || ctx->message_part == PART_HEADER)
-        return 0;
+        return SOAP_OK;
     const char *text = has_default_namespaces(ctx) ? xml_local_part(type).data() : type;
     // A type that the caller set as an attribute comes first and stays the only one.
     if (ctx->attributes_set ? soap_attr_set(ctx, "xsi:type", text, 1)
@@ -130,7 +130,7 @@ int put_type(soap *ctx, const char *type)
 int put_position(soap *ctx)
 {
     if (!ctx->null_flag || ctx->position_count < 1)
-        return 0;
+        return SOAP_OK;
     const int dimensions = std::min<int>(ctx->position_count, SOAP_POSITIONS_MAX);
     char text[SOAP_POSITIONS_MAX * 12 + 2]; // a sign, ten digits and a comma each, a bracket, the end
     char *end = text;
@@ -146,7 +146,7 @@ int put_position(soap *ctx)
 int put_must_understand(soap *ctx)
 {
     if (!ctx->must_understand)
-        return 0;
+        return SOAP_OK;
     const bool is_soap12 = ctx->soap_version == 2;
     if (ctx->actor != nullptr && *ctx->actor &&
         soap_attr_write(ctx, is_soap12 ? "SOAP-ENV:role" : "SOAP-ENV:actor", ctx->actor))
@@ -154,7 +154,7 @@ int put_must_understand(soap *ctx)
     if (soap_attr_write(ctx, "SOAP-ENV:mustUnderstand", is_soap12 ? "true" : "1"))
         return ctx->error;
     ctx->must_understand = 0;
-    return 0;
+    return SOAP_OK;
 }
 
 bool table_has_encoding_row(const soap *ctx)
@@ -174,7 +174,7 @@ int put_encoding_style(soap *ctx)
             return ctx->error;
     }
     ctx->encoding_flag = 0;
-    return 0;
+    return SOAP_OK;
 }
 
 // The visible attributes of the table, each of which becomes idle.
@@ -191,13 +191,13 @@ int put_waiting_attributes(soap *ctx)
         --ctx->attributes_set;
     }
     xml_attributes_hide(ctx);
-    return 0;
+    return SOAP_OK;
 }
 
 int write_empty(soap *ctx, const char *tag, int id, const char *type, const char *name, const char *value)
 {
     if (stands_for_none(tag))
-        return 0;
+        return SOAP_OK;
     if (soap_element_open(ctx, tag, id, type) || soap_attr_write(ctx, name, value))
         return ctx->error;
     return soap_element_attrs_close(ctx, tag);
@@ -218,10 +218,10 @@ int xml_put_attribute(soap *ctx, std::string_view name, const char *value, int e
     if (xml_put(ctx, " ") || xml_put(ctx, name))
         return ctx->error;
     if (value == nullptr)
-        return 0;
+        return SOAP_OK;
     if (xml_put(ctx, "=\"") || soap_text_write(ctx, value, escape) || xml_put(ctx, "\""))
         return ctx->error;
-    return 0;
+    return SOAP_OK;
 }
 
 int soap_attr_write(soap *ctx, const char *name, const char *value)
@@ -265,7 +265,7 @@ int soap_element_open(soap *ctx, const char *tag, int id, const char *type)
     ctx->null_flag = 0;
     ctx->position_count = 0;
     ctx->wsu_id_flag = 0;
-    return 0;
+    return SOAP_OK;
 }
 
 int soap_element_attrs_close(soap *ctx, const char *tag)
@@ -293,7 +293,7 @@ int xml_open_long(soap *ctx, const char *tag, int id, const char *type)
 int soap_element_out_begin(soap *ctx, const char *tag, int id, const char *type)
 {
     if (stands_for_none(tag))
-        return 0;
+        return SOAP_OK;
     if (id <= 0 && (type == nullptr || *type == '\0'))
         return xml_open_plain(ctx, tag, std::strlen(tag));
     return xml_open_long(ctx, tag, id, type);
@@ -337,12 +337,12 @@ int soap_element_null(soap *ctx, const char *tag, int id, const char *type)
         ctx->null_flag = 1;
         ctx->position_count = 0;
         ctx->must_understand = 0;
-        return 0;
+        return SOAP_OK;
     }
     if (!has_attributes)
         return write_empty(ctx, tag, id, type, "xsi:nil", "true");
     if (stands_for_none(tag))
-        return 0;
+        return SOAP_OK;
     return soap_element_open(ctx, tag, id, type) ? ctx->error : soap_element_attrs_close(ctx, tag);
 }
 

@@ -112,7 +112,7 @@ int use_attribute_prefixes(soap *ctx)
             soap_prefix_use(ctx, record->name))
             return ctx->error;
     }
-    return 0;
+    return SOAP_OK;
 }
 
 // Writes the name of the attribute that declares a prefix. False if the prefix is too long for it.
@@ -141,7 +141,7 @@ int declare_waiting(soap *ctx)
         if (record->index == 1 && record->uri != nullptr && declare(ctx, record))
             return ctx->error;
     }
-    return 0;
+    return SOAP_OK;
 }
 
 bool includes(const soap *ctx, std::string_view prefix)
@@ -161,7 +161,7 @@ int xml_canonical_root(soap *ctx, std::size_t rows)
         if (soap_prefix_push_out(ctx, row.prefix, uri, includes(ctx, row.prefix) ? 1 : 0))
             return ctx->error;
     }
-    return 0;
+    return SOAP_OK;
 }
 
 int xml_canonical_attributes(soap *ctx)
@@ -170,5 +170,5 @@ int xml_canonical_attributes(soap *ctx)
         return ctx->error;
     if (ctx->attributes_set > 0)
         sort_attributes(ctx);
-    return 0;
+    return SOAP_OK;
 }

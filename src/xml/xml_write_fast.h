@@ -14,6 +14,7 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "core/failure.h"
+#include "core/message_store.h"
 
 // Modes in which a start or end tag is more than its name in brackets.
 constexpr std::uint32_t XML_SPECIAL_TAGS = MODE_INDENT | MODE_DEFAULT_NAMESPACE | MODE_CANONICAL;
@@ -25,19 +26,22 @@ inline bool xml_only_counts(const soap *ctx)
            (ctx->on_send_prepare == nullptr);
 }
 
-// Room for `length` bytes in the send buffer, which count as sent; the caller fills all of it at once. Null
-// if the bytes must go through soap_send_bytes: counting, unbuffered, filtered, or not enough space in the buffer.
+// Room for `length` bytes in the send buffer or, while a message is counted, in the store, which count as sent;
+// the caller fills all of it at once. Null if the bytes must go through soap_send_bytes: counted alone,
+// unbuffered, filtered, or not enough space.
 inline char *xml_reserve(soap *ctx, std::size_t length)
 {
-    if ((ctx->mode & MODE_COUNTING) || (ctx->mode & MODE_IO_MASK) == MODE_DIRECT ||
-        (ctx->on_send_filter != nullptr) || length >= SOAP_BUFFER_SIZE - ctx->buffer_index)
+    if ((ctx->mode & MODE_COUNTING) != 0)
+        return store_reserve(ctx, length);
+    if ((ctx->mode & MODE_IO_MASK) == MODE_DIRECT || ctx->on_send_filter != nullptr ||
+        length >= SOAP_BUFFER_SIZE - ctx->buffer_index)
         return nullptr;
     char *place = ctx->buffer + ctx->buffer_index;
     ctx->buffer_index += length;
     return place;
 }
 
-// Raises the element depth for a start tag. 0, or SOAP_LENGTH past ctx->max_depth open elements.
+// Raises the element depth for a start tag. SOAP_OK or SOAP_LENGTH past ctx->max_depth open elements.
 inline int xml_enter(soap *ctx)
 {
     ++ctx->nesting_level;

@@ -234,7 +234,7 @@ template <place P>
                 return ctx->error;
         }
     }
-    return 0;
+    return SOAP_OK;
 }
 
 // Gathers the bytes of single characters.
@@ -247,7 +247,7 @@ public:
             return ctx->error;
         std::memcpy(buffer + fill, bytes.data(), bytes.size());
         fill += bytes.size();
-        return 0;
+        return SOAP_OK;
     }
     int put(std::uint32_t code)
     {

@@ -8,11 +8,18 @@
 #include <fstream>
 #include <utility>
 
+#include <zuv_client_pro/protocolProfile.h>
+#include <zuv_client_pro/soap_attachment.h>
+#include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "core/message_store.h"
+#include "exchange/request.h"
 #include "support/memory_wire.h"
 #include "support/random_objects.h"
+#include "traits_protocol.h"
+#include "traits_protocolProfile.h"
 
 using namespace random_objects;
 
@@ -225,6 +232,215 @@ TEST_F(every_class, are_valid_by_their_schemas)
     }
     EXPECT_EQ(0, result) << complaints;
     std::filesystem::remove_all(dir);
+}
+
+// ---------------------------------------------------------------------------------------------
+// Messages of a call: written once, which is the short way, or twice.
+
+// What can be told of a message that was sent.
+struct told {
+    int error;
+    std::vector<std::string> sends;
+    std::string limit, fault;
+    std::uint32_t mode;
+    int part;
+    std::uint64_t count;
+    bool operator==(const told &) const = default;
+};
+
+class requests : public every_class {
+protected:
+    static constexpr char HEAD[] = "POST / HTTP/1.1\r\n\r\n";
+
+    // As a call does it. A hook that does nothing makes it go the long way.
+    told send(bool once, const binding::class_ops &ops, const void *object, std::uint32_t mode = 0)
+    {
+        ctx.output_mode = mode;
+        ctx.on_send_prepare_begin = once ? nullptr : +[](soap *) { return 0; };
+        ctx.sends.clear();
+        ctx.socket = 900; // never used: without one a direct message is not buffered
+        ctx.encoding_style = nullptr;
+        soap_reset_call(&ctx);
+        message = {"protocol:root", &ops, object};
+        const int error = request_count(&ctx, message) || soap_send_begin(&ctx) ||
+                                  soap_send_text(&ctx, HEAD) || request_write(&ctx, message) ||
+                                  soap_send_finish(&ctx)
+                              ? ctx.error
+                              : 0;
+        message_store_wipe(&ctx);
+        ctx.socket = -1;
+        ctx.buffer_index = 0;
+        const char *const fault = ctx.fault != nullptr ? *soap_fault_string_field(&ctx) : nullptr;
+        told result = {error,
+                       ctx.sends,
+                       ctx.exceeded != nullptr ? ctx.exceeded : "",
+                       fault != nullptr ? fault : "",
+                       ctx.mode,
+                       ctx.message_part,
+                       ctx.message_count};
+        return result;
+    }
+
+    // The same both ways; true if it went the short way.
+    bool same_both_ways(const binding::class_ops &ops, const void *object, std::uint32_t mode = 0)
+    {
+        const told long_way = send(false, ops, object, mode);
+        EXPECT_EQ(0U, message.stored);
+        const told short_way = send(true, ops, object, mode);
+        EXPECT_TRUE(long_way == short_way)
+            << ops.xml_type << " mode " << std::hex << mode << std::dec << " errors " << long_way.error << " "
+            << short_way.error << " sends " << long_way.sends.size() << " " << short_way.sends.size();
+        return message.stored != 0;
+    }
+
+    const protocol__Contact *contact_with(std::size_t length)
+    {
+        name.assign(length, 'x');
+        contact.name = &name;
+        return &contact;
+    }
+
+    request_message message;
+    std::string name;
+    protocol__Contact contact;
+};
+
+TEST_F(requests, written_once_are_those_written_twice)
+{
+    const std::uint32_t modes[] = {0,
+                                   MODE_BUFFERED,
+                                   MODE_INDENT,
+                                   MODE_NIL,
+                                   MODE_NO_TYPE,
+                                   MODE_DEFAULT_NAMESPACE,
+                                   MODE_CANONICAL,
+                                   MODE_WSU_ID,
+                                   MODE_NULL_STRINGS | MODE_UTF_STRINGS | SOAP_XML_TREE};
+    each_class([&](int id, const binding::class_ops &ops) {
+        source random(&ctx, static_cast<unsigned>(id), id % 2 != 0);
+        void *object = soap_instantiate(&ctx, id, nullptr, nullptr, nullptr);
+        row_of(id)->fill(random, object, DEPTH);
+        ctx.max_depth = 40; // those that share hold cycles
+        ctx.max_message = 3 * SOAP_STORE_SIZE;
+        for (const std::uint32_t mode : modes)
+            same_both_ways(ops, object, mode);
+        const told whole = send(true, ops, object);
+        std::size_t bytes = 0;
+        for (const std::string &part : whole.sends)
+            bytes += part.size();
+        EXPECT_EQ(whole.error == 0 && bytes <= SOAP_STORE_SIZE + sizeof HEAD - 1, message.stored != 0)
+            << ops.xml_type;
+        for (ctx.send_limit = 0; ctx.send_limit < whole.sends.size(); ++ctx.send_limit)
+            same_both_ways(ops, object);
+        ctx.send_limit = std::numeric_limits<std::size_t>::max();
+        ctx.max_depth = 3;
+        same_both_ways(ops, object);
+        ctx.max_depth = SOAP_MAX_DEPTH;
+    });
+}
+
+TEST_F(requests, of_any_length_are_the_same_both_ways)
+{
+    const binding::class_ops &ops = binding::traits<protocol__Contact>::ops;
+    send(true, ops, contact_with(0));
+    const std::size_t frame = message.stored, head = sizeof HEAD - 1;
+    for (const std::size_t edge : {SOAP_BUFFER_SIZE - head, 2 * SOAP_BUFFER_SIZE - head, SOAP_STORE_SIZE})
+        for (std::size_t length = edge - frame - 40; length <= edge - frame + 40; ++length) {
+            const bool fits = frame + length <= SOAP_STORE_SIZE;
+            ASSERT_EQ(fits, same_both_ways(ops, contact_with(length))) << length;
+        }
+    for (ctx.max_message = frame - 90; ctx.max_message < frame + 12; ++ctx.max_message)
+        same_both_ways(ops, contact_with(10));
+    ctx.max_message = 0;
+    ctx.max_memory = SOAP_STORE_SIZE - 1;
+    EXPECT_FALSE(same_both_ways(ops, contact_with(10))) << "there is no memory for the store";
+    ctx.max_memory = 0;
+    name = "a\x01";
+    EXPECT_FALSE(same_both_ways(ops, &contact));
+    EXPECT_EQ(SOAP_UTF_ERROR, ctx.error);
+}
+
+// What a host derives from a class: it counts what is called of it.
+struct own_contact : protocol__Contact {
+    mutable int marked = 0, written = 0;
+    void soap_serialize(struct soap *ctx) const override
+    {
+        ++marked;
+        protocol__Contact::soap_serialize(ctx);
+    }
+    int soap_out(struct soap *ctx, const char *tag, int id, const char *type) const override
+    {
+        ++written;
+        return protocol__Contact::soap_out(ctx, tag, id, type);
+    }
+};
+
+TEST_F(requests, go_the_long_way_where_somebody_could_tell)
+{
+    const struct {
+        const char *rule;
+        void (*change)(soap &ctx);
+        std::uint32_t mode = 0;
+    } cases[] = {
+        {"a filter",
+         [](soap &c) { c.on_send_filter = [](soap *, const char **, std::size_t *) { return 0; }; }},
+        {"a hook at the start", [](soap &c) { c.on_send_prepare_begin = [](soap *) { return 0; }; }},
+        {"a hook that sees bytes",
+         [](soap &c) { c.on_send_prepare = [](soap *, const char *, std::size_t) { return 0; }; }},
+        {"a hook at the end", [](soap &c) { c.on_send_prepare_end = [](soap *) { return 0; }; }},
+        {"a hook that connects",
+         [](soap &c) { c.on_connect = [](soap *, const char *, const char *, int) { return 0; }; }},
+        {"a host's head",
+         [](soap &c) {
+             c.on_post = [](soap *, const char *, const char *, int, const char *, const char *,
+                            std::uint64_t) { return 0; };
+         }},
+        {"a host's lines",
+         [](soap &c) { c.on_header_line = [](soap *, const char *, const char *) { return 0; }; }},
+        {"an attachment",
+         [](soap &c) { soap_dime_attach(&c, nullptr, 0, "text/plain", "cid:x", 0, nullptr); }},
+        {"chunks", [](soap &) {}, MODE_CHUNKED},
+        {"stored", [](soap &) {}, MODE_STORE},
+        {"compressed", [](soap &) {}, MODE_DEFLATE},
+        {"a graph", [](soap &) {}, SOAP_XML_GRAPH},
+        {"MIME", [](soap &) {}, MODE_MIME},
+        {"DIME", [](soap &) {}, MODE_DIME},
+        {"no HTTP", [](soap &) {}, MODE_BARE_XML},
+    };
+    for (const auto &c : cases) {
+        memory_wire wire(0, c.mode);
+        soap_set_namespaces(&wire, soap_program_namespaces);
+        wire.encoding_style = nullptr;
+        soap_reset_call(&wire);
+        c.change(wire);
+        request_message asked{"protocol:root", &binding::traits<protocol__Contact>::ops, contact_with(9)};
+        EXPECT_EQ(0, request_count(&wire, asked)) << c.rule;
+        EXPECT_EQ(nullptr, wire.store) << c.rule;
+    }
+    own_contact own;
+    protocolProfile__ProfileContent profile;
+    contact_with(3);
+    profile.contact = {&contact, &own};
+    EXPECT_FALSE(same_both_ways(binding::traits<protocolProfile__ProfileContent>::ops, &profile));
+    EXPECT_EQ(2, own.marked) << "once each way";
+    EXPECT_EQ(4, own.written) << "counted and sent each way";
+}
+
+// Binary content is written in place unless it has an id or a type, which make an attachment of it.
+TEST_F(requests, with_binary_content_turn_to_attachments_as_they_did)
+{
+    unsigned char bytes[] = {1, 2, 3};
+    xsd__base64Binary binary;
+    binary.content = bytes;
+    binary.size = sizeof bytes;
+    protocol__Credentials credentials;
+    credentials.certificate = &binary;
+    const binding::class_ops &ops = binding::traits<protocol__Credentials>::ops;
+    EXPECT_TRUE(same_both_ways(ops, &credentials));
+    char type[] = "application/pkix-cert";
+    binary.type = type;
+    EXPECT_FALSE(same_both_ways(ops, &credentials));
+    EXPECT_NE(std::string::npos, ctx.sent().find(" href=\"cid:id"));
 }
 
 } // namespace

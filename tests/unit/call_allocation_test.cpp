@@ -1,5 +1,6 @@
 // call_allocation_test.cpp - every allocation of a call refused once: a code comes back, and the next call
 // works.
+#include "core/tracking.h"
 #include "support/call_wire.h"
 #include "support/testing.h"
 
@@ -181,24 +182,142 @@ TEST(allocation_failure, of_the_hosts_own_allocator_is_told_wherever_it_is_met)
     }
 }
 
+// Calls whose released objects wait for the next one, whatever the build's default.
+struct steady_calls : profile_call {
+    explicit steady_calls(std::uint64_t pool_limit = SOAP_POOL_LIMIT) { proxy.pool_limit = pool_limit; }
+
+    // Makes a call that is answered by a profile with so many contacts, and releases it. The allocations.
+    std::size_t call(std::size_t contacts)
+    {
+        std::string content = "<p:thisURI>urn:zuv:profile:with-a-name-that-needs-an-allocation</p:thisURI>"
+                              "<p:state>active</p:state><c:identity><c:type>organization</c:type>"
+                              "<c:name>a name that is too long for its place</c:name></c:identity>";
+        for (std::size_t i = 0; i < contacts; ++i)
+            content += "<c:contact><c:name>a name that is too long for its place</c:name><c:email>someone"
+                       "@workshop.example</c:email></c:contact>";
+        return call(answer_envelope("<E:Body><p:getResponse>" + content + "</p:getResponse></E:Body>"));
+    }
+    std::size_t call(const std::string &body)
+    {
+        const std::string answer = http_answer(body);
+        wire.sent.clear();
+        wire.answers.push_back(answer);
+        const std::size_t start = failing_malloc::allocations();
+        EXPECT_EQ(0, get());
+        proxy.destroy();
+        return failing_malloc::allocations() - start;
+    }
+};
+
 // Memory in use stays where it was, whatever the number of calls.
-TEST(many_calls, leave_a_proxy_as_small_as_it_was)
+TEST(many_calls, leave_a_proxy_as_small_as_it_was_and_allocate_nothing)
 {
-    profile_call calls;
-    const std::string answer = http_answer(rich_answer("get"));
+    steady_calls calls;
+    const std::string answer = rich_answer("get");
     std::size_t before = 0, per_call = 0;
     for (int i = 0; i < 20000; ++i) {
-        calls.wire.sent.clear();
-        calls.wire.answers.push_back(answer);
-        const std::size_t start = failing_malloc::allocations();
-        ASSERT_EQ(0, calls.get());
-        calls.proxy.destroy();
-        per_call = failing_malloc::allocations() - start;
+        per_call = calls.call(answer);
         if (i == 100)
             before = per_call;
     }
     EXPECT_EQ(before, per_call) << "allocations of the last call and of the hundredth";
     EXPECT_EQ(1, calls.wire.opened);
+    calls.call(3);
+    for (int i = 0; i < 500; ++i)
+        ASSERT_EQ(0U, calls.call(3)) << i;
+}
+
+TEST(released_objects, of_a_large_message_leave_the_pool_as_it_was)
+{
+#if defined(ZUV_SANITIZED)
+    GTEST_SKIP() << "AddressSanitizer's operator new isn't counted";
+#endif
+    steady_calls calls(64 << 10);
+    calls.call(1000); // makes the book-keeping as large as it gets
+    for (int i = 0; i < 3; ++i)
+        calls.call(5);
+    const std::ptrdiff_t small = failing_malloc::held();
+    for (int i = 0; i < 20; ++i) {
+        EXPECT_GT(calls.call(1000), 1000U);
+        EXPECT_LT(std::abs(failing_malloc::held() - small), 150);
+        EXPECT_LT(calls.call(5), 10U) << "what the large one took it gave back";
+    }
+    calls.proxy.pool_limit = 0;
+    calls.call(5);
+    EXPECT_LT(failing_malloc::held(), small) << "lowered, the limit holds from the next release on";
+    EXPECT_GT(calls.call(5), 20U);
+}
+
+TEST(released_objects, that_nobody_needs_any_more_go_by_and_by)
+{
+#if defined(ZUV_SANITIZED)
+    GTEST_SKIP() << "AddressSanitizer's operator new isn't counted";
+#endif
+    steady_calls calls;
+    calls.call(1);
+    calls.call(1);
+    const std::ptrdiff_t usual = failing_malloc::held();
+    calls.call(200);
+    const std::ptrdiff_t most = failing_malloc::held();
+    EXPECT_GT(most, usual + 500);
+    for (int i = 0; i < 50; ++i)
+        calls.call(1);
+    EXPECT_EQ(failing_malloc::held(), most) << "slowly";
+    for (int i = 0; i < 1000; ++i)
+        calls.call(1);
+    EXPECT_LT(failing_malloc::held() - usual, (most - usual) / 20);
+    EXPECT_EQ(0U, calls.call(1));
+}
+
+// The host may take objects out and delete them, and give objects in with a hook of its own.
+TEST(released_objects, are_blocks_of_their_own_and_a_hosts_hook_has_its_way)
+{
+    steady_calls calls;
+    static int deleted;
+    deleted = 0;
+    for (int i = 0; i < 3; ++i) {
+        calls.wire.answers = {http_answer(rich_answer("get"))};
+        ASSERT_EQ(0, calls.get());
+        std::unique_ptr<protocolProfile__ProfileContent> profile(calls.got.result);
+        std::unique_ptr<std::string> name(profile->identity->name);
+        EXPECT_EQ(0, soap_block_unlink(&calls.proxy, profile.get()));
+        EXPECT_EQ(0, soap_block_unlink(&calls.proxy, name.get()));
+        soap_instance_register(&calls.proxy, new std::string(100, 'h'), SOAP_TYPE_xsd__string, -1,
+                               [](soap_instance *instance) {
+                                   delete static_cast<std::string *>(instance->object);
+                                   ++deleted;
+                                   return 0;
+                               });
+        calls.proxy.destroy();
+        EXPECT_EQ(i + 1, deleted);
+        EXPECT_EQ(-1, soap_block_unlink(&calls.proxy, name.get()));
+        EXPECT_EQ("urn:zuv:profile:with-a-name-that-needs-an-allocation", profile->thisURI[0]);
+    }
+}
+
+// What waits in the pool holds nothing of the message, and none of it goes to a copy of the context.
+TEST(released_objects, are_wiped_and_stay_in_their_context)
+{
+    steady_calls calls;
+    const std::string secret = "a password that is too long for its place";
+    for (const bool in_vector : {false, true}) {
+        const std::string member =
+            in_vector ? "<p:thisURI>" + secret + "</p:thisURI>"
+                      : "<p:association><p:password>" + secret + "</p:password></p:association>";
+        calls.wire.answers = {
+            http_answer(answer_envelope("<E:Body><p:getResponse>" + member + "</p:getResponse></E:Body>"))};
+        ASSERT_EQ(0, calls.get());
+        const char *const bytes = in_vector ? calls.got.result->thisURI[0].data()
+                                            : calls.got.result->association[0]->password->data();
+        ASSERT_EQ(secret, bytes);
+        calls.proxy.destroy();
+        EXPECT_EQ(std::string(secret.size(), '\0'), std::string(bytes, secret.size()));
+    }
+    soap copy(calls.proxy);
+    EXPECT_EQ(copy.pool_limit, SOAP_POOL_LIMIT);
+    EXPECT_TRUE(copy.pools == nullptr || copy.pools->idle.bytes == 0);
+    const soap moved(std::move(copy));
+    EXPECT_EQ(moved.pool_limit, SOAP_POOL_LIMIT);
 }
 
 } // namespace

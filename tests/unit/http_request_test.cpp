@@ -1,6 +1,7 @@
 // http_request_test.cpp - request heads byte for byte, endpoints, and the choice of a connection.
 //
 // Elsewhere: response heads (http_response_test.cpp), the accepting side (http_service_test.cpp).
+#include <malloc.h>
 #include <sys/socket.h>
 #include <unistd.h>
 
@@ -30,15 +31,20 @@ TEST(parse_endpoint, splits_urls)
         {"soap.udp://host:9/", "host", 9, "/"},
         {"http://host:x/y", "host", 0, "/y"},
         {"http://", "", 80, "/"},
+        {"/x", "", 80, "/x"},
         {"", "", 80, "/"},
     };
     memory_wire wire;
+    char text[64]; // changed in place
     for (const auto &c : cases) {
-        soap_parse_endpoint(&wire, c.url);
-        EXPECT_STREQ(wire.endpoint, c.url);
-        EXPECT_STREQ(wire.host, c.host) << c.url;
-        EXPECT_EQ(wire.port, c.port) << c.url;
-        EXPECT_STREQ(wire.path, c.path) << c.url;
+        std::strcpy(text, c.url);
+        for (const char *const time : {"first", "again"}) { // it is remembered then
+            soap_parse_endpoint(&wire, text);
+            EXPECT_STREQ(wire.endpoint, c.url) << time;
+            EXPECT_STREQ(wire.host, c.host) << c.url << " " << time;
+            EXPECT_EQ(wire.port, c.port) << c.url << " " << time;
+            EXPECT_STREQ(wire.path, c.path) << c.url << " " << time;
+        }
     }
     soap_parse_endpoint(&wire, nullptr);
     EXPECT_STREQ(wire.endpoint, "");
@@ -182,6 +188,86 @@ TEST(request_head, is_written_line_by_line)
         EXPECT_EQ(wire.head(c.url, c.action, 42), c.head) << c.rule;
         EXPECT_EQ(wire.result, SOAP_OK) << c.rule;
     }
+}
+
+// What is remembered of the last head serves as long as nothing that it is made from has changed.
+TEST(request_head, shows_each_change_after_one_that_is_remembered)
+{
+    static char version[] = "1.1";
+    const std::string endless = "http://" + std::string(1000, 'x');
+    const struct {
+        const char *rule;
+        void (*change)(request_wire &wire);
+        const char *url = "http://host/path", *action = "urn:a";
+        std::uint64_t count = 42;
+    } cases[] = {
+        {"host", [](request_wire &) {}, "http://hosT/path"},
+        {"port", [](request_wire &) {}, "http://host:81/path"},
+        {"path", [](request_wire &) {}, "http://host/path/"},
+        {"scheme without a head", [](request_wire &) {}, "ftp://host/path"},
+        {"too long a URL", [](request_wire &) {}, endless.c_str()},
+        {"action", [](request_wire &) {}, "http://host/path", "urn:b"},
+        {"empty action", [](request_wire &) {}, "http://host/path", ""},
+        {"no action", [](request_wire &) {}, "http://host/path", nullptr},
+        {"length", [](request_wire &) {}, "http://host/path", "urn:a", 1234567},
+        {"no body", [](request_wire &) {}, "http://host/path", "urn:a", 0},
+        {"method", [](request_wire &w) { w.status = STATUS_GET; }},
+        {"file", [](request_wire &w) { w.status = STATUS_POST_FILE, w.http_content = "image/png"; }},
+        {"version of HTTP, in place", [](request_wire &) { version[2] = '0'; }},
+        {"version of SOAP", [](request_wire &w) { w.soap_version = 2; }},
+        {"version of SOAP, no body", [](request_wire &w) { w.soap_version = 2; }, "http://host/path", "", 0},
+        {"connection", [](request_wire &w) { w.keep_alive = 1; }},
+        {"TLS", [](request_wire &w) { w.tls_connection = reinterpret_cast<ssl_st *>(&w); }},
+        {"chunks", [](request_wire &w) { w.output_mode |= MODE_CHUNKED; }},
+        {"gzip", [](request_wire &w) { w.output_mode |= MODE_DEFLATE; }},
+        {"deflate", [](request_wire &w) { w.output_mode |= MODE_DEFLATE, w.zlib_out = 1; }},
+        {"DIME", [](request_wire &w) { w.output_mode |= MODE_DIME; }},
+        {"MIME", [](request_wire &w) { w.output_mode |= MODE_MIME, w.mime.boundary = version; }},
+        {"MTOM", [](request_wire &w) { w.output_mode |= MODE_MTOM; }},
+        {"credentials", [](request_wire &w) { w.auth_user = "u", w.auth_password = "p"; }},
+        {"HTTP proxy", [](request_wire &w) { w.proxy_host = "proxy"; }},
+        {"HTTP proxy with credentials", [](request_wire &w) { w.go_through_proxy(); }},
+        {"lines of the host's",
+         [](request_wire &w) { w.on_header_line = [](soap *, const char *, const char *) { return 0; }; }},
+    };
+    for (const auto &c : cases) {
+        const auto head = [&](request_wire &wire, bool changed) {
+            wire.sends.clear();
+            if (changed)
+                c.change(wire);
+            std::string text =
+                changed ? wire.head(c.url, c.action, c.count) : wire.head("http://host/path", "urn:a", 42);
+            return text + (wire.result == SOAP_OK ? "" : "refused");
+        };
+        request_wire plain, remembering, changed;
+        for (request_wire *const wire : {&plain, &remembering, &changed})
+            wire->http_version = version;
+        version[2] = '1';
+        const std::string base = head(plain, false);
+        EXPECT_EQ(base, head(remembering, false)) << c.rule;
+        ASSERT_NE(nullptr, remembering.head_memory);
+        EXPECT_EQ(base, head(remembering, false)) << c.rule << ": the same again";
+        const std::string shown = head(changed, true);
+        EXPECT_NE(base, shown) << c.rule;
+        EXPECT_EQ(shown, head(remembering, true)) << c.rule;
+        EXPECT_EQ(shown, head(remembering, true)) << c.rule << ": the changed one again";
+    }
+}
+
+TEST(request_head, with_credentials_is_not_remembered)
+{
+    request_wire wire;
+    const auto remembers = [&wire](std::string_view text) {
+        const void *const memory = wire.head_memory;
+        return memmem(memory, malloc_usable_size(wire.head_memory), text.data(), text.size()) != nullptr;
+    };
+    wire.auth_user = "Aladdin";
+    wire.auth_password = "open sesame";
+    wire.head("http://host/path", "urn:a", 42);
+    EXPECT_FALSE(remembers("QWxhZGRpbjpvcGVuIHNlc2FtZQ=="));
+    wire.auth_user = wire.auth_password = nullptr;
+    wire.head("http://host/path", "urn:a", 42);
+    EXPECT_TRUE(remembers("SOAPAction: \"urn:a\""));
 }
 
 TEST(request_head, names_the_host_by_the_connection_that_carries_it)

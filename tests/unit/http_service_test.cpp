@@ -117,8 +117,13 @@ TEST(credentials, are_wiped_when_they_are_forgotten)
         accepting_wire wire;
         c.bring(wire);
         ASSERT_STREQ(wire.auth_password, PASSWORD) << c.rule;
+        wire.pool_limit = SOAP_POOL_LIMIT; // the block waits for its next use, and
+        const char *const password = wire.auth_password;
         char freed[sizeof PASSWORD] = "never freed";
-        failing_malloc::watch_free(wire.auth_password, freed, sizeof freed);
+        failing_malloc::watch_free(password, freed, sizeof freed);
+        soap_discard_all(&wire);
+        EXPECT_EQ(std::string(password, sizeof PASSWORD), std::string(sizeof PASSWORD, '\0')) << c.rule;
+        wire.pool_limit = 0; // is freed
         soap_discard_all(&wire);
         EXPECT_EQ(std::string(freed, sizeof freed), std::string(sizeof freed, '\0')) << c.rule;
         const auto whole = [](const auto &text) { return std::string(text, sizeof text); };

@@ -99,4 +99,19 @@ TEST(stack_use, of_writing_one_level)
     });
 }
 
+TEST(stack_use, of_a_call_besides_its_proxy_object)
+{
+    const auto call = std::make_unique<profile_call>();
+    protocol__Contact contact;
+    protocolProfile__ProfileContent request;
+    request.contact = {&contact};
+    call->wire.answers = {http_answer(answer_envelope("<E:Body><p:setResponse/></E:Body>"))};
+    const std::size_t bytes = stack_used_by([&] { EXPECT_EQ(0, call->proxy.set(&request, call->held)); });
+#if defined(ZUV_SANITIZED) || !defined(__OPTIMIZE__)
+    GTEST_SKIP() << "frames are larger in this build";
+#endif
+    EXPECT_LE(bytes, SOAP_CALL_STACK_BYTES);
+    std::printf("a call: %zu bytes of stack, a proxy object: %zu bytes\n", bytes, sizeof call->proxy);
+}
+
 } // namespace

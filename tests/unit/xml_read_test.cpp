@@ -1,5 +1,10 @@
 // xml_read_test.cpp - elements on input: tags, attributes, namespaces, the envelope's frame.
+#include <random>
+
 #include "support/reader_input.h"
+#include "xml/namespace.h"
+#include "xml/namespace_scope.h"
+#include "xml/xml_read.h"
 
 using namespace reader_input;
 
@@ -10,9 +15,9 @@ int begin(soap *ctx, const char *tag)
     return soap_element_in_begin(ctx, tag, 0, nullptr);
 }
 
-std::string attributes(const soap *ctx)
+std::string attributes(soap *ctx)
 {
-    std::string text;
+    std::string text = xml_attributes_complete(ctx) == 0 ? "" : failure(ctx);
     for (const soap_attribute *p = ctx->attribute_list; p != nullptr; p = p->next) {
         if (p->visible != 0)
             text += std::string(" ") + p->name + (p->visible == 2 ? "=" + std::string(p->value) : "");
@@ -470,6 +475,106 @@ TEST(xml_read, the_envelope_settles_the_version)
         in->status = c.status;
         EXPECT_EQ(soap_envelope_in_begin(in), c.error) << c.document << " with " << c.status;
     }
+}
+
+// A root element's attributes, mostly declarations, in the forms that peers write.
+std::string random_attributes(std::mt19937 &random)
+{
+    const auto one_of = [&random](std::initializer_list<const char *> choice) {
+        return std::string(choice.begin()[random() % choice.size()]);
+    };
+    std::string text;
+    for (std::size_t left = 1 + random() % 7; left > 0; --left) {
+        const std::string quote = random() % 4 == 0 ? "'" : "\"";
+        text += one_of({" ", " ", "\n", " \t "});
+        if (random() % 12 == 0)
+            text += one_of({"a=\"1\"", "xsi:type='p:t'", "q:x=\"<>'\"", "plain", "xmlns:=\"urn:one\"",
+                            "xmlns:q", "xmlnsx=\"urn:one\"", "xmlns:p = \"urn:one\"", "xmlns:q=urn:one"});
+        else
+            text += one_of({"xmlns", "xmlns:p", "xmlns:q", "xmlns:e", "xmlns:a_name_of_more_than_eight",
+                            "xmlns:\xC3\xA9"}) +
+                    "=" + quote +
+                    one_of({"urn:one", "urn:one", "urn:two", "urn:none", "", "urn:&#x6F;ne", "urn:\xC3\xA9",
+                            " urn:one", "http://www.w3.org/2003/05/soap-envelope",
+                            "http://www.w3.org/1/soap-envelope", "http://schemas.xmlsoap.org/soap/envelope/",
+                            "http://www.w3.org/1/soap-encoding"}) +
+                    quote;
+    }
+    return text + one_of({"", "", "", " ", "/", " /", "/ "});
+}
+
+// All that a message's root element leaves in the context. `asks`: its attributes are looked at, too.
+std::string root_and_content(soap *ctx, bool asks)
+{
+    std::string text =
+        std::to_string(soap_element_head_read(ctx)) + " " + ctx->tag + (ctx->has_body ? "" : "/");
+    if (asks)
+        text += attributes(ctx);
+    for (const char *name :
+         {"x", "p:x", "q:x", "e:x", "a_name_of_more_than_eight:x", "\xC3\xA9:x", "xml:x"}) {
+        const char *const uri = soap_namespace_of(ctx, name);
+        const soap_prefix *const record = xml_prefix_find(ctx, xml_prefix_of(name));
+        text += std::string("\n") + name + " " + (uri ? uri : "(none)");
+        if (record)
+            text += " " + std::to_string(record->index) + " " + std::to_string(record->level);
+        text += " " + std::to_string(soap_tag_compare(ctx, name, "one:x"));
+    }
+    for (const soap_namespace *row = ctx->local_namespaces; row->prefix != nullptr; ++row)
+        text += std::string(" ") + (row->received ? row->received : "-");
+    for (const soap_prefix *p = ctx->prefix_list; p != nullptr; p = p->next)
+        text += std::string(" <") + p->prefix + "=" + (p->uri ? p->uri : std::to_string(p->index));
+    text += "\n" + tree(ctx);
+    return text + std::to_string(ctx->error) + " " + std::to_string(ctx->nesting_level);
+}
+
+// Taken over or read anew, a root element's declarations mean the same, whatever came before them.
+TEST(xml_read, a_root_element_like_the_last_one_is_read_as_if_it_were_the_first)
+{
+    static constexpr soap_namespace other_rows[] = {
+        {"SOAP-ENV", "http://www.w3.org/2003/05/soap-envelope", nullptr, nullptr},
+        {"SOAP-ENC", "urn:two", "http://*/soap-encoding", nullptr},
+        {"any", "urn:none", "urn:*", nullptr}, // takes what a later row calls its own
+        {"one", "urn:one", nullptr, nullptr},
+        {nullptr, nullptr, nullptr, nullptr},
+    };
+    std::mt19937 random(1);
+    for (int round = 0; round < 60; ++round) {
+        reception kept("");
+        const std::string heads[] = {random_attributes(random), random_attributes(random)};
+        for (int message = 0; message < 12; ++message) {
+            const std::string document = "<p:root" + heads[random() % 8 == 0 ? 1 : 0] +
+                                         "><p:x xmlns:q=\"urn:two\"><q:y/></p:x><x/></p:root>";
+            const std::size_t first = random() % 4 == 0 ? 1 + random() % document.size() : SOAP_BUFFER_SIZE;
+            const std::uint32_t mode = random() % 2 == 0 ? MODE_UTF_STRINGS : 0;
+            const bool asks = random() % 3 == 0;
+            const soap_namespace *table = random() % 8 == 0 ? other_rows : NAMESPACES;
+            SCOPED_TRACE(document + (table == other_rows ? " with other rows" : ""));
+            const auto begin_message = [&](reception &in, std::size_t piece) {
+                in.receive(document, piece, piece == 1 ? 1 : SOAP_BUFFER_SIZE);
+                soap_reset_call(in);
+                in->namespaces = table;
+                in->mode = mode;
+                soap_namespace_table_copy(in);
+            };
+            reception fresh(""), bytewise(""); // the latter has no declaration whole in the buffer
+            begin_message(fresh, first);
+            begin_message(bytewise, 1);
+            begin_message(kept, first);
+            const std::string expected = root_and_content(bytewise, asks);
+            EXPECT_EQ(root_and_content(fresh, asks), expected);
+            EXPECT_EQ(root_and_content(kept, asks), expected);
+        }
+    }
+    // A memory that lies is believed: the way that was compared with the long one is in use.
+    const std::string document = "<p:root xmlns:p=\"urn:one\"></p:root>";
+    reception in(document);
+    EXPECT_EQ(soap_element_head_read(in), 0);
+    soap_reset_call(in);
+    in.receive(document);
+    soap_namespace_table_copy(in);
+    in->namespace_scope->root.empty_tag = true;
+    EXPECT_EQ(soap_element_head_read(in), 0);
+    EXPECT_EQ(in->has_body, 0);
 }
 
 TEST(xml_read, every_allocation_may_fail)

@@ -7,6 +7,7 @@
 #include <libxml/xmlreader.h>
 
 #include "support/reader_input.h"
+#include "xml/xml_read.h"
 #include "xml/xml_text.h"
 
 using reader_input::reception;
@@ -73,6 +74,7 @@ bool put_start(soap *ctx, std::string &events)
     if (soap_element_in_begin(ctx, nullptr, 1, nullptr) != 0)
         return false;
     std::set<std::string> attributes;
+    EXPECT_EQ(xml_attributes_complete(ctx), 0);
     for (const soap_attribute *p = ctx->attribute_list; p != nullptr; p = p->next) {
         if (p->visible == 2)
             attributes.insert(std::string(p->name) + "=" + blanks_unified(p->value));

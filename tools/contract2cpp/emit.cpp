@@ -28,6 +28,7 @@ std::vector<emitted_file> emit_contract(const contract_model &model, const std::
     add(emit_namespace_table(model, authority));
     for (const port &port : model.ports)
         add(emit_port(port));
+    add(emit_clients(model));
     add(emit_description(model));
     return files;
 }

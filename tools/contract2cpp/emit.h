@@ -1,8 +1,8 @@
 // emit.h - the emit stage: the model to files of C++.
 //
 // Here: what the emitters share. Elsewhere: public headers of the types (emit_headers.cpp), member lists and
-// class units (emit_classes.cpp), type ids and registry (emit_types.cpp), ports (emit_ports.cpp), data for
-// the command line (emit_description.cpp).
+// class units (emit_classes.cpp), type ids and registry (emit_types.cpp), ports (emit_ports.cpp), clients of
+// the ports (emit_clients.cpp), data for the command line (emit_description.cpp).
 //
 // Always: the text depends on the model and the authority alone.
 #pragma once
@@ -32,6 +32,7 @@ emitted_file emit_class_list(const contract_model &model);
 emitted_file emit_registry_tables(const contract_model &model);
 std::vector<emitted_file> emit_namespace_table(const contract_model &model, const std::string &authority);
 std::vector<emitted_file> emit_port(const port &port);
+std::vector<emitted_file> emit_clients(const contract_model &model);
 std::vector<emitted_file> emit_description(const contract_model &model);
 
 // Writes a file below a directory, which is created if needed. contract_error if that fails.

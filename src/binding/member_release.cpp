@@ -1,0 +1,83 @@
+// member_release.cpp - see member_release.h; and what becomes of a released object as a whole.
+#include "binding/member_release.h"
+
+#include <cstring>
+#include <new>
+#include <utility>
+
+#include <zuv_client_pro/soap_memory.h>
+#include <zuv_client_pro/soap_registry.h>
+
+#include "binding/registry.h"
+#include "core/instance_pool.h"
+
+namespace binding {
+
+namespace {
+
+constexpr int TEXT_TYPE_ID = 8;
+static_assert(TYPE_ID_MAX < IDLE_TYPES && TEXT_TYPE_ID != IDLE_SHELLS);
+
+std::size_t allocated(const std::string &text)
+{
+    static const std::size_t in_place = std::string().capacity();
+    return text.capacity() > in_place ? text.capacity() + 1 : 0;
+}
+
+// An empty text to take another's memory; null if memory runs out.
+soap_instance *empty_text(soap *ctx)
+{
+    soap_instance *shell = idle_take(ctx, IDLE_SHELLS);
+    if (shell != nullptr)
+        return shell;
+    auto *text = new (std::nothrow) std::string;
+    shell = text != nullptr ? idle_record(ctx) : nullptr;
+    if (shell == nullptr)
+        delete text;
+    else
+        *shell = {nullptr, text, TEXT_TYPE_ID, -1, soap_delete_object};
+    return shell;
+}
+
+} // namespace
+
+std::size_t release_text(std::string &text)
+{
+    // What a message held, passwords too, is not to be found in memory that waits.
+    std::memset(text.data(), 0, text.size());
+    text.clear();
+    return allocated(text);
+}
+
+void release_texts(soap *owner, std::vector<std::string> &texts)
+{
+    for (std::size_t i = texts.size(); i-- > 0;) {
+        std::string &text = texts[i];
+        const std::size_t bytes = sizeof text + allocated(text);
+        if (bytes == sizeof text || !idle_has_room(owner, TEXT_TYPE_ID, bytes))
+            continue;
+        soap_instance *shell = empty_text(owner);
+        if (shell == nullptr)
+            return;
+        release_text(text);
+        static_cast<std::string *>(shell->object)->swap(text);
+        idle_give(owner, TEXT_TYPE_ID, shell, bytes);
+    }
+}
+
+std::size_t instance_recycle(soap *ctx, soap_instance *instance)
+{
+    if (instance->delete_hook != soap_delete_object)
+        return 0;
+    const type_entry *entry = type_entry_of(instance->type_id);
+    if (entry == nullptr)
+        return 0;
+    if (entry->kind == type_kind::text) {
+        auto &text = *static_cast<std::string *>(instance->object);
+        const std::size_t bytes = sizeof text + allocated(text);
+        return idle_has_room(ctx, TEXT_TYPE_ID, bytes) ? sizeof text + release_text(text) : 0;
+    }
+    return entry->kind == type_kind::object ? entry->ops->recycle(instance->object, ctx) : 0;
+}
+
+} // namespace binding

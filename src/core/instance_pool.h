@@ -1,0 +1,76 @@
+// instance_pool.h - released objects and blocks that wait for the next message, so that a steady caller takes
+// nothing from malloc.
+//
+// Here: what waits, its bound, their slow decay. Elsewhere: which objects can wait and how they are emptied
+// (soap_upcalls::recycle), managed blocks (managed_blocks.cpp).
+//
+// Always: what waits is a single object or block of malloc of its own, as it was made, so that a host may
+// take it out again and end it by the ordinary means. All that waits holds at most soap::pool_limit bytes and
+// belongs to one context. A message that holds more than that gives the pool back what it took, and no more.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+
+#include <zuv_client_pro/soap.h>
+
+#include "core/limits.h"
+#include "core/tracking.h"
+
+// A place for empty texts, whose memory has gone to a text in a vector: no object has this type.
+constexpr int IDLE_SHELLS = 0;
+
+// Before objects or blocks are released: how much of them may wait.
+void idle_release_begin(soap *ctx);
+// After all objects were released.
+void idle_release_end(soap *ctx);
+
+// True if an object of the type that holds so many bytes may wait.
+inline bool idle_has_room(const soap *ctx, int type_id, std::size_t bytes)
+{
+    return ctx->pools != nullptr && idle_has_room(ctx->pools->idle, ctx->pools->idle.objects[type_id], bytes);
+}
+
+// Lets an emptied object wait among those of the type; idle_has_room told that it may.
+inline void idle_give(soap *ctx, int type_id, soap_instance *instance, std::size_t bytes)
+{
+    idle_pool &idle = ctx->pools->idle;
+    instance->array_size = static_cast<std::int32_t>(bytes);
+    idle.objects[type_id].push(instance, idle.large);
+    idle.used[type_id / 64] |= std::uint64_t{1} << type_id % 64;
+    idle.bytes += bytes;
+}
+
+// The object of this type that was released last; null if none waits. It is in no list of the context.
+inline soap_instance *idle_take(soap *ctx, int type_id)
+{
+    soap_memory_pools *pools = ctx->pools;
+    if (pools == nullptr || pools->idle.objects[type_id].first == nullptr)
+        return nullptr;
+    soap_instance *instance = pools->idle.objects[type_id].pop();
+    pools->idle.bytes -= static_cast<std::size_t>(instance->array_size);
+    instance->array_size = -1;
+    return instance;
+}
+
+// A record in no list, with undefined contents; null if memory runs out.
+soap_instance *idle_record(soap *ctx);
+
+// idle_take, and the object is entered in the context's list of instances.
+inline soap_instance *instance_reuse(soap *ctx, int type_id)
+{
+    soap_instance *instance = idle_take(ctx, type_id);
+    if (instance == nullptr)
+        return nullptr;
+    instance->next = ctx->instance_list;
+    ctx->instance_list = instance;
+    memory_charge(ctx, sizeof *instance);
+    return instance;
+}
+
+// Destroys and frees all that waits.
+void idle_drop(soap *ctx);
+
+// In managed_blocks.cpp: the same for blocks alone, and half of those that nobody needed lately.
+void idle_blocks_drop(soap *ctx);
+void idle_blocks_thin(soap *ctx);
