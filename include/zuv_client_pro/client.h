@@ -165,6 +165,8 @@ private:
 // of `endpoint` and `settings`.
 class ZUV_CLASS client {
 public:
+    client(const client &) = delete;
+    client &operator=(const client &) = delete;
     // Takes over settings and connection. `other` can't call any more: its calls fail with SOAP_USER_ERROR.
     //   other    the client to move
     //   returns  this client

@@ -21,8 +21,8 @@
 #include <zuv_client_pro/soap.h>
 #include <zuv_client_pro/soap_envelope.h>
 
-constexpr std::size_t SOAP_CONTEXT_BYTES_MAX = 170 * 1024; // bytes; more than sizeof of any proxy class
-constexpr std::size_t SOAP_CALL_STACK_BYTES = 64 * 1024;   // bytes
+constexpr std::size_t SOAP_CONTEXT_BYTES_MAX = 174080; // bytes; more than sizeof of any proxy class
+constexpr std::size_t SOAP_CALL_STACK_BYTES = 65536;   // bytes
 
 // Members of a proxy class P. All may be called between calls only.
 //   endpoint

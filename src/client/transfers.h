@@ -50,7 +50,7 @@ private:
     int attach(soap *ctx, const part &what, bool in_record);
     void *choose(soap *ctx, const char *id, const char *type, const char *description);
     void *recognised(soap *ctx, void *handle);
-    void set_callbacks(soap *ctx);
+    static void set_callbacks(soap *ctx);
     static std::size_t read_piece(soap *ctx, void *handle, char *buffer, std::size_t length);
     static int write_piece(soap *ctx, void *handle, const char *data, std::size_t length);
     static void end_incoming(soap *ctx, void *handle, soap_attachment *record);

