@@ -50,19 +50,21 @@ std::size_t engine_run::give(soap *ctx, char *buffer, std::size_t length)
     return length;
 }
 
-std::size_t engine_run::write(const void *object)
+std::size_t engine_run::write(const void *object, std::uint32_t way)
 {
     sent = 0;
     encoding_style = nullptr;
+    output_mode = way;
     soap_reset_call(this);
     request_message message{element, &ops, object};
-    if (request_count(this, message) || !(mode & MODE_COUNTING))
+    if (request_count(this, message))
         return 0;
+    const bool counts = (mode & MODE_COUNTING) != 0;
     const std::size_t counted = static_cast<std::size_t>(soap_message_length(this));
     if (soap_send_begin(this) || request_write(this, message) || soap_send_finish(this))
         return 0;
     message_store_wipe(this);
-    return sent == counted ? sent : 0;
+    return counts && sent != counted ? 0 : sent;
 }
 
 std::string engine_run::written(const void *object)

@@ -16,8 +16,9 @@ public:
     engine_run();
     engine_run(const binding::class_ops &object_class, const char *element_name);
 
-    // Marks, counts and sends a message with the object. The bytes sent; 0 on a failure.
-    std::size_t write(const void *object);
+    // Marks, counts and sends a message with the object. `way`: MODE_BUFFERED, MODE_CHUNKED or MODE_STORE. The
+    // bytes sent, those of heads among them; 0 on a failure.
+    std::size_t write(const void *object, std::uint32_t way = MODE_BUFFERED);
 
     // The same, with the bytes kept.
     std::string written(const void *object);

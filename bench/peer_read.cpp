@@ -241,18 +241,43 @@ void bind(const pugi::xml_node &node, report &target)
     }
 }
 
-} // namespace
+void bind(const pugi::xml_node &node, profile &target)
+{
+    for (const pugi::xml_node &child : node) {
+        const char *name = local_name(child.name());
+        if (is(name, "thisURI"))
+            bind(child, target.this_uri);
+        else if (is(name, "state"))
+            target.state = code_of(profile_states, child.child_value());
+        else if (is(name, "identity"))
+            bind(child, target.owner);
+        else if (is(name, "contact"))
+            bind(child, target.contacts);
+    }
+}
 
-bool read(const std::string &bytes, report &target)
+template <class T> bool parse(const std::string &bytes, T &target)
 {
     pugi::xml_document document;
     if (!document.load_buffer(bytes.data(), bytes.size()))
         return false;
-    const pugi::xml_node root = document.child("SOAP-ENV:Envelope").child("SOAP-ENV:Body").first_child();
-    if (!root)
+    const pugi::xml_node body = document.first_child().first_child();
+    const pugi::xml_node root = body.first_child();
+    if (!root || !is(local_name(body.name()), "Body"))
         return false;
     bind(root, target);
     return true;
+}
+
+} // namespace
+
+bool read(const std::string &bytes, report &target)
+{
+    return parse(bytes, target);
+}
+bool read(const std::string &bytes, profile &target)
+{
+    return parse(bytes, target);
 }
 
 } // namespace peer

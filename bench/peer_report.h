@@ -73,6 +73,13 @@ struct report {
     std::vector<report> nested;
 };
 
+struct profile {
+    std::vector<std::string> this_uri;
+    int state = -1;
+    std::optional<identity> owner;
+    std::vector<contact> contacts;
+};
+
 struct words {
     const char *const *list;
     int count;
@@ -88,6 +95,7 @@ PEER_WORDS(address_types, "primary", "shipping", "billing", "service", "other");
 PEER_WORDS(contact_preferences, "mail", "voice", "pager", "fax", "email", "instantMessage");
 PEER_WORDS(report_states, "open", "processing", "complete", "closed", "cancelled", "error", "submitted",
            "rejected");
+PEER_WORDS(profile_states, "active", "inactive", "inactive.suspended", "inactive.revoked", "closed");
 PEER_WORDS(problem_types, "abnormalTermination", "errorIndication", "dysfunction", "performance", "overrun",
            "intermittent", "temporary", "permanent", "other");
 PEER_WORDS(impacts, "systemUnavailable", "systemImpaired", "serviceUnavailable", "serviceImpaired", "other");
@@ -100,5 +108,6 @@ PEER_WORDS(results, "noChange", "problemChanged", "problemNotResolved", "problem
 
 // Parses with pugixml's DOM and binds. False if it is no document of this kind.
 bool read(const std::string &bytes, report &target);
+bool read(const std::string &bytes, profile &target);
 
 } // namespace peer

@@ -212,6 +212,16 @@ template <class Sink> void put(Sink &sink, std::string_view tag, const report &v
     sink.end(tag);
 }
 
+template <class Sink> void put(Sink &sink, std::string_view tag, const profile &value)
+{
+    sink.start(tag);
+    put(sink, "protocolProfile:thisURI", value.this_uri);
+    put(sink, "protocolProfile:state", value.state, profile_states);
+    put(sink, PEER_P "identity", value.owner);
+    put(sink, PEER_P "contact", value.contacts);
+    sink.end(tag);
+}
+
 #undef PEER_P
 #undef PEER_PR
 

@@ -5,6 +5,8 @@
 
 #include <pugixml.hpp>
 
+#include "sample_profile.h"
+
 namespace call_bench {
 
 namespace {
@@ -68,22 +70,8 @@ contact bound_contact(const pugi::xml_node &node)
 
 std::string answer_body()
 {
-    std::string body =
-        "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<E:Envelope"
-        " xmlns:E=\"http://schemas.xmlsoap.org/soap/envelope/\""
-        " xmlns:c=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0\""
-        " xmlns:p=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0/Profile\"><E:Body><p:createResponse>"
-        "<c:thisURI>urn:zuv:profile:9b2d9d5e-6b0c-4d0f-9e62-0c4f5a1c7d11</c:thisURI><p:state>active</"
-        "p:state>" +
-        element("identity", element("type", "organization") + element("name", "Zo\xC3\xAB &amp; company"));
-    for (const char *const who : {"one", "two", "three", "four", "five", "six"})
-        body += element("contact",
-                        element("name", std::string("Contact number ") + who) +
-                            element("organization", "Workshop") + element("role", "maintainer") +
-                            element("address", element("city", "Graz") + element("country", "Austria") +
-                                                   element("postalCode", "8010")) +
-                            element("email", std::string(who) + "@workshop.example"));
-    return body + "</p:createResponse></E:Body></E:Envelope>\r\n";
+    sample_profile sample;
+    return profile_answer(sample);
 }
 
 std::string answer()
@@ -114,7 +102,7 @@ bool bind(char *body, std::size_t length, profile &into)
                 if (std::strcmp(local_name(part), "name") == 0)
                     into.name = part.text().get();
     }
-    return into.contacts.size() == 6;
+    return into.contacts.size() == CONTACTS;
 }
 
 std::string request_body(const order &what)

@@ -63,7 +63,7 @@ public:
         __protocolProfile__createResponse response{};
         proxy_.destroy();
         const int code = proxy_.create(&request, response);
-        expect(code == 0 && response.result && response.result->contact.size() == 6, "library");
+        expect(code == 0 && response.result && response.result->contact.size() == CONTACTS, "library");
     }
     // The bytes that a call sends.
     std::string sent()
