@@ -5,7 +5,7 @@ file(GLOB ZUV_CLI_SOURCES CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/cli/*.cpp)
 add_executable(zuv ${ZUV_CLI_SOURCES} ${ZUV_GENERATED_DIR}/tools/contract_description.cpp)
 target_include_directories(zuv PRIVATE ${PROJECT_SOURCE_DIR}/cli ${ZUV_GENERATED_DIR}/tools)
 target_compile_definitions(zuv PRIVATE ZUV_VERSION="${PROJECT_VERSION}")
-target_link_libraries(zuv PRIVATE zuv_objects CLI11::CLI11 nlohmann_json::nlohmann_json pugixml::pugixml zuv_flags
+target_link_libraries(zuv PRIVATE ${ZUV_PROGRAM_LIBRARY} CLI11::CLI11 nlohmann_json::nlohmann_json pugixml::pugixml zuv_flags
     zuv_hardening)
 add_dependencies(zuv zuv_generated)
 

@@ -1,12 +1,20 @@
 # Generated code: builds contract2cpp, and runs it over the contract while building.
-find_package(pugixml REQUIRED)
-file(GLOB CONTRACT2CPP_SOURCES CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/tools/contract2cpp/*.cpp)
-list(REMOVE_ITEM CONTRACT2CPP_SOURCES ${PROJECT_SOURCE_DIR}/tools/contract2cpp/main.cpp)
-add_library(contract_translator STATIC ${CONTRACT2CPP_SOURCES})
-target_include_directories(contract_translator PUBLIC ${PROJECT_SOURCE_DIR}/tools/contract2cpp)
-target_link_libraries(contract_translator PUBLIC pugixml::pugixml PRIVATE zuv_flags)
-add_executable(contract2cpp ${PROJECT_SOURCE_DIR}/tools/contract2cpp/main.cpp)
-target_link_libraries(contract2cpp PRIVATE contract_translator zuv_flags)
+if(ZUV_CONTRACT2CPP)
+    add_executable(contract2cpp IMPORTED)
+    set_target_properties(contract2cpp PROPERTIES IMPORTED_LOCATION ${ZUV_CONTRACT2CPP})
+elseif(CMAKE_CROSSCOMPILING AND NOT CMAKE_CROSSCOMPILING_EMULATOR)
+    message(FATAL_ERROR "contract2cpp runs while building: build it for this machine (cmake --build ... --target contract2cpp), "
+        "and name it by -DZUV_CONTRACT2CPP=FILE")
+else()
+    find_package(pugixml REQUIRED)
+    file(GLOB CONTRACT2CPP_SOURCES CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/tools/contract2cpp/*.cpp)
+    list(REMOVE_ITEM CONTRACT2CPP_SOURCES ${PROJECT_SOURCE_DIR}/tools/contract2cpp/main.cpp)
+    add_library(contract_translator STATIC ${CONTRACT2CPP_SOURCES})
+    target_include_directories(contract_translator PUBLIC ${PROJECT_SOURCE_DIR}/tools/contract2cpp)
+    target_link_libraries(contract_translator PUBLIC pugixml::pugixml PRIVATE zuv_flags)
+    add_executable(contract2cpp ${PROJECT_SOURCE_DIR}/tools/contract2cpp/main.cpp)
+    target_link_libraries(contract2cpp PRIVATE contract_translator zuv_flags)
+endif()
 
 # Translates the contract in `schema` while building, below `out`: public headers into `headers`, sources and private headers
 # into `sources`, and into out/tools what the command line is made from. Which files these are is in outputs.txt next to the

@@ -1,6 +1,12 @@
-# Options of the build, and the flags that every target of the project is compiled with.
+# Options of the build, and the flags that every target of the project is compiled with. Within another project
+# (add_subdirectory) only the library is built, and that project's own settings stay.
 set(ZUV_AUTHORITY "http://www.zuv.example" CACHE STRING "Authority of the service namespaces")
-option(ZUV_BUILD_TESTS "Build the test suite" ON)
+option(ZUV_BUILD_TESTS "Build the test suite; needs the programs" ${PROJECT_IS_TOP_LEVEL})
+option(ZUV_BUILD_PROGRAMS "Build zuv-service, zuv and the examples; needs SQLite, CLI11, nlohmann-json and pugixml"
+    ${PROJECT_IS_TOP_LEVEL})
+option(ZUV_INSTALL "Offer what `cmake --install` lays down" ${PROJECT_IS_TOP_LEVEL})
+option(ZUV_WERROR "Warnings are errors, as in the presets" OFF)
+set(ZUV_CONTRACT2CPP "" CACHE FILEPATH "contract2cpp for the machine that builds, for a cross build; empty: it is built")
 option(ZUV_BUILD_BENCH "Build the benchmarks" OFF)
 option(ZUV_SANITIZE "Build with AddressSanitizer and UndefinedBehaviorSanitizer" OFF)
 option(ZUV_THREADS "Build with ThreadSanitizer" OFF)
@@ -8,8 +14,14 @@ option(ZUV_COVERAGE "Build with coverage counters" OFF)
 option(ZUV_SHARED_OBJECTS "Let the tests load src/ as a shared object, for script/mutants and script/torture" OFF)
 option(ZUV_FUZZ "Build the libFuzzer targets (needs clang)" OFF)
 
-if(NOT CMAKE_BUILD_TYPE)
-    set(CMAKE_BUILD_TYPE Release CACHE STRING "Build type" FORCE)
+if((ZUV_BUILD_TESTS OR ZUV_BUILD_BENCH) AND NOT ZUV_BUILD_PROGRAMS)
+    message(FATAL_ERROR "ZUV_BUILD_TESTS and ZUV_BUILD_BENCH need ZUV_BUILD_PROGRAMS")
+endif()
+if(PROJECT_IS_TOP_LEVEL)
+    if(NOT CMAKE_BUILD_TYPE)
+        set(CMAKE_BUILD_TYPE Release CACHE STRING "Build type" FORCE)
+    endif()
+    set(CMAKE_CXX_FLAGS_RELEASE "-O2 -DNDEBUG")
 endif()
 set(CMAKE_CXX_STANDARD 20)
 set(CMAKE_CXX_STANDARD_REQUIRED ON)
@@ -18,7 +30,7 @@ set(CMAKE_POSITION_INDEPENDENT_CODE ON)
 set(CMAKE_CXX_VISIBILITY_PRESET hidden)
 set(CMAKE_VISIBILITY_INLINES_HIDDEN ON)
 set(CMAKE_EXPORT_COMPILE_COMMANDS ON)
-set(CMAKE_CXX_FLAGS_RELEASE "-O2 -DNDEBUG")
+set(CMAKE_BUILD_RPATH_USE_ORIGIN ON) # a program is the same in whatever folder it was built
 if(ZUV_SHARED_OBJECTS) # private names are found across its border, and so are the calls that a test replaces
     set(CMAKE_CXX_VISIBILITY_PRESET default)
     set(CMAKE_VISIBILITY_INLINES_HIDDEN OFF)
@@ -30,8 +42,8 @@ find_package(ZLIB REQUIRED)
 find_package(Threads REQUIRED)
 
 add_library(zuv_flags INTERFACE)
-target_compile_options(zuv_flags INTERFACE -Wall -Wextra -Wpedantic -Wshadow -Wconversion -Werror
-    $<$<CXX_COMPILER_ID:Clang>:-Wno-sign-conversion>)
+target_compile_options(zuv_flags INTERFACE -Wall -Wextra -Wpedantic -Wshadow -Wconversion
+    $<$<BOOL:${ZUV_WERROR}>:-Werror> $<$<CXX_COMPILER_ID:Clang>:-Wno-sign-conversion>)
 if(ZUV_SANITIZE)
     add_compile_options(-fsanitize=address,undefined -fno-sanitize-recover=all -fno-omit-frame-pointer -g)
     add_link_options(-fsanitize=address,undefined)

@@ -21,12 +21,21 @@ add_test(NAME public_headers COMMAND sh ${PACKAGE_TESTS}/public_headers.sh ${PRO
 add_test(NAME package_make COMMAND ${CMAKE_CPACK_COMMAND} --config ${PROJECT_BINARY_DIR}/CPackConfig.cmake -G DEB
     -B ${TEST_PACKAGES})
 set_tests_properties(package_make PROPERTIES FIXTURES_SETUP packages TIMEOUT 120)
+add_test(NAME build_ways COMMAND sh ${PACKAGE_TESTS}/build_ways.sh ${PROJECT_SOURCE_DIR} $<TARGET_FILE:contract2cpp>
+    ${PROJECT_BINARY_DIR}/package_tests/ways)
+set_tests_properties(build_ways PROPERTIES LABELS package TIMEOUT 300)
 foreach(way cmake pkg-config)
     add_test(NAME package_host_${way} COMMAND sh ${PACKAGE_TESTS}/extracted.sh ${way} ${TEST_PACKAGES}
         ${PROJECT_BINARY_DIR}/package_tests/${way})
 endforeach()
 add_test(NAME package_clean_root COMMAND bash ${PACKAGE_TESTS}/clean_root.sh ${TEST_PACKAGES}
     ${PROJECT_BINARY_DIR}/package_tests/clean_root)
+if(EXISTS /usr/bin/lintian)
+    file(WRITE ${PROJECT_BINARY_DIR}/package_tests/lintian.sh
+        "exec lintian --allow-root --fail-on error,warning --tag-display-limit 0 ${TEST_PACKAGES}/*.deb\n")
+    add_test(NAME package_lintian COMMAND sh ${PROJECT_BINARY_DIR}/package_tests/lintian.sh)
+    set_tests_properties(package_lintian PROPERTIES FIXTURES_REQUIRED packages LABELS package TIMEOUT 300)
+endif()
 add_test(NAME package_readme COMMAND /usr/bin/python3 -B ${PACKAGE_TESTS}/readme_test.py ${PROJECT_SOURCE_DIR}
     ${PROJECT_BINARY_DIR} ${TEST_PACKAGES})
 set_tests_properties(package_host_cmake package_host_pkg-config package_clean_root package_readme PROPERTIES

@@ -11,6 +11,7 @@ set(CPACK_DEB_COMPONENT_INSTALL ON)
 set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
 set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS ON)
 set(CPACK_DEBIAN_PACKAGE_GENERATE_SHLIBS ON)
+set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS_PRIVATE_DIRS ${PROJECT_BINARY_DIR})
 set(CPACK_DEBIAN_PACKAGE_CONTROL_STRICT_PERMISSION ON)
 
 # The library leaves OpenSSL's and zlib's symbols to the process, so shlibdeps doesn't see them.
@@ -31,9 +32,11 @@ set(CPACK_COMPONENT_DEVELOPMENT_DESCRIPTION "SOAP client of a customer-care serv
 
 set(CPACK_DEBIAN_TOOLS_PACKAGE_NAME zuv-tools)
 set(CPACK_DEBIAN_TOOLS_PACKAGE_SECTION net)
+set(CPACK_DEBIAN_TOOLS_PACKAGE_DEPENDS "libzuv-client-pro${PROJECT_VERSION} (= ${PROJECT_VERSION})")
 set(CPACK_COMPONENT_TOOLS_DESCRIPTION "SOAP client of a customer-care service: programs
- zuv-service, a reference service with documents in SQLite, to develop and test
- hosts against; zuv, the command line, which calls services, checks documents and
- shows traces.")
+ zuv-service, a reference service with documents in SQLite, to develop and
+ test hosts against; zuv, the command line, which calls services, checks
+ documents and shows traces.")
+include(${PROJECT_SOURCE_DIR}/cmake/package_documents.cmake)
 set(CMAKE_SKIP_INSTALL_ALL_DEPENDENCY ON) # what is missing is built by whoever packages
 include(CPack)

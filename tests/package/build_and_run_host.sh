@@ -12,7 +12,8 @@ mkdir -p "$work"
 
 case $way in
 cmake)
-    cmake -S "$here/host" -B "$work" -DCMAKE_PREFIX_PATH="$prefix" -DEXAMPLE="$example" >"$work/cmake.log" ||
+    cmake -S "$here/host" -B "$work" -DCMAKE_PREFIX_PATH="$prefix" -DEXAMPLE="$example" \
+        -DCMAKE_EXE_LINKER_FLAGS="-fuse-ld=gold -Wl,--as-needed" >"$work/cmake.log" ||
         { cat "$work/cmake.log"; exit 1; }
     cmake --build "$work" --parallel 2
     ;;
@@ -23,6 +24,11 @@ pkg-config)
         # shellcheck disable=SC2046 # the flags are words
         g++ -std=c++17 -Wall -Wextra -Wpedantic -Werror $(pkg-config --cflags zuv_client_pro) "$source" \
             -o "$work/$name" $(pkg-config --libs zuv_client_pro)
+    done
+    for linker in bfd gold lld; do # which differ in what they make of a library that nothing seems to need
+        command -v "ld.$linker" >/dev/null || continue
+        g++ -std=c++17 $(pkg-config --cflags zuv_client_pro) -fuse-ld=$linker -Wl,--as-needed "$here/host/host.cpp" \
+            -o "$work/host.$linker" $(pkg-config --libs zuv_client_pro)
     done
     ;;
 *) echo "build_and_run_host.sh: no way '$way'" >&2; exit 2 ;;
@@ -38,5 +44,7 @@ service=$!
 trap 'kill $service 2>/dev/null; wait $service 2>/dev/null || true' EXIT
 read -r listening <said
 endpoint="${listening#listening on }/zuv/v1.0/services/Profile"
-./host "$endpoint"
+for host in ./host*; do
+    "$host" "$endpoint"
+done
 ./example "$endpoint"
