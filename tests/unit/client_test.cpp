@@ -422,7 +422,7 @@ TEST_F(client_reports, and_texts_tell_what_ended_a_call)
     }
 }
 
-soap *signalled; // what the handler cancels
+std::atomic<soap *> signalled; // what is cancelled; armed before it stands here
 
 TEST_F(client_reports, of_calls_that_are_cancelled_wherever_they_wait)
 {
@@ -472,11 +472,14 @@ TEST_F(client_reports, of_calls_that_are_cancelled_wherever_they_wait)
     for (const auto &row : rows) {
         SCOPED_TRACE(row.rule);
         const pthread_t caller = pthread_self();
+        std::atomic<bool> told = false;
         const auto cancel = [&] {
             if (row.by_signal)
                 pthread_kill(caller, SIGUSR1);
             else
                 EXPECT_TRUE(soap_cancel(signalled));
+            told = true;
+            told.notify_one();
         };
         const scripted::server peer([&](scripted::line &end) { row.first(end, cancel); }, row.tls);
         std::string endpoint = peer.endpoint();
@@ -486,12 +489,13 @@ TEST_F(client_reports, of_calls_that_are_cancelled_wherever_they_wait)
         wanted.connect_limit = wanted.send_limit = wanted.recv_limit = wanted.total_limit = 0s;
         wanted.retry = {2, 60s, 60s};
         zuv::profile_client client(endpoint, wanted);
+        ASSERT_EQ(soap_cancel_arm(client.context()), SOAP_OK);
         signalled = client.context();
-        ASSERT_EQ(soap_cancel_arm(signalled), SOAP_OK);
         const auto began = std::chrono::steady_clock::now();
         const profile_result result =
             create_one(client, std::string(row.length, 'x'), zuv::extras().repeatable());
         EXPECT_LT(std::chrono::steady_clock::now() - began, 10s);
+        told.wait(false); // soap_cancel must have returned before the client ends
         EXPECT_EQ(result.failure().kind(), zuv::failure_kind::cancelled);
         EXPECT_NE(result.failure().message().find("The call was cancelled"), std::string::npos)
             << result.failure().message();
