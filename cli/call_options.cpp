@@ -50,6 +50,8 @@ void connection_options::declare(CLI::App &app)
                    "Append what goes over the wire to this file, \"-\" for standard output; see zuv trace")
         ->type_name("FILE")
         ->group("Output");
+    app.add_flag("-v,--verbose", verbose, "Tell what happened: times, bytes, addresses, TLS")
+        ->group("Output");
     app.add_flag("-q,--quiet", quiet, "Show no progress")->group("Output");
 }
 

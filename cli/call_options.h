@@ -19,7 +19,7 @@ struct connection_options {
     std::string proxy, proxy_user, proxy_password_file; // ... in ZUV_PROXY_PASSWORD
     double connect_limit = 30, silence_limit = 300;     // seconds; 0: none
     std::string trace_file;
-    bool quiet = false;
+    bool quiet = false, verbose = false;
 
     void declare(CLI::App &app);
 };

@@ -4,6 +4,7 @@
 #include <cerrno>
 #include <charconv>
 #include <cmath>
+#include <cstdio>
 #include <cstdlib>
 #include <system_error>
 
@@ -14,6 +15,7 @@
 #include <zuv_client_pro/soap_tls.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "call_report.h"
 #include "failure.h"
 #include "text_files.h"
 
@@ -119,6 +121,13 @@ void connection::renew(soap *ctx) const
 {
     ctx->auth_user = text_or_null(options_.user);
     ctx->auth_password = options_.user.empty() ? nullptr : password_.c_str();
+}
+
+void connection::tell(soap *ctx) const
+{
+    const soap_report *const told = options_.verbose ? soap_call_report(ctx) : nullptr;
+    if (told != nullptr)
+        std::fputs(call_report(*told).c_str(), stderr);
 }
 
 void refuse_user(const std::string &address)

@@ -34,8 +34,7 @@ constexpr advice FAULT_ADVICE[] = { // the first that fits
     {"Server", "try again; if it stays so, tell the service's operator"}};
 
 constexpr failure_words KINDS[] = {
-    {EXIT_NETWORK, "the network, or nobody listens there",
-     "check the address and that the service runs; --connect-limit and --silence-limit give it more time"},
+    {EXIT_NETWORK, "the network, or nobody listens there", "check the address and that the service runs"},
     {EXIT_TLS, "this side and the service don't trust each other",
      "name the authority by --ca-file; the certificate must be made out to the host in the address (see "
      "--no-host-check)"},
@@ -63,6 +62,24 @@ const char *advice_for(const std::string &fault)
     for (const advice &one : FAULT_ADVICE)
         if (fault == one.about || fault.starts_with(std::string(one.about) + "."))
             return one.text;
+    return nullptr;
+}
+
+const char *ending_advice(soap_ending by)
+{
+    switch (by) {
+    case ENDED_BY_CONNECT_LIMIT:
+        return "check the address and that the service runs; --connect-limit gives it more time";
+    case ENDED_BY_SEND_LIMIT:
+    case ENDED_BY_RECV_LIMIT:
+        return "give the service more time by --silence-limit; it may have taken the request";
+    case ENDED_BY_PEER:
+        return "look into the service's log; it may have taken the request";
+    case ENDED_BY_NOTHING:
+    case ENDED_BY_CALL_LIMIT:
+    case ENDED_BY_CANCEL:
+        break;
+    }
     return nullptr;
 }
 

@@ -4,6 +4,8 @@
 
 #include <string>
 
+#include <zuv_client_pro/soap_report.h>
+
 #include "exit_codes.h"
 
 namespace cli {
@@ -19,6 +21,9 @@ const failure_words &words_of(exit_code code);
 // What to try after a fault of the contract, by its name ("Client.ObjectNotFound") or the one it is derived
 // from; null for others.
 const char *advice_for(const std::string &fault);
+
+// What to try after an exchange that was ended so; null if there is nothing to add.
+const char *ending_advice(soap_ending by);
 
 // What to try after an HTTP status; null if there is nothing to add.
 const char *http_advice(int status);

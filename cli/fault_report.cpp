@@ -11,6 +11,7 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_registry.h>
+#include <zuv_client_pro/soap_report.h>
 
 #include "contract.h"
 #include "documents.h"
@@ -187,6 +188,8 @@ std::string fault_report(soap *ctx, const std::string &what, const std::string &
     lines.add("fault", faults.empty() ? (received ? code : "") : faults.front().name + " (" + code + ")");
     lines.add("what", text_of(*soap_fault_string_field(ctx)));
     const char *advice = http_advice(kind == EXIT_HTTP ? ctx->error : 0);
+    if (const soap_report *const told = kind == EXIT_NETWORK ? soap_call_report(ctx) : nullptr)
+        advice = ending_advice(told->ended_by);
     if (ctx->error == SOAP_VERSION_MISMATCH)
         advice = words_of(EXIT_FAULT).advice;
     lines.add("who", words_of(kind).who);

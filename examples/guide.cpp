@@ -3,7 +3,9 @@
 // Usage: guide ENDPOINT, the Profile port of a service. Each function is one section of the guide; the
 // guide's blocks stand here word for word. Ends with 1 at the first call that goes another way than the guide
 // says.
+#include <atomic>
 #include <chrono>
+#include <csignal>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -22,6 +24,7 @@
 #include <zuv_client_pro/soap_log.h>
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_plugin.h>
+#include <zuv_client_pro/soap_report.h>
 #include <zuv_client_pro/soap_tls.h>
 #include <zuv_client_pro/soap_xml.h>
 
@@ -197,6 +200,42 @@ void time_limits()
     expect(proxy.create(&profile, created) == 0, "the service answers in time");
 }
 
+std::atomic<soap *> running{nullptr};
+
+void stop(int)
+{
+    if (soap *const ctx = running)
+        soap_cancel(ctx);
+}
+
+void cancelling()
+{
+    ProfileSoapBindingProxy proxy(endpoint);
+    if (soap_cancel_arm(&proxy) != SOAP_OK)
+        return proxy.soap_print_fault(stderr);
+    running = &proxy; // stop, a handler of SIGINT, calls soap_cancel(running)
+    std::signal(SIGINT, stop);
+    protocolProfile__ProfileContent profile;
+    __protocolProfile__createResponse created;
+    expect(proxy.create(&profile, created) == 0, "an armed context calls like any other");
+    running = nullptr; // before the proxy ends
+    std::signal(SIGINT, SIG_DFL);
+}
+
+void reporting()
+{
+    ProfileSoapBindingProxy proxy(endpoint);
+    protocolProfile__ProfileContent profile;
+    __protocolProfile__createResponse created;
+    expect(proxy.create(&profile, created) == 0, "the service answers");
+    if (const soap_report *told = soap_call_report(&proxy))
+        std::printf("%s, %.1f ms, first byte after %.1f ms, %llu bytes received, HTTP status %d\n",
+                    told->peer, static_cast<double>(told->total_time) / 1000,
+                    static_cast<double>(told->first_byte_time) / 1000,
+                    static_cast<unsigned long long>(told->wire_received), told->http_status);
+    expect(soap_call_report(&proxy)->http_status == 200, "the report tells the status");
+}
+
 void older_behaviour()
 {
     ProfileSoapBindingProxy proxy(endpoint);
@@ -365,6 +404,8 @@ int main(int argc, char **argv)
     one_context_for_each_thread();
     errors_and_faults();
     time_limits();
+    cancelling();
+    reporting();
     older_behaviour();
     several_endpoints();
     tls(nullptr);

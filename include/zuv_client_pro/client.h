@@ -20,6 +20,7 @@
 #include <zuv_client_pro/client_failure.h>
 #include <zuv_client_pro/client_options.h>
 #include <zuv_client_pro/soap_call.h>
+#include <zuv_client_pro/soap_report.h>
 
 class protocol__Header;
 struct soap_attachment;
@@ -182,8 +183,14 @@ public:
     // The trace file.
     //   returns  its path; empty for none
     const std::string &trace_file() const;
-    // The context, for settings that options lack; between calls. Its callbacks of attachments are the
-    // client's own.
+    // What happened in the last call, or in the last attempt of one that was repeated: times, bytes, addresses,
+    // TLS, what ended it.
+    //   returns  the report, valid until the next call; before the first one, and of a client that was moved,
+    //            an empty one
+    const soap_report &report() const;
+    // The context, for settings that options lack, between calls, and for soap_cancel_arm and soap_cancel
+    // (soap_report.h), which also ends the pauses between the attempts of a call. Its callbacks of attachments
+    // are the client's own.
     //   returns  the context, which is the client's
     //   null     the client was moved
     soap *context();

@@ -40,7 +40,8 @@ enum class failure_kind : int {
     unreadable,    // the response is not what the contract says
     too_large,     // beyond max_message, max_memory or max_depth, in either direction
     request,       // the request can't be sent as it is, or the client can't be used
-    memory         // memory ran out
+    memory,        // memory ran out
+    cancelled      // soap_cancel (soap_report.h) ended the call; the service may have taken the request
 };
 
 // One fault of a failure.

@@ -3,7 +3,7 @@
 // Here: sizes, mode flags, the callback table, the record with every field's meaning, and its life
 // (construction, per-call reset, copying, end). Elsewhere: what works on the record, one header for
 // each mechanism (soap_memory.h, soap_io.h, soap_error.h, soap_log.h, soap_plugin.h, soap_tcp.h,
-// soap_tls.h, soap_http.h, soap_xml.h, soap_identity.h, soap_primitive.h, soap_attachment.h).
+// soap_tls.h, soap_http.h, soap_xml.h, soap_identity.h, soap_primitive.h, soap_attachment.h, soap_report.h).
 //
 // Always, in all public headers, unless a function says otherwise:
 //
@@ -28,6 +28,7 @@ struct SOAP_ENV__Header;
 struct SOAP_ENV__Fault;
 
 struct soap_head_memory; // see soap::head_memory
+struct soap_call_record; // see soap::call_record
 
 // Handles of OpenSSL and zlib: named here so that a host program needs none of their headers.
 struct bio_st;
@@ -280,7 +281,7 @@ struct ZUV_CLASS soap {
     int call_timeout;           // time limit of a whole exchange, from connecting to the response's last byte
     std::int64_t call_deadline; // when call_timeout ends the exchange in progress; microseconds of the
                                 // monotonic clock; 0 none
-    bool call_expired;          // call_timeout has ended the exchange, and so is what error texts name
+    bool call_expired;          // call_timeout or soap_cancel has ended the exchange, which error texts name
     std::uint32_t legacy;       // LEGACY_...
     // Most bytes of one message's XML, both ways, as plain text: framing and compression undone, attachments
     // not counted; 0 no limit. Beyond it: SOAP_LENGTH, and the connection is closed.
@@ -569,6 +570,7 @@ struct ZUV_CLASS soap {
     std::size_t store_space;       // bytes that it still takes; 0 unless a message is being stored
     std::int16_t mark_state;       // output: whether the message's objects were marked; private
     soap_head_memory *head_memory; // owned; the last request head, to be sent again; private
+    soap_call_record *call_record; // owned; what happened in the last exchange (soap_report.h); private
 
     // --- construction ---
 

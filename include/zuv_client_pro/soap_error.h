@@ -133,8 +133,9 @@ ZUV_API void soap_fault_location_print(soap *ctx, std::FILE *file);
 //   returns   the text, cut to SOAP_TEXT_SIZE - 1 bytes
 ZUV_API const char *soap_constraint_text(soap *ctx, const char *text, const char *argument);
 
-// Text for an end of input: that of ctx->errno_value, or of a timeout with the time limits that are set, or
-// with call_timeout alone if that has passed.
+// Text for an end of input: that of ctx->errno_value; or that soap_cancel ended the call or the peer closed
+// the connection, where that is known (soap_report.h); or of a timeout with the time limits that are set, with
+// call_timeout alone if that has passed.
 //   returns  the text
 ZUV_API const char *soap_eof_text(soap *ctx);
 

@@ -5,7 +5,8 @@
 // Always: a time limit runs from the beginning of the step that it limits, and no signal restarts it.
 // call_timeout limits all steps together, from soap_server_connect or soap_connect_one (soap_http.h) to
 // soap_socket_release: whatever waits then ends with it, with errno_value 0, and error texts name it. No
-// limit ends the look-up of a name, which has those of the system's resolver. Only select is used, so
+// limit ends the look-up of a name, which has those of the system's resolver. What ended an exchange is told by
+// soap_call_report, and soap_cancel ends one from outside (soap_report.h). Only select is used, so
 // descriptors of 1024 and over are refused with SOAP_FD_EXCEEDED. Sockets that the library makes are closed
 // on exec, and writing to one whose peer is gone raises no SIGPIPE. SOAP_TCP_ERROR comes with a fault record:
 // its text is that of tcp_error_text, "Timeout" or the resolver's, its detail says what failed. Descriptors

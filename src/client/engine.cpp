@@ -3,8 +3,6 @@
 
 #include <algorithm>
 #include <atomic>
-#include <cerrno>
-#include <ctime>
 
 #include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
@@ -12,6 +10,8 @@
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_tls.h>
+
+#include "net/call_record.h"
 
 namespace zuv {
 
@@ -53,15 +53,6 @@ microseconds shortened(microseconds pause)
 {
     const std::int64_t half = pause.count() / 2;
     return pause - microseconds(half > 0 ? tls_random_word() % (half + 1) : 0);
-}
-
-void sleep_for(microseconds pause)
-{
-    std::timespec left{};
-    left.tv_sec = static_cast<std::time_t>(pause.count() / 1000000);
-    left.tv_nsec = static_cast<long>(pause.count() % 1000000) * 1000;
-    while (pause.count() > 0 && nanosleep(&left, &left) != 0 && errno == EINTR) {
-    }
 }
 
 } // namespace
@@ -120,6 +111,14 @@ void engine::set_proxy()
 
 int engine::run(const soap_operation &operation, const void *request, const extras &how, void **object)
 {
+    call_cancel_hold(this); // also between attempts
+    const int code = repeat(operation, request, how, object);
+    call_cancel_release(this);
+    return code;
+}
+
+int engine::repeat(const soap_operation &operation, const void *request, const extras &how, void **object)
+{
     const auto began = std::chrono::steady_clock::now();
     const auto total = wanted.total_limit;
     auto pause = microseconds(wanted.retry.first_pause);
@@ -135,7 +134,7 @@ int engine::run(const soap_operation &operation, const void *request, const extr
         if (total.count() > 0 && passed + wait >= total)
             return code;
         discard();
-        sleep_for(wait);
+        call_pause(this, wait.count());
         pause = std::min<microseconds>(pause * 2, wanted.retry.longest_pause);
         if (total.count() > 0)
             call_timeout = limit_of(total - passed - wait);
@@ -146,7 +145,7 @@ failure_kind engine::kind() const
 {
     const bool unconnected = opens > 0 && !connected;
     if (error != SOAP_OK && call_expired)
-        return failure_kind::out_of_time;
+        return call_ending(this) == ENDED_BY_CANCEL ? failure_kind::cancelled : failure_kind::out_of_time;
     switch (error) {
     case SOAP_OK:
         return failure_kind::none;

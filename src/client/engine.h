@@ -43,6 +43,7 @@ private:
     void set_modes();
     void set_tls();
     void set_proxy();
+    int repeat(const soap_operation &operation, const void *request, const extras &how, void **object);
     int attempt(const soap_operation &operation, const void *request, const extras &how, void **object);
     void begin_notes();
     int prepare(const extras &how);

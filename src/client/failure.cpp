@@ -125,6 +125,8 @@ const char *failure::advice() const
         return "Change the request as the text says.";
     case failure_kind::memory:
         return "Free memory, or ask for less at a time.";
+    case failure_kind::cancelled:
+        return "Ask whether the request was taken before it is sent again.";
     }
     return "";
 }

@@ -19,6 +19,7 @@
 #include "core/failure.h"
 #include "core/message_store.h"
 #include "exchange/request.h"
+#include "net/call_record.h"
 
 namespace {
 
@@ -98,9 +99,9 @@ int end_response(soap *ctx)
     return soap_receive_finish(ctx);
 }
 
-// soap_call, but for what becomes of *response in a failure: it is left alone until a response is awaited.
-int run_call(soap *ctx, const char *endpoint, const char *action, const soap_operation &operation,
-             const void *request, void **response)
+// A call from its first step to its release. *response is left alone until a response is awaited.
+int run_exchange(soap *ctx, const char *endpoint, const char *action, const soap_operation &operation,
+                 const void *request, void **response)
 {
     const body_part sent = part_of(operation.request, binding::type_kind::request);
     const body_part expected = part_of(operation.response, binding::type_kind::response);
@@ -127,6 +128,17 @@ int run_call(soap *ctx, const char *endpoint, const char *action, const soap_ope
         return soap_fault_receive(ctx, 0);
     end_response(ctx);
     return soap_socket_release(ctx);
+}
+
+// soap_call, but for what becomes of *response in a failure.
+int run_call(soap *ctx, const char *endpoint, const char *action, const soap_operation &operation,
+             const void *request, void **response)
+{
+    call_record_prepare(ctx);
+    const int error = run_exchange(ctx, endpoint, action, operation, request, response);
+    if (error != SOAP_OK) // also one that ended before there was anything to release
+        call_record_end(ctx);
+    return error;
 }
 
 } // namespace

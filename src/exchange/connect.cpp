@@ -88,7 +88,8 @@ int soap_server_connect(soap *ctx, const char *endpoints, const char *action)
         char *end = item + std::strcspn(item, " ");
         char *next = end + std::strspn(end, " ");
         *end = '\0';
-        if (connect_one(ctx, STATUS_POST, item, action) != SOAP_TCP_ERROR || *next == '\0')
+        if (connect_one(ctx, STATUS_POST, item, action) != SOAP_TCP_ERROR || *next == '\0' ||
+            ctx->call_expired)
             break;
         item = next;
     }

@@ -30,6 +30,7 @@
 #include "core/tracking.h"
 #include "exchange/context.h"
 #include "exchange/fault.h"
+#include "net/call_record.h"
 #include "net/head_memory.h"
 #include "xml/attributes.h"
 
@@ -281,6 +282,7 @@ void soap_engine_done(soap *ctx)
     end_compression(ctx);
     message_store_free(ctx);
     head_memory_free(ctx);
+    call_record_free(ctx);
     credentials_wipe(ctx);
     trace_log_end(ctx);
     ctx->state = 0;

@@ -270,6 +270,7 @@ constexpr std::uint64_t POOL_LIMIT_DEFAULT = SOAP_POOL_LIMIT;
     X(pools, RESOURCE, {}) \
     X(store, RESOURCE, {}) \
     X(head_memory, RESOURCE, {}) \
+    X(call_record, RESOURCE, {}) \
     X(tls_bio, RESOURCE, {}) \
     X(tls_connection, RESOURCE, {}) \
     X(tls_session, RESOURCE, {}) \

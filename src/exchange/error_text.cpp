@@ -5,6 +5,7 @@
 // Always: a composed text stands in message_text, cut to its size.
 #include "exchange/fault.h"
 
+#include <algorithm>
 #include <cstdio>
 #include <cstring>
 #include <initializer_list>
@@ -63,6 +64,9 @@ const char *soap_constraint_text(soap *ctx, const char *text, const char *argume
 
 namespace {
 
+constexpr std::string_view TYPE_LETTERS =
+    "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789/+-._";
+
 // The end-of-input text after its prefix, or alone if both together are too long.
 const char *prefixed_eof_text(soap *ctx)
 {
@@ -75,10 +79,21 @@ const char *prefixed_eof_text(soap *ctx)
     return ctx->message_text;
 }
 
+// "HTTP status 200, but the answer is not a SOAP message: it is of type text/html".
+const char *strange_answer_text(soap *ctx)
+{
+    constexpr std::size_t TYPE_MAX = 100; // bytes shown of a media type
+    constexpr std::string_view text = "HTTP status 200, but the answer is not a SOAP message";
+    std::string_view type = ctx->http_content != nullptr ? ctx->http_content : "";
+    type = type.substr(0, std::min(type.find_first_of("; \t"), TYPE_MAX));
+    const bool shown = !type.empty() && type.find_first_not_of(TYPE_LETTERS) == std::string_view::npos;
+    return compose(ctx, {text, shown ? ": it is of type " : "", shown ? type : ""});
+}
+
 const char *unlisted_text(soap *ctx)
 {
     if (ctx->error == 200)
-        return "HTTP status 200, but the answer is not a SOAP message";
+        return strange_answer_text(ctx);
     if (ctx->error >= 201 && ctx->error <= 599)
         std::snprintf(ctx->message_text, sizeof ctx->message_text, "HTTP Error: %d %s", ctx->error,
                       http_reason(ctx->error));

@@ -17,6 +17,7 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "core/failure.h"
+#include "net/call_record.h"
 #include "net/endpoint.h"
 #include "net/head_memory.h"
 #include "net/tcp_socket.h"
@@ -150,7 +151,9 @@ int end_connection(soap *ctx)
 // new one.
 int provide_connection(soap *ctx, const char *endpoint)
 {
-    if (connection_is_reusable(ctx, endpoint))
+    const bool reused = connection_is_reusable(ctx, endpoint);
+    call_note_connection(ctx, reused);
+    if (reused)
         return SOAP_OK;
     if (is_datagrams(endpoint))
         ctx->output_mode |= MODE_UDP;
@@ -166,6 +169,7 @@ int provide_connection(soap *ctx, const char *endpoint)
     if (ctx->error != SOAP_OK)
         return ctx->error;
     note_route(ctx, endpoint);
+    call_note_ready(ctx);
     ctx->keep_alive = (ctx->output_mode & MODE_KEEP_ALIVE) != 0 ? 1 : 0;
     return SOAP_OK;
 }

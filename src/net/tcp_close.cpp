@@ -13,6 +13,7 @@
 
 #include "core/context_state.h"
 #include "core/failure.h"
+#include "net/call_record.h"
 #include "net/tcp_socket.h"
 #include "net/tls_connection.h"
 
@@ -143,8 +144,10 @@ int tcp_release(soap *ctx)
 int soap_socket_release(soap *ctx)
 {
     const int result = tcp_release(ctx);
-    if (!reads_on(ctx))
+    if (!reads_on(ctx)) {
         ctx->call_deadline = 0;
+        call_record_end(ctx);
+    }
     return result;
 }
 

@@ -4,14 +4,18 @@
 // Elsewhere: the tunnel through a proxy (tcp_tunnel.cpp), TLS (tls_handshake.cpp).
 #include <cerrno>
 #include <cstddef>
+#include <cstdio>
 #include <cstring>
 #include <netinet/in.h>
 #include <netinet/tcp.h>
 
 #include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "core/failure.h"
+#include "net/call_record.h"
 #include "net/tcp_socket.h"
 #include "net/tcp_wait.h"
 #include "net/tls_connection.h"
@@ -36,6 +40,11 @@ const char *target_host(const soap *ctx, const char *host, char (&space)[SOAP_TE
 
 tcp_address_list resolve_target(soap *ctx, const char *host, int port)
 {
+    if (tcp_call_is_over(ctx)) {
+        ctx->errno_value = 0;
+        tcp_fail(ctx, -1, "getaddrinfo failed in tcp_connect()", tcp_timeout_text(ctx));
+        return nullptr;
+    }
     char space[SOAP_TEXT_SIZE];
     return tcp_resolve(ctx, target_host(ctx, host, space),
                        ctx->proxy_host != nullptr ? ctx->proxy_port : port, 0,
@@ -158,9 +167,12 @@ int connect_to_list(soap *ctx, addrinfo *address)
         const int socket = open_socket(ctx, address, &made);
         if (made && socket < 0)
             return -1;
+        call_note_address(ctx, address->ai_addr, address->ai_addrlen);
         const attempt outcome = made ? try_connect(ctx, socket, address) : attempt::refused;
         if (outcome == attempt::connected)
             return socket;
+        if (outcome == attempt::out_of_time)
+            call_note_ending(ctx, ENDED_BY_CONNECT_LIMIT);
         if (outcome == attempt::address_in_use && --reuse_tries > 0) {
             tcp_close_through_hook(ctx, socket);
             continue;
@@ -208,10 +220,37 @@ int open_tunnel(soap *ctx, const char *endpoint, const char *host, int port)
     const int error = tcp_open_tunnel(ctx, endpoint, host, port);
     const bool late = error == SOAP_EOF && ctx->call_expired;
     ctx->call_deadline = call;
-    tcp_call_is_over(ctx); // if so, that is what the fault tells
+    const bool call_is_over = tcp_call_is_over(ctx); // if so, that is what the fault tells
+    if (late && !call_is_over)
+        call_note_ending(ctx, ENDED_BY_CONNECT_LIMIT);
     if (late)
         return tcp_fail(ctx, -1, "CONNECT failed in tcp_connect()", tcp_timeout_text(ctx));
     return error == 0 ? 0 : -1;
+}
+
+// What was refused is the HTTP proxy's doing, not the host's.
+void blame_proxy(soap *ctx)
+{
+    if (ctx->proxy_host == nullptr || ctx->error != SOAP_TCP_ERROR || ctx->call_expired)
+        return;
+    const fault_texts fault = ctx->upcalls->read_fault(ctx);
+    char text[2 * SOAP_TEXT_SIZE];
+    std::snprintf(text, sizeof text, "The HTTP proxy %.800s:%d can't be reached: %.800s", ctx->proxy_host,
+                  ctx->proxy_port, fault.text != nullptr ? fault.text : "");
+    if (const char *const own = soap_string_dup(ctx, text))
+        fail_as_sender(ctx, own, fault.detail, SOAP_TCP_ERROR);
+}
+
+// A connected socket, or one for datagrams; -1 with a fault.
+int reach(soap *ctx, const char *host, int port)
+{
+    const tcp_address_list addresses = resolve_target(ctx, host, port);
+    if (!addresses)
+        return -1;
+    call_note_time(ctx, &soap_report::lookup_time);
+    if (tcp_is_udp(ctx))
+        return open_datagram_socket(ctx, addresses.get());
+    return connect_to_list(ctx, addresses.get());
 }
 
 } // namespace
@@ -219,14 +258,13 @@ int open_tunnel(soap *ctx, const char *endpoint, const char *host, int port)
 int tcp_connect(soap *ctx, const char *endpoint, const char *host, int port)
 {
     tcp_drop_socket(ctx);
-    const tcp_address_list addresses = resolve_target(ctx, host, port);
-    if (!addresses)
-        return -1;
     const bool udp = tcp_is_udp(ctx);
-    const int socket =
-        udp ? open_datagram_socket(ctx, addresses.get()) : connect_to_list(ctx, addresses.get());
-    if (socket < 0)
+    const int socket = reach(ctx, host, port);
+    if (socket < 0) {
+        blame_proxy(ctx);
         return -1;
+    }
+    call_note_connected(ctx, socket);
     tcp_store_socket(ctx, socket);
     if (udp)
         return socket;

@@ -6,6 +6,7 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_tcp.h>
 
+#include "net/call_record.h"
 #include "net/tcp_wait.h"
 
 namespace {
@@ -20,6 +21,14 @@ std::size_t append_limit(char *text, std::size_t size, const char *what, int tim
     return static_cast<std::size_t>(written);
 }
 
+const char *text_of_ending(const soap_call_record &record)
+{
+    if (record.report.ended_by == ENDED_BY_CANCEL)
+        return "The call was cancelled";
+    return record.report.first_byte_time < 0 ? "The peer closed the connection without an answer"
+                                             : "The peer closed the connection in the midst of its answer";
+}
+
 } // namespace
 
 const char *soap_eof_text(soap *ctx)
@@ -32,6 +41,10 @@ const char *soap_eof_text(soap *ctx)
     }
     char *text = ctx->message_text;
     const std::size_t size = sizeof ctx->message_text;
+    if (call_ending(ctx) == ENDED_BY_CANCEL || call_ending(ctx) == ENDED_BY_PEER) {
+        std::snprintf(text, size, "%s", text_of_ending(*ctx->call_record));
+        return text;
+    }
     auto length = static_cast<std::size_t>(std::snprintf(text, size, "Operation interrupted or timed out"));
     if (ctx->call_expired) {
         append_limit(text + length, size - length, "call limit", ctx->call_timeout);

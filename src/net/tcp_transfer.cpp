@@ -22,6 +22,7 @@
 #include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_tls.h>
 
+#include "net/call_record.h"
 #include "net/tcp_socket.h"
 #include "net/tcp_wait.h"
 #include "net/tls_connection.h"
@@ -152,9 +153,10 @@ ssize_t send_once(soap *ctx, const char *data, std::size_t length, bool limited,
     errno = 0;
     if (ctx->tls_bio != nullptr)
         return BIO_write(ctx->tls_bio, data, length < INT_MAX ? static_cast<int>(length) : INT_MAX);
-    if (tcp_is_udp(ctx))
-        return send_datagram_with_retries(ctx, data, length, limited);
-    return send(ctx->socket, data, length, send_flags(ctx, limited));
+    const ssize_t sent = tcp_is_udp(ctx) ? send_datagram_with_retries(ctx, data, length, limited)
+                                         : send(ctx->socket, data, length, send_flags(ctx, limited));
+    call_note_sent(ctx, sent);
+    return sent;
 }
 
 // After a transfer that took nothing: 0 if it may be repeated now, -1 if the sending has failed.
@@ -175,6 +177,11 @@ int settle_refused_send(soap *ctx, int wait_for, tcp_deadline deadline)
         return ready < 0 && ctx->errno_value != EINTR ? -1 : 0;
     }
     return tcp_wait_until(ctx, ctx->socket, wait_for, deadline) > 0 ? 0 : -1;
+}
+
+void note_failed_sending(soap *ctx, bool tls_failed)
+{
+    call_note_ending(ctx, tls_failed || ctx->errno_value != 0 ? ENDED_BY_PEER : ENDED_BY_SEND_LIMIT);
 }
 
 // --- receiving ---
@@ -235,6 +242,7 @@ ssize_t recv_once(soap *ctx, char *buffer, std::size_t length, bool limited, int
     const int flags = ctx->socket_flags | (limited ? MSG_DONTWAIT : 0);
     const ssize_t received = tcp_is_udp(ctx) ? recv_datagram(ctx, buffer, length, flags)
                                              : recv(ctx->socket, buffer, length, flags);
+    call_note_received(ctx, received);
     if (received >= 0 || errno == EINTR || errno == EAGAIN)
         return received;
     tcp_save_errno(ctx);
@@ -250,6 +258,13 @@ bool await_more(soap *ctx, int wait_for, tcp_deadline deadline)
     return tcp_wait_until(ctx, ctx->socket, flags, tcp_deadline_of(ctx, RECV_WAIT_S)) >= 0;
 }
 
+// A failed wait ends the receiving.
+std::size_t give_up_receiving(soap *ctx)
+{
+    call_note_ending(ctx, ctx->errno_value == 0 ? ENDED_BY_RECV_LIMIT : ENDED_BY_PEER);
+    return 0;
+}
+
 // What is to be read may lie in OpenSSL already, where select doesn't see it.
 bool must_wait_first(const soap *ctx, tcp_deadline deadline)
 {
@@ -260,24 +275,26 @@ std::size_t recv_from_socket(soap *ctx, char *buffer, std::size_t length)
 {
     tcp_deadline deadline = tcp_deadline_of(ctx, ctx->recv_timeout);
     if (must_wait_first(ctx, deadline) && !await_more(ctx, WAIT_RECV, deadline))
-        return 0;
+        return give_up_receiving(ctx);
     for (int rounds = RECV_ROUNDS;;) {
         int wait_for;
         const std::uint64_t before = tls_bytes_in(ctx);
         const ssize_t received = recv_once(ctx, buffer, length, deadline != 0, &wait_for);
+        if (received == 0)
+            call_note_ending(ctx, ENDED_BY_PEER);
         if (received >= 0)
             return static_cast<std::size_t>(received);
         if (errno == EINTR) {
             if (tcp_is_over(ctx, deadline))
-                return 0;
+                return give_up_receiving(ctx);
             continue;
         }
         if (tls_bytes_in(ctx) != before)
             deadline = tcp_deadline_of(ctx, ctx->recv_timeout);
         else if (--rounds == 0)
-            return 0;
+            return give_up_receiving(ctx);
         if (!await_more(ctx, wait_for, deadline))
-            return 0;
+            return give_up_receiving(ctx);
     }
 }
 
@@ -287,8 +304,10 @@ int send_to_socket(soap *ctx, const char *data, std::size_t length)
     tcp_deadline deadline = tcp_deadline_of(ctx, ctx->send_timeout);
     while (length > 0) {
         if (deadline != 0)
-            if (const int failed = await_sending(ctx, ctx->socket, flags, deadline))
+            if (const int failed = await_sending(ctx, ctx->socket, flags, deadline)) {
+                note_failed_sending(ctx, false);
                 return failed;
+            }
         int wait_for;
         const std::uint64_t before = tls_bytes_out(ctx);
         const ssize_t sent = send_once(ctx, data, length, deadline != 0, &wait_for);
@@ -300,8 +319,10 @@ int send_to_socket(soap *ctx, const char *data, std::size_t length)
         if (length > 0 && (sent > 0 || tls_bytes_out(ctx) != before))
             deadline = tcp_deadline_of(ctx, ctx->send_timeout);
         errno = reason;
-        if (sent <= 0 && settle_refused_send(ctx, wait_for, deadline) != 0)
+        if (sent <= 0 && settle_refused_send(ctx, wait_for, deadline) != 0) {
+            note_failed_sending(ctx, wait_for == 0);
             return -1;
+        }
     }
     return SOAP_OK;
 }
@@ -333,8 +354,12 @@ std::size_t tcp_recv(soap *ctx, char *buffer, std::size_t length)
         return recv_from_stream(ctx, buffer, length);
     if (ctx->socket == -1)
         return recv_from_descriptor(ctx, buffer, length);
-    if (soap_socket_open(ctx))
-        return recv_from_socket(ctx, buffer, length);
-    ctx->errno_value = EBADF;
-    return 0;
+    if (!soap_socket_open(ctx)) {
+        ctx->errno_value = EBADF;
+        return 0;
+    }
+    const std::size_t received = recv_from_socket(ctx, buffer, length);
+    if (received != 0)
+        call_note_response(ctx);
+    return received;
 }

@@ -12,6 +12,9 @@
 // When a step must have ended: microseconds of the monotonic clock; 0: no limit.
 using tcp_deadline = std::int64_t;
 
+// The present time of that clock.
+std::int64_t tcp_clock();
+
 // The end of a step that begins now: after `timeout` (0 none, positive seconds, negative microseconds) or
 // with the call, whichever comes first.
 tcp_deadline tcp_deadline_of(const soap *ctx, int timeout);
@@ -19,10 +22,11 @@ tcp_deadline tcp_deadline_of(const soap *ctx, int timeout);
 // True if the deadline, or that of the call, has passed.
 bool tcp_is_over(soap *ctx, tcp_deadline deadline);
 
-// True if call_timeout has passed. Notes in call_expired whether it has.
+// True if call_timeout has passed, or the call was cancelled. Notes in call_expired whether it is so.
 bool tcp_call_is_over(soap *ctx);
 
-// The time of a call begins now, by call_timeout.
+// The time of a call begins now, by call_timeout. One that can be cancelled always has a deadline, if need be
+// one that never comes: so no transfer of it blocks, and all waiting is done here.
 void tcp_call_begin(soap *ctx);
 
 // As tcp_wait, but up to `deadline` and whatever signals arrive. Asks once if the deadline has passed;

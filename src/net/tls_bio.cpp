@@ -11,6 +11,7 @@
 #include <openssl/bio.h>
 #include <openssl/crypto.h>
 
+#include "net/call_record.h"
 #include "net/tcp_socket.h"
 #include "net/tcp_wait.h"
 #include "net/tls_connection.h"
@@ -58,6 +59,7 @@ int bio_write(BIO *bio, const char *data, int length)
     const ssize_t sent = is_held_up(state) ? -1
                                            : send(state->ctx->socket, data, static_cast<std::size_t>(length),
                                                   transfer_flags(state));
+    call_note_sent(state->ctx, sent);
     if (retry_helps(sent))
         BIO_set_retry_write(bio);
     return static_cast<int>(sent);
@@ -75,6 +77,7 @@ int bio_read(BIO *bio, char *buffer, int length)
         is_held_up(state)
             ? -1
             : recv(state->ctx->socket, buffer, static_cast<std::size_t>(length), transfer_flags(state));
+    call_note_received(state->ctx, received);
     if (retry_helps(received))
         BIO_set_retry_read(bio);
     return static_cast<int>(received);

@@ -70,16 +70,22 @@ const char *tls_error_text(soap *ctx, int result);
 // Is the peer verified and the host asked for? By tls_flags. 0, or 30 with a fault.
 int tls_check_peer(soap *ctx, const char *host);
 
+// Writes the subject of a certificate as by RFC 2253, cut to `size` bytes. What could be markup or control an
+// output becomes "?".
+void tls_write_subject(const X509 *certificate, char *text, std::size_t size);
+
 // Why the chain of certificates was refused, as far as OpenSSL asked the verify callback.
 struct tls_verdict {
+    soap *ctx = nullptr;
     int error = 0;          // X509_V_ERR_...; 0: it wasn't
     int depth = 0;          // of the certificate; 0 is the peer's
     char subject[256] = ""; // of it, cut to the room; empty: not known
 };
-// From here on `verdict` takes what the handshakes of tls_connection find; null: nothing does. It must live
-// as long.
+// From here on `verdict` takes what the handshakes of tls_connection find, and the report of the call the
+// certificate that was refused; null: nothing does. It must live as long.
 void tls_watch_verdict(soap *ctx, tls_verdict *verdict);
-// `text`, and the reason if there is one, as a fault's detail: managed, or `text` itself.
+// `text`, and the reason if there is one, as a fault's detail: managed, or `text` itself. The report of the
+// call takes the reason.
 const char *tls_with_reason(soap *ctx, const char *text, const tls_verdict &verdict);
 // The address that `host` writes down, if it does, an IPv6 zone left out. Its length, bytes; 0: `host` is a
 // name.

@@ -2,6 +2,8 @@
 //
 // Elsewhere: its use (tls_handshake.cpp), the verify callbacks (tls_verify.cpp).
 #include <atomic>
+#include <cerrno>
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <memory>
@@ -14,6 +16,7 @@
 #include <openssl/ssl.h>
 
 #include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_tls.h>
 
@@ -48,20 +51,32 @@ bool has_flag(const soap *ctx, std::uint16_t flag)
     return (ctx->tls_flags & flag) != 0;
 }
 
-// Each step returns null, or what failed.
+// Each step returns null, or what failed: constant or managed.
 
-const char *load_randomness(const soap *ctx)
+// What failed with a file, and why if the system knows.
+const char *with_file(soap *ctx, const char *what, const char *file)
+{
+    char text[2 * SOAP_TEXT_SIZE], own[SOAP_TEXT_SIZE];
+    const bool readable = access(file, R_OK) == 0;
+    std::snprintf(text, sizeof text, "%s: %.900s%s%s", what, file, readable ? "" : ": ",
+                  readable ? "" : strerror_r(errno, own, sizeof own));
+    const char *const detail = soap_string_dup(ctx, text);
+    return detail != nullptr ? detail : what;
+}
+
+const char *load_randomness(soap *ctx)
 {
     return ctx->tls_random_file != nullptr && RAND_load_file(ctx->tls_random_file, -1) <= 0
-               ? "Can't load randomness"
+               ? with_file(ctx, "Can't load randomness", ctx->tls_random_file)
                : nullptr;
 }
 
-const char *load_trust(const soap *ctx, SSL_CTX *context)
+const char *load_trust(soap *ctx, SSL_CTX *context)
 {
     if (ctx->tls_ca_file != nullptr || ctx->tls_ca_path != nullptr) {
         if (SSL_CTX_load_verify_locations(context, ctx->tls_ca_file, ctx->tls_ca_path) == 0)
-            return "Can't read CA file";
+            return with_file(ctx, "Can't read CA file",
+                             ctx->tls_ca_file != nullptr ? ctx->tls_ca_file : ctx->tls_ca_path);
         if (ctx->tls_ca_file != nullptr && has_flag(ctx, TLS_REQUIRE_CLIENT_CERT))
             SSL_CTX_set_client_CA_list(context, SSL_load_client_CA_file(ctx->tls_ca_file));
     }
@@ -70,7 +85,7 @@ const char *load_trust(const soap *ctx, SSL_CTX *context)
     return nullptr;
 }
 
-const char *load_revocations(const soap *ctx, SSL_CTX *context)
+const char *load_revocations(soap *ctx, SSL_CTX *context)
 {
     if (ctx->tls_crl == nullptr)
         return nullptr;
@@ -78,21 +93,21 @@ const char *load_revocations(const soap *ctx, SSL_CTX *context)
     X509_LOOKUP *lookup = X509_STORE_add_lookup(store, X509_LOOKUP_file());
     if (lookup == nullptr || X509_load_crl_file(lookup, ctx->tls_crl, X509_FILETYPE_PEM) <= 0 ||
         X509_STORE_set_flags(store, X509_V_FLAG_CRL_CHECK) == 0)
-        return "Can't read CRL file";
+        return with_file(ctx, "Can't read CRL file", ctx->tls_crl);
     return nullptr;
 }
 
-const char *load_key(const soap *ctx, SSL_CTX *context)
+const char *load_key(soap *ctx, SSL_CTX *context)
 {
     if (ctx->tls_key_file == nullptr)
         return nullptr;
     if (SSL_CTX_use_certificate_chain_file(context, ctx->tls_key_file) == 0)
-        return "Can't read certificate key file";
+        return with_file(ctx, "Can't read certificate key file", ctx->tls_key_file);
     // Also without a password: OpenSSL's own way would ask for one at the host's terminal.
     SSL_CTX_set_default_passwd_cb_userdata(context, const_cast<char *>(ctx->tls_password));
     SSL_CTX_set_default_passwd_cb(context, tls_password_callback);
     if (SSL_CTX_use_PrivateKey_file(context, ctx->tls_key_file, SSL_FILETYPE_PEM) == 0)
-        return "Can't read key file";
+        return with_file(ctx, "Can't read key file", ctx->tls_key_file);
     return nullptr;
 }
 
@@ -129,7 +144,7 @@ key read_dh_parameters(BIO *file)
     return check && EVP_PKEY_param_check(check.get()) == 1 ? std::move(parameters) : nullptr;
 }
 
-const char *set_dh_parameters(const soap *ctx, SSL_CTX *context)
+const char *set_dh_parameters(soap *ctx, SSL_CTX *context)
 {
     char *end = nullptr;
     const long bits = std::strtol(ctx->tls_dh_file, &end, 10);
@@ -139,7 +154,7 @@ const char *set_dh_parameters(const soap *ctx, SSL_CTX *context)
     } else {
         const std::unique_ptr<BIO, bio_delete> file(BIO_new_file(ctx->tls_dh_file, "r"));
         if (!file)
-            return "Can't read DH file";
+            return with_file(ctx, "Can't read DH file", ctx->tls_dh_file);
         parameters = read_dh_parameters(file.get());
     }
     if (!parameters || SSL_CTX_set0_tmp_dh_pkey(context, parameters.get()) != 1)
@@ -148,7 +163,7 @@ const char *set_dh_parameters(const soap *ctx, SSL_CTX *context)
     return nullptr;
 }
 
-const char *set_key_exchange(const soap *ctx, SSL_CTX *context)
+const char *set_key_exchange(soap *ctx, SSL_CTX *context)
 {
     if (has_flag(ctx,
                  TLS_RSA_EPHEMERAL)) // RSA keys for one connection are gone from TLS: OpenSSL picks DH groups
@@ -177,7 +192,7 @@ void set_verification(const soap *ctx, SSL_CTX *context)
     SSL_CTX_set_verify_depth(context, VERIFY_DEPTH);
 }
 
-const char *set_up(const soap *ctx, SSL_CTX *context)
+const char *set_up(soap *ctx, SSL_CTX *context)
 {
     if (const char *failure = load_randomness(ctx))
         return failure;

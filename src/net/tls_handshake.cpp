@@ -14,6 +14,7 @@
 #include <zuv_client_pro/soap_tls.h>
 
 #include "core/failure.h"
+#include "net/call_record.h"
 #include "net/tcp_socket.h"
 #include "net/tcp_wait.h"
 #include "net/tls_connection.h"
@@ -113,11 +114,33 @@ int name_server(SSL *ssl, const char *host)
     return static_cast<int>(SSL_set_tlsext_host_name(ssl, const_cast<char *>(named ? host : nullptr)));
 }
 
+// What came was no TLS at all.
+bool is_plain_answer()
+{
+    const unsigned long error = ERR_peek_error();
+    return ERR_GET_LIB(error) == ERR_LIB_SSL && ERR_GET_REASON(error) == SSL_R_WRONG_VERSION_NUMBER;
+}
+
+bool is_end_of_input()
+{
+    const unsigned long error = ERR_peek_error();
+    return error == 0 ||
+           (ERR_GET_LIB(error) == ERR_LIB_SSL && ERR_GET_REASON(error) == SSL_R_UNEXPECTED_EOF_WHILE_READING);
+}
+
 int fail_connect(soap *ctx, handshake outcome, int result, const tls_verdict &verdict)
 {
+    if (outcome == handshake::out_of_time)
+        call_note_ending(ctx, ENDED_BY_CONNECT_LIMIT);
+    else if (is_end_of_input())
+        call_note_ending(ctx, ENDED_BY_PEER);
+    const char *const detail = is_plain_answer()
+                                   ? "SSL_connect error in tcp_connect(): the peer doesn't speak TLS on this "
+                                     "port, which may be one for http"
+                                   : "SSL_connect error in tcp_connect()";
     if (outcome == handshake::refused)
-        fail_as_sender(ctx, tls_error_text(ctx, result),
-                       tls_with_reason(ctx, "SSL_connect error in tcp_connect()", verdict), SOAP_TLS_ERROR);
+        fail_as_sender(ctx, tls_error_text(ctx, result), tls_with_reason(ctx, detail, verdict),
+                       SOAP_TLS_ERROR);
     else
         fail_as_sender(
             ctx, outcome == handshake::out_of_time ? tcp_timeout_text(ctx) : tls_error_text(ctx, result),
@@ -172,9 +195,11 @@ int tls_connect(soap *ctx, const char *host, int port)
     const handshake outcome = run_handshake(ctx, SSL_connect, ctx->connect_timeout, &result, &verdict);
     if (outcome != handshake::done)
         return fail_connect(ctx, outcome, result, verdict);
-    if ((ctx->tls_flags & TLS_VERIFY_PEER) == 0)
-        return SOAP_OK;
-    return tls_check_peer(ctx, host) == 0 ? 0 : -1;
+    call_note_tls(ctx);
+    if ((ctx->tls_flags & TLS_VERIFY_PEER) != 0 && tls_check_peer(ctx, host) != 0)
+        return -1;
+    call_note_time(ctx, &soap_report::tls_time);
+    return SOAP_OK;
 }
 
 int soap_ssl_accept(soap *ctx)

@@ -28,6 +28,7 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "core/failure.h"
+#include "net/call_record.h"
 #include "net/tls_connection.h"
 
 namespace {
@@ -201,15 +202,18 @@ bool names_host(const soap *ctx, X509 *certificate, const char *host)
 // Reasons. A fault's detail is raw XML, and names are the peer's text: what could be markup or control an
 // output becomes "?".
 
+bool is_harmless(char c)
+{
+    return c >= ' ' && c <= '~' && std::strchr("<>&", c) == nullptr;
+}
+
 class reason_text {
 public:
     void add(std::string_view part)
     {
-        for (const char c : part) {
-            const bool harmless = c >= ' ' && c <= '~' && (std::strchr("<>&", c) == nullptr);
+        for (const char c : part)
             if (length_ + 1 < sizeof text_)
-                text_[length_++] = harmless ? c : '?';
-        }
+                text_[length_++] = is_harmless(c) ? c : '?';
     }
     // An item of a list. False once there is no room for more.
     bool add_item(std::string_view item)
@@ -246,8 +250,9 @@ bool add_alternative_name(reason_text &reason, const GENERAL_NAME *name)
 
 int fail_host(soap *ctx, const X509 *certificate, const char *host)
 {
+    constexpr std::string_view MISMATCH = "SSL/TLS certificate host name mismatch in tcp_connect(): ";
     reason_text reason;
-    reason.add("SSL/TLS certificate host name mismatch in tcp_connect(): ");
+    reason.add(MISMATCH);
     reason.add(std::string_view(host).substr(0, 128));
     reason.add(" was asked for, the certificate is for ");
     any_alternative_name(certificate,
@@ -258,6 +263,7 @@ int fail_host(soap *ctx, const X509 *certificate, const char *host)
         });
     if (!reason.has_items())
         reason.add("no host");
+    call_note_refusal(ctx, reason.text() + MISMATCH.size());
     const char *detail = soap_string_dup(ctx, reason.text());
     return fail_as_sender(ctx, "SSL/TLS error",
                           detail != nullptr ? detail
@@ -277,13 +283,9 @@ void note_verdict(tls_verdict *verdict, X509_STORE_CTX *store)
     verdict->error = X509_STORE_CTX_get_error(store);
     verdict->depth = X509_STORE_CTX_get_error_depth(store);
     verdict->subject[0] = '\0';
-    const X509 *certificate = X509_STORE_CTX_get_current_cert(store);
-    const std::unique_ptr<BIO, bio_delete> text(certificate != nullptr ? BIO_new(BIO_s_mem()) : nullptr);
-    if (!text)
-        return;
-    X509_NAME_print_ex(text.get(), X509_get_subject_name(certificate), 0, XN_FLAG_RFC2253);
-    const int length = BIO_read(text.get(), verdict->subject, sizeof verdict->subject - 1);
-    verdict->subject[length > 0 ? length : 0] = '\0';
+    if (const X509 *const certificate = X509_STORE_CTX_get_current_cert(store))
+        tls_write_subject(certificate, verdict->subject, sizeof verdict->subject);
+    call_note_certificate(verdict->ctx, X509_STORE_CTX_get0_cert(store));
 }
 
 // The callback that the set-up or the host has given decides; this one listens.
@@ -302,9 +304,22 @@ int listen_to_verdict(int result, X509_STORE_CTX *store)
 
 } // namespace
 
+void tls_write_subject(const X509 *certificate, char *text, std::size_t size)
+{
+    const std::unique_ptr<BIO, bio_delete> name(BIO_new(BIO_s_mem()));
+    if (name)
+        X509_NAME_print_ex(name.get(), X509_get_subject_name(certificate), 0, XN_FLAG_RFC2253);
+    const int length = name ? BIO_read(name.get(), text, static_cast<int>(size - 1)) : 0;
+    text[length > 0 ? length : 0] = '\0';
+    std::replace_if(
+        text, text + std::strlen(text), [](char c) { return !is_harmless(c); }, '?');
+}
+
 void tls_watch_verdict(soap *ctx, tls_verdict *verdict)
 {
     SSL *const ssl = ctx->tls_connection;
+    if (verdict != nullptr)
+        verdict->ctx = ctx;
     SSL_set_ex_data(ssl, verdict_index(), verdict);
     SSL_set_verify(ssl, SSL_get_verify_mode(ssl), listen_to_verdict);
 }
@@ -321,6 +336,7 @@ const char *tls_with_reason(soap *ctx, const char *text, const tls_verdict &verd
         for (const char *part : {" (at depth ", depth.c_str(), ": ", verdict.subject, ")"})
             reason.add(part);
     }
+    call_note_refusal(ctx, reason.text() + std::strlen(text) + 2);
     const char *detail = soap_string_dup(ctx, reason.text());
     return detail != nullptr ? detail : text;
 }
@@ -345,16 +361,18 @@ int tls_check_peer(soap *ctx, const char *host)
         return fail_as_sender(
             ctx, X509_verify_cert_error_string(verdict),
             tls_with_reason(ctx, "SSL/TLS certificate presented by peer cannot be verified in tcp_connect()",
-                            {static_cast<int>(verdict)}),
+                            {ctx, static_cast<int>(verdict)}),
             SOAP_TLS_ERROR);
     if ((ctx->tls_flags & TLS_SKIP_HOST_CHECK) != 0)
         return SOAP_OK;
     const std::unique_ptr<X509, certificate_delete> certificate(
         SSL_get1_peer_certificate(ctx->tls_connection));
-    if (!certificate)
+    if (!certificate) {
+        call_note_refusal(ctx, "none was presented");
         return fail_as_sender(ctx, "SSL/TLS error",
                               "No SSL/TLS certificate was presented by the peer in tcp_connect()",
                               SOAP_TLS_ERROR);
+    }
     return names_host(ctx, certificate.get(), host) ? 0 : fail_host(ctx, certificate.get(), host);
 }
 

@@ -128,12 +128,12 @@ class calls(unittest.TestCase):
             (6, zuv.answer("", "503 Service Unavailable"), "try again later"),
             (6, zuv.answer(zuv.envelope(fault % ("E:Client", "never heard", "")), "404 No"), "detail    never heard (E:Client)\n"),
             (6, zuv.answer("<html><title>Please log in</title><p>x</p></html>", "403 No"), "detail    Please log in\n"),
-            (7, zuv.answer("<html>"), "not a SOAP message"),
-            (4, zuv.answer(GOT[:-40]), "--silence-limit"),
+            (7, zuv.answer("<html>", headers=["Content-Type: text/html"]), "not a SOAP message: it is of type text/html"),
+            (4, zuv.answer(GOT[:-40]), "in the midst of its answer"),
             (7, zuv.answer(zuv.envelope("<p:getResponse/>", 3)), "--soap12"),
             (7, zuv.answer(zuv.envelope("<p:setResponse/>")), "tag name or namespace mismatch"),
             (7, zuv.answer(GOT).replace(b"Connection", b"Content-Encoding: gzip\r\nConnection"), "zuv trace"),
-            (4, b"", "--silence-limit"),
+            (4, b"", "The peer closed the connection without an answer"),
         )
         for code, bytes_, words in rows:
             with self.subTest(answer=bytes_), zuv.peer(bytes_) as (address, _):
@@ -145,7 +145,8 @@ class calls(unittest.TestCase):
                 self.expect(zuv.run("profile", "get", "-e", address, *options), code)
         with socket.create_server(("127.0.0.1", 0)) as silent:
             address = "http://127.0.0.1:%d" % silent.getsockname()[1]
-            self.expect(zuv.run("profile", "get", "-e", address, "--silence-limit", "0.1"), 4, "(100000us receive delay)")
+            self.expect(zuv.run("profile", "get", "-v", "-e", address, "--silence-limit", "0.1"), 4, "(100000us receive delay)",
+                        "* ended by --silence-limit\n")
         wrong = self.file("w.xml", PROFILE_XML.replace("organization", "nobody"))
         for code, words, arguments in (
                 (4, "Connection refused", ["profile", "get", "-e", "http://127.0.0.1:1"]),
@@ -154,6 +155,7 @@ class calls(unittest.TestCase):
                 (11, "can't be opened", ["profile", "set", os.path.join(self.folder, "none.xml")]),
                 (11, "can't be attached", ["profile", "set", "--attach", self.folder]),
                 (5, "can't be set up", ["profile", "get", "--ca-file", wrong]),
+                (4, "The HTTP proxy 127.0.0.1:1 can't be reached: Connection refused", ["profile", "get", "--proxy", "127.0.0.1:1", "-e", "http://x"]),
                 (11, "--ca-file: /none: No such file", ["profile", "get", "--ca-file", "/none"]),
                 (11, "--key-file: /none: No such file", ["data", "get", "--key-file", "/none", "http://x/"]),
                 (2, "--endpoint", ["profile", "get", "-e", "ftp://x"]),
@@ -179,10 +181,14 @@ class calls(unittest.TestCase):
                 both.write(key.read())
             return path
         here, other = make("here.pem", "IP:127.0.0.1"), make("other.pem", "DNS:elsewhere.example")
-        for code, certificate, options in ((0, here, ["--ca-file", here]), (5, here, []), (5, other, ["--ca-file", other]),
-                                           (0, other, ["--ca-file", other, "--no-host-check"]), (5, other, ["--ca-file", here])):
+        trusted, refused = "TLSv certificate TLS sent first received HTTP", "certificate certificate sent received"
+        for code, certificate, options, steps in (
+                (0, here, ["--ca-file", here], trusted), (5, here, [], refused), (5, other, ["--ca-file", other], "TLSv " + refused),
+                (0, other, ["--ca-file", other, "--no-host-check"], trusted), (5, other, ["--ca-file", here], refused)):
             with self.subTest(options=options), zuv.peer(zuv.answer(GOT), certificate=certificate) as (address, _):
-                self.expect(zuv.run("profile", "get", "-e", address, *options), code, *(["--ca-file"] if code else []))
+                run = self.expect(zuv.run("profile", "get", "-v", "-e", address, *options), code, *(["--ca-file"] if code else []))
+                told = re.findall(r"^\* ([a-zA-Z]+)", run.stderr, re.M)
+                self.assertEqual(told, ["looked", "connected", *steps.split(), "over"], run.stderr)
 
     def test_attachments_come_from_files_and_go_to_files(self):
         data = random.Random(1).randbytes(70000) + b"\r\n--\r\n"

@@ -1,6 +1,8 @@
 // client_test.cpp - the clients of include/zuv_client_pro/client.h: whose memory a result is, what a failure
 // tells, when a call is repeated, requests and responses without pointers by hand, attachments.
 #include <chrono>
+#include <csignal>
+#include <ctime>
 #include <thread>
 
 #include <zuv_client_pro/client.h>
@@ -11,6 +13,7 @@
 #include "support/call_wire.h"
 #include "support/dime_bytes.h"
 #include "support/scripted_server.h"
+#include "support/socket_calls.h"
 
 namespace {
 
@@ -285,6 +288,224 @@ TEST(client_calls, wait_between_attempts_within_the_total_limit)
     EXPECT_EQ(all, 4);
     EXPECT_GE(took, 100ms); // half of 40, 80 and 80
     EXPECT_EQ(attempts_of(10ms).first, 1);
+}
+
+// --- what happened in a call ---
+
+class client_reports : public tls_peers::tls_test {};
+
+profile_result create_one(zuv::profile_client &client, const std::string &name = "call-1",
+                          const zuv::extras &how = zuv::extras::none())
+{
+    protocolProfile__ProfileContent profile;
+    protocol__Identity identity;
+    std::string own = name;
+    identity.name = &own;
+    profile.identity = &identity;
+    return client.create(profile, how);
+}
+
+zuv::options trusting()
+{
+    zuv::options wanted;
+    wanted.ca_file = tls_peers::ca().ca_file();
+    wanted.system_ca = false;
+    wanted.retry.attempts = 1;
+    return wanted;
+}
+
+TEST_F(client_reports, follow_a_call_on_a_new_connection_and_on_a_kept_one)
+{
+    for (const bool tls : {false, true}) {
+        SCOPED_TRACE(tls);
+        const scripted::server peer(scripted::serve_well, tls);
+        zuv::profile_client client(peer.endpoint(), trusting());
+        EXPECT_EQ(client.report().total_time, -1);
+        EXPECT_STREQ(client.report().peer, "");
+        EXPECT_EQ(name_of(create_one(client)), "call-1");
+        const soap_report first = client.report();
+        EXPECT_TRUE(0 <= first.lookup_time && first.lookup_time <= first.connect_time);
+        EXPECT_TRUE(tls ? first.connect_time <= first.tls_time && first.tls_time <= first.first_byte_time
+                        : first.tls_time == -1 && first.connect_time <= first.first_byte_time);
+        EXPECT_LE(first.first_byte_time, first.total_time);
+        EXPECT_EQ(name_of(create_one(client)), "call-1");
+        const soap_report &second = client.report();
+        EXPECT_TRUE(second.lookup_time == -1 && second.connect_time == -1 && second.tls_time == -1);
+        for (const soap_report *one : {&first, &second}) {
+            const soap_report &told = *one;
+            EXPECT_EQ(told.reused, one == &second);
+            EXPECT_EQ(told.addresses_tried, one == &first ? 1 : 0);
+            EXPECT_EQ(told.peer, "127.0.0.1:" + std::to_string(peer.port()));
+            EXPECT_TRUE(std::string(told.local).starts_with("127.0.0.1:"));
+            EXPECT_EQ(told.http_status, 200);
+            EXPECT_EQ(told.ended_by, ENDED_BY_NOTHING);
+            EXPECT_EQ(told.plain_received, scripted::answer_body("call-1").size());
+            EXPECT_TRUE(told.plain_sent > 500 && told.wire_received > told.plain_received);
+            EXPECT_EQ(told.wire_sent > told.plain_sent, tls);
+            EXPECT_STREQ(told.tls_version, tls ? "TLSv1.3" : "");
+            EXPECT_EQ(*told.tls_cipher != '\0', tls);
+            EXPECT_STREQ(told.certificate_subject, tls ? "CN=peer.test,O=Test" : "");
+            EXPECT_EQ(told.certificate_not_after > std::time(nullptr), tls);
+            EXPECT_STREQ(told.certificate_refusal, "");
+        }
+        zuv::profile_client moved = std::move(client);
+        EXPECT_EQ(client.report().total_time, -1); // NOLINT(bugprone-use-after-move): what it says then
+        EXPECT_EQ(moved.report().http_status, 200);
+    }
+}
+
+TEST_F(client_reports, and_texts_tell_what_ended_a_call)
+{
+    using script = std::function<void(scripted::line &)>;
+    const script silent = [](scripted::line &end) { end.await_end(); };
+    const struct {
+        const char *rule;
+        bool tls;
+        script first;
+        std::function<void(zuv::options &wanted, std::string &endpoint)> change;
+        soap_ending ended_by;
+        const char *words, *refusal;
+    } rows[] = {
+        {"closed", false, [](scripted::line &end) { end.request(); }, nullptr, ENDED_BY_PEER,
+         "The peer closed the connection without an answer", ""},
+        {"closed under TLS", true, [](scripted::line &end) { end.request(); }, nullptr, ENDED_BY_PEER,
+         "The peer closed the connection without an answer", ""},
+        {"closed in the answer", false,
+         [](scripted::line &end) { end.send(scripted::answer_to(end.request()).substr(0, 300)); }, nullptr,
+         ENDED_BY_PEER, "The peer closed the connection in the midst of its answer", ""},
+        {"silent", false, silent, [](zuv::options &wanted, std::string &) { wanted.recv_limit = 50ms; },
+         ENDED_BY_RECV_LIMIT, "timed out (50000us receive delay)", ""},
+        {"silent for the whole call", true, silent,
+         [](zuv::options &wanted, std::string &) { wanted.total_limit = 200ms; }, ENDED_BY_CALL_LIMIT,
+         "call limit", ""},
+        {"another answer", false,
+         [](scripted::line &end) {
+             end.request();
+             end.send("HTTP/1.1 200 OK\r\nContent-Type: text/html; charset=x\r\n\r\n<html></html>");
+         },
+         nullptr, ENDED_BY_NOTHING, "not a SOAP message: it is of type text/html", ""},
+        {"no TLS there", false,
+         [](scripted::line &end) {
+             end.bytes(100);
+             end.send("HTTP/1.1 400 Bad Request\r\n\r\n");
+         },
+         [](zuv::options &, std::string &endpoint) { endpoint.insert(4, "s"); }, ENDED_BY_NOTHING,
+         "the peer doesn't speak TLS on this port, which may be one for http", ""},
+        {"untrusted", true, nullptr, [](zuv::options &wanted, std::string &) { wanted.ca_file = ""; },
+         ENDED_BY_NOTHING, "certificate verify failed", "unable to get local issuer certificate"},
+        {"another host", true, nullptr,
+         [](zuv::options &, std::string &endpoint) { endpoint.replace(8, 9, "127.0.0.1"); }, ENDED_BY_NOTHING,
+         "host name mismatch", "127.0.0.1 was asked for, the certificate is for peer.test"},
+        {"no such authority", true, nullptr,
+         [](zuv::options &wanted, std::string &) { wanted.ca_file = "/none.pem"; }, ENDED_BY_NOTHING,
+         "Can't read CA file: /none.pem: No such file or directory", ""},
+        {"no proxy there", false, nullptr,
+         [](zuv::options &wanted, std::string &) { wanted.proxy = "127.0.0.1:1"; }, ENDED_BY_NOTHING,
+         "The HTTP proxy 127.0.0.1:1 can't be reached: Connection refused", ""},
+    };
+    for (const auto &row : rows) {
+        SCOPED_TRACE(row.rule);
+        const scripted::server peer(row.first ? row.first : scripted::serve_well, row.tls);
+        zuv::options wanted = trusting();
+        std::string endpoint = peer.endpoint();
+        if (row.change)
+            row.change(wanted, endpoint);
+        zuv::profile_client client(endpoint, wanted);
+        const profile_result result = create_one(client);
+        EXPECT_EQ(client.report().ended_by, row.ended_by);
+        EXPECT_NE(result.failure().message().find(row.words), std::string::npos)
+            << result.failure().message();
+        EXPECT_EQ(std::string(client.report().certificate_refusal).substr(0, std::strlen(row.refusal)),
+                  row.refusal);
+        EXPECT_EQ(std::string(client.report().certificate_subject) == "CN=peer.test,O=Test",
+                  row.tls && wanted.ca_file != "/none.pem");
+    }
+}
+
+std::atomic<soap *> signalled; // what is cancelled; armed before it stands here
+
+TEST_F(client_reports, of_calls_that_are_cancelled_wherever_they_wait)
+{
+    using script = std::function<void(scripted::line &, const std::function<void()> &cancel)>;
+    const struct {
+        const char *rule;
+        bool tls, by_signal;
+        std::size_t length; // of the name in the request
+        script first;
+    } rows[] = {
+        {"for the answer", false, false, 6,
+         [](scripted::line &end, const auto &cancel) {
+             end.request();
+             cancel();
+             end.await_end();
+         }},
+        {"for the answer under TLS, by a signal", true, true, 6,
+         [](scripted::line &end, const auto &cancel) {
+             end.request();
+             cancel();
+             end.await_end();
+         }},
+        {"for a reader", false, false, std::size_t{1} << 24,
+         [](scripted::line &end, const auto &cancel) {
+             end.bytes(1);
+             cancel();
+             end.await_end();
+         }},
+        {"for the handshake", false, true, 6,
+         [](scripted::line &end, const auto &cancel) {
+             end.bytes(1);
+             cancel();
+             end.await_end();
+         }},
+        {"for the next attempt", false, false, 6,
+         [](scripted::line &end, const auto &cancel) {
+             end.request();
+             end.send(http_answer("", "503 Later", "Connection: close\r\n"));
+             end.await_end();
+             cancel();
+         }},
+    };
+    struct sigaction action {
+    }, before;
+    action.sa_handler = [](int) { soap_cancel(signalled); };
+    sigaction(SIGUSR1, &action, &before);
+    for (const auto &row : rows) {
+        SCOPED_TRACE(row.rule);
+        const pthread_t caller = pthread_self();
+        std::atomic<bool> told = false;
+        const auto cancel = [&] {
+            if (row.by_signal)
+                pthread_kill(caller, SIGUSR1);
+            else
+                EXPECT_TRUE(soap_cancel(signalled));
+            told = true;
+            told.notify_one();
+        };
+        const scripted::server peer([&](scripted::line &end) { row.first(end, cancel); }, row.tls);
+        std::string endpoint = peer.endpoint();
+        if (std::strcmp(row.rule, "for the handshake") == 0)
+            endpoint.insert(4, "s");
+        zuv::options wanted = trusting();
+        wanted.connect_limit = wanted.send_limit = wanted.recv_limit = wanted.total_limit = 0s;
+        wanted.retry = {2, 60s, 60s};
+        zuv::profile_client client(endpoint, wanted);
+        ASSERT_EQ(soap_cancel_arm(client.context()), SOAP_OK);
+        signalled = client.context();
+        const auto began = std::chrono::steady_clock::now();
+        const profile_result result =
+            create_one(client, std::string(row.length, 'x'), zuv::extras().repeatable());
+        EXPECT_LT(std::chrono::steady_clock::now() - began, 10s);
+        told.wait(false); // soap_cancel must have returned before the client ends
+        EXPECT_EQ(result.failure().kind(), zuv::failure_kind::cancelled);
+        EXPECT_NE(result.failure().message().find("The call was cancelled"), std::string::npos)
+            << result.failure().message();
+        EXPECT_EQ(client.report().ended_by, ENDED_BY_CANCEL);
+        EXPECT_FALSE(soap_cancel(signalled)) << "nothing runs";
+        if (endpoint == peer.endpoint()) {
+            EXPECT_EQ(name_of(create_one(client)), "call-1") << "the client is usable afterwards";
+        }
+    }
+    sigaction(SIGUSR1, &before, nullptr);
 }
 
 TEST(client_options, reach_the_context)

@@ -2,6 +2,8 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <zuv_client_pro/soap_report.h>
+
 #include "support/scripted_client.h"
 #include "support/socket_calls.h"
 
@@ -34,6 +36,12 @@ const child_row CHILDREN[] = {
          return own->proxy.soap_force_close_socket() == 0 && own->call() == 0;
      },
      1},
+    {"can't cancel until it is armed itself",
+     [](std::unique_ptr<client> &own) {
+         const bool armed = soap_call_report(&own->proxy) == nullptr || soap_cancel(&own->proxy);
+         return !armed && soap_cancel_arm(&own->proxy) == SOAP_OK && own->call() == 0;
+     },
+     1},
     {"calls on a copy", [](std::unique_ptr<client> &own) { return client(*own).call() == 0; }, 1},
 };
 
@@ -61,6 +69,7 @@ TEST_F(forked, a_child_leaves_the_connections_of_its_parent_alone)
             SCOPED_TRACE(std::string(row.rule) + (tls ? ", TLS" : ", plain"));
             const crowd_server server(tls);
             auto own = std::make_unique<client>(server);
+            ASSERT_EQ(soap_cancel_arm(&own->proxy), SOAP_OK);
             ASSERT_EQ(own->call(), 0);
             const int socket = own->proxy.socket;
             EXPECT_EQ(child_that(row, own), NOTHING_SAID);

@@ -255,7 +255,9 @@ const obstacle OBSTACLES[] = {
      [](int socket, const end_of_call &) {
          loopback::write_text(socket, "HTTP/1.1 400 Bad Request\r\n\r\n");
      },
-     true, 0, SOAP_TLS_ERROR, "SSL_connect error in tcp_connect()", 0},
+     true, 0, SOAP_TLS_ERROR,
+     "SSL_connect error in tcp_connect(): the peer doesn't speak TLS on this port, which may be one for http",
+     0},
     {"an alert for a handshake",
      [](int socket, const end_of_call &) {
          loopback::write_text(socket, std::string("\x15\x03\x03\x00\x02\x02\x28", 7));

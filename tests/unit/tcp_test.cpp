@@ -5,6 +5,8 @@
 #include <netinet/tcp.h>
 #include <optional>
 
+#include <zuv_client_pro/soap_report.h>
+
 #include "net/tcp_socket.h"
 #include "support/tcp_client.h"
 
@@ -157,19 +159,23 @@ TEST_F(tcp, each_address_of_a_host_is_tried_in_turn_within_the_limit_for_each)
         int connect, call;
         std::uint32_t legacy;
         const char *text; // of the fault; null: connected
+        int tried;        // addresses
+        soap_ending ended_by = ENDED_BY_NOTHING;
     } cases[] = {
-        {"refused, no limit", "two.test", false, 0, 0, 0, nullptr},
-        {"refused, no limit, the older rule", "two.test", false, 0, 0, LEGACY_FIRST_ADDRESS, nullptr},
-        {"refused", "two.test", false, 5, 0, 0, nullptr},
-        {"refused late, the older rule", "two.test", false, 5, 0, LEGACY_FIRST_ADDRESS, "Connection refused"},
-        {"silent", "two.test", true, BRIEF_US, 0, 0, nullptr},
-        {"silent, the older rule", "two.test", true, BRIEF_US, 0, LEGACY_FIRST_ADDRESS, "Timeout"},
+        {"refused, no limit", "two.test", false, 0, 0, 0, nullptr, 2},
+        {"refused, no limit, the older rule", "two.test", false, 0, 0, LEGACY_FIRST_ADDRESS, nullptr, 2},
+        {"refused", "two.test", false, 5, 0, 0, nullptr, 2},
+        {"refused late, the older rule", "two.test", false, 5, 0, LEGACY_FIRST_ADDRESS, "Connection refused",
+         1},
+        {"silent", "two.test", true, BRIEF_US, 0, 0, nullptr, 2},
+        {"silent, the older rule", "two.test", true, BRIEF_US, 0, LEGACY_FIRST_ADDRESS, "Timeout", 1,
+         ENDED_BY_CONNECT_LIMIT},
         {"silent, until the call is over", "two.test", true, 5, BRIEF_US, 0,
-         "Operation interrupted or timed out (50000us call limit)"},
+         "Operation interrupted or timed out (50000us call limit)", 1, ENDED_BY_CALL_LIMIT},
         {"silent, then another endpoint", "two.test peer.test", true, BRIEF_US, 0, LEGACY_FIRST_ADDRESS,
-         nullptr},
-        {"IPv6 refused", "six.test", false, 5, 0, 0, nullptr},
-        {"as this machine has it", "localhost", false, 5, 0, 0, nullptr},
+         nullptr, 2},
+        {"IPv6 refused", "six.test", false, 5, 0, 0, nullptr, 2},
+        {"as this machine has it", "localhost", false, 5, 0, 0, nullptr, 0},
     };
     const peer server(wait_for_end, std::size(cases));
     for (const auto &c : cases) {
@@ -188,7 +194,41 @@ TEST_F(tcp, each_address_of_a_host_is_tried_in_turn_within_the_limit_for_each)
         EXPECT_EQ(ctx->socket >= 0, c.text == nullptr) << c.rule;
         if (c.text)
             expect_failure(ctx, 28, c.text, "connect failed in tcp_connect()");
+        soap_socket_release(ctx.get());
+        const soap_report &told = *soap_call_report(ctx.get());
+        EXPECT_EQ(told.ended_by, c.ended_by) << c.rule;
+        EXPECT_TRUE(told.addresses_tried == c.tried || c.tried == 0) << c.rule << told.addresses_tried;
+        EXPECT_EQ(told.connect_time >= told.lookup_time, c.text == nullptr) << c.rule;
+        EXPECT_EQ(told.peer,
+                  (c.text != nullptr ? "127.0.0.9:" : "127.0.0.1:") + std::to_string(server.port()))
+            << c.rule;
     }
+}
+
+TEST_F(tcp, a_cancelled_exchange_tries_no_further_address_and_the_next_one_is_not_cancelled)
+{
+    const peer server(wait_for_end);
+    const full_listener first("127.0.0.9", server.port());
+    const std::string endpoint = "http://two.test:" + std::to_string(server.port()) + "/";
+    context ctx;
+    EXPECT_FALSE(soap_cancel(ctx.get()));
+    ASSERT_EQ(soap_cancel_arm(ctx.get()), SOAP_OK);
+    EXPECT_FALSE(soap_cancel(ctx.get())) << "nothing runs";
+    {
+        const std::jthread other([&] {
+            while (!soap_cancel(ctx.get()))
+                std::this_thread::yield();
+        });
+        EXPECT_EQ(soap_server_connect(ctx.get(), (endpoint + " " + endpoint).c_str(), ""), SOAP_TCP_ERROR);
+    }
+    EXPECT_EQ(ctx.fault_text(), "The call was cancelled");
+    soap_socket_release(ctx.get());
+    EXPECT_FALSE(soap_cancel(ctx.get()));
+    EXPECT_EQ(soap_call_report(ctx.get())->ended_by, ENDED_BY_CANCEL);
+    EXPECT_LE(soap_call_report(ctx.get())->addresses_tried, 1);
+    ctx->connect_timeout = -50000;
+    EXPECT_EQ(soap_server_connect(ctx.get(), endpoint.c_str(), ""), SOAP_OK);
+    EXPECT_EQ(soap_call_report(ctx.get())->addresses_tried, 2);
 }
 
 TEST_F(tcp, a_new_connection_closes_the_old_one_through_the_hook)

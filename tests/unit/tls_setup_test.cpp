@@ -20,16 +20,18 @@ TEST_F(tls_setup, a_set_up_that_fails_says_why_and_leaves_no_context)
 {
     const std::string junk = ca().write("junk.pem", [](std::FILE *file) { std::fputs("junk\n", file); });
     const std::string lone = ca().ca_file(); // a certificate without a key
+    const std::string why = ": No such file or directory";
     const struct {
-        const char *key, *ca, *dh, *random, *detail;
+        const char *key, *ca, *dh, *random;
+        std::string detail;
     } cases[] = {
-        {nullptr, "/nonexistent", nullptr, nullptr, "Can't read CA file"},
-        {nullptr, junk.c_str(), nullptr, nullptr, "Can't read CA file"},
-        {"/nonexistent", nullptr, nullptr, nullptr, "Can't read certificate key file"},
-        {lone.c_str(), nullptr, nullptr, nullptr, "Can't read key file"},
-        {nullptr, nullptr, nullptr, "/nonexistent", "Can't load randomness"},
-        {nullptr, nullptr, "/nonexistent", nullptr, "Can't read DH file"},
-        {nullptr, nullptr, "511", nullptr, "Can't read DH file"},
+        {nullptr, "/nonexistent", nullptr, nullptr, "Can't read CA file: /nonexistent" + why},
+        {nullptr, junk.c_str(), nullptr, nullptr, "Can't read CA file: " + junk},
+        {"/nonexistent", nullptr, nullptr, nullptr, "Can't read certificate key file: /nonexistent" + why},
+        {lone.c_str(), nullptr, nullptr, nullptr, "Can't read key file: " + lone},
+        {nullptr, nullptr, nullptr, "/nonexistent", "Can't load randomness: /nonexistent" + why},
+        {nullptr, nullptr, "/nonexistent", nullptr, "Can't read DH file: /nonexistent" + why},
+        {nullptr, nullptr, "511", nullptr, "Can't read DH file: 511" + why},
         {nullptr, nullptr, junk.c_str(), nullptr, "Can't set DH parameters"},
         {nullptr, nullptr, "8193", nullptr, "Can't set DH parameters"},
     };
@@ -45,7 +47,7 @@ TEST_F(tls_setup, a_set_up_that_fails_says_why_and_leaves_no_context)
     context ctx;
     ctx->tls_crl = "/nonexistent";
     EXPECT_EQ(set_up_client(ctx), SOAP_TLS_ERROR);
-    EXPECT_EQ(ctx.fault_detail(), "Can't read CRL file");
+    EXPECT_EQ(ctx.fault_detail(), "Can't read CRL file: /nonexistent" + why);
 }
 
 TEST_F(tls_setup, a_second_set_up_replaces_the_first)
@@ -311,7 +313,7 @@ TEST_F(tls_setup, a_client_certificate_is_asked_for_and_verified)
     EXPECT_EQ(
         soap_ssl_client_context(wrong.get(), VERIFIED, good.c_str(), "wrong", nullptr, nullptr, nullptr),
         SOAP_TLS_ERROR);
-    EXPECT_EQ(wrong.fault_detail(), "Can't read key file");
+    EXPECT_EQ(wrong.fault_detail().rfind("Can't read key file: /", 0), 0U) << wrong.fault_detail();
     EXPECT_EQ(
         soap_ssl_client_context(wrong.get(), VERIFIED, good.c_str(), nullptr, nullptr, nullptr, nullptr),
         SOAP_TLS_ERROR)
