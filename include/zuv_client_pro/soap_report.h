@@ -61,7 +61,8 @@ ZUV_API const soap_report *soap_call_report(soap *ctx);
 
 // Lets soap_cancel end exchanges of this context from here on; until its end there is no way back. Exchanges
 // of an armed context wait before each transfer, as under a time limit: one system call more for each. A copy
-// of the context is not armed, nor is the context in a child process until the child arms it. To be called by the thread of the context, between exchanges.
+// of the context is not armed, nor is the context in a child process until the child arms it. To be called by
+// the thread of the context, between exchanges.
 //   SOAP_OK             armed; also if it was before
 //   SOAP_OUT_OF_MEMORY
 //   SOAP_FD_EXCEEDED    no descriptor was to be had, or only one of 1024 or over
