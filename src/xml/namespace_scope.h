@@ -27,12 +27,30 @@ constexpr std::size_t URI_SLOTS = 64;        // power of two
 constexpr std::size_t ROOT_BYTES_MAX = 4096; // for a remembered root element
 constexpr std::size_t RECEIVED_SIZE = 128;   // bytes; longer received URIs have blocks of their own
 constexpr std::size_t RECEIVED_KEPT = 4;     // blocks for received URIs that stay from call to call
+constexpr unsigned TAG_GUESS_BITS = 6;       // of the number of a tag_guess
 constexpr std::size_t ROOT_RECEIVED_MAX = 8; // rows that took a URI in it
 
 // Bytes in a row's own texts.
 struct namespace_lengths {
     std::size_t prefix, uri;
     std::size_t pattern_head; // of the pattern, before its first "*" or "-"
+};
+
+// The start tag that came after another in the last messages, with what was found out about it: a guess at the
+// next one. Who guesses says what it follows.
+struct tag_guess {
+    static constexpr std::size_t SIZE = 32;
+
+    const void *table;         // of names that it was looked up in; null: no guess
+    std::uint8_t last;         // place in the table of the tag before it
+    std::uint8_t next;         // its own
+    bool doubtful;             // it was wrong the last time
+    std::uint8_t prefix_place; // in soap::prefix_cache
+    std::uint8_t local;        // offset of the local name in the tag's name
+    std::uint8_t length;       // bytes of `text`
+    char text[SIZE];           // "<", the name in bytes below 128, ">"
+    std::uint64_t changes;     // soap_namespace_scope::prefix_changes when that place held its prefix
+    const char *row_prefix;    // of the table's row: the one asked for; null if another was
 };
 
 // The declarations of the last message's root element, with what became of them; see root_head.h.
@@ -65,9 +83,12 @@ struct soap_namespace_scope {
     std::size_t spare_attribute_count;
     soap_namespace *spare_table; // room for row_count rows and their end; null while it is the working copy
     remembered_root root;
-    char *received[RECEIVED_KEPT]; // blocks of RECEIVED_SIZE for received URIs; owned; null until first use
-    unsigned received_used;        // bit n: a row has received[n]
-    std::uint8_t tag_prefix;       // the reader's last tag: place of its prefix in soap::prefix_cache
+    char *received[RECEIVED_KEPT];   // blocks of RECEIVED_SIZE for received URIs; owned; null until first use
+    unsigned received_used;          // bit n: a row has received[n]
+    std::uint8_t tag_prefix;         // the reader's last tag: place of its prefix in soap::prefix_cache
+    std::uint64_t prefix_changes[8]; // how often each place of soap::prefix_cache took another prefix
+    tag_guess
+        guesses[(1U << TAG_GUESS_BITS) + 3]; // where one may stand in any of four places from its number on
 
     const soap_namespace *rows;       // copy of the rows described, without received URIs; owned with lengths
     const namespace_lengths *lengths; // of each row

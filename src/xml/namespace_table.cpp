@@ -51,6 +51,7 @@ bool is_measured(const soap_namespace_scope *scope, const soap_namespace *table)
 void forget_rows(soap *ctx, soap_namespace_scope *scope)
 {
     xml_root_forget(ctx);
+    std::memset(scope->guesses, 0, sizeof scope->guesses); // they know prefixes of rows
     SOAP_FREE(ctx, scope->spare_table);
     scope->spare_table = nullptr;
     SOAP_FREE(ctx, scope->declarations);
@@ -176,6 +177,18 @@ void give_received(soap *ctx, char *received)
     SOAP_FREE(ctx, received);
 }
 
+// Gives the rows of a new copy the URIs that the host's rows have received. 0 or 20.
+int copy_received(soap *ctx, soap_namespace *rows, std::size_t count)
+{
+    std::for_each(rows, rows + count, [](soap_namespace &row) { row.received = nullptr; });
+    for (std::size_t i = 0; i < count; ++i) {
+        const char *received = ctx->namespaces[i].received;
+        if (received != nullptr && xml_received_set(ctx, rows[i], received))
+            return ctx->error;
+    }
+    return SOAP_OK;
+}
+
 // A row is about to stand for another URI: declarations of the held element that are bound to it become
 // attributes while it still tells what they said. 0 or 20.
 int keep_declared(soap *ctx, const soap_namespace &row, const char *uri)
@@ -250,13 +263,10 @@ int soap_namespace_table_copy(soap *ctx)
         return fail(ctx, SOAP_OUT_OF_MEMORY);
     std::copy_n(ctx->namespaces, count + 1, rows);
     ctx->local_namespaces = rows;
-    std::for_each(rows, rows + count + 1, [](soap_namespace &row) { row.received = nullptr; });
-    for (std::size_t i = 0; i < count; ++i) {
-        const char *received = ctx->namespaces[i].received;
-        if (received != nullptr && xml_received_set(ctx, rows[i], received)) {
-            soap_namespace_table_drop(ctx);
-            return ctx->error;
-        }
+    rows[count].received = nullptr;
+    if (!measured && copy_received(ctx, rows, count)) {
+        soap_namespace_table_drop(ctx);
+        return ctx->error;
     }
     if (count > 0)
         ctx->soap_version =

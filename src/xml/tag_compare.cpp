@@ -17,6 +17,7 @@ namespace {
 
 constexpr std::size_t CACHE_SIZE = sizeof(soap::prefix_cache) / sizeof(soap_prefix_cache);
 static_assert((CACHE_SIZE & (CACHE_SIZE - 1)) == 0 && CACHE_SIZE <= 8);
+static_assert(CACHE_SIZE == sizeof(soap_namespace_scope::prefix_changes) / sizeof(std::uint64_t));
 
 bool is_xml_prefix(const char *text, std::size_t length)
 {
@@ -116,6 +117,9 @@ int xml_prefix_row(soap *ctx, const char *prefix, std::size_t length)
         return entry.row;
     const int row = search_stack(ctx, prefix, length);
     if (length <= sizeof entry.text) {
+        const bool other = entry.length != length || !same_name(entry.text, prefix, length);
+        if (other && ctx->namespace_scope != nullptr)
+            ++ctx->namespace_scope->prefix_changes[place];
         std::memcpy(entry.text, prefix, length);
         entry.length = static_cast<std::uint8_t>(length);
         entry.row = static_cast<std::int16_t>(row);

@@ -200,6 +200,20 @@ std::string_view declared_encoding(const char *instruction)
                           : std::string_view();
 }
 
+// The declaration that most documents begin with, up to and with its second "?", if it is whole in the buffer
+// and a byte follows. False: nothing was consumed.
+bool take_usual_declaration(soap *ctx)
+{
+    constexpr std::string_view usual = "xml version=\"1.0\" encoding=\"UTF-8\"?";
+    const char *const here = input_here(ctx);
+    if (ctx->look_ahead != 0 || input_end(ctx) - here <= static_cast<std::ptrdiff_t>(usual.size()) ||
+        !same_name(here, usual.data(), usual.size()))
+        return false;
+    ctx->mode &= ~ENCODING_MODES;
+    input_consume(ctx, here + usual.size());
+    return true;
+}
+
 } // namespace
 
 std::int32_t xml_markup_next(soap *ctx)
@@ -247,6 +261,8 @@ std::int32_t soap_char_next_utf8(soap *ctx)
 
 std::int32_t soap_pi_read(soap *ctx)
 {
+    if (take_usual_declaration(ctx))
+        return soap_recv_byte(ctx);
     char text[INSTRUCTION_TEXT_MAX + 1];
     std::size_t kept = 0;
     std::int32_t byte = XML_EOF;
