@@ -69,14 +69,14 @@ std::size_t instance_recycle(soap *ctx, soap_instance *instance)
 {
     if (instance->delete_hook != soap_delete_object)
         return 0;
-    const type_entry *entry = type_entry_of(instance->type_id);
-    if (entry == nullptr)
-        return 0;
-    if (entry->kind == type_kind::text) {
+    if (instance->type_id == TEXT_TYPE_ID) {
         auto &text = *static_cast<std::string *>(instance->object);
         const std::size_t bytes = sizeof text + allocated(text);
         return idle_has_room(ctx, TEXT_TYPE_ID, bytes) ? sizeof text + release_text(text) : 0;
     }
+    const type_entry *entry = type_entry_of(instance->type_id);
+    if (entry == nullptr)
+        return 0;
     return entry->kind == type_kind::object ? entry->ops->recycle(instance->object, ctx) : 0;
 }
 

@@ -59,6 +59,8 @@ int parse_host(soap *ctx, const char *value)
 // in place of one for each.
 bool is_simple_type(const char *type)
 {
+    if (std::strcmp(type, "text/xml; charset=utf-8") == 0) // as nearly all say
+        return true;
     for (;; ++type) {
         while (*type == ' ' || *type == '\t')
             ++type;
@@ -142,7 +144,7 @@ int parse_transfer_encoding(soap *ctx, const char *value)
 // The peer's consent is pending until the version of its HTTP is known.
 int parse_connection(soap *ctx, const char *value)
 {
-    if (soap_tag_match(value, "keep-alive") == 0)
+    if (std::strcmp(value, "keep-alive") == 0 || soap_tag_match(value, "keep-alive") == 0)
         ctx->keep_alive = static_cast<std::int16_t>(-ctx->keep_alive);
     else if (soap_tag_match(value, "close") == 0)
         ctx->keep_alive = 0;
@@ -237,7 +239,7 @@ int parse_forwarded_for(soap *ctx, const char *value)
 }
 
 struct header_row {
-    const char *key; // pattern of soap_tag_match without a "*"
+    std::string_view key; // pattern of soap_tag_match without a "*", terminated
     int (*parse)(soap *ctx, const char *value);
 };
 
@@ -267,14 +269,25 @@ constexpr auto ROWS_OF_LETTER = [] {
     return rows;
 }();
 
+// A key matches up to its first quote, if it has one; most are spelled as in the table.
+bool matches(const char *key, std::size_t length, std::string_view pattern)
+{
+    if (length < pattern.size())
+        return false;
+    return (length == pattern.size() && std::memcmp(key, pattern.data(), length) == 0) ||
+           ((length == pattern.size() || key[pattern.size()] == '"') &&
+            soap_tag_match(key, pattern.data()) == 0);
+}
+
 } // namespace
 
 int http_parse_header(soap *ctx, const char *key, const char *value)
 {
+    const std::size_t length = std::strlen(key);
     std::uint32_t left = ROWS_OF_LETTER[static_cast<unsigned char>(*key) % LETTERS];
     for (; left != 0; left &= left - 1) {
         const header_row &row = HEADERS[__builtin_ctz(left)];
-        if (soap_tag_match(key, row.key) == 0)
+        if (matches(key, length, row.key))
             return row.parse(ctx, value);
     }
     return SOAP_OK;

@@ -82,6 +82,8 @@ struct soap_namespace_scope {
     soap_attribute *spare_attributes; // linked by next
     std::size_t spare_attribute_count;
     soap_namespace *spare_table; // room for row_count rows and their end; null while it is the working copy
+    const soap_namespace
+        *copy; // the working copy, with room for row_count rows and their end; null if there is none
     remembered_root root;
     char *received[RECEIVED_KEPT];   // blocks of RECEIVED_SIZE for received URIs; owned; null until first use
     unsigned received_used;          // bit n: a row has received[n]

@@ -40,6 +40,9 @@ bool same_texts(const soap_namespace &one, const soap_namespace &other)
 // table differs from the row in its place, so nothing after it is looked at.
 bool is_measured(const soap_namespace_scope *scope, const soap_namespace *table)
 {
+    if (scope != nullptr && scope->copy != nullptr && table == scope->copy) // which has as many rows
+        return std::memcmp(scope->rows, table, scope->row_count * sizeof *table) == 0 &&
+               table[scope->row_count].prefix == nullptr;
     const auto same_row = [](const soap_namespace &one, const soap_namespace &other) {
         return same_texts(one, other) && one.received == other.received;
     };
@@ -263,6 +266,7 @@ int soap_namespace_table_copy(soap *ctx)
         return fail(ctx, SOAP_OUT_OF_MEMORY);
     std::copy_n(ctx->namespaces, count + 1, rows);
     ctx->local_namespaces = rows;
+    ctx->namespace_scope->copy = rows;
     rows[count].received = nullptr;
     if (!measured && copy_received(ctx, rows, count)) {
         soap_namespace_table_drop(ctx);
@@ -286,6 +290,8 @@ void soap_namespace_table_drop(soap *ctx)
         xml_received_drop(ctx, *row);
     }
     soap_namespace_scope *scope = ctx->namespace_scope;
+    if (scope != nullptr)
+        scope->copy = nullptr;
     if (scope != nullptr && scope->spare_table == nullptr &&
         scope->row_count == static_cast<std::size_t>(row - ctx->local_namespaces))
         scope->spare_table = ctx->local_namespaces;

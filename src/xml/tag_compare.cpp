@@ -101,6 +101,21 @@ name_parts split_name(soap *ctx, const char *name)
     return {colon + 1, static_cast<std::size_t>(colon - name)};
 }
 
+// soap_prefix_compare of a prefix whose row is known.
+int compare_row(soap *ctx, int row, const char *read, const char *asked, std::size_t read_length,
+                std::size_t asked_length)
+{
+    if ((ctx->mode & MODE_IGNORE_NAMESPACES) != 0)
+        return SOAP_OK;
+    if (is_xml_prefix(read, read_length) && is_xml_prefix(asked, asked_length) && row == TAG_ROW_UNBOUND)
+        return SOAP_OK;
+    if (row == TAG_ROW_UNDECLARED)
+        return fail(ctx, SOAP_SYNTAX_ERROR);
+    if (row < 0)
+        return SOAP_NAMESPACE_ERROR;
+    return namespace_row_has_prefix(ctx, row, asked, asked_length) ? 0 : SOAP_NAMESPACE_ERROR;
+}
+
 } // namespace
 
 int xml_prefix_row(soap *ctx, const char *prefix, std::size_t length)
@@ -148,15 +163,7 @@ int soap_prefix_compare(soap *ctx, const char *read, const char *asked, std::siz
                         std::size_t asked_length)
 {
     const int row = xml_prefix_row(ctx, read, read_length);
-    if ((ctx->mode & MODE_IGNORE_NAMESPACES) != 0)
-        return SOAP_OK;
-    if (is_xml_prefix(read, read_length) && is_xml_prefix(asked, asked_length) && row == TAG_ROW_UNBOUND)
-        return SOAP_OK;
-    if (row == TAG_ROW_UNDECLARED)
-        return fail(ctx, SOAP_SYNTAX_ERROR);
-    if (row < 0)
-        return SOAP_NAMESPACE_ERROR;
-    return namespace_row_has_prefix(ctx, row, asked, asked_length) ? 0 : SOAP_NAMESPACE_ERROR;
+    return compare_row(ctx, row, read, asked, read_length, asked_length);
 }
 
 int soap_tag_compare(soap *ctx, const char *read, const char *asked)
@@ -174,7 +181,8 @@ int soap_tag_compare(soap *ctx, const char *read, const char *asked)
         return SOAP_TAG_MISMATCH;
     if (asked_colon == asked)
         return SOAP_OK;
-    const int error = soap_prefix_compare(ctx, read, asked, name.prefix_length,
-                                          static_cast<std::size_t>(asked_colon - asked));
+    const int row = read == ctx->tag ? ctx->tag_row : xml_prefix_row(ctx, read, name.prefix_length);
+    const int error =
+        compare_row(ctx, row, read, asked, name.prefix_length, static_cast<std::size_t>(asked_colon - asked));
     return error == SOAP_NAMESPACE_ERROR ? SOAP_TAG_MISMATCH : error;
 }
