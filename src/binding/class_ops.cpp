@@ -210,44 +210,44 @@ step take_member(soap *ctx, const member_table &members, const member_head &head
     return step::unknown;
 }
 
-bool is_after(const tag_guess &guess, const member_table &members, std::size_t last)
+// What comes after the member `last`, where NO_MEMBER stands for the start tag: a number that no other place
+// of a class has, well mixed.
+std::uint64_t place_after(const member_table &members, std::size_t last)
 {
-    return guess.table == &members && guess.last == last;
+    return (reinterpret_cast<std::uintptr_t>(&members) + (static_cast<std::uint64_t>(last) << 56)) *
+           UINT64_C(0x9E3779B97F4A7C15);
 }
 
-// The guess at what comes after the member `last`, where NO_MEMBER stands for the start tag, or the place of
-// one to make: a free one of the few that it may stand in, or the first.
-tag_guess &guess_after(soap_namespace_scope &scope, const member_table &members, std::size_t last)
+// The guess at it, or the place for one to make: a free one of the few that it may stand in, or the first.
+tag_guess &guess_of(soap_namespace_scope &scope, std::uint64_t place)
 {
-    constexpr std::size_t PROBES = 4;
-    const std::uint64_t key = reinterpret_cast<std::uintptr_t>(&members) + (last << 32);
-    tag_guess *const first = &scope.guesses[key * 0x9E3779B97F4A7C15U >> (64 - TAG_GUESS_BITS)];
-    static_assert(sizeof scope.guesses / sizeof *scope.guesses == (1U << TAG_GUESS_BITS) + PROBES - 1);
-    for (tag_guess *guess = first; guess != first + PROBES; ++guess) {
-        if (is_after(*guess, members, last) || guess->table == nullptr)
+    tag_guess *const first = &scope.guesses[place >> (64 - TAG_GUESS_BITS)];
+    for (tag_guess *guess = first; guess != first + TAG_GUESS_PROBES; ++guess) {
+        if (guess->after == place || guess->after == 0)
             return *guess;
     }
     return *first;
 }
 
+constexpr char NO_ROW = '\0'; // no row's prefix is at its address
+
 // Puts right a guess that was wrong twice.
-void learn(const soap *ctx, tag_guess &guess, const member_table &members, std::size_t last,
+void learn(const soap *ctx, tag_guess &guess, const member_table &members, std::uint64_t place,
            const member_head &head)
 {
-    if (is_after(guess, members, last) && !guess.doubtful) {
+    if (guess.after == place && !guess.doubtful) {
         guess.doubtful = true;
         return;
     }
     if (head.member == NO_MEMBER || !xml_head_guess(ctx, guess))
         return;
     const member_entry &entry = members.entries[head.member];
-    guess.table = &members;
-    guess.last = static_cast<std::uint8_t>(last);
+    guess.after = place;
     guess.next = static_cast<std::uint8_t>(head.member);
     guess.doubtful = false;
     const bool asks =
         ctx->local_namespaces == nullptr || asked_tag(ctx, head.tag, entry.tag, entry.local) != nullptr;
-    guess.row_prefix = asks ? nullptr : ctx->local_namespaces[head.tag.row].prefix;
+    guess.row_prefix = asks ? &NO_ROW : ctx->local_namespaces[head.tag.row].prefix;
 }
 
 enum class next_thing { element, end_taken, none };
@@ -257,15 +257,14 @@ enum class next_thing { element, end_taken, none };
 next_thing read_next_head(soap *ctx, const member_table &members, bool may_end, member_head &head)
 {
     soap_namespace_scope *const scope = ctx->namespace_scope;
-    const std::size_t last = head.member;
-    tag_guess *const guess = scope != nullptr ? &guess_after(*scope, members, last) : nullptr;
-    if (guess != nullptr && is_after(*guess, members, last) &&
-        xml_guessed_head_read(ctx, *guess, &head.tag)) {
+    const std::uint64_t place = place_after(members, head.member);
+    tag_guess *const guess = scope != nullptr ? &guess_of(*scope, place) : nullptr;
+    if (guess != nullptr && guess->after == place && xml_guessed_head_read(ctx, *guess, &head.tag)) {
+        const soap_namespace *const table = ctx->local_namespaces;
         guess->doubtful = false;
         head.member = guess->next;
-        head.asks_nothing = guess->row_prefix != nullptr && ctx->local_namespaces != nullptr &&
-                            !strict(ctx) && head.tag.row >= 0 &&
-                            ctx->local_namespaces[head.tag.row].prefix == guess->row_prefix;
+        head.asks_nothing = head.tag.row >= 0 && table != nullptr &&
+                            table[head.tag.row].prefix == guess->row_prefix && !strict(ctx);
         return next_thing::element;
     }
     if (may_end && xml_next_end_read(ctx))
@@ -276,7 +275,7 @@ next_thing read_next_head(soap *ctx, const member_table &members, bool may_end, 
     head.member = first_member(members, head.tag);
     head.asks_nothing = false;
     if (guess != nullptr)
-        learn(ctx, *guess, members, last, head);
+        learn(ctx, *guess, members, place, head);
     return next_thing::element;
 }
 

@@ -49,7 +49,8 @@ std::size_t release_text(std::string &text)
     return allocated(text);
 }
 
-void release_texts(soap *owner, std::vector<std::string> &texts)
+// Out of line, so that the many vectors without texts cost next to nothing.
+[[gnu::noinline]] static void release_each(soap *owner, std::vector<std::string> &texts)
 {
     for (std::size_t i = texts.size(); i-- > 0;) {
         std::string &text = texts[i];
@@ -63,6 +64,12 @@ void release_texts(soap *owner, std::vector<std::string> &texts)
         static_cast<std::string *>(shell->object)->swap(text);
         idle_give(owner, TEXT_TYPE_ID, shell, bytes);
     }
+}
+
+void release_texts(soap *owner, std::vector<std::string> &texts)
+{
+    if (!texts.empty())
+        release_each(owner, texts);
 }
 
 std::size_t instance_recycle(soap *ctx, soap_instance *instance)

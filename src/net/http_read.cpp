@@ -170,9 +170,9 @@ int read_final_head(soap *ctx, head_state &head)
 // Where the protocol's name stands in the start line; the last place, as a request's path may hold it too.
 const char *find_version(const char *start_line)
 {
-    const char *found = std::strncmp(start_line, "HTTP/", 5) == 0 ? start_line : nullptr;
-    if (found != nullptr)
-        return found;
+    const char *found = nullptr;
+    if (std::memcmp(start_line, "HTTP/", 5) == 0) // in message_text, which has as many bytes
+        return start_line;
     for (const char *p = start_line; (p = std::strstr(p, "HTTP/")) != nullptr; p += 5)
         found = p;
     return found;

@@ -41,9 +41,10 @@ class wait_set {
 public:
     wait_set(bool wanted, int socket) : wanted_(wanted), socket_(socket)
     {
+        if (!wanted_)
+            return;
         FD_ZERO(&set_);
-        if (wanted_)
-            FD_SET(socket_, &set_);
+        FD_SET(socket_, &set_);
     }
     fd_set *get() { return wanted_ ? &set_ : nullptr; }
     bool ready() const { return wanted_ && FD_ISSET(socket_, &set_); }

@@ -116,6 +116,14 @@ int compare_row(soap *ctx, int row, const char *read, const char *asked, std::si
     return namespace_row_has_prefix(ctx, row, asked, asked_length) ? 0 : SOAP_NAMESPACE_ERROR;
 }
 
+// The held tag is spelled as the one asked for, and its prefix stands for the row of that name.
+bool is_spelled_so(soap *ctx, const char *asked)
+{
+    const tag_view held = soap_held_tag(ctx);
+    return held.row >= 0 && ctx->tag_local > 1 && std::strcmp(ctx->tag, asked) == 0 &&
+           namespace_row_has_prefix(ctx, held.row, asked, ctx->tag_local - 1U);
+}
+
 } // namespace
 
 int xml_prefix_row(soap *ctx, const char *prefix, std::size_t length)
@@ -172,6 +180,8 @@ int soap_tag_compare(soap *ctx, const char *read, const char *asked)
         return SOAP_OK;
     if (read == nullptr)
         return SOAP_TAG_MISMATCH;
+    if (read == ctx->tag && is_spelled_so(ctx, asked))
+        return SOAP_OK;
     const name_parts name = split_name(ctx, read);
     const char *asked_colon = std::strchr(asked, ':');
     if (asked_colon == nullptr)

@@ -90,12 +90,31 @@ int find_start_tag_slow(soap *ctx)
     return no_tag(ctx, SOAP_NO_TAG);
 }
 
+// The place after the usual XML declaration, if that stands at `p`, which begins an instruction, and a start
+// tag follows in the buffer; else `p`.
+const char *after_usual_declaration(soap *ctx, const char *p, const char *end)
+{
+    constexpr std::string_view usual = XML_USUAL_DECLARATION;
+    if (static_cast<std::size_t>(end - p) < 2 + usual.size() || !same_name(p + 2, usual.data(), usual.size()))
+        return p;
+    const char *next = p + 2 + usual.size();
+    while (next != end && is_blank(static_cast<unsigned char>(*next)))
+        ++next;
+    if (end - next < 2 || next[0] != '<' || static_cast<unsigned char>(next[1]) <= '?')
+        return p;
+    ctx->mode &= ~ENCODING_MODES;
+    return next;
+}
+
 // Consumes up to and including the "<" of the next start tag; 0, or an error with no tag held.
 int find_start_tag(soap *ctx)
 {
     if (ctx->look_ahead == 0 && ctx->in_cdata == CDATA_OUTSIDE) {
-        const char *const p = xml_after_blanks(ctx);
-        if (input_end(ctx) - p >= 2 && p[0] == '<') {
+        const char *p = xml_after_blanks(ctx);
+        const char *const end = input_end(ctx);
+        if (end - p >= 2 && p[0] == '<') {
+            if (p[1] == '?')
+                p = after_usual_declaration(ctx, p, end);
             if (static_cast<unsigned char>(p[1]) > '?') { // none of the marks that lead to something else
                 input_consume(ctx, p + 1);
                 return SOAP_OK;

@@ -200,20 +200,6 @@ std::string_view declared_encoding(const char *instruction)
                           : std::string_view();
 }
 
-// The declaration that most documents begin with, up to and with its second "?", if it is whole in the buffer
-// and a byte follows. False: nothing was consumed.
-bool take_usual_declaration(soap *ctx)
-{
-    constexpr std::string_view usual = "xml version=\"1.0\" encoding=\"UTF-8\"?";
-    const char *const here = input_here(ctx);
-    if (ctx->look_ahead != 0 || input_end(ctx) - here <= static_cast<std::ptrdiff_t>(usual.size()) ||
-        !same_name(here, usual.data(), usual.size()))
-        return false;
-    ctx->mode &= ~ENCODING_MODES;
-    input_consume(ctx, here + usual.size());
-    return true;
-}
-
 } // namespace
 
 std::int32_t xml_markup_next(soap *ctx)
@@ -261,8 +247,14 @@ std::int32_t soap_char_next_utf8(soap *ctx)
 
 std::int32_t soap_pi_read(soap *ctx)
 {
-    if (take_usual_declaration(ctx))
-        return soap_recv_byte(ctx);
+    constexpr std::string_view usual = XML_USUAL_DECLARATION;
+    const char *const begin = input_here(ctx);
+    if (ctx->look_ahead == 0 && static_cast<std::size_t>(input_end(ctx) - begin) >= usual.size() &&
+        same_name(begin, usual.data(), usual.size())) {
+        ctx->mode &= ~ENCODING_MODES;
+        input_consume(ctx, begin + usual.size());
+        return usual.back();
+    }
     char text[INSTRUCTION_TEXT_MAX + 1];
     std::size_t kept = 0;
     std::int32_t byte = XML_EOF;
