@@ -399,12 +399,12 @@ TEST_F(binding, short_ways_and_what_earlier_messages_taught_change_nothing)
     }
     const std::string state = "<protocolProfile:state>active</protocolProfile:state>";
     const auto contact = [](const std::string &members) {
-        return "<protocolProfile:contact>" + members + "</protocolProfile:contact>";
+        return "<protocol:contact>" + members + "</protocol:contact>";
     };
     const std::string name = "<protocol:name>A</protocol:name>", mail = "<protocol:email>B</protocol:email>";
     const auto in_prefix = [&](const std::string &attribute, const std::string &prefix) {
-        return "<protocolProfile:contact " + attribute + ">" + "<" + prefix + "name>A</" + prefix + "name><" +
-               prefix + "email>B</" + prefix + "email></protocolProfile:contact>" + contact(name + mail);
+        return "<protocol:contact " + attribute + ">" + "<" + prefix + "name>A</" + prefix + "name><" +
+               prefix + "email>B</" + prefix + "email></protocol:contact>" + contact(name + mail);
     };
     const std::string contents[] = {
         state + contact(name + mail) + contact(name),
@@ -418,6 +418,8 @@ TEST_F(binding, short_ways_and_what_earlier_messages_taught_change_nothing)
         in_prefix("xmlns='" + uri + "'", ""),
         in_prefix("xmlns='urn:other'", ""),
         in_prefix("xmlns:q='urn:other' xmlns:\xC3\xA9='" + uri + "'", "\xC3\xA9:"),
+        // "u" and "protocol" have one place in the memory of prefixes
+        "<protocol:contact xmlns:u='urn:other'><u:x/>" + name + "</protocol:contact>",
         in_prefix("", "undeclared:"),
         contact("<protocol:name xsi:nil='true'/><protocol:email a='b'>B</protocol:email>" + name),
         contact("<protocol:name>A &amp;&lt;&#65;<![CDATA[&]]>\xC3\xA9</protocol:name>" + mail),
@@ -429,7 +431,7 @@ TEST_F(binding, short_ways_and_what_earlier_messages_taught_change_nothing)
         contact("<protocol:name>A</protocol:nam>" + mail),
         contact("<protocol:name>A<protocol:email>B</protocol:email></protocol:name>"),
         contact(name + "</protocol:\xFF>") + state,
-        "<protocolProfile:contact>" + name,
+        "<protocol:contact>" + name,
     };
     for (const std::uint32_t mode : {0U, MODE_UTF_STRINGS, MODE_LATIN1, MODE_STRICT | MODE_UTF_STRINGS}) {
         for (const std::string &content : contents) {
