@@ -18,6 +18,7 @@
 #include "core/message_store.h"
 #include "xml/namespace_scope.h"
 #include "xml/tag_view.h"
+#include "xml/xml_read.h"
 #include "xml/xml_scan.h"
 
 namespace binding {
@@ -179,17 +180,26 @@ std::size_t next_member(const member_table &members, std::size_t index)
     return members.next_same[index] != 0 ? members.next_same[index] - 1U : NO_MEMBER;
 }
 
+// A start tag that is held.
+struct member_head {
+    tag_view tag;
+    std::size_t member; // the first with its local name, or NO_MEMBER
+    bool asks_nothing;  // the tag's namespace is known to be that of this member, and needn't be asked for
+};
+
 // Gives the held element to the member that it names. The members with its local name are tried in order.
-step take_member(soap *ctx, const member_table &members, void *object, std::uint64_t &seen)
+step take_member(soap *ctx, const member_table &members, const member_head &head, void *object,
+                 std::uint64_t &seen)
 {
-    const tag_view tag = soap_held_tag(ctx);
-    std::size_t index = first_member(members, tag);
-    for (; index != NO_MEMBER; index = next_member(members, index)) {
+    bool asks_nothing = head.asks_nothing;
+    for (std::size_t index = head.member; index != NO_MEMBER; index = next_member(members, index)) {
         const member_entry &entry = members.entries[index];
         const std::uint64_t bit = std::uint64_t{1} << index;
+        const char *const asked = asks_nothing ? nullptr : asked_tag(ctx, head.tag, entry.tag, entry.local);
+        asks_nothing = false;
         if ((seen & bit) != 0)
             continue;
-        if (entry.read(ctx, asked_tag(ctx, tag, entry.tag, entry.local), object)) {
+        if (entry.read(ctx, asked, object)) {
             if (entry.single)
                 seen |= bit;
             return step::consumed;
@@ -200,19 +210,92 @@ step take_member(soap *ctx, const member_table &members, void *object, std::uint
     return step::unknown;
 }
 
-// Reads all elements up to the end of the parent, in any order. `seen` takes the single members that were
-// met.
-bool read_elements(soap *ctx, const member_table &members, void *object, std::uint64_t &seen)
+// What comes after the member `last`, where NO_MEMBER stands for the start tag: a number that no other place
+// of a class has, well mixed.
+std::uint64_t place_after(const member_table &members, std::size_t last)
 {
-    for (;;) {
-        if (soap_element_head_read(ctx))
-            return ctx->error == SOAP_NO_TAG;
+    return (reinterpret_cast<std::uintptr_t>(&members) + (static_cast<std::uint64_t>(last) << 56)) *
+           UINT64_C(0x9E3779B97F4A7C15);
+}
+
+// The guess at it, or the place for one to make: a free one of the few that it may stand in, or the first.
+tag_guess &guess_of(soap_namespace_scope &scope, std::uint64_t place)
+{
+    tag_guess *const first = &scope.guesses[place >> (64 - TAG_GUESS_BITS)];
+    for (tag_guess *guess = first; guess != first + TAG_GUESS_PROBES; ++guess) {
+        if (guess->after == place || guess->after == 0)
+            return *guess;
+    }
+    return *first;
+}
+
+constexpr char NO_ROW = '\0'; // no row's prefix is at its address
+
+// Puts right a guess that was wrong twice.
+void learn(const soap *ctx, tag_guess &guess, const member_table &members, std::uint64_t place,
+           const member_head &head)
+{
+    if (guess.after == place && !guess.doubtful) {
+        guess.doubtful = true;
+        return;
+    }
+    if (head.member == NO_MEMBER || !xml_head_guess(ctx, guess))
+        return;
+    const member_entry &entry = members.entries[head.member];
+    guess.after = place;
+    guess.next = static_cast<std::uint8_t>(head.member);
+    guess.doubtful = false;
+    const bool asks =
+        ctx->local_namespaces == nullptr || asked_tag(ctx, head.tag, entry.tag, entry.local) != nullptr;
+    guess.row_prefix = asks ? &NO_ROW : ctx->local_namespaces[head.tag.row].prefix;
+}
+
+enum class next_thing { element, end_taken, none };
+
+// Holds the next start tag, mostly the one that came after head.member the last time. `may_end`: an end tag in
+// its place may be taken at once.
+next_thing read_next_head(soap *ctx, const member_table &members, bool may_end, member_head &head)
+{
+    soap_namespace_scope *const scope = ctx->namespace_scope;
+    const std::uint64_t place = place_after(members, head.member);
+    tag_guess *const guess = scope != nullptr ? &guess_of(*scope, place) : nullptr;
+    if (guess != nullptr && guess->after == place && xml_guessed_head_read(ctx, *guess, &head.tag)) {
+        const soap_namespace *const table = ctx->local_namespaces;
+        guess->doubtful = false;
+        head.member = guess->next;
+        head.asks_nothing = head.tag.row >= 0 && table != nullptr &&
+                            table[head.tag.row].prefix == guess->row_prefix && !strict(ctx);
+        return next_thing::element;
+    }
+    if (may_end && xml_next_end_read(ctx))
+        return next_thing::end_taken;
+    if (soap_element_head_read(ctx))
+        return next_thing::none;
+    head.tag = soap_held_tag(ctx);
+    head.member = first_member(members, head.tag);
+    head.asks_nothing = false;
+    if (guess != nullptr)
+        learn(ctx, *guess, members, place, head);
+    return next_thing::element;
+}
+
+// Reads all elements up to the end of the parent, in any order, and the end tag; `seen` takes the single
+// members that were met.
+bool read_elements(soap *ctx, const member_table &members, const char *tag, void *object, std::uint64_t &seen)
+{
+    const bool may_end = tag == nullptr || *tag != '-';
+    for (member_head head = {{}, NO_MEMBER, false};;) {
+        const next_thing next = read_next_head(ctx, members, may_end, head);
+        if (next == next_thing::end_taken)
+            return true;
+        if (next == next_thing::none)
+            return ctx->error == SOAP_NO_TAG && soap_element_in_end(ctx, tag) == 0;
         fail(ctx, SOAP_TAG_MISMATCH);
-        const step taken = take_member(ctx, members, object, seen);
+        const step taken = take_member(ctx, members, head, object, seen);
         if (taken == step::failed)
             return false;
         if (taken == step::unknown && soap_element_skip(ctx))
-            return ctx->error == SOAP_NO_TAG;
+            return ctx->error == SOAP_NO_TAG && soap_element_in_end(ctx, tag) == 0;
     }
 }
 
@@ -270,7 +353,7 @@ void *read_members(soap *ctx, const class_ops &ops, const char *tag, void *objec
 void *read_further_members(soap *ctx, const class_ops &ops, const char *tag, void *object)
 {
     std::uint64_t seen = 0;
-    if (!read_elements(ctx, *ops.members, object, seen) || soap_element_in_end(ctx, tag))
+    if (!read_elements(ctx, *ops.members, tag, object, seen))
         return nullptr;
     if (strict(ctx) && lacks(ops, object, seen))
         return fail_null(ctx, SOAP_OCCURS);

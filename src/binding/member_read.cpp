@@ -323,9 +323,33 @@ bool copy_text(soap *ctx, std::string &target, const std::string &source)
 
 // --- enumerations ---
 
+// The short way of a code that is a word without blanks, in an element without attributes, whole in the
+// buffer. False: nothing was consumed.
+static bool take_code(soap *ctx, const enum_table &names, std::int32_t *code)
+{
+    const std::size_t start = ctx->buffer_index;
+    const int error = ctx->error;
+    std::string_view text;
+    if (!xml_leaf_in_place(ctx, &text))
+        return false;
+    if (text.size() < sizeof ctx->scratch_text) {
+        ctx->scratch_text[text.copy(ctx->scratch_text, text.size())] = '\0';
+        if (const soap_code_row *row = soap_name_to_row(names.codes, ctx->scratch_text)) {
+            *code = static_cast<std::int32_t>(row->code);
+            return true;
+        }
+    }
+    ctx->buffer_index = start;
+    ctx->peeked = 1;
+    ctx->error = error;
+    return false;
+}
+
 bool read_code_value(soap *ctx, const char *tag, std::int32_t *place, const enum_table &names)
 {
     bool done = false;
+    if (tag == nullptr && take_code(ctx, names, place))
+        return true;
     if (!begins(ctx, tag, 0, names.xml_type) || !registers(ctx, place, names.type_id, sizeof *place))
         return false;
     if (is_nil(ctx, tag, &done))
@@ -337,9 +361,17 @@ bool read_code_value(soap *ctx, const char *tag, std::int32_t *place, const enum
 
 bool read_code_pointer(soap *ctx, const char *tag, void **place, const enum_table &names)
 {
-    if (!begins(ctx, tag, 1, names.xml_type))
+    std::int32_t known = 0;
+    const bool taken = tag == nullptr && take_code(ctx, names, &known);
+    if (!taken && !begins(ctx, tag, 1, names.xml_type))
         return false;
     *place = nullptr;
+    if (taken) {
+        auto *code = static_cast<std::int32_t *>(soap_block_alloc(ctx, sizeof known));
+        if (code != nullptr)
+            *code = known;
+        return (*place = code) != nullptr;
+    }
     if (ctx->null_flag || is_reference(ctx))
         return refers_pointer(ctx, tag, place, names.type_id, sizeof(std::int32_t));
     auto *code = static_cast<std::int32_t *>(soap_block_alloc(ctx, sizeof(std::int32_t)));

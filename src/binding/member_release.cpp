@@ -49,7 +49,8 @@ std::size_t release_text(std::string &text)
     return allocated(text);
 }
 
-void release_texts(soap *owner, std::vector<std::string> &texts)
+// Out of line, so that the many vectors without texts cost next to nothing.
+[[gnu::noinline]] static void release_each(soap *owner, std::vector<std::string> &texts)
 {
     for (std::size_t i = texts.size(); i-- > 0;) {
         std::string &text = texts[i];
@@ -65,18 +66,24 @@ void release_texts(soap *owner, std::vector<std::string> &texts)
     }
 }
 
+void release_texts(soap *owner, std::vector<std::string> &texts)
+{
+    if (!texts.empty())
+        release_each(owner, texts);
+}
+
 std::size_t instance_recycle(soap *ctx, soap_instance *instance)
 {
     if (instance->delete_hook != soap_delete_object)
         return 0;
-    const type_entry *entry = type_entry_of(instance->type_id);
-    if (entry == nullptr)
-        return 0;
-    if (entry->kind == type_kind::text) {
+    if (instance->type_id == TEXT_TYPE_ID) {
         auto &text = *static_cast<std::string *>(instance->object);
         const std::size_t bytes = sizeof text + allocated(text);
         return idle_has_room(ctx, TEXT_TYPE_ID, bytes) ? sizeof text + release_text(text) : 0;
     }
+    const type_entry *entry = type_entry_of(instance->type_id);
+    if (entry == nullptr)
+        return 0;
     return entry->kind == type_kind::object ? entry->ops->recycle(instance->object, ctx) : 0;
 }
 

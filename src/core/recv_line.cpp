@@ -56,10 +56,33 @@ std::size_t take_stretch(soap *ctx, char *&end, const char *limit, std::size_t l
     return length;
 }
 
+// A line that stands whole in the buffer, with the byte that tells whether the next one is folded onto it, and
+// fits. False: nothing was consumed.
+bool take_whole_line(soap *ctx, char *text, std::size_t size)
+{
+    if (ctx->look_ahead != 0)
+        return false;
+    const char *const here = ctx->buffer + ctx->buffer_index, *const end = ctx->buffer + ctx->buffer_length;
+    const char *const stop = here + std::min(size, static_cast<std::size_t>(end - here));
+    const char *const line_end = stretch_end(here, stop);
+    if (stop - line_end <= 2)
+        return false;
+    const char *const next = line_end + (*line_end == '\r' ? 2 : 1);
+    const auto length = static_cast<std::size_t>(line_end - here);
+    if (next[-1] != '\n' || (length != 0 && (*next == ' ' || *next == '\t')))
+        return false;
+    std::memcpy(text, here, length);
+    text[length] = '\0';
+    ctx->buffer_index = static_cast<std::size_t>(next - ctx->buffer);
+    return true;
+}
+
 } // namespace
 
 int soap_recv_line(soap *ctx, char *text, std::size_t size)
 {
+    if (take_whole_line(ctx, text, size))
+        return SOAP_OK;
     std::size_t left = size; // bytes that the line may still have, its CR included
     char *end = text;
     char *const limit = text + size - 1;

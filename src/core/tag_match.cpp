@@ -31,6 +31,10 @@ int soap_tag_match(const char *text, const char *pattern)
     const char *run_end = nullptr;    // text that this "*" doesn't cover yet
     if (text == nullptr || pattern == nullptr)
         return 1;
+    while (*text > '*' && *text == *pattern) { // spelled alike, up to the first that may be a mark
+        ++text;
+        ++pattern;
+    }
     while (!at_end(text)) {
         if (*pattern == '*') {
             after_star = ++pattern;

@@ -2,9 +2,11 @@
 //
 // Elsewhere: splitting a head into its headers (http_read.cpp), the decisions on the whole head (there too).
 // Always: key and value may hold any bytes; a header that isn't in the table changes nothing.
+#include <array>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <iterator>
 #include <string_view>
 
 #include <openssl/crypto.h>
@@ -57,14 +59,18 @@ int parse_host(soap *ctx, const char *value)
 // in place of one for each.
 bool is_simple_type(const char *type)
 {
-    bool begins = true;
-    for (; *type != '\0'; ++type) {
-        const bool blank = *type == ' ' || *type == '\t';
-        if (begins && !blank && std::strchr("aAmM%", *type) != nullptr)
-            return false;
-        begins = *type == ',' || *type == ';' || (begins && blank);
+    if (std::strcmp(type, "text/xml; charset=utf-8") == 0) // as nearly all say
+        return true;
+    for (;; ++type) {
+        while (*type == ' ' || *type == '\t')
+            ++type;
+        if (std::strchr("aAmM%", *type) != nullptr) // finds the end too
+            return *type == '\0';
+        while (*type != ',' && *type != ';') {
+            if (*++type == '\0')
+                return true;
+        }
     }
-    return true;
 }
 
 int parse_content_type(soap *ctx, const char *value)
@@ -94,7 +100,13 @@ int parse_content_type(soap *ctx, const char *value)
 
 int parse_content_length(soap *ctx, const char *value)
 {
-    const std::uint64_t length = std::strtoul(value, nullptr, 10);
+    constexpr int DIGITS_MAX = 18; // of numbers that can't overflow
+    std::uint64_t length = 0;
+    const char *digit = value;
+    for (; *digit >= '0' && *digit <= '9' && digit - value < DIGITS_MAX; ++digit)
+        length = 10 * length + static_cast<std::uint64_t>(*digit - '0');
+    if (digit == value || digit - value == DIGITS_MAX)
+        length = std::strtoul(value, nullptr, 10);
     if (ctx->content_length_given && length != ctx->content_length)
         ctx->framing_doubtful = true; // which one holds is anybody's guess
     ctx->content_length = length;
@@ -132,7 +144,7 @@ int parse_transfer_encoding(soap *ctx, const char *value)
 // The peer's consent is pending until the version of its HTTP is known.
 int parse_connection(soap *ctx, const char *value)
 {
-    if (soap_tag_match(value, "keep-alive") == 0)
+    if (std::strcmp(value, "keep-alive") == 0 || soap_tag_match(value, "keep-alive") == 0)
         ctx->keep_alive = static_cast<std::int16_t>(-ctx->keep_alive);
     else if (soap_tag_match(value, "close") == 0)
         ctx->keep_alive = 0;
@@ -248,13 +260,34 @@ constexpr header_row HEADERS[] = {
     {"X-Forwarded-For", parse_forwarded_for},
 };
 
+// By the first letter of a key, whatever its case: bit n tells that HEADERS[n] begins so.
+constexpr std::size_t LETTERS = 32;
+constexpr auto ROWS_OF_LETTER = [] {
+    std::array<std::uint32_t, LETTERS> rows{};
+    for (std::size_t i = 0; i < std::size(HEADERS); ++i)
+        rows[static_cast<unsigned char>(HEADERS[i].key[0]) % LETTERS] |= 1U << i;
+    return rows;
+}();
+
+// A key matches up to its first quote, if it has one; most are spelled as in the table.
+bool matches(const char *key, std::size_t length, std::string_view pattern)
+{
+    if (length < pattern.size())
+        return false;
+    return (length == pattern.size() && std::memcmp(key, pattern.data(), length) == 0) ||
+           ((length == pattern.size() || key[pattern.size()] == '"') &&
+            soap_tag_match(key, pattern.data()) == 0);
+}
+
 } // namespace
 
 int http_parse_header(soap *ctx, const char *key, const char *value)
 {
-    const std::size_t length = std::strcspn(key, "\""); // where the match ends
-    for (const header_row &row : HEADERS) {
-        if (row.key.size() == length && soap_tag_match(key, row.key.data()) == 0)
+    const std::size_t length = std::strlen(key);
+    std::uint32_t left = ROWS_OF_LETTER[static_cast<unsigned char>(*key) % LETTERS];
+    for (; left != 0; left &= left - 1) {
+        const header_row &row = HEADERS[__builtin_ctz(left)];
+        if (matches(key, length, row.key))
             return row.parse(ctx, value);
     }
     return SOAP_OK;

@@ -69,12 +69,19 @@ bool is_low(char c)
     return static_cast<unsigned char>(c) <= ' ';
 }
 
+bool is_digit(char c)
+{
+    return c >= '0' && c <= '9';
+}
+
 // The number after the first blank; 0 if there is none, which makes the line that of a request.
 int status_of(const char *start_line)
 {
     const char *const blank = std::strchr(start_line, ' ');
     if (blank == nullptr)
         return 0;
+    if (is_digit(blank[1]) && is_digit(blank[2]) && is_digit(blank[3]) && is_low(blank[4]))
+        return 100 * (blank[1] - '0') + 10 * (blank[2] - '0') + (blank[3] - '0');
     char *end = nullptr;
     const unsigned long number = std::strtoul(blank, &end, 10);
     return is_low(*end) ? static_cast<int>(number & 0xFFFF) : 0;
@@ -90,14 +97,14 @@ int read_start_line(soap *ctx)
     return ctx->error;
 }
 
-// Cuts the quotes and the blanks around a value, in place.
-char *trimmed_value(char *value)
+// Cuts the quotes and the blanks around a value that ends at `end`, in place.
+char *trimmed_value(char *value, const char *end)
 {
-    while (*value != '\0' && is_low(*value))
+    while (value != end && is_low(*value))
         ++value;
     if (*value == '"')
         ++value;
-    std::size_t length = std::strlen(value);
+    auto length = static_cast<std::size_t>(end - value);
     while (length > 0 && is_low(value[length - 1]))
         --length;
     if (length > 0 && value[length - 1] == '"')
@@ -106,7 +113,7 @@ char *trimmed_value(char *value)
     return value;
 }
 
-int take_header(soap *ctx, head_state &head, char *line)
+int take_header(soap *ctx, head_state &head, char *line, std::size_t length)
 {
     char *const colon = std::strchr(line, ':');
     if (colon == nullptr)
@@ -114,7 +121,7 @@ int take_header(soap *ctx, head_state &head, char *line)
     *colon = '\0';
     if (ctx->on_parse_header == nullptr)
         return SOAP_OK;
-    char *const value = trimmed_value(colon + 1);
+    char *const value = trimmed_value(colon + 1, line + length);
     const int result = ctx->on_parse_header(ctx, line, value);
     if (ctx->auth_password != nullptr) // it may have come with this line
         OPENSSL_cleanse(value, std::strlen(value));
@@ -138,10 +145,11 @@ int read_headers(soap *ctx, head_state &head)
             return ctx->error = SOAP_OK;
         if (result != SOAP_OK || line[0] == '\0')
             return result;
-        head.bytes += std::strlen(line);
+        const std::size_t length = std::strlen(line);
+        head.bytes += length;
         if (++head.lines > LINES_MAX || head.bytes > HEAD_BYTES_MAX)
             return fail(ctx, SOAP_HEADER_LINE);
-        if (!is_interim(ctx->status) && take_header(ctx, head, line) != SOAP_OK)
+        if (!is_interim(ctx->status) && take_header(ctx, head, line, length) != SOAP_OK)
             return ctx->error;
     }
 }
@@ -162,9 +170,9 @@ int read_final_head(soap *ctx, head_state &head)
 // Where the protocol's name stands in the start line; the last place, as a request's path may hold it too.
 const char *find_version(const char *start_line)
 {
-    const char *found = std::strncmp(start_line, "HTTP/", 5) == 0 ? start_line : nullptr;
-    if (found != nullptr)
-        return found;
+    const char *found = nullptr;
+    if (std::memcmp(start_line, "HTTP/", 5) == 0) // in message_text, which has as many bytes
+        return start_line;
     for (const char *p = start_line; (p = std::strstr(p, "HTTP/")) != nullptr; p += 5)
         found = p;
     return found;

@@ -37,9 +37,10 @@ class wait_set {
 public:
     wait_set(bool wanted, int socket) : wanted_(wanted), used_(wanted), socket_(socket)
     {
+        if (!wanted_)
+            return;
         FD_ZERO(&set_);
-        if (wanted_)
-            FD_SET(socket_, &set_);
+        FD_SET(socket_, &set_);
     }
     // Another descriptor; -1 is none.
     void add(int other)

@@ -29,7 +29,11 @@ bool is_blank(char byte)
 
 const soap_code_row *soap_name_to_row(const soap_code_row *table, const char *name)
 {
-    return name != nullptr ? row_of(table, name) : nullptr;
+    if (name == nullptr)
+        return nullptr;
+    while (table->name != nullptr && (table->name[0] != name[0] || std::strcmp(table->name, name) != 0))
+        table++;
+    return table->name != nullptr ? table : nullptr;
 }
 
 std::int64_t soap_name_to_code(const soap_code_row *table, const char *name, std::int64_t otherwise)

@@ -7,6 +7,7 @@
 
 #include "core/hex_digit.h"
 #include "xml/utf8.h"
+#include "xml/xml_scan.h"
 #include "xml/xml_token.h"
 
 namespace {
@@ -30,15 +31,32 @@ constexpr const char *latin1_names[] = {
     "uacute", "ucirc",  "uuml",   "yacute", "thorn",  "yuml"};
 static_assert(sizeof latin1_names / sizeof *latin1_names == 96);
 
+struct markup_row {
+    std::string_view reference; // after the "&"
+    std::int32_t code;
+};
+constexpr markup_row MARKUP[] = {{"amp;", '&'}, {"lt;", '<'}, {"gt;", '>'}, {"quot;", '"'}, {"apos;", '\''}};
+
+// Takes a reference to a character of markup that is whole in the buffer. UNKNOWN: nothing was consumed.
+std::int32_t take_markup(soap *ctx)
+{
+    const char *const here = input_here(ctx);
+    const auto unread = static_cast<std::size_t>(input_end(ctx) - here);
+    for (const markup_row &row : MARKUP) {
+        const std::size_t length = row.reference.size();
+        if (length <= unread && ctx->look_ahead == 0 && same_name(here, row.reference.data(), length)) {
+            input_consume(ctx, here + length);
+            return row.code;
+        }
+    }
+    return UNKNOWN;
+}
+
 // Letter case doesn't count in these names, so of two that differ by it the first is found.
 std::int32_t named_code(const char *name)
 {
-    static constexpr struct {
-        const char *name;
-        std::int32_t code;
-    } markup[] = {{"lt", '<'}, {"gt", '>'}, {"amp", '&'}, {"quot", '"'}, {"apos", '\''}};
-    for (const auto &row : markup) {
-        if (std::strcmp(name, row.name) == 0)
+    for (const markup_row &row : MARKUP) {
+        if (row.reference.substr(0, row.reference.size() - 1) == name)
             return row.code;
     }
     std::int32_t code = 160;
@@ -113,6 +131,9 @@ std::int32_t xml_reference_read(soap *ctx, xml_reference &reference)
 
 std::int32_t soap_entity_read(soap *ctx)
 {
+    const std::int32_t code = take_markup(ctx);
+    if (code != UNKNOWN)
+        return code;
     xml_reference reference;
     return xml_reference_read(ctx, reference);
 }

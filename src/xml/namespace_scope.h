@@ -27,12 +27,30 @@ constexpr std::size_t URI_SLOTS = 64;        // power of two
 constexpr std::size_t ROOT_BYTES_MAX = 4096; // for a remembered root element
 constexpr std::size_t RECEIVED_SIZE = 128;   // bytes; longer received URIs have blocks of their own
 constexpr std::size_t RECEIVED_KEPT = 4;     // blocks for received URIs that stay from call to call
+constexpr unsigned TAG_GUESS_BITS = 6;       // of the number of a tag_guess
+constexpr std::size_t TAG_GUESS_PROBES = 4;  // places that one may stand in, from its number on
 constexpr std::size_t ROOT_RECEIVED_MAX = 8; // rows that took a URI in it
 
 // Bytes in a row's own texts.
 struct namespace_lengths {
     std::size_t prefix, uri;
     std::size_t pattern_head; // of the pattern, before its first "*" or "-"
+};
+
+// The start tag that came after another in the last messages, with what was found out about it: a guess at the
+// next one. Who guesses says what it follows.
+struct tag_guess {
+    static constexpr std::size_t SIZE = 32;
+
+    std::uint64_t after;       // tells what it follows; 0: no guess
+    std::uint8_t next;         // what it was found to be
+    bool doubtful;             // it was wrong the last time
+    std::uint8_t prefix_place; // in soap::prefix_cache
+    std::uint8_t local;        // offset of the local name in the tag's name
+    std::uint8_t length;       // bytes of `text`
+    char text[SIZE];           // "<", the name in bytes below 128, ">"
+    std::uint64_t changes;     // soap_namespace_scope::prefix_changes when that place held its prefix
+    const char *row_prefix;    // of the row that the binding asks for; where it asks for another: of none
 };
 
 // The declarations of the last message's root element, with what became of them; see root_head.h.
@@ -64,14 +82,19 @@ struct soap_namespace_scope {
     soap_attribute *spare_attributes; // linked by next
     std::size_t spare_attribute_count;
     soap_namespace *spare_table; // room for row_count rows and their end; null while it is the working copy
+    const soap_namespace *copy; // the working copy, with room for row_count rows and their end; null for none
+    bool copy_received;         // a row of it has or had a received URI
     remembered_root root;
-    char *received[RECEIVED_KEPT]; // blocks of RECEIVED_SIZE for received URIs; owned; null until first use
-    unsigned received_used;        // bit n: a row has received[n]
-    std::uint8_t tag_prefix;       // the reader's last tag: place of its prefix in soap::prefix_cache
+    char *received[RECEIVED_KEPT];   // blocks of RECEIVED_SIZE for received URIs; owned; null until first use
+    unsigned received_used;          // bit n: a row has received[n]
+    std::uint8_t tag_prefix;         // the reader's last tag: place of its prefix in soap::prefix_cache
+    std::uint64_t prefix_changes[8]; // how often each place of soap::prefix_cache took another prefix
+    tag_guess guesses[(1U << TAG_GUESS_BITS) + TAG_GUESS_PROBES - 1];
 
     const soap_namespace *rows;       // copy of the rows described, without received URIs; owned with lengths
     const namespace_lengths *lengths; // of each row
     std::size_t row_count;
+    std::int16_t version; // of SOAP, by the first row
     // Index + 1 of the row that a URI is bound to whatever was received before, by hash of the URI; 0 for an
     // empty slot. Open addressing.
     std::uint8_t uri_slots[URI_SLOTS];
@@ -99,6 +122,13 @@ inline bool namespace_row_has_prefix(const soap *ctx, int row, const char *prefi
         namespace_prefix_has_length(ctx->namespace_scope, table[row], static_cast<std::size_t>(row), length))
         return same_name(table[row].prefix, prefix, length);
     return xml_row_has_prefix(ctx, row, prefix, length);
+}
+
+// True if no row of the working copy has received a URI, as far as that is known without a look at them.
+inline bool namespace_copy_is_clean(const soap *ctx)
+{
+    const soap_namespace_scope *scope = ctx->namespace_scope;
+    return scope != nullptr && scope->copy == ctx->local_namespaces && !scope->copy_received;
 }
 
 // The lengths of a row's texts, or null where the row isn't one of those described.

@@ -36,21 +36,17 @@ bool same_texts(const soap_namespace &one, const soap_namespace &other)
     return one.prefix == other.prefix && one.uri == other.uri && one.pattern == other.pattern;
 }
 
-// True if the table holds just the rows measured last time, none with a received URI. The end of a shorter
-// table differs from the row in its place, so nothing after it is looked at.
+// True if the table holds just the rows measured last time, none with a received URI.
 bool is_measured(const soap_namespace_scope *scope, const soap_namespace *table)
 {
-    const auto same_row = [](const soap_namespace &one, const soap_namespace &other) {
-        return same_texts(one, other) && one.received == other.received;
-    };
-    return scope != nullptr && scope->rows != nullptr &&
-           std::equal(scope->rows, scope->rows + scope->row_count, table, same_row) &&
-           table[scope->row_count].prefix == nullptr;
+    return scope != nullptr && scope->rows != nullptr && count_rows(table) == scope->row_count &&
+           std::memcmp(scope->rows, table, scope->row_count * sizeof *table) == 0;
 }
 
 void forget_rows(soap *ctx, soap_namespace_scope *scope)
 {
     xml_root_forget(ctx);
+    std::memset(scope->guesses, 0, sizeof scope->guesses); // they know prefixes of rows
     SOAP_FREE(ctx, scope->spare_table);
     scope->spare_table = nullptr;
     SOAP_FREE(ctx, scope->declarations);
@@ -100,6 +96,8 @@ int describe_rows(soap *ctx, const soap_namespace *table, std::size_t count)
     scope->rows = rows;
     scope->lengths = lengths;
     scope->row_count = count;
+    scope->version =
+        count > 0 && rows[0].uri != nullptr && std::strcmp(rows[0].uri, SOAP_11_ENVELOPE) == 0 ? 1 : 2;
     index_uris(scope);
     return SOAP_OK;
 }
@@ -176,6 +174,18 @@ void give_received(soap *ctx, char *received)
     SOAP_FREE(ctx, received);
 }
 
+// Gives the rows of a new copy the URIs that the host's rows have received. 0 or 20.
+int copy_received(soap *ctx, soap_namespace *rows, std::size_t count)
+{
+    std::for_each(rows, rows + count, [](soap_namespace &row) { row.received = nullptr; });
+    for (std::size_t i = 0; i < count; ++i) {
+        const char *received = ctx->namespaces[i].received;
+        if (received != nullptr && xml_received_set(ctx, rows[i], received))
+            return ctx->error;
+    }
+    return SOAP_OK;
+}
+
 // A row is about to stand for another URI: declarations of the held element that are bound to it become
 // attributes while it still tells what they said. 0 or 20.
 int keep_declared(soap *ctx, const soap_namespace &row, const char *uri)
@@ -250,17 +260,15 @@ int soap_namespace_table_copy(soap *ctx)
         return fail(ctx, SOAP_OUT_OF_MEMORY);
     std::copy_n(ctx->namespaces, count + 1, rows);
     ctx->local_namespaces = rows;
-    std::for_each(rows, rows + count + 1, [](soap_namespace &row) { row.received = nullptr; });
-    for (std::size_t i = 0; i < count; ++i) {
-        const char *received = ctx->namespaces[i].received;
-        if (received != nullptr && xml_received_set(ctx, rows[i], received)) {
-            soap_namespace_table_drop(ctx);
-            return ctx->error;
-        }
+    ctx->namespace_scope->copy = rows;
+    ctx->namespace_scope->copy_received = false;
+    rows[count].received = nullptr;
+    if (!measured && copy_received(ctx, rows, count)) {
+        soap_namespace_table_drop(ctx);
+        return ctx->error;
     }
     if (count > 0)
-        ctx->soap_version =
-            (rows[0].uri != nullptr) && std::strcmp(rows[0].uri, SOAP_11_ENVELOPE) == 0 ? 1 : 2;
+        ctx->soap_version = ctx->namespace_scope->version;
     return SOAP_OK;
 }
 
@@ -269,6 +277,8 @@ void soap_namespace_table_drop(soap *ctx)
     if (ctx->local_namespaces == nullptr)
         return;
     soap_namespace *row = ctx->local_namespaces;
+    if (ctx->encoding_style == nullptr && namespace_copy_is_clean(ctx))
+        row += ctx->namespace_scope->row_count; // nothing to do for any of them
     for (; row->prefix != nullptr; ++row) {
         // The style was taken from the table in place of "" and may be another one in the next message.
         if (ctx->encoding_style != nullptr && ctx->encoding_style == row->uri)
@@ -276,6 +286,8 @@ void soap_namespace_table_drop(soap *ctx)
         xml_received_drop(ctx, *row);
     }
     soap_namespace_scope *scope = ctx->namespace_scope;
+    if (scope != nullptr)
+        scope->copy = nullptr;
     if (scope != nullptr && scope->spare_table == nullptr &&
         scope->row_count == static_cast<std::size_t>(row - ctx->local_namespaces))
         scope->spare_table = ctx->local_namespaces;
@@ -307,6 +319,8 @@ int xml_received_set(soap *ctx, soap_namespace &row, const char *uri)
     std::memcpy(copy, uri, size);
     xml_received_drop(ctx, row);
     row.received = copy;
+    if (ctx->namespace_scope != nullptr)
+        ctx->namespace_scope->copy_received = true;
     return SOAP_OK;
 }
 

@@ -35,6 +35,8 @@ bool root_head_stands_alone(const soap *ctx)
     if (ctx->prefix_list != nullptr || ctx->nesting_level != 0 || ctx->local_namespaces == nullptr ||
         ctx->namespace_scope == nullptr)
         return false;
+    if (namespace_copy_is_clean(ctx))
+        return true;
     for (const soap_namespace *row = ctx->local_namespaces; row->prefix != nullptr; ++row) {
         if (row->received != nullptr)
             return false;

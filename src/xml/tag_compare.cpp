@@ -17,6 +17,7 @@ namespace {
 
 constexpr std::size_t CACHE_SIZE = sizeof(soap::prefix_cache) / sizeof(soap_prefix_cache);
 static_assert((CACHE_SIZE & (CACHE_SIZE - 1)) == 0 && CACHE_SIZE <= 8);
+static_assert(CACHE_SIZE == sizeof(soap_namespace_scope::prefix_changes) / sizeof(std::uint64_t));
 
 bool is_xml_prefix(const char *text, std::size_t length)
 {
@@ -100,6 +101,29 @@ name_parts split_name(soap *ctx, const char *name)
     return {colon + 1, static_cast<std::size_t>(colon - name)};
 }
 
+// soap_prefix_compare of a prefix whose row is known.
+int compare_row(soap *ctx, int row, const char *read, const char *asked, std::size_t read_length,
+                std::size_t asked_length)
+{
+    if ((ctx->mode & MODE_IGNORE_NAMESPACES) != 0)
+        return SOAP_OK;
+    if (is_xml_prefix(read, read_length) && is_xml_prefix(asked, asked_length) && row == TAG_ROW_UNBOUND)
+        return SOAP_OK;
+    if (row == TAG_ROW_UNDECLARED)
+        return fail(ctx, SOAP_SYNTAX_ERROR);
+    if (row < 0)
+        return SOAP_NAMESPACE_ERROR;
+    return namespace_row_has_prefix(ctx, row, asked, asked_length) ? 0 : SOAP_NAMESPACE_ERROR;
+}
+
+// The held tag is spelled as the one asked for, and its prefix stands for the row of that name.
+bool is_spelled_so(soap *ctx, const char *asked)
+{
+    const tag_view held = soap_held_tag(ctx);
+    return held.row >= 0 && ctx->tag_local > 1 && std::strcmp(ctx->tag, asked) == 0 &&
+           namespace_row_has_prefix(ctx, held.row, asked, ctx->tag_local - 1U);
+}
+
 } // namespace
 
 int xml_prefix_row(soap *ctx, const char *prefix, std::size_t length)
@@ -116,6 +140,9 @@ int xml_prefix_row(soap *ctx, const char *prefix, std::size_t length)
         return entry.row;
     const int row = search_stack(ctx, prefix, length);
     if (length <= sizeof entry.text) {
+        const bool other = entry.length != length || !same_name(entry.text, prefix, length);
+        if (other && ctx->namespace_scope != nullptr)
+            ++ctx->namespace_scope->prefix_changes[place];
         std::memcpy(entry.text, prefix, length);
         entry.length = static_cast<std::uint8_t>(length);
         entry.row = static_cast<std::int16_t>(row);
@@ -144,15 +171,7 @@ int soap_prefix_compare(soap *ctx, const char *read, const char *asked, std::siz
                         std::size_t asked_length)
 {
     const int row = xml_prefix_row(ctx, read, read_length);
-    if ((ctx->mode & MODE_IGNORE_NAMESPACES) != 0)
-        return SOAP_OK;
-    if (is_xml_prefix(read, read_length) && is_xml_prefix(asked, asked_length) && row == TAG_ROW_UNBOUND)
-        return SOAP_OK;
-    if (row == TAG_ROW_UNDECLARED)
-        return fail(ctx, SOAP_SYNTAX_ERROR);
-    if (row < 0)
-        return SOAP_NAMESPACE_ERROR;
-    return namespace_row_has_prefix(ctx, row, asked, asked_length) ? 0 : SOAP_NAMESPACE_ERROR;
+    return compare_row(ctx, row, read, asked, read_length, asked_length);
 }
 
 int soap_tag_compare(soap *ctx, const char *read, const char *asked)
@@ -161,6 +180,8 @@ int soap_tag_compare(soap *ctx, const char *read, const char *asked)
         return SOAP_OK;
     if (read == nullptr)
         return SOAP_TAG_MISMATCH;
+    if (read == ctx->tag && is_spelled_so(ctx, asked))
+        return SOAP_OK;
     const name_parts name = split_name(ctx, read);
     const char *asked_colon = std::strchr(asked, ':');
     if (asked_colon == nullptr)
@@ -170,7 +191,8 @@ int soap_tag_compare(soap *ctx, const char *read, const char *asked)
         return SOAP_TAG_MISMATCH;
     if (asked_colon == asked)
         return SOAP_OK;
-    const int error = soap_prefix_compare(ctx, read, asked, name.prefix_length,
-                                          static_cast<std::size_t>(asked_colon - asked));
+    const int row = read == ctx->tag ? ctx->tag_row : xml_prefix_row(ctx, read, name.prefix_length);
+    const int error =
+        compare_row(ctx, row, read, asked, name.prefix_length, static_cast<std::size_t>(asked_colon - asked));
     return error == SOAP_NAMESPACE_ERROR ? SOAP_TAG_MISMATCH : error;
 }

@@ -35,24 +35,6 @@ int end_of_input(soap *ctx)
     return error == 0 || error == SOAP_TAG_MISMATCH || error == SOAP_NO_TAG ? SOAP_EOF : error;
 }
 
-void forget_tag(soap *ctx)
-{
-    ctx->peeked = 1;
-    ctx->tag_resolved = false;
-    ctx->bare_declarations = 0;
-    ctx->element_id[0] = '\0';
-    ctx->element_href[0] = '\0';
-    ctx->element_type[0] = '\0';
-    ctx->array_type[0] = '\0';
-    ctx->array_size[0] = '\0';
-    ctx->array_offset[0] = '\0';
-    ctx->other_flag = 0;
-    ctx->root_flag = -1;
-    ctx->position_count = 0;
-    ctx->null_flag = 0;
-    ctx->must_understand = 0;
-}
-
 // A byte-order mark may stand before a tag. 0 when the next token can be read, 47 on UTF-16.
 int pass_byte_order_mark(soap *ctx)
 {
@@ -108,15 +90,31 @@ int find_start_tag_slow(soap *ctx)
     return no_tag(ctx, SOAP_NO_TAG);
 }
 
+// The place after the usual XML declaration, if that stands at `p`, which begins an instruction, and a start
+// tag follows in the buffer; else `p`.
+const char *after_usual_declaration(soap *ctx, const char *p, const char *end)
+{
+    constexpr std::string_view usual = XML_USUAL_DECLARATION;
+    if (static_cast<std::size_t>(end - p) < 2 + usual.size() || !same_name(p + 2, usual.data(), usual.size()))
+        return p;
+    const char *next = p + 2 + usual.size();
+    while (next != end && is_blank(static_cast<unsigned char>(*next)))
+        ++next;
+    if (end - next < 2 || next[0] != '<' || static_cast<unsigned char>(next[1]) <= '?')
+        return p;
+    ctx->mode &= ~ENCODING_MODES;
+    return next;
+}
+
 // Consumes up to and including the "<" of the next start tag; 0, or an error with no tag held.
 int find_start_tag(soap *ctx)
 {
     if (ctx->look_ahead == 0 && ctx->in_cdata == CDATA_OUTSIDE) {
-        const char *p = input_here(ctx);
-        const char *end = input_end(ctx);
-        while (p != end && is_blank(static_cast<unsigned char>(*p)))
-            ++p;
+        const char *p = xml_after_blanks(ctx);
+        const char *const end = input_end(ctx);
         if (end - p >= 2 && p[0] == '<') {
+            if (p[1] == '?')
+                p = after_usual_declaration(ctx, p, end);
             if (static_cast<unsigned char>(p[1]) > '?') { // none of the marks that lead to something else
                 input_consume(ctx, p + 1);
                 return SOAP_OK;
@@ -151,11 +149,8 @@ bool read_plain_tag(soap *ctx)
 {
     if (ctx->look_ahead != 0 || ctx->in_cdata != CDATA_OUTSIDE)
         return false;
-    const char *p = input_here(ctx);
-    const char *end = input_end(ctx);
-    while (p != end && is_blank(static_cast<unsigned char>(*p)))
-        ++p;
-    if (end - p <= static_cast<std::ptrdiff_t>(SHORT_NAME) || p[0] != '<' ||
+    const char *const p = xml_after_blanks(ctx);
+    if (input_end(ctx) - p <= static_cast<std::ptrdiff_t>(SHORT_NAME) || p[0] != '<' ||
         static_cast<unsigned char>(p[1]) <= '?' || // one of the marks that lead to something else
         !take_plain_name<tag_name_stop>(ctx, p + 1))
         return false;
@@ -173,16 +168,10 @@ int read_tag_name(soap *ctx)
     return no_tag(ctx, xml_is_refused(ctx) ? ctx->error : static_cast<int>(SOAP_SYNTAX_ERROR));
 }
 
-// The innermost declaration is of an element that has ended.
-bool prefixes_end(const soap *ctx)
-{
-    return ctx->prefix_list != nullptr && ctx->prefix_list->level >= ctx->nesting_level;
-}
-
 // Drops the declarations of elements that have ended.
 void pop_prefixes(soap *ctx)
 {
-    if (prefixes_end(ctx))
+    if (xml_prefixes_end(ctx))
         soap_prefix_pop(ctx);
 }
 
@@ -386,12 +375,49 @@ int soap_element_head_read(soap *ctx)
 {
     if (ctx->peeked != 0)
         return ctx->tag[0] != '\0' ? 0 : fail(ctx, SOAP_NO_TAG);
-    forget_tag(ctx);
+    xml_tag_forget(ctx);
     if (!read_plain_tag(ctx))
         return read_head(ctx);
-    if (prefixes_end(ctx) || ctx->attributes_set != 0)
+    if (xml_prefixes_end(ctx) || ctx->attributes_set != 0)
         leave_previous_head(ctx);
     return ctx->error = 0;
+}
+
+bool xml_head_guess(const soap *ctx, tag_guess &guess)
+{
+    const soap_namespace_scope *const scope = ctx->namespace_scope;
+    const soap_prefix_cache &prefix = ctx->prefix_cache[scope->tag_prefix];
+    const std::size_t length = ctx->tag_length;
+    if (!ctx->tag_resolved || length + 2 > tag_guess::SIZE ||
+        tag_name_stop<true>::find(ctx->tag, ctx->tag + length) != ctx->tag + length ||
+        ctx->tag_local != (prefix.length != 0 ? prefix.length + 1 : 0) ||
+        !same_name(ctx->tag, prefix.text, prefix.length))
+        return false;
+    guess.prefix_place = scope->tag_prefix;
+    guess.changes = scope->prefix_changes[scope->tag_prefix];
+    guess.local = static_cast<std::uint8_t>(ctx->tag_local);
+    guess.length = static_cast<std::uint8_t>(length + 2);
+    guess.text[0] = '<';
+    std::memcpy(guess.text + 1, ctx->tag, length);
+    guess.text[length + 1] = '>';
+    return true;
+}
+
+bool xml_next_end_read(soap *ctx)
+{
+    if (ctx->peeked != 0 || ctx->look_ahead != 0 || ctx->in_cdata != CDATA_OUTSIDE ||
+        (ctx->mode & MODE_STRICT) != 0)
+        return false;
+    const char *const p = xml_after_blanks(ctx);
+    if (input_end(ctx) - p <= static_cast<std::ptrdiff_t>(SHORT_NAME) + 1 || p[0] != '<' || p[1] != '/' ||
+        !take_plain_name<end_name_stop>(ctx, p + 2))
+        return false;
+    xml_tag_forget(ctx);
+    ctx->peeked = 0;
+    ctx->has_body = 1;
+    leave_element(ctx);
+    ctx->error = 0;
+    return true;
 }
 
 int soap_element_in_begin(soap *ctx, const char *tag, int nil_allowed, const char *type)

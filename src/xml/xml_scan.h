@@ -109,6 +109,22 @@ inline bool same_name(const char *one, const char *other, std::size_t length)
     return true;
 }
 
+// True if the first `length` bytes of two stretches of 32 are equal.
+inline bool same_of_32(const char *one, const char *other, std::size_t length)
+{
+#if defined(__SSE2__)
+    const auto equal = [&](std::size_t at) {
+        const __m128i a = _mm_loadu_si128(reinterpret_cast<const __m128i *>(one + at));
+        const __m128i b = _mm_loadu_si128(reinterpret_cast<const __m128i *>(other + at));
+        return static_cast<std::uint32_t>(_mm_movemask_epi8(_mm_cmpeq_epi8(a, b)));
+    };
+    const std::uint64_t differ = ~(equal(0) | equal(16) << 16);
+    return static_cast<std::uint32_t>(differ << (32 - length)) == 0;
+#else
+    return std::memcmp(one, other, length) == 0;
+#endif
+}
+
 // What ends a stretch that may be taken as it stands. Control characters always go the way of single bytes,
 // so that no text holds one; bytes from 128 on do unless they are known to be what the text is made of.
 template <bool High> using tag_name_stop = byte_class<true, High, '>', '/'>;

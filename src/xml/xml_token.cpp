@@ -247,6 +247,14 @@ std::int32_t soap_char_next_utf8(soap *ctx)
 
 std::int32_t soap_pi_read(soap *ctx)
 {
+    constexpr std::string_view usual = XML_USUAL_DECLARATION;
+    const char *const begin = input_here(ctx);
+    if (ctx->look_ahead == 0 && static_cast<std::size_t>(input_end(ctx) - begin) >= usual.size() &&
+        same_name(begin, usual.data(), usual.size())) {
+        ctx->mode &= ~ENCODING_MODES;
+        input_consume(ctx, begin + usual.size());
+        return usual.back();
+    }
     char text[INSTRUCTION_TEXT_MAX + 1];
     std::size_t kept = 0;
     std::int32_t byte = XML_EOF;

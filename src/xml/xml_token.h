@@ -5,10 +5,14 @@
 #pragma once
 
 #include <cstdint>
+#include <string_view>
 
 #include <zuv_client_pro/soap_error.h>
 
 #include "xml/xml_input.h"
+
+// The XML declaration that most documents begin with, from after its "<?".
+constexpr std::string_view XML_USUAL_DECLARATION = "xml version=\"1.0\" encoding=\"UTF-8\"?>";
 
 // Result of xml_markup_next for a construct that no caller sees: reading continues after it. No character has
 // this value: a reference to zero is an unknown one.

@@ -15,7 +15,32 @@
 
 namespace {
 
-// A context that reads documents whose prefixes are the service's own, and writes bare XML.
+// Reads a document on a context whose prefixes are the service's own; null when that failed.
+template <class T> T *read_on(memory_wire &ctx, const std::string &xml, std::uint32_t mode)
+{
+    ctx.input_mode = mode;
+    std::string declared = xml;
+    const std::string name = xml.substr(1, xml.find_first_of(" />") - 1);
+    std::string declarations = " xmlns:xsi=\"http://www.w3.org/2001/XMLSchema-instance\""
+                               " xmlns:xsd=\"http://www.w3.org/2001/XMLSchema\""
+                               " xmlns:SOAP-ENC=\"http://schemas.xmlsoap.org/soap/encoding/\""
+                               " xmlns:SOAP-ENV=\"http://schemas.xmlsoap.org/soap/envelope/\"";
+    for (const soap_namespace *row = ctx.namespaces; row->prefix; ++row) {
+        if (std::string(row->prefix).rfind("protocol", 0) == 0)
+            declarations += std::string(" xmlns:") + row->prefix + "=\"" + row->uri + "\"";
+    }
+    declared.insert(1 + name.size(), declarations);
+    ctx.receive(declared);
+    soap_reset_call(&ctx);
+    soap_receive_begin(&ctx);
+    ctx.soap_version = 1;
+    auto *object = static_cast<T *>(soap_instantiate(&ctx, T().soap_type(), nullptr, nullptr, nullptr));
+    if (!object->soap_in(&ctx, name.c_str(), nullptr))
+        return nullptr;
+    return soap_receive_finish(&ctx) ? nullptr : object;
+}
+
+// A context that reads such documents, and writes bare XML.
 class binding : public testing::Test {
 protected:
     binding() : ctx(0, MODE_BARE_XML | MODE_BUFFERED)
@@ -25,26 +50,7 @@ protected:
 
     template <class T> T *read(const std::string &xml, std::uint32_t mode = 0)
     {
-        ctx.input_mode = mode;
-        std::string declared = xml;
-        const std::string name = xml.substr(1, xml.find_first_of(" />") - 1);
-        std::string declarations = " xmlns:xsi=\"http://www.w3.org/2001/XMLSchema-instance\""
-                                   " xmlns:xsd=\"http://www.w3.org/2001/XMLSchema\""
-                                   " xmlns:SOAP-ENC=\"http://schemas.xmlsoap.org/soap/encoding/\""
-                                   " xmlns:SOAP-ENV=\"http://schemas.xmlsoap.org/soap/envelope/\"";
-        for (const soap_namespace *row = ctx.namespaces; row->prefix; ++row) {
-            if (std::string(row->prefix).rfind("protocol", 0) == 0)
-                declarations += std::string(" xmlns:") + row->prefix + "=\"" + row->uri + "\"";
-        }
-        declared.insert(1 + name.size(), declarations);
-        ctx.receive(declared);
-        soap_reset_call(&ctx);
-        soap_receive_begin(&ctx);
-        ctx.soap_version = 1;
-        auto *object = static_cast<T *>(soap_instantiate(&ctx, T().soap_type(), nullptr, nullptr, nullptr));
-        if (!object->soap_in(&ctx, name.c_str(), nullptr))
-            return nullptr;
-        return soap_receive_finish(&ctx) ? nullptr : object;
+        return read_on<T>(ctx, xml, mode);
     }
 
     template <class T> std::string write(const T &object, const char *tag, std::uint32_t mode = 0)
@@ -357,6 +363,91 @@ TEST_F(binding, a_vector_named_by_a_reference_is_filled_through_its_id)
         "id=\"t\">urn:1</protocolProfile:thisURI></p>");
     ASSERT_NE(nullptr, read_back) << ctx.error;
     EXPECT_EQ((std::vector<std::string>{"urn:1", "urn:1"}), read_back->thisURI);
+}
+
+// What a reader that begins anew with each text tells of it: the error and where the reading ended, or the profile.
+std::string outcome_of(memory_wire &ctx, const std::string &content, std::uint32_t mode)
+{
+    // The blanks leave room in the buffer after each tag.
+    const auto *profile =
+        read_on<protocolProfile__ProfileContent>(ctx, "<c>" + content + std::string(80, ' ') + "</c>", mode);
+    const std::size_t held = ctx.look_ahead == XML_END ? 2 : ctx.look_ahead != 0 ? 1 : 0; // bytes pushed back
+    std::ostringstream told;
+    told << ctx.error << ' ' << ctx.tag << ' ' << ctx.nesting_level << ' ' << ctx.peeked << ' '
+         << ctx.given - (ctx.buffer_length - ctx.buffer_index) - held << ' ';
+    if (profile != nullptr) {
+        ctx.sends.clear();
+        soap_reset_call(&ctx);
+        ctx.output_mode = MODE_BARE_XML | MODE_BUFFERED;
+        soap_send_begin(&ctx);
+        profile->soap_put(&ctx, "c", "");
+        soap_send_finish(&ctx);
+        told << ctx.sent();
+    }
+    soap_discard_objects(&ctx, nullptr);
+    soap_discard_all(&ctx);
+    return told.str();
+}
+
+// Whole tags in the buffer are read by short ways, with what earlier messages have taught of their order.
+TEST_F(binding, short_ways_and_what_earlier_messages_taught_change_nothing)
+{
+    std::string uri;
+    for (const soap_namespace *row = ctx.namespaces; row->prefix; ++row) {
+        if (std::string(row->prefix) == "protocol")
+            uri = row->uri;
+    }
+    const std::string state = "<protocolProfile:state>active</protocolProfile:state>";
+    const auto contact = [](const std::string &members) {
+        return "<protocol:contact>" + members + "</protocol:contact>";
+    };
+    const std::string name = "<protocol:name>A</protocol:name>", mail = "<protocol:email>B</protocol:email>";
+    const auto in_prefix = [&](const std::string &attribute, const std::string &prefix) {
+        return "<protocol:contact " + attribute + ">" + "<" + prefix + "name>A</" + prefix + "name><" +
+               prefix + "email>B</" + prefix + "email></protocol:contact>" + contact(name + mail);
+    };
+    const std::string contents[] = {
+        state + contact(name + mail) + contact(name),
+        contact(mail + name + mail) + state,
+        "\n " + contact("\n <protocol:name> A </protocol:name>\n\t" + mail + " <!-- c --> ") + state,
+        state + state + contact(name + name),
+        contact("<protocol:unknown><protocol:name>C</protocol:name></protocol:unknown>" + name),
+        contact("<protocolProfile:name>C</protocolProfile:name>" + mail),
+        in_prefix("xmlns:p='" + uri + "'", "p:"),
+        in_prefix("xmlns:protocol='urn:other'", "protocol:"),
+        in_prefix("xmlns='" + uri + "'", ""),
+        in_prefix("xmlns='urn:other'", ""),
+        in_prefix("xmlns:q='urn:other' xmlns:\xC3\xA9='" + uri + "'", "\xC3\xA9:"),
+        // "u" and "protocol" have one place in the memory of prefixes
+        "<protocol:contact xmlns:u='urn:other'><u:x/>" + name + "</protocol:contact>",
+        in_prefix("", "undeclared:"),
+        contact("<protocol:name xsi:nil='true'/><protocol:email a='b'>B</protocol:email>" + name),
+        contact("<protocol:name>A &amp;&lt;&#65;<![CDATA[&]]>\xC3\xA9</protocol:name>" + mail),
+        contact("<protocol:name>A</protocol:name ><protocol:email/>" + mail),
+        "<protocolProfile:state> active </protocolProfile:state>",
+        "<protocolProfile:state>1</protocolProfile:state>" + contact(mail),
+        "<protocolProfile:state>unheard</protocolProfile:state>" + contact(mail),
+        "<protocolProfile:state>active&amp;</protocolProfile:state>",
+        contact("<protocol:name>A</protocol:nam>" + mail),
+        contact("<protocol:name>A<protocol:email>B</protocol:email></protocol:name>"),
+        contact(name + "</protocol:\xFF>") + state,
+        "<protocol:contact>" + name,
+    };
+    for (const std::uint32_t mode : {0U, MODE_UTF_STRINGS, MODE_LATIN1, MODE_STRICT | MODE_UTF_STRINGS}) {
+        for (const std::string &content : contents) {
+            memory_wire slow;
+            soap_set_namespaces(&slow, ctx.namespaces);
+            slow.piece = [](std::size_t) { return 1; };
+            const std::string expected = outcome_of(slow, content, mode);
+            for (const std::string &lesson : contents) {
+                memory_wire taught;
+                soap_set_namespaces(&taught, ctx.namespaces);
+                for (int times = 0; times < 3; ++times)
+                    outcome_of(taught, lesson, mode & MODE_STRICT ? MODE_UTF_STRINGS : mode);
+                EXPECT_EQ(outcome_of(taught, content, mode), expected) << content << "\nafter " << lesson;
+            }
+        }
+    }
 }
 
 TEST_F(binding, nesting_stops_at_the_limit_of_open_elements)
