@@ -39,15 +39,18 @@ public:
     {
         if (!wanted_)
             return;
-        FD_ZERO(&set_);
+        set_ = {};
         FD_SET(socket_, &set_);
     }
     // Another descriptor; -1 is none.
     void add(int other)
     {
-        if (other >= 0)
-            FD_SET(other, &set_);
-        used_ = used_ || other >= 0;
+        if (other < 0)
+            return;
+        if (!used_)
+            set_ = {};
+        FD_SET(other, &set_);
+        used_ = true;
     }
     fd_set *get() { return used_ ? &set_ : nullptr; }
     bool ready() const { return wanted_ && FD_ISSET(socket_, &set_); }

@@ -388,7 +388,8 @@ bool xml_head_guess(const soap *ctx, tag_guess &guess)
     const soap_namespace_scope *const scope = ctx->namespace_scope;
     const soap_prefix_cache &prefix = ctx->prefix_cache[scope->tag_prefix];
     const std::size_t length = ctx->tag_length;
-    if (!ctx->tag_resolved || length + 2 > tag_guess::SIZE ||
+    if (!ctx->tag_resolved || ctx->attributes_set != 0 || ctx->bare_declarations != 0 ||
+        length + 2 > tag_guess::SIZE ||
         tag_name_stop<true>::find(ctx->tag, ctx->tag + length) != ctx->tag + length ||
         ctx->tag_local != (prefix.length != 0 ? prefix.length + 1 : 0) ||
         !same_name(ctx->tag, prefix.text, prefix.length))
