@@ -46,10 +46,11 @@ bool copy_text(soap *ctx, std::string &target,
                const std::string &source); // false with SOAP_OUT_OF_MEMORY or SOAP_LENGTH
 bool out_of_memory(soap *ctx);             // SOAP_OUT_OF_MEMORY; false
 
-// What the next item makes a vector grow by counts in max_memory.
+// What the next item makes a vector grow by counts in max_memory, and what a released one has kept with its
+// first item.
 template <class V> void vector_charge(soap *ctx, const std::vector<V> &vector)
 {
-    if (vector.size() == vector.capacity())
+    if (vector.empty() || vector.size() == vector.capacity())
         memory_charge(ctx, std::max(vector.capacity() * sizeof(V), SMALLEST_ALLOCATION));
 }
 

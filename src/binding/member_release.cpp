@@ -52,6 +52,8 @@ std::size_t release_text(std::string &text)
 // Out of line, so that the many vectors without texts cost next to nothing.
 [[gnu::noinline]] static void release_each(soap *owner, std::vector<std::string> &texts)
 {
+    for (std::string &text : texts)
+        release_text(text);
     for (std::size_t i = texts.size(); i-- > 0;) {
         std::string &text = texts[i];
         const std::size_t bytes = sizeof text + allocated(text);
@@ -60,7 +62,6 @@ std::size_t release_text(std::string &text)
         soap_instance *shell = empty_text(owner);
         if (shell == nullptr)
             return;
-        release_text(text);
         static_cast<std::string *>(shell->object)->swap(text);
         idle_give(owner, TEXT_TYPE_ID, shell, bytes);
     }

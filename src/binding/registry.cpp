@@ -13,6 +13,7 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "binding/envelope.h"
+#include "binding/member_release.h"
 #include "core/failure.h"
 #include "core/instance_pool.h"
 #include "core/limits.h"
@@ -183,6 +184,8 @@ void unmake(const type_entry &entry, void *object, int count)
 {
     switch (entry.kind) {
     case type_kind::text:
+        if (count < 0 && object != nullptr)
+            release_text(*static_cast<std::string *>(object)); // which may be a password
         return delete_or_array<std::string>(object, count);
     case type_kind::object:
         return entry.ops->destroy(object, count);

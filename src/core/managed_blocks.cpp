@@ -80,6 +80,8 @@ bool keep_block(soap *ctx, soap_block_trailer *trailer)
     if (list == nullptr || !idle_has_room(ctx->pools->idle, *list, idle_bytes(trailer)))
         return false;
     track_rest(ctx, trailer->entry);
+    std::memset(block_start(trailer), 0,
+                trailer->span - sizeof CANARY); // keys and the like don't wait with it
     list->push(trailer, ctx->pools->idle.large);
     ctx->pools->idle.bytes += idle_bytes(trailer);
     return true;

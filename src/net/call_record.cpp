@@ -310,7 +310,8 @@ void call_wake_clear(const soap *ctx)
 bool call_is_cancelled(const soap *ctx)
 {
     const soap_call_record *const record = running_record(ctx);
-    return record != nullptr && record->state.load(std::memory_order_relaxed) == CANCELLED;
+    return record != nullptr && is_armed(*record) &&
+           record->state.load(std::memory_order_relaxed) == CANCELLED;
 }
 
 void call_cancel_hold(soap *ctx)
@@ -333,7 +334,7 @@ void call_cancel_release(soap *ctx)
 
 void call_pause(soap *ctx, std::int64_t time)
 {
-    const bool held = ctx->call_record != nullptr && ctx->call_record->held;
+    const bool held = ctx->call_record != nullptr && ctx->call_record->held && is_armed(*ctx->call_record);
     const soap_call_record *const record = held ? ctx->call_record : nullptr;
     pollfd wake{record != nullptr ? record->wake_fd : -1, POLLIN, 0};
     const std::int64_t end = tcp_clock() + time;

@@ -299,19 +299,32 @@ TEST(released_objects, are_blocks_of_their_own_and_a_hosts_hook_has_its_way)
 TEST(released_objects, are_wiped_and_stay_in_their_context)
 {
     steady_calls calls;
+    using answer = protocolProfile__ProfileContent;
     const std::string secret = "a password that is too long for its place";
-    for (const bool in_vector : {false, true}) {
-        const std::string member =
-            in_vector ? "<p:thisURI>" + secret + "</p:thisURI>"
-                      : "<p:association><p:password>" + secret + "</p:password></p:association>";
-        calls.wire.answers = {
-            http_answer(answer_envelope("<E:Body><p:getResponse>" + member + "</p:getResponse></E:Body>"))};
+    const struct {
+        std::string before, secret, behind;
+        const char *(*place)(const answer &);
+    } rows[] = {
+        {"<p:association><p:password>", secret, "</p:password></p:association>",
+         [](const answer &got) -> const char * { return got.association[0]->password->data(); }},
+        {"<p:thisURI>", secret, "</p:thisURI>",
+         [](const answer &got) -> const char * { return got.thisURI[0].data(); }},
+        {"<p:thisURI>", "in its place", "</p:thisURI>",
+         [](const answer &got) -> const char * { return got.thisURI[0].data(); }},
+        {"<c:credentials><c:certificate>", "QSBrZXkgb2YgaXRzIG93bg==", "</c:certificate></c:credentials>",
+         [](const answer &got) -> const char * {
+             return reinterpret_cast<const char *>(got.credentials[0]->certificate->content);
+         }},
+    };
+    for (const auto &row : rows) {
+        calls.wire.answers = {http_answer(answer_envelope(
+            "<E:Body><p:getResponse>" + row.before + row.secret + row.behind + "</p:getResponse></E:Body>"))};
         ASSERT_EQ(0, calls.get());
-        const char *const bytes = in_vector ? calls.got.result->thisURI[0].data()
-                                            : calls.got.result->association[0]->password->data();
-        ASSERT_EQ(secret, bytes);
+        const char *const bytes = row.place(*calls.got.result);
+        const std::string held = row.secret.back() == '=' ? "A key of its own" : row.secret;
+        ASSERT_EQ(held, std::string(bytes, held.size()));
         calls.proxy.destroy();
-        EXPECT_EQ(std::string(secret.size(), '\0'), std::string(bytes, secret.size()));
+        EXPECT_EQ(std::string(held.size(), '\0'), std::string(bytes, held.size())) << row.before;
     }
     soap copy(calls.proxy);
     EXPECT_EQ(copy.pool_limit, SOAP_POOL_LIMIT);

@@ -707,6 +707,8 @@ TEST(client_attachments, pass_between_files_memory_and_functions)
     EXPECT_EQ(wired.wire.opened, 0) << "nothing is sent";
     wired.wire.answers.clear();
     EXPECT_TRUE(wired.get(named_answer("x"))) << "the client is usable afterwards";
+    std::remove(sent_file.c_str());
+    std::remove(into.c_str());
 }
 
 TEST(client_ports, call_a_port_without_a_proxy_class)

@@ -80,6 +80,34 @@ TEST_F(forked, a_child_leaves_the_connections_of_its_parent_alone)
         }
 }
 
+// A host that cancels, and forks before the call has ended.
+TEST_F(forked, a_child_made_in_a_cancelled_call_makes_calls_of_its_own)
+{
+    static pid_t child;
+    const crowd_server server(false);
+    auto own = std::make_unique<client>(server);
+    ASSERT_EQ(soap_cancel_arm(&own->proxy), SOAP_OK);
+    own->proxy.call_timeout = CHILD_LIMIT_S; // so that each wait asks whether it may go on
+    own->proxy.on_connect = [](soap *ctx, const char *, const char *, int) -> int {
+        soap_cancel(ctx);
+        child = fork();
+        return child == 0 ? SOAP_USER_ERROR : SOAP_OK;
+    };
+    const int error = own->call();
+    if (child == 0) {
+        alarm(CHILD_LIMIT_S);
+        own->proxy.on_connect = nullptr;
+        const bool right = error != 0 && own->call() == 0;
+        own.reset();
+        _exit(right ? NOTHING_SAID : 1);
+    }
+    EXPECT_NE(error, 0);
+    EXPECT_EQ(soap_call_report(&own->proxy)->ended_by, ENDED_BY_CANCEL);
+    int status = 0;
+    EXPECT_EQ(waitpid(child, &status, 0), child);
+    EXPECT_EQ(status, NOTHING_SAID << 8);
+}
+
 // The pattern of servers that fork for each client.
 TEST_F(forked, a_child_serves_the_client_that_its_parent_accepted)
 {

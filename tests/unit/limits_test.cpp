@@ -249,6 +249,20 @@ TEST(max_memory, counts_what_a_message_holds)
     }
 }
 
+TEST(max_memory, counts_what_released_objects_have_kept_for_it)
+{
+    const std::string answer = with_length(answer_with(repeat_text("<p:thisURI>u</p:thisURI>", 4000)));
+    profile_call calls;
+    ASSERT_EQ(calls.get(answer), 0);
+    const std::int64_t first = calls.proxy.memory_held;
+    for (int i = 0; i < 3; ++i) {
+        calls.proxy.destroy();
+        ASSERT_EQ(calls.get(answer), 0);
+        EXPECT_GE(calls.proxy.memory_held, first / 10 * 9)
+            << i << ", growing step by step takes a little more";
+    }
+}
+
 // What a host holds from earlier answers is its own affair.
 TEST(max_memory, is_a_messages_own)
 {
