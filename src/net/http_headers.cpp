@@ -262,12 +262,17 @@ constexpr header_row HEADERS[] = {
 
 // By the first letter of a key, whatever its case: bit n tells that HEADERS[n] begins so.
 constexpr std::size_t LETTERS = 32;
-constexpr auto ROWS_OF_LETTER = [] {
+constexpr std::array<std::uint32_t, LETTERS> rows_of_letter()
+{
     std::array<std::uint32_t, LETTERS> rows{};
-    for (std::size_t i = 0; i < std::size(HEADERS); ++i)
-        rows[static_cast<unsigned char>(HEADERS[i].key[0]) % LETTERS] |= 1U << i;
+    std::uint32_t bit = 1;
+    for (const header_row &row : HEADERS) {
+        rows[static_cast<unsigned char>(row.key[0]) % LETTERS] |= bit;
+        bit <<= 1;
+    }
     return rows;
-}();
+}
+constexpr std::array<std::uint32_t, LETTERS> ROWS_OF_LETTER = rows_of_letter();
 
 // A key matches up to its first quote, if it has one; most are spelled as in the table.
 bool matches(const char *key, std::size_t length, std::string_view pattern)
