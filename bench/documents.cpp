@@ -258,8 +258,8 @@ protocolProblemReport__ProblemReportContent *make_document(soap *owner, std::siz
 {
     document_maker maker(owner);
     report_class *document = maker.outer();
-    const std::size_t room = bytes > FRAME_BYTES ? bytes - FRAME_BYTES : 0;
-    for (std::size_t i = 0; i < (room + NESTED_REPORT_BYTES / 2) / NESTED_REPORT_BYTES; ++i)
+    const std::size_t rest = bytes > FRAME_BYTES ? bytes - FRAME_BYTES : 0;
+    for (std::size_t i = 0; i < (rest + NESTED_REPORT_BYTES / 2) / NESTED_REPORT_BYTES; ++i)
         document->problemReport.push_back(maker.nested());
     return document;
 }

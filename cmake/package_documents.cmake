@@ -1,5 +1,5 @@
-# What Debian and whoever audits a machine want of a package beside its programs: copyright, changelog, symbols of the library, and a
-# bill of materials (SPDX). All of it is the same at each build of a version. To be included by packages.cmake.
+# What Debian and whoever audits a machine want of a package besides its programs: copyright, changelog, symbols of the library, and a
+# bill of materials (SPDX). No time of the build is in it. To be included by packages.cmake.
 set(ZUV_RELEASE_DAY 2026-11-22) # of PROJECT_VERSION
 set(ZUV_RELEASE_DATE "Sun, 22 Nov 2026")
 set(package_files ${PROJECT_SOURCE_DIR}/cmake/package_files)

@@ -278,7 +278,7 @@ void proxies_and_credentials()
     expect(proxy.create(&profile, created) == SOAP_TCP_ERROR, "without the proxy there is no connection");
     proxy.proxy_host = nullptr;
 
-    proxy.auth_user = "ada"; // borrowed, and forgotten by `destroy`: set them ahead of each call
+    proxy.auth_user = "ada"; // borrowed, and forgotten by `destroy`: set them before each call
     proxy.auth_password = "secret";
     expect(proxy.create(&profile, created) == 0, "a service without accounts takes any");
 }

@@ -29,7 +29,7 @@ struct document_error : std::runtime_error {
 };
 
 // Several objects may refer to one object, which is then written as many times. So many
-// bytes may result from so many that arrived: room for what the service adds, and for other names and
+// bytes may result from so many that arrived: space for what the service adds, and for other names and
 // prefixes.
 constexpr std::uint64_t grown(std::uint64_t bytes)
 {

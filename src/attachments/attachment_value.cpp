@@ -1,4 +1,4 @@
-// attachment_value.cpp - a binary value that stands beside the message: its reference, out and in.
+// attachment_value.cpp - a binary value outside the XML of the message: its reference, out and in.
 //
 // Elsewhere: the value's class (binding), inline base64 (the primitives), how references find their
 // attachments (attachment_refs.cpp).

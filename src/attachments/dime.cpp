@@ -79,7 +79,7 @@ void describe(soap *ctx, const soap_attachment &record)
     ctx->dime.flags = MEDIA_TYPE;
 }
 
-// A chunk's marks, beside its type format: more follow, or it is the last one of the message.
+// A chunk's flags, in addition to its type format: more follow, or it is the last one of the message.
 void mark(soap *ctx, bool more, bool last_record)
 {
     const unsigned marks = more ? CHUNK : last_record ? MESSAGE_END : 0;

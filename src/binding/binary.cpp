@@ -37,7 +37,7 @@ bool read_bytes(soap *ctx, xsd__base64Binary &binary)
     return binary.content != nullptr || ctx->error == 0;
 }
 
-// Absent bytes and no bytes are told apart by the pointer alone.
+// Absent bytes and no bytes differ in the pointer alone.
 bool take_nothing(soap *ctx, xsd__base64Binary &binary)
 {
     binary.content = static_cast<unsigned char *>(soap_block_alloc(ctx, 1));

@@ -104,7 +104,7 @@ int class_pointer_out(soap *ctx, const class_ops &ops, const char *tag, int id, 
                       const char *type);
 void class_pointer_mark(soap *ctx, const class_ops &ops, const void *object);
 
-// A reference is to be filled by a copy of an object of `size` bytes with `content` bytes beside it. False
+// A reference is to be filled by a copy of an object of `size` bytes with `content` bytes in addition. False
 // with SOAP_LENGTH.
 bool object_copy_allowed(soap *ctx, std::size_t size, std::size_t content);
 

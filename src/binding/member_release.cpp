@@ -57,7 +57,7 @@ std::size_t release_text(std::string &text)
     for (std::size_t i = texts.size(); i-- > 0;) {
         std::string &text = texts[i];
         const std::size_t bytes = sizeof text + allocated(text);
-        if (bytes == sizeof text || !idle_has_room(owner, TEXT_TYPE_ID, bytes))
+        if (bytes == sizeof text || !idle_has_space(owner, TEXT_TYPE_ID, bytes))
             continue;
         soap_instance *shell = empty_text(owner);
         if (shell == nullptr)
@@ -80,7 +80,7 @@ std::size_t instance_recycle(soap *ctx, soap_instance *instance)
     if (instance->type_id == TEXT_TYPE_ID) {
         auto &text = *static_cast<std::string *>(instance->object);
         const std::size_t bytes = sizeof text + allocated(text);
-        return idle_has_room(ctx, TEXT_TYPE_ID, bytes) ? sizeof text + release_text(text) : 0;
+        return idle_has_space(ctx, TEXT_TYPE_ID, bytes) ? sizeof text + release_text(text) : 0;
     }
     const type_entry *entry = type_entry_of(instance->type_id);
     if (entry == nullptr)

@@ -62,7 +62,7 @@ struct idle_pool {
 
 // True if one more record that holds so many bytes may wait.
 template <class Record>
-bool idle_has_room(const idle_pool &idle, const idle_list<Record> &list, std::size_t bytes)
+bool idle_has_space(const idle_pool &idle, const idle_list<Record> &list, std::size_t bytes)
 {
     return bytes <= idle.bytes_max && idle.bytes <= idle.bytes_max - bytes &&
            (!idle.large || list.count < list.usual);

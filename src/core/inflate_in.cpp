@@ -158,7 +158,7 @@ int soap_inflate_refill(soap *ctx)
     if (ctx->zlib_state != ZLIB_INFLATING || stream->next_out == nullptr)
         return STREAM_ENDED;
     for (;;) {
-        // With no room left last time, more may come out of the input taken already.
+        // With the buffer full last time, more may come out of the input taken already.
         if (stream->avail_in == 0 && stream->avail_out != 0) {
             const int result = fetch_input(ctx);
             if (result != SOAP_OK)

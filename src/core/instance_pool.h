@@ -26,12 +26,13 @@ void idle_release_begin(soap *ctx);
 void idle_release_end(soap *ctx);
 
 // True if an object of the type that holds so many bytes may wait.
-inline bool idle_has_room(const soap *ctx, int type_id, std::size_t bytes)
+inline bool idle_has_space(const soap *ctx, int type_id, std::size_t bytes)
 {
-    return ctx->pools != nullptr && idle_has_room(ctx->pools->idle, ctx->pools->idle.objects[type_id], bytes);
+    return ctx->pools != nullptr &&
+           idle_has_space(ctx->pools->idle, ctx->pools->idle.objects[type_id], bytes);
 }
 
-// Lets an emptied object wait among those of the type; idle_has_room told that it may.
+// Lets an emptied object wait among those of the type; idle_has_space told that it may.
 inline void idle_give(soap *ctx, int type_id, soap_instance *instance, std::size_t bytes)
 {
     idle_pool &idle = ctx->pools->idle;

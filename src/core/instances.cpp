@@ -52,10 +52,10 @@ namespace {
 bool keep_instance(soap *ctx, soap_instance *instance)
 {
     if (instance->array_size >= 0 || instance->object == nullptr || instance->type_id <= IDLE_SHELLS ||
-        instance->type_id >= IDLE_TYPES || !idle_has_room(ctx, instance->type_id, 1))
+        instance->type_id >= IDLE_TYPES || !idle_has_space(ctx, instance->type_id, 1))
         return false;
     const std::size_t bytes = ctx->upcalls->recycle(ctx, instance);
-    if (bytes == 0 || !idle_has_room(ctx, instance->type_id, bytes))
+    if (bytes == 0 || !idle_has_space(ctx, instance->type_id, bytes))
         return false;
     idle_give(ctx, instance->type_id, instance, bytes);
     return true;

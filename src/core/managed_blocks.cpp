@@ -55,7 +55,7 @@ int check_canary(soap *ctx, soap_block_trailer *trailer)
     return found == CANARY ? SOAP_OK : corruption(ctx);
 }
 
-// False for a block that was given to tracked_free behind the list's back.
+// False for a block that was given to tracked_free without the list being told.
 bool entry_is_live(soap_block_trailer *trailer)
 {
     return trailer->entry->address == block_start(trailer) && track_is_live(trailer->entry);
@@ -77,7 +77,7 @@ std::size_t idle_bytes(const soap_block_trailer *trailer)
 bool keep_block(soap *ctx, soap_block_trailer *trailer)
 {
     idle_list<soap_block_trailer> *list = idle_blocks(ctx, trailer->span);
-    if (list == nullptr || !idle_has_room(ctx->pools->idle, *list, idle_bytes(trailer)))
+    if (list == nullptr || !idle_has_space(ctx->pools->idle, *list, idle_bytes(trailer)))
         return false;
     track_rest(ctx, trailer->entry);
     std::memset(block_start(trailer), 0,
@@ -277,7 +277,7 @@ int soap_block_unlink(soap *ctx, const void *address)
 
 namespace {
 
-// Room in the target's pools for all that the source holds, so that the move itself cannot fail half way.
+// Space in the target's pools for all that the source holds, so that the move itself cannot fail half way.
 int prepare_move(soap *source, soap *target)
 {
     std::size_t blocks = 0, instances = 0;

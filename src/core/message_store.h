@@ -1,4 +1,4 @@
-// message_store.h - the bytes of a call's message, kept while they are counted, so that it is written but once.
+// message_store.h - the bytes of a call's message, kept while they are counted, so that it is written only once.
 //
 // Here: the store, and whether the message's objects were marked. Elsewhere: which calls take this short way
 // (exchange/call.cpp), bytes that writers pass in stretches (soap_send_bytes in soap_io.h).
@@ -31,8 +31,8 @@ void message_store_wipe(soap *ctx);
 // Gives the store back.
 void message_store_free(soap *ctx);
 
-// Room for `length` bytes of a message that is being counted, which count as written; null if the store doesn't
-// take them.
+// Reserves `length` bytes of the store for a message that is being counted; they count as written. Null if the
+// store is full.
 inline char *store_reserve(soap *ctx, std::size_t length)
 {
     if (length > ctx->store_space)

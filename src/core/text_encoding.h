@@ -9,7 +9,7 @@
 
 #include <zuv_client_pro/soap.h>
 
-// Beside MODE_LATIN1: the bytes 0x80 to 0x9F are those of windows-1252.
+// With MODE_LATIN1: the bytes 0x80 to 0x9F are those of windows-1252.
 constexpr std::uint32_t MODE_WINDOWS_1252 = 0x100000;
 // A head names an encoding that isn't read: there must be an XML declaration that names another.
 constexpr std::uint32_t MODE_UNREAD_ENCODING = 0x200000;

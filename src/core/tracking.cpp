@@ -123,7 +123,7 @@ soap_track_entry *entry_for(soap *ctx, void *address)
             return nullptr; // malloc gives no block that it has given already
         if (!track_is_live(entry))
             pools->dead[entry->life - TRACK_DEAD] = nullptr;
-        else // freed behind our back
+        else // freed by somebody else
             ctx->memory_held -= bytes_held(entry);
         return entry;
     }

@@ -190,8 +190,8 @@ char *soap_fault_print_text(soap *ctx, char *buffer, std::size_t length)
     const auto put = [&](const char *text) {
         if (used + 1 >= length)
             return;
-        const std::size_t size = std::strlen(text), room = length - used - 1;
-        const std::size_t taken = size < room ? size : room;
+        const std::size_t size = std::strlen(text), space = length - used - 1;
+        const std::size_t taken = size < space ? size : space;
         std::memcpy(buffer + used, text, taken);
         used += taken;
         buffer[used] = '\0';

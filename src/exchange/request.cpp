@@ -1,4 +1,4 @@
-// request.cpp - the message of a call on its way out: marked, counted and written, or written but once.
+// request.cpp - the message of a call on its way out: marked, counted and written, or written only once.
 //
 // The short way: the bytes are kept as they are counted, without marks, and the head is sent before them. Always:
 // the bytes, the trace, the error, and what hooks and a host's own classes are called with are those of the long
@@ -26,7 +26,7 @@ int write_message(soap *ctx, const request_message &message)
 }
 
 // True if nobody can tell whether the message is written once or twice, and with marks or without: a tree with
-// a Content-Length, nothing beside its XML, and no hook that sees or changes it or what it is made from.
+// a Content-Length, nothing but its XML, and no hook that sees or changes it or what it is made from.
 bool writes_once(const soap *ctx)
 {
     constexpr std::uint32_t OTHER_WAYS =

@@ -24,7 +24,7 @@ struct soap_forward_record {
     soap_copy_hook hook;
 };
 
-// One id of the message, known from the object that bears it, from references to it, or from both.
+// One id of the message, known from the object that has it, from references to it, or from both.
 struct soap_id_record {
     soap_id_record *next;         // in its bucket, newest first
     soap_id_record *next_held;    // late resolution: in a queue of records, or in those that watch one place

@@ -1,4 +1,4 @@
-// identity_read.cpp - the id table: objects that bear an id, and the places that wait for one.
+// identity_read.cpp - the id table: objects that have an id, and the places that wait for one.
 //
 // Here: the table, registering an object, entering references. Elsewhere: filling the places (forward.cpp).
 //
@@ -202,7 +202,7 @@ bool index_grow(soap *ctx, soap_id_index *index)
     return true;
 }
 
-// Makes room in the index for one more record, when there is an index or the table calls for one.
+// Grows the index for one more record, when there is an index or the table calls for one.
 bool index_reserve(soap *ctx)
 {
     soap_id_index *index = ctx->id_index;

@@ -38,7 +38,7 @@ inline std::uint32_t address_hash(const void *address)
 }
 
 // Objects of one size stand at regular distances, which leaves most chains of a table unused. The first
-// table is small enough to bear that; in larger ones the hash is mixed.
+// table is small enough for that; in larger ones the hash is mixed.
 inline std::size_t chain_of(std::uint32_t hash, std::size_t mask)
 {
     if (mask < SOAP_POINTER_HASH_SIZE)

@@ -4,7 +4,7 @@
 //
 // Always: a context without memory for its record works like any other; what would be noted is lost. Only an
 // exchange that runs is noted: what happens between exchanges belongs to none. Texts and certificates are
-// taken apart when a host asks.
+// parsed when a host asks.
 #pragma once
 
 #include <atomic>

@@ -47,11 +47,11 @@ bool is_same(const memory &kept, const head_source &source)
 
 void forget(memory &kept)
 {
-    explicit_bzero(kept.bytes, kept.end); // an endpoint may hold what is not for everybody
+    explicit_bzero(kept.bytes, kept.end); // an endpoint may hold credentials
     kept.end = 0;
 }
 
-// False if there is no room.
+// False if it doesn't fit.
 bool append(memory &kept, std::size_t &used, const char *text, std::size_t length)
 {
     if (length > memory::SIZE - used)

@@ -20,8 +20,8 @@ struct head_source {
 // False: it isn't.
 bool head_memory_send(soap *ctx, const head_source &source, std::uint64_t count, int *result);
 
-// Remembers the `length` bytes of a head for a body of `count` bytes; a longer one than there is room for, and
-// any where memory runs out, is not.
+// Remembers the `length` bytes of a head for a body of `count` bytes; one that doesn't fit, or
+// for which there is no memory, is not remembered.
 void head_memory_keep(soap *ctx, const head_source &source, std::uint64_t count, const char *head,
                       std::size_t length);
 

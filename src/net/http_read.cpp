@@ -203,9 +203,9 @@ void append_request_target(soap *ctx, const char *target, const char *version)
     if (*target != '/')
         ctx->endpoint[0] = '\0';
     const std::size_t used = std::strlen(ctx->endpoint);
-    const std::size_t room = SOAP_TEXT_SIZE - 1 - used;
+    const std::size_t space = SOAP_TEXT_SIZE - 1 - used;
     const std::size_t length = static_cast<std::size_t>(end - target);
-    const std::size_t copied = length < room ? length : room;
+    const std::size_t copied = length < space ? length : space;
     std::memcpy(ctx->endpoint + used, target, copied);
     ctx->endpoint[used + copied] = '\0';
 }

@@ -41,7 +41,7 @@ using tcp_address_list = std::unique_ptr<addrinfo, tcp_address_delete>;
 // Resolves; `flags` AI_... . Null with a fault, whose detail is `failure`.
 tcp_address_list tcp_resolve(soap *ctx, const char *host, int port, int flags, const char *failure);
 
-// Keeps a peer's address in ctx->peer, cut to the room there.
+// Keeps a peer's address in ctx->peer, cut to its size.
 void tcp_keep_peer(soap *ctx, const addrinfo *address);
 
 // Keeps a fresh socket; what was true of the one before is forgotten.

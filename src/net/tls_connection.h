@@ -79,7 +79,7 @@ struct tls_verdict {
     soap *ctx = nullptr;
     int error = 0;          // X509_V_ERR_...; 0: it wasn't
     int depth = 0;          // of the certificate; 0 is the peer's
-    char subject[256] = ""; // of it, cut to the room; empty: not known
+    char subject[256] = ""; // of it, truncated; empty: not known
 };
 // From here on `verdict` takes what the handshakes of tls_connection find, and the report of the call the
 // certificate that was refused; null: nothing does. It must live as long.

@@ -138,7 +138,7 @@ int tls_peek(soap *ctx)
 
 const char *tls_error_text(soap *ctx, int result)
 {
-    char part[256]; // room that OpenSSL asks for one error
+    char part[256]; // the size that OpenSSL asks for one error
     const int code = SSL_get_error(ctx->tls_connection, result);
     bounded_text text(ctx->message_text, sizeof ctx->message_text);
     text.add(error_name(code, part, sizeof part));

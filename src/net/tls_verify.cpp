@@ -215,12 +215,12 @@ public:
             if (length_ + 1 < sizeof text_)
                 text_[length_++] = is_harmless(c) ? c : '?';
     }
-    // An item of a list. False once there is no room for more.
+    // An item of a list. False once the text is full.
     bool add_item(std::string_view item)
     {
-        constexpr std::size_t ROOM = sizeof text_ - 64;
+        constexpr std::size_t CAPACITY = sizeof text_ - 64;
         add(items_++ == 0 ? "" : ", ");
-        const bool fits = length_ < ROOM && item.size() < ROOM - length_;
+        const bool fits = length_ < CAPACITY && item.size() < CAPACITY - length_;
         add(fits ? item : "...");
         return fits;
     }

@@ -12,7 +12,7 @@ namespace {
 
 const soap_code_row *row_of(const soap_code_row *table, std::string_view name)
 {
-    const char first = name.empty() ? '\0' : name[0]; // tells most names apart
+    const char first = name.empty() ? '\0' : name[0]; // differs in most names
     for (; table->name != nullptr; table++)
         if (table->name[0] == first && std::strncmp(table->name, name.data(), name.size()) == 0 &&
             table->name[name.size()] == '\0')

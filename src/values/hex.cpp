@@ -47,7 +47,7 @@ inline bool is_hex_digit(std::int32_t code)
     return hex_digit(code) >= 0;
 }
 
-// Decodes the pairs of digits at the start of a stretch into the growing text, which has room for them.
+// Decodes the pairs of digits at the start of a stretch into the growing text, which has space for them.
 const char *take_pairs(soap *ctx, const char *text, const char *end)
 {
     while (end - text >= 2 && is_hex_digit(text[0]) && is_hex_digit(text[1])) {

@@ -23,7 +23,7 @@ namespace {
 // without end: past this number of records one that is idle takes another name.
 constexpr std::size_t RECORDS_BEFORE_RENAMING = 256;
 constexpr std::size_t USUAL_VALUE = 64; // bytes of a first value buffer
-constexpr std::size_t USUAL_NAME = 64;  // room for a name in a new record, bytes
+constexpr std::size_t USUAL_NAME = 64;  // bytes for the name in a new record
 
 soap_attribute *&chain_of(soap_namespace_scope *scope, std::uint32_t hash)
 {
@@ -157,7 +157,7 @@ void xml_attributes_hide(soap *ctx)
         ctx->namespace_scope->attributes_visible = 0;
 }
 
-int xml_attribute_room(soap *ctx, soap_attribute *record, std::size_t size)
+int xml_attribute_reserve(soap *ctx, soap_attribute *record, std::size_t size)
 {
     if (record->size >= size)
         return SOAP_OK;
@@ -173,7 +173,7 @@ int xml_attribute_room(soap *ctx, soap_attribute *record, std::size_t size)
 
 int xml_attribute_store(soap *ctx, soap_attribute *record, std::string_view value)
 {
-    if (xml_attribute_room(ctx, record, value.size() + 1))
+    if (xml_attribute_reserve(ctx, record, value.size() + 1))
         return ctx->error;
     *std::copy(value.begin(), value.end(), record->value) = '\0';
     return SOAP_OK;

@@ -29,7 +29,7 @@ void xml_attributes_hide(soap *ctx);
 
 // Makes the record's value buffer hold at least `size` bytes; its contents are lost if it grows. 0 or
 // SOAP_OUT_OF_MEMORY.
-int xml_attribute_room(soap *ctx, soap_attribute *record, std::size_t size);
+int xml_attribute_reserve(soap *ctx, soap_attribute *record, std::size_t size);
 
 // Copies a text to the record's value and terminates it. SOAP_OK or SOAP_OUT_OF_MEMORY.
 int xml_attribute_store(soap *ctx, soap_attribute *record, std::string_view value);

@@ -69,7 +69,7 @@ void drop_record(soap *ctx, soap_namespace_scope *scope, soap_prefix *record)
     ++scope->spare_count;
 }
 
-// The remembered records that no message has in scope make room in the chains.
+// The remembered records that no message has in scope leave the chains.
 void drop_remembered(soap *ctx, soap_namespace_scope *scope)
 {
     while (soap_prefix *record = scope->root.first) {
@@ -151,7 +151,7 @@ bool is_row_uri(const soap_namespace &row, const namespace_lengths *lengths, std
     return row.uri != nullptr && (lengths == nullptr || lengths->uri == uri.size()) && uri == row.uri;
 }
 
-// The patterns of a table have long heads in common: the last letter of the head tells most apart.
+// The patterns of a table share long prefixes: the last letter before the mark differs in most.
 bool fits_pattern(const soap_namespace &row, const namespace_lengths *lengths, std::string_view uri)
 {
     if (row.pattern == nullptr)

@@ -81,9 +81,9 @@ struct soap_namespace_scope {
     std::size_t attribute_reuse;      // chain where an idle record to rename is looked for next
     soap_attribute *spare_attributes; // linked by next
     std::size_t spare_attribute_count;
-    soap_namespace *spare_table; // room for row_count rows and their end; null while it is the working copy
-    const soap_namespace *copy; // the working copy, with room for row_count rows and their end; null for none
-    bool copy_received;         // a row of it has or had a received URI
+    soap_namespace *spare_table; // has row_count rows and their end; null while it is the working copy
+    const soap_namespace *copy;  // the working copy: row_count rows and their end; null for none
+    bool copy_received;          // a row of it has or had a received URI
     remembered_root root;
     char *received[RECEIVED_KEPT];   // blocks of RECEIVED_SIZE for received URIs; owned; null until first use
     unsigned received_used;          // bit n: a row has received[n]

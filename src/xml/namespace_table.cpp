@@ -146,7 +146,7 @@ bool compose_declarations(soap *ctx, soap_namespace_scope *scope)
     return true;
 }
 
-// Room for a received URI of so many bytes. Null if memory runs out.
+// Memory for a received URI of so many bytes. Null if memory runs out.
 char *take_received(soap *ctx, std::size_t size)
 {
     soap_namespace_scope *scope = ctx->namespace_scope;

@@ -53,7 +53,8 @@ struct attribute_order {
 
 int store_value(soap *ctx, soap_attribute *record, const char *text, std::size_t length)
 {
-    if (record->size <= length && xml_attribute_room(ctx, record, std::max(length + 1, VALUE_BYTES_MIN)) != 0)
+    if (record->size <= length &&
+        xml_attribute_reserve(ctx, record, std::max(length + 1, VALUE_BYTES_MIN)) != 0)
         return ctx->error;
     std::memcpy(record->value, text, length);
     record->value[length] = '\0';

@@ -95,7 +95,7 @@ const char *simple_value_done(soap *ctx, std::size_t length, bool cut)
     return ctx->scratch_text;
 }
 
-// The bytes of a character in a byte string; `target` has room for six.
+// The bytes of a character in a byte string; `target` has six bytes.
 std::size_t code_bytes(const soap *ctx, std::uint32_t code, char *target)
 {
     if ((ctx->mode & MODE_UTF_STRINGS) != 0)

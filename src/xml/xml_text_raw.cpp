@@ -333,7 +333,7 @@ int put_content(soap *ctx, std::int32_t token)
     return token >= 0 ? put_raw(ctx, raw_state::content, token) : text_put_token(ctx, token);
 }
 
-// A look ahead for a tag may have gone into a section.
+// A search for a tag may have gone into a section.
 int resume_cdata(soap *ctx, raw_state &state)
 {
     if (ctx->in_cdata == CDATA_OUTSIDE)

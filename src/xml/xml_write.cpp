@@ -25,7 +25,7 @@ namespace {
 
 constexpr std::string_view DECLARATION = "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n";
 constexpr std::string_view INDENT = "\n\t\t\t\t\t\t\t\t\t";
-constexpr std::size_t DEFAULT_NAMESPACE_ROWS = 4; // rows whose prefixes stay in use beside default namespaces
+constexpr std::size_t DEFAULT_NAMESPACE_ROWS = 4; // rows whose prefixes stay in use with default namespaces
 
 bool has_mode(const soap *ctx, std::uint32_t flag)
 {

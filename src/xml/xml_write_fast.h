@@ -26,7 +26,7 @@ inline bool xml_only_counts(const soap *ctx)
            (ctx->on_send_prepare == nullptr);
 }
 
-// Room for `length` bytes in the send buffer or, while a message is counted, in the store, which count as sent;
+// Reserves `length` bytes in the send buffer or, while a message is counted, in the store, which count as sent;
 // the caller fills all of it at once. Null if the bytes must go through soap_send_bytes: counted alone,
 // unbuffered, filtered, or not enough space.
 inline char *xml_reserve(soap *ctx, std::size_t length)

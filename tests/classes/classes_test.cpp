@@ -65,7 +65,7 @@ protected:
         ops.mark(object, &ctx);
     }
 
-    // The object as a document of its own: the element "root" of no namespace bears the type.
+    // The object as a document of its own: the element "root" of no namespace has the type.
     std::string write(const binding::class_ops &ops, const void *object, std::uint32_t mode)
     {
         ctx.output_mode = MODE_BARE_XML | mode;

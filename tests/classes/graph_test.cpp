@@ -27,7 +27,7 @@ struct form {
 constexpr form forms[] = {
     {"literal SOAP 1.1, graph mode", 1, false, SOAP_XML_GRAPH},
     {"literal SOAP 1.2, graph mode", 2, false, SOAP_XML_GRAPH},
-    {"encoded SOAP 1.1: shared objects behind the first", 1, true, 0},
+    {"encoded SOAP 1.1: shared objects after the first", 1, true, 0},
     {"encoded SOAP 1.1, graph mode", 1, true, SOAP_XML_GRAPH},
     {"encoded SOAP 1.2: shared objects where first met", 2, true, 0},
 };

@@ -8,7 +8,7 @@
 //   file NAME        any other input file, as it stands
 //   expect PATH      lines that stand together in this output; "model": in the dump of the model
 //   error MESSAGE    what refuses the contract
-// Lines ahead of the first section say what the case is about.
+// Lines before the first section say what the case is about.
 #pragma once
 
 #include <filesystem>

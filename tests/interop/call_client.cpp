@@ -39,7 +39,7 @@ struct options {
         app.add_flag("--keep-alive", keep_alive, "Keep the connection");
         app.add_flag("--chunked", chunked, "Send requests in chunks");
         app.add_flag("--gzip", gzip, "Compress requests");
-        app.add_flag("--steps", steps, "Wait for a line of input ahead of each call but the first");
+        app.add_flag("--steps", steps, "Wait for a line of input before each call but the first");
         app.add_option("--connect", connect, "Time limit of connecting");
         app.add_option("--send", send, "Time limit of sending");
         app.add_option("--recv", recv, "Time limit of receiving");

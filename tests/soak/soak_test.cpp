@@ -32,7 +32,7 @@ constexpr int STRETCHES = 20; // after the first of them nothing is made for the
 constexpr int ANEW = 100;     // one call in so many goes over a new connection
 constexpr std::ptrdiff_t BLOCK_LIMIT =
     20; // by which the blocks held may differ: of a session, of a random state
-// Of processor time per call. 1.53 was measured beside another program on the same cores, with flat memory; a
+// Of processor time per call. 1.53 was measured with another program on the same cores, with flat memory; a
 // cost that grows with the calls made grows to a multiple in so many.
 constexpr double SLOWDOWN_LIMIT = 2.5;
 

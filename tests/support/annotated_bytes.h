@@ -1,4 +1,4 @@
-// annotated_bytes.h - bytes written down for people: hexadecimal pairs and 'texts', with comments behind "#".
+// annotated_bytes.h - bytes written down for people: hexadecimal pairs and 'texts', with comments after "#".
 #pragma once
 
 #include <algorithm>

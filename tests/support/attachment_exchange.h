@@ -9,7 +9,7 @@
 namespace attachment_exchange {
 
 constexpr int VALUE_TYPE = 10;           // type id of the values
-constexpr int LENGTH_DIFFERS = -1000000; // result of send: not the length that was counted ahead
+constexpr int LENGTH_DIFFERS = -1000000; // result of send: not the length that was counted before
 constexpr char ENVELOPE_URI[] = "http://schemas.xmlsoap.org/soap/envelope/";
 
 // A message by hand.

@@ -52,7 +52,7 @@ protected:
         }
         EXPECT_EQ(bytes[length], 0);
         EXPECT_EQ(soap_element_in_end(&ctx, "d"), 0) << text;
-        EXPECT_EQ(soap_element_in_begin(&ctx, "next", 0, nullptr), 0) << "reading goes on behind the element";
+        EXPECT_EQ(soap_element_in_begin(&ctx, "next", 0, nullptr), 0) << "reading goes on after the element";
         return "[" + std::string(reinterpret_cast<const char *>(bytes), static_cast<std::size_t>(length)) +
                "]";
     }
@@ -71,7 +71,7 @@ TEST_F(base64, whole_texts_are_decoded_up_to_padding)
         {"padding may lack", "Zm9vYg", "[foob]"},
         {"a lone digit carries nothing", "Zm9vY", "[foo]"},
         {"white space anywhere", " Zm9\r\nvY\tmF y\n", "[foobar]"},
-        {"nothing counts behind padding", "Zg==!!", "[f]"},
+        {"nothing counts after padding", "Zg==!!", "[f]"},
         {"the other alphabet", "Zm9-", "refused"},
         {"a high byte", "Zm9v\xc3", "refused"},
     };
@@ -93,9 +93,9 @@ TEST_F(base64, a_target_is_filled_and_not_overrun)
         const std::string whole = "foobar";
         EXPECT_EQ(decoded("Zm9vYmFy", target, capacity), "[" + whole.substr(0, capacity) + "]");
         EXPECT_EQ(target[capacity], '#') << "capacity " << capacity;
-        EXPECT_TRUE(capacity < 7 || target[6] == '\0') << "a terminator where room is left";
+        EXPECT_TRUE(capacity < 7 || target[6] == '\0') << "a terminator where space is left";
     }
-    EXPECT_EQ(decoded("Zm9vYmFy!", target, 3), "[foo]") << "what has no room is not looked at";
+    EXPECT_EQ(decoded("Zm9vYmFy!", target, 3), "[foo]") << "what doesn't fit is not looked at";
 }
 
 TEST_F(base64, bytes_are_encoded_into_a_target_or_none)
@@ -118,13 +118,13 @@ TEST_F(base64, content_of_a_message_reads_the_same_at_every_cut)
         {{"a digit as a reference", "Zm9vYmF&#121;", "[foobar]"}, soap_base64_inline_read},
         {{"in a section", "<![CDATA[Zm9v]]>YmFy", "[foobar]"}, soap_base64_inline_read},
         {{"around a comment", "Zm9v<!-- x -->YmFy", "[foobar]"}, soap_base64_inline_read},
-        {{"the rest behind padding is dropped", "Zm8=Zm9v!", "[fo]"}, soap_base64_inline_read},
+        {{"the rest after padding is dropped", "Zm8=Zm9v!", "[fo]"}, soap_base64_inline_read},
         {{"up to a child", "Zm9v<child>Zm9v</child>", "[foo]"}, soap_base64_inline_read},
         {{"up to a mark", "Zm9v>Zm9v", "[foo]"}, soap_base64_inline_read},
         {{"empty", "", "[]"}, soap_base64_inline_read},
         {{"not in the alphabet", "Zm9v-", "refused"}, soap_base64_inline_read},
         {{"both cases", "666f6F", "[foo]"}, soap_hex_inline_read},
-        {{"blanks ahead", " \n66", "[f]"}, soap_hex_inline_read},
+        {{"blanks before", " \n66", "[f]"}, soap_hex_inline_read},
         {{"up to a blank", "66 6f", "[f]"}, soap_hex_inline_read},
         {{"a lone digit", "666", "refused"}, soap_hex_inline_read},
         {{"a lone digit and more", "6g", "refused"}, soap_hex_inline_read},

@@ -368,7 +368,7 @@ TEST_F(binding, a_vector_named_by_a_reference_is_filled_through_its_id)
 // What a reader that begins anew with each text tells of it: the error and where the reading ended, or the profile.
 std::string outcome_of(memory_wire &ctx, const std::string &content, std::uint32_t mode)
 {
-    // The blanks leave room in the buffer after each tag.
+    // The blanks keep bytes in the buffer after each tag.
     const auto *profile =
         read_on<protocolProfile__ProfileContent>(ctx, "<c>" + content + std::string(80, ' ') + "</c>", mode);
     const std::size_t held = ctx.look_ahead == XML_END ? 2 : ctx.look_ahead != 0 ? 1 : 0; // bytes pushed back

@@ -106,11 +106,11 @@ TEST(buffered_in, the_first_bytes_decide_what_is_read)
         std::int32_t first; // byte that the reader gets
     } rows[] = {
         {"plain XML", "<a/>", 0, MODE_LATIN1, '<'},
-        {"blanks ahead", " \r\n\t<a/>", 0, MODE_LATIN1, '<'},
+        {"blanks before", " \r\n\t<a/>", 0, MODE_LATIN1, '<'},
         {"nothing", "", SOAP_EOF, MODE_LATIN1, -1},
         {"blanks alone", "   ", SOAP_EOF, MODE_LATIN1, -1},
         {"UTF-8 mark", "\xEF\xBB\xBF<a/>", 0, 0, '<'},
-        {"UTF-8 mark, blanks behind it", "\xEF\xBB\xBF \r\n<a/>", 0, 0, '<'},
+        {"UTF-8 mark, blanks after it", "\xEF\xBB\xBF \r\n<a/>", 0, 0, '<'},
         {"UTF-8 mark and blanks alone", "\xEF\xBB\xBF  ", SOAP_EOF, 0, -1},
         {"UTF-16, low byte first", "\xFF\xFE<", SOAP_UTF_ERROR, MODE_LATIN1, -1},
         {"UTF-16, high byte first", "\xFE\xFF<", SOAP_UTF_ERROR, MODE_LATIN1, -1},
@@ -163,7 +163,7 @@ TEST(buffered_in, bodies_read_the_same_at_every_split)
         {"either case",
          "a\r\n0123456789\r\nB\r\n0123456789a\r\n0\r\n\r\n",
          {0, "01234567890123456789a", 0, true}},
-        {"zeros ahead", "0000000000000004\r\n<a/>\r\n0\r\n\r\n", {0, "<a/>", 0, true}},
+        {"zeros before", "0000000000000004\r\n<a/>\r\n0\r\n\r\n", {0, "<a/>", 0, true}},
         {"trailers", "4\r\n<a/>\r\n0\r\nA: b\r\nC: d\r\n\r\n", {0, "<a/>", 0, true}},
         {"digits past the sixteenth", "00000000000000041\r\n<a/>\r\n0\r\n\r\n", {0, "<a/>", 0, false}},
         {"junk between chunks", "2\r\n<a\r\n?!\r\n2\r\n/>\r\n0\r\n\r\n", {0, "<a/>", 0, false}},

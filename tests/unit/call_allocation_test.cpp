@@ -302,7 +302,7 @@ TEST(released_objects, are_wiped_and_stay_in_their_context)
     using answer = protocolProfile__ProfileContent;
     const std::string secret = "a password that is too long for its place";
     const struct {
-        std::string before, secret, behind;
+        std::string before, secret, after;
         const char *(*place)(const answer &);
     } rows[] = {
         {"<p:association><p:password>", secret, "</p:password></p:association>",
@@ -318,7 +318,7 @@ TEST(released_objects, are_wiped_and_stay_in_their_context)
     };
     for (const auto &row : rows) {
         calls.wire.answers = {http_answer(answer_envelope(
-            "<E:Body><p:getResponse>" + row.before + row.secret + row.behind + "</p:getResponse></E:Body>"))};
+            "<E:Body><p:getResponse>" + row.before + row.secret + row.after + "</p:getResponse></E:Body>"))};
         ASSERT_EQ(0, calls.get());
         const char *const bytes = row.place(*calls.got.result);
         const std::string held = row.secret.back() == '=' ? "A key of its own" : row.secret;

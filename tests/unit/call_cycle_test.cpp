@@ -324,7 +324,7 @@ TEST_F(call_cycle, the_references_of_a_fault_are_followed)
         {"what the detail holds", ENVELOPE_11,
          fault(code + text + "<detail><c:Client.ObjectNotFound href=\"#o\"/></detail>") +
              "<m id=\"o\"><c:uri>u</c:uri></m>"},
-        {"to nothing, beside others", ENVELOPE_11,
+        {"to nothing, with others", ENVELOPE_11,
          fault(code + "<faultstring href=\"#t\"/><faultactor href=\"#a\"/><detail href=\"#d\"/>") +
              found("d") + "<m id=\"t\">t</m>"},
         {"nil, not a reference", ENVELOPE_11, fault(code + text + "<detail xsi:nil=\"true\"/>"), "none"},

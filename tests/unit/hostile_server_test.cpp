@@ -143,7 +143,7 @@ std::vector<hostility> all_peers()
         "length 10 too large", 0, [](text n) { return with_false_length(n, 10); }, MEETS_LIMIT);
     answer("two lengths, the second right", 0,
            [=](text n) { return inserted(good(n), "Content-Length: 7\r\n"); });
-    answer("a length beside chunks", 0, [=](text n) { return inserted(chunks(n), "Content-Length: 7\r\n"); });
+    answer("a length with chunks", 0, [=](text n) { return inserted(chunks(n), "Content-Length: 7\r\n"); });
     answer("chunk size too small", SOAP_TAG_MISMATCH, [](text n) { return with_changed_chunk(n, "60"); });
     answer(
         "chunk size too large", SOAP_EOF, [](text n) { return with_changed_chunk(n, "6A"); }, MEETS_LIMIT);

@@ -286,7 +286,7 @@ TEST(response_head, names_the_encoding_where_neither_the_document_nor_the_host_d
 TEST(response_head, decides_by_the_status)
 {
     static const struct {
-        const char *head; // behind "HTTP/1.1 "
+        const char *head; // after "HTTP/1.1 "
         const char *body;
         int result;
         const char *text, *detail; // of the fault; null: none

@@ -176,7 +176,7 @@ TEST(response_out, names_the_status)
         const char *rule;
         int status;
         std::uint64_t count;
-        const char *lines; // ahead of "Server"
+        const char *lines; // before "Server"
         void (*prepare)(memory_wire &wire) = [](memory_wire &) {};
     } cases[] = {
         {"HTTP status", 404, 5, "HTTP/1.1 404 Not Found\r\n"},

@@ -172,9 +172,9 @@ TEST(attachments, count_in_max_memory_where_they_are_kept_in_memory)
 
 // --- max_memory ---
 
-std::string answer_with(const std::string &content, const std::string &behind = {})
+std::string answer_with(const std::string &content, const std::string &after = {})
 {
-    return answer_envelope("<E:Body><p:getResponse>" + content + "</p:getResponse>" + behind + "</E:Body>");
+    return answer_envelope("<E:Body><p:getResponse>" + content + "</p:getResponse>" + after + "</E:Body>");
 }
 
 std::size_t memory_in_use()
@@ -191,11 +191,11 @@ constexpr bool KNOWS_MEMORY_IN_USE = !__has_feature(address_sanitizer);
 constexpr bool KNOWS_MEMORY_IN_USE = true;
 #endif
 
-std::string numbered(const std::string &before, const std::string &behind, int count)
+std::string numbered(const std::string &before, const std::string &after, int count)
 {
     std::string all;
     for (int i = 0; i < count; ++i)
-        all += before + std::to_string(i) + behind;
+        all += before + std::to_string(i) + after;
     return all;
 }
 
@@ -216,7 +216,7 @@ TEST(max_memory, counts_what_a_message_holds)
          "<c:credentials><c:certificate>" + std::string(4000000, 'A') + "</c:certificate></c:credentials>"},
         {"ids", numbered("<c:contact id=\"c", "\"/>", 5000)},
         {"references", "<c:contact id=\"c\"/>" + repeat_text("<c:contact href=\"#c\"/>", 50000)},
-        {"references ahead",
+        {"references before",
          repeat_text("<p:thisURI href=\"#u\"/>", 50000) + "<p:thisURI id=\"u\">u</p:thisURI>", 2 * MB},
         {"attribute values", numbered("<p:profile a", "=\"" + std::string(20000, 'v') + "\"/>", 200)},
     };
@@ -405,8 +405,8 @@ TEST(endless, input_ends_by_a_limit_and_so_does_its_trace)
         int code;
         std::string text;
     } rows[] = {
-        {"blank lines ahead of the head", "", "\r\n", SOAP_HEADER_LINE, "Header line too long"},
-        {"blanks ahead of the root", body, " ", SOAP_LENGTH, message},
+        {"blank lines before the head", "", "\r\n", SOAP_HEADER_LINE, "Header line too long"},
+        {"blanks before the root", body, " ", SOAP_LENGTH, message},
         {"comments", body, "<!-- c -->", SOAP_LENGTH, message},
         {"a comment", body + "<!--", "c", SOAP_LENGTH, message},
         {"instructions", body, "<?p i?>", SOAP_LENGTH, message},
@@ -415,7 +415,7 @@ TEST(endless, input_ends_by_a_limit_and_so_does_its_trace)
         {"an attribute", body + "<a b='", "c", SOAP_LENGTH, message},
         {"a preamble", head + "Content-Type: multipart/related; boundary=\"b\"\r\n\r\n", "x\r\n", SOAP_LENGTH,
          message},
-        {"blanks behind the envelope", ended, "4\r\n    \r\n", SOAP_LENGTH, message},
+        {"blanks after the envelope", ended, "4\r\n    \r\n", SOAP_LENGTH, message},
         {"extensions of chunks", chunks, "1;" + std::string(4000, 'x') + "\r\n \r\n", SOAP_LENGTH, framing},
         {"zeros of chunk sizes", chunks, std::string(15, '0') + "1\r\n \r\n", SOAP_LENGTH, framing},
         {"empty blocks of deflate", head + GZIP + "\r\n" + gzipped("").substr(0, 10),

@@ -225,7 +225,7 @@ TEST_F(memory, blocks_and_instances_move_to_another_context)
     EXPECT_STREQ(moved, "moved");
     EXPECT_TRUE(destroyed.empty());
     soap_discard_objects(&ctx, nullptr);
-    EXPECT_EQ(destroyed, (std::vector<int>{1, 2})) << "moved instances come behind the target's own";
+    EXPECT_EQ(destroyed, (std::vector<int>{1, 2})) << "moved instances come after the target's own";
     soap_block_free(&ctx, moved);
     soap_block_free(&ctx, own);
     EXPECT_EQ(ctx.allocation_list, nullptr);

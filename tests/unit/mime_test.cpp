@@ -209,9 +209,9 @@ TEST(mime_in, reports_what_is_wrong_with_a_message)
     const std::string a = part("Content-ID: <a>\r\n", "x");
     const wrong_case cases[] = {
         {"good", a + END, 0},
-        {"blanks behind the boundary", "\r\n--bb \t\r\nContent-ID: <a>\r\n\r\nx\r\n--bb--", 0},
+        {"blanks after the boundary", "\r\n--bb \t\r\nContent-ID: <a>\r\n\r\nx\r\n--bb--", 0},
         {"epilogue", a + END + "\r\nepilogue", 0},
-        {"something behind the boundary", "\r\n--bbb\r\n\r\nx" + a + END, SOAP_MIME_ERROR},
+        {"something after the boundary", "\r\n--bbb\r\n\r\nx" + a + END, SOAP_MIME_ERROR},
         {"two of one id", a + a + END, SOAP_MIME_ERROR},
         {"two of one id, spelled differently", a + part("Content-ID: %61\r\n", "y") + END, SOAP_MIME_ERROR},
         {"one dash", a + "\r\n--bb-\r\n", SOAP_MIME_ERROR},

@@ -84,11 +84,11 @@ TEST_F(tls, the_first_https_connection_sets_up_by_default)
 TEST_F(tls, a_tunnel_through_a_proxy_leads_to_the_host_behind_it)
 {
     std::string head;
-    const server_context behind = server_for({"far.example", ""});
+    const server_context beyond = server_for({"far.example", ""});
     peer proxy([&](int client) {
         head = loopback::read_head(client);
         loopback::write_text(client, "HTTP/1.0 200 Connection established\r\nContent-Type: text/x\r\n\r\n");
-        const server_connection connection(SSL_new(behind.get()));
+        const server_connection connection(SSL_new(beyond.get()));
         SSL_set_fd(connection.get(), client);
         if (SSL_accept(connection.get()) == 1)
             echo(connection.get());

@@ -64,7 +64,7 @@ TEST(xml_read, elements_and_attributes_come_out_as_they_stand)
         {"text in place of a tag", "\xEF\xBD\xA1", ""},
         {"no name", "<></>", "!5"},
         {"end of input", "<a><b", "a{!-1"},
-        {"end of input behind the slash", "<a/", "!-1"},
+        {"end of input after the slash", "<a/", "!-1"},
         {"end in an attribute", "<a b='c", "!-1"},
         {"broken end tag", "<a>x</a b>", "a{'x'!5"},
         {"end tag of another name", "<a>x</b>", "a{'x'}!-1"},

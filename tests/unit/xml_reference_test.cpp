@@ -1,4 +1,4 @@
-// xml_reference_test.cpp - the reader beside another parser: both must see the same document.
+// xml_reference_test.cpp - the reader against another parser: both must see the same document.
 //
 // Documents come from a small random grammar with fixed seeds, and from the XML files that the system has,
 // most of them style sheets of a text processor. Texts, attribute values and the order of tags are compared.

@@ -44,7 +44,7 @@ std::string raw_tokens(soap *ctx)
 TEST(xml_tokens, markup_is_folded_into_tokens_and_comments_are_invisible)
 {
     const reading rows[] = {
-        {"blanks behind the bracket", "< a>< / b>", "[<]a[>][</]#32b[>][eof]"},
+        {"blanks after the bracket", "< a>< / b>", "[<]a[>][</]#32b[>][eof]"},
         {"quotes", "x=\"a'", "x=[\"]a['][eof]"},
         {"comments of dashes", "a<!------><!--b - b-->c", "ac[eof]"},
         {"instruction with marks inside", "a<?p ?a>b?\?>c", "ac[eof]"},
@@ -53,10 +53,10 @@ TEST(xml_tokens, markup_is_folded_into_tokens_and_comments_are_invisible)
         {"section by another name", "<![XYZ[<]]>b", "<b[eof]"},
         {"brackets in a section", "<![CDATA[]a]]b]]]>]]", "]a]]b]]][eof]"},
         {"end in a comment", "a<!-- b", "a[eof]"},
-        {"end behind a comment's dash", "a<!-- b -", "a[eof]"},
+        {"end after a comment's dash", "a<!-- b -", "a[eof]"},
         {"end in a declaration", "a<!DOCTYPE b", "a[eof]"},
         {"end in a section's name", "a<![CDA", "a[eof]"},
-        {"end behind the bracket", "a<", "a[eof]"},
+        {"end after the bracket", "a<", "a[eof]"},
         {"end in an instruction", "<?xml ", "[eof]"},
         {"end in a section", "<![CDATA[a]]", "a]][eof]"},
     };
@@ -71,7 +71,7 @@ TEST(xml_tokens, references_give_their_character_and_never_markup)
         {"Latin-1 names", "&nbsp;&yuml;&euro;", "{#160}{#255}{#127}[eof]"},
         {"case doesn't count, the first row wins", "&Auml;&auml;&EURO;", "{#196}{#196}{#127}[eof]"},
         {"upper case is no markup name", "&AMP;", "{#127}[eof]"},
-        {"zeros ahead and the last character", "&#0000065;&#x000000000041;&#x10FFFF;&#1114111;",
+        {"zeros before and the last character", "&#0000065;&#x000000000041;&#x10FFFF;&#1114111;",
          "{A}{A}{#1114111}{#1114111}[eof]"},
         {"numbers of no character",
          "&#0;&#11;&#xD800;&#xDFFF;&#xFFFE;&#x110000;&#xFFFFFFFFFFFFFFFF;&#4294967361;",

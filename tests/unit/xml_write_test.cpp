@@ -202,7 +202,7 @@ TEST(xml_write, what_xml_cannot_carry_is_refused)
                     w.pass(MODE_BUFFERED | MODE_COUNTING, start::inside, [&](soap *ctx) {
                         EXPECT_EQ(write_by(way, ctx, text + "tail"),
                                   (is_utf8 ? c.utf8 : c.latin1) ? SOAP_UTF_ERROR : 0)
-                            << testing::PrintToString(c.bytes) << " by " << way << " behind " << before;
+                            << testing::PrintToString(c.bytes) << " by " << way << " after " << before;
                     });
                 }
     }
