@@ -5,14 +5,7 @@
 #include <cstdint>
 #include <cstring>
 
-inline bool is_hex_digit(char c)
-{
-    return (c >= '0' && c <= '9') || (c >= 'A' && c <= 'F') || (c >= 'a' && c <= 'f');
-}
-inline unsigned hex_digit_value(char c)
-{
-    return c <= '9' ? static_cast<unsigned>(c - '0') : (c & 7U) + 9U;
-}
+#include "core/hex_digit.h"
 
 // A piece of text read as it stands or percent-decoded, character by character.
 class id_view {
@@ -25,10 +18,10 @@ public:
     {
         if (at_ == end_)
             return -1;
-        if (decodes_ && *at_ == '%' && end_ - at_ > 2 && is_hex_digit(at_[1]) && is_hex_digit(at_[2])) {
-            const unsigned value = hex_digit_value(at_[1]) << 4 | hex_digit_value(at_[2]);
+        if (decodes_ && *at_ == '%' && end_ - at_ > 2 && hex_digit(at_[1]) >= 0 && hex_digit(at_[2]) >= 0) {
+            const int value = hex_digit(at_[1]) << 4 | hex_digit(at_[2]);
             at_ += 3;
-            return static_cast<int>(value & 0xFF);
+            return value;
         }
         return static_cast<unsigned char>(*at_++);
     }

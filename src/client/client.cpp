@@ -12,15 +12,6 @@
 
 namespace zuv {
 
-namespace {
-
-const char *or_empty(const char *text)
-{
-    return text != nullptr ? text : "";
-}
-
-} // namespace
-
 // --- extras ---
 
 extras::extras() = default;
@@ -102,9 +93,9 @@ void outcome::note_failure(engine &from, int code)
         const char **const text = soap_fault_string_field(&from);
         *text = soap_string_dup(&from, *text);
         failure_.fault_ = from.fault;
-        failure_.fault_code_ = or_empty(*soap_fault_code_field(&from));
-        failure_.fault_text_ = or_empty(*text);
-        failure_.fault_detail_ = or_empty(soap_fault_detail_value(&from));
+        failure_.fault_code_ = text_or_empty(*soap_fault_code_field(&from));
+        failure_.fault_text_ = text_or_empty(*text);
+        failure_.fault_detail_ = text_or_empty(soap_fault_detail_value(&from));
     }
     from.error = code;
 }
@@ -190,11 +181,11 @@ outcome::~outcome()
 
 std::vector<received_part> outcome::attachments() const
 {
-    const auto told = [](const char *text) { return std::string_view(or_empty(text)); };
     std::vector<received_part> found;
     for (const soap_attachment *part = parts_; part != nullptr; part = part->next)
         if (part != root_)
-            found.push_back({told(part->id), told(part->type), told(part->description),
+            found.push_back({text_or_empty(part->id), text_or_empty(part->type),
+                             text_or_empty(part->description),
                              std::string_view(part->content, part->content != nullptr ? part->size : 0)});
     return found;
 }

@@ -37,7 +37,7 @@ int limit_of(std::chrono::microseconds limit)
     constexpr std::int64_t most = 2147483647;
     const std::int64_t count = limit.count();
     if (count <= 0)
-        return SOAP_OK;
+        return 0;
     if (count <= most)
         return -static_cast<int>(count);
     const std::int64_t seconds = count / 1000000;

@@ -3,6 +3,7 @@
 // Elsewhere: which kind of failure it was (engine.cpp).
 #include <cstring>
 
+#include <zuv_client_pro/client_document.h>
 #include <zuv_client_pro/client_failure.h>
 #include <zuv_client_pro/protocol.h>
 #include <zuv_client_pro/soap_envelope.h>
@@ -10,15 +11,6 @@
 #include <zuv_client_pro/soap_registry.h>
 
 namespace zuv {
-
-namespace {
-
-const char *told(const std::string *text)
-{
-    return text != nullptr ? text->c_str() : "";
-}
-
-} // namespace
 
 const std::error_category &error_category()
 {
@@ -87,12 +79,12 @@ const char *fault_info::name() const
 
 const char *fault_info::description() const
 {
-    return told(record_->description);
+    return text(record_->description);
 }
 
 const char *fault_info::subcode() const
 {
-    return told(record_->subcode);
+    return text(record_->subcode);
 }
 
 const char *failure::advice() const

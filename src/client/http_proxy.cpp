@@ -3,6 +3,8 @@
 
 #include <cstdlib>
 
+#include "core/hex_digit.h"
+
 namespace zuv {
 
 namespace {
@@ -18,14 +20,12 @@ std::string_view cut_before(std::string_view &text, char mark)
 // "%41" as "A"; what isn't an escape stays.
 std::string unescaped(std::string_view text)
 {
-    const auto digit = [](char c) {
-        return c >= '0' && c <= '9' ? c - '0' : (c | 32) >= 'a' && (c | 32) <= 'f' ? (c | 32) - 'a' + 10 : -1;
-    };
     std::string plain;
     for (std::size_t at = 0; at < text.size(); ++at) {
-        const bool escape =
-            text[at] == '%' && at + 2 < text.size() && digit(text[at + 1]) >= 0 && digit(text[at + 2]) >= 0;
-        plain += escape ? static_cast<char>(digit(text[at + 1]) * 16 + digit(text[at + 2])) : text[at];
+        const bool escape = text[at] == '%' && at + 2 < text.size() && hex_digit(text[at + 1]) >= 0 &&
+                            hex_digit(text[at + 2]) >= 0;
+        plain +=
+            escape ? static_cast<char>(hex_digit(text[at + 1]) * 16 + hex_digit(text[at + 2])) : text[at];
         at += escape ? 2 : 0;
     }
     return plain;

@@ -15,11 +15,6 @@ namespace {
 
 constexpr std::uint32_t TRANSFER_MODES = MODE_IO_MASK | MODE_MTOM | MODE_DIME;
 
-std::string_view told(const char *text)
-{
-    return text != nullptr ? text : "";
-}
-
 void clear_callbacks(soap *ctx)
 {
     ctx->mime_read_open = nullptr;
@@ -29,6 +24,13 @@ void clear_callbacks(soap *ctx)
     ctx->dime_write_open = nullptr;
     ctx->mime_write = ctx->dime_write = nullptr;
     ctx->mime_write_close = ctx->dime_write_close = nullptr;
+}
+
+// Of a received attachment's file. Returns SOAP_USER_ERROR.
+int report_unwritable(soap *ctx, const std::string &path)
+{
+    return soap_fault_receiver(ctx, "can't write the file of an attachment",
+                               soap_string_dup(ctx, path.c_str()), SOAP_USER_ERROR);
 }
 
 } // namespace
@@ -110,7 +112,9 @@ int transfers::end(soap *ctx, int code)
 void *transfers::choose(soap *ctx, const char *id, const char *type, const char *description)
 {
     sink to =
-        carried_->receiver_ ? carried_->receiver_({told(id), told(type), told(description), {}}) : sink();
+        carried_->receiver_
+            ? carried_->receiver_({text_or_empty(id), text_or_empty(type), text_or_empty(description), {}})
+            : sink();
     if (to.path.empty() && !to.write)
         return soap_attachment_in_memory(ctx);
     auto made = std::make_unique<receiving>();
@@ -118,9 +122,7 @@ void *transfers::choose(soap *ctx, const char *id, const char *type, const char 
     if (!made->to.path.empty()) {
         made->file.reset(std::fopen((made->to.path + ".part").c_str(), "wb"));
         if (made->file == nullptr)
-            return soap_fault_receiver(ctx, "can't write the file of an attachment",
-                                       soap_string_dup(ctx, made->to.path.c_str()), SOAP_USER_ERROR),
-                   nullptr;
+            return report_unwritable(ctx, made->to.path), nullptr;
     }
     incoming.push_back(std::move(made));
     return incoming.back().get();
@@ -157,8 +159,7 @@ int transfers::write_piece(soap *ctx, void *handle, const char *data, std::size_
 {
     receiving &into = *static_cast<receiving *>(handle);
     if (into.file != nullptr && std::fwrite(data, 1, length, into.file.get()) != length)
-        return soap_fault_receiver(ctx, "can't write the file of an attachment",
-                                   soap_string_dup(ctx, into.to.path.c_str()), SOAP_USER_ERROR);
+        return report_unwritable(ctx, into.to.path);
     if (into.file == nullptr && !into.to.write(data, length))
         return soap_fault_receiver(ctx, "the function for an attachment doesn't want it", nullptr,
                                    SOAP_USER_ERROR);
@@ -174,8 +175,7 @@ void transfers::end_incoming(soap *ctx, void *handle, soap_attachment *record)
     receiving &into = *static_cast<receiving *>(handle);
     into.whole = into.file == nullptr || std::fflush(into.file.get()) == 0;
     if (!into.whole)
-        soap_fault_receiver(ctx, "can't write the file of an attachment",
-                            soap_string_dup(ctx, into.to.path.c_str()), SOAP_USER_ERROR);
+        report_unwritable(ctx, into.to.path);
     if (record != nullptr) {
         record->content = nullptr;
         record->size = 0;

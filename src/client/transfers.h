@@ -13,6 +13,11 @@
 
 namespace zuv {
 
+inline const char *text_or_empty(const char *text)
+{
+    return text != nullptr ? text : "";
+}
+
 // Ends a call with SOAP_USER_ERROR before anything is sent, or while attachments are moved. `text` is constant.
 int refuse(soap *ctx, const char *text, const std::string &what);
 

@@ -196,58 +196,59 @@ TEST(client_failures, of_references_in_a_circle_are_finite)
 
 // --- repeating ---
 
-void answer_one(scripted::line &end)
+profile_result create_one(zuv::profile_client &client, const std::string &name = "call-1",
+                          const zuv::extras &how = zuv::extras::none())
 {
-    end.send(scripted::answer_to(end.request()));
+    protocolProfile__ProfileContent profile;
+    protocol__Identity identity;
+    std::string own = name;
+    identity.name = &own;
+    profile.identity = &identity;
+    return client.create(profile, how);
 }
+
+// Scripts of a connection: what comes after the first request, or after the one that follows an answer.
+using script = std::function<void(scripted::line &)>;
+
+script after_request(const script &then)
+{
+    return [then](scripted::line &end) {
+        end.request();
+        then(end);
+    };
+}
+
+script after_answer(const script &then)
+{
+    return [then](scripted::line &end) {
+        end.send(scripted::answer_to(end.request()));
+        after_request(then)(end);
+    };
+}
+
+const script CLOSE = [](scripted::line &) {};
+const script STAY_SILENT = [](scripted::line &end) { end.await_end(); };
 
 TEST(client_calls, are_repeated_only_if_the_request_was_not_taken)
 {
+    using kind = zuv::failure_kind;
     const struct {
         const char *rule;
-        std::function<void(scripted::line &)> first; // the first connection; later ones are served well
+        script first; // the first connection; later ones are served well
         bool repeatable;
         int calls; // the last one counts
-        zuv::failure_kind expected;
+        kind expected;
         int connections;
     } rows[] = {
-        {"kept and closed with the request",
-         [](scripted::line &end) {
-             answer_one(end);
-             end.request();
-         },
-         false, 2, zuv::failure_kind::none, 2},
-        {"kept and reset with the request",
-         [](scripted::line &end) {
-             answer_one(end);
-             end.request();
-             end.reset();
-         },
-         false, 2, zuv::failure_kind::none, 2},
-        {"kept and closed after a byte",
-         [](scripted::line &end) {
-             answer_one(end);
-             end.request();
-             end.send("H");
-         },
-         false, 2, zuv::failure_kind::broken, 1},
-        {"kept and silent",
-         [](scripted::line &end) {
-             answer_one(end);
-             end.request();
-             end.await_end();
-         },
-         false, 2, zuv::failure_kind::out_of_time, 1},
-        {"new and closed", [](scripted::line &end) { end.request(); }, false, 1, zuv::failure_kind::broken,
-         1},
-        {"new and closed, harmless", [](scripted::line &end) { end.request(); }, true, 1,
-         zuv::failure_kind::none, 2},
-        {"new and silent, harmless",
-         [](scripted::line &end) {
-             end.request();
-             end.await_end();
-         },
-         true, 1, zuv::failure_kind::none, 2},
+        {"kept and closed with the request", after_answer(CLOSE), false, 2, kind::none, 2},
+        {"kept and reset with the request", after_answer([](auto &end) { end.reset(); }), false, 2,
+         kind::none, 2},
+        {"kept and closed after a byte", after_answer([](auto &end) { end.send("H"); }), false, 2,
+         kind::broken, 1},
+        {"kept and silent", after_answer(STAY_SILENT), false, 2, kind::out_of_time, 1},
+        {"new and closed", after_request(CLOSE), false, 1, kind::broken, 1},
+        {"new and closed, harmless", after_request(CLOSE), true, 1, kind::none, 2},
+        {"new and silent, harmless", after_request(STAY_SILENT), true, 1, kind::none, 2},
     };
     zuv::options brief;
     brief.recv_limit = 200ms;
@@ -256,15 +257,12 @@ TEST(client_calls, are_repeated_only_if_the_request_was_not_taken)
         SCOPED_TRACE(row.rule);
         const scripted::server peer(row.first);
         zuv::profile_client client("http://127.0.0.1:" + std::to_string(peer.port()) + "/", brief);
-        zuv::document document;
-        protocolProfile__ProfileContent profile;
-        zuv::set(zuv::make(profile.identity).name, "call-1");
         zuv::extras how;
         if (row.repeatable)
             how.repeatable();
         for (int left = row.calls; left > 1; --left)
-            EXPECT_EQ(name_of(client.create(profile, how)), "call-1");
-        const profile_result last = client.create(profile, how);
+            EXPECT_EQ(name_of(create_one(client, "call-1", how)), "call-1");
+        const profile_result last = create_one(client, "call-1", how);
         EXPECT_EQ(last.failure().kind(), row.expected) << last.failure().message();
         EXPECT_EQ(peer.connections(), row.connections);
     }
@@ -293,17 +291,6 @@ TEST(client_calls, wait_between_attempts_within_the_total_limit)
 // --- what happened in a call ---
 
 class client_reports : public tls_peers::tls_test {};
-
-profile_result create_one(zuv::profile_client &client, const std::string &name = "call-1",
-                          const zuv::extras &how = zuv::extras::none())
-{
-    protocolProfile__ProfileContent profile;
-    protocol__Identity identity;
-    std::string own = name;
-    identity.name = &own;
-    profile.identity = &identity;
-    return client.create(profile, how);
-}
 
 zuv::options trusting()
 {
@@ -356,8 +343,6 @@ TEST_F(client_reports, follow_a_call_on_a_new_connection_and_on_a_kept_one)
 
 TEST_F(client_reports, and_texts_tell_what_ended_a_call)
 {
-    using script = std::function<void(scripted::line &)>;
-    const script silent = [](scripted::line &end) { end.await_end(); };
     const struct {
         const char *rule;
         bool tls;
@@ -366,16 +351,16 @@ TEST_F(client_reports, and_texts_tell_what_ended_a_call)
         soap_ending ended_by;
         const char *words, *refusal;
     } rows[] = {
-        {"closed", false, [](scripted::line &end) { end.request(); }, nullptr, ENDED_BY_PEER,
+        {"closed", false, after_request(CLOSE), nullptr, ENDED_BY_PEER,
          "The peer closed the connection without an answer", ""},
-        {"closed under TLS", true, [](scripted::line &end) { end.request(); }, nullptr, ENDED_BY_PEER,
+        {"closed under TLS", true, after_request(CLOSE), nullptr, ENDED_BY_PEER,
          "The peer closed the connection without an answer", ""},
         {"closed in the answer", false,
          [](scripted::line &end) { end.send(scripted::answer_to(end.request()).substr(0, 300)); }, nullptr,
          ENDED_BY_PEER, "The peer closed the connection in the midst of its answer", ""},
-        {"silent", false, silent, [](zuv::options &wanted, std::string &) { wanted.recv_limit = 50ms; },
+        {"silent", false, STAY_SILENT, [](zuv::options &wanted, std::string &) { wanted.recv_limit = 50ms; },
          ENDED_BY_RECV_LIMIT, "timed out (50000us receive delay)", ""},
-        {"silent for the whole call", true, silent,
+        {"silent for the whole call", true, STAY_SILENT,
          [](zuv::options &wanted, std::string &) { wanted.total_limit = 200ms; }, ENDED_BY_CALL_LIMIT,
          "call limit", ""},
         {"another answer", false,
@@ -426,44 +411,30 @@ std::atomic<soap *> signalled; // what is cancelled; armed before it stands here
 
 TEST_F(client_reports, of_calls_that_are_cancelled_wherever_they_wait)
 {
-    using script = std::function<void(scripted::line &, const std::function<void()> &cancel)>;
+    static std::function<void()> cancel; // of the row
+    const script cancelled = [](scripted::line &end) {
+        cancel();
+        end.await_end();
+    };
+    const script begun = [&](scripted::line &end) {
+        end.bytes(1);
+        cancelled(end);
+    };
     const struct {
         const char *rule;
         bool tls, by_signal;
         std::size_t length; // of the name in the request
         script first;
     } rows[] = {
-        {"for the answer", false, false, 6,
-         [](scripted::line &end, const auto &cancel) {
-             end.request();
-             cancel();
-             end.await_end();
-         }},
-        {"for the answer under TLS, by a signal", true, true, 6,
-         [](scripted::line &end, const auto &cancel) {
-             end.request();
-             cancel();
-             end.await_end();
-         }},
-        {"for a reader", false, false, std::size_t{1} << 24,
-         [](scripted::line &end, const auto &cancel) {
-             end.bytes(1);
-             cancel();
-             end.await_end();
-         }},
-        {"for the handshake", false, true, 6,
-         [](scripted::line &end, const auto &cancel) {
-             end.bytes(1);
-             cancel();
-             end.await_end();
-         }},
-        {"for the next attempt", false, false, 6,
-         [](scripted::line &end, const auto &cancel) {
-             end.request();
+        {"for the answer", false, false, 6, after_request(cancelled)},
+        {"for the answer under TLS, by a signal", true, true, 6, after_request(cancelled)},
+        {"for a reader", false, false, std::size_t{1} << 24, begun},
+        {"for the handshake", false, true, 6, begun},
+        {"for the next attempt", false, false, 6, after_request([](scripted::line &end) {
              end.send(http_answer("", "503 Later", "Connection: close\r\n"));
              end.await_end();
              cancel();
-         }},
+         })},
     };
     struct sigaction action {
     }, before;
@@ -473,7 +444,7 @@ TEST_F(client_reports, of_calls_that_are_cancelled_wherever_they_wait)
         SCOPED_TRACE(row.rule);
         const pthread_t caller = pthread_self();
         std::atomic<bool> told = false;
-        const auto cancel = [&] {
+        cancel = [&] {
             if (row.by_signal)
                 pthread_kill(caller, SIGUSR1);
             else
@@ -481,7 +452,7 @@ TEST_F(client_reports, of_calls_that_are_cancelled_wherever_they_wait)
             told = true;
             told.notify_one();
         };
-        const scripted::server peer([&](scripted::line &end) { row.first(end, cancel); }, row.tls);
+        const scripted::server peer(row.first, row.tls);
         std::string endpoint = peer.endpoint();
         if (std::strcmp(row.rule, "for the handshake") == 0)
             endpoint.insert(4, "s");
