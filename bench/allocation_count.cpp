@@ -1,4 +1,4 @@
-// allocation_count.cpp - malloc and its kin, in front of the C library's own.
+// allocation_count.cpp - malloc and its family, in front of the C library's own.
 #include "allocation_count.h"
 
 #include <malloc.h>

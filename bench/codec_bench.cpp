@@ -107,7 +107,7 @@ struct document {
     engine_run pooled;             // keeps all that is released for the next document
     const void *objects = nullptr; // null: in a form that the engine reads, and never writes
     std::string bytes;
-    std::string head, tail; // what stands around the content
+    std::string head, tail; // what encloses the content
     std::unique_ptr<peer_content> structs;
     pugi::xml_document dom;
 };

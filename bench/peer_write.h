@@ -1,7 +1,7 @@
 // peer_write.h - the peers' structs written as the document, to any sink.
 //
 // A sink has start(tag), start_typed(tag, xsi_type), end(tag) and element(tag, text). Here: the walk, in the
-// contract's order, and the sink of the bare append loop. Elsewhere: reading (peer_read.cpp).
+// contract's order, and the sink of the plain append loop. Elsewhere: reading (peer_read.cpp).
 #pragma once
 
 #include <string>

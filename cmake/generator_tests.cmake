@@ -11,7 +11,7 @@ target_link_libraries(generator_test PRIVATE contract_translator zuv_flags GTest
 add_dependencies(generator_test contract2cpp)
 add_test(NAME generator_test COMMAND generator_test)
 
-# Each public header stands alone in C++17; a failure is a failure of the build.
+# Each public header compiles alone in C++17; a failure is a failure of the build.
 file(GLOB ZUV_PUBLIC_HEADERS CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/include/zuv_client_pro/*.h)
 set(header_units)
 foreach(header ${ZUV_PUBLIC_HEADERS} ${ZUV_GENERATED_HEADERS})

@@ -1,6 +1,6 @@
 # The library: all of src/ once as objects, for the shared object and for the tests alike.
 file(GLOB ZUV_SOURCES CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/src/*/*.cpp)
-if(ZUV_SHARED_OBJECTS) # bound to itself: what it asks for can be told from what a test asks for
+if(ZUV_SHARED_OBJECTS) # bound to itself: what it asks for can be distinguished from what a test asks for
     add_library(zuv_objects SHARED ${ZUV_SOURCES})
     target_link_options(zuv_objects PRIVATE LINKER:-Bsymbolic-functions)
 else()
@@ -26,7 +26,7 @@ target_compile_features(zuv_client_pro INTERFACE cxx_std_17)
 target_include_directories(zuv_client_pro INTERFACE
     $<BUILD_INTERFACE:${PROJECT_SOURCE_DIR}/include>
     $<BUILD_INTERFACE:${PROJECT_BINARY_DIR}/generated/include>)
-# A host that calls none of these itself needs them all the same, which a linker told --as-needed doesn't see.
+# A host that calls none of these itself needs them all the same, which a linker with --as-needed doesn't see.
 target_link_libraries(zuv_client_pro INTERFACE -Wl,--push-state,--no-as-needed OpenSSL::SSL OpenSSL::Crypto ZLIB::ZLIB
     -Wl,--pop-state PRIVATE zuv_hardening)
 target_link_options(zuv_client_pro PRIVATE

@@ -43,7 +43,7 @@ class Comment:
             else:
                 self.text += ["\\endverbatim"] if verbatim else []
                 self.text.append(escaped(line.strip()))
-                # Paragraphs behind a table stay behind it in the source only.
+                # Paragraphs after a table stay after it in the source only.
             verbatim = False
         self.text += ["\\endverbatim"] if verbatim else []
 
@@ -57,24 +57,24 @@ class Comment:
         if declared and declared[0] in ("ctx", "ctx_") and self.row("ctx") is None:
             result.append("\\param %s the context" % declared[0])
         for names, text in self.rows:
-            told = escaped(" ".join(text).strip())
+            described = escaped(" ".join(text).strip())
             if declared is None:
-                result += ["", "- <b>%s</b> %s" % (escaped(", ".join(names)), told)]
+                result += ["", "- <b>%s</b> %s" % (escaped(", ".join(names)), described)]
             elif names[0] in templates:
-                result += ["\\tparam %s %s" % (names[0], told)]
+                result += ["\\tparam %s %s" % (names[0], described)]
             elif any(name in declared for name in names):
-                result += ["\\param %s %s" % (",".join(name for name in names if name in declared), told)]
+                result += ["\\param %s %s" % (",".join(name for name in names if name in declared), described)]
             elif names == ["returns"]:
-                result += ["\\return " + told]
+                result += ["\\return " + described]
             elif all(RESULT.fullmatch(name) for name in names):
-                result += ["\\retval %s %s" % (name.replace(" ", ""), told) for name in names]
+                result += ["\\retval %s %s" % (name.replace(" ", ""), described) for name in names]
             elif not all(name in others for name in names):
-                result += ["\\param %s %s" % (names[0], told)]
+                result += ["\\param %s %s" % (names[0], described)]
         return result
 
 
 def escaped(text):
-    """As Doxygen shows it as it is; what stands between double quotes it takes literally."""
+    """As Doxygen shows it as it is; what is between double quotes it takes literally."""
     html = {"&": "&amp;", "<": "&lt;", ">": "&gt;"}
     text = re.sub(r'("[^"]*")|[\\@$#%&<>]', lambda found: found[1] or html.get(found[0], "\\" + found[0]), text)
     return re.sub(r"`([^`]+)`", r"<code>\1</code>", text)
@@ -202,7 +202,7 @@ class Filter:
         return lines
 
     def take_trailing(self, lines):
-        """What stands at the ends of the lines, and goes on below them."""
+        """What is at the ends of the lines, and continues below them."""
         parts = [split_line(line) for line in lines]
         found = [part[1] for part in parts if part[1] is not None]
         if found and parts[-1][1] is not None:
@@ -218,7 +218,7 @@ class Filter:
         for declaration in declarations_of(macro.expanded(values)):
             name = re.search(r"(~?\w+|operator=)\s*(?:\(|= )", declaration)[1]
             if macro.name in ("SOAP_PROXY_CALL", "SOAP_CLASS_MAKER"):
-                told = above + [""] + macro.comment.lines(arguments(declaration), others=macro.comment_names)
+                described = above + [""] + macro.comment.lines(arguments(declaration), others=macro.comment_names)
             else:
                 key = {owner: "constructors", "~" + owner: "destructor", owner + "_init": "P_init"}.get(name, name)
                 row = documented.comment.row(key)
@@ -226,13 +226,13 @@ class Filter:
                     sys.exit("%s: %s is not in the comment of %s" % (sys.argv[1], key, macro.name))
                 about, _, result = re.sub(r"\bP\(", owner + "(", row).partition(" Returns ")
                 names = arguments(declaration) or []
-                told = [escaped(about)] + [
+                described = [escaped(about)] + [
                     "\\param %s %s" % (name, escaped(documented.comment.row(name) or "")) for name in names]
-                told += ["\\return " + escaped(result)] if result and not gives_nothing(declaration) else []
-            self.comment(told, "    ")
+                described += ["\\return " + escaped(result)] if result and not gives_nothing(declaration) else []
+            self.comment(described, "    ")
             self.out += declaration.split("\n")
 
-    def write_list(self, name, member, told):
+    def write_list(self, name, member, described):
         """A list of X macros, applied to a macro of the same file."""
         text = "\n".join(self.lines)
         body = re.search(r"#define %s\(X\)((?:.*\\\n)*.*)" % name, text)[1].replace("\\\n", " ")
@@ -240,7 +240,7 @@ class Filter:
         for entry in re.findall(r'X\(((?:"(?:\\.|[^"])*"|[^()"])*)\)', body):
             values = split_values(entry)
             self.out.append(shape.expanded(values))
-            words = told or [escaped("%s %s" % (values[1], values[2].strip('"')))]
+            words = described or [escaped("%s %s" % (values[1], values[2].strip('"')))]
             self.comment(words, trailing=True)
 
     def write(self, lines, above, shared):
@@ -268,8 +268,8 @@ class Filter:
         doc = above or (None if trailing else shared)
         if doc:
             indent = re.match(r" *", lines[0])[0]
-            told = doc.lines(arguments(joined), self.shared_names, template_arguments(joined))
-            self.comment([line for line in told if not gives_nothing(joined) or not line.startswith("\\ret")], indent)
+            described = doc.lines(arguments(joined), self.shared_names, template_arguments(joined))
+            self.comment([line for line in described if not gives_nothing(joined) or not line.startswith("\\ret")], indent)
         several = re.match(r"(\s*)((?:const )?[\w:]+) ([^()=]+, [^()=]+);$", code[0] if len(code) == 1 else "")
         for number, each in enumerate(several[3].split(", ")) if several else [(0, None)]:
             self.comment(doc.lines(), several[1]) if doc and number else None

@@ -6,7 +6,7 @@
 // file, wsTrace.log.
 //
 // Who owns what: requests are the host's own objects, and are read during the call only. Answers are the
-// proxy's, and live until its `destroy`, so a host that calls on and on lets go of them from time to time.
+// proxy's, and live until its `destroy`, so a host that keeps calling frees them from time to time.
 #include <cstdio>
 #include <stdexcept>
 #include <string>

@@ -116,7 +116,7 @@ std::size_t read_file(soap *, void *handle, char *buffer, std::size_t length)
     return count;
 }
 
-// The library keeps the bytes of what nobody expects in memory, which suits small parts.
+// The library keeps the bytes of unexpected parts in memory, which suits small parts.
 void *take_expected(soap *ctx)
 {
     transfer *const expected = static_cast<host *>(ctx->user)->expected;

@@ -1,7 +1,7 @@
 // guide.cpp - the pieces of code that docs/host-guide.md shows, as a host that compiles and runs.
 //
 // Usage: guide ENDPOINT, the Profile port of a service. Each function is one section of the guide; the
-// guide's blocks stand here word for word. Ends with 1 at the first call that goes another way than the guide
+// guide's blocks are here word for word. Ends with 1 at the first call that goes another way than the guide
 // says.
 #include <atomic>
 #include <chrono>
@@ -180,7 +180,7 @@ void errors_and_faults()
         std::printf("the service: %s\n", proxy.soap_fault_string());
         break;
     case SOAP_TCP_ERROR: // no connection: try again later
-    case SOAP_TLS_ERROR: // no trust: have somebody look at certificates and host name
+    case SOAP_TLS_ERROR: // no trust: certificates or host name need a look
     case SOAP_EOF:       // the connection ended, or a time limit passed
     default:             // an HTTP status such as 401 or 503, or another code of soap_error.h
         proxy.soap_print_fault(stderr);
@@ -228,12 +228,12 @@ void reporting()
     protocolProfile__ProfileContent profile;
     __protocolProfile__createResponse created;
     expect(proxy.create(&profile, created) == 0, "the service answers");
-    if (const soap_report *told = soap_call_report(&proxy))
+    if (const soap_report *report = soap_call_report(&proxy))
         std::printf("%s, %.1f ms, first byte after %.1f ms, %llu bytes received, HTTP status %d\n",
-                    told->peer, static_cast<double>(told->total_time) / 1000,
-                    static_cast<double>(told->first_byte_time) / 1000,
-                    static_cast<unsigned long long>(told->wire_received), told->http_status);
-    expect(soap_call_report(&proxy)->http_status == 200, "the report tells the status");
+                    report->peer, static_cast<double>(report->total_time) / 1000,
+                    static_cast<double>(report->first_byte_time) / 1000,
+                    static_cast<unsigned long long>(report->wire_received), report->http_status);
+    expect(soap_call_report(&proxy)->http_status == 200, "the report gives the status");
 }
 
 void older_behaviour()
@@ -255,6 +255,25 @@ void several_endpoints()
     expect(proxy.create(&profile, created) == 0, "the second endpoint serves");
 }
 
+void kept_and_closed(const std::string &uri)
+{
+    ProfileSoapBindingProxy proxy(endpoint, MODE_KEEP_ALIVE);
+    protocol__Header header;
+    std::string target = uri;
+    header.targetURI = &target;
+    proxy.soap_header(&header);
+    _protocolProfile__getRequest request;
+    __protocolProfile__getResponse response;
+    int error = proxy.get(&request, response);
+    const soap_report *report = soap_call_report(&proxy);
+    if (error != 0 && report && report->reused && report->ended_by == ENDED_BY_PEER &&
+        report->first_byte_time < 0) {
+        proxy.soap_header(&header); // a header is for one call
+        error = proxy.get(&request, response);
+    }
+    expect(error == 0, "the service answers");
+}
+
 void tls(const char *bundle)
 {
     ProfileSoapBindingProxy proxy("https://care.example/zuv/v1.0/services/Profile", MODE_KEEP_ALIVE);
@@ -270,7 +289,7 @@ void proxies_and_credentials()
 {
     ProfileSoapBindingProxy proxy(endpoint);
     proxy.proxy_host = "127.0.0.1";
-    proxy.proxy_port = 1; // nobody is there
+    proxy.proxy_port = 1; // nothing listens there
     proxy.proxy_user = "user";
     proxy.proxy_password = "secret";
     protocolProfile__ProfileContent profile;
@@ -369,6 +388,8 @@ void trace()
     std::strcpy(g_TraceLogFile, "agent-trace.log"); // for contexts made from now on; "" means no trace
     ProfileSoapBindingProxy proxy(endpoint);
     soap_log_set_received(&proxy, nullptr); // or for one context and one direction
+    soap_log_set_sent(&proxy, "agent-1.log");
+    soap_log_set_received(&proxy, "agent-1.log");
     protocolProfile__ProfileContent profile;
     __protocolProfile__createResponse created;
     expect(proxy.create(&profile, created) == 0, "the call is traced");
@@ -408,6 +429,7 @@ int main(int argc, char **argv)
     reporting();
     older_behaviour();
     several_endpoints();
+    kept_and_closed(uri);
     tls(nullptr);
     tls("/no/such/bundle.pem");
     proxies_and_credentials();

@@ -1,7 +1,7 @@
 // host_options.h - the command line that the example hosts share: where the service is, and how its messages
 // look.
 //
-// Elsewhere: what a host does with them (*_host.cpp). profile_host.cpp stands alone.
+// Elsewhere: what a host does with them (*_host.cpp). profile_host.cpp uses none of it.
 #pragma once
 
 #include <cstdint>

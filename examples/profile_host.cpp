@@ -14,7 +14,7 @@
 
 namespace {
 
-// Says how a call ended. On a failure the library tells what happened.
+// Says how a call ended. On a failure the library says what happened.
 bool report(ProfileSoapBindingProxy &proxy, const char *call, int error,
             const protocolProfile__ProfileContent *answer)
 {
@@ -111,6 +111,6 @@ int main(int argc, char **argv)
             proxy.endpoint = argv[i];
     }
     const bool kept = keep_a_profile(proxy);
-    proxy.destroy(); // lets go of all answers; the proxy could go on
+    proxy.destroy(); // frees all answers; the proxy could go on
     return kept ? 0 : 1;
 }

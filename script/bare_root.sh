@@ -32,7 +32,7 @@ bare_root() {
     if [ ! -f "$archive" ]; then
         rm -rf --one-file-system "$root"
         eval "$(apt-config shell proxy Acquire::http::Proxy)"
-        # What it mounts is seen by nobody else and ends with it, and it ends with us.
+        # What it mounts is seen by no other process and ends with it, and it ends with us.
         http_proxy=${http_proxy:-$proxy} setpriv --pdeathsig KILL unshare --mount debootstrap --variant=minbase \
             ${*:+--include="$(IFS=,; echo "$*")"} bookworm "$root" "$(bare_root_mirror)" >"$archive.log" 2>&1 ||
             { tail -20 "$archive.log" >&2; return 1; }

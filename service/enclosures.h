@@ -36,14 +36,14 @@ public:
         : config_(config), directory_(std::move(directory))
     {}
 
-    // Forgets the previous exchange; files that nobody has kept are removed.
+    // Forgets the previous exchange; files that weren't kept are removed.
     void reset();
     // The request is refused: removes such files now, and those that were kept meanwhile.
     void discard_arrived();
     // What was kept stays: what refers to it is on the disk.
     void confirm_kept() { kept_.clear(); }
 
-    // The form that a request's head tells (MODE_DIME, MODE_MIME), and the message itself (MODE_MTOM).
+    // The form that a request's head names (MODE_DIME, MODE_MIME), and the message itself (MODE_MTOM).
     void set_form(std::uint32_t form) { form_ = form; }
     void add_form(std::uint32_t form) { form_ |= form; }
     bool has_form() const { return form_ != 0; }

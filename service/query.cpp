@@ -45,7 +45,7 @@ constexpr country_row COUNTRIES[] = {{"AT", "Austria"}, {"CH", "Switzerland"},  
 void add_report(call &c, std::vector<report *> &found, report *passing)
 {
     if (found.size() == REPORTS_MAX)
-        refuse<protocol__Server_x002eDataTooLarge>(c.ctx, "The filter lets too many reports pass.");
+        refuse<protocol__Server_x002eDataTooLarge>(c.ctx, "Too many reports match the filter.");
     found.push_back(passing);
 }
 

@@ -102,7 +102,7 @@ public:
     }
 
 private:
-    // `is_sent` tells of an attachment whether its data goes with the answer.
+    // `is_sent` says of an attachment whether its data goes with the answer.
     template <class Predicate> Document *answer(Document *document, const Predicate &is_sent)
     {
         settle_references(call_, document->attachment, is_sent);

@@ -120,7 +120,7 @@ private:
     int socket_;
 };
 
-// The same bytes as the library's, looked at by nobody.
+// The same bytes as the library's, which no one looks at.
 class bare_exchange {
 public:
     bare_exchange(int port, std::string request)

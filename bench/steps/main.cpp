@@ -1,5 +1,5 @@
 // main.cpp - call_steps: repeats one step of a call, for a tool that counts instructions (script/bench
-// instructions), and tells its size and what it takes from malloc.
+// instructions), and prints its size and what it takes from malloc.
 //
 // The instructions of one repetition are the difference of two runs with different counts: start and warm-up
 // are the same in both.

@@ -55,7 +55,7 @@ public:
     //   uri      of the document, copied
     //   returns  this object
     extras &target(std::string_view uri);
-    // Lets the call be repeated where it isn't known whether the request was taken; see retry_policy. For
+    // Allows the call to be repeated where it isn't known whether the request was taken; see retry_policy. For
     // requests that do no harm when they are served twice, such as get.
     //   returns  this object
     extras &repeatable();

@@ -21,7 +21,7 @@ namespace zuv {
 
 struct transfers; // of the library
 
-// Told after each piece how many bytes have passed, and of how many in all; 0 if that isn't known.
+// Called after each piece with the bytes passed so far and the total, 0 if that isn't known.
 using progress = std::function<void(std::uint64_t done, std::uint64_t total)>;
 
 constexpr std::uint64_t UNKNOWN_SIZE = ~std::uint64_t{0}; // of part::size
@@ -30,13 +30,13 @@ constexpr std::uint64_t UNKNOWN_SIZE = ~std::uint64_t{0}; // of part::size
 struct part {
     std::string id;                                // of the attachment, without angle brackets
     std::string type = "application/octet-stream"; // media type
-    std::string description;                       // told in MIME; empty: none
+    std::string description;                       // sent with MIME; empty: none
     std::string path;                              // the file; empty: `read` or `bytes`
     std::string_view bytes;                        // borrowed: the memory
     // The callback: stores at most `size` bytes and returns their number, 0 at the end.
     std::function<std::size_t(char *buffer, std::size_t size)> read;
     std::uint64_t size = UNKNOWN_SIZE; // bytes that `read` gives; unknown: the message is sent in chunks
-    progress told;                     // of the sending; may be empty
+    progress on_progress;              // of the sending; may be empty
 
     // What a member such as protocol__Attachment::dataHandler says to refer to the attachment.
     //   returns  "cid:" and the id
@@ -46,14 +46,14 @@ struct part {
 namespace detail {
 
 // For the functions below.
-//   told     of the sending; may be empty
-//   returns  an attachment with an id of its own in the process
-inline part named_part(progress told)
+//   on_progress  of the sending; may be empty
+//   returns      an attachment with an id of its own in the process
+inline part named_part(progress on_progress)
 {
     static std::atomic<unsigned> last{0};
     part made;
     made.id = "part-" + std::to_string(++last);
-    made.told = std::move(told);
+    made.on_progress = std::move(on_progress);
     return made;
 }
 
@@ -61,36 +61,36 @@ inline part named_part(progress told)
 
 // An attachment from a file, which is opened when the call begins. A file that can't be opened or read ends
 // the call with SOAP_USER_ERROR.
-//   path     of the file
-//   told     of the sending; may be empty
-//   returns  the attachment, with an id of its own in the process
-inline part file_part(std::string path, progress told = nullptr)
+//   path         of the file
+//   on_progress  of the sending; may be empty
+//   returns      the attachment, with an id of its own in the process
+inline part file_part(std::string path, progress on_progress = nullptr)
 {
-    part made = detail::named_part(std::move(told));
+    part made = detail::named_part(std::move(on_progress));
     made.path = std::move(path);
     return made;
 }
 
 // An attachment from memory.
-//   bytes    borrowed until the call has returned
-//   told     of the sending; may be empty
-//   returns  as above
-inline part memory_part(std::string_view bytes, progress told = nullptr)
+//   bytes        borrowed until the call has returned
+//   on_progress  of the sending; may be empty
+//   returns      as above
+inline part memory_part(std::string_view bytes, progress on_progress = nullptr)
 {
-    part made = detail::named_part(std::move(told));
+    part made = detail::named_part(std::move(on_progress));
     made.bytes = bytes;
     return made;
 }
 
 // An attachment from a function. A call that has asked it for bytes is never repeated.
-//   read     as part::read
-//   size     bytes that it gives; UNKNOWN_SIZE: the message is sent in chunks
-//   told     of the sending; may be empty
-//   returns  as above
+//   read         as part::read
+//   size         bytes that it gives; UNKNOWN_SIZE: the message is sent in chunks
+//   on_progress  of the sending; may be empty
+//   returns      as above
 inline part callback_part(std::function<std::size_t(char *buffer, std::size_t size)> read,
-                          std::uint64_t size = UNKNOWN_SIZE, progress told = nullptr)
+                          std::uint64_t size = UNKNOWN_SIZE, progress on_progress = nullptr)
 {
-    part made = detail::named_part(std::move(told));
+    part made = detail::named_part(std::move(on_progress));
     made.read = std::move(read);
     made.size = size;
     return made;
@@ -101,7 +101,7 @@ struct sink {
     std::string path; // the file
     // Takes a piece; false ends the call with SOAP_USER_ERROR.
     std::function<bool(const char *data, std::size_t size)> write;
-    progress told; // of the receiving; may be empty
+    progress on_progress; // of the receiving; may be empty
 };
 
 // To memory, with the result.
@@ -112,26 +112,26 @@ inline sink to_memory()
 }
 // To a file. The bytes go to a file of the same name with ".part" after it, which takes the name when the
 // call has succeeded and is removed otherwise; so what was there before is never left half overwritten.
-//   path     of the file
-//   told     of the receiving; may be empty
-//   returns  the sink
-inline sink to_file(std::string path, progress told = nullptr)
+//   path         of the file
+//   on_progress  of the receiving; may be empty
+//   returns      the sink
+inline sink to_file(std::string path, progress on_progress = nullptr)
 {
     sink made;
     made.path = std::move(path);
-    made.told = std::move(told);
+    made.on_progress = std::move(on_progress);
     return made;
 }
 // To a function.
-//   write    as sink::write
-//   told     of the receiving; may be empty
-//   returns  the sink
+//   write        as sink::write
+//   on_progress  of the receiving; may be empty
+//   returns      the sink
 inline sink to_callback(std::function<bool(const char *data, std::size_t size)> write,
-                        progress told = nullptr)
+                        progress on_progress = nullptr)
 {
     sink made;
     made.write = std::move(write);
-    made.told = std::move(told);
+    made.on_progress = std::move(on_progress);
     return made;
 }
 

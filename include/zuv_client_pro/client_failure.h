@@ -1,4 +1,4 @@
-// client_failure.h - what a call that failed tells: code, kind, texts, HTTP status, faults, what to do.
+// client_failure.h - what is known of a failed call: code, kind, texts, HTTP status, faults, what to do.
 //
 // Elsewhere: the codes themselves (soap_error.h), the record of a fault (soap_envelope.h).
 //
@@ -15,14 +15,14 @@
 class protocol__Fault;
 
 namespace std {
-// Lets codes of soap_error.h be compared with std::error_code.
+// Codes of soap_error.h can be compared with std::error_code.
 template <> struct is_error_code_enum<soap_error_code> : true_type {};
 } // namespace std
 
 namespace zuv {
 
 // The category of the library's codes: those of soap_error.h, and HTTP statuses from 100 to 999. Each has a
-// text; codes of callbacks are told by their number.
+// text; codes of callbacks are given by their number.
 //   returns  the one category object
 ZUV_API const std::error_category &error_category();
 

@@ -10,7 +10,7 @@
 // - One context serves one thread and one exchange at a time; nothing takes a lock.
 // - Arguments are needed only during the call. A text field marked "borrowed" keeps the caller's pointer: the
 //   text must outlive its last use. A field marked "managed" belongs to the context (soap_memory.h).
-// - An operation returns SOAP_OK or an error code of soap_error.h, which also stands in soap::error.
+// - An operation returns SOAP_OK or an error code of soap_error.h, which is also in soap::error.
 // - Time limits: 0 is no limit, positive values are seconds, negative ones microseconds. They run on the
 //   system's monotonic clock, whatever signals arrive.
 // - ctx is a context that has not ended.
@@ -325,7 +325,7 @@ struct ZUV_CLASS soap {
     // --- callbacks ---
     //
     // Each takes the context first. A null entry is skipped. An int result other than SOAP_OK ends the
-    // operation with that code, unless told otherwise.
+    // operation with that code, unless set otherwise.
 
     // Writes the head of a request with `count` bytes of body. Default: http_write_request.
     int (*on_post)(soap *ctx, const char *endpoint, const char *host, int port, const char *path,
@@ -433,7 +433,7 @@ struct ZUV_CLASS soap {
     std::size_t buffer_length;   // input: fill of `buffer`
     std::int32_t look_ahead;     // one byte or token pushed back; 0 none; -1 end of input, which stays
     std::int16_t in_cdata;       // reader: inside a CDATA section
-    // Reader: the held element has content; writer: text or children stood in the element.
+    // Reader: the held element has content; writer: the element has text or children.
     std::int16_t has_body;
     std::uint32_t nesting_level;         // open elements
     std::uint32_t max_depth;             // most open elements, both ways; 0 no limit
@@ -618,14 +618,14 @@ ZUV_API soap *soap_context_create();
 ZUV_API soap *soap_context_create(std::uint32_t mode);
 ZUV_API soap *soap_context_create(std::uint32_t input_mode, std::uint32_t output_mode);
 
-// Copies every field as it stands, scratch buffers included; owned pointers are then shared. Only a part of
+// Copies every field unchanged, scratch buffers included; owned pointers are then shared. Only a part of
 // soap_context_copy, which corrects that; the virtual table of the target stays.
 //   target  takes the fields; its own are overwritten, not released
 //   source  nothing happens if it is the target
 ZUV_API void soap_context_assign(soap *target, const soap *source);
 
 // Makes `target` an independent copy of `source`, with state 2. All settings and callbacks are copied, and
-// scratch texts as they stand. Everything that is freed with a call or a context starts anew: managed memory
+// scratch texts unchanged. Everything that is freed with a call or a context starts anew: managed memory
 // and the fields that point into it, received namespaces, attachments, trace files (on the same paths),
 // compression. Shared: `user`, the streams, data of plug-ins without a copy hook, the listening socket, which
 // only the source closes, and the TLS context, which lives as long as the last of them.

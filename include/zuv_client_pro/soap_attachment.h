@@ -22,7 +22,7 @@ enum soap_mime_encoding : int {
 };
 
 // One attachment, for DIME and MIME alike; the record is managed memory. Those received are in ctx->dime.list
-// and ctx->mime.list, in order. Contents are never decoded: `encoding` only tells what the sender says, and a
+// and ctx->mime.list, in order. Contents are never decoded: `encoding` only gives what the sender says, and a
 // host program that wants them decoded does so in its write callback or afterwards.
 struct soap_attachment {
     soap_attachment *next; // in its list
@@ -88,7 +88,7 @@ ZUV_API int soap_dime_attach(soap *ctx, char *content, std::size_t size, const c
 // field.
 //   content      as above, with mime_read_open
 //   size         as above
-//   encoding     a soap_mime_encoding that tells how the content is encoded already
+//   encoding     a soap_mime_encoding that says how the content is encoded already
 //   type         media type
 //   id           Content-ID; no two parts of a message may have one id: see soap_mime_attachments_write
 //   location     Content-Location

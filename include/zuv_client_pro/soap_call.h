@@ -6,7 +6,7 @@
 
 #include <zuv_client_pro/soap.h>
 
-// An operation of a service port, by the type ids of its two records (type_ids.h), which tell the elements
+// An operation of a service port, by the type ids of its two records (type_ids.h), which determine the elements
 // and the classes of request and response. For "set" of the port Profile:
 //
 //     constexpr soap_operation set = {SOAP_TYPE___protocolProfile__set,
@@ -33,7 +33,7 @@ struct soap_operation {
 //   SOAP_CLIENT_FAULT, SOAP_SERVER_FAULT, SOAP_MUST_UNDERSTAND, SOAP_VERSION_MISMATCH, SOAP_FAULT
 //                        a fault was received: ctx->fault
 //   SOAP_TCP_ERROR, SOAP_TLS_ERROR, SOAP_EOF
-//                        no connection, or one that failed or went beyond a time limit; the fault's text tells which
+//                        no connection, or one that failed or went beyond a time limit; the fault's text says which
 //   SOAP_LENGTH          beyond max_message or max_memory, in either direction
 //   SOAP_OUT_OF_MEMORY   memory ran out
 ZUV_API int soap_call(soap *ctx, const char *endpoint, const char *action, const soap_operation &operation,

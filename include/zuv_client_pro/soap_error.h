@@ -1,7 +1,7 @@
 // soap_error.h - error codes, their texts, and faults made from them.
 //
 // Elsewhere: the fault record itself (soap_envelope.h), socket texts (soap_tcp.h).
-// Always: a code stays until the next call begins; a text is composed only when somebody asks. Composed texts
+// Always: a code stays until the next call begins; a text is composed only when it is asked for. Composed texts
 // are in soap::message_text and last until its next use.
 #pragma once
 
@@ -9,7 +9,7 @@
 
 // Every engine code: name, value, text. This list is the one source of the texts. soap_fault_text_fill puts
 // an argument in the place of "%s" and after texts that end in a blank, and "Validation constraint violation"
-// before those that tell what an element violates. A code with an empty text is described by its number, or
+// before those that say what an element violates. A code with an empty text is described by its number, or
 // by another module.
 #define SOAP_ERRORS(X)                                                                                       \
     X(SOAP_EOF, -1, "End of file or no input: ")                                                             \

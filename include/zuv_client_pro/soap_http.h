@@ -120,10 +120,10 @@ ZUV_API const char *http_reason(int status);
 //   SOAP_HEADER_LINE    a line over 8191 bytes, more than 1024 lines or 1 MB, or more than 100 interim heads
 //                       (1xx but 101, whose headers are ignored)
 //   SOAP_OUT_OF_MEMORY
-//   SOAP_GET_METHOD     a GET that nobody serves
-//   SOAP_PUT_METHOD     a PUT that nobody serves
+//   SOAP_GET_METHOD     a GET without a handler
+//   SOAP_PUT_METHOD     a PUT without a handler
 //   SOAP_HTTP_ERROR     a status below 100 or above 999; with a fault
-//   405                 a request with a method that nobody serves
+//   405                 a request with a method without a handler
 //   414                 start line over 1023 bytes
 //   returns             otherwise the HTTP status, with a fault: text "HTTP Error" and the start line as
 //                       detail, or the start line and the error body; or the error of a callback

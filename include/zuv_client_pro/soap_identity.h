@@ -214,7 +214,7 @@ ZUV_API int soap_forward_resolve(soap *ctx);
 //   0      there is none
 ZUV_API int soap_forward_has_pending(soap *ctx, const void *start, const void *end);
 
-// Tells the table that the bytes of an area move. Both the old and the new area must be allocated; it does
+// Informs the table that the bytes of an area move. Both the old and the new area must be allocated; it does
 // not matter which of them holds the bytes yet. Takes time proportional to all that is entered, so collect an
 // array in few blocks.
 //   start        of the area

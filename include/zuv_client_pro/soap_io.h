@@ -158,12 +158,12 @@ ZUV_API int soap_receive_begin(soap *ctx);
 
 // What soap_recv_byte calls when a byte was pushed back or the buffer is empty.
 //   returns   the byte, 0 to 255
-//   SOAP_EOF  end of input; ctx->error tells why, SOAP_OK at a plain end
+//   SOAP_EOF  end of input; ctx->error says why, SOAP_OK at a plain end
 ZUV_API std::int32_t soap_recv_byte_slow(soap *ctx);
 
 // The next byte of the message. Called during receiving, as are all functions below.
 //   returns   the byte, 0 to 255
-//   SOAP_EOF  end of input; ctx->error tells why, SOAP_OK at a plain end
+//   SOAP_EOF  end of input; ctx->error says why, SOAP_OK at a plain end
 inline std::int32_t soap_recv_byte(soap *ctx)
 {
     if (ctx->look_ahead == 0 && ctx->buffer_index < ctx->buffer_length)
@@ -188,7 +188,7 @@ ZUV_API int soap_recv_more(soap *ctx);
 // Drops bytes.
 //   count     bytes
 //   SOAP_OK
-//   SOAP_EOF  the input ended before; ctx->error tells why, SOAP_OK at a plain end
+//   SOAP_EOF  the input ended before; ctx->error says why, SOAP_OK at a plain end
 ZUV_API int soap_recv_skip(soap *ctx, std::size_t count);
 
 // Drops the 9 bytes of a gzip header that follow its first.

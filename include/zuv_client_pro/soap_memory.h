@@ -85,8 +85,8 @@ ZUV_API soap_instance *soap_instance_register(soap *ctx, void *object, int type_
 
 // Destroys all managed instances, newest first, or a single one. A hook that returns non-zero is reported on
 // standard error, and its object is forgotten. Does nothing on a context that has ended.
-//   object  start of the one to destroy; null: all. With null, or an address that is not known, ctx->header
-//           and ctx->fault become null
+//   object  start of the one to destroy; null: all. ctx->header and ctx->fault become null if it is theirs, with
+//           null, and with an address that is not known
 ZUV_API void soap_discard_objects(soap *ctx, void *object);
 
 // Removes a block or an instance from management: the caller owns it, ends a block by plain free and an

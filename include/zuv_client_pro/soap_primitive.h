@@ -23,7 +23,7 @@ struct soap_code_row {
 // follow them. Beyond the type's own range: soap_uint_parse and soap_ulong_parse wrap a negative number and,
 // unless reading is strict, take the empty text as 0; soap_long64_parse and soap_ulong64_parse ignore what
 // follows the digits and take the nearest value for a number too large.
-//   text                null: the target is unchanged, and the result is ctx->error, which tells why
+//   text                null: the target is unchanged, and the result is ctx->error, which says why
 //                       soap_attr_get found no attribute
 //   target              takes the value
 //   SOAP_OK

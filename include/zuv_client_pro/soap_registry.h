@@ -2,7 +2,7 @@
 // contract.
 //
 // Elsewhere: the ids (type_ids.h, generated), the classes (protocol*.h, generated). Always: an id of
-// type_ids.h stands for one concrete type in all tables. Ids above 877 are pointer types that nothing reads
+// type_ids.h means one concrete type in all tables. Ids above 877 are pointer types that nothing reads
 // or writes by id.
 #pragma once
 

@@ -59,7 +59,7 @@ struct soap_report {
 //   null     there was no exchange, or there was no memory to note what happened
 ZUV_API const soap_report *soap_call_report(soap *ctx);
 
-// Lets soap_cancel end exchanges of this context from here on; until its end there is no way back. Exchanges
+// Enables soap_cancel for exchanges of this context; it stays enabled until the context ends. Exchanges
 // of an armed context wait before each transfer, as under a time limit: one system call more for each. A copy
 // of the context is not armed, nor is the context in a child process until the child arms it. To be called by
 // the thread of the context, between exchanges.

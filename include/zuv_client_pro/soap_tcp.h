@@ -5,7 +5,7 @@
 // Always: a time limit runs from the beginning of the step that it limits, and no signal restarts it.
 // call_timeout limits all steps together, from soap_server_connect or soap_connect_one (soap_http.h) to
 // soap_socket_release: whatever waits then ends with it, with errno_value 0, and error texts name it. No
-// limit ends the look-up of a name, which has those of the system's resolver. What ended an exchange is told by
+// limit ends the look-up of a name, which has those of the system's resolver. What ended an exchange is reported by
 // soap_call_report, and soap_cancel ends one from outside (soap_report.h). Only select is used, so
 // descriptors of 1024 and over are refused with SOAP_FD_EXCEEDED. Sockets that the library makes are closed
 // on exec, and writing to one whose peer is gone raises no SIGPIPE. SOAP_TCP_ERROR comes with a fault record:
@@ -70,18 +70,18 @@ ZUV_API int tcp_send(soap *ctx, const char *data, std::size_t length);
 ZUV_API std::size_t tcp_recv(soap *ctx, char *buffer, std::size_t length);
 
 // Closes the TLS layer, whose session is kept for the next connection to the same host and port, and the
-// socket (default of on_close). The peer is told (close_notify) and not waited for; LEGACY_CLOSE_WAIT: its
+// socket (default of on_close). The peer is notified (close_notify) and not waited for; LEGACY_CLOSE_WAIT: its
 // answer is waited for, at most 5 s. A UDP socket stays open.
 //   SOAP_OK
 //   SOAP_TLS_ERROR  TLS did not close properly
 ZUV_API int tcp_disconnect(soap *ctx);
 
-// Whether a kept connection may carry another call (default of on_poll). Bytes that nobody asked for make a
+// Whether a kept connection may carry another call (default of on_poll). Bytes that weren't asked for make a
 // connection unusable, and so does a fork after it was opened for a call: it stays the parent's, and the
 // child's tcp_disconnect closes the child's descriptor alone, without a message to the peer. Never blocks.
 //   SOAP_OK         it may
 //   SOAP_EOF        it may not
-//   SOAP_TCP_ERROR  the system can't tell; with a fault record
+//   SOAP_TCP_ERROR  the system doesn't know; with a fault record
 ZUV_API int tcp_peek(soap *ctx);
 
 // Ends an exchange: closes the connection (on_close) after an end of input, a network or TLS failure, a

@@ -49,7 +49,7 @@ constexpr std::uint16_t TLS_STRICT_HOST_CHECK = 512; // the certificate must nam
 // SSL_CTX_set_min_proto_version(ctx->tls_context, ...), and OpenSSL's security level with it.
 //   flags        TLS_...
 //   key_file     PEM: certificate chain and private key of this side; null: none
-//   password     of the private key; null: none (nobody is prompted)
+//   password     of the private key; null: none (there is no prompt)
 //   ca_file      PEM: certificates to trust; null: none
 //   ca_path      directory of such, by hash; null: none
 //   dh_file      PEM file of Diffie-Hellman parameters, or a decimal number over 511: bits of a group to

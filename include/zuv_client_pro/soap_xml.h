@@ -27,7 +27,7 @@
 // Byte texts are Latin-1 unless soap::mode has MODE_UTF_STRINGS; they are sent as UTF-8 either way. XML can't
 // carry control characters other than tab, line feed and carriage return, surrogates, U+FFFE, U+FFFF, numbers
 // above U+10FFFF, and bytes that should be UTF-8 and are not: the counting pass finds them before anything is
-// sent; a message that isn't counted (chunks, bare XML) breaks off there, and its connection is closed.
+// sent; a message that isn't counted (chunks, XML without HTTP) breaks off there, and its connection is closed.
 
 // Starts the Envelope: with MODE_MIME the head of its part, with MODE_DIME the header of its record, then the
 // start tag.
@@ -291,7 +291,7 @@ ZUV_API const char *soap_namespace_of(soap *ctx, const char *name);
 // (zero and other control characters, surrogates, U+FFFE, U+FFFF), by itself or as a number in a reference,
 // and each sequence of bytes that isn't UTF-8 where UTF-8 is read. In strict mode reading ends there: with
 // SOAP_SYNTAX_ERROR for a control character or a reference, with SOAP_UTF_ERROR for such bytes. Only a single
-// byte from 128 on, followed by one below, still stands for itself as Latin-1 where strings are Latin-1.
+// byte from 128 on, followed by one below, is still itself as Latin-1 where strings are Latin-1.
 //
 // Errors of reading, which every function can give that needs input: the errors of receiving (soap_io.h),
 // SOAP_EOF for the end of input inside a message included; SOAP_SYNTAX_ERROR (no name, an attribute without a
@@ -374,7 +374,7 @@ ZUV_API int soap_element_in_begin(soap *ctx, const char *tag, int nil_allowed, c
 //   returns            otherwise an error of reading
 ZUV_API int soap_element_in_end(soap *ctx, const char *tag);
 
-// Drops an element that nobody knows, with all that it holds.
+// Drops an unknown element with all its content.
 //   SOAP_OK
 //   SOAP_NO_TAG           no start tag comes next
 //   SOAP_TAG_MISMATCH     strict mode, outside the header

@@ -7,7 +7,7 @@
 
 #include "core/hex_digit.h"
 
-// A piece of text read as it stands or percent-decoded, character by character.
+// A piece of text read unchanged or percent-decoded, character by character.
 class id_view {
 public:
     id_view(const char *text, std::size_t length, bool decodes)

@@ -1,4 +1,4 @@
-// attachment_list.h - what holds of all attachments of a message, and what is told of one that is wrong.
+// attachment_list.h - what holds of all attachments of a message, and what is reported of a wrong one.
 #pragma once
 
 #include <zuv_client_pro/soap.h>
@@ -27,6 +27,6 @@ int attachment_ref_queue(soap *ctx, const soap_attachment_ref &wanted);
 
 // Enters the attachment that the value goes out as, in the order of its number, and makes the message one
 // with attachments. `holder` begins with the address of the bytes and their number (an int). False: the value
-// stands in place. SOAP_OUT_OF_MEMORY in ctx->error if memory runs out.
+// is in place. SOAP_OUT_OF_MEMORY in ctx->error if memory runs out.
 bool attachment_value_mark(soap *ctx, const void *holder, const char *id_text, const char *type,
                            const char *options);

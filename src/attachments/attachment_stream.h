@@ -46,7 +46,7 @@ public:
     int copy_to_end();
 
 private:
-    // One call of the callback; 0 bytes at the end and on an error, which ctx->error tells.
+    // One call of the callback; 0 bytes at the end and on an error, which ctx->error gives.
     std::size_t next(char *data, std::size_t most);
 
     soap *ctx_;

@@ -21,13 +21,13 @@
 
 namespace {
 
-constexpr int ALL_WRITTEN = -1;  // result: the element stands, or ctx->error tells why not
+constexpr int ALL_WRITTEN = -1;  // result: the element is written, or ctx->error says why not
 constexpr int AS_ATTACHMENT = 3; // mark of a value that goes out as an attachment
 constexpr int ATTACHMENT_TYPE =
     -1; // type of such a value in the pointer table: none of an object's, nor that of bytes in place
 #define XOP_URI "http://www.w3.org/2004/08/xop/include"
 constexpr const char *XOP_TAG = "xop:Include";
-// One attribute carries both: the writer sends a name as it stands.
+// One attribute carries both: the writer sends a name unchanged.
 constexpr const char *XOP_HREF = "xmlns:xop=\"" XOP_URI "\" href";
 constexpr const char *XOP_DEFAULT_HREF = "xmlns=\"" XOP_URI "\" href";
 
@@ -233,7 +233,7 @@ int soap_attachment_ref_in(soap *ctx, unsigned char **content, int *size, char *
 int soap_xop_include_in(soap *ctx, unsigned char **content, int *size, char **id, char **type, char **options)
 {
     if (ctx->peeked == 0 && ctx->look_ahead == 0 && input_skip_blanks(ctx) != '<')
-        return SOAP_NO_TAG; // bytes stand in the element itself
+        return SOAP_NO_TAG; // bytes are in the element itself
     // The prefix is bound by the element, in no row of the table; so only the local name is compared.
     const int result = soap_element_in_begin(ctx, ":Include", 0, nullptr);
     if (result == SOAP_NO_TAG || result == SOAP_TAG_MISMATCH) {

@@ -86,7 +86,7 @@ void mark(soap *ctx, bool more, bool last_record)
     ctx->dime.flags = static_cast<std::uint8_t>((ctx->dime.flags & ~(CHUNK | MESSAGE_END)) | marks);
 }
 
-// Only the first chunk tells what the record is.
+// Only the first chunk says what the record is.
 void describe_next_chunk(soap *ctx)
 {
     ctx->dime.id = ctx->dime.type = ctx->dime.options = nullptr;
@@ -118,7 +118,7 @@ int send_in_chunks(soap *ctx, attachment_stream &stream, bool last_record)
 }
 
 // Data of known length, from the stream or, if none is open, from memory. One record, unless no header can
-// tell the length.
+// give the length.
 int send_sized(soap *ctx, const soap_attachment &record, attachment_stream &stream)
 {
     const char *data = record.content;

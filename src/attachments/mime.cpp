@@ -36,7 +36,7 @@ constexpr unsigned FIELDS_MAX = 1024;        // fields of one part head
 constexpr char BOUNDARY_PREFIX[] = "=_zuv_"; // "=_" can't come out of base64 or quoted-printable
 constexpr const char *ROOT_ID = "<message@zuv_client_pro>";
 
-// Stands after a description. A value that the part answers takes the description in place of DIME options,
+// Follows a description. A value that the part answers takes the description in place of DIME options,
 // and whoever takes it for such a block reads as many bytes as its third and fourth say: this is how it is
 // known, and the zeros are there for descriptions of fewer characters.
 constexpr char DESCRIPTION_END[] = "\0\0\0\0\0\x9DMIME description";
@@ -160,7 +160,7 @@ bool draw(char *text, std::size_t length)
 
 // --- in: part heads ---
 
-// The line of a delimiter, without its dashes, tells the boundary or must repeat it.
+// The line of a delimiter, without its dashes, gives the boundary or must repeat it.
 int take_boundary(soap *ctx, char *text)
 {
     std::size_t length = std::strlen(text);
@@ -319,7 +319,7 @@ int take_content(soap *ctx, attachment_sink *sink, const delimiter &wanted, std:
     }
 }
 
-// A byte that the XML reader gave back stands before the rest of the message's part; `matched` tells
+// A byte that the XML reader gave back comes before the rest of the message's part; `matched` says
 // whether a delimiter may begin with it.
 int take_pushed_back(soap *ctx, attachment_sink *sink, std::size_t &matched)
 {
@@ -520,7 +520,7 @@ int soap_mime_parts_read_all(soap *ctx)
 
 namespace {
 
-// Drops what stands before the first line that begins with "--".
+// Drops what comes before the first line that begins with "--".
 int skip_to_boundary(soap *ctx)
 {
     bool line_start = true;

@@ -210,7 +210,7 @@ step take_member(soap *ctx, const member_table &members, const member_head &head
     return step::unknown;
 }
 
-// What comes after the member `last`, where NO_MEMBER stands for the start tag: a number that no other place
+// What comes after the member `last`, where NO_MEMBER means the start tag: a number that no other place
 // of a class has, well mixed.
 std::uint64_t place_after(const member_table &members, std::size_t last)
 {
@@ -218,7 +218,7 @@ std::uint64_t place_after(const member_table &members, std::size_t last)
            UINT64_C(0x9E3779B97F4A7C15);
 }
 
-// The guess at it, or the place for one to make: a free one of the few that it may stand in, or the first.
+// The guess at it, or the place for one to make: a free one of its few places, or the first.
 tag_guess &guess_of(soap_namespace_scope &scope, std::uint64_t place)
 {
     tag_guess *const first = &scope.guesses[place >> (64 - TAG_GUESS_BITS)];

@@ -15,7 +15,7 @@
 
 namespace binding {
 
-// Reads the held element into one member of an object. True: consumed. False: ctx->error tells whether it was
+// Reads the held element into one member of an object. True: consumed. False: ctx->error says whether it was
 // another element (3, 6) or a failure.
 using member_reader = bool (*)(soap *ctx, const char *tag, void *object);
 
@@ -42,7 +42,7 @@ struct member_table {
 
 struct class_ops;
 
-// Reads what stands after the consumed start tag of an element into `object`, up to and with the end tag.
+// Reads what follows the consumed start tag of an element into `object`, up to and with the end tag.
 // The object, or null with error set.
 using content_reader = void *(*)(soap *ctx, const class_ops &ops, const char *tag, void *object);
 
@@ -52,7 +52,7 @@ struct class_ops {
     const class_ops *base; // null for a root class
     std::size_t size;      // bytes of one object
     bool global_element;   // type of a top-level element
-    bool nillable;         // xsi:nil is no failure even where the object stands by itself
+    bool nillable;         // xsi:nil is no failure even where the object is alone
     const member_table *members;
     void *(*create)(soap *owner, int count); // count < 0: one object; null if memory runs out
     void (*destroy)(void *object, int count);

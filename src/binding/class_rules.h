@@ -43,7 +43,7 @@ template <class T> constexpr auto member_class_tag()
 }
 template <class T> using member_class = std::remove_pointer_t<decltype(member_class_tag<T>())>;
 
-// Calls `visit` with each own element of T as a constant, in order, until it gives true: the result tells
+// Calls `visit` with each own element of T as a constant, in order, until it gives true: the result says
 // whether it did. Constants, and not references into the tuple, so that a member costs no more than its own
 // code.
 template <class T, class Visit> constexpr bool any_element(Visit visit)

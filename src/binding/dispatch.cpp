@@ -1,4 +1,4 @@
-// dispatch.cpp - reading, writing and marking an object whose type only an id or a name tells.
+// dispatch.cpp - reading, writing and marking an object whose type is known by id or name only.
 //
 // Elsewhere: making and destroying by id (registry.cpp), the classes' own rules (class_ops.cpp).
 #include <cstring>
@@ -131,7 +131,7 @@ int type_of_element(soap *ctx)
 {
     const char *name = ctx->element_type[0] ? ctx->element_type : ctx->tag;
     if (const int type = type_by_qname(ctx, type_index, name))
-        return type == TEXT_ID ? CHARS_ID : type; // a text that nobody asked for is read as plain characters
+        return type == TEXT_ID ? CHARS_ID : type; // a text that wasn't asked for is read as plain characters
     return type_by_qname(ctx, element_index, ctx->tag);
 }
 

@@ -534,7 +534,7 @@ void soap_fault_record(soap *ctx)
 
 namespace {
 
-// Stands in where memory ran out: written and never read. In the thread's first block, so that the library
+// Used where memory ran out: written and never read. In the thread's first block, so that the library
 // needs nothing of the dynamic loader's.
 const char **thrown_away()
 {

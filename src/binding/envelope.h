@@ -17,9 +17,9 @@ void *envelope_in(soap *ctx, int type_id, const char *tag, void *record);
 int envelope_out(soap *ctx, int type_id, const char *tag, int id, const void *record, const char *type);
 void envelope_mark(soap *ctx, int type_id, const void *record);
 
-// After a failure within an element whose content stands at nesting level `level`: if a value was to blame,
+// After a failure within an element whose content is at nesting level `level`: if a value was to blame,
 // and not the XML, drops what is left of it, and the reader goes on at that level, or above it if the element
-// has ended. False: the error stands in the context.
+// has ended. False: the error is in the context.
 bool drop_bad_value(soap *ctx, std::uint32_t level);
 
 } // namespace binding

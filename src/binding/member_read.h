@@ -35,7 +35,7 @@ bool read_number_value(soap *ctx, const char *tag, void *place, int type_id);
 bool read_code_attribute(soap *ctx, const char *name, bool required, const enum_table &names,
                          std::int32_t *code, bool *present);
 // One more item of a vector. Where the element is a reference, index `index` of the vector is filled at the
-// end of the message, and an empty item stands in until then.
+// end of the message, and an empty item takes its place until then.
 bool read_vector_item_text(soap *ctx, const char *tag, std::vector<std::string> &vector, int vector_type);
 bool read_vector_item_object(soap *ctx, const class_ops &ops, const char *tag, void *vector,
                              std::size_t index, int vector_type, void **object);

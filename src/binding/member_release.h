@@ -15,7 +15,7 @@ namespace binding {
 // Wipes and empties a text. The bytes that it has allocated.
 std::size_t release_text(std::string &text);
 
-// The same for texts that stand in a vector: their memory waits for texts of the context.
+// The same for texts in a vector: their memory waits for texts of the context.
 void release_texts(soap *owner, std::vector<std::string> &texts);
 
 // soap_upcalls::recycle: classes and texts can be used again.

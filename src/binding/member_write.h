@@ -35,7 +35,7 @@ void mark_plain(soap *ctx, const void *value, int type_id);
 inline int write_absent(soap *ctx, std::string_view tag, occurs how)
 {
     const bool shows = how == occurs::required || (ctx->mode & MODE_NIL) != 0 ||
-                       ctx->attributes_set != 0; // attributes need an element to stand on
+                       ctx->attributes_set != 0; // attributes need an element
     return shows ? write_nil(ctx, tag, how) : 0;
 }
 

@@ -50,7 +50,7 @@ struct vector_ops {
     const void *(*item)(const void *vector,
                         std::size_t index);         // std::string *, code *, or the pointer itself
     bool (*append)(void *vector, const void *item); // null: an empty item; false if memory runs out
-    void (*store)(void *vector, std::size_t index, const void *item); // `item`: where the new item stands
+    void (*store)(void *vector, std::size_t index, const void *item); // `item`: the new item's address
     std::size_t size;                                                 // bytes of the vector object
 };
 
@@ -68,7 +68,7 @@ struct type_entry {
 
 extern const type_entry type_entries[TYPE_ID_MAX + 1]; // by id
 
-// Names that an element may be known by when nothing else tells its type, with an index from local names; see
+// Names that an element may be known by when nothing else gives its type, with an index from local names; see
 // name_index.h for how the generated table makes one.
 struct type_name {
     std::string_view name; // "protocol:Identity"

@@ -1,4 +1,4 @@
-// traits.h - how the contract's declarations are told to the rules: the vocabulary of a generated member
+// traits.h - how the contract's declarations reach the rules: the vocabulary of a generated member
 // list.
 //
 // Here: rows of a member list and the traits that a list specialises. Elsewhere: what the rules do with a
@@ -19,7 +19,7 @@
 
 namespace binding {
 
-// How often a member stands on the wire, and so how it is held.
+// How often a member occurs on the wire, and so how it is held.
 enum class occurs : std::uint8_t {
     optional, // a pointer; null writes nothing
     required, // a pointer (null writes nil) or a value

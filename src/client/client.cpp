@@ -244,8 +244,8 @@ const soap_report &client::report() const
             none.certificate_refusal = "";
         return none;
     }();
-    const soap_report *const told = engine_ != nullptr ? soap_call_report(engine_) : nullptr;
-    return told != nullptr ? *told : empty;
+    const soap_report *const report = engine_ != nullptr ? soap_call_report(engine_) : nullptr;
+    return report != nullptr ? *report : empty;
 }
 
 soap *client::context()

@@ -1,4 +1,4 @@
-// failure.cpp - what a call that failed tells: texts of the codes, advice, the faults of a detail.
+// failure.cpp - what is known of a failed call: texts of the codes, advice, the faults of a detail.
 //
 // Elsewhere: which kind of failure it was (engine.cpp).
 #include <cstring>
@@ -103,14 +103,14 @@ const char *failure::advice() const
     case failure_kind::refused:
         return "Change the request as the fault says.";
     case failure_kind::failed:
-        return "Try again later; if it stays so, tell the service's operator.";
+        return "Try again later; if it stays so, inform the service's operator.";
     case failure_kind::unauthorized:
         return status_ == 407 ? "Check the credentials for the HTTP proxy."
                               : "Check the credentials and the rights that go with them.";
     case failure_kind::http:
         return "Check the path of the address: no SOAP message came from there.";
     case failure_kind::unreadable:
-        return "Look at the response in a trace, and tell the service's operator.";
+        return "Look at the response in a trace, and inform the service's operator.";
     case failure_kind::too_large:
         return "Ask for less, or raise the limit that the text names.";
     case failure_kind::request:

@@ -150,8 +150,8 @@ std::size_t transfers::read_piece(soap *ctx, void *handle, char *buffer, std::si
         count = from.what->bytes.copy(buffer, length, static_cast<std::size_t>(from.done));
     }
     from.done += count;
-    if (count != 0 && from.what->told)
-        from.what->told(from.done, from.total == UNKNOWN_SIZE ? 0 : from.total);
+    if (count != 0 && from.what->on_progress)
+        from.what->on_progress(from.done, from.total == UNKNOWN_SIZE ? 0 : from.total);
     return count;
 }
 
@@ -164,8 +164,8 @@ int transfers::write_piece(soap *ctx, void *handle, const char *data, std::size_
         return soap_fault_receiver(ctx, "the function for an attachment doesn't want it", nullptr,
                                    SOAP_USER_ERROR);
     into.done += length;
-    if (into.to.told)
-        into.to.told(into.done, 0);
+    if (into.to.on_progress)
+        into.to.on_progress(into.done, 0);
     return SOAP_OK;
 }
 

@@ -18,7 +18,7 @@ inline bool input_is_chunked(const soap *ctx)
     return (ctx->mode & MODE_IO_MASK) == MODE_CHUNKED;
 }
 
-// Puts what stands before `length` bytes of data, the end of the previous chunk included, into `line`.
+// Puts what comes before `length` bytes of data, the end of the previous chunk included, into `line`.
 // Returns its bytes.
 std::size_t chunk_size_line(soap *ctx, std::size_t length, char (&line)[CHUNK_LINE_SIZE]);
 

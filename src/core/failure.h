@@ -1,5 +1,5 @@
 // failure.h - how every layer ends with an error: the one place where a code is set, and the way up to the
-// fault that tells a host more than a code.
+// fault that says more than a code.
 //
 // Elsewhere: the codes and their texts (soap_error.h), the fault record (exchange/fault.cpp).
 // Always: a code is set once, where it comes from, and passed on unchanged.
@@ -24,7 +24,7 @@ inline std::nullptr_t fail_null(soap *ctx, int error)
     return nullptr;
 }
 
-// The end of input where more should come: SOAP_EOF, unless what ended it stands in the context already.
+// The end of input where more should come: SOAP_EOF, unless what ended it is in the context already.
 inline int fail_at_end(soap *ctx)
 {
     return ctx->error == SOAP_OK ? fail(ctx, SOAP_EOF) : ctx->error;
@@ -53,7 +53,7 @@ struct soap_upcalls {
     std::size_t (*recycle)(soap *ctx, soap_instance *instance);
 };
 
-// Ends with an error that has texts of its own: as fail(), and the fault tells them. `text` and `detail` are
+// Ends with an error that has texts of its own: as fail(), and the fault has them. `text` and `detail` are
 // constants or managed memory; `detail` may be null.
 inline int fail_with(soap *ctx, fault_side side, const char *text, const char *detail, int error)
 {

@@ -35,7 +35,7 @@ template <class Record> struct idle_list {
             least = count;
         return record;
     }
-    // Takes half of those that nobody needed lately, the oldest ones, out of the list: linked by next.
+    // Takes half of those unused lately, the oldest ones, out of the list: linked by next.
     Record *thin()
     {
         std::uint32_t keep = count - (least + 1) / 2;

@@ -137,7 +137,7 @@ int soap_inflate_begin(soap *ctx, int window_bits)
 
 int soap_inflate_begin_deflate(soap *ctx, std::uint8_t first)
 {
-    // The second byte is looked at where it stands; the first, which a refill may have taken away, is handed
+    // The second byte is looked at in the buffer; the first, which a refill may have taken away, is handed
     // on by itself.
     const bool has_second = ctx->look_ahead == 0 && ctx->buffer_index < ctx->buffer_length;
     const auto second = static_cast<unsigned char>(has_second ? ctx->buffer[ctx->buffer_index] : 0);
@@ -187,7 +187,7 @@ int soap_inflate_finish(soap *ctx)
         (result == STREAM_ENDED && gzip && !trailer_is_right(ctx, plain_length)))
         result = fail_to_inflate(ctx);
     ctx->zlib_in = 0;
-    if (ctx->exceeded != nullptr) // what the stream lacks is what nobody wanted to receive
+    if (ctx->exceeded != nullptr) // what the stream lacks is beyond the limit
         return fail(ctx, SOAP_LENGTH);
     return result == STREAM_ENDED ? SOAP_OK : fail(ctx, result);
 }

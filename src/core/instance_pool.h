@@ -32,7 +32,7 @@ inline bool idle_has_space(const soap *ctx, int type_id, std::size_t bytes)
            idle_has_space(ctx->pools->idle, ctx->pools->idle.objects[type_id], bytes);
 }
 
-// Lets an emptied object wait among those of the type; idle_has_space told that it may.
+// Keeps an emptied object with those of its type, after idle_has_space gave true.
 inline void idle_give(soap *ctx, int type_id, soap_instance *instance, std::size_t bytes)
 {
     idle_pool &idle = ctx->pools->idle;
@@ -72,6 +72,6 @@ inline soap_instance *instance_reuse(soap *ctx, int type_id)
 // Destroys and frees all that waits.
 void idle_drop(soap *ctx);
 
-// In managed_blocks.cpp: the same for blocks alone, and half of those that nobody needed lately.
+// In managed_blocks.cpp: the same for blocks alone, and half of those unused lately.
 void idle_blocks_drop(soap *ctx);
 void idle_blocks_thin(soap *ctx);

@@ -72,6 +72,15 @@ void destroy_instance(soap *ctx, soap_instance *instance)
     ctx->pools->instances.give(instance);
 }
 
+// The context refers to a header and a fault that are `object`, or to any if that is null: no longer.
+void forget_envelope_records(soap *ctx, const void *object)
+{
+    if (object == nullptr || ctx->header == object)
+        ctx->header = nullptr;
+    if (object == nullptr || ctx->fault == object)
+        ctx->fault = nullptr;
+}
+
 void destroy_all(soap *ctx)
 {
     idle_release_begin(ctx);
@@ -83,8 +92,7 @@ void destroy_all(soap *ctx)
         destroy_instance(ctx, instance);
     }
     idle_release_end(ctx);
-    ctx->header = nullptr;
-    ctx->fault = nullptr;
+    forget_envelope_records(ctx, nullptr);
 }
 
 } // namespace
@@ -101,13 +109,13 @@ void soap_discard_objects(soap *ctx, void *object)
     for (soap_instance **link = &ctx->instance_list; *link != nullptr; link = &(*link)->next) {
         soap_instance *instance = *link;
         if (instance->object == object) {
+            forget_envelope_records(ctx, object);
             *link = instance->next;
             destroy_instance(ctx, instance);
             return;
         }
     }
-    ctx->header = nullptr;
-    ctx->fault = nullptr;
+    forget_envelope_records(ctx, nullptr);
 }
 
 void instance_records_release(soap *ctx)

@@ -11,8 +11,8 @@
 
 namespace {
 
-// Bytes at hand that belong to no XML: those after the length that the head told, and where attachments may
-// follow, those that nobody has looked at yet.
+// Bytes at hand that belong to no XML: those after the length given in the head, and where attachments may
+// follow, those that haven't been looked at yet.
 std::uint64_t beside_xml(const soap *ctx)
 {
     const std::uint64_t unread = ctx->buffer_length - ctx->buffer_index;

@@ -55,7 +55,7 @@ int check_canary(soap *ctx, soap_block_trailer *trailer)
     return found == CANARY ? SOAP_OK : corruption(ctx);
 }
 
-// False for a block that was given to tracked_free without the list being told.
+// False for a block that was given to tracked_free without the list's knowledge.
 bool entry_is_live(soap_block_trailer *trailer)
 {
     return trailer->entry->address == block_start(trailer) && track_is_live(trailer->entry);

@@ -19,12 +19,12 @@
     X(action)                                                                                                \
     X(forwarded_for)
 
-// Told of each block that moves: the bytes from `start` up to `end` now lie at `new_address`; they lay at
+// Called for each block that moves: the bytes from `start` up to `end` now lie at `new_address`; they lay at
 // `old_address`.
 using block_moved = void (*)(soap *ctx, const void *start, const void *end, char *new_address,
                              const char *old_address);
 
-// soap_block_stack_save, which tells `moved` (may be null) of each block.
+// soap_block_stack_save, which calls `moved` (may be null) for each block.
 void *block_stack_gather(soap *ctx, soap_block_stack *stack, void *target, block_moved moved);
 
 // Ends the growing text.

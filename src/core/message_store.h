@@ -13,7 +13,7 @@
 
 // Values of soap::mark_state.
 constexpr std::int16_t MARKS_MADE = 0;    // as all messages but those of calls have it
-constexpr std::int16_t MARKS_SAVED = 1;   // nothing that a mark could tell shows in the message
+constexpr std::int16_t MARKS_SAVED = 1;   // nothing that a mark could change shows in the message
 constexpr std::int16_t MARKS_MISSING = 2; // but something does after all: it has to begin anew, with marks
 
 // A message is about to be counted: its bytes are kept from here on, if there is memory for them.

@@ -4,7 +4,7 @@
 //
 //   list  = item *( ("," / ";") item )
 //   item  = name [ "=" value ]
-//   value = '"' characters '"' / characters; between quotes a backslash may stand before a quote or
+//   value = '"' characters '"' / characters; between quotes a backslash may come before a quote or
 //   backslash
 #include <cstddef>
 #include <cstring>
@@ -45,7 +45,7 @@ const char *copy_plain(const char *text, const char *stops, char *target)
     return text;
 }
 
-// As above, for what stands between double quotes; `text` is after the first. A missing second quote is the
+// As above, for what is between double quotes; `text` is after the first. A missing second quote is the
 // end.
 const char *copy_quoted(const char *text, char *target)
 {

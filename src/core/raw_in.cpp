@@ -140,7 +140,7 @@ bool soap_raw_consumed(soap *ctx)
 {
     if (ctx->framing_doubtful)
         return false;
-    // A length in addition to chunks, which rule, may be what somebody between us and the peer went by.
+    // A length in addition to chunks, which rule, may be what a proxy on the way went by.
     if (input_is_chunked(ctx))
         return ctx->body_open && ctx->body_ended && !ctx->content_length_given;
     if (!length_is_known(ctx))

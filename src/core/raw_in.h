@@ -23,7 +23,7 @@ int soap_raw_fill(soap *ctx);
 // is empty. zlib_buffer must exist.
 void soap_raw_move_aside(soap *ctx);
 
-// Undoes soap_raw_move_aside; raw_index must stand at the next raw byte.
+// Undoes soap_raw_move_aside; raw_index must be at the next raw byte.
 void soap_raw_move_back(soap *ctx);
 
 // The body begins at buffer_index: puts the chunks announced in ctx->mode into force.

@@ -40,7 +40,7 @@ const char *stretch_end(const char *start, const char *stop)
     return find('\n', find('\r', stop)); // the search for a CR may go far only once for each line
 }
 
-// Moves what stands in the buffer up to a CR or LF, but no more than `left` bytes, to `end`, as far as that
+// Moves what is in the buffer up to a CR or LF, but no more than `left` bytes, to `end`, as far as that
 // fits before `limit`. The bytes moved or dropped.
 std::size_t take_stretch(soap *ctx, char *&end, const char *limit, std::size_t left)
 {
@@ -56,7 +56,7 @@ std::size_t take_stretch(soap *ctx, char *&end, const char *limit, std::size_t l
     return length;
 }
 
-// A line that stands whole in the buffer, with the byte that tells whether the next one is folded onto it, and
+// A line that is whole in the buffer, with the byte that shows whether the next one is folded onto it, and
 // fits. False: nothing was consumed.
 bool take_whole_line(soap *ctx, char *text, std::size_t size)
 {

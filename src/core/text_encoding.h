@@ -1,4 +1,4 @@
-// text_encoding.h - which encoding received XML is in: its names, and the bits of soap::mode that stand for
+// text_encoding.h - which encoding received XML is in: its names, and the bits of soap::mode that mean
 // it.
 //
 // Elsewhere: who names it (the XML declaration, xml/xml_token.cpp; heads and MIME parts),

@@ -53,7 +53,7 @@ void track_table_clear(soap *ctx)
 
 namespace {
 
-// Blocks of malloc stand at multiples of 16, so that only half of the first table's chains are used; in
+// Blocks of malloc lie at multiples of 16, so that only half of the first table's chains are used; in
 // larger tables all are. Neighbours stay neighbours, which the caches like.
 soap_track_entry **chain_of(soap *ctx, const void *address)
 {
@@ -123,7 +123,7 @@ soap_track_entry *entry_for(soap *ctx, void *address)
             return nullptr; // malloc gives no block that it has given already
         if (!track_is_live(entry))
             pools->dead[entry->life - TRACK_DEAD] = nullptr;
-        else // freed by somebody else
+        else // freed elsewhere
             ctx->memory_held -= bytes_held(entry);
         return entry;
     }

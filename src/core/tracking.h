@@ -59,7 +59,7 @@ void track_table_clear(soap *ctx);
 // Allocates and enters a block; null if memory runs out.
 soap_track_entry *track_alloc(soap *ctx, const char *source_file, int source_line, std::size_t size);
 
-// Ends an entry that the caller knows to be live: the block is freed, or with track_forget left to somebody
+// Ends an entry that the caller knows to be live: the block is freed, or with track_forget left to someone else
 // else.
 void track_free(soap *ctx, soap_track_entry *entry);
 void track_forget(soap *ctx, soap_track_entry *entry);

@@ -14,7 +14,7 @@ namespace proxies {
 
 // One call. `proxy_endpoint` is the proxy's own endpoint, set by the call when `endpoint` or the default
 // fills it. `request` may be null; `result` is the response record's pointer, null for a call that reads no
-// answer. 0, or the error that stands in the context.
+// answer. 0, or the error, as in the context.
 int call(soap *ctx, const char *&proxy_endpoint, const char *default_endpoint,
          const soap_operation &operation, const char *endpoint, const char *action, const void *request,
          void **result);

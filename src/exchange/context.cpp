@@ -165,7 +165,7 @@ void soap_reset_call(soap *ctx)
     ctx->content_length = 0;
     ctx->look_ahead = 0;
     ctx->error = SOAP_OK;
-    ctx->fault = nullptr; // it told of an earlier exchange
+    ctx->fault = nullptr; // it is of an earlier exchange
     ctx->exceeded = nullptr;
     ctx->endpoint[0] = '\0';
     ctx->dime.count = 0;
@@ -287,7 +287,7 @@ void soap_engine_done(soap *ctx)
     trace_log_end(ctx);
     ctx->state = 0;
     track_end(ctx);
-    ctx->allocation_list = nullptr; // what stands there was named as a leak
+    ctx->allocation_list = nullptr; // what is in it was reported as a leak
 }
 
 void soap_context_free(soap *ctx)

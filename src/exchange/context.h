@@ -1,7 +1,7 @@
 // context.h - what becomes of each field of a context when it begins, is copied, and loses its connection.
 //
 // A field has one row here, or in core/memory.h; context.cpp doesn't compile without it. What more
-// has to be done for a field than the row tells stands in the functions of context.cpp and context_copy.cpp
+// has to be done for a field than its row says is in the functions of context.cpp and context_copy.cpp
 // that use the rows.
 #pragma once
 
@@ -291,7 +291,7 @@ template <class T, std::size_t N> void field_reset(T (&field)[N], std::nullptr_t
     std::memset(static_cast<void *>(field), 0, sizeof field);
 }
 
-// Lets a field take the value of another context's.
+// Gives a field the value of another context's.
 template <class T> void field_copy(T &target, const T &source)
 {
     target = source;

@@ -128,7 +128,7 @@ int copy_plugins(soap *target, const soap *source)
 }
 
 // A copy without a connection, in a record that holds nothing. Null if `source` has ended, or as the error in
-// the copy tells.
+// the copy says.
 soap *copy_settings(soap *target, const soap *source)
 {
     if (!context_is_alive(source))

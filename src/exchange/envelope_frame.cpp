@@ -118,7 +118,7 @@ int soap_envelope_out_end(soap *ctx)
     if (soap_element_out_end(ctx, "SOAP-ENV:Envelope") || xml_put(ctx, "\r\n") || finish_dime_record(ctx))
         return ctx->error;
     ctx->message_part = PART_AFTER_ENVELOPE;
-    // All attachments are known: what is wrong with them is told before anything is sent, where that can be.
+    // All attachments are known: what is wrong with them is reported before anything is sent, where that can be.
     return (ctx->mode & MODE_COUNTING) ? attachment_ids_check_out(ctx) : 0;
 }
 

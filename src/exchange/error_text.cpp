@@ -2,7 +2,7 @@
 // the context's state.
 //
 // Elsewhere: the fault record that takes a text (fault.cpp), socket errors and timeouts (net/tcp_error.cpp).
-// Always: a composed text stands in message_text, cut to its size.
+// Always: a composed text is in message_text, cut to its size.
 #include "exchange/fault.h"
 
 #include <algorithm>

@@ -1,7 +1,7 @@
 // fault.cpp - faults made from error codes, and their printed forms.
 //
 // Elsewhere: the fault record (soap_envelope.h), the texts of codes (error_text.cpp).
-// Always: a fault is made only when somebody asks for it.
+// Always: a fault is made only when it is asked for.
 #include <cstdio>
 #include <cstring>
 #include <ostream>

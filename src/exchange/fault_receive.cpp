@@ -47,7 +47,7 @@ bool may_be_fault(const soap *ctx)
     return ctx->error == SOAP_NO_TAG || (ctx->error == SOAP_TAG_MISMATCH && ctx->nesting_level == 2);
 }
 
-// No fault could be read: the error of the response stands, told as a fault of the sender. Only lack of
+// No fault could be read: the error of the response remains, as a fault of the sender. Only lack of
 // memory says nothing of what was there.
 int keep_error(soap *ctx, int error)
 {
@@ -59,7 +59,7 @@ int keep_error(soap *ctx, int error)
     return error;
 }
 
-// What stands after the fault: it may refer to it.
+// What follows the fault: the fault may refer to it.
 void read_rest_of_body(soap *ctx)
 {
     const std::uint32_t level = ctx->nesting_level;

@@ -29,7 +29,7 @@ namespace {
 
 constexpr std::int32_t END = -1;
 constexpr std::int32_t GZIP_FIRST_BYTE = 0x1F;
-constexpr std::size_t BLANKS_MAX = std::size_t{1024} * 1024; // before a head or a bare message
+constexpr std::size_t BLANKS_MAX = std::size_t{1024} * 1024; // before a head or a message without one
 constexpr std::int32_t HIGH_OF_TRUNCATED_MARK = 0xFEC0;
 
 // ---------------------------------------------------------------------------------------------
@@ -230,8 +230,8 @@ int soap_receive_begin(soap *ctx)
         return ctx->error;
     }
     int informative = SOAP_OK;
-    const bool bare = ctx->look_ahead == '<' || (ctx->mode & (MODE_DEFLATE | MODE_MIME | MODE_DIME)) != 0;
-    if ((bare ? show_first_bytes(ctx, early) : begin_http(ctx, informative)) != SOAP_OK)
+    const bool headless = ctx->look_ahead == '<' || (ctx->mode & (MODE_DEFLATE | MODE_MIME | MODE_DIME)) != 0;
+    if ((headless ? show_first_bytes(ctx, early) : begin_http(ctx, informative)) != SOAP_OK)
         return ctx->error;
     if (informative != SOAP_OK)
         return end_informatively(ctx, informative);

@@ -25,7 +25,7 @@ int write_message(soap *ctx, const request_message &message)
     return SOAP_OK;
 }
 
-// True if nobody can tell whether the message is written once or twice, and with marks or without: a tree with
+// True if no one can see whether the message is written once or twice, and with marks or without: a tree with
 // a Content-Length, nothing but its XML, and no hook that sees or changes it or what it is made from.
 bool writes_once(const soap *ctx)
 {
@@ -39,7 +39,7 @@ bool writes_once(const soap *ctx)
            ctx->on_post == http_write_request && ctx->on_header_line == http_write_line;
 }
 
-// The mode but for what tells how bytes leave, on which those of a message don't depend.
+// The mode without the bits for how bytes leave, on which those of a message don't depend.
 std::uint32_t writing_mode(const soap *ctx)
 {
     return ctx->mode & ~(MODE_IO_MASK | MODE_COUNTING | MODE_TLS);
@@ -62,7 +62,7 @@ int count_marked(soap *ctx, const request_message &message)
 }
 
 // Counts without marks, and keeps the bytes as long as the store takes them. What needs marks is met while
-// nobody has seen anything of the message, which then begins anew.
+// no one has seen anything of the message, which then begins anew.
 int count_stored(soap *ctx, request_message &message)
 {
     message_store_begin(ctx);

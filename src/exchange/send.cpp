@@ -23,7 +23,7 @@ namespace {
 // ---------------------------------------------------------------------------------------------
 // Modes.
 
-// Compression makes the length unknown until the end, so a compressed message whose length must stand in its
+// Compression makes the length unknown until the end, so a compressed message whose length must be in its
 // head is stored first, and counting it would be in vain. Only DIME still needs the count of the plain bytes.
 std::uint32_t with_compression(std::uint32_t mode)
 {

@@ -39,7 +39,7 @@ struct soap_id_record {
     char id[1];         // "#" and the id, or an address outside the message; in the record itself
 };
 
-// The pointer that stands at a waiting place.
+// The pointer at a waiting place.
 inline void *load_place(const void *place)
 {
     void *value = nullptr;

@@ -37,7 +37,7 @@ inline std::uint32_t address_hash(const void *address)
     return static_cast<std::uint32_t>(reinterpret_cast<std::uintptr_t>(address) >> 3);
 }
 
-// Objects of one size stand at regular distances, which leaves most chains of a table unused. The first
+// Objects of one size lie at regular distances, which leaves most chains of a table unused. The first
 // table is small enough for that; in larger ones the hash is mixed.
 inline std::size_t chain_of(std::uint32_t hash, std::size_t mask)
 {
@@ -219,7 +219,7 @@ inline bool literal(const soap *ctx)
     return ctx->encoding_style == nullptr && (ctx->mode & SOAP_XML_GRAPH) == 0;
 }
 
-// Encoded SOAP 1.1: objects met twice stand after the Body's first element, and all that refer to them do
+// Encoded SOAP 1.1: objects met twice follow the Body's first element, and all that refer to them do
 // so.
 inline bool encoded_1_1(const soap *ctx)
 {

@@ -191,7 +191,7 @@ void soap_parse_endpoint(soap *ctx, const char *url)
         store_parts(ctx, url, parts_of(ctx, url));
 }
 
-// What is meant for nobody in particular doesn't go to whoever was called before.
+// A call without an endpoint of its own doesn't go to the one called before.
 int connection_provide(soap *ctx, const char *endpoint)
 {
     if (ctx->on_open != nullptr && endpoint != nullptr && ctx->host[0] != '\0')

@@ -71,7 +71,7 @@ const char *fault_of(std::string_view item)
         if (is_control(c))
             return "it holds a control character";
     }
-    // The first colon is what tells a scheme, wherever it stands.
+    // The first colon ends the scheme, wherever it is.
     const std::size_t colon = item.find(':');
     const bool has_scheme = colon != std::string_view::npos && item.substr(colon, 3) == "://";
     if (has_scheme && !is_known_scheme(item))
@@ -83,7 +83,7 @@ const char *fault_of(std::string_view item)
     return fault_of_authority(item.substr(0, item.find('/')));
 }
 
-// Where the part of a user ends, whose password no text tells: after the last "@" of its stretch; 0 for
+// Where the part of a user ends, whose password no text may show: after the last "@" of its stretch; 0 for
 // none.
 std::size_t end_of_user(std::string_view item)
 {

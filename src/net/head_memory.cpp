@@ -83,7 +83,7 @@ memory *memory_of(soap *ctx)
     return ctx->head_memory;
 }
 
-// The body's length as it stands in a head, after LENGTH_LINE.
+// The body's length as written in a head, after LENGTH_LINE.
 std::size_t write_number(char *text, std::uint64_t count)
 {
     return static_cast<std::size_t>(std::to_chars(text, text + SOAP_TEXT_SIZE, count).ptr - text);

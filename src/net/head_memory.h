@@ -25,7 +25,7 @@ bool head_memory_send(soap *ctx, const head_source &source, std::uint64_t count,
 void head_memory_keep(soap *ctx, const head_source &source, std::uint64_t count, const char *head,
                       std::size_t length);
 
-// Where the parts of an endpoint stand in its text, which has `length` bytes.
+// Where the parts of an endpoint are in its text, which has `length` bytes.
 struct endpoint_parts {
     std::size_t length, host, host_length;
     std::size_t path; // `length` for none

@@ -166,7 +166,7 @@ bool decode_to_scratch(soap *ctx, const char *text)
     return true;
 }
 
-// Whatever comes on a connection that was opened for a call answers that call, whether it tells a status or
+// Whatever comes on a connection that was opened for a call answers that call, whether it gives a status or
 // not.
 bool is_answer(const soap *ctx)
 {
@@ -192,7 +192,7 @@ int store_credentials(soap *ctx)
     return store_secret(ctx, colon + 1, ctx->auth_password);
 }
 
-// A request tells who sends it. In an answer the peer would choose in whose name the next call is made.
+// A request says who sends it. In an answer the peer would choose in whose name the next call is made.
 int parse_authorization(soap *ctx, const char *value)
 {
     if (is_answer(ctx) && (ctx->legacy & LEGACY_ANSWER_CREDENTIALS) == 0)
@@ -260,7 +260,7 @@ constexpr header_row HEADERS[] = {
     {"X-Forwarded-For", parse_forwarded_for},
 };
 
-// By the first letter of a key, whatever its case: bit n tells that HEADERS[n] begins so.
+// By the first letter of a key, whatever its case: bit n means that HEADERS[n] begins so.
 constexpr std::size_t LETTERS = 32;
 constexpr std::array<std::uint32_t, LETTERS> rows_of_letter()
 {

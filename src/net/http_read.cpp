@@ -26,7 +26,7 @@ constexpr unsigned LINES_MAX = 1024;    // header lines of one message
 constexpr std::size_t HEAD_BYTES_MAX = std::size_t{1024} * 1024; // all header lines of one message
 constexpr unsigned INTERIM_HEADS_MAX = 100;                      // interim heads before the one that counts
 constexpr std::uint64_t ERROR_BODY_MAX = std::uint64_t{1024} * 1024; // bytes of an error body that are kept
-constexpr int STATUS_SWITCHING = 101;                                // to a protocol that nobody asked for
+constexpr int STATUS_SWITCHING = 101;                                // to a protocol that wasn't asked for
 constexpr int STATUS_MIN = 100, STATUS_MAX = 999; // other numbers could pass for codes of the engine
 constexpr int STATUS_URI_TOO_LARGE = 414;
 constexpr int STATUS_NO_METHOD = 405;
@@ -154,7 +154,7 @@ int read_headers(soap *ctx, head_state &head)
     }
 }
 
-// The head that counts follows those that only tell how the request gets on.
+// The final head follows informational ones.
 int read_final_head(soap *ctx, head_state &head)
 {
     for (unsigned heads = 0; heads <= INTERIM_HEADS_MAX; ++heads) {
@@ -167,7 +167,7 @@ int read_final_head(soap *ctx, head_state &head)
     return fail(ctx, SOAP_HEADER_LINE);
 }
 
-// Where the protocol's name stands in the start line; the last place, as a request's path may hold it too.
+// Where the protocol's name is in the start line; the last place, as a request's path may hold it too.
 const char *find_version(const char *start_line)
 {
     const char *found = nullptr;

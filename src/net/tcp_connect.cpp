@@ -96,7 +96,7 @@ bool is_limited(const soap *ctx)
     return ctx->connect_timeout != 0 || ctx->call_deadline != 0;
 }
 
-// A socket for the address with all options set, or -1 with a fault; *made tells whether there was a socket
+// A socket for the address with all options set, or -1 with a fault; *made says whether there was a socket
 // at all.
 int open_socket(soap *ctx, addrinfo *address, bool *made)
 {
@@ -220,7 +220,7 @@ int open_tunnel(soap *ctx, const char *endpoint, const char *host, int port)
     const int error = tcp_open_tunnel(ctx, endpoint, host, port);
     const bool late = error == SOAP_EOF && ctx->call_expired;
     ctx->call_deadline = call;
-    const bool call_is_over = tcp_call_is_over(ctx); // if so, that is what the fault tells
+    const bool call_is_over = tcp_call_is_over(ctx); // if so, the fault says that
     if (late && !call_is_over)
         call_note_ending(ctx, ENDED_BY_CONNECT_LIMIT);
     if (late)

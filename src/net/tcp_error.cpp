@@ -26,7 +26,7 @@ const char *text_of_ending(const soap_call_record &record)
     if (record.report.ended_by == ENDED_BY_CANCEL)
         return "The call was cancelled";
     return record.report.first_byte_time < 0 ? "The peer closed the connection without an answer"
-                                             : "The peer closed the connection in the midst of its answer";
+                                             : "The peer closed the connection before the end of its answer";
 }
 
 } // namespace

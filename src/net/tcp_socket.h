@@ -13,7 +13,7 @@
 #include <zuv_client_pro/soap.h>
 
 // True if ctx->socket may be used. Every reader of ctx->socket asks this and not for -1: the number of a
-// socket that soap_force_close has closed still stands there and may name somebody else's file by now.
+// socket that soap_force_close has closed is still there and may name another file by now.
 inline bool soap_socket_open(const soap *ctx)
 {
     return ctx->socket != -1 && !ctx->socket_abandoned;
@@ -50,7 +50,7 @@ void tcp_store_socket(soap *ctx, int socket);
 // Closes ctx->socket through on_close_socket if it is open, takes TLS off it, and leaves -1.
 void tcp_drop_socket(soap *ctx);
 
-// soap_socket_release in the midst of a call, whose time goes on.
+// soap_socket_release within a call, whose time goes on.
 int tcp_release(soap *ctx);
 
 // Closes a descriptor that is not, or no longer, in ctx->socket; -1 is ignored.

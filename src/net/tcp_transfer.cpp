@@ -186,7 +186,7 @@ void note_failed_sending(soap *ctx, bool tls_failed)
 
 // --- receiving ---
 
-constexpr int STRAY = EINTR; // in errno, for a datagram from somebody else: receive again
+constexpr int STRAY = EINTR; // in errno, for a datagram from another sender: receive again
 
 bool same_address(const sockaddr *one, const sockaddr *other)
 {
@@ -222,7 +222,7 @@ ssize_t recv_datagram(soap *ctx, char *buffer, std::size_t length, int flags)
     return received;
 }
 
-// One transfer. Negative: nothing for now, *wait_for tells what to wait for, and errno why; 0: the end, or a
+// One transfer. Negative: nothing for now, *wait_for says what to wait for, and errno why; 0: the end, or a
 // failure in errno_value.
 ssize_t recv_once(soap *ctx, char *buffer, std::size_t length, bool limited, int *wait_for)
 {

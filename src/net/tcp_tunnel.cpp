@@ -1,8 +1,8 @@
-// tcp_tunnel.cpp - CONNECT to an HTTP proxy, in the midst of another message's beginning.
+// tcp_tunnel.cpp - CONNECT to an HTTP proxy, while another message begins.
 //
 // Always: the request that is about to be sent finds the context as it left it, whatever the proxy answers.
 // An answer that opens the tunnel has a head only; bytes after it that came before anything was said to the
-// host after are nobody's answer and are dropped.
+// host after answer nothing and are dropped.
 #include "net/tcp_socket.h"
 
 #include <cstdio>
@@ -105,7 +105,7 @@ struct answer {
     int result; // of the head reader
     int status; // 0: it was no HTTP response
     bool has_body;
-    char line[SOAP_TEXT_SIZE]; // the first one, or what stood in its place
+    char line[SOAP_TEXT_SIZE]; // the first one, or what came in its place
     const char *body;          // null: not known
 
     bool opens_tunnel() const { return result == 0 && status == STATUS_OK && !has_body; }
@@ -156,8 +156,8 @@ int refuse(soap *ctx, const char *host, int port, const answer &got)
     const char *const own = soap_string_dup(ctx, text);
     if (own == nullptr)
         return ctx->error;
-    const bool told = got.body != nullptr && got.body[0] != '\0';
-    return fail_as_sender(ctx, own, told ? got.body : "CONNECT failed in tcp_connect()", got.error());
+    const bool has_text = got.body != nullptr && got.body[0] != '\0';
+    return fail_as_sender(ctx, own, has_text ? got.body : "CONNECT failed in tcp_connect()", got.error());
 }
 
 } // namespace

@@ -32,7 +32,7 @@ timeval as_timeval(std::int64_t microseconds)
     return value;
 }
 
-// One set of a select call: null for a way that nobody asked about.
+// One set of a select call: null for a direction that isn't waited for.
 class wait_set {
 public:
     wait_set(bool wanted, int socket) : wanted_(wanted), used_(wanted), socket_(socket)

@@ -5,7 +5,7 @@
 // context has given up.
 //
 // Left out on purpose: BIO_CTRL_EOF. A peer that ends without a closing alert is then an end of input, as
-// HTTP over TLS servers in use need it; lengths and chunks of the message tell a cut one from a whole one.
+// HTTP over TLS servers in use need it; lengths and chunks show whether the message is whole.
 #include <cerrno>
 
 #include <openssl/bio.h>

@@ -50,7 +50,7 @@ void tls_bio_set_nonblocking(BIO *bio, bool nonblocking);
 
 // --- tls_transfer.cpp ---
 // One SSL_write or SSL_read, which doesn't block if it is limited in time. Above 0: bytes. Otherwise
-// *wait_for is the WAIT_ flag to wait for before a retry, or 0 if no retry helps; errno tells the system's
+// *wait_for is the WAIT_ flag to wait for before a retry, or 0 if no retry helps; errno has the system's
 // reason, 0 for none.
 int tls_write(soap *ctx, const char *data, std::size_t length, bool limited, int *wait_for);
 int tls_read(soap *ctx, char *buffer, std::size_t length, bool limited, int *wait_for);

@@ -37,7 +37,7 @@ void keep_session(soap *ctx)
 }
 
 // Our closing alert is out, the peer's hasn't been seen: looks for it among what has arrived. Data that
-// nobody has read and nobody will is no failure of the closing. 1 finished, 0 not yet.
+// no one has read or will read is no failure of the closing. 1 finished, 0 not yet.
 int look_for_peer_alert(SSL *ssl)
 {
     if (!SSL_want_read(ssl) && !SSL_has_pending(ssl))
@@ -51,7 +51,7 @@ int look_for_peer_alert(SSL *ssl)
     return finished == 1 ? 1 : 0;
 }
 
-// Tells the peer by the socket's end that nothing more comes, and waits for it to end as well.
+// Ends the sending side so that the peer knows that nothing more comes, and waits for it to end as well.
 void half_close(soap *ctx)
 {
     if (ctx->on_shutdown_socket == nullptr || ctx->on_shutdown_socket(ctx, ctx->socket, SHUT_WR) != 0)

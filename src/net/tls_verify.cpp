@@ -1,4 +1,4 @@
-// tls_verify.cpp - is the peer the host asked for, and does a certificate's verdict stand? And the reasons of
+// tls_verify.cpp - is the peer the host asked for, and does the verdict on a certificate hold? And the reasons of
 // a refusal, for the host's eyes.
 //
 // Three rules for the name of a host:

@@ -14,7 +14,7 @@
 #include "core/failure.h"
 #include "xml/xml_token.h"
 
-// Bytes of the input buffer that may be taken as they stand as long as they are no markup; they die at the
+// Bytes of the input buffer that may be taken unchanged as long as they are no markup; they die at the
 // next read.
 struct inline_stretch {
     const char *start, *end;

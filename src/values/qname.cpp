@@ -66,7 +66,7 @@ struct text_sink {
     }
 };
 
-// The table's prefix or the URI for the namespace of a prefix in scope; false if nothing stands for it.
+// The table's prefix or the URI for the namespace of a prefix in scope; false if there is none.
 bool put_namespace(soap *ctx, const soap_prefix *record, text_sink *out)
 {
     if (record->index >= 0 && ctx->local_namespaces != nullptr) {
@@ -123,7 +123,7 @@ bool put_list(soap *ctx, const char *text, text_sink *out)
     return true;
 }
 
-// A managed text of what the list stands for. 0, 9, 20 or 45.
+// A managed text of the list's meaning. 0, 9, 20 or 45.
 int map_list(soap *ctx, const char *text, char **target, bool narrows)
 {
     text_sink measure = {nullptr, 0, narrows};
@@ -169,7 +169,7 @@ int put_text(soap *ctx, std::string_view text)
     return soap_text_buffer_put(ctx, text.data(), text.size());
 }
 
-// Declares a prefix of its own for a URI on the element to come and puts it. The URI stands after the
+// Declares a prefix of its own for a URI on the element to come and puts it. The URI follows the
 // growing text for the time of the call, as it needs a terminator.
 int put_new_prefix(soap *ctx, std::string_view uri)
 {
@@ -190,7 +190,7 @@ int put_prefix_for(soap *ctx, std::string_view uri)
     return prefix != nullptr ? put_text(ctx, prefix) : put_new_prefix(ctx, uri);
 }
 
-// Tells canonical output that the prefix of the word from `start` on is used.
+// Marks for canonical output that the prefix of the word from `start` on is used.
 int use_prefix_from(soap *ctx, std::size_t start)
 {
     if (soap_text_buffer_put(ctx, "", 1) || soap_prefix_use(ctx, ctx->label_buffer + start))

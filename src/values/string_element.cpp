@@ -215,7 +215,7 @@ bool has_own_tag(const char *tag)
     return tag != nullptr && *tag != '-';
 }
 
-// Tag under which literal content stands: with its namespace as the default one, the name goes without a
+// Tag under which literal content is written: with its namespace as the default one, the name goes without a
 // prefix.
 const char *literal_name(const soap *ctx, const char *tag)
 {
@@ -268,7 +268,7 @@ private:
     char *last;
 };
 
-// "[type" of SOAP 1.2 stands before the last bracket of the array type, the sizes after it.
+// "[type" of SOAP 1.2 comes before the last bracket of the array type, the sizes after it.
 int put_soap12_array(soap *ctx, const char *array_type)
 {
     const char *bracket = std::strrchr(array_type, '[');

@@ -1,7 +1,7 @@
 // attributes.h - the context's attribute records, shared by writer and reader.
 //
-// Always: a record holds its name. Those that the element has are visible and stand in soap::attribute_list;
-// all stand in hash chains (namespace_scope.h), where an idle one waits for its name to come again. Records
+// Always: a record holds its name. Those that the element has are visible and in soap::attribute_list;
+// all are in hash chains (namespace_scope.h), where an idle one waits for its name to come again. Records
 // and value buffers stay until the call's scratch memory is freed, and a bounded number of them beyond that,
 // for the next call.
 #pragma once

@@ -1,6 +1,6 @@
 // entities.cpp - references in XML text: "&lt;", "&#65;", "&eacute;".
 //
-// Here: their names and numbers. Elsewhere: where a reference may stand (xml_token.cpp).
+// Here: their names and numbers. Elsewhere: where a reference may be (xml_token.cpp).
 #include <algorithm>
 #include <cstring>
 #include <string_view>
@@ -80,7 +80,7 @@ std::int32_t unknown(soap *ctx)
     return (ctx->mode & MODE_STRICT) != 0 ? xml_refuse(ctx, SOAP_SYNTAX_ERROR) : UNKNOWN;
 }
 
-// What stands after the "#". The digits end where they end, which strict reading demands to be the end.
+// What follows the "#". The digits end where they end, which strict reading demands to be the end.
 std::int32_t numbered_code(soap *ctx, std::string_view text)
 {
     const bool hexadecimal = !text.empty() && (text[0] == 'x' || text[0] == 'X');
@@ -97,7 +97,7 @@ std::int32_t numbered_code(soap *ctx, std::string_view text)
     return xml_carries(code) ? static_cast<std::int32_t>(code) : xml_no_character(ctx, SOAP_SYNTAX_ERROR);
 }
 
-// Markup, blanks and bytes that may be part of a character can't stand in a reference: the "&" was a stray
+// Markup, blanks and bytes that may be part of a character can't be in a reference: the "&" was a stray
 // one.
 bool ends_stray_reference(std::int32_t byte)
 {

@@ -10,7 +10,7 @@
 
 constexpr const char *XML_NAMESPACE_URI = "http://www.w3.org/XML/1998/namespace";
 
-// The innermost record of a prefix in scope, or null: as it stands, or where strings are Latin-1 in that too.
+// The innermost record of a prefix in scope, or null: as written, or where strings are Latin-1 in that too.
 // Cost does not depend on how many are in scope.
 soap_prefix *xml_prefix_find(const soap *ctx, std::string_view prefix);
 

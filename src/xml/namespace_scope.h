@@ -28,7 +28,7 @@ constexpr std::size_t ROOT_BYTES_MAX = 4096; // for a remembered root element
 constexpr std::size_t RECEIVED_SIZE = 128;   // bytes; longer received URIs have blocks of their own
 constexpr std::size_t RECEIVED_KEPT = 4;     // blocks for received URIs that stay from call to call
 constexpr unsigned TAG_GUESS_BITS = 6;       // of the number of a tag_guess
-constexpr std::size_t TAG_GUESS_PROBES = 4;  // places that one may stand in, from its number on
+constexpr std::size_t TAG_GUESS_PROBES = 4;  // places that one may be in, from its number on
 constexpr std::size_t ROOT_RECEIVED_MAX = 8; // rows that took a URI in it
 
 // Bytes in a row's own texts.
@@ -42,7 +42,7 @@ struct namespace_lengths {
 struct tag_guess {
     static constexpr std::size_t SIZE = 32;
 
-    std::uint64_t after;       // tells what it follows; 0: no guess
+    std::uint64_t after;       // what it follows; 0: no guess
     std::uint8_t next;         // what it was found to be
     bool doubtful;             // it was wrong the last time
     std::uint8_t prefix_place; // in soap::prefix_cache

@@ -186,8 +186,8 @@ int copy_received(soap *ctx, soap_namespace *rows, std::size_t count)
     return SOAP_OK;
 }
 
-// A row is about to stand for another URI: declarations of the held element that are bound to it become
-// attributes while it still tells what they said. 0 or 20.
+// A row is about to get another URI: declarations of the held element that are bound to it become
+// attributes while their URI is still known. 0 or 20.
 int keep_declared(soap *ctx, const soap_namespace &row, const char *uri)
 {
     const char *const before = xml_row_uri(row);
@@ -328,7 +328,7 @@ void xml_received_drop(soap *ctx, soap_namespace &row)
 {
     if (row.received == nullptr)
         return;
-    keep_declared(ctx, row, row.uri); // without memory the attribute tells the row's next URI
+    keep_declared(ctx, row, row.uri); // without memory the attribute shows the row's next URI
     if (ctx->encoding_style == row.received)
         ctx->encoding_style = "";
     give_received(ctx, row.received);

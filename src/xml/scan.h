@@ -17,7 +17,7 @@ inline bool is_digit(char byte)
     return byte >= '0' && byte <= '9';
 }
 
-// Result of scan_integer. Numbers of any length are safe: past 64 bits only `overflow` tells.
+// Result of scan_integer. Numbers of any length are safe: past 64 bits only `overflow` is set.
 struct scanned_integer {
     const char *end;         // after the last digit; the start of the text without digits
     std::uint64_t magnitude; // UINT64_MAX on overflow

@@ -1,6 +1,6 @@
 // utf8.h - UTF-8 as XML may hold it: what is well-formed, to and from code points, to Latin-1.
 //
-// Elsewhere: where such text stands and what ends it (xml/xml_scan.h), sequences that a refill cuts
+// Elsewhere: where such text is and what ends it (xml/xml_scan.h), sequences that a refill cuts
 // (xml/xml_token.cpp).
 //
 // Always: well-formed are the shortest forms of characters up to U+10FFFF but surrogates, U+FFFE and U+FFFF.

@@ -1,4 +1,4 @@
-// xml_read.cpp - elements on input: the held start tag, consuming it, its end, and dropping what nobody
+// xml_read.cpp - elements on input: the held start tag, consuming it, its end, and dropping what no one
 // knows.
 //
 // Here: the life of a start tag between questions. Elsewhere: attributes (xml_read_attributes.cpp), names and
@@ -28,14 +28,14 @@ int no_tag(soap *ctx, int error)
     return fail(ctx, error);
 }
 
-// A code left by a search that found nothing says nothing about the input; any other tells why it ended.
+// A code left by a search that found nothing says nothing about the input; any other says why it ended.
 int end_of_input(soap *ctx)
 {
     const int error = ctx->exceeded != nullptr ? static_cast<int>(SOAP_LENGTH) : ctx->error;
     return error == 0 || error == SOAP_TAG_MISMATCH || error == SOAP_NO_TAG ? SOAP_EOF : error;
 }
 
-// A byte-order mark may stand before a tag. 0 when the next token can be read, 47 on UTF-16.
+// A byte-order mark may come before a tag. 0 when the next token can be read, 47 on UTF-16.
 int pass_byte_order_mark(soap *ctx)
 {
     if (ctx->look_ahead < 0 || ctx->in_cdata != CDATA_OUTSIDE)
@@ -90,7 +90,7 @@ int find_start_tag_slow(soap *ctx)
     return no_tag(ctx, SOAP_NO_TAG);
 }
 
-// The place after the usual XML declaration, if that stands at `p`, which begins an instruction, and a start
+// The place after the usual XML declaration, if that is at `p`, which begins an instruction, and a start
 // tag follows in the buffer; else `p`.
 const char *after_usual_declaration(soap *ctx, const char *p, const char *end)
 {
@@ -143,7 +143,7 @@ template <template <bool> class Stop> bool take_plain_name(soap *ctx, const char
     return true;
 }
 
-// Reads a start tag that is a short name in brackets and stands whole in the buffer. False: the next thing is
+// Reads a start tag that is a short name in brackets and is whole in the buffer. False: the next thing is
 // another, and nothing was consumed.
 bool read_plain_tag(soap *ctx)
 {
@@ -236,7 +236,7 @@ int enter_element(soap *ctx)
     return SOAP_OK;
 }
 
-// The name of an end tag and its ">". 0, 5 when something else stands there, or why the input ended.
+// The name of an end tag and its ">". 0, 5 when something else is there, or why the input ended.
 int read_end_tag_name(soap *ctx)
 {
     ctx->tag_resolved = false;
@@ -297,7 +297,7 @@ void leave_element(soap *ctx)
         ctx->nesting_level--;
 }
 
-// A type whose prefix nobody has declared names no type at all. Generous reading takes it for one that it
+// A type whose prefix isn't declared names no type at all. Generous reading takes it for one that it
 // doesn't know.
 bool has_undeclared_type(const soap *ctx)
 {
@@ -322,7 +322,7 @@ bool has_undeclared_type(const soap *ctx)
     ctx->error = soap_tag_compare(ctx, ctx->tag, tag);
     if (ctx->error != 0)
         return ctx->error;
-    // Refused tags stay held, so that nesting_level still tells where the reader is.
+    // Refused tags stay held, so that nesting_level still shows where the reader is.
     if (type != nullptr && ctx->element_type[0] != '\0' &&
         soap_tag_compare(ctx, ctx->element_type, type) != 0)
         return fail(ctx, SOAP_TYPE_MISMATCH);

@@ -4,7 +4,7 @@
 // themselves (attributes.cpp), the tag (xml_read.cpp), the prefix stack (namespace_prefix.cpp).
 //
 // Always: an attribute costs the same however many the element has. The declarations of an element that has no
-// other attributes stand on the prefix stack alone; whoever asks for its attributes gets records made of them.
+// other attributes are on the prefix stack alone; records are made of them when its attributes are asked for.
 #include <algorithm>
 #include <array>
 #include <climits>
@@ -64,7 +64,7 @@ int store_value(soap *ctx, soap_attribute *record, const char *text, std::size_t
 
 // ------------------------------------------------------------------------------------------ values
 
-// A byte that a value continues after, but not as it stands.
+// A byte that a value continues after, but not unchanged.
 bool is_special(char c)
 {
     return c == '&' || is_high(c) || is_control(c);
@@ -86,7 +86,7 @@ int gather_special(soap *ctx)
     return text_put(ctx, bytes, utf8_encode(token_code(token), bytes));
 }
 
-// The end of what may be taken as it stands for UTF-8.
+// The end of what may be taken unchanged as UTF-8.
 template <template <bool> class Stop>
 const char *value_end(const soap *ctx, const char *here, const char *end)
 {
@@ -130,7 +130,7 @@ void narrow_value(soap_attribute *record)
     record->value[utf8_to_latin1(record->value, std::strlen(record->value))] = '\0';
 }
 
-// A value that stands whole and plain in the buffer is copied once; any other is gathered first. `names_wide`
+// A value that is whole and plain in the buffer is copied once; any other is gathered first. `names_wide`
 // is set if that leaves a name that is UTF-8 where strings are Latin-1.
 template <template <bool> class Stop> int read_value(soap *ctx, soap_attribute *record, bool *names_wide)
 {
@@ -176,7 +176,7 @@ const char *declared_prefix(const soap_attribute *record)
     return name.size() == 5 ? record->name + 5 : record->name[5] == ':' ? record->name + 6 : nullptr;
 }
 
-// A declaration that stands whole in the buffer, as plain ASCII in quotes.
+// A declaration that is whole in the buffer, as plain ASCII in quotes.
 struct plain_declaration {
     const char *prefix, *prefix_end, *uri, *uri_end;
 };
@@ -432,7 +432,7 @@ std::string_view without_blanks(std::string_view value)
     return value;
 }
 
-// By first letter: bit n tells that some name which is understood has a local part of n bytes.
+// By first letter: bit n means that some name which is understood has a local part of n bytes.
 constexpr std::size_t LETTERS = 32;
 constexpr auto KNOWN_LENGTHS = [] {
     std::array<std::uint32_t, LETTERS> lengths{};

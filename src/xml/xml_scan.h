@@ -55,7 +55,7 @@ template <bool Blanks, bool High, char... Marks> struct byte_class {
     {
         __m128i hits = _mm_setzero_si128();
         ((hits = _mm_or_si128(hits, _mm_cmpeq_epi8(bytes, _mm_set1_epi8(Marks)))), ...);
-        // White space is among the hits for control characters too: it is told from them one by one.
+        // White space is among the hits for control characters too: each is checked singly.
         const __m128i low = _mm_set1_epi8(Blanks ? ' ' : ' ' - 1);
         hits = _mm_or_si128(hits, _mm_cmpeq_epi8(_mm_min_epu8(bytes, low), bytes));
         if constexpr (High) // the mask takes the top bit of each byte
@@ -125,7 +125,7 @@ inline bool same_of_32(const char *one, const char *other, std::size_t length)
 #endif
 }
 
-// What ends a stretch that may be taken as it stands. Control characters always go the way of single bytes,
+// What ends a stretch that may be taken unchanged. Control characters always go the way of single bytes,
 // so that no text holds one; bytes from 128 on do unless they are known to be what the text is made of.
 template <bool High> using tag_name_stop = byte_class<true, High, '>', '/'>;
 template <bool High> using attribute_name_stop = byte_class<true, High, '>', '/', '='>;

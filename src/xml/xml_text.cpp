@@ -4,7 +4,7 @@
 // (xml_text_wide.cpp), whole string elements (values/string_element.cpp).
 //
 // Always: text runs in stretches between two special bytes; only those go through the tokens. Gathered text
-// stands in the growing text and is copied once to managed memory.
+// is in the growing text and is copied once to managed memory.
 #include "xml/xml_text.h"
 #include "xml/xml_read.h"
 

@@ -1,7 +1,7 @@
 // xml_text.h - element text for the reader's own files and the binding: in place, or gathered in the growing
 // text.
 //
-// Elsewhere: managed texts (soap_string_read and its kin in soap_xml.h).
+// Elsewhere: managed texts (soap_string_read and those after it in soap_xml.h).
 #pragma once
 
 #include <string_view>
@@ -12,20 +12,20 @@
 #include "xml/xml_scan.h"
 #include "xml/xml_token.h"
 
-// When the whole text up to "</" stands in the buffer as it is to be (no child, no reference, no CDATA
+// When the whole text up to "</" is in the buffer as it is to be (no child, no reference, no CDATA
 // section, nothing to decode), consumes it and gives its place and length; else false, with nothing consumed.
 // The text isn't terminated, and lives until the next read. Nothing may be held.
 bool xml_text_in_place(soap *ctx, const char **text, std::size_t *length);
 
 // The same for the whole element whose start tag is held: when it has neither attributes nor children, and
-// all of it stands in the buffer, consumes it with its end tag. Any name and no type is asked for. Not in
+// all of it is in the buffer, consumes it with its end tag. Any name and no type is asked for. Not in
 // strict mode.
 bool xml_leaf_in_place(soap *ctx, std::string_view *text);
 
 // What the message and its strings are made of, as far as bytes from 128 on go.
 constexpr std::uint32_t BYTE_MODES = MODE_LATIN1 | MODE_WINDOWS_1252 | MODE_UTF_STRINGS;
 
-// The rest of stretch_end from a byte of 128 or above on. From Latin-1 to Latin-1 all stay as they stand,
+// The rest of stretch_end from a byte of 128 or above on. From Latin-1 to Latin-1 all stay as they are,
 // from UTF-8 to UTF-8 what is well-formed; else none.
 template <template <bool> class Stop>
 [[gnu::noinline]] const char *high_stretch_end(const soap *ctx, const char *here, const char *end)
@@ -36,7 +36,7 @@ template <template <bool> class Stop>
     return bytes == MODE_LATIN1 ? Stop<false>::find(here, end) : here;
 }
 
-// The first byte of [here, end) that isn't part of a string as it stands: one of the class Stop, or one from
+// The first byte of [here, end) that isn't part of a string unchanged: one of the class Stop, or one from
 // 128 on that has to be decoded.
 template <template <bool> class Stop>
 [[gnu::always_inline]] inline const char *stretch_end(const soap *ctx, const char *here, const char *end)
@@ -50,7 +50,7 @@ template <template <bool> class Stop>
     return stretch_end<text_stop>(ctx, here, end);
 }
 
-// The next token of a string, decoded. A control character stands for no character.
+// The next token of a string, decoded. A control character means no character.
 inline std::int32_t text_token(soap *ctx)
 {
     const std::int32_t token = soap_char_next_utf8(ctx);
@@ -82,7 +82,7 @@ int text_limits_check(soap *ctx, text_limits &limits);
 // The same at the end of the text, against both bounds.
 int text_limits_finish(soap *ctx, text_limits &limits);
 
-// Where markup inside a text stands: which token ends the text, and which one is part of it.
+// Where markup inside a text is: which token ends the text, and which one is part of it.
 //
 // A text ends at the end tag of the element around it. One that began with a held start tag takes that whole
 // element in and ends at the next start tag too.

@@ -1,6 +1,6 @@
 // xml_text_raw.cpp - the content of an element unchanged: raw XML in a byte string.
 //
-// Here: the states that tell text from CDATA sections, comments and instructions. Elsewhere: decoded text
+// Here: the states that separate text from CDATA sections, comments and instructions. Elsewhere: decoded text
 // (xml_text.cpp).
 //
 // Always: references stay references, but for those of no character; bytes from 128 on are decoded, but

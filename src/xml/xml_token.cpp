@@ -1,4 +1,4 @@
-// xml_token.cpp - bytes to tokens: markup told from text, references and UTF-8 decoded, comments passed over.
+// xml_token.cpp - bytes to tokens: markup separated from text, references and UTF-8 decoded, comments passed over.
 //
 // Here: the two token layers, instructions, and skipping of tags and content. Elsewhere: the names of
 // references (entities.cpp), what is made of tokens (xml_read.cpp, xml_text.cpp).
@@ -86,7 +86,7 @@ std::int32_t skip_declaration(soap *ctx)
     return skip_balanced(ctx, byte);
 }
 
-// An instruction ends at "?>", whatever brackets stand in it.
+// An instruction ends at "?>", whatever brackets it holds.
 std::int32_t skip_instruction(soap *ctx)
 {
     std::int32_t byte = soap_pi_read(ctx);

@@ -24,7 +24,7 @@ constexpr std::int16_t CDATA_OUTSIDE = 0;
 constexpr std::int16_t CDATA_INSIDE = 1;
 constexpr std::int16_t CDATA_BRACKET_DUE = 2;
 
-// Ends the input for what stands in it: every later read gives XML_EOF, and the error tells why.
+// Ends the input for what it holds: every later read gives XML_EOF, and the error says why.
 inline std::int32_t xml_refuse(soap *ctx, int error)
 {
     ctx->error = error;
@@ -43,7 +43,7 @@ inline std::int32_t xml_no_character(soap *ctx, int error)
     return (ctx->mode & MODE_STRICT) != 0 ? xml_refuse(ctx, error) : '?';
 }
 
-// A reference as it stands, from after its "&" up to the ";" if there is one.
+// A reference unchanged, from after its "&" up to the ";" if there is one.
 struct xml_reference {
     char text[64];
     std::size_t length = 0;

@@ -203,7 +203,7 @@ int write_empty(soap *ctx, const char *tag, int id, const char *type, const char
     return soap_element_attrs_close(ctx, tag);
 }
 
-// "#_%d" for the attribute href; the name alone stands after the "#".
+// "#_%d" for the attribute href; the name alone follows the "#".
 void compose_reference(char *text, std::size_t size, int number)
 {
     text[0] = '#';

@@ -20,6 +20,6 @@ int xml_canonical_root(soap *ctx, std::size_t rows);
 // Canonical output: enters the declarations that the element needs and puts the attribute table in order.
 int xml_canonical_attributes(soap *ctx);
 
-// XML as it stands, as UTF-8. Also 47 for what XML can't carry; the first form sends nothing then.
+// XML unchanged, as UTF-8. Also 47 for what XML can't carry; the first form sends nothing then.
 int xml_put_literal(soap *ctx, std::string_view text);
 int xml_put_wide(soap *ctx, const char32_t *text);

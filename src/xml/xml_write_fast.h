@@ -19,7 +19,7 @@
 // Modes in which a start or end tag is more than its name in brackets.
 constexpr std::uint32_t XML_SPECIAL_TAGS = MODE_INDENT | MODE_DEFAULT_NAMESPACE | MODE_CANONICAL;
 
-// True in a counting pass that nobody watches: bytes need only be added up.
+// True in a counting pass without hooks or trace: bytes need only be added up.
 inline bool xml_only_counts(const soap *ctx)
 {
     return ((ctx->mode & MODE_COUNTING) != 0u) && ctx->on_send_filter == nullptr &&
@@ -28,7 +28,7 @@ inline bool xml_only_counts(const soap *ctx)
 
 // Reserves `length` bytes in the send buffer or, while a message is counted, in the store, which count as sent;
 // the caller fills all of it at once. Null if the bytes must go through soap_send_bytes: counted alone,
-// unbuffered, filtered, or not enough space.
+// unbuffered, filtered, or too little space.
 inline char *xml_reserve(soap *ctx, std::size_t length)
 {
     if ((ctx->mode & MODE_COUNTING) != 0)

@@ -27,7 +27,7 @@
 
 namespace {
 
-// Where a text stands decides what its characters become.
+// Where a text is written decides what its characters become.
 enum class place : std::uint8_t { element = 1, canonical_element = 2, attribute = 4 };
 
 constexpr std::uint8_t HIGH_BYTE = 8;
@@ -157,7 +157,7 @@ template <place P>
     return done;
 }
 
-// A text that is refused before it is sent: its host is told what stands in it.
+// A text that is refused before it is sent: its host learns what it holds.
 [[gnu::cold]] int refuse(soap *ctx, const char *format, unsigned value)
 {
     char text[96];
@@ -180,7 +180,7 @@ int refuse_bytes(soap *ctx, char byte)
                   static_cast<unsigned char>(byte));
 }
 
-// What may stand between bytes from 128 on, by place.
+// What may come between bytes from 128 on, by place.
 template <bool High> using element_stop = byte_class<false, High, '<', '>', '&', '\n', '\r'>;
 template <bool High> using attribute_stop = byte_class<false, High, '<', '"', '&', '\t', '\n', '\r'>;
 

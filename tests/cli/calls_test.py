@@ -129,7 +129,7 @@ class calls(unittest.TestCase):
             (6, zuv.answer(zuv.envelope(fault % ("E:Client", "never heard", "")), "404 No"), "detail    never heard (E:Client)\n"),
             (6, zuv.answer("<html><title>Please log in</title><p>x</p></html>", "403 No"), "detail    Please log in\n"),
             (7, zuv.answer("<html>", headers=["Content-Type: text/html"]), "not a SOAP message: it is of type text/html"),
-            (4, zuv.answer(GOT[:-40]), "in the midst of its answer"),
+            (4, zuv.answer(GOT[:-40]), "before the end of its answer"),
             (7, zuv.answer(zuv.envelope("<p:getResponse/>", 3)), "--soap12"),
             (7, zuv.answer(zuv.envelope("<p:setResponse/>")), "tag name or namespace mismatch"),
             (7, zuv.answer(GOT).replace(b"Connection", b"Content-Encoding: gzip\r\nConnection"), "zuv trace"),

@@ -357,7 +357,7 @@ TEST_F(client_reports, and_texts_tell_what_ended_a_call)
          "The peer closed the connection without an answer", ""},
         {"closed in the answer", false,
          [](scripted::line &end) { end.send(scripted::answer_to(end.request()).substr(0, 300)); }, nullptr,
-         ENDED_BY_PEER, "The peer closed the connection in the midst of its answer", ""},
+         ENDED_BY_PEER, "The peer closed the connection before the end of its answer", ""},
         {"silent", false, STAY_SILENT, [](zuv::options &wanted, std::string &) { wanted.recv_limit = 50ms; },
          ENDED_BY_RECV_LIMIT, "timed out (50000us receive delay)", ""},
         {"silent for the whole call", true, STAY_SILENT,

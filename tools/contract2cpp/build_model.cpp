@@ -127,7 +127,7 @@ void model_builder::add_type_id(const type_id_declaration &row)
         throw contract_error(row.at, "type id " + std::to_string(row.id) + " is out of 1 to " +
                                          std::to_string(TYPE_ID_MAX));
     if (const auto [first, added] = id_places.emplace(row.id, row.at); !added)
-        throw contract_error(row.at, "type id " + std::to_string(row.id) + " stands in line " +
+        throw contract_error(row.at, "type id " + std::to_string(row.id) + " is in line " +
                                          std::to_string(first->second.line) + " too");
     const auto kind = kinds.find(row.kind);
     if (kind == kinds.end())
@@ -560,7 +560,7 @@ const data_class *model_builder::find_class(const std::string &name) const
 
 void model_builder::check_own_members(const data_class &type)
 {
-    std::map<std::string, std::string> names; // what each member's name stands for
+    std::map<std::string, std::string> names; // what each member's name means
     for (const std::string_view name : RESERVED)
         names.emplace(name, "the class's own use");
     if (type.simple_content)

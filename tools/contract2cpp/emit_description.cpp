@@ -87,7 +87,7 @@ std::string attribute_row(const class_attribute &attribute,
            "}";
 }
 
-// A named array with the rows, or nothing; and what stands for it in a span.
+// A named array with the rows, or nothing; and what names it in a span.
 std::string rows_of(const std::string &type, const std::string &name, const std::vector<std::string> &rows)
 {
     return rows.empty() ? ""

@@ -114,9 +114,9 @@ emitted_file emit_type_ids(const contract_model &model)
 {
     std::string text =
         opening("type_ids.h", "type_ids.txt",
-                "One number for each type that can stand on the wire or in the managed lists of a "
+                "One number for each type that can be on the wire or in the managed lists of a "
                 "context. A published number keeps its type.");
-    text += "#pragma once\n\n// The type ids. A comment tells the XML name.\nenum soap_type_id : int {\n";
+    text += "#pragma once\n\n// The type ids. A comment gives the XML name.\nenum soap_type_id : int {\n";
     for (const identified_type &type : model.types)
         text += documented(type.constant + " = " + std::to_string(type.id) + ",", type.xml_name, "    ");
     return {"include/zuv_client_pro/type_ids.h", text + "};\n"};

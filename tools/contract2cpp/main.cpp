@@ -30,7 +30,7 @@ bool parse(int argc, char **argv, options &options)
             options.dump = true;
         } else if (name == "--list") {
             options.list = true;
-        } else if (i + 1 == argc) { // NOLINT(bugprone-branch-clone): lacks its value; below, nobody knows it
+        } else if (i + 1 == argc) { // NOLINT(bugprone-branch-clone): lacks its value; below, it is unknown
             return false;
         } else if (name == "--schema") {
             options.schema = argv[++i];

@@ -32,7 +32,7 @@ std::vector<namespace_declaration> read_namespaces(const std::filesystem::path &
         for (const namespace_declaration &row : rows) {
             if (row.prefix == words[0] || row.uri == words[1])
                 throw contract_error(at,
-                                     "prefix or URI stands in line " + std::to_string(row.at.line) + " too");
+                                     "prefix or URI is in line " + std::to_string(row.at.line) + " too");
         }
         rows.push_back({at, words[0], words[1], words[2] == "-" ? "" : words[2]});
     });

@@ -120,7 +120,7 @@ class Pages:
                          for uri, title in contract.titles.items())
         return page("Wire reference",
                     "<h1>Wire reference</h1><p>What goes over the wire, made from the contract: every class with its members and an "
-                    "example. Members stand in the order in which they are written; a reader takes them in any order.</p>"
+                    "example. Members are in the order in which they are written; a reader takes them in any order.</p>"
                     "<table><tr><th>Prefix<th>Namespace<th>What" + spaces + "</table>" +
                     "\n".join(map(self.port_section, contract.ports)))
 
