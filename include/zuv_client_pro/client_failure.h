@@ -63,7 +63,8 @@ public:
     //   returns  the record
     const protocol__Fault &record() const { return *record_; }
     // The fault as its own class, with the members that this has, such as `uri` of
-    // protocol__Client_x002eObjectNotFound.
+    // protocol__Client_x002eObjectNotFound. Needs RTTI: a host program compiled with -fno-rtti asks name() and
+    // casts record() by itself.
     //   Fault    a class of protocol.h, which the host program includes
     //   returns  the record
     //   null     it is of another class

@@ -571,6 +571,9 @@ struct ZUV_CLASS soap {
     std::int16_t mark_state;       // output: whether the message's objects were marked; private
     soap_head_memory *head_memory; // owned; the last request head, to be sent again; private
     soap_call_record *call_record; // owned; what happened in the last exchange (soap_report.h); private
+    // 0: waits use select, so a descriptor of 1024 (FD_SETSIZE) and over is refused with SOAP_FD_EXCEEDED.
+    // Otherwise they use poll, which takes any. Set before soap_cancel_arm and before the first call.
+    int wait_with_poll;
 
     // --- construction ---
 

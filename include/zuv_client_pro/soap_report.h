@@ -65,7 +65,8 @@ ZUV_API const soap_report *soap_call_report(soap *ctx);
 // the thread of the context, between exchanges.
 //   SOAP_OK             armed; also if it was before
 //   SOAP_OUT_OF_MEMORY
-//   SOAP_FD_EXCEEDED    no descriptor was to be had, or only one of 1024 or over
+//   SOAP_FD_EXCEEDED    no descriptor was to be had, or only one of 1024 or over without
+//                       wait_with_poll
 ZUV_API int soap_cancel_arm(soap *ctx);
 
 // Ends the exchange that runs: whatever it waits for on the network ends at once, with SOAP_EOF or

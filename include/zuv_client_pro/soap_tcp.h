@@ -5,10 +5,11 @@
 // Always: a time limit runs from the beginning of the step that it limits, and no signal restarts it.
 // call_timeout limits all steps together, from soap_server_connect or soap_connect_one (soap_http.h) to
 // soap_socket_release: whatever waits then ends with it, with errno_value 0, and error texts name it. No
-// limit ends the look-up of a name, which has those of the system's resolver. What ended an exchange is reported by
-// soap_call_report, and soap_cancel ends one from outside (soap_report.h). Only select is used, so
-// descriptors of 1024 and over are refused with SOAP_FD_EXCEEDED. Sockets that the library makes are closed
-// on exec, and writing to one whose peer is gone raises no SIGPIPE. SOAP_TCP_ERROR comes with a fault record:
+// limit ends the look-up of a name, which has those of the system's resolver. What ended an exchange is
+// reported by soap_call_report, and soap_cancel ends one from outside (soap_report.h). Waits use select, so
+// descriptors of 1024 and over are refused with SOAP_FD_EXCEEDED, unless soap::wait_with_poll is set. Sockets
+// that the library makes are closed on exec, and writing to one whose peer is gone raises no SIGPIPE.
+// SOAP_TCP_ERROR comes with a fault record:
 // its text is that of tcp_error_text, "Timeout" or the resolver's, its detail says what failed. Descriptors
 // are closed through on_close_socket, exactly once.
 #pragma once
@@ -26,8 +27,8 @@ constexpr int WAIT_ALL = 7;   // all of them
 //   timeout  seconds if positive, microseconds if negative, 0: does not wait
 //   > 0      the flags found
 //   0        time is up; errno_value is 0
-//   < 0      failure; errno_value holds the system's reason, EINTR included. A descriptor of 1024 or over:
-//            SOAP_FD_EXCEEDED in ctx->error, errno_value 0
+//   < 0      failure; errno_value holds the system's reason, EINTR included. A descriptor of 1024 or over
+//            without wait_with_poll: SOAP_FD_EXCEEDED in ctx->error, errno_value 0
 ZUV_API int tcp_wait(soap *ctx, int socket, int flags, int timeout);
 
 // Opens a connection (default of on_open): closes a socket that is still open, resolves the name, tries its

@@ -65,6 +65,7 @@ engine::engine(std::string_view to, const options &given)
     send_timeout = limit_of(wanted.send_limit);
     recv_timeout = limit_of(wanted.recv_limit);
     call_timeout = limit_of(wanted.total_limit);
+    wait_with_poll = 1;
     max_message = wanted.max_message;
     max_memory = wanted.max_memory;
     max_depth = wanted.max_depth;

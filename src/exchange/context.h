@@ -51,6 +51,7 @@ constexpr std::uint64_t POOL_LIMIT_DEFAULT = SOAP_POOL_LIMIT;
     X(connect_timeout, SETTING, {}) \
     X(accept_timeout, SETTING, {}) \
     X(call_timeout, SETTING, {}) \
+    X(wait_with_poll, SETTING, {}) \
     X(legacy, SETTING, {}) \
     X(max_message, SETTING, SOAP_MAX_MESSAGE) \
     X(max_memory, SETTING, SOAP_MAX_MEMORY) \

@@ -11,7 +11,6 @@
 #include <new>
 #include <poll.h>
 #include <sys/eventfd.h>
-#include <sys/select.h>
 #include <unistd.h>
 
 #include <openssl/ssl.h>
@@ -357,7 +356,7 @@ int soap_cancel_arm(soap *ctx)
     if (is_armed(*record))
         return SOAP_OK;
     const int made = eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK);
-    if (made < 0 || made >= FD_SETSIZE) {
+    if (made < 0 || tcp_too_large_to_wait(ctx, made)) {
         if (made >= 0)
             close(made);
         return fail(ctx, SOAP_FD_EXCEEDED);

@@ -9,7 +9,6 @@
 #include <cstdio>
 #include <cstring>
 #include <fcntl.h>
-#include <sys/select.h>
 #include <unistd.h>
 
 #include <zuv_client_pro/soap_error.h>
@@ -17,6 +16,7 @@
 
 #include "core/context_state.h"
 #include "core/failure.h"
+#include "net/tcp_wait.h"
 #include "net/tls_connection.h"
 
 namespace {
@@ -106,7 +106,7 @@ int tcp_fail(soap *ctx, int socket, const char *detail, const char *text)
 
 bool tcp_refuse_large(soap *ctx, int socket)
 {
-    if (socket < FD_SETSIZE)
+    if (!tcp_too_large_to_wait(ctx, socket))
         return false;
     tcp_close_through_hook(ctx, socket);
     fail(ctx, SOAP_FD_EXCEEDED);

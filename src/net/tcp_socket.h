@@ -70,7 +70,7 @@ void tcp_save_errno(soap *ctx);
 // `socket` first. Returns -1.
 int tcp_fail(soap *ctx, int socket, const char *detail, const char *text = nullptr);
 
-// Closes a socket that select can't serve: SOAP_FD_EXCEEDED. True if it did.
+// Closes a socket that can't be waited for: SOAP_FD_EXCEEDED. True if it did.
 bool tcp_refuse_large(soap *ctx, int socket);
 
 // A socket option to set, if it is wanted.

@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <ctime>
+#include <poll.h>
 #include <sys/select.h>
 
 #include <zuv_client_pro/soap_error.h>
@@ -22,14 +23,6 @@ constexpr tcp_deadline NEVER =
 std::int64_t microseconds_of(int timeout)
 {
     return timeout >= 0 ? timeout * MICROSECONDS : -std::int64_t{timeout};
-}
-
-timeval as_timeval(std::int64_t microseconds)
-{
-    timeval value{};
-    value.tv_sec = microseconds / MICROSECONDS;
-    value.tv_usec = microseconds % MICROSECONDS;
-    return value;
 }
 
 // One set of a select call: null for a direction that isn't waited for.
@@ -62,12 +55,64 @@ private:
     fd_set set_;
 };
 
-// tcp_wait with the time as select wants it; null: without end. `wake` is a descriptor that ends the waiting
+constexpr int WOKEN = 8; // besides WAIT_...: the waking descriptor is readable
+
+// What is ready of a socket (WAIT_...) and of the waking one, asked of select; 0 and -1 as of select.
+int select_ready(int socket, int flags, const std::int64_t *limit_us, int wake)
+{
+    wait_set readable((flags & WAIT_RECV) != 0, socket);
+    readable.add(wake);
+    wait_set writable((flags & WAIT_SEND) != 0, socket);
+    wait_set exceptional((flags & WAIT_ERROR) != 0, socket);
+    timeval limit{};
+    if (limit_us != nullptr) {
+        limit.tv_sec = static_cast<std::time_t>(*limit_us / MICROSECONDS);
+        limit.tv_usec = static_cast<suseconds_t>(*limit_us % MICROSECONDS);
+    }
+    const int count = select(std::max(socket, wake) + 1, readable.get(), writable.get(), exceptional.get(),
+                             limit_us != nullptr ? &limit : nullptr);
+    if (count <= 0)
+        return count;
+    return (readable.ready() ? WAIT_RECV : 0) | (writable.ready() ? WAIT_SEND : 0) |
+           (exceptional.ready() ? WAIT_ERROR : 0) | (readable.has(wake) ? WOKEN : 0);
+}
+
+// The same asked of poll. It reports errors and hang-ups unasked: both make a transfer return at once, so they
+// are given as the flags asked for, as select gives them.
+int poll_ready(int socket, int flags, const std::int64_t *limit_us, int wake)
+{
+    const auto events = [flags](int flag, int event) { return (flags & flag) != 0 ? event : 0; };
+    pollfd asked[2]{{socket,
+                     static_cast<short>(events(WAIT_RECV, POLLIN) | events(WAIT_SEND, POLLOUT) |
+                                        events(WAIT_ERROR, POLLPRI)),
+                     0},
+                    {wake, POLLIN, 0}};
+    timespec limit{};
+    if (limit_us != nullptr) {
+        limit.tv_sec = static_cast<std::time_t>(*limit_us / MICROSECONDS);
+        limit.tv_nsec = static_cast<long>(*limit_us % MICROSECONDS * 1000);
+    }
+    const int count = ppoll(asked, 2, limit_us != nullptr ? &limit : nullptr, nullptr);
+    if (count <= 0)
+        return count;
+    const int found = asked[0].revents;
+    if ((found & POLLNVAL) != 0) {
+        errno = EBADF;
+        return -1;
+    }
+    int ready = ((found & POLLIN) != 0 ? WAIT_RECV : 0) | ((found & POLLOUT) != 0 ? WAIT_SEND : 0) |
+               ((found & POLLPRI) != 0 ? WAIT_ERROR : 0);
+    if ((found & (POLLERR | POLLHUP)) != 0)
+        ready |= (flags & (WAIT_RECV | WAIT_SEND)) != 0 ? flags & (WAIT_RECV | WAIT_SEND) : WAIT_ERROR;
+    return ready | (asked[1].revents != 0 ? WOKEN : 0);
+}
+
+// tcp_wait with the time in microseconds; null: without end. `wake` is a descriptor that ends the waiting
 // with EINTR, once, when it is readable; -1: none.
-int wait_for(soap *ctx, int socket, int flags, timeval *limit, int wake)
+int wait_for(soap *ctx, int socket, int flags, const std::int64_t *limit_us, int wake)
 {
     ctx->errno_value = 0;
-    if (socket >= FD_SETSIZE) {
+    if (tcp_too_large_to_wait(ctx, std::max(socket, wake))) {
         fail(ctx, SOAP_FD_EXCEEDED);
         return -1;
     }
@@ -75,23 +120,18 @@ int wait_for(soap *ctx, int socket, int flags, timeval *limit, int wake)
         ctx->errno_value = EBADF;
         return -1;
     }
-    wait_set readable((flags & WAIT_RECV) != 0, socket);
-    readable.add(wake);
-    wait_set writable((flags & WAIT_SEND) != 0, socket);
-    wait_set exceptional((flags & WAIT_ERROR) != 0, socket);
-    const int count =
-        select(std::max(socket, wake) + 1, readable.get(), writable.get(), exceptional.get(), limit);
-    if (count < 0)
+    const int ready = ctx->wait_with_poll != 0 ? poll_ready(socket, flags, limit_us, wake)
+                                               : select_ready(socket, flags, limit_us, wake);
+    if (ready < 0)
         tcp_save_errno(ctx);
-    if (count <= 0)
-        return count;
-    if (readable.has(wake)) {
+    if (ready <= 0)
+        return ready;
+    if ((ready & WOKEN) != 0) {
         call_wake_clear(ctx);
         ctx->errno_value = EINTR;
         return -1;
     }
-    return (readable.ready() ? WAIT_RECV : 0) | (writable.ready() ? WAIT_SEND : 0) |
-           (exceptional.ready() ? WAIT_ERROR : 0);
+    return ready;
 }
 
 int time_is_up(soap *ctx)
@@ -102,9 +142,14 @@ int time_is_up(soap *ctx)
 
 } // namespace
 
+bool tcp_too_large_to_wait(const soap *ctx, int descriptor)
+{
+    return descriptor >= FD_SETSIZE && ctx->wait_with_poll == 0;
+}
+
 int tcp_wait(soap *ctx, int socket, int flags, int timeout)
 {
-    timeval limit = as_timeval(microseconds_of(timeout));
+    const std::int64_t limit = microseconds_of(timeout);
     return wait_for(ctx, socket, flags, &limit, -1);
 }
 
@@ -151,8 +196,7 @@ int tcp_wait_until(soap *ctx, int socket, int flags, tcp_deadline deadline)
         if (tcp_call_is_over(ctx))
             return time_is_up(ctx);
         const std::int64_t left = deadline == 0 ? 0 : std::max<std::int64_t>(deadline - tcp_clock(), 0);
-        timeval limit = as_timeval(left);
-        const int ready = wait_for(ctx, socket, flags, deadline == 0 ? nullptr : &limit, call_wake_fd(ctx));
+        const int ready = wait_for(ctx, socket, flags, deadline == 0 ? nullptr : &left, call_wake_fd(ctx));
         if (ready == 0)
             tcp_call_is_over(ctx); // whose time was it?
         if (ready >= 0 || ctx->errno_value != EINTR)

@@ -33,5 +33,8 @@ void tcp_call_begin(soap *ctx);
 // doesn't ask if the call is over.
 int tcp_wait_until(soap *ctx, int socket, int flags, tcp_deadline deadline);
 
+// True if waits of this context can't take the descriptor: it doesn't fit a set of select.
+bool tcp_too_large_to_wait(const soap *ctx, int descriptor);
+
 // Text of a fault for a step whose time is up: constant, or in message_text.
 const char *tcp_timeout_text(soap *ctx);

@@ -2,9 +2,11 @@
 //
 // Here: integers of all widths, float and double. Elsewhere: numbers as elements (simple_element.cpp).
 //
-// Always: results are those of the C library in the "C" locale, whatever locale the host has set. The parsers
+// Always: results are those of the C library in the "C" locale, whatever locale or -ffast-math the host has. The parsers
 // store a value also when they refuse the text: the nearest one in the long type, cut to the target's width.
 
+#include <bit>
+#include <cfenv>
 #include <cfloat>
 #include <charconv>
 #include <clocale>
@@ -124,6 +126,47 @@ bool parse_by_library(const char *text, double *value)
     return *end == '\0' || std::sscanf(text, "%lg", value) == 1;
 }
 
+// The arithmetic of IEEE 754 in this thread, while it lives: a host made with -ffast-math takes numbers below the
+// normal ones for 0.
+class exact_arithmetic_scope {
+public:
+    exact_arithmetic_scope()
+    {
+        std::fegetenv(&before);
+        std::fesetenv(FE_DFL_ENV);
+    }
+    exact_arithmetic_scope(const exact_arithmetic_scope &) = delete;
+    exact_arithmetic_scope &operator=(const exact_arithmetic_scope &) = delete;
+    ~exact_arithmetic_scope() { std::fesetenv(&before); }
+
+private:
+    std::fenv_t before;
+};
+
+// From one floating type to the other where the float is below its normal numbers. Volatile: the compiler may
+// move a conversion over the change of arithmetic, but neither reading nor writing.
+template <class To, class From> To convert_exactly(From value)
+{
+    const exact_arithmetic_scope scope;
+    const volatile From from = value;
+    const volatile To to = static_cast<To>(from);
+    return to;
+}
+
+float to_float(double value)
+{
+    return value == 0 || std::fabs(value) >= FLT_MIN ? static_cast<float>(value)
+                                                     : convert_exactly<float>(value);
+}
+
+double to_double(float value)
+{
+    const std::uint32_t magnitude = std::bit_cast<std::uint32_t>(value) & 0x7FFFFFFF;
+    const std::uint32_t normal = std::bit_cast<std::uint32_t>(FLT_MIN);
+    return magnitude == 0 || magnitude >= normal ? static_cast<double>(value)
+                                                 : convert_exactly<double>(value);
+}
+
 template <class Value> void store_number(double value, Value *target)
 {
     if constexpr (std::is_same_v<Value, float>) {
@@ -132,8 +175,10 @@ template <class Value> void store_number(double value, Value *target)
         constexpr double overflow_from = 0x1.ffffffp127;
         if (std::isfinite(value) && std::fabs(value) >= overflow_from)
             value = std::copysign(HUGE_VAL, value);
+        *target = to_float(value);
+    } else {
+        *target = value;
     }
-    *target = static_cast<Value>(value);
 }
 
 template <class Value> int parse_floating(soap *ctx, const char *text, Value *target)
@@ -270,7 +315,7 @@ const char *soap_ulong_text(soap *ctx, std::uint64_t value)
 
 const char *soap_float_text(soap *ctx, float value)
 {
-    return floating_text(ctx, static_cast<double>(value),
+    return floating_text(ctx, to_double(value),
                          ctx->float_format != nullptr ? ctx->float_format : FLOAT_FORMAT);
 }
 

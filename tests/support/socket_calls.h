@@ -7,9 +7,11 @@
 // Names that end in ".test" resolve to the loopback: "two.test" to 127.0.0.9 and then 127.0.0.1, "six.test"
 // to ::1 and then 127.0.0.1, as "localhost" does on most machines, all else to 127.0.0.1.
 //
-// The monotonic clock may be set ahead of the system's, so that a test of time limits takes no time.
+// The monotonic clock may be set ahead of the system's, so that a test of time limits takes no time; the wall clock
+// may be set back.
 #pragma once
 
+#include <atomic>
 #include <cerrno>
 #include <climits>
 #include <cstdarg>
@@ -21,6 +23,7 @@
 #include <string_view>
 #include <sys/select.h>
 #include <sys/socket.h>
+#include <sys/time.h>
 
 namespace socket_calls {
 
@@ -47,8 +50,10 @@ struct interruption {
 inline thread_local call_counts counts{};
 inline thread_local failure fail_connect{}, fail_sendto{}, fail_recv{};
 inline thread_local interruption interrupt_select{};
-inline thread_local long clock_ahead_us = 0,         // what CLOCK_MONOTONIC shows more than the system's does
-    call_takes_us = 0;                               // what each call of select and recv adds to it
+inline thread_local long clock_ahead_us = 0, // what CLOCK_MONOTONIC shows more than the system's does
+    call_takes_us = 0;                       // what each call of select and recv adds to it
+inline std::atomic<long> set_back_s =
+    0; // what the wall clock shows less than the system's does, for all threads
 inline thread_local bool drips = false, dry = false; // recv gives one byte, and nothing the next time
 
 // Takes all orders back.
@@ -152,6 +157,8 @@ int clock_gettime(clockid_t clock, timespec *time)
 {
     static const auto real = socket_calls::next<decltype(&clock_gettime)>("clock_gettime");
     const int result = real(clock, time);
+    if (clock == CLOCK_REALTIME)
+        time->tv_sec -= socket_calls::set_back_s;
     if (clock != CLOCK_MONOTONIC)
         return result;
     ++socket_calls::counts.clock;
@@ -159,6 +166,23 @@ int clock_gettime(clockid_t clock, timespec *time)
     time->tv_nsec += socket_calls::clock_ahead_us % 1000000 * 1000;
     time->tv_sec += time->tv_nsec / 1000000000;
     time->tv_nsec %= 1000000000;
+    return result;
+}
+
+std::time_t time(std::time_t *seconds) noexcept
+{
+    timespec now{};
+    clock_gettime(CLOCK_REALTIME, &now);
+    if (seconds != nullptr)
+        *seconds = now.tv_sec;
+    return now.tv_sec;
+}
+
+int gettimeofday(timeval *__restrict now, void *__restrict) noexcept
+{
+    timespec time{};
+    const int result = clock_gettime(CLOCK_REALTIME, &time);
+    *now = {time.tv_sec, static_cast<suseconds_t>(time.tv_nsec / 1000)};
     return result;
 }
 
