@@ -9,9 +9,8 @@
 // reported by soap_call_report, and soap_cancel ends one from outside (soap_report.h). Waits use select, so
 // descriptors of 1024 and over are refused with SOAP_FD_EXCEEDED, unless soap::wait_with_poll is set. Sockets
 // that the library makes are closed on exec, and writing to one whose peer is gone raises no SIGPIPE.
-// SOAP_TCP_ERROR comes with a fault record:
-// its text is that of tcp_error_text, "Timeout" or the resolver's, its detail says what failed. Descriptors
-// are closed through on_close_socket, exactly once.
+// SOAP_TCP_ERROR comes with a fault record: its text is that of tcp_error_text, "Timeout" or the resolver's,
+// its detail says what failed. Descriptors are closed through on_close_socket, exactly once.
 #pragma once
 
 #include <zuv_client_pro/soap.h>
