@@ -20,7 +20,7 @@ TEST(dime_out, is_one_record_for_the_message_and_one_for_each_attachment)
     memory_wire wire(0, SENDING);
     char *options = soap_dime_options_make(&wire, 7, "opt");
     options[5] = '\0'; // the length says where they end
-    ASSERT_EQ(soap_dime_attach(&wire, const_cast<char *>("host's"), 6, nullptr, "own", 0, nullptr), 0);
+    ASSERT_EQ(soap_dime_attach(&wire, const_cast<char *>("host's"), 6, nullptr, "own", 0, "o"), 0);
     ASSERT_EQ(
         send(wire, {make_value(first, nullptr, "image/png"), make_value(second, "cid:two", nullptr, options),
                     make_value(first, nullptr, nullptr)}),
@@ -35,7 +35,8 @@ TEST(dime_out, is_one_record_for_the_message_and_one_for_each_attachment)
     EXPECT_NE(xml.find("<data href=\"cid:two\""), std::string::npos) << xml;
     EXPECT_NE(xml.find("<data>Zmlyc3Q=</data>"), std::string::npos) << xml; // neither id nor type: inline
     EXPECT_EQ(xml.substr(xml.size() - 2), "\r\n");
-    EXPECT_EQ(sent, record(MB, URI, "cid:id0", ENVELOPE_URI, xml) + record(0, MEDIA, "own", "", "host's") +
+    EXPECT_EQ(sent, record(MB, URI, "cid:id0", ENVELOPE_URI, xml) +
+                        record(0, MEDIA, "own", "", "host's", std::string("\0\0\0\1o", 5)) +
                         record(0, MEDIA, "id1", "image/png", first) +
                         record(ME, MEDIA, "two", "", second, std::string("\0\7\0\3o\0t", 7)));
     expect_same_at_every_split(sent,

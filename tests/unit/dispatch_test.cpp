@@ -77,14 +77,15 @@ protected:
         return ctx.sent();
     }
 
-    // Puts the reader after the start tag of an element that declares what `content` needs.
-    void receive(const std::string &content)
+    // Puts the reader after the start tag of an element that declares what `content` needs, and which doesn't end
+    // if the content is cut.
+    void receive(const std::string &content, bool cut = false)
     {
         std::string start = "<all xmlns:SOAP-ENC=\"http://schemas.xmlsoap.org/soap/encoding/\"";
         for (const soap_namespace *row = ctx.namespaces; row->prefix; ++row)
             if (std::strncmp(row->prefix, "SOAP-ENC", 8) != 0)
                 start += std::string(" xmlns:") + row->prefix + "=\"" + row->uri + "\"";
-        ctx.receive(start + ">" + content + "</all>");
+        ctx.receive(start + ">" + content + (cut ? "" : "</all>"));
         soap_reset_call(&ctx);
         ctx.input_mode = MODE_BARE_XML;
         soap_receive_begin(&ctx);
@@ -168,6 +169,28 @@ TEST_F(dispatch, an_absent_item_writes_nothing_and_a_nil_record_is_null)
     ASSERT_NE(nullptr, code) << ctx.error;
     EXPECT_EQ(nullptr, code->Subcode);
     EXPECT_STREQ("SOAP-ENV:Sender", code->Value);
+}
+
+TEST_F(dispatch, what_is_cut_short_or_finds_no_memory_is_refused)
+{
+    for_each_type([&](int type, const std::string &text) {
+        for (std::size_t length = 0; length < text.size(); ++length) {
+            receive(text.substr(0, length), true);
+            EXPECT_EQ(nullptr, read_by_type(&ctx, type)) << text.substr(0, length);
+            EXPECT_NE(0, ctx.error);
+            forget();
+        }
+        void *back = nullptr;
+        receive(text);
+        failing_malloc::at_each_allocation(
+            failing_malloc::refuse::one, [&] { back = read_by_type(&ctx, type); },
+            [&](bool refused) {
+                EXPECT_TRUE(back != nullptr || (refused && ctx.error == SOAP_OUT_OF_MEMORY)) << ctx.error;
+                forget();
+                receive(text);
+            });
+        forget();
+    });
 }
 
 TEST_F(dispatch, arrays_are_made_of_whatever_may_be_in_one)

@@ -53,6 +53,7 @@ TEST(pointer_table, finds_arrays_by_content_and_sizes_wherever_their_holders_are
     EXPECT_EQ(mark(alike), 2);
     EXPECT_EQ(mark(other_size), 0);
     EXPECT_EQ(mark(empty), 1);
+    EXPECT_EQ(soap_array_pointer_find(&ctx, &alike, &alike, 2, 10, nullptr), 1);
     EXPECT_EQ(id_of(alike, -1), 1);
     EXPECT_EQ(id_of(other_size, -1), 2);
     EXPECT_EQ(id_of(other_size, 7), 7) << "the id that is asked for";

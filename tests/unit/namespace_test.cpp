@@ -42,6 +42,7 @@ TEST(namespaces, the_copy_is_made_once_and_sets_the_version)
     EXPECT_EQ(ctx.soap_version, 0);
 
     ASSERT_EQ(declare(&ctx, "e", SOAP12_ENVELOPE), 0);
+    ASSERT_EQ(soap_set_namespaces(&other, table()), 0);
     ASSERT_EQ(soap_set_namespaces(&other, ctx.local_namespaces), 0);
     soap_namespace_table_drop(&ctx);
     EXPECT_STREQ(other.local_namespaces[0].received, SOAP12_ENVELOPE) << "what was received goes along";

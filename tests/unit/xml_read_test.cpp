@@ -496,6 +496,7 @@ constexpr const char *ROOT_HEADS[] = {
     " xmlns:p=\"urn:one\" xmlns:a_name_of_more_than_eight=\"urn:two\" xmlns:\xC3\xA9=\"urn:\xC3\xA9\"",
     " xmlns:e=\"http://schemas.xmlsoap.org/soap/envelope/\" xmlns:p=\"http://www.w3.org/1/soap-encoding\"",
     " xmlns:e=\"http://www.w3.org/2003/05/soap-envelope\" xmlns:p=\"urn:one\"",
+    " xmlns:e=\"http://www.w3.org/2003/05/soap-envelope\"/",
     " xmlns:e=\"http://www.w3.org/1/soap-envelope\" xmlns:p=\"http://www.w3.org/2003/05/soap-envelope\"",
 };
 
@@ -577,6 +578,22 @@ TEST(xml_read, the_header_callback_judges_a_header_that_was_read)
         EXPECT_EQ(soap_envelope_in_begin(in), 0);
         EXPECT_EQ(soap_header_get(in), judged);
     }
+}
+
+TEST(xml_read, every_allocation_may_fail)
+{
+    const std::string document = "<p:a xmlns:p='urn:one' long='" + std::string(2000, 'x') + "&amp;'><p:b>" +
+                                 std::string(600, 'y') + "&lt;</p:b><p:c>\xC3\xA9</p:c></p:a>";
+    const auto make = [&] { return std::make_unique<reception>(document); };
+    expect_out_of_memory_at_each_allocation(6, make, [](reception &in) {
+        char *text = nullptr;
+        char32_t *wide = nullptr;
+        if (begin(in, "one:a") == 0 &&
+            soap_string_element_in(in, "one:b", &text, nullptr, 4, 1, -1, -1) != nullptr &&
+            soap_wide_string_element_in(in, "one:c", &wide, nullptr, 4, 1, -1, -1) != nullptr)
+            soap_element_in_end(in, "one:a");
+        return in.error;
+    });
 }
 
 } // namespace
