@@ -31,9 +31,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size
         return 0;
     memory_wire wire(data[0] & 1 ? MODE_KEEP_ALIVE : 0, data[0] & 2 ? MODE_CHUNKED : MODE_BUFFERED);
     wire.keep_alive = data[0] & 1;
-    wire.receive(std::string(reinterpret_cast<const char *>(data + 1), size - 1));
     const std::size_t piece = 1U + (data[0] >> 2);
-    wire.piece = [piece](std::size_t) { return piece; };
+    wire.receive(std::string(reinterpret_cast<const char *>(data + 1), size - 1), piece, piece);
     soap_reset_call(&wire);
     if (soap_receive_begin(&wire) == 0)
         soap_receive_finish(&wire);

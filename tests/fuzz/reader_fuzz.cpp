@@ -25,8 +25,7 @@ outcome read_document(const std::string &document, std::uint32_t mode, std::size
 {
     memory_wire wire(mode | MODE_BARE_XML, mode);
     soap_set_namespaces(&wire, soap_program_namespaces);
-    wire.receive(document);
-    wire.piece = [piece](std::size_t) { return piece; };
+    wire.receive(document, piece, piece);
     outcome result{0, 0, false};
     soap_reset_call(&wire);
     if (soap_receive_begin(&wire) == 0) {

@@ -65,25 +65,29 @@ std::vector<contract_case> read_cases(const std::filesystem::path &path)
     std::vector<contract_case> cases = {{path.stem().string(), {}}};
     std::string line;
     for (std::size_t number = 1; std::getline(file, line); ++number) {
-        std::vector<case_section> &sections = cases.back().sections;
         if (!line.starts_with("== ")) {
-            if (!sections.empty())
-                sections.back().text += line + "\n";
+            if (!cases.back().sections.empty())
+                cases.back().sections.back().text += line + "\n";
             continue;
         }
         std::istringstream words(line.substr(3));
         case_section section;
         words >> section.kind >> std::ws;
-        std::getline(words, section.argument);
-        section.line = number;
-        if (section.kind != "case") {
-            sections.push_back(section);
-        } else if (cases.size() == 1 && sections.empty()) {
-            cases.back().name = section.argument;
-        } else {
-            cases.push_back({section.argument, {}});
+        if (section.kind == "case") {
+            cases.emplace_back();
+            std::getline(words, cases.back().name, ':');
+            words >> section.kind >> std::ws;
         }
+        section.line = number;
+        if (section.kind == "schema")
+            words >> section.argument >> std::ws;
+        std::getline(words,
+                     section.kind == "schema" || section.kind == "types" ? section.text : section.argument);
+        section.text += section.text.empty() ? "" : "\n";
+        cases.back().sections.push_back(section);
     }
+    if (cases.front().sections.empty()) // only its remarks come before the first case
+        cases.erase(cases.begin());
     return cases;
 }
 

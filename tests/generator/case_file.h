@@ -1,14 +1,15 @@
 // case_file.h - small contracts in text files, translated for the tests of the generator.
 //
 // A case file holds sections, each opened by a line "== kind argument":
-//   case NAME        in a file of several cases: opens one
+//   case NAME: ...   in a file of several cases: opens one; its first section follows in the same line
 //   types            rows of type_ids.txt; those of BASE_TYPE_IDS follow them
-//   schema PREFIX    what stands inside xsd:schema in PREFIX.xsd, whose first line is the section's
+//   schema PREFIX    what is inside xsd:schema in PREFIX.xsd, whose first line is the section's
 //   members XML      schema t with the one class Thing, id 20, of these elements, all in its first line
-//   file NAME        any other input file, as it stands
-//   expect PATH      lines that stand together in this output; "model": in the dump of the model
+//   file NAME        any other input file, as it is
+//   expect PATH      lines that come together in this output; "model": in the dump of the model
 //   error MESSAGE    what refuses the contract
-// Lines before the first section say what the case is about.
+// A schema or types of one line are in the line of their section. Lines before the first section say what the
+// case is about.
 #pragma once
 
 #include <filesystem>

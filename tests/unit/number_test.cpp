@@ -59,13 +59,10 @@ TEST_F(numbers, take_the_whole_text_within_their_range)
     EXPECT_EQ(parsed(soap_ulong_parse, "-2"), "0 18446744073709551614");
     EXPECT_EQ(parsed(soap_ulong64_parse, "5 6"), "0 5");
     EXPECT_EQ(parsed(soap_ulong64_parse, ""), "4 77");
-}
-
-TEST_F(numbers, a_failed_look_up_stands_for_a_missing_attribute)
-{
-    std::int32_t value = 3;
     ctx->error = SOAP_REQUIRED;
-    EXPECT_EQ(soap_int_parse(ctx.get(), nullptr, &value), SOAP_REQUIRED);
+    std::int32_t value = 3;
+    EXPECT_EQ(soap_int_parse(ctx.get(), nullptr, &value), SOAP_REQUIRED)
+        << "a failed look-up of an attribute";
     EXPECT_EQ(value, 3);
     EXPECT_EQ(soap_int_parse(ctx.get(), "4", &value), 0) << "an old error is not the parser's";
 }

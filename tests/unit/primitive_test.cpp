@@ -104,6 +104,37 @@ TEST_F(elements, values_come_with_their_end_tag_and_errors_without)
     EXPECT_EQ(soap_int_in(&ctx, "w", &value, "xsd:int", 1), &value);
 }
 
+// Texts beyond the bounds are refused by the parsers: number_test.cpp.
+template <class T>
+void expect_bounds(int (*write)(soap *, const char *, int, const T *, const char *, int),
+                   T *(*read)(soap *, const char *, T *, const char *, int))
+{
+    using bounds = std::numeric_limits<T>;
+    T got = T{1};
+    for (const T value : {bounds::lowest(), bounds::max(), bounds::min(), T{0}}) {
+        memory_wire out, in;
+        out.namespace_state = 1;
+        ASSERT_EQ(write(&out, "v", -1, &value, "", 3), 0);
+        in.receive(out.sent());
+        ASSERT_NE(read(&in, "v", &got, nullptr, 3), nullptr) << out.sent();
+        EXPECT_EQ(got, value) << out.sent();
+    }
+}
+
+TEST(numbers, are_written_and_read_up_to_their_bounds)
+{
+    expect_bounds(soap_byte_out, soap_byte_in);
+    expect_bounds(soap_short_out, soap_short_in);
+    expect_bounds(soap_int_out, soap_int_in);
+    expect_bounds(soap_long_out, soap_long_in);
+    expect_bounds(soap_ubyte_out, soap_ubyte_in);
+    expect_bounds(soap_ushort_out, soap_ushort_in);
+    expect_bounds(soap_uint_out, soap_uint_in);
+    expect_bounds(soap_ulong_out, soap_ulong_in);
+    expect_bounds(soap_float_out, soap_float_in);
+    expect_bounds(soap_double_out, soap_double_in);
+}
+
 TEST_F(elements, references_are_filled_at_the_end)
 {
     receive("<n href=\"#n\"/><d href=\"#d\"></d><n id=\"n\">7</n><d id=\"d\">2.5</d><n href=\"#d\"/>");
@@ -278,29 +309,53 @@ TEST_F(elements, offsets_count_from_the_start_of_the_array)
         EXPECT_EQ(soap_array_dims_offset_parse(row.text, row.offset_text, &offset), row.rest) << row.text;
         EXPECT_EQ(offset, row.offset) << row.text;
     }
-    const int sizes[] = {4, 5, 6};
+    const struct {
+        const char *text;
+        std::vector<int> sizes;
+        int offset;
+    } alone[] = {
+        {"[1,2,3]", {4, 5, 6}, (1 * 5 + 2) * 6 + 3},
+        {"", {4, 5, 6}, 0},
+        {"[-1]", {4}, -1},
+        {"[2147483647]", {1}, INT_MAX},
+        {"[2147483648]", {1}, -1},
+        {"[65535,32767]", {0, 1 << 15}, INT_MAX},
+        {"[65535,32768]", {0, 1 << 15}, -1},
+        {"[999999,999999,999999]", {1000000, 1000000, 1000000}, -1},
+    };
     int offsets[3] = {};
-    EXPECT_EQ(soap_array_offset_parse("[1,2,3]", sizes, offsets, 3), (1 * 5 + 2) * 6 + 3);
+    for (const auto &row : alone)
+        for (int *target : {offsets, static_cast<int *>(nullptr)})
+            EXPECT_EQ(soap_array_offset_parse(row.text, row.sizes.data(), target,
+                                              static_cast<int>(row.sizes.size())),
+                      row.offset)
+                << row.text;
+    soap_array_offset_parse("[1,2,3]", alone[0].sizes.data(), offsets, 3);
     EXPECT_EQ(offsets[2], 3);
-    EXPECT_EQ(soap_array_offset_parse("", sizes, nullptr, 3), 0);
-    EXPECT_EQ(soap_array_offset_parse("[-1]", sizes, nullptr, 1), -1);
-    const int huge[] = {1000000, 1000000, 1000000};
-    EXPECT_EQ(soap_array_offset_parse("[999999,999999,999999]", huge, nullptr, 3), -1);
 }
 
 TEST_F(elements, positions_are_read_up_to_their_limit)
 {
-    int numbers[SOAP_POSITIONS_MAX] = {};
-    EXPECT_EQ(soap_position_parse("[3,-4]", numbers), 2);
-    EXPECT_EQ(numbers[1], -4);
-    EXPECT_EQ(soap_position_parse("3", numbers), 0);
-    EXPECT_EQ(soap_position_parse("[]", numbers), 0);
-    EXPECT_EQ(soap_position_parse("[99999999999]", numbers), 0);
     std::string many = "[0";
     for (int i = 1; i < 40; i++)
         many += "," + std::to_string(i);
-    EXPECT_EQ(soap_position_parse(many.c_str(), numbers), 16);
-    EXPECT_EQ(numbers[15], 15);
+    const struct {
+        std::string text;
+        int count, last;
+    } cases[] = {
+        {"[3,-4]", 2, -4},
+        {"3", 0, 0},
+        {"[]", 0, 0},
+        {"[99999999999]", 0, 0},
+        {"[2147483647,-2147483648,2147483648]", 2, INT_MIN},
+        {"[2147483647]", 1, INT_MAX},
+        {many, SOAP_POSITIONS_MAX, SOAP_POSITIONS_MAX - 1},
+    };
+    for (const auto &row : cases) {
+        int numbers[SOAP_POSITIONS_MAX] = {};
+        EXPECT_EQ(soap_position_parse(row.text.c_str(), numbers), row.count) << row.text;
+        EXPECT_EQ(row.count == 0 ? 0 : numbers[row.count - 1], row.last) << row.text;
+    }
 }
 
 } // namespace

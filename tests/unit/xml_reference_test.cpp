@@ -1,9 +1,7 @@
 // xml_reference_test.cpp - the reader against another parser: both must see the same document.
 //
-// Documents come from a small random grammar with fixed seeds, and from the XML files that the system has,
-// most of them style sheets of a text processor. Texts, attribute values and the order of tags are compared.
-// Left out of account: line ends and white space in attributes, which the reader keeps as they stand, and
-// entities that a document declares for itself.
+// Documents come from a small random grammar with fixed seeds. Texts, attribute values and the order of tags are
+// compared. Left out of account: white space in attributes, which the reader keeps as it is.
 #include <libxml/xmlreader.h>
 
 #include "support/reader_input.h"
@@ -124,8 +122,6 @@ void compare(const std::string &document, const std::string &expected, std::size
                                     << " piece " << piece;
 }
 
-// ------------------------------------------------------------------------------------------ random documents
-
 class grammar {
 public:
     explicit grammar(unsigned seed) : random_(seed) {}
@@ -201,50 +197,21 @@ private:
 
 TEST(xml_reference, random_documents_read_the_same)
 {
-    for (unsigned seed = 1; seed <= 400; ++seed) {
-        const std::string document = grammar(seed).document();
+    const auto compare_in_pieces = [](const std::string &document, std::size_t first, std::size_t piece) {
         std::string expected;
-        ASSERT_TRUE(reference_events(document, expected)) << seed << ": " << document;
-        SCOPED_TRACE(seed);
+        ASSERT_TRUE(reference_events(document, expected)) << document;
         compare(document, expected, SOAP_BUFFER_SIZE, SOAP_BUFFER_SIZE);
         compare(document, expected, 1, 1);
-        compare(document, expected, seed % 97 + 1, seed % 13 + 2);
+        compare(document, expected, first, piece);
+    };
+    std::string large = "<all>"; // more than the buffer holds
+    for (unsigned seed = 1; seed <= 400; ++seed) {
+        SCOPED_TRACE(seed);
+        const std::string document = grammar(seed).document();
+        compare_in_pieces(document, seed % 97 + 1, seed % 13 + 2);
+        large += document.substr(document.starts_with("<?xml ") ? document.find("?>") + 2 : 0);
     }
-}
-
-// ------------------------------------------------------------------------------------------ files
-
-bool comparable(const std::string &document)
-{
-    return document.find("<!ENTITY") == std::string::npos && document.find('\r') == std::string::npos &&
-           document.find("encoding=\"UTF-16") == std::string::npos && document.size() < 5000000;
-}
-
-TEST(xml_reference, files_of_the_system_read_the_same)
-{
-    int compared = 0;
-    for (const char *place : {"/usr/share/xml", "/usr/share/mime/packages", "/usr/share/metainfo"}) {
-        std::error_code none;
-        for (const auto &entry : std::filesystem::recursive_directory_iterator(place, none)) {
-            const std::string kind = entry.path().extension();
-            if ((kind != ".xml" && kind != ".xsl") || !entry.is_regular_file(none))
-                continue;
-            std::ostringstream content;
-            content << std::ifstream(entry.path(), std::ios::binary).rdbuf();
-            const std::string document = content.str();
-            std::string expected;
-            if (!comparable(document) || !reference_events(document, expected))
-                continue;
-            SCOPED_TRACE(entry.path());
-            compare(document, expected, SOAP_BUFFER_SIZE, SOAP_BUFFER_SIZE);
-            compare(document, expected, 1000, 1447);
-            ++compared;
-        }
-    }
-    std::printf("%d files compared\n", compared);
-    if (!std::filesystem::exists("/usr/share/xml/docbook"))
-        GTEST_SKIP() << "the package docbook-xsl, which brings most of the files, is not installed";
-    EXPECT_GT(compared, 300);
+    compare_in_pieces(large + "</all>", 1000, 1447);
 }
 
 } // namespace

@@ -1,4 +1,4 @@
-// Start tags, text, arrays and the envelope as they stand on the wire, in every output mode.
+// Start tags, text, arrays and the envelope as they are on the wire, in every output mode.
 #include <unistd.h>
 
 #include "support/writer_fixture.h"
@@ -25,12 +25,19 @@ std::string document(std::uint32_t mode, const calls &write, std::int16_t versio
     return written(w, start::document, write);
 }
 
-void element(soap *ctx, const char *tag, const calls &content = {})
+void element(soap *ctx, const char *tag, const calls &content = {}, int id = 0, const char *type = nullptr)
 {
-    EXPECT_EQ(soap_element_out_begin(ctx, tag, 0, nullptr), 0);
+    EXPECT_EQ(soap_element_out_begin(ctx, tag, id, type), 0);
     if (content)
         content(ctx);
     EXPECT_EQ(soap_element_out_end(ctx, tag), 0);
+}
+
+// Gives the next start tag attributes, in this order.
+void set_attributes(soap *ctx, std::initializer_list<std::pair<const char *, const char *>> attributes)
+{
+    for (const auto &[name, value] : attributes)
+        EXPECT_EQ(soap_attr_set(ctx, name, value, 1), 0);
 }
 
 // What `xmllint` makes of a document; empty if it finds fault with it.
@@ -52,8 +59,7 @@ std::string canonical_form(const std::string &text, const char *form)
 
 } // namespace
 
-// ---------------------------------------------------------------------------------------------
-// Text.
+// --- Text.
 
 // The table of escapes once more, a byte at a time.
 static std::string escaped(const std::string &text, int flag, std::uint32_t mode)
@@ -112,38 +118,28 @@ TEST(xml_write, escapes_follow_place_and_mode)
 
 TEST(xml_write, an_escape_is_found_at_every_place_of_every_length)
 {
-    for (const std::uint32_t mode : {0U, MODE_UTF_STRINGS, MODE_CANONICAL}) {
-        writer w(mode);
+    for (const std::uint32_t mode : {0U, MODE_UTF_STRINGS, MODE_CANONICAL})
         for (const int flag : {0, 1, 2}) {
-            for (std::size_t length = 1; length <= 50; ++length) {
+            writer w(mode);
+            std::string long_text; // passes the end of the buffer
+            const auto bytes_of = [&](const std::string &text) {
+                return w.pass(MODE_BUFFERED, start::inside,
+                              [&](soap *ctx) { soap_text_write_n(ctx, text.data(), text.size(), flag); });
+            };
+            for (std::size_t length = 1; length <= 50; ++length)
                 for (std::size_t at = 0; at < length; ++at) {
                     std::string text(length, 'x');
                     text[length - 1 - at / 2] = '>';
                     text[at] = "&<>\n\r\t\"\xE9"[(at + length) % 8];
                     if (text[at] == '\xE9' && (flag == 2 || (mode & MODE_UTF_STRINGS) != 0))
                         text.replace(at, 1, "\xE2\x82\xAC");
-                    const std::string bytes = w.pass(MODE_BUFFERED, start::inside, [&](soap *ctx) {
-                        soap_text_write(ctx, text.c_str(), flag);
-                    });
-                    ASSERT_EQ(bytes, escaped(text, flag, mode)) << flag << ' ' << length << ' ' << at;
+                    ASSERT_EQ(bytes_of(text), escaped(text, flag, mode))
+                        << flag << ' ' << length << ' ' << at;
+                    long_text += text;
                 }
-            }
+            long_text += long_text + long_text;
+            EXPECT_TRUE(bytes_of(long_text) == escaped(long_text, flag, mode)) << flag;
         }
-    }
-}
-
-TEST(xml_write, long_text_of_any_bytes_is_written_whole)
-{
-    std::mt19937 random(7);
-    for (const unsigned spread : {256U, 40U, 3U}) {
-        std::string text(200000, ' ');
-        for (char &c : text) {
-            c = static_cast<char>(random() % 5 ? 'a' : 1 + random() % (spread - 1));
-            c = static_cast<unsigned char>(c) < 8 ? '\t' : static_cast<unsigned char>(c) < ' ' ? '\n' : c;
-        }
-        EXPECT_EQ(inside(0, [&](soap *ctx) { soap_text_write_n(ctx, text.data(), text.size(), 0); }),
-                  escaped(text, 0, 0));
-    }
 }
 
 static int write_by(int way, soap *ctx, const std::string &text)
@@ -165,89 +161,67 @@ static int write_by(int way, soap *ctx, const std::string &text)
 
 TEST(xml_write, what_xml_cannot_carry_is_refused)
 {
-    static const struct {
-        const char *bytes;
-        bool latin1, utf8; // refused in strings of that kind
-    } cases[] = {
-        {"\t\n\r ~\x7F", false, false},
-        {"\x01", true, true},
-        {"\x08", true, true},
-        {"\x0B", true, true},
-        {"\x1F", true, true},
-        {"\xC2\x80\xDF\xBF\xE0\xA0\x80\xED\x9F\xBF\xEE\x80\x80\xEF\xBF\xBD", false, false},
-        {"\xF0\x90\x80\x80\xF4\x8F\xBF\xBF", false, false},
-        {"\x80", false, true},
-        {"\xC3", false, true},
-        {"\xC1\xBF", false, true},
-        {"\xE0\x9F\xBF", false, true},
-        {"\xED\xA0\x80", false, true},
-        {"\xEF\xBF\xBE", false, true},
-        {"\xF0\x8F\xBF\xBF", false, true},
-        {"\xF4\x90\x80\x80", false, true},
-        {"\xF5\x80\x80\x80", false, true},
-        {"\xE2\x82\xE2", false, true},
-        {"\xC3\xA9\xA9", false, true},
+    constexpr int NONE = 0, UTF8 = 1, ALL = 2; // strings in which it is refused
+    static const std::pair<int, std::vector<const char *>> cases[] = {
+        {NONE,
+         {"\t\n\r ~\x7F", "\xC2\x80\xDF\xBF\xE0\xA0\x80\xED\x9F\xBF\xEE\x80\x80\xEF\xBF\xBD",
+          "\xF0\x90\x80\x80\xF4\x8F\xBF\xBF"}},
+        {UTF8,
+         {"\x80", "\xC3", "\xC1\xBF", "\xE0\x9F\xBF", "\xED\xA0\x80", "\xEF\xBF\xBE", "\xF0\x8F\xBF\xBF",
+          "\xF4\x90\x80\x80", "\xF5\x80\x80\x80", "\xE2\x82\xE2", "\xC3\xA9\xA9"}},
+        {ALL, {"\x01", "\x08", "\x0B", "\x1F"}},
     };
     for (const std::uint32_t mode : {0U, MODE_UTF_STRINGS}) {
         writer w(mode);
-        for (const auto &c : cases)
-            for (int way = 0; way < 5; ++way)
-                for (const int before : {0, 3, 15, 700}) {
-                    const bool is_utf8 = way > 2 || mode != 0;
-                    std::string text;
-                    for (int i = 0; i < before; ++i)
-                        text += is_utf8 && i % 5 != 0 ? "\xC3\xA9" : "x";
-                    text += c.bytes;
-                    w.ctx->error = 0;
-                    w.pass(MODE_BUFFERED | MODE_COUNTING, start::inside, [&](soap *ctx) {
-                        EXPECT_EQ(write_by(way, ctx, text + "tail"),
-                                  (is_utf8 ? c.utf8 : c.latin1) ? SOAP_UTF_ERROR : 0)
-                            << testing::PrintToString(c.bytes) << " by " << way << " after " << before;
-                    });
-                }
+        for (const auto &[refused_in, texts] : cases)
+            for (const std::string bytes : texts)
+                for (int way = 0; way < 5; ++way)
+                    for (const int before : {0, 3, 15, 700}) {
+                        const bool is_utf8 = way > 2 || mode != 0;
+                        std::string text;
+                        for (int i = 0; i < before; ++i)
+                            text += is_utf8 && i % 5 != 0 ? "\xC3\xA9" : "x";
+                        w.ctx->error = 0;
+                        w.pass(MODE_BUFFERED | MODE_COUNTING, start::inside, [&](soap *ctx) {
+                            EXPECT_EQ(write_by(way, ctx, text + bytes + "tail"),
+                                      refused_in == ALL || (is_utf8 && refused_in == UTF8) ? SOAP_UTF_ERROR
+                                                                                           : 0)
+                                << testing::PrintToString(bytes) << " by " << way << " after " << before;
+                        });
+                    }
     }
+    const std::u32string good = {9, 0x7F, 0x80, 0xD7FF, 0xE000, 0xFFFD, 0x10000, 0x10FFFF},
+                         refused = {1, 0x1F, 0xD800, 0xDFFF, 0xFFFE, 0xFFFF, 0x110000, 0x7FFFFFFF};
     writer w;
-    for (const char32_t code : std::u32string({9, 0x7F, 0x80, 0xD7FF, 0xE000, 0xFFFD, 0x10000, 0x10FFFF, 1,
-                                               0x1F, 0xD800, 0xDFFF, 0xFFFE, 0xFFFF, 0x110000, 0x7FFFFFFF})) {
-        char32_t text[] = {U'a', code, 0}, *place = text;
-        const bool refused = code == 1 || code == 0x1F || code == 0xFFFE || code == 0xFFFF ||
-                             code > 0x10FFFF || (code >= 0xD800 && code < 0xE000);
+    for (const char32_t code : good + refused)
         w.pass(MODE_BUFFERED | MODE_COUNTING, start::inside, [&](soap *ctx) {
-            EXPECT_EQ(soap_wide_text_write(ctx, text, 0), refused ? SOAP_UTF_ERROR : 0)
-                << static_cast<std::uint32_t>(code);
-            EXPECT_EQ(soap_wide_literal_write(ctx, "-", &place, nullptr), refused ? SOAP_UTF_ERROR : 0)
-                << static_cast<std::uint32_t>(code);
+            char32_t text[] = {U'a', code, 0}, *place = text;
+            const int expected = good.find(code) == good.npos ? SOAP_UTF_ERROR : 0;
+            EXPECT_EQ(soap_wide_text_write(ctx, text, 0), expected) << static_cast<std::uint32_t>(code);
+            EXPECT_EQ(soap_wide_literal_write(ctx, "-", &place, nullptr), expected);
             ctx->error = 0;
         });
-    }
 }
 
-TEST(xml_write, code_points_take_one_to_six_bytes)
+TEST(xml_write, code_points_take_one_to_six_bytes_and_are_escaped_like_bytes)
 {
-    EXPECT_EQ(inside(0,
-                     [](soap *ctx) {
-                         for (const std::uint32_t code :
-                              {0x09U, 0x7FU, 0x80U, 0x7FFU, 0x800U, 0xFFFFU, 0x10000U, 0x1FFFFFU, 0x200000U,
-                               0x3FFFFFFU, 0x4000000U, 0x7FFFFFFFU})
-                             soap_char_write(ctx, code);
-                     }),
+    const auto write_each = [](soap *ctx) {
+        for (const std::uint32_t code : {0x09U, 0x7FU, 0x80U, 0x7FFU, 0x800U, 0xFFFFU, 0x10000U, 0x1FFFFFU,
+                                         0x200000U, 0x3FFFFFFU, 0x4000000U, 0x7FFFFFFFU})
+            soap_char_write(ctx, code);
+    };
+    EXPECT_EQ(inside(0, write_each),
               "\t\x7F\xC2\x80\xDF\xBF\xE0\xA0\x80\xEF\xBF\xBF\xF0\x90\x80\x80\xF7\xBF\xBF\xBF"
               "\xF8\x88\x80\x80\x80\xFB\xBF\xBF\xBF\xBF\xFC\x84\x80\x80\x80\x80\xFD\xBF\xBF\xBF\xBF\xBF");
+    const std::u32string wide = U"<\n\t\"&>\u00E9\u20AC\U0001F600" + std::u32string(300, U'\u00E9');
+    const std::string text = "<\n\t\"&>\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80" + repeat_text("\xC3\xA9", 300);
+    for (const std::uint32_t mode : {0U, MODE_UTF_STRINGS, MODE_CANONICAL})
+        for (const int flag : {0, 1})
+            EXPECT_EQ(inside(mode, [&](soap *ctx) { soap_wide_text_write(ctx, wide.c_str(), flag); }),
+                      escaped(text, flag, mode | MODE_UTF_STRINGS));
 }
 
-TEST(xml_write, wide_text_is_escaped_like_byte_text)
-{
-    const std::u32string text = U"a<\n\t\"&>\u00E9\u20AC\U0001F600" + std::u32string(300, U'\u00E9');
-    const std::string end = "\xC3\xA9\xE2\x82\xAC\xF0\x9F\x98\x80" + repeat_text("\xC3\xA9", 300);
-    EXPECT_EQ(inside(0, [&](soap *ctx) { soap_wide_text_write(ctx, text.c_str(), 0); }),
-              "a&lt;&#xA;\t\"&amp;&gt;" + end);
-    EXPECT_EQ(inside(MODE_UTF_STRINGS, [&](soap *ctx) { soap_wide_text_write(ctx, text.c_str(), 1); }),
-              "a&lt;&#xA;&#x9;&quot;&amp;>" + end);
-    EXPECT_EQ(inside(MODE_CANONICAL, [&](soap *ctx) { soap_wide_text_write(ctx, U"\n", 0); }), "\n");
-}
-
-// ---------------------------------------------------------------------------------------------
-// Tags.
+// --- Tags.
 
 TEST(xml_write, a_start_tag_carries_what_waits_for_it)
 {
@@ -306,17 +280,6 @@ TEST(xml_write, a_start_tag_carries_what_waits_for_it)
     }
 }
 
-TEST(xml_write, a_dash_stands_for_no_element)
-{
-    const auto write = [](soap *ctx) {
-        element(ctx, "-protocolProfile:set");
-        EXPECT_EQ(soap_element_empty_nil(ctx, "-x"), 0);
-        EXPECT_EQ(ctx->nesting_level, 0U);
-    };
-    EXPECT_EQ(inside(0, write), "");
-    EXPECT_EQ(inside(MODE_INDENT, write), "");
-}
-
 TEST(xml_write, the_root_declares_the_table)
 {
     const std::string rows = " xmlns:SOAP-ENV=\"http://schemas.xmlsoap.org/soap/envelope/\""
@@ -364,10 +327,8 @@ TEST(xml_write, default_namespaces_change_with_the_prefix)
                     element(e, "a:same");
                     element(e, "b:four");
                 });
-                EXPECT_EQ(soap_attr_set(d, "b:own", "1", 1), 0);
-                EXPECT_EQ(soap_attr_set(d, "a:other", "2", 1), 0);
-                EXPECT_EQ(soap_element_out_begin(d, "b:five", 0, "a:type"), 0);
-                EXPECT_EQ(soap_element_out_end(d, "b:five"), 0);
+                set_attributes(d, {{"b:own", "1"}, {"a:other", "2"}});
+                element(d, "b:five", {}, 0, "a:type");
             });
         });
     };
@@ -401,19 +362,16 @@ TEST(xml_write, table_attributes_come_in_reverse_order_of_setting)
 {
     const auto write = [](soap *ctx) {
         for (const char *first : {"1", "2"}) {
-            EXPECT_EQ(soap_attr_set(ctx, "x", first, 1), 0);
-            EXPECT_EQ(soap_attr_set(ctx, "x", "later", 1), 0); // the first value stays
-            EXPECT_EQ(soap_attr_set(ctx, "-no", "z", 1), 0);
-            EXPECT_EQ(soap_attr_set(ctx, "y", nullptr, 1), 0);
+            set_attributes(ctx,
+                           {{"x", first}, {"x", "later"}, {"-no", "z"}, {"y", nullptr}}); // the first x stays
             EXPECT_EQ(soap_attr_set(ctx, "z", "<\xC3\xA9", 2), 0);
-            EXPECT_EQ(soap_element_out_begin(ctx, "a:e", 1, "xsd:int"), 0);
-            EXPECT_EQ(soap_element_out_end(ctx, "a:e"), 0);
+            element(ctx, "a:e", {}, 1, "xsd:int");
         }
-        element(ctx, "a:bare");
+        element(ctx, "a:plain");
     };
     EXPECT_EQ(inside(0, write),
               "<a:e id=\"_1\" xsi:type=\"xsd:int\" z=\"&lt;\xC3\xA9\" y x=\"1\"></a:e>"
-              "<a:e id=\"_1\" xsi:type=\"xsd:int\" z=\"&lt;\xC3\xA9\" y x=\"2\"></a:e><a:bare></a:bare>");
+              "<a:e id=\"_1\" xsi:type=\"xsd:int\" z=\"&lt;\xC3\xA9\" y x=\"2\"></a:e><a:plain></a:plain>");
 }
 
 TEST(xml_write, attribute_records_do_not_grow_with_ever_new_names)
@@ -452,26 +410,27 @@ TEST(xml_write, a_wsu_id_is_shown_to_the_signer)
 TEST(xml_write, null_values_are_left_out_or_nil)
 {
     static const struct {
-        const char *bytes;
+        const char *rule, *bytes;
         int id;
         std::int16_t version, positions;
         std::uint32_t mode;
         const char *attribute;
     } cases[] = {
-        {"", 0, 1, 0, 0, nullptr},
-        {"", -1, 1, 1, 0, nullptr}, // a position makes it nil in SOAP 1.2 alone
-        {"<e xsi:type=\"t\" xsi:nil=\"true\"/>", 0, 1, 0, MODE_NIL, nullptr},
-        {"<e id=\"_3\" xsi:type=\"t\" xsi:nil=\"true\"/>", 3, 1, 0, 0, nullptr},
-        {"<e xsi:type=\"t\" SOAP-ENC:position=\"[4]\" xsi:nil=\"true\"/>", 0, 2, 1, 0, nullptr},
-        {"<e xsi:type=\"t\" k=\"v\"/>", 0, 1, 0, 0, "k"},
+        {"nothing to say", "", 0, 1, 0, 0, nullptr},
+        {"a position is said in SOAP 1.2 alone", "", -1, 1, 1, 0, nullptr},
+        {"mode", "<e xsi:type=\"t\" xsi:nil=\"true\"/>", 0, 1, 0, MODE_NIL, nullptr},
+        {"id", "<e id=\"_3\" xsi:type=\"t\" xsi:nil=\"true\"/>", 3, 1, 0, 0, nullptr},
+        {"position", "<e xsi:type=\"t\" SOAP-ENC:position=\"[4]\" xsi:nil=\"true\"/>", 0, 2, 1, 0, nullptr},
+        {"attribute", "<e xsi:type=\"t\" k=\"v\"/>", 0, 1, 0, 0, "k"},
     };
     for (const auto &c : cases) {
+        SCOPED_TRACE(c.rule);
         const auto write = [&](soap *ctx) {
             ctx->null_flag = 1;
             ctx->position_count = c.positions;
             ctx->positions[0] = 4;
             if (c.attribute)
-                soap_attr_set(ctx, c.attribute, "v", 1);
+                set_attributes(ctx, {{c.attribute, "v"}});
             EXPECT_EQ(soap_element_null(ctx, "e", c.id, "t"), 0);
             EXPECT_EQ(ctx->nesting_level, 0U);
             EXPECT_EQ(ctx->position_count, 0);
@@ -484,6 +443,8 @@ TEST(xml_write, null_values_are_left_out_or_nil)
 TEST(xml_write, empty_elements_carry_one_attribute)
 {
     const auto write = [](soap *ctx) {
+        element(ctx, "-a:none"); // a dash is for no element
+        EXPECT_EQ(soap_element_empty_nil(ctx, "-none"), 0);
         EXPECT_EQ(soap_element_empty_nil(ctx, "a:n"), 0);
         EXPECT_EQ(soap_element_href(ctx, "a:r", 0, 12), 0);
         EXPECT_EQ(soap_element_empty_attr(ctx, "a:x", 2, "href", "cid:<"), 0);
@@ -495,44 +456,41 @@ TEST(xml_write, empty_elements_carry_one_attribute)
 
 TEST(xml_write, open_elements_stop_at_the_limit)
 {
-    static const auto open = [](soap *ctx) { return soap_element_out_begin(ctx, "e", 0, nullptr); };
+    const auto opened = [](std::uint32_t limit, std::uint32_t mode, std::uint32_t io) {
+        writer w(mode);
+        w.ctx->max_depth = limit;
+        int count = 0;
+        w.pass(io, start::inside, [&](soap *ctx) {
+            while (count < 10000 && soap_element_out_begin(ctx, "e", 0, nullptr) == 0)
+                ++count;
+            EXPECT_EQ(ctx->error, limit != 0 ? SOAP_LENGTH : 0);
+        });
+        return count;
+    };
     for (const std::uint32_t mode : {0U, MODE_INDENT})
-        for (const std::uint32_t io : {MODE_BUFFERED, MODE_BUFFERED | MODE_COUNTING}) {
-            writer w(mode);
-            w.ctx->max_depth = 4;
-            w.pass(io, start::inside, [](soap *ctx) {
-                for (int i = 0; i < 4; ++i)
-                    EXPECT_EQ(open(ctx), 0);
-                EXPECT_EQ(open(ctx), SOAP_LENGTH);
-                EXPECT_EQ(ctx->error, SOAP_LENGTH);
-            });
-        }
-    writer endless;
-    endless.ctx->max_depth = 0;
-    endless.pass(MODE_BUFFERED | MODE_COUNTING, start::inside, [](soap *ctx) {
-        for (int i = 0; i < 10000; ++i)
-            ASSERT_EQ(open(ctx), 0);
-    });
+        for (const std::uint32_t io : {MODE_BUFFERED, MODE_BUFFERED | MODE_COUNTING})
+            EXPECT_EQ(opened(4, mode, io), 4);
+    EXPECT_EQ(opened(0, 0, MODE_BUFFERED | MODE_COUNTING), 10000) << "no limit";
 }
 
 TEST(xml_write, short_ways_write_what_the_long_ways_do)
 {
-    constexpr int COUNT = 4000; // past the end of the buffer
-    for (const std::uint32_t mode : {0U, MODE_INDENT, MODE_DEFAULT_NAMESPACE, MODE_CANONICAL}) {
-        const std::string short_way = document(mode, [](soap *ctx) {
-            for (int i = 0; i < COUNT; ++i) {
-                EXPECT_EQ(xml_open_plain(ctx, "a:list", 6), 0);
-                EXPECT_EQ(xml_text_element_plain(ctx, "b:item", 6, "x<y", 3), 0);
-                EXPECT_EQ(xml_close_plain(ctx, "a:list", 6), 0);
-            }
-        });
-        EXPECT_EQ(short_way, document(mode, [](soap *ctx) {
-                      for (int i = 0; i < COUNT; ++i)
-                          element(ctx, "a:list", [](soap *c) {
-                              element(c, "b:item", [](soap *d) { soap_text_write(d, "x<y", 0); });
-                          });
-                  }));
-    }
+    const auto many = [](soap *ctx, const calls &write) {
+        for (int i = 0; i < 4000; ++i) // past the end of the buffer
+            write(ctx);
+    };
+    const auto by_short_ways = [](soap *ctx) {
+        EXPECT_EQ(xml_open_plain(ctx, "a:list", 6), 0);
+        EXPECT_EQ(xml_text_element_plain(ctx, "b:item", 6, "x<y", 3), 0);
+        EXPECT_EQ(xml_close_plain(ctx, "a:list", 6), 0);
+    };
+    const auto by_long_ways = [](soap *ctx) {
+        element(ctx, "a:list",
+                [](soap *c) { element(c, "b:item", [](soap *d) { soap_text_write(d, "x<y", 0); }); });
+    };
+    for (const std::uint32_t mode : {0U, MODE_INDENT, MODE_DEFAULT_NAMESPACE, MODE_CANONICAL})
+        EXPECT_EQ(document(mode, [&](soap *ctx) { many(ctx, by_short_ways); }),
+                  document(mode, [&](soap *ctx) { many(ctx, by_long_ways); }));
 }
 
 TEST(xml_write, a_failed_send_ends_the_call)
@@ -541,12 +499,10 @@ TEST(xml_write, a_failed_send_ends_the_call)
     w.ctx->on_send = [](soap *, const char *, std::size_t) -> int { return SOAP_TCP_ERROR; };
     w.ctx->mode = MODE_DIRECT;
     EXPECT_EQ(soap_element_out_begin(w.ctx.get(), "a:e", 1, "t"), SOAP_TCP_ERROR);
-    EXPECT_EQ(w.ctx->error, SOAP_TCP_ERROR);
     EXPECT_EQ(soap_text_write(w.ctx.get(), "t", 0), SOAP_TCP_ERROR);
 }
 
-// ---------------------------------------------------------------------------------------------
-// Values.
+// --- Values.
 
 TEST(xml_write, arrays_are_typed_by_version)
 {
@@ -597,55 +553,50 @@ TEST(xml_write, the_result_name_is_for_encoded_soap_12)
 
 TEST(xml_write, literal_content_is_not_escaped)
 {
-    const std::string content = "<b>\xC3\xA9&amp;</b>";
-    std::string text = content;
+    std::string text = "<b>\xC3\xA9&amp;</b>";
     std::u32string wide = U"<b>\u00E9&amp;</b>";
-    static const struct {
-        const char *tag, *begin, *end;
-    } cases[] = {
+    static const std::tuple<const char *, std::string, std::string> cases[] = {
+        // tag, before, after
         {"a:x", "<x xmlns=\"urn:a\">", "</x>"},
         {"q:x", "<x xmlns=\"\">", "</x>"},
         {"x", "<x>", "</x>"},
         {"-x", "", ""},
         {nullptr, "", ""},
     };
-    for (const auto &c : cases) {
-        char *place = text.data();
+    for (const auto &[tag, before, after] : cases) {
+        char *place = text.data(), *none = nullptr;
         char32_t *wide_place = wide.data();
-        const std::string expected = c.begin + content + c.end;
-        const auto write = [&](soap *ctx) { soap_literal_write(ctx, c.tag, &place, nullptr); };
-        const auto write_wide = [&](soap *ctx) { soap_wide_literal_write(ctx, c.tag, &wide_place, nullptr); };
-        EXPECT_EQ(inside(0, write), expected);
-        EXPECT_EQ(inside(0, write_wide), expected);
-        place = nullptr;
-        EXPECT_EQ(inside(0, write), "");
+        const char *const name = tag;
+        const auto write = [&](char **content) {
+            return inside(0, [&](soap *ctx) { soap_literal_write(ctx, name, content, nullptr); });
+        };
+        EXPECT_EQ(write(&place), before + text + after);
+        EXPECT_EQ(write(&none), "");
+        EXPECT_EQ(inside(0, [&](soap *ctx) { soap_wide_literal_write(ctx, name, &wide_place, nullptr); }),
+                  before + text + after);
     }
 }
 
 TEST(xml_write, strings_are_elements_with_an_identity)
 {
-    char text[] = "a<b";
-    char empty[] = "";
-    char32_t wide[] = U"\u00E9";
+    char text[] = "a<b", empty[] = "";
+    char32_t wide[] = U"\u00E9", *wide_place = wide;
     const auto write = [&](soap *ctx) {
-        char *place = text;
-        EXPECT_EQ(soap_string_element_out(ctx, "a:s", 0, &place, "xsd:string", 5), 0);
-        place = empty;
-        EXPECT_EQ(soap_string_element_out(ctx, "a:s", 3, &place, "", 5), 0);
-        place = nullptr;
-        EXPECT_EQ(soap_string_element_out(ctx, "a:s", 0, &place, "", 5), 0);
-        char32_t *wide_place = wide;
+        const std::tuple<char *, int, const char *> strings[] = {
+            {text, 0, "xsd:string"}, {empty, 3, ""}, {nullptr, 0, ""}};
+        for (const auto &[content, id, type] : strings) {
+            char *place = content;
+            EXPECT_EQ(soap_string_element_out(ctx, "a:s", id, &place, type, 5), 0);
+        }
         EXPECT_EQ(soap_wide_string_element_out(ctx, "a:w", 0, &wide_place, "", 5), 0);
     };
-    const std::string first = "<a:s xsi:type=\"xsd:string\">a&lt;b</a:s>";
-    const std::string last = "<a:w>\xC3\xA9</a:w>";
+    const std::string first = "<a:s xsi:type=\"xsd:string\">a&lt;b</a:s>", last = "<a:w>\xC3\xA9</a:w>";
     EXPECT_EQ(inside(0, write), first + "<a:s id=\"_3\"></a:s>" + last);
     EXPECT_EQ(inside(MODE_NULL_STRINGS, write), first + "<a:s id=\"_3\" xsi:nil=\"true\"/>" + last);
     EXPECT_EQ(inside(MODE_NIL, write), first + "<a:s id=\"_3\"></a:s><a:s xsi:nil=\"true\"/>" + last);
 }
 
-// ---------------------------------------------------------------------------------------------
-// The envelope.
+// --- The envelope.
 
 static void envelope(soap *ctx)
 {
@@ -658,19 +609,18 @@ static void envelope(soap *ctx)
     EXPECT_EQ(ctx->nesting_level, 0U);
 }
 
-constexpr char PLAIN_ENVELOPE[] =
-    "<SOAP-ENV:Envelope><SOAP-ENV:Body></SOAP-ENV:Body></SOAP-ENV:Envelope>\r\n";
-
 TEST(xml_write, the_envelope_names_its_encoding_in_soap_11)
 {
-    writer w;
-    w.ctx->encoding_style = nullptr;
-    EXPECT_EQ(inside(w, envelope), PLAIN_ENVELOPE);
-    w.ctx->encoding_style = "urn:s";
-    EXPECT_EQ(inside(w, envelope), "<SOAP-ENV:Envelope><SOAP-ENV:Body SOAP-ENV:encodingStyle=\"urn:s\">"
-                                   "</SOAP-ENV:Body></SOAP-ENV:Envelope>\r\n");
-    w.ctx->soap_version = 2;
-    EXPECT_EQ(inside(w, envelope), PLAIN_ENVELOPE);
+    const auto sent = [](const char *style, std::int16_t version) {
+        writer w(0, version);
+        w.ctx->encoding_style = style;
+        return inside(w, envelope);
+    };
+    const std::string plain = "<SOAP-ENV:Envelope><SOAP-ENV:Body></SOAP-ENV:Body></SOAP-ENV:Envelope>\r\n";
+    EXPECT_EQ(sent(nullptr, 1), plain);
+    EXPECT_EQ(sent("urn:s", 1), "<SOAP-ENV:Envelope><SOAP-ENV:Body SOAP-ENV:encodingStyle=\"urn:s\">"
+                                "</SOAP-ENV:Body></SOAP-ENV:Envelope>\r\n");
+    EXPECT_EQ(sent("urn:s", 2), plain);
 }
 
 TEST(xml_write, the_part_head_names_what_the_part_is)
@@ -685,24 +635,22 @@ TEST(xml_write, the_part_head_names_what_the_part_is)
         {MODE_MIME | MODE_MTOM, 1, "application/xop+xml; charset=utf-8; type=\"text/xml\""},
         {MODE_MIME | MODE_MTOM, 2, "application/xop+xml; charset=utf-8; type=\"application/soap+xml\""},
     };
-    std::string boundary = "==b==", start = "<s>", large(941, 'b');
-    for (const auto &c : cases) {
-        writer w(c.mode, c.version);
-        w.ctx->encoding_style = nullptr;
-        w.ctx->mime.boundary = boundary.data();
-        w.ctx->mime.start = start.data();
-        const std::string head =
-            "--==b==\r\nContent-Type: " + std::string(c.type) +
-            "\r\nContent-Transfer-Encoding: binary\r\nContent-ID: <s>\r\n\r\n<SOAP-ENV:Envelope>";
-        EXPECT_EQ(inside(w, envelope).substr(0, head.size()), head);
-        w.ctx->mime.boundary = large.data(); // leaves no head at all
-        EXPECT_EQ(inside(w, envelope).substr(0, 3), "<SO");
-        w.ctx->mime = {};
-    }
+    std::string boundary = "==b==", start = "<s>", large(941, 'b'); // the last leaves no head at all
+    for (const auto &c : cases)
+        for (std::string *chosen : {&boundary, &large}) {
+            writer w(c.mode, c.version);
+            w.ctx->encoding_style = nullptr;
+            w.ctx->mime.boundary = chosen->data();
+            w.ctx->mime.start = start.data();
+            const std::string head = "--==b==\r\nContent-Type: " + std::string(c.type) +
+                                     "\r\nContent-Transfer-Encoding: binary\r\nContent-ID: <s>\r\n\r\n";
+            EXPECT_TRUE(
+                inside(w, envelope).starts_with((chosen == &large ? "" : head) + "<SOAP-ENV:Envelope>"));
+            w.ctx->mime = {};
+        }
 }
 
-// ---------------------------------------------------------------------------------------------
-// Canonical output.
+// --- Canonical output.
 
 static void namespaces_where_used(soap *ctx)
 {
@@ -720,19 +668,18 @@ static void namespaces_where_used(soap *ctx)
 static void attributes_in_order(soap *ctx)
 {
     element(ctx, "b:root", [](soap *c) {
-        soap_attr_set(c, "z", "\t\n\r<>&\"'\xE9", 1);
-        soap_attr_set(c, "b:a", "1", 1);
-        soap_attr_set(c, "xsi:n", "2", 1);
-        soap_attr_set(c, "a:z", "3", 1);
-        soap_attr_set(c, "a:b", "4", 1);
-        soap_attr_set(c, "xml:lang", "en", 1);
-        soap_attr_set(c, "b", "5", 1);
+        set_attributes(c, {{"z", "\t\n\r<>&\"'\xE9"},
+                           {"b:a", "1"},
+                           {"xsi:n", "2"},
+                           {"a:z", "3"},
+                           {"a:b", "4"},
+                           {"xml:lang", "en"},
+                           {"b", "5"}});
         element(c, "a:e", [](soap *d) {
-            soap_attr_set(d, "a:b", "6", 1);
-            soap_attr_set(d, "SOAP-ENC:q", "7", 1);
+            set_attributes(d, {{"a:b", "6"}, {"SOAP-ENC:q", "7"}});
             element(d, "b:e");
         });
-        soap_attr_set(c, "b", "8", 1);
+        set_attributes(c, {{"b", "8"}});
         EXPECT_EQ(soap_element_empty_nil(c, "a:nil"), 0);
         EXPECT_EQ(soap_element_href(c, "a:ref", 9, 1), 0);
     });
@@ -754,8 +701,7 @@ static void prefixes_redefined(soap *ctx)
         EXPECT_EQ(soap_element_out_end(c, "b:inner"), 0);
         EXPECT_EQ(soap_element_out_end(c, "a:e"), 0);
         element(c, "b:outer");
-        EXPECT_EQ(soap_attr_set(c, "xmlns:_1", "urn:generated", 1), 0);
-        EXPECT_EQ(soap_attr_set(c, "_1:x", "2", 1), 0);
+        set_attributes(c, {{"xmlns:_1", "urn:generated"}, {"_1:x", "2"}});
         element(c, "a:generated");
     });
 }
@@ -763,8 +709,7 @@ static void prefixes_redefined(soap *ctx)
 static void types_and_arrays(soap *ctx)
 {
     element(ctx, "SOAP-ENV:Envelope", [](soap *c) {
-        EXPECT_EQ(soap_element_out_begin(c, "a:typed", 3, "xsd:int"), 0);
-        EXPECT_EQ(soap_element_out_end(c, "a:typed"), 0);
+        element(c, "a:typed", {}, 3, "xsd:int");
         EXPECT_EQ(soap_array_open(c, "a:list", 0, "b:item[2]", nullptr), 0);
         EXPECT_EQ(soap_element_out_end(c, "a:list"), 0);
         EXPECT_EQ(soap_prefix_use(c, "xsd:value"), 0); // before an element whose text is a name
