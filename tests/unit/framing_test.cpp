@@ -116,6 +116,28 @@ TEST(framing, any_bytes_come_back_through_every_framing)
     }
 }
 
+TEST(framing, a_message_cut_anywhere_never_counts_as_read_to_its_end)
+{
+    random_source random(7);
+    for (const framing &form : all_framings()) {
+        const std::string body = random_body(random, 200);
+        const std::string message = sent_message(form, body, 1);
+        for (std::size_t cut = 0; !form.bare && cut < message.size(); ++cut) {
+            memory_wire wire(MODE_KEEP_ALIVE);
+            wire.keep_alive = 1;
+            set_dictionary(wire, form.dictionary);
+            wire.receive(message.substr(0, cut));
+            if (soap_receive_begin(&wire) == 0) {
+                const std::string read = wire.read_all();
+                EXPECT_EQ(body.compare(0, read.size(), read), 0);
+                soap_receive_finish(&wire);
+            }
+            EXPECT_TRUE(wire.response_unfinished) << testing::PrintToString(form) << " cut at " << cut;
+            EXPECT_LT(wire.receives, 10U);
+        }
+    }
+}
+
 // Those of sending are refused in call_allocation_test.cpp.
 TEST(framing, every_allocation_of_reading_may_fail_once)
 {

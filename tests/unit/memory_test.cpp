@@ -146,7 +146,12 @@ TEST_F(memory, destroys_instances_newest_first_and_names_refusals)
     soap_instance_register(&ctx, &objects[1], -2, -1, note_destruction);
     soap_instance_register(&ctx, &objects[2], 3, 4, note_destruction);
     EXPECT_EQ(ctx.instance_list->array_size, 4);
+    SOAP_ENV__Header header;
+    soap_instance_register(&ctx, &header, 9, -1, [](soap_instance *) { return 0; });
+    ctx.header = &header;
     ctx.fault = static_cast<SOAP_ENV__Fault *>(soap_block_alloc(&ctx, 8));
+    soap_discard_objects(&ctx, &header);
+    EXPECT_TRUE(ctx.header == nullptr && ctx.fault != nullptr) << "what is gone alone is forgotten alone";
     EXPECT_EQ(reported([&] { soap_discard_objects(&ctx, nullptr); }),
               "new(object type = -2) = " + text_of(&objects[1]) + " not freed: deletion callback failed\n");
     EXPECT_EQ(destroyed, (std::vector<int>{3, -2, 1}));
