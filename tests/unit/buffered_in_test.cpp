@@ -312,9 +312,11 @@ TEST(buffered_in, a_damaged_compressed_body_is_an_error_wherever_it_is_damaged)
     for (std::size_t at = 10; at < good.size(); ++at) {
         std::string damaged = good;
         damaged[at] = static_cast<char>(damaged[at] ^ 0x55);
-        for (const std::string &body : {damaged, good.substr(0, at)}) {
-            const outcome result = read_on_kept_connection(head + body);
-            EXPECT_EQ(result.finished, SOAP_ZLIB_ERROR) << body.size() << " bytes, byte " << at;
+        const std::string cut = good.substr(0, at), length = "Content-Length: " + std::to_string(at) + "\r\n";
+        for (const std::string &message :
+             {head + damaged, head + cut, OK_HEAD + length + head.substr(OK_HEAD.size()) + cut}) {
+            const outcome result = read_on_kept_connection(message);
+            EXPECT_EQ(result.finished, SOAP_ZLIB_ERROR) << message.size() << " bytes, byte " << at;
             EXPECT_FALSE(result.reusable);
         }
     }

@@ -284,6 +284,11 @@ TEST(buffered_out, the_error_of_a_hook_is_that_of_the_message)
         EXPECT_EQ(send_message(wire, "hello world"), 77) << row.rule;
         EXPECT_EQ(wire.error, 77) << row.rule;
     }
+    memory_wire wire(0, MODE_BUFFERED);
+    wire.on_send = see_none;
+    ASSERT_EQ(soap_send_begin(&wire), 0);
+    EXPECT_EQ(soap_send_bytes(&wire, text_of_size(SOAP_BUFFER_SIZE).data(), SOAP_BUFFER_SIZE), 77)
+        << "at once";
 }
 
 TEST(buffered_out, without_a_callback_a_head_has_no_lines)

@@ -138,6 +138,32 @@ TEST(framing, a_message_cut_anywhere_never_counts_as_read_to_its_end)
     }
 }
 
+TEST(framing, damaged_messages_end_with_bounded_work)
+{
+    random_source random(99);
+    for (const framing &form : all_framings()) {
+        const std::string message = sent_message(form, random_body(random, 3000), 1);
+        for (int round = 0; round < 200; ++round) {
+            std::string damaged = message;
+            for (unsigned i = random() % 8 + 1; i != 0; --i)
+                damaged.replace(random() % damaged.size(), random() % 3 == 0 ? random() % 20 : 1, 1,
+                                static_cast<char>(random()));
+            memory_wire wire(MODE_KEEP_ALIVE);
+            wire.keep_alive = static_cast<std::int16_t>(random() % 2);
+            set_dictionary(wire, form.dictionary);
+            wire.receive(damaged);
+            wire.piece = [&random](std::size_t) { return random() % 1000; };
+            if (soap_receive_begin(&wire) == 0) {
+                EXPECT_LT(wire.read_all().size(), damaged.size() * 1100);
+                soap_receive_finish(&wire);
+            }
+            EXPECT_LE(wire.buffer_index, wire.buffer_length);
+            EXPECT_LE(wire.buffer_length, SOAP_BUFFER_SIZE);
+            EXPECT_LT(wire.receives, damaged.size() + 20);
+        }
+    }
+}
+
 // Those of sending are refused in call_allocation_test.cpp.
 TEST(framing, every_allocation_of_reading_may_fail_once)
 {

@@ -224,6 +224,18 @@ TEST_F(elements, q_names_are_mapped_to_the_table)
     soap_reset_call(&ctx);
     EXPECT_EQ(soap_qname_read_map(&ctx, "p:x y", &mapped, -1, -1), 0);
     EXPECT_STREQ(mapped, "p:x y") << "without declarations nothing is mapped";
+    int result = 0;
+    {
+        const failing_malloc::scope armed(1, failing_malloc::refuse::all_from);
+        result = soap_qname_read_map(&ctx, "p:x", &mapped, -1, -1);
+    }
+    EXPECT_EQ(result, SOAP_OUT_OF_MEMORY);
+    EXPECT_EQ(ctx.error, SOAP_OUT_OF_MEMORY);
+    ctx.mode = MODE_CANONICAL;
+    EXPECT_EQ(soap_prefix_use(&ctx, "q:x"), 0);
+    EXPECT_EQ(soap_qname_read_map(&ctx, "q:x", &mapped, -1, -1), SOAP_NAMESPACE_ERROR)
+        << "used, not declared";
+    EXPECT_EQ(ctx.error, SOAP_NAMESPACE_ERROR);
 }
 
 TEST_F(elements, q_names_go_out_under_the_prefixes_of_the_table)

@@ -496,7 +496,9 @@ constexpr const char *ROOT_HEADS[] = {
     " xmlns:p=\"urn:one\" xmlns:a_name_of_more_than_eight=\"urn:two\" xmlns:\xC3\xA9=\"urn:\xC3\xA9\"",
     " xmlns:e=\"http://schemas.xmlsoap.org/soap/envelope/\" xmlns:p=\"http://www.w3.org/1/soap-encoding\"",
     " xmlns:e=\"http://www.w3.org/2003/05/soap-envelope\" xmlns:p=\"urn:one\"",
-    " xmlns:e=\"http://www.w3.org/2003/05/soap-envelope\"/",
+    " xmlns:e=\"http://www.w3.org/2003/05/soap-envelope\" "
+    "xmlns:f=\"http://schemas.xmlsoap.org/soap/envelope/\"/",
+    " xmlns:q=urn:one",
     " xmlns:e=\"http://www.w3.org/1/soap-envelope\" xmlns:p=\"http://www.w3.org/2003/05/soap-envelope\"",
 };
 
@@ -538,7 +540,7 @@ TEST(xml_read, a_root_element_like_the_last_one_is_read_as_if_it_were_the_first)
         const std::string document = "<p:root" + head + "><p:x xmlns:q=\"urn:two\"><q:y/></p:x><x/></p:root>";
         in.receive(document, round % 4 == 1 ? 1 + piece % document.size() : piece, piece);
         soap_reset_call(in);
-        in->namespaces = round % 5 == 1 ? other_rows : NAMESPACES;
+        in->namespaces = round % 7 == 1 ? other_rows : NAMESPACES;
         in->mode = round % 3 == 1 ? MODE_UTF_STRINGS : 0;
         soap_namespace_table_copy(in);
         return root_and_content(in, round % 2 == 1);
