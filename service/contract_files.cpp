@@ -104,6 +104,20 @@ std::string contract_document(const request_target &target)
     return {};
 }
 
+std::vector<std::string_view> namespaces_of_element(std::string_view local_name)
+{
+    const std::string declared = "element name=\"" + std::string(local_name) + "\"";
+    std::vector<std::string_view> result;
+    for (const contract_file &file : contract_files()) {
+        if (!file.name.ends_with(".xsd") || file.text.find(declared) == std::string_view::npos)
+            continue;
+        const std::string_view uri = value_at(file.text, file.text.find(NAMESPACE) + NAMESPACE.size());
+        if (std::find(result.begin(), result.end(), uri) == result.end())
+            result.push_back(uri);
+    }
+    return result;
+}
+
 std::string contract_page(const request_target &target)
 {
     std::string html = "<!DOCTYPE html><html><head><title>zuv-service</title></head><body>";

@@ -6,6 +6,7 @@
 #include <span>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "request_target.h"
 
@@ -24,6 +25,9 @@ std::span<const contract_file> contract_files();
 // A document of XML: a file below CONTRACT_PATH; at the path of a port its WSDL, with the query "wsdl" in
 // capitals or small letters or with none; at "/" with that query what leads to all. Empty for anything else.
 std::string contract_document(const request_target &target);
+
+// Namespaces of the schemas that declare an element of this local name, each once.
+std::vector<std::string_view> namespaces_of_element(std::string_view local_name);
 
 // A page of HTML that leads to the documents.
 std::string contract_page(const request_target &target);

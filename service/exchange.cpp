@@ -4,7 +4,10 @@
 // Always: every request that was begun gets an answer, unless the peer is gone or too slow.
 #include "exchange.h"
 
+#include <algorithm>
 #include <cstdio>
+#include <string_view>
+#include <vector>
 
 #include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
@@ -14,6 +17,7 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "answer.h"
+#include "contract_files.h"
 #include "data_port.h"
 #include "moment.h"
 
@@ -54,6 +58,28 @@ const operation *find_operation(soap *ctx, const port &target)
         ctx, "Method '" + name + "' not implemented: method name or namespace not recognized");
 }
 
+// In strict reading: names the element at which it stopped, its namespace and the one that the contract has for
+// such a name.
+[[noreturn]] void refuse_unexpected(soap *ctx)
+{
+    ctx->error = SOAP_OK;
+    const std::string_view tag = ctx->tag;
+    const std::string local(tag.substr(tag.find(':') + 1));
+    const char *const bound = soap_namespace_of(ctx, ctx->tag);
+    ctx->error = SOAP_OK; // of a prefix without a declaration
+    const std::string_view found = bound == nullptr ? std::string_view() : bound;
+    std::vector<std::string_view> others = namespaces_of_element(local);
+    const bool is_known = std::erase(others, found) != 0;
+    std::string text = "Element '" + local + "' of ";
+    text += found.empty() ? "no namespace" : "the namespace '" + std::string(found) + "'";
+    text += is_known         ? " is not expected in this place, or not once more"
+            : others.empty() ? ": the contract has no element of this name"
+                             : ": wrong namespace";
+    for (const std::string_view one : others)
+        text.append(one == others.front() ? "; expected '" : " or '").append(one).append("'");
+    refuse<protocol__Client_x002eMalformedRequest>(ctx, text + ".");
+}
+
 struct request {
     const operation *op;
     void *object;
@@ -72,9 +98,14 @@ request read_request(soap *ctx, const port &target)
     if (op == nullptr)
         refuse_operation(ctx);
     void *const object = op->read(ctx, target.by_type ? nullptr : op->request_element);
+    const bool strict = (ctx->mode & MODE_STRICT) != 0;
+    if (object != nullptr)
+        soap_read_independents(ctx);
+    if (ctx->error == SOAP_TAG_MISMATCH && strict)
+        refuse_unexpected(ctx);
     if (object == nullptr)
         throw unreadable{};
-    if (soap_read_independents(ctx) == SOAP_TAG_MISMATCH)
+    if (ctx->error == SOAP_TAG_MISMATCH)
         ctx->error = SOAP_OK; // unknown: the end of the Body skips it
     demand(ctx->error);
     demand(soap_body_in_end(ctx));

@@ -45,6 +45,8 @@ void declare(CLI::App &app, options &o)
     user->needs(password);
     password->needs(user);
     app.add_option("--account", o.accounts, "USER:PASSWORD that authenticates; may be given several times");
+    app.add_flag("--strict", s.strict,
+                 "Refuse requests that hold what the contract does not know, and name it");
     app.add_flag("--indent", s.indent, "Indent the XML of answers");
     app.add_flag("--chunked", s.chunked, "Send answers in chunks");
     app.add_option("--trace", s.trace, "File that takes a copy of all bytes received and sent");

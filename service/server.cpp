@@ -26,7 +26,13 @@ constexpr std::chrono::seconds STOP_LIMIT(5); // time that requests under way ge
 constexpr std::chrono::milliseconds
     ACCEPT_PAUSE(100); // after a failed accept, for example without free descriptors
 
-std::uint32_t mode_of(const settings &config)
+std::uint32_t input_mode_of(const settings &config)
+{
+    const std::uint32_t mode = MODE_KEEP_ALIVE | MODE_UTF_STRINGS;
+    return config.strict ? mode | MODE_STRICT : mode;
+}
+
+std::uint32_t output_mode_of(const settings &config)
 {
     const std::uint32_t mode = MODE_BUFFERED | MODE_KEEP_ALIVE | MODE_UTF_STRINGS;
     return config.indent ? mode | MODE_INDENT : mode;
@@ -43,7 +49,7 @@ std::string listen_failure(soap *ctx, const settings &config)
 } // namespace
 
 server::server(const settings &config, database &place)
-    : config_(config), place_(place), master_(MODE_KEEP_ALIVE | MODE_UTF_STRINGS, mode_of(config))
+    : config_(config), place_(place), master_(input_mode_of(config), output_mode_of(config))
 {
     idle_sessions_.push_back(std::make_unique<session>(place, config)); // an unusable database fails now
     store &documents = idle_sessions_.back()->documents;
