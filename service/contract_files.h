@@ -29,7 +29,7 @@ std::string contract_document(const request_target &target);
 // Namespaces of the schemas that declare an element of this local name, each once.
 std::vector<std::string_view> namespaces_of_element(std::string_view local_name);
 
-// A page of HTML that leads to the documents.
-std::string contract_page(const request_target &target);
+// Items of an HTML list that lead to the WSDLs of the ports and to the files.
+std::string contract_links(const request_target &target);
 
 } // namespace service

@@ -49,6 +49,12 @@ void declare(CLI::App &app, options &o)
                  "Refuse requests that hold what the contract does not know, and name it");
     app.add_flag("--indent", s.indent, "Indent the XML of answers");
     app.add_flag("--chunked", s.chunked, "Send answers in chunks");
+    app.add_option("--access-log", s.access_log,
+                   "File that takes a line for each exchange; -: standard output. Opened again on SIGHUP");
+    app.add_option("--rules", s.rules, "JSON file of rules that say how the next calls are answered")
+        ->check(CLI::ExistingFile);
+    app.add_flag("--control", s.control,
+                 "Take such rules from clients on this machine too, at /zuv/v1.0/control");
     app.add_option("--trace", s.trace, "File that takes a copy of all bytes received and sent");
     app.add_option("--port-file", o.port_file, "File that takes the port once the service listens");
     app.add_flag("--json", o.json, "Print the addresses of the ports as one line of JSON, in place of words");
@@ -136,10 +142,11 @@ void announce(const options &o, int port)
 
 void serve_until_signal(const options &o)
 {
-    sigset_t ending; // blocked in all threads, so that the wait below gets them
+    sigset_t ending; // or SIGHUP: blocked in all threads, so that the wait below gets them
     sigemptyset(&ending);
     sigaddset(&ending, SIGINT);
     sigaddset(&ending, SIGTERM);
+    sigaddset(&ending, SIGHUP);
     pthread_sigmask(SIG_BLOCK, &ending, nullptr);
 
     std::optional<passing_directory> passing;
@@ -150,7 +157,8 @@ void serve_until_signal(const options &o)
     server.start();
     announce(o, server.port());
     int signal = 0;
-    sigwait(&ending, &signal);
+    while (sigwait(&ending, &signal) == 0 && signal == SIGHUP)
+        server.reopen_log();
     server.stop();
 }
 

@@ -77,6 +77,29 @@ request_target parse_target(std::string_view url, int socket)
     return target;
 }
 
+peer_address peer_of(int socket)
+{
+    sockaddr_storage address{};
+    socklen_t length = sizeof address;
+    auto *const generic = reinterpret_cast<sockaddr *>(&address);
+    char host[NI_MAXHOST], port[NI_MAXSERV];
+    if (getpeername(socket, generic, &length) != 0 ||
+        getnameinfo(generic, length, host, sizeof host, port, sizeof port, NI_NUMERICHOST | NI_NUMERICSERV) !=
+            0)
+        return {};
+    const std::string_view name = host;
+    const bool v6 = name.find(':') != std::string_view::npos;
+    return {(v6 ? "[" + std::string(name) + "]:" : std::string(name) + ":") + port,
+            name == "::1" || name.starts_with("127.") || name.starts_with("::ffff:127.")};
+}
+
+bool is_loopback_root(std::string_view root)
+{
+    static const std::regex loopback(R"(https?://(localhost|127\.0\.0\.1|\[::1\])(:[0-9]+)?)",
+                                     std::regex::icase);
+    return std::regex_match(root.begin(), root.end(), loopback);
+}
+
 std::string root_of(int socket)
 {
     const own_end end(socket);

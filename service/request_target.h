@@ -16,6 +16,15 @@ struct request_target {
 // or anything but a scheme, a host and a port, which documents can hold unchanged, it is root_of(socket).
 request_target parse_target(std::string_view url, int socket);
 
+struct peer_address {
+    std::string name;      // "127.0.0.1:40000"; empty if the peer is gone
+    bool is_local = false; // on this machine, over the loopback interface
+};
+peer_address peer_of(int socket);
+
+// Whether the root names this machine over the loopback interface: localhost, 127.0.0.1 or [::1].
+bool is_loopback_root(std::string_view root);
+
 // The URL of a socket's own end, such as "http://127.0.0.1:9080", and its port. Throw std::runtime_error.
 std::string root_of(int socket);
 int port_of(int socket);

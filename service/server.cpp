@@ -4,6 +4,8 @@
 #include <algorithm>
 #include <chrono>
 #include <cstdio>
+#include <fstream>
+#include <iterator>
 #include <stdexcept>
 
 #include <sys/socket.h>
@@ -38,6 +40,12 @@ std::uint32_t output_mode_of(const settings &config)
     return config.indent ? mode | MODE_INDENT : mode;
 }
 
+std::string text_of_file(const std::string &path)
+{
+    std::ifstream file(path, std::ios::binary);
+    return {std::istreambuf_iterator<char>(file), {}};
+}
+
 // Why listening failed, in the system's words where they are known.
 std::string listen_failure(soap *ctx, const settings &config)
 {
@@ -49,9 +57,13 @@ std::string listen_failure(soap *ctx, const settings &config)
 } // namespace
 
 server::server(const settings &config, database &place)
-    : config_(config), place_(place), master_(input_mode_of(config), output_mode_of(config))
+    : config_(config), place_(place), notes_(config.access_log),
+      master_(input_mode_of(config), output_mode_of(config))
 {
-    idle_sessions_.push_back(std::make_unique<session>(place, config)); // an unusable database fails now
+    idle_sessions_.push_back(
+        std::make_unique<session>(place, config, notes_, rules_)); // an unusable database fails now
+    if (!config.rules.empty())
+        rules_.add(text_of_file(config.rules));
     store &documents = idle_sessions_.back()->documents;
     open_data_directory(place.data_directory);
     sweep_data(place.data_directory,
@@ -139,7 +151,7 @@ std::unique_ptr<session> server::acquire_session()
             return borrowed;
         }
     }
-    return std::make_unique<session>(place_, config_);
+    return std::make_unique<session>(place_, config_, notes_, rules_);
 }
 
 void server::serve(soap *copy, std::list<connection>::iterator place)
