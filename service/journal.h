@@ -26,7 +26,7 @@ struct exchange_note {
     std::string method;                   // "POST"; empty if no head was read
     std::string target;                   // "Profile/create", or a path
     int status = 0;                       // 0: nothing was sent
-    std::uint64_t received = 0, sent = 0; // bytes on the connection, below TLS; heads included
+    std::uint64_t received = 0, sent = 0; // bytes before encryption, heads included
     std::string request, answer;          // their first bytes: a request without its head
     bool shown = true;                    // false: only for the log
 };

@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <cstdio>
 #include <exception>
+#include <new>
 #include <string_view>
 #include <utility>
 
@@ -35,6 +36,16 @@ bool same_secret(const char *given, const std::string &expected)
 {
     const std::string_view text = given == nullptr ? std::string_view() : given;
     return text.size() == expected.size() && CRYPTO_memcmp(text.data(), expected.data(), text.size()) == 0;
+}
+
+// For the journal; what there is no memory for is left out, since the library's hooks must not throw.
+void keep_some(std::string &text, const char *data, std::size_t length)
+{
+    try {
+        text.append(data, std::min(length, NOTED_BYTES - text.size()));
+    } catch (const std::bad_alloc &) {
+        text.clear();
+    }
 }
 
 // A request that should have no body is at its end. A body that it has all the same, or bytes after it,
@@ -151,7 +162,7 @@ int reception::send(soap *ctx, const char *data, std::size_t length)
     const std::uint64_t end = self.distortion_.cut_after.value_or(note.sent + length);
     const std::size_t part =
         static_cast<std::size_t>(std::min<std::uint64_t>(length, end - std::min(end, note.sent)));
-    note.answer.append(data, std::min(part, NOTED_BYTES - std::min(NOTED_BYTES, note.answer.size())));
+    keep_some(note.answer, data, part);
     note.sent += part;
     const int result = part == 0 ? 0 : tcp_send(ctx, data, part);
     return result == 0 && part != length ? static_cast<int>(SOAP_EOF) : result;
@@ -200,9 +211,8 @@ void reception::note_exchange()
 int reception::count_body(soap *ctx, const char *data, std::size_t length)
 {
     reception &self = of(ctx);
-    std::string &noted = self.note_.request;
     if (self.target_ != nullptr)
-        noted.append(data, std::min(length, NOTED_BYTES - noted.size()));
+        keep_some(self.note_.request, data, length);
     self.body_bytes_ += length;
     if (!self.data_name().empty())
         self.deadline_ += ATTACHED_BYTE_TIME * static_cast<long>(length);
@@ -262,7 +272,7 @@ bool reception::is_local() const
 // status.
 int reception::settle_request(soap *ctx)
 {
-    where_ = parse_target(ctx->endpoint, ctx->socket);
+    where_ = parse_target(ctx->endpoint, ctx->socket, config_.tls);
     target_ = find_port(where_.path);
     const std::string_view line = ctx->message_text;
     note_.method = loggable_path(line.substr(0, line.find(' ')));

@@ -13,8 +13,8 @@ struct request_target {
 };
 
 // `url`: root, path and query; the root is from the Host header or an absolute target. If it is missing,
-// or anything but a scheme, a host and a port, which documents can hold unchanged, it is root_of(socket).
-request_target parse_target(std::string_view url, int socket);
+// or anything but a scheme, a host and a port, which documents can hold unchanged, it is root_of(socket, tls).
+request_target parse_target(std::string_view url, int socket, bool tls);
 
 struct peer_address {
     std::string name;      // "127.0.0.1:40000"; empty if the peer is gone
@@ -26,7 +26,7 @@ peer_address peer_of(int socket);
 bool is_loopback_root(std::string_view root);
 
 // The URL of a socket's own end, such as "http://127.0.0.1:9080", and its port. Throw std::runtime_error.
-std::string root_of(int socket);
+std::string root_of(int socket, bool tls);
 int port_of(int socket);
 
 } // namespace service

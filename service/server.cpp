@@ -14,7 +14,9 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_log.h>
 #include <zuv_client_pro/soap_tcp.h>
+#include <zuv_client_pro/soap_tls.h>
 
+#include "certificates.h"
 #include "connection.h"
 #include "data_files.h"
 #include "request_target.h"
@@ -73,6 +75,8 @@ server::server(const settings &config, database &place)
     master_.max_message = config.message_limit();
     master_.max_memory = config.memory_limit();
     master_.recv_timeout = master_.send_timeout = config.idle_seconds;
+    if (config.tls)
+        set_up_tls(&master_, config);
     if (!config.trace.empty()) {
         soap_log_set_received(&master_, config.trace.c_str());
         soap_log_set_sent(&master_, config.trace.c_str());
@@ -159,7 +163,8 @@ void server::serve(soap *copy, std::list<connection>::iterator place)
     std::unique_ptr<session> borrowed;
     try {
         borrowed = acquire_session();
-        serve_connection(copy, config_, *borrowed);
+        if (!config_.tls || soap_ssl_accept(copy) == SOAP_OK)
+            serve_connection(copy, config_, *borrowed);
     } catch (const std::exception &failure) {
         std::fprintf(stderr, "zuv-service: %s\n", failure.what());
     }

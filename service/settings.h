@@ -13,9 +13,12 @@ namespace service {
 
 struct settings {
     std::string host = "127.0.0.1";
-    int port = 9080;            // 0: any free port
-    std::string database;       // file; empty: one that ends with the program
-    std::string user, password; // HTTP Basic credentials that clients need; empty user: none
+    int port = 9080;              // 0: any free port
+    bool tls = false;             // HTTPS
+    std::string certificate, key; // PEM files of the service; an empty key is in the other file
+    std::string client_ca;        // PEM file: clients need a certificate that it vouches for; empty: none
+    std::string database;         // file; empty: one that ends with the program
+    std::string user, password;   // HTTP Basic credentials that clients need; empty user: none
     std::vector<std::pair<std::string, std::string>>
         accounts;           // further users and passwords that authenticate
     bool strict = false;    // requests that hold what the contract doesn't know, or lack what it demands, are
