@@ -4,6 +4,7 @@
 #include <chrono>
 
 #include <malloc.h>
+#include <openssl/ssl.h>
 #include <poll.h>
 #include <sys/socket.h>
 
@@ -18,9 +19,12 @@ constexpr std::chrono::milliseconds LINGER_LIMIT(5000); // time that a peer gets
 
 // A connection closed with unread input is reset, and the peer may lose the answer. What it still sends is
 // dropped until it has closed its side.
-void let_peer_read(int socket)
+void let_peer_read(soap *ctx)
 {
     using namespace std::chrono;
+    const int socket = ctx->socket;
+    if (ctx->tls_connection != nullptr)
+        SSL_shutdown(ctx->tls_connection); // tells the peer that nothing was cut off
     if (shutdown(socket, SHUT_WR) != 0)
         return;
     const auto end = steady_clock::now() + LINGER_LIMIT;
@@ -56,7 +60,7 @@ void serve_connection(soap *ctx, const settings &config, session &borrowed)
         if (more)
             soap_discard_all(ctx);
     }
-    let_peer_read(ctx->socket);
+    let_peer_read(ctx);
     ctx->keep_alive = 0;
     soap_discard_all(ctx);
 }

@@ -104,20 +104,33 @@ std::string contract_document(const request_target &target)
     return {};
 }
 
-std::string contract_page(const request_target &target)
+std::vector<std::string_view> namespaces_of_element(std::string_view local_name)
 {
-    std::string html = "<!DOCTYPE html><html><head><title>zuv-service</title></head><body>";
+    const std::string declared = "element name=\"" + std::string(local_name) + "\"";
+    std::vector<std::string_view> result;
+    for (const contract_file &file : contract_files()) {
+        if (!file.name.ends_with(".xsd") || file.text.find(declared) == std::string_view::npos)
+            continue;
+        const std::string_view uri = value_at(file.text, file.text.find(NAMESPACE) + NAMESPACE.size());
+        if (std::find(result.begin(), result.end(), uri) == result.end())
+            result.push_back(uri);
+    }
+    return result;
+}
+
+std::string contract_links(const request_target &target)
+{
+    std::string html;
     const auto item = [&](const std::string &url, std::string_view text) {
-        html.append("<li><a href=\"").append(url).append("\">").append(text).append("</a></li>");
+        html.append("<li><a href=\"").append(url).append("\">").append(text).append("</a></li>\n");
     };
-    html += "<p>Ports:</p><ul>";
+    item(target.root + "/?wsdl", "all ports in one WSDL");
     each_wsdl([&](const port &described, const contract_file &) {
         item(wsdl_url(described, target.root), std::string(SERVICES_PATH).append(described.name));
     });
-    html += "</ul><p>Contract:</p><ul>";
     for (const contract_file &file : contract_files())
         item(target.root + std::string(CONTRACT_PATH).append(file.name), file.name);
-    return html + "</ul></body></html>\r\n";
+    return html;
 }
 
 } // namespace service

@@ -6,6 +6,7 @@
 #include <span>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "request_target.h"
 
@@ -25,7 +26,10 @@ std::span<const contract_file> contract_files();
 // capitals or small letters or with none; at "/" with that query what leads to all. Empty for anything else.
 std::string contract_document(const request_target &target);
 
-// A page of HTML that leads to the documents.
-std::string contract_page(const request_target &target);
+// Namespaces of the schemas that declare an element of this local name, each once.
+std::vector<std::string_view> namespaces_of_element(std::string_view local_name);
+
+// Items of an HTML list that lead to the WSDLs of the ports and to the files.
+std::string contract_links(const request_target &target);
 
 } // namespace service

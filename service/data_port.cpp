@@ -23,30 +23,6 @@ namespace {
 constexpr int BAD_REQUEST = 400, NOT_FOUND = 404;
 constexpr char MEDIA_TYPE[] = "application/octet-stream";
 
-// The body, framing and compression undone. False if less arrived than was announced; the size is limited by
-// reception.cpp.
-bool read_body(soap *ctx, arriving_file &file)
-{
-    const bool length_known =
-        ctx->content_length_given && (ctx->mode & MODE_IO_MASK) != MODE_CHUNKED && ctx->zlib_in == 0;
-    const std::uint64_t length =
-        length_known ? ctx->content_length : std::numeric_limits<std::uint64_t>::max();
-    if (ctx->look_ahead > 0) {
-        const char first = static_cast<char>(std::exchange(ctx->look_ahead, 0));
-        file.write(&first, 1);
-    }
-    while (file.size() < length && ctx->look_ahead == 0) {
-        if (ctx->buffer_index >= ctx->buffer_length && soap_recv_more(ctx) != SOAP_OK)
-            break;
-        const std::size_t taken = static_cast<std::size_t>(
-            std::min<std::uint64_t>(length - file.size(), ctx->buffer_length - ctx->buffer_index));
-        file.write(ctx->buffer + ctx->buffer_index, taken);
-        ctx->buffer_index += taken;
-    }
-    return ctx->error == SOAP_OK && (!length_known || file.size() == length) &&
-           soap_receive_finish(ctx) == SOAP_OK && (length_known || !ctx->response_unfinished);
-}
-
 bool keep(store &documents, std::string_view name, arriving_file &file)
 {
     store::writing transaction(documents);
@@ -58,6 +34,29 @@ bool keep(store &documents, std::string_view name, arriving_file &file)
 }
 
 } // namespace
+
+bool read_body(soap *ctx, const std::function<void(const char *data, std::size_t length)> &take)
+{
+    const bool length_known =
+        ctx->content_length_given && (ctx->mode & MODE_IO_MASK) != MODE_CHUNKED && ctx->zlib_in == 0;
+    std::uint64_t left = length_known ? ctx->content_length : std::numeric_limits<std::uint64_t>::max();
+    if (ctx->look_ahead > 0) {
+        const char first = static_cast<char>(std::exchange(ctx->look_ahead, 0));
+        take(&first, 1);
+        --left;
+    }
+    while (left != 0 && ctx->look_ahead == 0) {
+        if (ctx->buffer_index >= ctx->buffer_length && soap_recv_more(ctx) != SOAP_OK)
+            break;
+        const std::size_t part =
+            static_cast<std::size_t>(std::min<std::uint64_t>(left, ctx->buffer_length - ctx->buffer_index));
+        take(ctx->buffer + ctx->buffer_index, part);
+        ctx->buffer_index += part;
+        left -= part;
+    }
+    return ctx->error == SOAP_OK && (!length_known || left == 0) && soap_receive_finish(ctx) == SOAP_OK &&
+           (length_known || !ctx->response_unfinished);
+}
 
 int send_data(soap *ctx, store &documents, std::string_view name)
 {
@@ -80,7 +79,7 @@ int receive_data(soap *ctx, store &documents, std::string_view name)
     if (!documents.data_size(name))
         return ctx->error = NOT_FOUND;
     arriving_file file(documents.data_directory());
-    if (!read_body(ctx, file))
+    if (!read_body(ctx, [&file](const char *data, std::size_t length) { file.write(data, length); }))
         return ctx->error != SOAP_OK ? ctx->error : ctx->error = BAD_REQUEST;
     file.flush();
     if (!keep(documents, name, file))

@@ -3,7 +3,9 @@
 // Elsewhere: how data ports are offered (attachments.h).
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <string_view>
 
 #include <zuv_client_pro/soap.h>
@@ -11,6 +13,10 @@
 #include "store.h"
 
 namespace service {
+
+// Reads the body of a request, framing and compression undone, in stretches. False if less arrived than was
+// announced, or ctx->error is set. The size is limited by reception.cpp, and by `take`, which may throw.
+bool read_body(soap *ctx, const std::function<void(const char *data, std::size_t length)> &take);
 
 // Both serve a name below DATA_PATH, after the head was read. They answer a request that succeeds and return
 // SOAP_STOP; otherwise an HTTP status or an error of the engine, which ctx->error holds too, and nothing

@@ -4,7 +4,14 @@
 // Always: every request that was begun gets an answer, unless the peer is gone or too slow.
 #include "exchange.h"
 
+#include <algorithm>
 #include <cstdio>
+#include <optional>
+#include <stdexcept>
+#include <string_view>
+#include <vector>
+
+#include <poll.h>
 
 #include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
@@ -14,7 +21,9 @@
 #include <zuv_client_pro/soap_xml.h>
 
 #include "answer.h"
+#include "contract_files.h"
 #include "data_port.h"
+#include "local_resources.h"
 #include "moment.h"
 
 namespace service {
@@ -23,7 +32,7 @@ namespace {
 
 constexpr int BAD_REQUEST = 400, REQUEST_TIMEOUT = 408, TOO_LARGE = 413, INTERNAL_ERROR = 500;
 constexpr int HTTP_STATUS_MIN = 400, HTTP_STATUS_MAX = 599;
-constexpr int METHOD_NOT_ALLOWED = 405;
+constexpr int METHOD_NOT_ALLOWED = 405, UNSUPPORTED_TYPE = 415;
 
 // The engine could not read the request; ctx->error says why.
 struct unreadable {};
@@ -54,6 +63,28 @@ const operation *find_operation(soap *ctx, const port &target)
         ctx, "Method '" + name + "' not implemented: method name or namespace not recognized");
 }
 
+// In strict reading: names the element at which it stopped, its namespace and the one that the contract has for
+// such a name.
+[[noreturn]] void refuse_unexpected(soap *ctx)
+{
+    ctx->error = SOAP_OK;
+    const std::string_view tag = ctx->tag;
+    const std::string local(tag.substr(tag.find(':') + 1));
+    const char *const bound = soap_namespace_of(ctx, ctx->tag);
+    ctx->error = SOAP_OK; // of a prefix without a declaration
+    const std::string_view found = bound == nullptr ? std::string_view() : bound;
+    std::vector<std::string_view> others = namespaces_of_element(local);
+    const bool is_known = std::erase(others, found) != 0;
+    std::string text = "Element '" + local + "' of ";
+    text += found.empty() ? "no namespace" : "the namespace '" + std::string(found) + "'";
+    text += is_known         ? " is not expected in this place, or not once more"
+            : others.empty() ? ": the contract has no element of this name"
+                             : ": wrong namespace";
+    for (const std::string_view one : others)
+        text.append(one == others.front() ? "; expected '" : " or '").append(one).append("'");
+    refuse<protocol__Client_x002eMalformedRequest>(ctx, text + ".");
+}
+
 struct request {
     const operation *op;
     void *object;
@@ -72,9 +103,14 @@ request read_request(soap *ctx, const port &target)
     if (op == nullptr)
         refuse_operation(ctx);
     void *const object = op->read(ctx, target.by_type ? nullptr : op->request_element);
+    const bool strict = (ctx->mode & MODE_STRICT) != 0;
+    if (object != nullptr)
+        soap_read_independents(ctx);
+    if (ctx->error == SOAP_TAG_MISMATCH && strict)
+        refuse_unexpected(ctx);
     if (object == nullptr)
         throw unreadable{};
-    if (soap_read_independents(ctx) == SOAP_TAG_MISMATCH)
+    if (ctx->error == SOAP_TAG_MISMATCH)
         ctx->error = SOAP_OK; // unknown: the end of the Body skips it
     demand(ctx->error);
     demand(soap_body_in_end(ctx));
@@ -256,6 +292,54 @@ const void *run(soap *ctx, const request &asked, reception &received)
     }
 }
 
+// The wait ends early with the connection, or with the service.
+void wait(int socket, int milliseconds)
+{
+    pollfd end{socket, POLLRDHUP, 0};
+    if (milliseconds != 0)
+        poll(&end, 1, milliseconds);
+}
+
+// Takes rules and answers with those that wait, or with what is wrong with them. JSON must say that it is JSON:
+// a page of elsewhere can't make a browser do that.
+int receive_rules(soap *ctx, reception &received)
+{
+    if (!is_json(ctx->http_content))
+        return ctx->error = UNSUPPORTED_TYPE;
+    rule_book &rules = received.borrowed().rules;
+    std::string body;
+    if (!read_body(ctx, [&body](const char *data, std::size_t length) { body.append(data, length); }))
+        return ctx->error != SOAP_OK ? ctx->error : ctx->error = BAD_REQUEST;
+    try {
+        rules.add(body);
+    } catch (const std::invalid_argument &wrong) {
+        settle_version(ctx);
+        return soap_fault_sender(ctx, soap_string_dup(ctx, wrong.what()), nullptr, BAD_REQUEST);
+    }
+    return send_file(ctx, JSON_TYPE, rules.waiting());
+}
+
+// What the rules say of this call.
+void follow_rule(soap *ctx, const operation &op, reception &received)
+{
+    std::string_view name = op.request_element;
+    name.remove_prefix(name.find(':') + 1);
+    if (name.ends_with("Request"))
+        name.remove_suffix(std::string_view("Request").size());
+    received.note_operation(name);
+    const std::optional<rule> asked = received.borrowed().rules.take(received.target()->name, name);
+    if (!asked)
+        return;
+    wait(ctx->socket, asked->delay_ms);
+    received.distort(ctx, *asked);
+    if (!asked->fault.empty() || asked->status != 0)
+        refuse_by_name(ctx,
+                       !asked->fault.empty()            ? asked->fault
+                       : asked->status < INTERNAL_ERROR ? "Client"
+                                                        : "Server",
+                       asked->text.empty() ? "A rule asks for this answer." : asked->text);
+}
+
 void receive_and_answer(soap *ctx, reception &received)
 {
     const int begun = soap_receive_begin(ctx);
@@ -266,12 +350,17 @@ void receive_and_answer(soap *ctx, reception &received)
         demand(receive_data(ctx, received.borrowed().documents, received.data_name()));
         return;
     }
+    if (received.at_control()) {
+        demand(receive_rules(ctx, received));
+        return;
+    }
     if (received.target() == nullptr) { // XML without an HTTP head
         ctx->error = SOAP_HTTP_ERROR;
         throw unreadable{};
     }
     received.enclosed().add_form(ctx->mode & MODE_MTOM);
     const request asked = read_request(ctx, *received.target());
+    follow_rule(ctx, *asked.op, received);
     const void *const response = run(ctx, asked, received);
     received.enclosed().confirm_kept();
     if (ctx->response_unfinished)
@@ -309,6 +398,7 @@ bool serve_exchange(soap *ctx, reception &received)
         ctx->keep_alive = 0;
     }
     received.note_memory(ctx->memory_held);
+    received.note_exchange();
     received.borrowed().codec.reset();
     received.borrowed().judged.reset();
     received.enclosed().reset();

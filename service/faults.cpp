@@ -1,9 +1,50 @@
 // faults.cpp - see faults.h.
 #include "faults.h"
 
+#include <algorithm>
+#include <iterator>
+
 #include "filter.h"
 
 namespace service {
+
+namespace {
+
+struct fault_row {
+    std::string_view name; // "Client_x002eObjectNotFound"
+    void (*refuse)(soap *ctx, std::string description);
+};
+
+constexpr fault_row FAULTS[] = {
+#define SERVICE_FAULT_ROW(name)                                                                              \
+    {#name, [](soap *ctx, std::string text) { refuse<protocol__##name>(ctx, std::move(text)); }},
+    SOAP_DETAIL_FAULTS(SERVICE_FAULT_ROW)
+#undef SERVICE_FAULT_ROW
+};
+
+const fault_row *find_fault(std::string_view name)
+{
+    std::string encoded;
+    for (const char c : name)
+        encoded += c == '.' ? "_x002e" : std::string(1, c);
+    const auto *const found = std::find_if(std::begin(FAULTS), std::end(FAULTS),
+                                           [&](const fault_row &row) { return row.name == encoded; });
+    return found == std::end(FAULTS) ? nullptr : found;
+}
+
+} // namespace
+
+bool is_fault_name(std::string_view name)
+{
+    return find_fault(name) != nullptr;
+}
+
+void refuse_by_name(soap *ctx, std::string_view name, std::string description)
+{
+    if (const fault_row *const row = find_fault(name))
+        row->refuse(ctx, std::move(description));
+    refuse<protocol__Server_x002eProcessing>(ctx, std::move(description));
+}
 
 void refuse_not_found(soap *ctx, const std::string &uri)
 {

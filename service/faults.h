@@ -4,6 +4,7 @@
 #pragma once
 
 #include <string>
+#include <string_view>
 #include <utility>
 
 #include <zuv_client_pro/protocol.h>
@@ -53,6 +54,10 @@ template <class F> [[noreturn]] void refuse(soap *ctx, std::string description)
 {
     refuse(make_fault<F>(ctx, std::move(description)));
 }
+
+// The same for a class by its name, such as "Client.ObjectNotFound"; an unknown one is a Server.Processing.
+[[noreturn]] void refuse_by_name(soap *ctx, std::string_view name, std::string description);
+bool is_fault_name(std::string_view name);
 
 // No document has the name.
 [[noreturn]] void refuse_not_found(soap *ctx, const std::string &uri);

@@ -16,6 +16,7 @@
 #include <zuv_client_pro/soap_log.h>
 
 #include "catalogue.h"
+#include "certificates.h"
 #include "port.h"
 #include "server.h"
 
@@ -26,6 +27,8 @@ constexpr int WRONG_USAGE = 2; // exit status
 struct options {
     service::settings config;
     std::vector<std::string> accounts; // "user:password"
+    std::string basic_file;            // its first line is the "user:password" that clients must give
+    std::string authority;             // directory of a test authority
     std::string port_file;             // gets the port once the service listens
     bool json = false;                 // announce the service's addresses as JSON
 };
@@ -44,9 +47,22 @@ void declare(CLI::App &app, options &o)
     auto *const password = app.add_option("--password", s.password, "Password that clients must give");
     user->needs(password);
     password->needs(user);
+    app.add_option(
+           "--basic", o.basic_file,
+           "File with the USER:PASSWORD that clients must give; or ZUV_SERVICE_BASIC in the environment")
+        ->check(CLI::ExistingFile)
+        ->excludes(user);
     app.add_option("--account", o.accounts, "USER:PASSWORD that authenticates; may be given several times");
+    app.add_flag("--strict", s.strict,
+                 "Refuse requests that hold what the contract does not know, and name it");
     app.add_flag("--indent", s.indent, "Indent the XML of answers");
     app.add_flag("--chunked", s.chunked, "Send answers in chunks");
+    app.add_option("--access-log", s.access_log,
+                   "File that takes a line for each exchange; -: standard output. Opened again on SIGHUP");
+    app.add_option("--rules", s.rules, "JSON file of rules that say how the next calls are answered")
+        ->check(CLI::ExistingFile);
+    app.add_flag("--control", s.control,
+                 "Take such rules from clients on this machine too, at /zuv/v1.0/control");
     app.add_option("--trace", s.trace, "File that takes a copy of all bytes received and sent");
     app.add_option("--port-file", o.port_file, "File that takes the port once the service listens");
     app.add_flag("--json", o.json, "Print the addresses of the ports as one line of JSON, in place of words");
@@ -72,6 +88,53 @@ void split_accounts(options &o)
             throw std::invalid_argument("an account is USER:PASSWORD");
         o.config.accounts.emplace_back(account.substr(0, colon), account.substr(colon + 1));
     }
+}
+
+void split_basic(options &o)
+{
+    std::string line;
+    if (!o.basic_file.empty())
+        std::getline(std::ifstream(o.basic_file), line);
+    else if (const char *const given = std::getenv("ZUV_SERVICE_BASIC");
+             given != nullptr && o.config.user.empty())
+        line = given;
+    else
+        return;
+    const std::size_t colon = line.find(':');
+    if (colon == std::string::npos || colon == 0)
+        throw std::invalid_argument("--basic and ZUV_SERVICE_BASIC want USER:PASSWORD");
+    o.config.user = line.substr(0, colon);
+    o.config.password = line.substr(colon + 1);
+}
+
+void declare_tls(CLI::App &app, options &o)
+{
+    service::settings &s = o.config;
+    auto *const tls = app.add_flag("--tls", s.tls, "HTTPS; needs --cert or --make-ca");
+    auto *const certificate = app.add_option(
+        "--cert", s.certificate, "PEM file of the certificate chain, and of its key without --key");
+    certificate->needs(tls);
+    app.add_option("--key", s.key, "PEM file of the certificate's key")->needs(certificate);
+    app.add_option("--make-ca", o.authority,
+                   "Directory in which a test authority and certificates of it for this machine are made, "
+                   "unless there")
+        ->needs(tls)
+        ->excludes(certificate);
+    app.add_option("--client-ca", s.client_ca, "PEM file of authorities; clients need a certificate of one")
+        ->needs(tls)
+        ->check(CLI::ExistingFile);
+}
+
+void settle_tls(options &o)
+{
+    if (!o.config.tls)
+        return;
+    if (!o.authority.empty()) {
+        service::make_authority(o.authority);
+        o.config.certificate = o.authority + "/server.pem";
+    }
+    if (o.config.certificate.empty())
+        throw std::invalid_argument("--tls needs --cert or --make-ca");
 }
 
 // A directory for the documents of one run.
@@ -123,8 +186,8 @@ void announce(const options &o, int port)
     if (!o.port_file.empty())
         write_port_file(o.port_file, port);
     const bool v6 = o.config.host.find(':') != std::string::npos;
-    const std::string address =
-        "http://" + (v6 ? "[" + o.config.host + "]" : o.config.host) + ":" + std::to_string(port);
+    const std::string address = std::string(o.config.tls ? "https://" : "http://") +
+                                (v6 ? "[" + o.config.host + "]" : o.config.host) + ":" + std::to_string(port);
     if (o.json)
         print_json(address, port);
     else
@@ -134,10 +197,12 @@ void announce(const options &o, int port)
 
 void serve_until_signal(const options &o)
 {
-    sigset_t ending; // blocked in all threads, so that the wait below gets them
+    sigset_t ending; // or SIGHUP: blocked in all threads, so that the wait below gets them
     sigemptyset(&ending);
     sigaddset(&ending, SIGINT);
     sigaddset(&ending, SIGTERM);
+    if (!o.config.access_log.empty()) // else a hang-up ends the program as usual
+        sigaddset(&ending, SIGHUP);
     pthread_sigmask(SIG_BLOCK, &ending, nullptr);
 
     std::optional<passing_directory> passing;
@@ -148,7 +213,8 @@ void serve_until_signal(const options &o)
     server.start();
     announce(o, server.port());
     int signal = 0;
-    sigwait(&ending, &signal);
+    while (sigwait(&ending, &signal) == 0 && signal == SIGHUP)
+        server.reopen_log();
     server.stop();
 }
 
@@ -161,12 +227,15 @@ int run(int argc, char **argv)
     options o;
     app.set_version_flag("--version", "zuv-service " ZUV_VERSION);
     declare(app, o);
+    declare_tls(app, o);
     try {
         app.parse(argc, argv);
     } catch (const CLI::ParseError &error) {
         return app.exit(error) == 0 ? 0 : WRONG_USAGE;
     }
     split_accounts(o);
+    split_basic(o);
+    settle_tls(o);
     service::the_catalogue(); // read now, while there is only one thread
     serve_until_signal(o);
     return 0;

@@ -4,12 +4,14 @@
 #include <algorithm>
 #include <cstdio>
 #include <exception>
+#include <new>
 #include <string_view>
 #include <utility>
 
 #include <openssl/crypto.h>
 
 #include <zuv_client_pro/soap_attachment.h>
+#include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
 #include <zuv_client_pro/soap_tcp.h>
 
@@ -22,8 +24,9 @@ namespace service {
 
 namespace {
 
-constexpr int BAD_REQUEST = 400, UNAUTHORIZED = 401, NOT_FOUND = 404, METHOD_NOT_ALLOWED = 405,
-              TOO_LARGE = 413, INTERNAL_ERROR = 500;
+constexpr int BAD_REQUEST = 400, UNAUTHORIZED = 401, FORBIDDEN = 403, NOT_FOUND = 404,
+              METHOD_NOT_ALLOWED = 405, TOO_LARGE = 413, INTERNAL_ERROR = 500;
+constexpr std::int16_t GZIP = 2; // of zlib_out
 char REALM[] = "zuv";
 // Attachments may be long, and at this pace their bytes don't count in the time that a request may take.
 constexpr std::chrono::microseconds ATTACHED_BYTE_TIME(10);
@@ -33,6 +36,16 @@ bool same_secret(const char *given, const std::string &expected)
 {
     const std::string_view text = given == nullptr ? std::string_view() : given;
     return text.size() == expected.size() && CRYPTO_memcmp(text.data(), expected.data(), text.size()) == 0;
+}
+
+// For the journal; what there is no memory for is left out, since the library's hooks must not throw.
+void keep_some(std::string &text, const char *data, std::size_t length)
+{
+    try {
+        text.append(data, std::min(length, NOTED_BYTES - text.size()));
+    } catch (const std::bad_alloc &) {
+        text.clear();
+    }
 }
 
 // A request that should have no body is at its end. A body that it has all the same, or bytes after it,
@@ -50,23 +63,27 @@ void end_without_body(soap *ctx)
 void settle_framing(soap *ctx, bool chunks_wanted)
 {
     const bool old = std::string_view(ctx->message_text).ends_with("HTTP/1.0");
-    ctx->output_mode =
-        (ctx->output_mode & ~MODE_IO_MASK) | (chunks_wanted && !old ? MODE_CHUNKED : MODE_BUFFERED);
+    ctx->output_mode = (ctx->output_mode & ~(MODE_IO_MASK | MODE_DEFLATE)) |
+                       (chunks_wanted && !old ? MODE_CHUNKED : MODE_BUFFERED);
 }
 
 } // namespace
 
 reception::reception(soap *ctx, const settings &config, session &borrowed)
-    : config_(config), borrowed_(borrowed), enclosures_(config, borrowed.documents.data_directory())
+    : config_(config), borrowed_(borrowed), peer_(peer_of(ctx->socket)),
+      enclosures_(config, borrowed.documents.data_directory())
 {
     ctx->user = this;
     ctx->on_read_head = read_head;
     ctx->on_recv_prepare = count_body;
     ctx->on_recv = receive;
+    ctx->on_send = send;
+    ctx->on_response = send_head;
     ctx->on_header_line = write_line;
     ctx->on_get = get;
     ctx->on_head = ctx->on_options = option_or_head;
-    ctx->on_put = ctx->on_delete = refuse_method;
+    ctx->on_put = refuse_method;
+    ctx->on_delete = erase;
     install_attachment_hooks(ctx);
 }
 
@@ -102,6 +119,8 @@ void reception::reset()
     body_bytes_ = 0;
     target_ = nullptr;
     where_ = {};
+    distortion_ = {};
+    note_ = {};
     enclosures_.reset();
 }
 
@@ -124,16 +143,76 @@ std::size_t reception::receive(soap *ctx, char *buffer, std::size_t length)
     }
     const std::size_t received = tcp_recv(ctx, buffer, length);
     const auto end = steady_clock::now();
+    self.note_.received += received;
     if (received == 0)
         self.too_slow_ = self.started_ && end - start >= seconds(ctx->recv_timeout);
-    else if (!std::exchange(self.started_, true))
+    else if (!std::exchange(self.started_, true)) {
+        self.begun_ = end;
+        self.note_.begun = system_clock::now();
         self.deadline_ = end + seconds(self.config_.request_seconds);
+    }
     return received;
 }
 
-int reception::count_body(soap *ctx, const char *, std::size_t length)
+// Sends what a rule leaves of the answer, and notes its beginning.
+int reception::send(soap *ctx, const char *data, std::size_t length)
 {
     reception &self = of(ctx);
+    exchange_note &note = self.note_;
+    const std::uint64_t end = self.distortion_.cut_after.value_or(note.sent + length);
+    const std::size_t part =
+        static_cast<std::size_t>(std::min<std::uint64_t>(length, end - std::min(end, note.sent)));
+    keep_some(note.answer, data, part);
+    note.sent += part;
+    const int result = part == 0 ? 0 : tcp_send(ctx, data, part);
+    return result == 0 && part != length ? static_cast<int>(SOAP_EOF) : result;
+}
+
+int reception::send_head(soap *ctx, int status, std::uint64_t length)
+{
+    reception &self = of(ctx);
+    const std::uint64_t error = static_cast<std::uint64_t>(self.distortion_.length_error);
+    self.note_.answer.clear(); // an interim head
+    return http_write_response(ctx, self.distortion_.status == 0 ? status : self.distortion_.status,
+                               self.distortion_.length_error < 0 && length < -error ? 0 : length + error);
+}
+
+void reception::distort(soap *ctx, const rule &how)
+{
+    distortion_ = how;
+    if (how.chunked)
+        ctx->output_mode |= MODE_CHUNKED;
+    if (how.length_error != 0)
+        ctx->output_mode = (ctx->output_mode & ~MODE_IO_MASK) | MODE_BUFFERED;
+    if (how.gzip) {
+        ctx->output_mode |= MODE_DEFLATE;
+        ctx->zlib_out = GZIP;
+    }
+    if (how.length_error != 0 || how.cut_after)
+        ctx->keep_alive = 0; // the peer can't know where the next answer begins
+}
+
+void reception::note_operation(std::string_view name)
+{
+    note_.target.append("/").append(name);
+}
+
+void reception::note_exchange()
+{
+    if (!started_)
+        return;
+    note_.peer = peer_.name;
+    note_.lasted = std::chrono::steady_clock::now() - begun_;
+    if (const std::string_view head = note_.answer; head.starts_with("HTTP/1.") && head.size() > 12)
+        note_.status = std::atoi(head.substr(9, 3).data());
+    borrowed_.notes.add(std::move(note_));
+}
+
+int reception::count_body(soap *ctx, const char *data, std::size_t length)
+{
+    reception &self = of(ctx);
+    if (self.target_ != nullptr)
+        keep_some(self.note_.request, data, length);
     self.body_bytes_ += length;
     if (!self.data_name().empty())
         self.deadline_ += ATTACHED_BYTE_TIME * static_cast<long>(length);
@@ -168,6 +247,8 @@ int reception::read_head(soap *ctx)
     if (std::string_view(ctx->message_text).find(" HTTP/1.") == std::string_view::npos)
         return ctx->error = BAD_REQUEST; // the library leaves what isn't HTTP to its caller
     return answered(ctx, [ctx](const reception &known) {
+        if (known.at_control())
+            return known.is_local() ? 0 : ctx->error = FORBIDDEN;
         return known.target_ == nullptr && known.data_name().empty() ? ctx->error = NOT_FOUND : 0;
     });
 }
@@ -181,12 +262,21 @@ bool reception::knows_sender(const soap *ctx) const
     return user && password;
 }
 
+// A page of elsewhere, shown by a browser on this machine, would name another host.
+bool reception::is_local() const
+{
+    return peer_.is_local && is_loopback_root(where_.root);
+}
+
 // Takes the URL that the request is for, and says why the request can't be handled: 0 or an HTTP
 // status.
 int reception::settle_request(soap *ctx)
 {
-    where_ = parse_target(ctx->endpoint, ctx->socket);
+    where_ = parse_target(ctx->endpoint, ctx->socket, config_.tls);
     target_ = find_port(where_.path);
+    const std::string_view line = ctx->message_text;
+    note_.method = loggable_path(line.substr(0, line.find(' ')));
+    note_.target = target_ == nullptr ? loggable_path(where_.path) : target_->name;
     ctx->max_message = data_name().empty() ? config_.message_limit() : 0; // data is written to a file
     if (!knows_sender(ctx)) {
         ctx->auth_realm = REALM;
@@ -202,10 +292,14 @@ std::string_view reception::data_name() const
                                               : std::string_view();
 }
 
-// An answer that refuses the method names the one that is served.
+// An answer that refuses the method names the one that is served; a browser takes what is sent for what it is.
 int reception::write_line(soap *ctx, const char *key, const char *value)
 {
     const bool end = key == nullptr;
+    if (end && ctx->status == STATUS_FILE &&
+        (http_write_line(ctx, "Content-Security-Policy", page_policy()) ||
+         http_write_line(ctx, "X-Content-Type-Options", "nosniff")))
+        return ctx->error;
     if (end && ctx->status == METHOD_NOT_ALLOWED && http_write_line(ctx, "Allow", "POST"))
         return ctx->error;
     return http_write_line(ctx, key, value);
@@ -221,11 +315,24 @@ int reception::answer_get(soap *ctx)
     const std::string contract = contract_document(where_);
     if (!contract.empty())
         return send_file(ctx, "text/xml; charset=utf-8", contract);
+    if (where_.path == RECENT_PATH || at_control())
+        return answer_local(ctx);
     if (target_ != nullptr)
         return ctx->error = METHOD_NOT_ALLOWED; // a port has nothing to fetch
     if (where_.path != "/" && where_.path != SERVICES_PATH && where_.path != CONTRACT_PATH)
         return ctx->error = NOT_FOUND;
-    return send_file(ctx, "text/html; charset=utf-8", contract_page(where_));
+    note_.shown = false;
+    return send_file(ctx, "text/html; charset=utf-8", front_page(where_));
+}
+
+// What is for clients on this machine alone.
+int reception::answer_local(soap *ctx)
+{
+    if (!is_local())
+        return ctx->error = FORBIDDEN;
+    note_.shown = false;
+    return send_file(ctx, JSON_TYPE,
+                     at_control() ? borrowed_.rules.waiting() : borrowed_.notes.recent(number_after(where_)));
 }
 
 int reception::get(soap *ctx)
@@ -238,6 +345,19 @@ int reception::option_or_head(soap *ctx)
 {
     end_without_body(ctx);
     return answered(ctx, [ctx](reception &) { return http_method_default(ctx); });
+}
+
+int reception::erase(soap *ctx)
+{
+    return answered(ctx, [ctx](reception &self) {
+        if (!self.at_control())
+            return ctx->error = METHOD_NOT_ALLOWED;
+        if (!self.is_local())
+            return ctx->error = FORBIDDEN;
+        end_without_body(ctx);
+        self.borrowed_.rules.clear();
+        return http_method_default(ctx);
+    });
 }
 
 int reception::refuse_method(soap *ctx)

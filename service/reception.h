@@ -13,8 +13,10 @@
 #include <zuv_client_pro/soap.h>
 
 #include "enclosures.h"
+#include "local_resources.h"
 #include "port.h"
 #include "request_target.h"
+#include "rules.h"
 #include "session.h"
 #include "settings.h"
 
@@ -42,6 +44,14 @@ public:
     const std::string &root() const { return where_.root; }
     enclosures &enclosed() { return enclosures_; }
 
+    // What a rule says of the bytes of the answer to this request; before the answer is begun.
+    void distort(soap *ctx, const rule &how);
+    bool at_control() const { return config_.control && where_.path == CONTROL_PATH; }
+
+    // Notes which operation the request is for, and writes the finished exchange in the journal.
+    void note_operation(std::string_view name);
+    void note_exchange();
+
     // What the exchange held in its context, and the documents that were read for it.
     void note_memory(std::int64_t bytes)
     {
@@ -61,15 +71,20 @@ private:
     static void install_attachment_hooks(soap *ctx);
     int settle_request(soap *ctx);
     int answer_get(soap *ctx);
+    int answer_local(soap *ctx);
     bool knows_sender(const soap *ctx) const;
+    bool is_local() const; // a client on this machine that names this service so
 
     static reception &of(soap *ctx) { return *static_cast<reception *>(ctx->user); }
     static int read_head(soap *ctx);
+    static int send(soap *ctx, const char *data, std::size_t length);
+    static int send_head(soap *ctx, int status, std::uint64_t length);
     static int count_body(soap *ctx, const char *data, std::size_t length);
     static std::size_t receive(soap *ctx, char *buffer, std::size_t length);
     static int write_line(soap *ctx, const char *key, const char *value);
     static int get(soap *ctx);
     static int option_or_head(soap *ctx);
+    static int erase(soap *ctx);
     static int refuse_method(soap *ctx);
     template <class Answer> static int answered(soap *ctx, Answer answer);
 
@@ -81,6 +96,10 @@ private:
     std::chrono::steady_clock::time_point deadline_;
     const port *target_ = nullptr;
     request_target where_;
+    const peer_address peer_;
+    rule distortion_;
+    exchange_note note_;
+    std::chrono::steady_clock::time_point begun_;
     enclosures enclosures_;
 };
 

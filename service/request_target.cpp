@@ -61,7 +61,7 @@ std::string decoded(std::string_view path)
 
 } // namespace
 
-request_target parse_target(std::string_view url, int socket)
+request_target parse_target(std::string_view url, int socket, bool tls)
 {
     const std::size_t scheme = url.find("://");
     const std::size_t path = url.starts_with('/') || scheme == std::string_view::npos
@@ -71,13 +71,36 @@ request_target parse_target(std::string_view url, int socket)
     request_target target;
     target.root = url.substr(0, path);
     if (!is_plain_root(target.root))
-        target.root = root_of(socket);
+        target.root = root_of(socket, tls);
     target.path = std::filesystem::path(decoded(url.substr(path, mark - path))).lexically_normal();
     target.query = url.substr(std::min(mark + 1, url.size()));
     return target;
 }
 
-std::string root_of(int socket)
+peer_address peer_of(int socket)
+{
+    sockaddr_storage address{};
+    socklen_t length = sizeof address;
+    auto *const generic = reinterpret_cast<sockaddr *>(&address);
+    char host[NI_MAXHOST], port[NI_MAXSERV];
+    if (getpeername(socket, generic, &length) != 0 ||
+        getnameinfo(generic, length, host, sizeof host, port, sizeof port, NI_NUMERICHOST | NI_NUMERICSERV) !=
+            0)
+        return {};
+    const std::string_view name = host;
+    const bool v6 = name.find(':') != std::string_view::npos;
+    return {(v6 ? "[" + std::string(name) + "]:" : std::string(name) + ":") + port,
+            name == "::1" || name.starts_with("127.") || name.starts_with("::ffff:127.")};
+}
+
+bool is_loopback_root(std::string_view root)
+{
+    static const std::regex loopback(R"(https?://(localhost|127\.0\.0\.1|\[::1\])(:[0-9]+)?)",
+                                     std::regex::icase);
+    return std::regex_match(root.begin(), root.end(), loopback);
+}
+
+std::string root_of(int socket, bool tls)
 {
     const own_end end(socket);
     std::string host = end.host;
@@ -86,7 +109,7 @@ std::string root_of(int socket)
     host.resize(std::min(host.find('%'), host.size())); // the zone means nothing elsewhere
     if (host.find(':') != std::string::npos)
         host = "[" + host + "]";
-    return "http://" + host + ":" + end.port;
+    return (tls ? "https://" : "http://") + host + ":" + end.port;
 }
 
 int port_of(int socket)

@@ -4,6 +4,8 @@
 #include <algorithm>
 #include <chrono>
 #include <cstdio>
+#include <fstream>
+#include <iterator>
 #include <stdexcept>
 
 #include <sys/socket.h>
@@ -12,7 +14,9 @@
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_log.h>
 #include <zuv_client_pro/soap_tcp.h>
+#include <zuv_client_pro/soap_tls.h>
 
+#include "certificates.h"
 #include "connection.h"
 #include "data_files.h"
 #include "request_target.h"
@@ -26,10 +30,22 @@ constexpr std::chrono::seconds STOP_LIMIT(5); // time that requests under way ge
 constexpr std::chrono::milliseconds
     ACCEPT_PAUSE(100); // after a failed accept, for example without free descriptors
 
-std::uint32_t mode_of(const settings &config)
+std::uint32_t input_mode_of(const settings &config)
+{
+    const std::uint32_t mode = MODE_KEEP_ALIVE | MODE_UTF_STRINGS;
+    return config.strict ? mode | MODE_STRICT : mode;
+}
+
+std::uint32_t output_mode_of(const settings &config)
 {
     const std::uint32_t mode = MODE_BUFFERED | MODE_KEEP_ALIVE | MODE_UTF_STRINGS;
     return config.indent ? mode | MODE_INDENT : mode;
+}
+
+std::string text_of_file(const std::string &path)
+{
+    std::ifstream file(path, std::ios::binary);
+    return {std::istreambuf_iterator<char>(file), {}};
 }
 
 // Why listening failed, in the system's words where they are known.
@@ -43,9 +59,13 @@ std::string listen_failure(soap *ctx, const settings &config)
 } // namespace
 
 server::server(const settings &config, database &place)
-    : config_(config), place_(place), master_(MODE_KEEP_ALIVE | MODE_UTF_STRINGS, mode_of(config))
+    : config_(config), place_(place), notes_(config.access_log),
+      master_(input_mode_of(config), output_mode_of(config))
 {
-    idle_sessions_.push_back(std::make_unique<session>(place, config)); // an unusable database fails now
+    idle_sessions_.push_back(
+        std::make_unique<session>(place, config, notes_, rules_)); // an unusable database fails now
+    if (!config.rules.empty())
+        rules_.add(text_of_file(config.rules));
     store &documents = idle_sessions_.back()->documents;
     open_data_directory(place.data_directory);
     sweep_data(place.data_directory,
@@ -55,6 +75,8 @@ server::server(const settings &config, database &place)
     master_.max_message = config.message_limit();
     master_.max_memory = config.memory_limit();
     master_.recv_timeout = master_.send_timeout = config.idle_seconds;
+    if (config.tls)
+        set_up_tls(&master_, config);
     if (!config.trace.empty()) {
         soap_log_set_received(&master_, config.trace.c_str());
         soap_log_set_sent(&master_, config.trace.c_str());
@@ -133,7 +155,7 @@ std::unique_ptr<session> server::acquire_session()
             return borrowed;
         }
     }
-    return std::make_unique<session>(place_, config_);
+    return std::make_unique<session>(place_, config_, notes_, rules_);
 }
 
 void server::serve(soap *copy, std::list<connection>::iterator place)
@@ -141,7 +163,8 @@ void server::serve(soap *copy, std::list<connection>::iterator place)
     std::unique_ptr<session> borrowed;
     try {
         borrowed = acquire_session();
-        serve_connection(copy, config_, *borrowed);
+        if (!config_.tls || soap_ssl_accept(copy) == SOAP_OK)
+            serve_connection(copy, config_, *borrowed);
     } catch (const std::exception &failure) {
         std::fprintf(stderr, "zuv-service: %s\n", failure.what());
     }

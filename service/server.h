@@ -15,6 +15,8 @@
 #include <zuv_client_pro/soap.h>
 
 #include "exchange.h"
+#include "journal.h"
+#include "rules.h"
 #include "settings.h"
 #include "store.h"
 
@@ -30,6 +32,8 @@ public:
 
     // Accepts connections on a thread of its own.
     void start();
+
+    void reopen_log() { notes_.reopen(); }
 
     // Ends: requests under way get their answers, within STOP_LIMIT, idle connections are closed.
     void stop();
@@ -51,6 +55,8 @@ private:
 
     const settings &config_;
     database &place_;
+    journal notes_;
+    rule_book rules_;
     soap master_;
     int port_ = 0;
     std::thread acceptor_;

@@ -13,14 +13,22 @@ namespace service {
 
 struct settings {
     std::string host = "127.0.0.1";
-    int port = 9080;            // 0: any free port
-    std::string database;       // file; empty: one that ends with the program
-    std::string user, password; // HTTP Basic credentials that clients need; empty user: none
+    int port = 9080;              // 0: any free port
+    bool tls = false;             // HTTPS
+    std::string certificate, key; // PEM files of the service; an empty key is in the other file
+    std::string client_ca;        // PEM file: clients need a certificate that it vouches for; empty: none
+    std::string database;         // file; empty: one that ends with the program
+    std::string user, password;   // HTTP Basic credentials that clients need; empty user: none
     std::vector<std::pair<std::string, std::string>>
-        accounts;                           // further users and passwords that authenticate
-    bool indent = false;                    // answers are indented
-    bool chunked = false;                   // answers are sent in chunks instead of with a Content-Length
-    std::string trace;                      // file that takes a copy of all bytes; empty: none
+        accounts;           // further users and passwords that authenticate
+    bool strict = false;    // requests that hold what the contract doesn't know, or lack what it demands, are
+                            // refused
+    bool indent = false;    // answers are indented
+    bool chunked = false;   // answers are sent in chunks instead of with a Content-Length
+    std::string access_log; // file that takes a line for each exchange; "-": standard output, empty: none
+    std::string rules;      // file of rules that hold from the start (rules.h); empty: none
+    bool control = false;   // rules are taken from clients on this machine too
+    std::string trace;      // file that takes a copy of all bytes; empty: none
     std::uint64_t body_limit = 64ULL << 20; // bytes of a request, framing and compression undone; 413 beyond
     std::uint64_t attachment_limit =
         4ULL << 30; // bytes of its attachments that go to files, or of data for a port

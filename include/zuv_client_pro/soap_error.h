@@ -144,7 +144,7 @@ ZUV_API const char *soap_eof_text(soap *ctx);
 //   check  0: only if the error may stem from a fault in the place of the response; otherwise a fault is
 //          looked for whatever the error, and its absence is no error
 //   SOAP_OK                with `check`: there is no fault, and the message is still to be read
-//   SOAP_CLIENT_FAULT      a fault with the code Client or Sender
+//   SOAP_CLIENT_FAULT      a fault with the code Client or Sender, alone or with detail after a dot
 //   SOAP_SERVER_FAULT      Server or Receiver
 //   SOAP_MUST_UNDERSTAND   MustUnderstand
 //   SOAP_VERSION_MISMATCH  VersionMismatch

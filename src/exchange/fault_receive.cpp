@@ -26,6 +26,19 @@ constexpr code_row CODES[] = {{"SOAP-ENV:Server", SOAP_SERVER_FAULT},
                               {"SOAP-ENV:MustUnderstand", SOAP_MUST_UNDERSTAND},
                               {"SOAP-ENV:VersionMismatch", SOAP_VERSION_MISMATCH}};
 
+// The code before the first dot of its local name, in `buffer`: what follows is detail (SOAP 1.1, 4.4.1).
+const char *general_code(const char *code, char (&buffer)[SOAP_TEXT_SIZE])
+{
+    const char *const colon = std::strchr(code, ':');
+    const char *const dot = std::strchr(colon != nullptr ? colon : code, '.');
+    const std::size_t length = dot != nullptr ? static_cast<std::size_t>(dot - code) : sizeof buffer;
+    if (length >= sizeof buffer)
+        return code;
+    std::memcpy(buffer, code, length);
+    buffer[length] = '\0';
+    return buffer;
+}
+
 // The reader has put the table's prefix in the place of the peer's, where it knew it.
 bool is_code(soap *ctx, const char *code, const char *asked)
 {
@@ -34,9 +47,13 @@ bool is_code(soap *ctx, const char *code, const char *asked)
 
 int error_of_fault(soap *ctx)
 {
-    const char *code = *soap_fault_code_field(ctx);
+    const char *const received = *soap_fault_code_field(ctx);
+    if (received == nullptr)
+        return SOAP_FAULT;
+    char buffer[SOAP_TEXT_SIZE];
+    const char *const code = general_code(received, buffer);
     for (const code_row &row : CODES) {
-        if (code != nullptr && is_code(ctx, code, row.code))
+        if (is_code(ctx, code, row.code))
             return row.error;
     }
     return SOAP_FAULT;

@@ -16,12 +16,13 @@ def need(test):
 
 def _run(page, *options):
     with tempfile.TemporaryDirectory() as profile:
-        return subprocess.run(["chromium", *_OPTIONS, "--user-data-dir=" + profile, *options, "file://" + os.path.abspath(page)],
+        return subprocess.run(["chromium", *_OPTIONS, "--user-data-dir=" + profile, *options,
+                               page if page.startswith("http") else "file://" + os.path.abspath(page)],
                               capture_output=True, text=True, timeout=LIMIT_S, check=True).stdout
 
 
-def dom(page):
-    return _run(page, "--dump-dom")
+def dom(page, *options):
+    return _run(page, "--dump-dom", *options)
 
 
 def screenshot(page, picture, size=(1240, 1000)):

@@ -189,6 +189,10 @@ TEST_F(call_cycle, maps_fault_codes_in_both_versions)
         {ENVELOPE_11, "E:MustUnderstand", SOAP_MUST_UNDERSTAND},
         {ENVELOPE_11, "E:VersionMismatch", SOAP_VERSION_MISMATCH},
         {ENVELOPE_11, "E:Other", SOAP_FAULT},
+        {ENVELOPE_11, "E:Client.Authentication", SOAP_CLIENT_FAULT}, // what a dot adds is detail
+        {ENVELOPE_11, "E:Server.Processing.", SOAP_SERVER_FAULT},
+        {ENVELOPE_11, "E:Clients.Authentication", SOAP_FAULT},
+        {ENVELOPE_11, "c:Client.Authentication", SOAP_FAULT}, // of another namespace
         {ENVELOPE_12, "E:Sender", SOAP_CLIENT_FAULT},
         {ENVELOPE_12, "E:Receiver", SOAP_SERVER_FAULT},
     };

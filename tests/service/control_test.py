@@ -1,0 +1,189 @@
+#!/usr/bin/python3
+"""What serves developers: faults and delays on request, the access log, the last exchanges and the page that shows them."""
+import gzip
+import json
+import os
+import pathlib
+import re
+import signal
+import ssl
+import subprocess
+import tempfile
+import time
+import unittest
+import urllib.error
+import urllib.request
+
+import browser  # of the tests of the command line
+import zuv
+from by_hand import Connection, envelope, exchange, post, request, target
+
+CREATE = post("Profile", envelope("Profile", request("create")))
+GET = post("Profile", envelope("Profile", request("get"), target("urn:x")))
+CONTROL, RECENT = "/zuv/v1.0/control", "/zuv/v1.0/recent"
+
+
+def ask(address, method, path, body="", *headers, host="localhost"):
+    lines = ["%s %s HTTP/1.1" % (method, path), "Host: " + host, "Content-Length: %d" % len(body.encode()), *headers]
+    return exchange(address, "\r\n".join([*lines, "", ""]) + body)
+
+
+def rules(address, *wanted):
+    return ask(address, "POST", CONTROL, json.dumps(wanted), "Content-Type: application/json")
+
+
+def recent(address, last):
+    """Once so many exchanges are noted, which happens after their answers."""
+    while (found := json.loads(ask(address, "GET", RECENT).body))["last"] != last:
+        pass
+    return found
+
+
+class control(unittest.TestCase):
+    def test_a_rule_holds_for_the_next_calls_of_its_operation(self):
+        with zuv.service("--control") as address:
+            for rule, status, present in (
+                    ({"fault": "Client.ObjectNotFound", "text": "gone"}, 500, "subcode>Client.ObjectNotFound<"),
+                    ({"fault": "Server.Processing", "status": 503}, 503, "subcode>Server.Processing<"),
+                    ({"status": 429}, 429, "subcode>Client<"),
+                    ({"chunked": True}, 200, "Transfer-Encoding: chunked"),
+                    ({"gzip": True}, 200, "Content-Encoding: gzip"),
+                    ({"cut_after": 40}, 200, "HTTP/1.1 200"), ({"cut_after": 0}, 0, ""),
+                    ({"length_error": 7}, 200, "Connection: close"), ({"length_error": -7}, 200, "Connection: close")):
+                with self.subTest(rule):
+                    self.assertEqual(rules(address, {"port": "Profile", "operation": "create", **rule}).status, 200)
+                    self.assertNotIn("urn:x is", exchange(address, GET), "another operation")
+                    with Connection(address) as peer:
+                        answer = peer.send(CREATE).receive()
+                        rest = peer.received + (b"" if "keep-alive" in answer else peer.socket.recv(100))
+                    self.assertEqual((answer.status, present in answer), (status, True), answer)
+                    if "gzip" in rule:
+                        self.assertIn(b"createResponse", gzip.decompress(answer.body))
+                    if "cut_after" in rule:
+                        self.assertEqual(len(answer.head + answer.body), rule["cut_after"])
+                    if "length_error" in rule:
+                        told = int(re.search(rb"Content-Length: (\d+)", answer.head)[1])
+                        self.assertEqual(told - len(answer.body + rest), rule["length_error"])
+                    self.assertEqual(exchange(address, CREATE).status, 200, "it held for one call")
+
+    def test_a_delay_holds_up_its_own_connection_alone(self):
+        with zuv.service("--control") as address, Connection(address) as slow:
+            rules(address, {"operation": "create", "delay_ms": 1500}, {"operation": "get", "delay_ms": 600000})
+            begun = time.monotonic()
+            slow.send(CREATE)
+            while json.loads(ask(address, "GET", CONTROL).body)[0]["operation"] == "create":
+                pass  # until the call has taken its rule
+            self.assertEqual(exchange(address, CREATE).status, 200)
+            self.assertLess(time.monotonic() - begun, 1.5)
+            self.assertEqual(slow.receive().status, 200)
+            self.assertGreaterEqual(time.monotonic() - begun, 1.5)
+            with Connection(address) as endless:  # which doesn't hold up the end of the service
+                endless.send(GET)
+                while json.loads(ask(address, "GET", CONTROL).body):
+                    pass
+                address.process.terminate()
+                self.assertEqual(address.process.wait(zuv.LIMIT_S), 0)
+
+    def test_rules_come_from_a_file_and_from_this_machine_only(self):
+        with tempfile.TemporaryDirectory() as folder:
+            name = os.path.join(folder, "rules.json")
+            with open(name, "w") as file:
+                json.dump({"operation": "create", "times": 0, "status": 502}, file)
+            with zuv.service("--rules", name) as address, zuv.service("--control") as open_one:
+                self.assertEqual([exchange(address, CREATE).status for _ in range(3)], 3 * [502])
+                self.assertEqual(rules(address, {"status": 500}).status, 404)
+                self.assertEqual(ask(open_one, "POST", CONTROL, "{}", "Content-Type: application/json", host="x.test").status, 403)
+                self.assertEqual(ask(open_one, "POST", CONTROL, "{}", "Content-Type: text/plain").status, 415)
+                for wrong in ({"statsu": 500}, {"status": 200}, {"fault": "Client.No"}, {"port": "No"}, {"times": -1}, {"text": 1}, 3):
+                    answer = rules(open_one, {"status": 500}, wrong)
+                    self.assertEqual((answer.status, "rule:" in answer), (400, True), answer)
+                self.assertEqual(ask(open_one, "POST", CONTROL, "[", "Content-Type: application/json").status, 400)
+                self.assertEqual(ask(open_one, "GET", CONTROL).body, b"[]", "all or none")
+                rules(open_one, {"status": 500})
+                self.assertEqual(ask(open_one, "DELETE", CONTROL).status, 200)
+                self.assertEqual(exchange(open_one, CREATE).status, 200)
+                with open(name, "w") as file:
+                    file.write('{"status": 99}')
+                run = subprocess.run([zuv.SERVICE, "--port", "0", "--rules", name], capture_output=True, text=True, timeout=60)
+                self.assertEqual((run.returncode, '"status"' in run.stderr), (1, True), run)
+
+    def test_exchanges_are_logged_and_shown_without_secrets(self):
+        secret = ("<c:credentials><c:username>ada</c:username><c:password>sesame</c:password><c:token><![CDATA[sesame]]></c:token>"
+                  "</c:credentials><profileAuthority>&lt;script></profileAuthority>")
+        with tempfile.TemporaryDirectory() as folder:
+            log = os.path.join(folder, "access")
+            with zuv.service("--access-log", log) as address:
+                for number, sent in enumerate((
+                        post("Profile", envelope("Profile", request("create", secret)), "Authorization: Basic c2VzYW1l"),
+                        "no HTTP\r\n\r\n", "GET /zuv/v1.0/data/sesame?token=sesame HTTP/1.1\r\n\r\n",
+                        "GET /a\x7f?token=sesame HTTP/1.1\r\n\r\n"), 1):
+                    exchange(address, sent)
+                    recent(address, number)
+                os.rename(log, log + ".1")
+                address.process.send_signal(signal.SIGHUP)
+                while not os.path.exists(log):
+                    pass
+                exchange(address, CREATE)
+                shown = recent(address, 5)
+                self.assertEqual([one["status"] for one in shown["exchanges"]], [200, 400, 404, 404, 200])
+                self.assertIn("<c:password>***</c:password><c:token>***</c:token>", shown["exchanges"][0]["request"])
+                self.assertIn("createResponse", shown["exchanges"][0]["answer"])
+                self.assertNotIn("sesame", json.dumps(shown))
+                self.assertEqual(json.loads(ask(address, "GET", RECENT + "?after=4").body)["exchanges"], shown["exchanges"][4:])
+                for _ in range(60):
+                    exchange(address, CREATE)
+                self.assertEqual([one["number"] for one in recent(address, 65)["exchanges"]], list(range(16, 66)))
+                self.assertEqual(ask(address, "GET", RECENT, host="rebound.test").status, 403)
+            before, after = (pathlib.Path(name).read_text().splitlines() for name in (log + ".1", log))
+            for line, words in zip((line for line in before if RECENT not in line), ("POST Profile/create 200", "- - 400", "GET /zuv/v1.0/data/*** 404", "GET /a%7F 404")):
+                self.assertRegex(line, r"^\d{4}-\d\d-\d\dT[\d:.]+Z 127\.0\.0\.1:\d+ %s in=\d+ out=[1-9]\d* ms=[\d.]+$" % re.escape(words))
+            self.assertEqual(os.stat(log).st_mode & 0o777, 0o600)
+            self.assertGreaterEqual(len(before + after), 69, "one for each exchange")
+            self.assertNotIn("sesame", str(before + after))
+
+    def test_the_page_shows_hostile_content_as_text(self):
+        browser.need(self)
+        hostile = "&lt;/pre>&lt;img src=x onerror=alert(1)>"
+        with zuv.service() as address:
+            exchange(address, post("Profile", envelope("Profile", request("create", "<profileAuthority>%s</profileAuthority>" % hostile))))
+            recent(address, 1)
+            shown = browser.dom(address + "/#open", "--virtual-time-budget=3000")
+        self.assertRegex(shown, r"<summary[^>]*>[^<]*POST Profile/create 200")
+        self.assertIn("&lt;profileAuthority&gt;" + hostile.replace("&", "&amp;").replace(">", "&gt;"), shown)
+        self.assertIn("1 exchanges so far", shown)
+
+    def test_https_with_an_authority_of_its_own_and_client_certificates(self):
+        with tempfile.TemporaryDirectory() as folder:
+            made, basic = os.path.join(folder, "made"), os.path.join(folder, "basic")
+            ca, client = os.path.join(made, "ca.pem"), os.path.join(made, "client.pem")
+            pathlib.Path(basic).write_text("ada:sesame\nmore\n")
+            wsdl = "/zuv/v1.0/services/Profile?wsdl"
+
+            def fetch(address, **how):
+                request = urllib.request.Request(address + wsdl, headers={"Authorization": "Basic YWRhOnNlc2FtZQ=="})
+                trust = ssl.create_default_context(cafile=ca)
+                if how.get("certificate"):
+                    trust.load_cert_chain(client)
+                with urllib.request.urlopen(request, timeout=60, context=trust) as answer:
+                    return answer.read().decode()
+            with zuv.service("--tls", "--make-ca", made, "--basic", basic) as address:
+                for host in "127.0.0.1", "localhost":
+                    own = address.replace("127.0.0.1", host)
+                    self.assertIn('location="%s' % own, fetch(own))
+                with self.assertRaises(urllib.error.URLError):
+                    urllib.request.urlopen(address, timeout=60)
+                with self.assertRaisesRegex(urllib.error.HTTPError, "401"):
+                    urllib.request.urlopen(address, timeout=60, context=ssl.create_default_context(cafile=ca))
+            self.assertEqual([os.stat(os.path.join(made, name)).st_mode & 0o777 for name in ("server.pem", "client.pem")], 2 * [0o600])
+            both = os.path.join(made, "server.pem")
+            with zuv.service("--tls", "--cert", both, "--key", both, "--client-ca", ca) as address:
+                self.assertIn("portType", fetch(address, certificate=True))
+                with self.assertRaises(OSError):
+                    fetch(address)
+            for options in (["--tls"], ["--cert", both], ["--tls", "--cert", basic], ["--tls", "--cert", both, "--key", ca]):
+                run = subprocess.run([zuv.SERVICE, "--port", "0", *options], capture_output=True, text=True, timeout=60)
+                self.assertEqual((run.returncode in (1, 2), run.stdout, run.stderr == ""), (True, "", False), run)
+
+
+if __name__ == "__main__":
+    unittest.main()
