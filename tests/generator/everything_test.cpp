@@ -35,7 +35,7 @@ constexpr char DOCUMENT[] =
     "<all:line>one</all:line><all:line>two</all:line>"
     "<all:shade>default</all:shade><all:shade>red</all:shade>"
     "<all:piece><all:id>x</all:id></all:piece><all:piece><all:id>y</all:id></all:piece>"
-    "<all:remark colour=\"red\">well</all:remark><all:remark>plain</all:remark>"
+    "<all:remark colour=\"red\">well</all:remark><all:remark border=\"red\">plain</all:remark>"
     "</all:Everything>";
 
 // The object's elements, without what the root declares.

@@ -239,6 +239,7 @@ TEST_F(memory, growing_text_keeps_what_it_has_and_doubles)
     const std::string text(200, 'a'), more(1000, 'b');
     EXPECT_EQ(soap_text_buffer_put(&ctx, text.data(), text.size()), 0);
     EXPECT_EQ(soap_text_buffer_put(&ctx, more.data(), more.size()), 0);
+    EXPECT_EQ(ctx.label_size, 2048u);
     EXPECT_EQ(std::string(ctx.label_buffer, ctx.label_index), text + more);
     EXPECT_EQ(soap_text_buffer_reset_put(&ctx, "c", 1), 0);
     EXPECT_EQ(soap_text_buffer_reserve(&ctx, 2048), 0);

@@ -486,6 +486,7 @@ constexpr const char *ROOT_HEADS[] = {
     " xmlns:p=\"urn:two\"",
     " xmlns:p=\"urn:one\"/",
     " xmlns:p='urn:one' xmlns:q=\"urn:two\"",
+    " xmlns:q=\"urn:other\" xmlns:p=\"urn:one\"",
     "\nxmlns:p=\"urn:none\" \t xmlns='urn:one' ",
     " xmlns=\"\" xmlns:p = \"urn:one\"",
     " xmlns:p=\"urn:&#x6F;ne\" xmlns:q=\" urn:one\"",
