@@ -64,7 +64,8 @@ TEST_F(call_cycle, refuses_an_endpoint_that_leads_nowhere_before_anything_is_sen
     std::vector<std::string> refused = words(
         "http: http:h/x https:443/ http:// http:///x https://:443/ http://[]/ http://[::1 http://[::1]x/ "
         "http://h:/ http://h:0/ http://h:65536/ http://h:4294967376/ http://h:-1/ http://h:+80/ http://h:8x/ "
-        "http://h::80/ http://[::1]80/ http://h:80?q http://h?q=http://i/ http://h#f http://h\\i/ http://h[/ "
+        "http://h::80/ http://[::1]x80/ http://h:80?q http://h?q=http://i/ http://h#f http://h\\i/ "
+        "http://h[/ "
         "http://h]/ htps://h/ ftp://h/ HTTPG://h/ soap.tcp://h/ httpsoap.udp.long://h/ h/x?q=http://i/");
     refused.insert(refused.end(), {"", " "});
     const std::string endless = "http://" + std::string(2000, '?');
