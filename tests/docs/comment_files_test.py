@@ -1,5 +1,5 @@
 #!/usr/bin/python3
-"""Files and folders of this tree that a comment names exist: a path as it is written, a bare name in any folder.
+"""Files and folders of this tree that a comment names exist: a path as it is written, a name alone in any folder.
 
 Usage: comment_files_test.py SOURCE_DIR GENERATED_DIR
 """

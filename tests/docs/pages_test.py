@@ -1,5 +1,5 @@
 #!/usr/bin/python3
-"""What the pages show is so: their C++ stands in programs that compile and run, their commands are run by some test, and their
+"""What the pages show is so: their C++ is in programs that compile and run, their commands are run by some test, and their
 links lead somewhere.
 
 Usage: pages_test.py SOURCE_DIR ZUV_SERVICE GUIDE README_HOST. The programs call a zuv-service started here.
@@ -19,7 +19,7 @@ import messages
 import zuv_service
 
 COMMAND = re.compile(r"^(?:script/|cmake |ctest |g\+\+ |zuv(?!::)|\.ci/)")
-# The README's commands: the file that runs each, a script or a test that takes it from the text, and how it stands there.
+# The README's commands: the file that runs each, a script or a test that takes it from the text, and how it is written there.
 RUN_BY = {
     "script/demo": (".ci/run", "script/demo\n"),
     "script/test": (".ci/run", "script/test\n"),
@@ -68,7 +68,7 @@ def check_guide(source):
 
 
 def commands(page):
-    """Those of the page's shell blocks, and what stands in back quotes and looks like one."""
+    """Those of the page's shell blocks, and what is in back quotes and looks like one."""
     lines = "".join(blocks(page, "sh") + re.findall(r"^    .*\n", page, re.M)).splitlines()
     inline = re.findall(r"``(.+?)``|`([^`\n]+)`", re.sub(r"^```.*?^```", "", page, flags=re.S | re.M))
     found = [line.partition("#")[0].strip() for line in lines] + [one or other for one, other in inline]
@@ -105,7 +105,7 @@ def check_run(program, arguments, expected, **environment):
         assert re.search(pattern, run.stdout, re.M), "not printed: %s\n%s" % (pattern, run.stdout)
 
 
-class BarePeer(http.server.BaseHTTPRequestHandler):
+class PlainPeer(http.server.BaseHTTPRequestHandler):
     """Answers each request by a response, or a fault, in which everything optional is missing."""
     protocol_version, content = "HTTP/1.1", ""
 
@@ -136,10 +136,10 @@ class BarePeer(http.server.BaseHTTPRequestHandler):
         pass
 
 
-def check_bare_answers(guide, readme_host):
+def check_plain_answers(guide, readme_host):
     """No sample takes for granted what an answer may lack."""
     for content in "empty", "nil":
-        with http.server.ThreadingHTTPServer(("127.0.0.1", 0), type("Peer", (BarePeer,), {"content": content})) as peer:
+        with http.server.ThreadingHTTPServer(("127.0.0.1", 0), type("Peer", (PlainPeer,), {"content": content})) as peer:
             threading.Thread(target=peer.serve_forever).start()
             endpoint = "http://127.0.0.1:%d/" % peer.server_address[1]
             try:
@@ -162,7 +162,7 @@ def main():
         check_run(guide, [endpoint], [r"^Ada's workshop$", r"^still here: Ada's workshop$", r"^not found: urn:not:there$",
                                       r"^\d+ bytes$"])
         check_run(readme_host, [], [r"^kept as urn:zuv:profile:"], ZUV_README_ENDPOINT=endpoint)
-    check_bare_answers(guide, readme_host)
+    check_plain_answers(guide, readme_host)
     print("%d pages, the guide's code, the README's host and commands" % len(pages))
 
 

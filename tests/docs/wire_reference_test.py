@@ -1,5 +1,5 @@
 #!/usr/bin/python3
-"""The wire reference tells every class of the library, its links lead somewhere, and its examples are valid.
+"""The wire reference shows every class of the library, its links lead somewhere, and its examples are valid.
 
 Usage: wire_reference_test.py SOURCE_DIR GENERATED_DIR
 """
@@ -41,7 +41,7 @@ def check_pages(folder):
 
 
 def check_examples(contract):
-    """Each class gets an element of its own beside the contract's, under which its example is validated."""
+    """Each class gets an element of its own next to the contract's, under which its example is validated."""
     classes = [type_ for type_ in contract.types.values() if type_.is_class and not type_.anonymous]
     schema = etree.Element(XSD + "schema", nsmap={**{p: u for u, p in contract.prefixes.items()}, "t": TEST_URI},
                            targetNamespace=TEST_URI)

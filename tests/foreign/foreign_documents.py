@@ -1,4 +1,4 @@
-"""Documents as other senders might write them, read by the library and told apart by what they mean.
+"""Documents as other senders might write them, read by the library and compared by what they mean.
 
 Usage: foreign_documents.py <rewrite> <schema directory> [documents] [seed]
 
@@ -160,7 +160,7 @@ def expected(node):
     if not isinstance(content, list):
         return (tag, None, attributes, normal(content, kind))
     c = CLASSES[actual]
-    told = spelled(actual) if c.base else None
+    type_name = spelled(actual) if c.base else None
     kept = []
     for m in c.members():
         found = [n for n in content if n[0] == m.tag]
@@ -169,7 +169,7 @@ def expected(node):
         for n in found:
             if n[3] is not Nil or m.least:
                 kept.append(expected(n))
-    return (tag, told, attributes, kept)
+    return (tag, type_name, attributes, kept)
 
 
 def normal(text, kind):
@@ -294,7 +294,7 @@ class Spelling:
         return any(m.tag == tag and not m.many for m in CLASSES[actual].members())
 
     def unknown(self, tag, scope):
-        """An element that nobody declares: a name of a member in another namespace, with content of any kind."""
+        """An element that no schema declares: a name of a member in another namespace, with content of any kind."""
         scope, declared, self.used = dict(scope), {}, set()
         local = self.rng.choice((tag.split('}')[1], 'x', 'root'))
         name = self.name('{urn:unknown:%d}%s' % (self.rng.randint(0, 2), local), scope, declared)
@@ -440,8 +440,7 @@ def main():
         mode = (STRICT if strict else 0) | (UTF_STRINGS if wide else 0)
         batch.append(b'%d %s %s %d\n' % (mode, asked.encode(), asked_tag.encode(), len(document)) + document)
         want = expected(node)
-        told = spelled(node[1] or kind)
-        cases.append((i, document, ('root', told) + want[2:]))
+        cases.append((i, document, ('root', spelled(node[1] or kind)) + want[2:]))
     for name, wrong, node, *errors in refusals(rng):
         for mode, error in zip((STRICT, 0), errors):
             typed = name if name not in ELEMENTS and '-' not in name else None

@@ -1,4 +1,4 @@
-// call_client.cpp - a host that calls Profile's create and tells what came of each call, for the tests of
+// call_client.cpp - a host that calls Profile's create and says what came of each call, for the tests of
 // servers, proxies and networks.
 //
 // Usage: call_client ENDPOINT [options]; see declare. A line for each call; the program ends with 1 if an
@@ -10,7 +10,6 @@
 #include <vector>
 
 #include <CLI/CLI.hpp>
-#include <openssl/ssl.h>
 
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_log.h>
@@ -20,12 +19,12 @@
 
 namespace {
 
-constexpr std::size_t FAULT_LIMIT = 200; // bytes of a fault that are told
+constexpr std::size_t FAULT_LIMIT = 200; // bytes of a fault that are printed
 
 // The engine's time limits: seconds, or microseconds if negative.
 struct options {
     std::string endpoint, ca, key, password, proxy, proxy_user, user;
-    bool keep_alive = false, chunked = false, gzip = false, steps = false, forget_sessions = false;
+    bool keep_alive = false, chunked = false, gzip = false, steps = false;
     int calls = 1, connect = 0, send = 0, recv = 0, whole = 0;
     int proxy_port = 0;
     std::size_t size = 0;
@@ -48,7 +47,6 @@ struct options {
         app.add_option("--key", key, "Own certificate and key");
         app.add_option("--password", password, "Of the key");
         app.add_option("--tls-flags", tls_flags, "Flags of the TLS set-up");
-        app.add_flag("--forget-sessions", forget_sessions, "Resume no TLS session");
         app.add_option("--proxy", proxy, "Host of a proxy");
         app.add_option("--proxy-port", proxy_port, "Its port");
         app.add_option("--proxy-user", proxy_user, "USER:PASSWORD for it");
@@ -66,7 +64,7 @@ const char *or_null(const std::string &text)
     return text.empty() ? nullptr : text.c_str();
 }
 
-// "user:password", parted for the engine, which borrows both.
+// "user:password", split for the engine, which borrows both.
 struct credentials {
     explicit credentials(const std::string &both)
         : user(both.substr(0, both.find(':'))), password(both.substr(both.find(':') + 1))
@@ -139,8 +137,6 @@ private:
     void call(int number)
     {
         proxy_.destroy();
-        if (options_.forget_sessions)
-            forget_session();
         if (!options_.user.empty()) { // a received head takes them away
             proxy_.auth_user = user_.user.c_str();
             proxy_.auth_password = user_.password.c_str();
@@ -150,12 +146,6 @@ private:
         if (came.code == 0 && !(options_.size == 0 ? came.own : came.whole))
             ++others_answers_;
         outcomes_.push_back({came, connections_, came.code == 0 ? "" : fault()});
-    }
-
-    void forget_session()
-    {
-        SSL_SESSION_free(proxy_.tls_session);
-        proxy_.tls_session = nullptr;
     }
 
     std::string fault()
@@ -189,7 +179,7 @@ private:
 
 int main(int argc, char **argv)
 {
-    CLI::App app("Calls create of a Profile service and tells what came of it");
+    CLI::App app("Calls create of a Profile service and says what came of it");
     options o;
     o.declare(app);
     CLI11_PARSE(app, argc, argv);

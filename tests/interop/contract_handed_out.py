@@ -1,5 +1,5 @@
 #!/usr/bin/python3
-"""The contract as a stranger's toolkit meets it: every link that zuv-service writes is answered as it stands, and every
+"""The contract as a stranger's toolkit meets it: every link that zuv-service writes is answered as it is, and every
 operation is answered with the faults that its WSDL declares, and with no others.
 
 Usage: contract_handed_out.py ZUV_SERVICE SCHEMA_DIR
@@ -23,9 +23,9 @@ WSDL = "{http://schemas.xmlsoap.org/wsdl/}"
 SOAP = "http://schemas.xmlsoap.org/soap/envelope/"
 XSI = "http://www.w3.org/2001/XMLSchema-instance"
 MAX_BODY = 60000  # bytes; small, so that documents soon are too large
-# For services that tell less than this one, or other faults.
+# For services that say less than this one, or other faults.
 UNUSED = {"Client", "Client.Authentication", "Server", "Server.ServiceUnavailable"}
-# Answered only where memory is short, and to a binary value beside the message.
+# Answered only where memory is short, and to a binary value next to the message.
 RARE = {("UpdateOrder", "authenticate", "Server.Processing"), ("Profile", "refreshCredentials", "Client.InvalidInformation")}
 
 
@@ -59,14 +59,14 @@ def check_links(schemas, address):
 
 
 def declared(schemas, port):
-    """The faults of each operation, which port type and bindings tell alike."""
+    """The faults of each operation, which port type and bindings name alike."""
     root, found = etree.parse(messages.wsdl(schemas, port)).getroot(), {}
     for operation in root.iter(WSDL + "operation"):
         names = [fault.get("name") for fault in operation.findall(WSDL + "fault")]
         assert len(names) == len(set(names)), (port, operation.get("name"))
         for fault in operation.findall(WSDL + "fault"):
-            told = fault.get("message") or fault[0].get("name")
-            assert told.rpartition(":")[2] == fault.get("name"), (port, told)
+            named = fault.get("message") or fault[0].get("name")
+            assert named.rpartition(":")[2] == fault.get("name"), (port, named)
         assert found.setdefault(operation.get("name"), set(names)) == set(names), (port, operation.get("name"))
     for message in root.findall(WSDL + "message"):
         if "Request" not in message.get("name")[-9:] and message[0].get("name") == "detail":

@@ -21,7 +21,7 @@ class Address(str):
 def started(command, end_status=0, **options):
     """Gives the Address of a program that is stopped at the end of the block.
 
-    end_status is what it has to end with when it is told to terminate; options are those of subprocess.Popen.
+    end_status is what it has to end with when it is asked to terminate; options are those of subprocess.Popen.
     """
     process = subprocess.Popen(command, stdout=subprocess.PIPE, text=True, **options)
     try:

@@ -1,4 +1,4 @@
-"""Takes SOAP messages apart, and holds what is in them against the published schemas."""
+"""Splits SOAP messages, and holds what is in them against the published schemas."""
 import copy
 import os
 import re

@@ -14,8 +14,8 @@ import messages
 import zuv_service
 from programs import Call, Caller, EOF_ERROR, LIMIT_S, TCP_ERROR, command, free_port
 
-CLIENT, SERVER = "10.213.7.1", "10.213.7.2"  # each in a namespace of its own, so nobody else sees them
-NOBODY = "10.213.7.9"
+CLIENT, SERVER = "10.213.7.1", "10.213.7.2"  # each in a namespace of its own, so nothing else sees them
+NO_HOST = "10.213.7.9"
 SLACK_MS = 5000
 
 
@@ -45,7 +45,7 @@ class Network:
                      [*far, "address", "add", SERVER + "/24", "dev", "cable"], [*far, "link", "set", "cable", "up"],
                      [*far, "link", "set", "lo", "up"],
                      # an address where packets go, and from which none come back
-                     [*near, "neigh", "add", NOBODY, "lladdr", "02:00:00:00:00:09", "dev", "cable"]):
+                     [*near, "neigh", "add", NO_HOST, "lladdr", "02:00:00:00:00:09", "dev", "cable"]):
             done = run(*step)
             if done.returncode != 0:
                 return "%s: %s" % (" ".join(step), done.stderr.strip())
@@ -77,10 +77,10 @@ class Network:
 
 
 class Steps:
-    """A call_client that makes its calls when it is told to."""
+    """A call_client that makes its calls when it is asked to."""
 
-    def __init__(self, ahead, client, *options):
-        self.process = subprocess.Popen([*ahead, client, *map(str, options), "--steps"], stdin=subprocess.PIPE,
+    def __init__(self, before, client, *options):
+        self.process = subprocess.Popen([*before, client, *map(str, options), "--steps"], stdin=subprocess.PIPE,
                                         stdout=subprocess.PIPE, text=True)
 
     def call(self):
@@ -106,10 +106,10 @@ def expect(rule, call, code, least_ms):
 def silent_network(network, client, endpoint):
     limits = ["--connect", 1, "--send", 1, "--recv", 1]
     caller = Caller(client)
-    caller.run("nobody there", "http://%s:80/" % NOBODY, *limits, "--calls", 2, codes=TCP_ERROR, least_ms=1000,
-               most_ms=1000 + SLACK_MS, ahead=network.in_near)
-    caller.run("nobody there, then a service", "http://%s:80/ %s" % (NOBODY, endpoint), *limits, codes=0, least_ms=1000,
-               most_ms=1000 + SLACK_MS, ahead=network.in_near)
+    caller.run("no host there", "http://%s:80/" % NO_HOST, *limits, "--calls", 2, codes=TCP_ERROR, least_ms=1000,
+               most_ms=1000 + SLACK_MS, before=network.in_near)
+    caller.run("no host there, then a service", "http://%s:80/ %s" % (NO_HOST, endpoint), *limits, codes=0, least_ms=1000,
+               most_ms=1000 + SLACK_MS, before=network.in_near)
     steps = Steps(network.in_near, client, endpoint, *limits, "--keep-alive", "--calls", 10, "--size", 100)
     expect("a cable", steps.call(), 0, 0)
     expect("the kept connection", steps.next(), 0, 0)
@@ -118,8 +118,8 @@ def silent_network(network, client, endpoint):
         expect("no cable, anew", steps.next(), TCP_ERROR, 1000)
     expect("the cable is back", steps.next(), 0, 0)
     steps.end()
-    caller.run("nobody there, and a brief whole", "http://%s:80/ %s" % (NOBODY, endpoint), "--connect", 30, "--whole", 1,
-               codes=TCP_ERROR, least_ms=1000, most_ms=1000 + SLACK_MS, ahead=network.in_near)
+    caller.run("no host there, and a brief whole", "http://%s:80/ %s" % (NO_HOST, endpoint), "--connect", 30, "--whole", 1,
+               codes=TCP_ERROR, least_ms=1000, most_ms=1000 + SLACK_MS, before=network.in_near)
     steps = Steps(network.in_near, client, endpoint, "--connect", 1, "--send", 1, "--recv", 30, "--keep-alive", "--calls", 10,
                   "--size", 8_000_000)
     expect("a large message", steps.call(), 0, 0)
@@ -137,14 +137,14 @@ def slow_network(network, client, endpoint):
         print("left out: delay and loss, for this kernel has no netem (%s)" % failure)
         return
     caller.run("50 ms each way", endpoint, *limits, "--keep-alive", "--calls", 3, codes=0, connections=1, least_ms=100,
-               ahead=network.in_near)
+               before=network.in_near)
     caller.run("50 ms each way, a brief limit", endpoint, "--recv", -60000, "--connect", 5, "--calls", 2, codes=EOF_ERROR,
-               least_ms=60, ahead=network.in_near)
+               least_ms=60, before=network.in_near)
     caller.run("50 ms each way, connected too late", endpoint, "--connect", -60000, "--calls", 2, codes=TCP_ERROR, least_ms=60,
-               ahead=network.in_near)
+               before=network.in_near)
     assert not network.impaired("delay", "10ms", "5ms", "loss", "5%")
     caller.run("one of 20 packets lost", endpoint, *limits, "--keep-alive", "--calls", 20, "--size", 20000, codes=0,
-               connections=1, ahead=network.in_near)
+               connections=1, before=network.in_near)
 
 
 def main():

@@ -1,4 +1,4 @@
-"""What the tests of servers and networks stand on: programs on free ports, certificates, and calls by call_client."""
+"""What the tests of servers and networks share: programs on free ports, certificates, and calls by call_client."""
 import contextlib
 import os
 import re
@@ -21,7 +21,7 @@ cert = @folder@/server.pem
 
 
 def command(name):
-    """Path of a program that Debian may have put beside the PATH of users."""
+    """Path of a program that Debian may have put outside the PATH of users."""
     return shutil.which(name, path=os.environ["PATH"] + ":/usr/sbin:/sbin") or name
 
 
@@ -52,8 +52,8 @@ def _started(arguments, ports, log, options):
 
 @contextlib.contextmanager
 def server(folder, name, arguments, configuration, count=1, **options):
-    """Runs a server that has to be told its ports; gives them. The words @folder@, @port0@, ... of the configuration,
-    and of the arguments @file@, are filled in. A port that somebody else was quicker to take costs another try."""
+    """Runs a server that has to be given its ports; gives them. The words @folder@, @port0@, ... of the configuration,
+    and of the arguments @file@, are filled in. A port that another program was quicker to take costs another try."""
     file, log_file = os.path.join(folder, name + ".conf"), os.path.join(folder, name + ".log")
     for _ in range(5):
         ports = [free_port() for _ in range(count)]
@@ -86,7 +86,7 @@ def filled(text, words):
 
 
 def stunnel(folder, address):
-    """stunnel ahead of a service without TLS, with the certificate in the folder; gives its port as a list."""
+    """stunnel before a service without TLS, with the certificate in the folder; gives its port as a list."""
     return server(folder, "stunnel", [command("stunnel4"), "@file@"], filled(STUNNEL, {"zuv": address.removeprefix("http://")}))
 
 
@@ -136,9 +136,9 @@ class Caller:
     def __init__(self, program):
         self.program = program
 
-    def run(self, rule, endpoint, *options, codes, connections=None, least_ms=0, most_ms=20000, ahead=()):
+    def run(self, rule, endpoint, *options, codes, connections=None, least_ms=0, most_ms=20000, before=()):
         """`codes`: one for all calls, a list, or a set of which each call has one. Gives the calls."""
-        run = subprocess.run([*ahead, self.program, endpoint, *map(str, options)], capture_output=True, text=True,
+        run = subprocess.run([*before, self.program, endpoint, *map(str, options)], capture_output=True, text=True,
                              timeout=LIMIT_S)
         what = (rule, run.stdout, run.stderr)
         assert run.returncode == 0 and "descriptors left: 0\n" in run.stdout, what

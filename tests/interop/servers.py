@@ -1,6 +1,6 @@
 #!/usr/bin/python3
 """Calls through servers and proxies as they are met in the field: nginx, HAProxy and stunnel before zuv-service, nginx also before
-a service on an independent stack, openssl s_server, Squid and Tinyproxy.
+a service on an independent stack, Squid and Tinyproxy. Elsewhere: sessions of TLS (tests/unit/tls_test.cpp).
 
 Usage: servers.py CALL_CLIENT ZUV ZUV_SERVICE NPM_FOLDER SCHEMA_DIR. All run from a directory of their own, on free ports of the
 loopback.
@@ -11,7 +11,6 @@ import socket
 import subprocess
 import sys
 import tempfile
-import threading
 
 import messages
 import profile_calls
@@ -197,7 +196,7 @@ def profiles_through_nginx(program, folder, words, chunked_answers):
             profiles.call("get", "--keep-alive", "--repeat", str(many))
             profiles.call("set", "--keep-alive", "--repeat", "2", profileAuthority=large,
                           given=profile_calls.SAMPLE % ("<p:profileAuthority>%s</p:profileAuthority>" % large))
-            profiles.uri = "urn:nobody"
+            profiles.uri = "urn:none"
             profiles.expect_not_found()
     with open(os.path.join(folder, "access.log"), encoding="utf-8") as file:
         log = [re.match(r"(\d+) (\d+) request=(\S+) answer=(\S+)$", line).groups() for line in file]
@@ -281,73 +280,13 @@ def through_proxies(caller, folder, words):
     caller.run("no proxy there", plain, "--proxy", "127.0.0.1", "--proxy-port", 9, codes=TCP_ERROR)
 
 
-def answer_for(request):
-    """A whole answer to a request to create."""
-    name = re.search(rb">(call-\d+)<", request)[1]
-    body = (b'<E:Envelope xmlns:E="http://schemas.xmlsoap.org/soap/envelope/"'
-            b' xmlns:p="http://www.zuv.example/xmlns/b2b/zuv/v1.0/Profile"'
-            b' xmlns:c="http://www.zuv.example/xmlns/b2b/zuv/v1.0"><E:Body><p:createResponse><c:identity><c:name>' + name +
-            b"</c:name></c:identity></p:createResponse></E:Body></E:Envelope>")
-    return b"HTTP/1.1 200 OK\r\nContent-Type: text/xml\r\nContent-Length: %d\r\n\r\n%s" % (len(body), body)
-
-
-class OpensslServer:
-    """openssl s_server, whose connections are answered through its pipes; keeps what it says of its sessions."""
-
-    def __init__(self, folder, version):
-        path = lambda name: os.path.join(folder, name)
-        self.process = subprocess.Popen(
-            ["openssl", "s_server", "-accept", "127.0.0.1:0", "-cert", path("server.crt"), "-key", path("server.key"),
-             "-" + version], stdin=subprocess.PIPE, stdout=subprocess.PIPE, stderr=subprocess.DEVNULL)
-        self.said = b""
-        for line in iter(self.process.stdout.readline, b""):
-            if found := re.match(rb"ACCEPT .*:(\d+)", line):
-                self.port = int(found[1])
-                break
-        self.thread = threading.Thread(target=self._serve)
-        self.thread.start()
-
-    def _serve(self):
-        request = b""
-        while data := os.read(self.process.stdout.fileno(), 65536):
-            self.said += data
-            request += data
-            if b"</SOAP-ENV:Envelope>" in request:
-                self.process.stdin.write(answer_for(request))
-                self.process.stdin.flush()
-                request = b""
-
-    def resumed(self):
-        """Stops it; of how many connections it resumed the session."""
-        self.process.terminate()
-        self.process.wait(LIMIT_S)
-        self.thread.join(LIMIT_S)
-        self.process.stdin.close()
-        self.process.stdout.close()
-        return len(re.findall(rb"^Reused session-id", self.said, re.MULTILINE))
-
-
-def resumed_sessions(caller, folder):
-    for version in ("tls1_2", "tls1_3"):
-        for forgets in (False, True):
-            peer = OpensslServer(folder, version)
-            try:
-                caller.run("s_server %s%s" % (version, ", sessions forgotten" if forgets else ""),
-                           "https://localhost:%d/" % peer.port, "--ca", os.path.join(folder, "ca.pem"), "--calls", 5,
-                           *(["--forget-sessions"] if forgets else []), codes=0, connections=5)
-            finally:
-                reused = peer.resumed()
-            assert reused == (0 if forgets else 4), (version, forgets, peer.said.decode(errors="replace"))
-            print("    of 5 connections the server resumed the session of %d" % reused)
-
-
 def main():
     client, program, service, npm_folder, schemas = (os.path.abspath(argument) for argument in sys.argv[1:])
     caller = Caller(client)
     with tempfile.TemporaryDirectory() as folder, zuv_service.running_npm(npm_folder, schemas) as npm, \
             zuv_service.running(service) as zuv, zuv_service.running(service, "--chunked") as chunked, \
             socket.create_server(("127.0.0.1", 0)) as silent, socket.socket() as dead:
-        dead.bind(("127.0.0.1", 0))  # bound, but nobody listens
+        dead.bind(("127.0.0.1", 0))  # bound, but nothing listens
         os.chmod(folder, 0o755)  # a proxy that gives up its privileges reads its files
         certificates(folder)
         password_file(os.path.join(folder, "users"))
@@ -357,7 +296,6 @@ def main():
         profiles_through_nginx(program, folder, {**words, "zuv": chunked.removeprefix("http://")}, True)
         for part in through_nginx, through_haproxy, through_stunnel, through_proxies:
             part(caller, folder, words)
-        resumed_sessions(caller, folder)
 
 
 if __name__ == "__main__":

@@ -25,7 +25,7 @@ def counted(caller, folder, rule, endpoint, calls, *options):
     """The system calls of a whole run, by name."""
     file = os.path.join(folder, "strace")
     caller.run("%s, %d calls" % (rule, calls), endpoint, "--keep-alive", "--calls", calls, *options, codes=0, connections=1,
-               ahead=["strace", "-f", "-c", "-o", file])
+               before=["strace", "-f", "-c", "-o", file])
     with open(file, encoding="utf-8") as table:
         rows = re.findall(r"^ *[\d.]+ +[\d.]+ +\d+ +(\d+)(?: +\d+)? +(\w+)$", table.read(), re.MULTILINE)
     return collections.Counter({name: int(count) for count, name in rows if name != "total"})

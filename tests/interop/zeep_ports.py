@@ -1,6 +1,6 @@
 #!/usr/bin/python3
 """An independent SOAP toolkit calls every operation of zuv-service, knowing nothing but the WSDLs: for SOAP 1.1 the files, for
-SOAP 1.2 what the service itself hands out at the address of the port, which tells the port's address too.
+SOAP 1.2 what the service itself hands out at the address of the port, which gives the port's address too.
 
 Usage: zeep_ports.py ZUV_SERVICE SCHEMA_DIR. Every request and every answer is validated against the published schemas.
 """

@@ -1,6 +1,6 @@
 #!/bin/bash
 # The packages on Debian 12 with nothing else. Usage: clean_root.sh PACKAGES WORK, as root.
-#   bare root:       runtime and tools install and run
+#   plain root:      runtime and tools install and run
 #   with compilers:  all three install; hosts are built in both ways and run
 # The two roots are made once, by debootstrap, and kept as archives in WORK; making them takes about two minutes.
 # Exit status 77: skipped, for want of root or of debootstrap.
@@ -41,7 +41,7 @@ within apt-get update -q >"$work/apt.log" 2>&1
 install '/packages/libzuv-client-pro1*.deb' '/packages/zuv-tools*.deb'
 within zuv-service --help >/dev/null
 within ldconfig -p | grep libzuv_client_pro.so.1.5.1 >/dev/null
-echo "ok    runtime and tools install on a bare root"
+echo "ok    runtime and tools install on a plain root"
 
 restore compilers
 within apt-get update -q >"$work/apt.log" 2>&1
@@ -53,5 +53,5 @@ for way in cmake pkg-config; do
 done
 within apt-get purge -y -q libzuv-client-pro1.5.1 libzuv-client-pro-dev zuv-tools >"$work/apt.log" 2>&1
 left=$(find "$root/usr" -ipath '*zuv*' -not -path '*/python3*')
-[ -z "$left" ] || { echo "left behind: $left"; exit 1; }
-echo "ok    nothing is left behind"
+[ -z "$left" ] || { echo "still there: $left"; exit 1; }
+echo "ok    nothing stays"

@@ -1,5 +1,5 @@
 #!/bin/sh
-# Hosts built from the packages alone, extracted beside the system. Usage: extracted.sh WAY PACKAGES WORK; see
+# Hosts built from the packages alone, extracted next to the system. Usage: extracted.sh WAY PACKAGES WORK; see
 # build_and_run_host.sh.
 set -eu
 root=$3/root

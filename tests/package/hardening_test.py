@@ -23,7 +23,7 @@ def findings(path, program):
     yield "a stack that isn't executed", dict(segments).get("GNU_STACK") == "RW "
     yield "nothing both written and executed", segments and not any("W" in flags and "E" in flags for _, flags in segments)
     yield "guarded stack frames", "__stack_chk_fail" in imported
-    if not program: # a program has no arrays of its own that anything is copied into, so nothing there tells
+    if not program: # a program has no arrays of its own that anything is copied into, so nothing there shows it
         yield "checked copies", {"__memcpy_chk", "__snprintf_chk"} <= set(imported)
     if program:
         yield "loaded anywhere", re.search(r"Type: +DYN", head) and re.search(r"\(FLAGS_1\) .*PIE", dynamic)

@@ -1,5 +1,5 @@
 #!/usr/bin/python3
-"""The README's commands for who installs the library and builds a host, run as they stand there.
+"""The README's commands for who installs the library and builds a host, run as they are written there.
 
 Usage: readme_test.py SOURCE_DIR BUILD_DIR PACKAGES. The build's place and the service's address are put in for those that the
 README names; nothing is installed outside a folder for the time of the test.
@@ -33,11 +33,11 @@ def run(command, folder, **environment):
 
 
 def check_packages(readme, prefix):
-    """The packages have the names that the README tells, and hold the same files as the installed tree."""
-    told = found(r"makes three Debian packages, (.*?);", readme)
+    """The packages have the names that the README gives, and hold the same files as the installed tree."""
+    named = found(r"makes three Debian packages, (.*?);", readme)
     files = glob.glob(os.path.join(packages, "*.deb"))
     names = {run("dpkg-deb -f %s Package" % file, packages).strip() for file in files}
-    assert names == set(re.findall("`(.*?)`", told)), (names, told)
+    assert names == set(re.findall("`(.*?)`", named)), (names, named)
     held = {line.removeprefix("./usr/") for file in files
             for line in run("dpkg-deb --fsys-tarfile %s | tar -t" % file, packages).split() if not line.endswith("/")}
     laid = {os.path.relpath(os.path.join(place, file), prefix) for place, _, files in os.walk(prefix) for file in files}

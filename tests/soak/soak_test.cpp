@@ -2,26 +2,10 @@
 // so does the reference service.
 //
 // ZUV_SOAK_CALLS in the environment: how many calls each test makes.
-#include <algorithm>
 #include <chrono>
-#include <cstdio>
-#include <cstdlib>
-#include <ctime>
-#include <filesystem>
-#include <fstream>
-#include <string>
-#include <vector>
+#include <csignal>
 
-#include <gtest/gtest.h>
-#include <unistd.h>
-
-#include <zuv_client_pro/ProfileSoapBindingProxy.h>
-#include <zuv_client_pro/protocol.h>
-#include <zuv_client_pro/soap_error.h>
-
-#include "soak/service_process.h"
 #include "support/call_wire.h"
-#include "support/failing_malloc.h"
 #include "support/scripted_client.h"
 #include "support/socket_calls.h"
 
@@ -63,6 +47,42 @@ footprint footprint_of(pid_t process)
             std::distance(std::filesystem::directory_iterator(place + "/fd"), {})};
 }
 
+// A zuv-service on a free port, with a folder of its own; both are gone at the end.
+class service_process {
+public:
+    service_process()
+        : folder_(std::filesystem::temp_directory_path() / "zuv-soak-XXXXXX"), made_(mkdtemp(folder_.data())),
+          output_(popen(
+              ("echo $$; exec " ZUV_SERVICE_PROGRAM " --port 0 --database " + folder_ + "/d.db").c_str(),
+              "r"))
+    {
+        EXPECT_EQ(std::fscanf(output_, "%d listening on http://%*[^:]:%d", &pid_, &port_), 2);
+    }
+    ~service_process()
+    {
+        if (output_ != nullptr)
+            end(SIGKILL);
+        std::filesystem::remove_all(folder_);
+    }
+    service_process(const service_process &) = delete;
+    service_process &operator=(const service_process &) = delete;
+
+    int port() const { return port_; } // 0: it did not start
+    pid_t pid() const { return pid_; }
+    // Its exit status as waitpid gives it.
+    int end(int signal)
+    {
+        kill(pid_, signal);
+        return pclose(std::exchange(output_, nullptr));
+    }
+
+private:
+    std::string folder_;
+    const char *made_;
+    std::FILE *output_;
+    int pid_ = 0, port_ = 0;
+};
+
 // A process that is looked at after each stretch.
 class watched {
 public:
@@ -75,7 +95,7 @@ public:
         largest_.kilobytes = std::max(largest_.kilobytes, now.kilobytes);
         largest_.descriptors = std::max(largest_.descriptors, now.descriptors);
     }
-    void tell() const { std::printf(", %s %ld KB", name_, footprint_of(process_).kilobytes); }
+    void print() const { std::printf(", %s %ld KB", name_, footprint_of(process_).kilobytes); }
     void expect_flat() const
     {
         std::printf("%s: %ld KB and %td descriptors, at most %ld KB and %td\n", name_, settled_.kilobytes,
@@ -115,7 +135,7 @@ template <class Call> void soak(Call call, pid_t service = 0)
             const std::chrono::duration<double> elapsed = std::chrono::steady_clock::now() - began;
             std::printf("  %d of %d calls, %.0f a second", done, all, done / elapsed.count());
             for (const watched &process : processes)
-                process.tell();
+                process.print();
             std::puts("");
             std::fflush(stdout);
         }
@@ -130,34 +150,33 @@ template <class Call> void soak(Call call, pid_t service = 0)
 }
 
 // A document with something of everything that a call allocates.
-class long_run : public testing::Test {
-protected:
-    long_run()
+struct rich_document {
+    rich_document()
     {
-        identity.name = &name;
-        contact.name = &name;
+        identity.name = contact.name = &name;
         contact.email = {"a@workshop.example", "b@workshop.example"};
-        document.identity = &identity;
-        document.contact = {&contact, &contact, &contact};
-        document.profileAuthority = &text;
+        profile.identity = &identity;
+        profile.contact = {&contact, &contact, &contact};
+        profile.profileAuthority = &text;
     }
-
     std::string name = "a workshop whose name does not fit in place", text = std::string(2000, 'x');
     protocol__Identity identity;
     protocol__Contact contact;
-    protocolProfile__ProfileContent document;
+    protocolProfile__ProfileContent profile;
 };
 
-TEST_F(long_run, with_the_service)
+TEST(long_run, with_the_service)
 {
+    rich_document document;
     service_process service;
     ASSERT_NE(service.port(), 0);
-    const std::string url = service.url("Profile");
+    const std::string url =
+        "http://127.0.0.1:" + std::to_string(service.port()) + "/zuv/v1.0/services/Profile";
     ProfileSoapBindingProxy proxy(url.c_str(), static_cast<int>(MODE_KEEP_ALIVE));
     soap_log_set_received(&proxy, nullptr);
     soap_log_set_sent(&proxy, nullptr);
     __protocolProfile__createResponse created{};
-    ASSERT_EQ(0, proxy.create(&document, created));
+    ASSERT_EQ(0, proxy.create(&document.profile, created));
     std::string uri = created.result->thisURI.at(0), unknown = "urn:none";
     protocol__Header header;
     _protocolProfile__getRequest request;
@@ -171,16 +190,16 @@ TEST_F(long_run, with_the_service)
         proxy.soap_header(&header);
         const int error = proxy.get(&request, got);
         const bool right =
-            held ? error == 0 && *got.result->profileAuthority == text : error == SOAP_CLIENT_FAULT;
+            held ? error == 0 && *got.result->profileAuthority == document.text : error == SOAP_CLIENT_FAULT;
         proxy.destroy();
         return right;
     };
     soak(get, service.pid());
-    EXPECT_EQ(0, service.stop());
+    EXPECT_EQ(0, service.end(SIGTERM));
 }
 
 // The server is a thread of this process and is watched with it.
-TEST_F(long_run, over_tls)
+TEST(long_run, over_tls)
 {
     const scripted::server server(scripted::serve_well, true);
     scripted::client caller(server);
@@ -194,8 +213,9 @@ TEST_F(long_run, over_tls)
     EXPECT_EQ(caller.connections, calls() / ANEW);
 }
 
-TEST_F(long_run, in_memory)
+TEST(long_run, in_memory)
 {
+    rich_document document;
     call_wire wire;
     ProfileSoapBindingProxy proxy(static_cast<int>(MODE_KEEP_ALIVE));
     wire.carry(proxy);
@@ -211,7 +231,8 @@ TEST_F(long_run, in_memory)
     soak([&](int) {
         wire.sent.clear();
         wire.answers.push_back(answer);
-        const bool right = proxy.set(&document, response) == 0 && response.result->contact.size() == 2 &&
+        const bool right = proxy.set(&document.profile, response) == 0 &&
+                           response.result->contact.size() == 2 &&
                            response.result->contact[0] == response.result->contact[1];
         proxy.soap_noheader(); // the one received
         proxy.destroy();

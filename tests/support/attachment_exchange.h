@@ -1,4 +1,4 @@
-// attachment_exchange.h - small SOAP messages with binary values beside them, written and read.
+// attachment_exchange.h - small SOAP messages with binary values next to them, written and read.
 //
 // A message is an Envelope whose Body holds elements "data". For tests and fuzz targets of attachments; the
 // expectations of the tests are in attachment_checks.h.
@@ -81,7 +81,7 @@ inline int send(memory_wire &wire, const std::deque<value> &values, bool length_
     return counts && length_is_known && length != wire.sent().size() ? LENGTH_DIFFERS : 0;
 }
 
-// A whole HTTP request, to nobody.
+// A whole HTTP request that goes nowhere.
 inline int send_request(memory_wire &wire, const std::deque<value> &values)
 {
     wire.on_open = [](soap *, const char *, const char *, int) { return -1; };

@@ -30,10 +30,10 @@ public:
 std::size_t allocations();
 
 // Blocks that this thread was handed out, less those that it has freed. It may be negative where others'
-// blocks are freed: only a difference tells something.
+// blocks are freed: only a difference says something.
 std::ptrdiff_t held();
 
-// When this thread frees `block`, its first `length` bytes are copied to `copy` as they stand then.
+// When this thread frees `block`, its first `length` bytes are copied to `copy` as they are then.
 void watch_free(const void *block, char *copy, std::size_t length);
 
 // Runs `call` with allocation 1, 2, 3... refused, each followed by `check`, which may assert, until a run

@@ -15,6 +15,7 @@
 #include <filesystem>
 #include <fstream>
 #include <functional>
+#include <iterator>
 #include <memory>
 #include <random>
 #include <set>
@@ -63,6 +64,13 @@ inline std::string in_chunks_of(std::size_t size, const std::string &body)
     for (std::size_t at = 0; at < body.size(); at += size)
         chunks += chunk(body.substr(at, size));
     return chunks + "0\r\n\r\n";
+}
+
+// The parts of a text between its blanks.
+inline std::vector<std::string> words(const std::string &text)
+{
+    std::istringstream all(text);
+    return {std::istream_iterator<std::string>(all), {}};
 }
 
 inline std::string repeat_text(const std::string &text, std::size_t times)

@@ -1,4 +1,4 @@
-// loopback.h - what tests of the transport stand on: peers on the loopback, a context, a count of open
+// loopback.h - what tests of the transport share: peers on the loopback, a context, a count of open
 // descriptors.
 #pragma once
 
@@ -82,7 +82,7 @@ public:
     {}
     ~peer()
     {
-        shutdown(listener_.socket(), SHUT_RDWR); // wakes a thread that nobody has come to
+        shutdown(listener_.socket(), SHUT_RDWR); // wakes a thread to which no client has come
         thread_.join();
     }
     int port() const { return listener_.port(); }

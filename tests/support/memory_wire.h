@@ -36,7 +36,7 @@ public:
         given = 0;
         receives = 0;
     }
-    // The same in pieces: the first has so many bytes, each later one at most as many as told.
+    // The same in pieces: the first has so many bytes, each later one at most `later`.
     void receive(std::string bytes, std::size_t first, std::size_t later)
     {
         receive(std::move(bytes));
@@ -90,6 +90,21 @@ struct read_wire : memory_wire {
     }
     int result;
 };
+
+// The program's namespaces, those of the envelope and of encodings as a version of SOAP has them.
+inline const soap_namespace *namespaces_of(int version)
+{
+    static const std::vector<soap_namespace> rows = [] {
+        const soap_namespace *const first = soap_program_namespaces, *last = first;
+        while (last->prefix)
+            ++last;
+        std::vector<soap_namespace> copy(first, last + 1);
+        copy[0].uri = "http://www.w3.org/2003/05/soap-envelope";
+        copy[1].uri = "http://www.w3.org/2003/05/soap-encoding";
+        return copy;
+    }();
+    return version == 1 ? soap_program_namespaces : rows.data();
+}
 
 // Value of a line of an HTTP head, or "(none)".
 inline std::string line_of(const std::string &head, const std::string &key)

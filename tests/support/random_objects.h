@@ -24,7 +24,7 @@ namespace random_objects {
 
 class source;
 
-// What can be done with an object whose class only its type id tells.
+// What can be done with an object of which only the type id is known.
 struct class_row {
     void (*fill)(source &random, void *object, int depth);
     bool (*equal)(const void *one, const void *other);
@@ -69,14 +69,14 @@ public:
         }
     }
 
-    // What stands elsewhere already as a value of the type, now and then; else null.
+    // A value of the type that is in another place already, now and then; else null.
     template <class T> T *again(int type_id)
     {
         const std::vector<void *> &made = made_[type_id];
         return shares_ && !made.empty() && chance(3) ? static_cast<T *>(made[below(made.size())]) : nullptr;
     }
-    // Lets a value stand elsewhere. An object is to stand only where its very class is asked for: a reference
-    // cannot tell a reader that the class is a derived one.
+    // Lets a value be in other places, an object only where its very class is asked for: a reference cannot say
+    // that the class is a derived one.
     void lend(int type_id, void *value) { made_[type_id].push_back(value); }
 
     // An object of the class, or now and then of one derived from it.

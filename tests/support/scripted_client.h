@@ -40,7 +40,7 @@ public:
     }
     client &operator=(const client &) = delete;
 
-    // The code of one call, of this client or through a copy of its proxy. `padding`: bytes of text besides.
+    // The code of one call, of this client or through a copy of its proxy. `padding`: bytes of text added.
     int call(std::size_t padding = 0) { return call_through(proxy, padding); }
     int call_through(ProfileSoapBindingProxy &any, std::size_t padding = 0)
     {

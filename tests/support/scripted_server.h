@@ -1,6 +1,6 @@
 // scripted_server.h - a server that answers calls of Profile's create as a test has it, over TCP or TLS.
 //
-// It tells whose answer an answer is: the name in the request comes back in it.
+// An answer shows whose it is: the name in the request comes back in it.
 #pragma once
 
 #include <atomic>

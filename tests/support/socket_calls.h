@@ -7,8 +7,8 @@
 // Names that end in ".test" resolve to the loopback: "two.test" to 127.0.0.9 and then 127.0.0.1, "six.test"
 // to ::1 and then 127.0.0.1, as "localhost" does on most machines, all else to 127.0.0.1.
 //
-// The monotonic clock may be set ahead of the system's, so that a test of time limits takes no time; the wall clock
-// may be set back.
+// The monotonic clock may be faster than the system's, so that a test of time limits takes no time; the wall
+// clock may be set back.
 #pragma once
 
 #include <atomic>

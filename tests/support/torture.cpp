@@ -26,7 +26,7 @@ namespace torture {
 
 namespace {
 
-constexpr std::size_t BLOCKS_MAX = 1 << 18; // live blocks of the library that are told apart
+constexpr std::size_t BLOCKS_MAX = 1 << 18; // live blocks of the library that are kept track of
 constexpr std::size_t PATHS_MAX = 1 << 16;  // ways to an allocation
 constexpr std::uint64_t LOOKED_AT = 20000;  // allocations whose way is looked at
 constexpr int PATH_DEPTH = 5;               // functions of the library that make up a way
@@ -164,7 +164,7 @@ int find_ranges(dl_phdr_info *object, std::size_t, void *)
     return 0;
 }
 
-_Unwind_Reason_Code tell_frame(_Unwind_Context *context, void *argument)
+_Unwind_Reason_Code print_frame(_Unwind_Context *context, void *argument)
 {
     int &frames = *static_cast<int *>(argument);
     char text[256];
@@ -179,7 +179,7 @@ void on_crash(int signal)
     inside = true;
     report("crash %d", signal);
     int frames = 0;
-    _Unwind_Backtrace(tell_frame, &frames);
+    _Unwind_Backtrace(print_frame, &frames);
     report("\n");
     _exit(98); // not by the signal: a test that waits for it would take a core file's time
 }
@@ -314,19 +314,11 @@ void *operator new[](std::size_t size, const std::nothrow_t &) noexcept
 {
     return new_block(size, CALLER);
 }
-void operator delete(void *block) noexcept
-{
-    std::free(block);
-}
-void operator delete[](void *block) noexcept
+void operator delete(void *block) noexcept // those of arrays end here, too
 {
     std::free(block);
 }
 void operator delete(void *block, std::size_t) noexcept
-{
-    std::free(block);
-}
-void operator delete[](void *block, std::size_t) noexcept
 {
     std::free(block);
 }

@@ -1,7 +1,7 @@
 // torture.h - refuses one allocation of the library in a whole process, chosen from outside by
 // script/torture.
 //
-// Only in a build with ZUV_SHARED_OBJECTS, where the library is a shared object and its calls can be told
+// Only in a build with ZUV_SHARED_OBJECTS, where the library is a shared object and its calls can be distinguished
 // from those of a test or of GoogleTest: an allocation belongs to the library if the innermost function that
 // is the library's or the program's, below the C++ runtime, is the library's. In zuv-service its own are
 // meant as well. It is inert without the environment:

@@ -19,7 +19,7 @@ std::string sample(const std::string &name)
 struct sample_case {
     const char *name;
     const char *summary;
-    const char *end; // the message ends with this text; anything after it is nobody's
+    const char *end; // the message ends with this text; anything after it is ignored
 };
 
 // What is announced as encoded is handed out as it came: its receiver knows the encoding from the record.
@@ -68,7 +68,7 @@ TEST(samples, are_the_same_through_the_callbacks)
     }
 }
 
-// Each length of each record tells something else than what is there.
+// Each length of each record gives something else than what is there.
 TEST(wrong_messages, of_records_with_false_lengths_are_refused)
 {
     using namespace dime_bytes;
@@ -89,7 +89,7 @@ TEST(wrong_messages, of_records_with_false_lengths_are_refused)
                 right = right << 8 | static_cast<unsigned char>(each[at + i]);
             for (const std::uint32_t lie : {right - 1, right + 4, right + 8, most, most - 3}) {
                 if (lie + 1 == right && (at == 6 || (at == 4 && start == 0)))
-                    continue; // a type, or the message's id, one shorter: followed by what nobody checks
+                    continue; // a type, or the message's id, one shorter: followed by what no one checks
                 std::string changed = bytes;
                 changed.replace(start + at, static_cast<std::size_t>(width), number(lie & most, width));
                 EXPECT_EQ(reception(changed).summary().substr(0, 1), "!")

@@ -45,19 +45,18 @@ const child_row CHILDREN[] = {
     {"calls on a copy", [](std::unique_ptr<client> &own) { return client(*own).call() == 0; }, 1},
 };
 
-// The exit status of a child that does so.
-int child_that(const child_row &row, std::unique_ptr<client> &own)
+// In the child: does the work, and ends.
+[[noreturn]] void be_child(const std::function<bool()> &work)
 {
-    const pid_t child = fork();
-    if (child == 0) {
-        alarm(CHILD_LIMIT_S);
-        const bool right = row.act(own);
-        own.reset();
-        _exit(right ? NOTHING_SAID : 1);
-    }
+    alarm(CHILD_LIMIT_S);
+    _exit(work() ? NOTHING_SAID : 1);
+}
+
+void expect_right(pid_t child)
+{
     int status = 0;
     EXPECT_EQ(waitpid(child, &status, 0), child);
-    return WIFEXITED(status) ? WEXITSTATUS(status) : -WTERMSIG(status);
+    EXPECT_EQ(status, NOTHING_SAID << 8);
 }
 
 class forked : public tls_peers::tls_test {};
@@ -72,7 +71,14 @@ TEST_F(forked, a_child_leaves_the_connections_of_its_parent_alone)
             ASSERT_EQ(soap_cancel_arm(&own->proxy), SOAP_OK);
             ASSERT_EQ(own->call(), 0);
             const int socket = own->proxy.socket;
-            EXPECT_EQ(child_that(row, own), NOTHING_SAID);
+            const pid_t child = fork();
+            if (child == 0)
+                be_child([&] {
+                    const bool right = row.act(own);
+                    own.reset();
+                    return right;
+                });
+            expect_right(child);
             EXPECT_EQ(own->call(), 0);
             EXPECT_EQ(own->proxy.socket, socket);
             EXPECT_EQ(own->connections, 1) << "the parent's connection goes on";
@@ -94,18 +100,16 @@ TEST_F(forked, a_child_made_in_a_cancelled_call_makes_calls_of_its_own)
         return child == 0 ? SOAP_USER_ERROR : SOAP_OK;
     };
     const int error = own->call();
-    if (child == 0) {
-        alarm(CHILD_LIMIT_S);
-        own->proxy.on_connect = nullptr;
-        const bool right = error != 0 && own->call() == 0;
-        own.reset();
-        _exit(right ? NOTHING_SAID : 1);
-    }
+    if (child == 0)
+        be_child([&] {
+            own->proxy.on_connect = nullptr;
+            const bool right = error != 0 && own->call() == 0;
+            own.reset();
+            return right;
+        });
     EXPECT_NE(error, 0);
     EXPECT_EQ(soap_call_report(&own->proxy)->ended_by, ENDED_BY_CANCEL);
-    int status = 0;
-    EXPECT_EQ(waitpid(child, &status, 0), child);
-    EXPECT_EQ(status, NOTHING_SAID << 8);
+    expect_right(child);
 }
 
 // The pattern of servers that fork for each client.
@@ -118,16 +122,12 @@ TEST_F(forked, a_child_serves_the_client_that_its_parent_accepted)
         tcp_connect(caller.get(), "http://peer/", "127.0.0.1", loopback::port_of(serving->master_socket)), 0);
     ASSERT_GE(soap_accept(serving.get()), 0);
     const pid_t child = fork();
-    if (child == 0) {
-        alarm(CHILD_LIMIT_S);
-        const bool right = tcp_send(serving.get(), "hello", 5) == 0 && tcp_disconnect(serving.get()) == 0;
-        _exit(right ? NOTHING_SAID : 1);
-    }
+    if (child == 0)
+        be_child(
+            [&] { return tcp_send(serving.get(), "hello", 5) == 0 && tcp_disconnect(serving.get()) == 0; });
     EXPECT_EQ(soap_force_close(serving.get()), 0);
     EXPECT_EQ(loopback::read_bytes(caller->socket, 100), "hello");
-    int status = 0;
-    EXPECT_EQ(waitpid(child, &status, 0), child);
-    EXPECT_EQ(status, NOTHING_SAID << 8);
+    expect_right(child);
 }
 
 } // namespace

@@ -1,5 +1,6 @@
-// Python's email package at the other end: it takes apart what the library sends, and composes what the
+// Python's email package at the other end: it splits what the library sends, and composes what the
 // library reads.
+#include "support/annotated_bytes.h"
 #include "support/attachment_exchange.h"
 #include "support/python_batch.h"
 
@@ -13,14 +14,6 @@ std::string hex(const std::string &bytes)
     for (const char c : bytes)
         text += {"0123456789abcdef"[static_cast<unsigned char>(c) >> 4], "0123456789abcdef"[c & 15]};
     return text;
-}
-
-std::string unhex(const std::string &text)
-{
-    std::string bytes;
-    for (std::size_t i = 0; i + 1 < text.size(); i += 2)
-        bytes += static_cast<char>(std::stoi(text.substr(i, 2), nullptr, 16));
-    return bytes;
 }
 
 // Prints for each message, an HTTP request in hexadecimal, its type, and the id, type and content of each
@@ -44,7 +37,7 @@ for line in lines:
     print("|".join(found))
 )";
 
-TEST(python_email, takes_apart_what_is_sent)
+TEST(python_email, splits_what_is_sent)
 {
     const std::string text = "line one\r\nline two";
     const std::string binary("\r\n--bb\0\xFF\r\n--=_zuv_\r", 19);
@@ -65,7 +58,7 @@ TEST(python_email, takes_apart_what_is_sent)
     EXPECT_EQ(python_batch(TAKE_APART, requests), expected);
 }
 
-// Prints messages: their HTTP form in hexadecimal, and what has to be read. The parts stand in every order,
+// Prints messages: their HTTP form in hexadecimal, and what has to be read. The parts come in every order,
 // with and without start, preamble and epilogue, and with parameters that are hard to split.
 constexpr char COMPOSE[] = R"(
 import itertools
@@ -103,8 +96,8 @@ TEST(python_email, is_read)
     const std::vector<std::string> composed = python_batch(COMPOSE, {});
     ASSERT_EQ(composed.size(), 24U * 2 + 6 * 2);
     for (const std::string &line : composed) {
-        const std::string message = unhex(line.substr(0, line.find(' ')));
-        const std::string expected = unhex(line.substr(line.find(' ') + 1));
+        const std::string message = annotated_bytes(line.substr(0, line.find(' ')));
+        const std::string expected = annotated_bytes(line.substr(line.find(' ') + 1));
         ASSERT_EQ(reception(message).summary(), expected) << message;
         ASSERT_EQ(reception(message, 0, 1, 1).summary(), expected) << message;
     }

@@ -118,6 +118,10 @@ TEST_F(tcp_service, a_proxy_that_refuses_a_tunnel_is_an_error_that_says_so_and_c
         {"POST / HTTP/1.1\r\n@\r\n", SOAP_HTTP_ERROR, nullptr},
         {"GET / HTTP/1.1\r\n@\r\n", SOAP_HTTP_ERROR, nullptr},
         {"\x16\x03 no HTTP at all\r\n@\r\n", SOAP_HTTP_ERROR, nullptr},
+        {"HTTP/1.1 99 Low\r\n@\r\n", SOAP_HTTP_ERROR, nullptr},
+        {"HTTP/1.1 1000 High\r\n@\r\n", SOAP_HTTP_ERROR, nullptr},
+        {"HTTP/1.1 999 Most\r\n@\r\n", 999, nullptr},
+        {"HTTP/1.1 407 Cut\r\n", 407, nullptr},
         {"", SOAP_EOF, nullptr},
     };
     for (const auto &c : cases) {
@@ -146,8 +150,12 @@ TEST_F(tcp_service, a_proxy_that_refuses_a_tunnel_is_an_error_that_says_so_and_c
                                   ctx->keep_alive, std::string(ctx->auth_user),
                                   std::string(ctx->auth_password), std::string(ctx->auth_realm),
                                   std::string(ctx->http_content), std::string(ctx->endpoint),
-                                  std::string(ctx->action ? ctx->action : ""), ctx->status);
+                                  text_of(ctx->action), ctx->status, ctx->mode, ctx->message_count,
+                                  text_of(ctx->forwarded_for));
             };
+            ctx->mode = MODE_STORE | MODE_KEEP_ALIVE;
+            ctx->message_count = 42;
+            ctx->forwarded_for = "10.0.0.1";
             soap_parse_endpoint(ctx.get(), "https://far.example/x");
             const auto before = state();
             EXPECT_EQ(tcp_connect(ctx.get(), ctx->endpoint, "far.example", 443), -1) << answer;
@@ -164,6 +172,27 @@ TEST_F(tcp_service, a_proxy_that_refuses_a_tunnel_is_an_error_that_says_so_and_c
         EXPECT_TRUE(head.starts_with("CONNECT far.example:443 HTTP/1.1\r\n")) << head;
         EXPECT_NE(head.find("Proxy-Authorization: Basic dXNlcjpzZWNyZXQ=\r\n"), std::string::npos) << head;
         EXPECT_EQ(head.find("\r\nAuthorization: ") != std::string::npos, c.error == 407) << head;
+    }
+}
+
+TEST_F(tcp_service, what_a_hook_says_of_a_tunnel_is_the_end_of_it)
+{
+    const peer proxy(wait_for_end, 2);
+    for (const bool post : {true, false}) {
+        context ctx(MODE_KEEP_ALIVE);
+        ctx->proxy_host = "127.0.0.1";
+        ctx->proxy_port = proxy.port();
+        ctx->status = STATUS_POST;
+        if (post)
+            ctx->on_post = [](soap *, const char *, const char *, int, const char *, const char *,
+                              std::uint64_t) { return 77; };
+        else
+            ctx->on_read_head = [](soap *c) { return c->error = SOAP_OUT_OF_MEMORY; };
+        EXPECT_EQ(tcp_connect(ctx.get(), "https://far.example/", "far.example", 443), -1);
+        EXPECT_EQ(ctx->error, post ? 77 : SOAP_OUT_OF_MEMORY);
+        EXPECT_EQ(ctx->status, STATUS_POST);
+        EXPECT_EQ(ctx->keep_alive, 0);
+        EXPECT_EQ(ctx->socket, -1);
     }
 }
 

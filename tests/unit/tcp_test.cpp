@@ -26,6 +26,22 @@ struct connected : context {
     explicit connected(int port) { EXPECT_GE(open_to(*this, port), 0); }
 };
 
+// A pipe in the place of a socket.
+struct pipe_ends {
+    explicit pipe_ends(context &ctx)
+    {
+        EXPECT_EQ(pipe(ends), 0);
+        ctx->send_fd = ends[1];
+        ctx->recv_fd = ends[0];
+    }
+    ~pipe_ends()
+    {
+        for (const int end : ends)
+            close(end);
+    }
+    int ends[2];
+};
+
 // --- connecting ---
 
 TEST_F(tcp, options_are_set_on_a_connected_socket)
@@ -78,26 +94,19 @@ TEST_F(tcp, sockets_block_unless_a_transfer_has_a_limit)
 TEST_F(tcp, a_failed_attempt_names_its_step_and_leaves_no_socket)
 {
     const peer server(wait_for_end);
-    int closed_port;
-    {
-        const bound_socket gone;
-        closed_port = gone.port();
-    }
-    const char *const host = "127.0.0.1";
-    {
-        context ctx;
-        EXPECT_EQ(tcp_connect(ctx.get(), "http://x/", "a..b", 80), -1);
-        expect_failure(ctx, 28, gai_strerror(EAI_NONAME), "getaddrinfo failed in tcp_connect()");
-        EXPECT_EQ(tcp_connect(ctx.get(), "http://x/", host, 65536 + server.port()), -1);
-        expect_failure(ctx, 28, gai_strerror(EAI_SERVICE), "getaddrinfo failed in tcp_connect()");
-        for (const int limit : {0, 5}) {
-            ctx->connect_timeout = limit;
-            EXPECT_EQ(tcp_connect(ctx.get(), "http://x/", host, closed_port), -1);
-            EXPECT_EQ(ctx->errno_value, ECONNREFUSED);
-            expect_failure(ctx, 28, "Connection refused", "connect failed in tcp_connect()");
-        }
-    }
+    const int closed_port = bound_socket().port();
+    const char *const lookup = "getaddrinfo failed in tcp_connect()";
     context ctx;
+    EXPECT_EQ(open_to(ctx, 80, "a..b"), -1);
+    expect_failure(ctx, 28, gai_strerror(EAI_NONAME), lookup);
+    EXPECT_EQ(open_to(ctx, 65536 + server.port()), -1);
+    expect_failure(ctx, 28, gai_strerror(EAI_SERVICE), lookup);
+    for (const int limit : {0, 5}) {
+        ctx->connect_timeout = limit;
+        EXPECT_EQ(open_to(ctx, closed_port), -1);
+        EXPECT_EQ(ctx->errno_value, ECONNREFUSED);
+        expect_failure(ctx, 28, "Connection refused", "connect failed in tcp_connect()");
+    }
     ctx->connect_flags = 9999;
     EXPECT_EQ(open_to(ctx, server.port()), -1);
     expect_failure(ctx, 28, "Protocol not available", "setsockopt failed in tcp_connect()");
@@ -179,6 +188,7 @@ TEST_F(tcp, each_address_of_a_host_is_tried_in_turn_within_the_limit_for_each)
     };
     const peer server(wait_for_end, std::size(cases));
     for (const auto &c : cases) {
+        SCOPED_TRACE(c.rule);
         std::optional<full_listener> first;
         if (c.silent)
             first.emplace("127.0.0.9", server.port());
@@ -186,22 +196,20 @@ TEST_F(tcp, each_address_of_a_host_is_tried_in_turn_within_the_limit_for_each)
         ctx->connect_timeout = c.connect;
         ctx->call_timeout = c.call;
         ctx->legacy = c.legacy;
-        std::istringstream hosts(c.hosts);
+        const std::string port = ":" + std::to_string(server.port());
         std::string endpoints;
-        for (std::string host; hosts >> host;)
-            endpoints += "http://" + host + ":" + std::to_string(server.port()) + "/ ";
+        for (const std::string &host : words(c.hosts))
+            endpoints += "http://" + host + port + "/ ";
         soap_server_connect(ctx.get(), endpoints.c_str(), "");
-        EXPECT_EQ(ctx->socket >= 0, c.text == nullptr) << c.rule;
+        EXPECT_EQ(ctx->socket >= 0, c.text == nullptr);
         if (c.text)
             expect_failure(ctx, 28, c.text, "connect failed in tcp_connect()");
         soap_socket_release(ctx.get());
-        const soap_report &told = *soap_call_report(ctx.get());
-        EXPECT_EQ(told.ended_by, c.ended_by) << c.rule;
-        EXPECT_TRUE(told.addresses_tried == c.tried || c.tried == 0) << c.rule << told.addresses_tried;
-        EXPECT_EQ(told.connect_time >= told.lookup_time, c.text == nullptr) << c.rule;
-        EXPECT_EQ(told.peer,
-                  (c.text != nullptr ? "127.0.0.9:" : "127.0.0.1:") + std::to_string(server.port()))
-            << c.rule;
+        const soap_report &report = *soap_call_report(ctx.get());
+        EXPECT_EQ(report.ended_by, c.ended_by);
+        EXPECT_TRUE(report.addresses_tried == c.tried || c.tried == 0) << report.addresses_tried;
+        EXPECT_EQ(report.connect_time >= report.lookup_time, c.text == nullptr);
+        EXPECT_EQ(report.peer, (c.text != nullptr ? "127.0.0.9" : "127.0.0.1") + port);
     }
 }
 
@@ -236,20 +244,17 @@ TEST_F(tcp, a_new_connection_closes_the_old_one_through_the_hook)
     static int closed;
     const peer server(wait_for_end, 2);
     context ctx;
-    ctx->on_close_socket = [](soap *, int socket) {
-        ++closed;
-        return close(socket);
-    };
-    closed = 0;
-    ASSERT_GE(open_to(ctx, server.port()), 0);
-    EXPECT_EQ(closed, 0);
-    ASSERT_GE(open_to(ctx, server.port()), 0);
-    EXPECT_EQ(closed, 1);
-    EXPECT_EQ(tcp_disconnect(ctx.get()), 0);
-    EXPECT_EQ(closed, 2);
-    EXPECT_EQ(ctx->socket, -1);
-    EXPECT_EQ(tcp_disconnect(ctx.get()), 0);
-    EXPECT_EQ(closed, 2);
+    ctx->on_close_socket = [](soap *, int socket) { return ++closed, close(socket); };
+    for (const int before : {0, 1}) {
+        closed = 0;
+        ASSERT_GE(open_to(ctx, server.port()), 0);
+        EXPECT_EQ(closed, before);
+    }
+    for (int time = 0; time < 2; ++time) {
+        EXPECT_EQ(tcp_disconnect(ctx.get()), 0);
+        EXPECT_EQ(closed, 2) << "once for each connection";
+        EXPECT_EQ(ctx->socket, -1);
+    }
 }
 
 // --- waiting ---
@@ -338,9 +343,9 @@ void begin_signals()
 // Something that is waited for in vain, on a connection to a peer that neither reads nor writes.
 struct wait_case {
     const char *rule;
-    void (*limit)(soap *ctx);
+    int soap::*limit;
     bool (*waits)(context &ctx, int port); // false: it found what it waited for
-    const char *text;                      // of the error
+    int length = LIMIT_S;                  // seconds, or microseconds below 0
 };
 
 bool connects_in_vain(context &ctx, int port)
@@ -382,17 +387,10 @@ bool receives_in_vain(context &ctx, int port)
 
 bool no_descriptor_serves(context &ctx, int)
 {
-    int ends[2];
-    EXPECT_EQ(pipe(ends), 0);
-    ctx->send_fd = ends[1];
-    ctx->recv_fd = ends[0];
+    const pipe_ends ends(ctx);
     begin_signals();
     ctx->error = SOAP_EOF;
-    const bool in_vain =
-        ctx->send_timeout != 0 ? tcp_send(ctx.get(), "x", 1) == SOAP_EOF : receive(ctx).empty();
-    close(ends[0]);
-    close(ends[1]);
-    return in_vain;
+    return ctx->send_timeout != 0 ? tcp_send(ctx.get(), "x", 1) == SOAP_EOF : receive(ctx).empty();
 }
 
 bool accepts_in_vain(context &ctx, int)
@@ -410,66 +408,56 @@ bool client_does_not_shake_hands(context &ctx, int port)
 }
 
 const wait_case WAITS[] = {
-    {"connect", [](soap *c) { c->connect_timeout = LIMIT_S; }, connects_in_vain, "Timeout"},
-    {"handshake", [](soap *c) { c->connect_timeout = LIMIT_S; }, handshake_is_in_vain, "Timeout"},
-    {"handshake, in microseconds", [](soap *c) { c->connect_timeout = -1000000 * LIMIT_S; },
-     handshake_is_in_vain, "Timeout"},
-    {"CONNECT", [](soap *c) { c->connect_timeout = LIMIT_S; }, proxy_answers_nothing, "Timeout"},
-    {"send", [](soap *c) { c->send_timeout = LIMIT_S; }, sends_in_vain,
-     "End of file or no input: Operation interrupted or timed out (1 s send delay)"},
-    {"receive", [](soap *c) { c->recv_timeout = LIMIT_S; }, receives_in_vain,
-     "End of file or no input: Operation interrupted or timed out (1 s receive delay)"},
-    {"send to a descriptor", [](soap *c) { c->send_timeout = LIMIT_S; }, no_descriptor_serves,
-     "End of file or no input: Operation interrupted or timed out (1 s send delay)"},
-    {"receive from a descriptor", [](soap *c) { c->recv_timeout = LIMIT_S; }, no_descriptor_serves,
-     "End of file or no input: Operation interrupted or timed out (1 s receive delay)"},
-    {"accept", [](soap *c) { c->accept_timeout = LIMIT_S; }, accepts_in_vain, "Timeout"},
-    {"handshake of a client", [](soap *c) { c->accept_timeout = LIMIT_S; }, client_does_not_shake_hands,
-     "Timeout"},
+    {"connect", &soap::connect_timeout, connects_in_vain},
+    {"handshake", &soap::connect_timeout, handshake_is_in_vain},
+    {"handshake, in microseconds", &soap::connect_timeout, handshake_is_in_vain, -1000000 * LIMIT_S},
+    {"CONNECT", &soap::connect_timeout, proxy_answers_nothing},
+    {"send", &soap::send_timeout, sends_in_vain},
+    {"receive", &soap::recv_timeout, receives_in_vain},
+    {"send to a descriptor", &soap::send_timeout, no_descriptor_serves},
+    {"receive from a descriptor", &soap::recv_timeout, no_descriptor_serves},
+    {"accept", &soap::accept_timeout, accepts_in_vain},
+    {"handshake of a client", &soap::accept_timeout, client_does_not_shake_hands},
 };
 
 TEST_F(tcp, limits_hold_whatever_signals_arrive)
 {
     const full_listener silent;
     for (const wait_case &c : WAITS) {
+        SCOPED_TRACE(c.rule);
         const bound_socket idle; // takes clients, and leaves them alone
         context ctx;
-        c.limit(ctx.get());
-        EXPECT_TRUE(c.waits(ctx, c.waits == connects_in_vain ? silent.port() : idle.port())) << c.rule;
-        EXPECT_EQ(socket_calls::counts.select, 5) << c.rule;
+        ctx.get()->*c.limit = c.length;
+        EXPECT_TRUE(c.waits(ctx, c.waits == connects_in_vain ? silent.port() : idle.port()));
+        EXPECT_EQ(socket_calls::counts.select, 5);
         soap_fault_text_fill(ctx.get());
-        EXPECT_EQ(ctx.fault_text(), c.text) << c.rule;
+        const char *const step = ctx->send_timeout != 0 ? "send" : ctx->recv_timeout != 0 ? "receive" : "";
+        const std::string of_transfer = "End of file or no input: Operation interrupted or timed out (1 s ";
+        EXPECT_EQ(ctx.fault_text(), *step != '\0' ? of_transfer + step + " delay)" : "Timeout");
         socket_calls::reset();
     }
 }
 
 TEST_F(tcp, streams_and_descriptors_take_the_place_of_a_socket)
 {
-    int ends[2];
-    ASSERT_EQ(pipe(ends), 0);
-    {
-        context ctx;
-        ctx->send_fd = ends[1];
-        ctx->recv_fd = ends[0];
-        EXPECT_EQ(tcp_send(ctx.get(), "through a pipe", 14), 0);
-        EXPECT_EQ(receive(ctx), "through a pipe");
-        ctx->send_fd = ctx->recv_fd = -1;
-        EXPECT_EQ(tcp_send(ctx.get(), "x", 1), -1);
-        EXPECT_EQ(ctx->errno_value, EBADF);
-        EXPECT_EQ(receive(ctx), "");
-        EXPECT_EQ(ctx->errno_value, EBADF);
+    context ctx;
+    const pipe_ends ends(ctx);
+    EXPECT_EQ(tcp_send(ctx.get(), "through a pipe", 14), 0);
+    EXPECT_EQ(receive(ctx), "through a pipe");
+    ctx->send_fd = ctx->recv_fd = -1;
+    EXPECT_EQ(tcp_send(ctx.get(), "x", 1), -1);
+    EXPECT_EQ(ctx->errno_value, EBADF);
+    EXPECT_EQ(receive(ctx), "");
+    EXPECT_EQ(ctx->errno_value, EBADF);
 
-        std::ostringstream out;
-        std::istringstream in("from a stream");
-        ctx->output_stream = &out;
-        ctx->input_stream = &in;
-        EXPECT_EQ(tcp_send(ctx.get(), "to a stream", 11), 0);
-        EXPECT_EQ(out.str(), "to a stream");
-        EXPECT_EQ(receive(ctx), "from a stream");
-        EXPECT_EQ(receive(ctx), "");
-    }
-    close(ends[0]);
-    close(ends[1]);
+    std::ostringstream out;
+    std::istringstream in("from a stream");
+    ctx->output_stream = &out;
+    ctx->input_stream = &in;
+    EXPECT_EQ(tcp_send(ctx.get(), "to a stream", 11), 0);
+    EXPECT_EQ(out.str(), "to a stream");
+    EXPECT_EQ(receive(ctx), "from a stream");
+    EXPECT_EQ(receive(ctx), "");
 }
 
 TEST_F(tcp, a_stream_that_fails_is_an_error_even_if_it_throws)
@@ -508,6 +496,7 @@ TEST_F(tcp, release_keeps_or_closes_by_the_keep_alive_rule)
                  {-1, 1, false, false}, {28, 1, false, false}, {30, 1, false, false}, {12, 1, false, true},
                  {3, 1, false, true},   {3, 1, true, false}};
     for (const auto &c : cases) {
+        SCOPED_TRACE(testing::PrintToString(std::tuple(c.error, c.keep_alive, c.unfinished)));
         const peer server(wait_for_end);
         connected ctx(server.port());
         ctx->error = c.error;
@@ -518,9 +507,9 @@ TEST_F(tcp, release_keeps_or_closes_by_the_keep_alive_rule)
         ctx->mime.list = ctx->mime.last = part;
         EXPECT_EQ(soap_socket_release(ctx.get()), c.error);
         for (const soap_attachment *kept : {ctx->dime.list, ctx->dime.last, ctx->mime.list, ctx->mime.last})
-            EXPECT_EQ(kept, c.error == 0 ? part : nullptr) << c.error;
+            EXPECT_EQ(kept, c.error == 0 ? part : nullptr);
         EXPECT_EQ(ctx->error, c.error);
-        EXPECT_EQ(ctx->socket != -1, c.kept) << c.error << ' ' << c.keep_alive << ' ' << c.unfinished;
+        EXPECT_EQ(ctx->socket != -1, c.kept);
         EXPECT_EQ(ctx->keep_alive, c.kept ? c.keep_alive : 0);
         EXPECT_FALSE(ctx->response_unfinished);
     }
@@ -549,8 +538,6 @@ TEST_F(tcp, socket_errors_have_texts_by_their_mode)
     } cases[] = {
         {1, 0, 0, 0, "WSAStartup failed"},
         {2, 1, 0, 0, "Host not found"},
-        {2, 2, 0, 0, "Try Again"},
-        {2, 3, 0, 0, "No Recovery"},
         {2, 4, 0, 0, "No Data"},
         {2, 5, 0, 0, "TCP/UDP IP error 5"},
         {2, 0, 0, 0, "TCP/UDP IP error 0"},

@@ -17,7 +17,7 @@ constexpr const char *MISMATCH = "SSL/TLS certificate host name mismatch in tcp_
 constexpr const char *REFUSED = "SSL_connect error in tcp_connect(): ";
 constexpr const char *NO_CERTIFICATE = "No SSL/TLS certificate was presented by the peer in tcp_connect()";
 
-// The columns: flags of the set-up, besides TLS_NO_DEFAULT_CA, and older behaviour.
+// The columns: flags of the set-up in addition to TLS_NO_DEFAULT_CA, and older behaviour.
 constexpr struct {
     unsigned flags;
     std::uint32_t legacy = 0;
@@ -30,7 +30,7 @@ constexpr struct {
     {TLS_VERIFY_PEER | TLS_STRICT_HOST_CHECK | TLS_SKIP_HOST_CHECK},
     {TLS_VERIFY_PEER | TLS_STRICT_HOST_CHECK | TLS_ALLOW_EXPIRED},
     {TLS_VERIFY_PEER | TLS_NO_TLSV1 | TLS_NO_SSLV3},
-    {TLS_VERIFY_PEER | TLS_REQUIRE_CLIENT_CERT | TLS_RSA_EPHEMERAL}, // those of a server besides
+    {TLS_VERIFY_PEER | TLS_REQUIRE_CLIENT_CERT | TLS_RSA_EPHEMERAL}, // with those of a server
     {TLS_REQUIRE_CLIENT_CERT},                                       // those of a server alone
     {TLS_VERIFY_PEER, LEGACY_HOST_CHECK},
     {TLS_VERIFY_PEER | TLS_STRICT_HOST_CHECK, LEGACY_HOST_CHECK},
@@ -122,12 +122,14 @@ char letter_of(context &ctx, int socket, const row &r)
         return exchange(ctx, "hello") == "hello" && tls_active(ctx.get()) ? '.' : '?';
     EXPECT_EQ(ctx->socket, -1);
     EXPECT_EQ(ctx->error, SOAP_TLS_ERROR);
+    EXPECT_FALSE(tls_active(ctx.get()));
     const std::string detail = ctx.fault_detail();
     if (detail == NO_CERTIFICATE)
         return 'N';
     const char letter = detail.starts_with(MISMATCH) ? 'M' : 'R';
     EXPECT_TRUE(detail.starts_with(detail_of(r, letter))) << r.rule << ": " << detail;
     if (letter == 'R') {
+        EXPECT_TRUE(ctx.fault_text().starts_with("SSL_ERROR_SSL\n")) << ctx.fault_text();
         EXPECT_TRUE(detail.ends_with(" (at depth 0: CN=" + r.server.common_name + ",O=Test)")) << detail;
     }
     return letter;

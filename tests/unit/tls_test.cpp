@@ -19,7 +19,6 @@ using namespace tls_peers;
 class tls : public tls_test {};
 
 const subject BY_NAME{"peer.test", ""};
-const subject EXPIRED{"peer.test", "", -2 * DAY, -DAY};
 
 // A client that has come through the handshake.
 struct connected : context {
@@ -30,27 +29,6 @@ struct connected : context {
         EXPECT_GE(open_to(*this, port), 0) << fault_text();
     }
 };
-
-// --- new rules after a failure ---
-
-TEST_F(tls, a_failed_context_serves_again_under_new_rules)
-{
-    for (const bool released : {true, false}) {
-        tls_peer server(server_for(EXPIRED), echo, 2);
-        context ctx;
-        ASSERT_EQ(set_up_client(ctx), 0);
-        EXPECT_EQ(open_to(ctx, server.port()), -1);
-        EXPECT_NE(ctx.fault_text().find("certificate verify failed"), std::string::npos) << ctx.fault_text();
-        EXPECT_EQ(ctx.fault_text().substr(0, 14), "SSL_ERROR_SSL\n");
-        EXPECT_FALSE(tls_active(ctx.get()));
-        if (released) {
-            EXPECT_EQ(soap_socket_release(ctx.get()), SOAP_TLS_ERROR);
-        }
-        ASSERT_EQ(set_up_client(ctx, VERIFIED | TLS_ALLOW_EXPIRED), 0);
-        EXPECT_GE(open_to(ctx, server.port()), 0);
-        EXPECT_EQ(exchange(ctx, "hello"), "hello");
-    }
-}
 
 TEST_F(tls, a_plain_connection_after_a_failed_tls_one_is_plain)
 {
@@ -81,7 +59,7 @@ TEST_F(tls, the_first_https_connection_sets_up_by_default)
     EXPECT_EQ(ctx->error, SOAP_TLS_ERROR);
 }
 
-TEST_F(tls, a_tunnel_through_a_proxy_leads_to_the_host_behind_it)
+TEST_F(tls, a_tunnel_through_a_proxy_leads_to_the_host_after_it)
 {
     std::string head;
     const server_context beyond = server_for({"far.example", ""});
@@ -125,7 +103,7 @@ TEST_F(tls, a_tunnel_through_a_proxy_leads_to_the_host_behind_it)
     EXPECT_STREQ(ctx->endpoint, "https://far.example/service");
     EXPECT_EQ(exchange(ctx, "hello"), "hello");
     EXPECT_NE(head.find("\r\nProxy-Authorization: Basic cDpw\r\n"), std::string::npos) << head;
-    std::string within; // the head that the host behind the proxy reads
+    std::string within; // the head that the host after the proxy reads
     ctx->user = &within;
     ctx->on_header_line = [](soap *line_ctx, const char *key, const char *) {
         static_cast<std::string *>(line_ctx->user)->append(key == nullptr ? "" : key).append("\n");
@@ -230,6 +208,48 @@ TEST_F(tls, messages_of_the_protocol_alone_are_read_no_longer_than_the_call_may_
     socket_calls::reset();
     EXPECT_LE(socket_calls::counts.recv, 2);
     EXPECT_STREQ(soap_eof_text(ctx.get()), "Operation interrupted or timed out (1000 s call limit)");
+}
+
+// As OpenSSL sees the socket: result, errno, and which transfer is to be tried again.
+TEST_F(tls, its_bio_says_why_a_transfer_fails_and_whether_another_try_helps)
+{
+    using outcome = std::tuple<int, int, bool, bool>; // the flags: of reading, of writing
+    int ends[2];
+    ASSERT_EQ(socketpair(AF_UNIX, SOCK_STREAM, 0, ends), 0);
+    context ctx;
+    ctx->socket = ends[0];
+    const std::unique_ptr<BIO, certificates::freed_by<BIO_free>> bio(tls_bio_new(ctx.get()));
+    tls_bio_set_nonblocking(bio.get(), true);
+    const auto transfer = [&](bool writes) {
+        char bytes[4096] = {};
+        errno = 0;
+        const int count = writes ? BIO_write(bio.get(), bytes, sizeof bytes) : BIO_read(bio.get(), bytes, 9);
+        return outcome(count, count < 0 ? errno : 0, BIO_should_read(bio.get()), BIO_should_write(bio.get()));
+    };
+    EXPECT_EQ(BIO_get_fd(bio.get(), nullptr), ends[0]);
+    EXPECT_EQ(transfer(false), outcome(-1, EAGAIN, true, false)) << "nothing has come";
+    EXPECT_EQ(transfer(true), outcome(4096, 0, false, false));
+    for (const int error : {EINTR, ECONNRESET}) {
+        socket_calls::fail_recv = {1, error};
+        EXPECT_EQ(transfer(false), outcome(-1, error, error == EINTR, false));
+    }
+    ctx->call_deadline = 1; // long ago
+    socket_calls::counts = {};
+    EXPECT_EQ(transfer(false), outcome(-1, EAGAIN, true, false)) << "time is up";
+    EXPECT_EQ(transfer(true), outcome(-1, EAGAIN, false, true)) << "time is up";
+    EXPECT_EQ(socket_calls::counts.all(), 0);
+    ctx->call_deadline = 0;
+    while (std::get<0>(transfer(true)) > 0) {
+    }
+    EXPECT_EQ(transfer(true), outcome(-1, EAGAIN, false, true)) << "the peer reads nothing";
+    loopback::write_text(ends[1], "x");
+    EXPECT_EQ(transfer(false), outcome(1, 0, false, false));
+    close(ends[1]);
+    EXPECT_EQ(transfer(true), outcome(-1, EPIPE, false, false)) << "the peer is gone";
+    ctx->socket_abandoned = true;
+    for (const bool writes : {false, true})
+        EXPECT_EQ(transfer(writes), outcome(-1, EBADF, false, false));
+    ctx->socket_abandoned = false;
 }
 
 // --- liveness and the end ---
@@ -367,7 +387,7 @@ TEST_F(tls, and_tcp_neither_use_nor_close_an_abandoned_socket)
         EXPECT_FALSE(soap_socket_open(ctx.get()));
         const int duplicate = dup2(ends[0], number);
         taken.set_value();
-        ASSERT_EQ(duplicate, number) << "the number now belongs to somebody else";
+        ASSERT_EQ(duplicate, number) << "the number now belongs to another part of the program";
         next.emplace(echoing, secure);
         EXPECT_EQ(soap_force_close(ctx.get()), 0);
         EXPECT_EQ(tcp_send(ctx.get(), "x", 1), -1);

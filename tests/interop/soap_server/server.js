@@ -1,7 +1,7 @@
 // All five ports on the npm package "soap", from the project's WSDLs.
 //
 // Usage: node server.js SCHEMA_DIR [--soap12]. Keeps documents in memory. Prints "listening on http://127.0.0.1:PORT" when it
-// is ready, and runs until it is stopped. The stack reads both SOAP versions and answers in one, SOAP 1.1 unless told.
+// is ready, and runs until it is stopped. The stack reads both SOAP versions and answers in one, SOAP 1.1 by default.
 const crypto = require('crypto');
 const fs = require('fs');
 const http = require('http');
@@ -18,7 +18,7 @@ const fresh = () => `urn:other:${crypto.randomUUID()}`;
 const typed = (type) =>
   ({ attributes: { 'xmlns:xsi': 'http://www.w3.org/2001/XMLSchema-instance', 'xsi:type': type } });
 
-// Values without the attributes that the parser keeps beside them, which would be written back as elements: all but the
+// Values without the attributes that the parser keeps with them, which would be written back as elements: all but the
 // name of a derived type.
 function plain(value) {
   if (Array.isArray(value)) return value.map(plain);
@@ -58,7 +58,7 @@ function notFound(uri) {
   return { Fault: { ...fault, statusCode: soap12 ? 400 : 500 } };
 }
 
-// Operations. Members of documents stand in the order of the schema.
+// Operations. Members of documents are in the order of the schema.
 
 // Keeps `made(request)` under a new name.
 const keeping = (made) => async (request) => {
