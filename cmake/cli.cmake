@@ -1,6 +1,7 @@
 # zuv, the command line, and the tests of both programs. To be included after service.cmake.
 find_package(CLI11 REQUIRED)
 find_package(nlohmann_json REQUIRED)
+find_package(pugixml REQUIRED)
 file(GLOB ZUV_CLI_SOURCES CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/cli/*.cpp)
 add_executable(zuv ${ZUV_CLI_SOURCES} ${ZUV_GENERATED_DIR}/tools/contract_description.cpp)
 target_include_directories(zuv PRIVATE ${PROJECT_SOURCE_DIR}/cli ${ZUV_GENERATED_DIR}/tools)

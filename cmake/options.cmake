@@ -44,6 +44,9 @@ find_package(Threads REQUIRED)
 add_library(zuv_flags INTERFACE)
 target_compile_options(zuv_flags INTERFACE -Wall -Wextra -Wpedantic -Wshadow -Wconversion
     $<$<BOOL:${ZUV_WERROR}>:-Werror> $<$<CXX_COMPILER_ID:Clang>:-Wno-sign-conversion>)
+if(CMAKE_SIZEOF_VOID_P EQUAL 4) # attachments and traces in files of more than 2 GB; nothing public depends on it
+    target_compile_definitions(zuv_flags INTERFACE _FILE_OFFSET_BITS=64)
+endif()
 if(ZUV_SANITIZE)
     add_compile_options(-fsanitize=address,undefined -fno-sanitize-recover=all -fno-omit-frame-pointer -g)
     add_link_options(-fsanitize=address,undefined)

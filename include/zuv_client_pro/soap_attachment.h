@@ -26,10 +26,10 @@ enum soap_mime_encoding : int {
 // host program that wants them decoded does so in its write callback or afterwards.
 struct soap_attachment {
     soap_attachment *next; // in its list
-    char *content;    // the bytes (on input followed by a zero byte), or a stream handle of the host program
-    std::size_t size; // bytes; 0 with a handle to be sent: unknown
-    const char *id;   // DIME id, or MIME Content-ID with its angle brackets
-    const char *type; // media type
+    char *content; // the bytes (on input followed by a zero byte), or a stream handle of the host program
+    std::uint64_t size;   // bytes, of a stream any number on any machine; 0 with a handle to be sent: unknown
+    const char *id;       // DIME id, or MIME Content-ID with its angle brackets
+    const char *type;     // media type
     const char *options;  // DIME: type (2 bytes), length of the text (2 bytes), both big-endian, text of any
                           // bytes. Sent as they are up to that length
     int encoding;         // soap_mime_encoding
@@ -81,7 +81,7 @@ inline void *soap_attachment_in_memory(soap *ctx)
 //   option_text  null for no options
 //   SOAP_OK
 //   SOAP_OUT_OF_MEMORY
-ZUV_API int soap_dime_attach(soap *ctx, char *content, std::size_t size, const char *type, const char *id,
+ZUV_API int soap_dime_attach(soap *ctx, char *content, std::uint64_t size, const char *type, const char *id,
                              unsigned short option_type, const char *option_text);
 
 // Adds a MIME part to the next message sent; soap_mime_start makes that a MIME message. Null texts give no
@@ -95,7 +95,7 @@ ZUV_API int soap_dime_attach(soap *ctx, char *content, std::size_t size, const c
 //   description  Content-Description
 //   SOAP_OK
 //   SOAP_OUT_OF_MEMORY
-ZUV_API int soap_mime_attach(soap *ctx, char *content, std::size_t size, int encoding, const char *type,
+ZUV_API int soap_mime_attach(soap *ctx, char *content, std::uint64_t size, int encoding, const char *type,
                              const char *id, const char *location, const char *description);
 
 // Makes the messages sent from now on MIME messages, until the managed blocks are freed. SOAP_OUT_OF_MEMORY
@@ -112,7 +112,7 @@ ZUV_API void soap_mime_start(soap *ctx, const char *boundary, const char *start)
 //   returns  the record
 //   null     SOAP_OUT_OF_MEMORY in ctx->error
 ZUV_API soap_attachment *soap_attachment_add(soap *ctx, soap_attachment **first, soap_attachment **last,
-                                             char *content, std::size_t size);
+                                             char *content, std::uint64_t size);
 
 // Makes an options block, as soap_attachment::options.
 //   type     type of the options

@@ -35,7 +35,7 @@ struct hashed_id {
 } // namespace
 
 soap_attachment *soap_attachment_add(soap *ctx, soap_attachment **first, soap_attachment **last,
-                                     char *content, std::size_t size)
+                                     char *content, std::uint64_t size)
 {
     auto *record = static_cast<soap_attachment *>(soap_block_alloc(ctx, sizeof(soap_attachment)));
     if (record == nullptr)
@@ -51,7 +51,7 @@ soap_attachment *soap_attachment_add(soap *ctx, soap_attachment **first, soap_at
     return record;
 }
 
-int soap_dime_attach(soap *ctx, char *content, std::size_t size, const char *type, const char *id,
+int soap_dime_attach(soap *ctx, char *content, std::uint64_t size, const char *type, const char *id,
                      unsigned short option_type, const char *option_text)
 {
     char *options = nullptr;
@@ -69,7 +69,7 @@ int soap_dime_attach(soap *ctx, char *content, std::size_t size, const char *typ
     return SOAP_OK;
 }
 
-int soap_mime_attach(soap *ctx, char *content, std::size_t size, int encoding, const char *type,
+int soap_mime_attach(soap *ctx, char *content, std::uint64_t size, int encoding, const char *type,
                      const char *id, const char *location, const char *description)
 {
     soap_attachment *record = soap_attachment_add(ctx, &ctx->mime.first, &ctx->mime.last, content, size);

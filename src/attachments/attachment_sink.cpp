@@ -26,7 +26,7 @@ int attachment_sink::add_piece(std::size_t wanted)
         stack_ = soap_block_stack_push(ctx_);
     if (stack_ == nullptr)
         return ctx_->error = SOAP_OUT_OF_MEMORY;
-    const std::size_t grown = std::clamp(size_, FIRST_PIECE, PIECE_MAX);
+    const auto grown = static_cast<std::size_t>(std::clamp<std::uint64_t>(size_, FIRST_PIECE, PIECE_MAX));
     const std::size_t capacity = std::max(grown, std::min(wanted, PIECE_MAX));
     piece_ = static_cast<char *>(soap_block_stack_grow(ctx_, stack_, capacity));
     filled_ = 0;
@@ -64,7 +64,7 @@ int attachment_sink::finish(soap_attachment *record)
         record->size = size_;
         return SOAP_OK;
     }
-    const std::size_t size = size_;
+    const std::uint64_t size = size_;
     if (put("", 1) != SOAP_OK)
         return ctx_->error;
     soap_block_stack_trim(ctx_, stack_, filled_);

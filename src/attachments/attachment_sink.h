@@ -36,5 +36,5 @@ private:
     char *piece_ = nullptr;
     std::size_t filled_ = 0;   // bytes used of the newest piece
     std::size_t capacity_ = 0; // bytes of the newest piece
-    std::size_t size_ = 0;     // bytes put in all
+    std::uint64_t size_ = 0;   // bytes put in all
 };

@@ -100,13 +100,15 @@ int attachment_stream::copy(std::uint64_t size)
 {
     char data[ATTACHMENT_PIECE];
     while (size > 0) {
-        const std::size_t part = next(data, std::min<std::uint64_t>(size, sizeof data));
+        const std::size_t part =
+            next(data, size < sizeof data ? static_cast<std::size_t>(size) : sizeof data);
         if (part == 0)
             return ctx_->error != SOAP_OK
                        ? ctx_->error
                        : attachment_fail(ctx_, SOAP_EOF,
-                                         "The stream of attachment \"%.400s\" ended after %zu of %zu bytes",
-                                         name_of(record_.id), static_cast<std::size_t>(given_), record_.size);
+                                         "The stream of attachment \"%.400s\" ended after %llu of %llu bytes",
+                                         name_of(record_.id), static_cast<unsigned long long>(given_),
+                                         static_cast<unsigned long long>(record_.size));
         if (soap_send_bytes(ctx_, data, part) != SOAP_OK)
             return ctx_->error;
         size -= part;

@@ -123,7 +123,7 @@ int send_sized(soap *ctx, const soap_attachment &record, attachment_stream &stre
 {
     const char *data = record.content;
     for (std::uint64_t left = record.size;;) {
-        const std::uint64_t part = left < RECORD_MAX ? left : RECORD_MAX;
+        const auto part = static_cast<std::size_t>(left < RECORD_MAX ? left : RECORD_MAX);
         left -= part;
         ctx->dime.size = part;
         mark(ctx, left != 0, record.next == nullptr);

@@ -141,7 +141,7 @@ int send_content(soap *ctx, const soap_attachment &part)
     if (stream.open(ctx->mime_read_open, part.description) != SOAP_OK)
         return ctx->error;
     if (!stream.is_open())
-        return soap_send_bytes(ctx, part.content, part.size);
+        return soap_send_bytes(ctx, part.content, static_cast<std::size_t>(part.size));
     return stream.is_endless() ? stream.copy_to_end() : stream.copy(part.size);
 }
 
@@ -420,7 +420,7 @@ std::uint64_t mime_part_length(soap *ctx, const soap_attachment &part)
 {
     head_writer counter(ctx, false);
     put_part_head(ctx, part, counter);
-    return counter.length() + static_cast<std::uint64_t>(part.size);
+    return counter.length() + part.size;
 }
 
 std::uint64_t mime_end_length(soap *ctx)

@@ -184,9 +184,10 @@ std::vector<received_part> outcome::attachments() const
     std::vector<received_part> found;
     for (const soap_attachment *part = parts_; part != nullptr; part = part->next)
         if (part != root_)
-            found.push_back({text_or_empty(part->id), text_or_empty(part->type),
-                             text_or_empty(part->description),
-                             std::string_view(part->content, part->content != nullptr ? part->size : 0)});
+            found.push_back(
+                {text_or_empty(part->id), text_or_empty(part->type), text_or_empty(part->description),
+                 std::string_view(part->content,
+                                  part->content != nullptr ? static_cast<std::size_t>(part->size) : 0)});
     return found;
 }
 

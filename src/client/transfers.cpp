@@ -77,7 +77,7 @@ int transfers::attach(soap *ctx, const part &what, bool in_record)
         ctx->output_mode |= MODE_CHUNKED;
     char *const handle =
         made.total == 0 ? nullptr : reinterpret_cast<char *>(&made); // 0 with a handle: unknown
-    const std::size_t size = made.total == UNKNOWN_SIZE ? 0 : static_cast<std::size_t>(made.total);
+    const std::uint64_t size = made.total == UNKNOWN_SIZE ? 0 : made.total;
     if (in_record)
         return soap_dime_attach(ctx, handle, size, what.type.c_str(), what.id.c_str(), 0, nullptr);
     char *const id = soap_string_dup(ctx, ("<" + what.id + ">").c_str());

@@ -9,6 +9,7 @@
 #include "core/failure.h"
 #include "identity/identity.h"
 
+#include <bit>
 #include <ctime>
 #include <sys/random.h>
 
@@ -127,6 +128,8 @@ std::uint64_t keyed_hash(const std::uint64_t key[2], const char *text)
     }
     std::uint64_t rest = 0;
     std::memcpy(&rest, text, length);
+    if constexpr (std::endian::native == std::endian::big)
+        rest >>= 8; // out of the byte that the length is in
     state.take(last | rest);
     state.c ^= 0xff;
     for (int i = 0; i < 3; i++)
@@ -148,7 +151,7 @@ void draw_key(const soap *ctx, std::uint64_t key[2])
 
 void index_put(soap_id_index *index, std::uint64_t hash, soap_id_record *record)
 {
-    std::size_t at = hash & index->slot_mask;
+    std::size_t at = static_cast<std::size_t>(hash) & index->slot_mask;
     while (index->slots[at].record != nullptr)
         at = (at + 1) & index->slot_mask;
     index->slots[at] = {hash, record};
@@ -157,8 +160,8 @@ void index_put(soap_id_index *index, std::uint64_t hash, soap_id_record *record)
 soap_id_record *index_find(const soap_id_index *index, const char *text)
 {
     const std::uint64_t hash = keyed_hash(index->key, text);
-    for (std::size_t at = hash & index->slot_mask; index->slots[at].record != nullptr;
-         at = (at + 1) & index->slot_mask)
+    for (std::size_t at = static_cast<std::size_t>(hash) & index->slot_mask;
+         index->slots[at].record != nullptr; at = (at + 1) & index->slot_mask)
         if (index->slots[at].hash == hash && std::strcmp(index->slots[at].record->id, text) == 0)
             return index->slots[at].record;
     return nullptr;
@@ -318,7 +321,7 @@ int id_failure(soap *ctx, const char *id, int error)
 
 std::size_t soap_id_hash(const char *text)
 {
-    return text_hash(text) % SOAP_ID_HASH_SIZE;
+    return static_cast<std::size_t>(text_hash(text) % SOAP_ID_HASH_SIZE);
 }
 
 soap_id_record *soap_id_lookup(soap *ctx, const char *text)
