@@ -332,6 +332,7 @@ TEST_F(client_reports, follow_a_call_on_a_new_connection_and_on_a_kept_one)
             EXPECT_STREQ(told.tls_version, tls ? "TLSv1.3" : "");
             EXPECT_EQ(*told.tls_cipher != '\0', tls);
             EXPECT_STREQ(told.certificate_subject, tls ? "CN=peer.test,O=Test" : "");
+            EXPECT_STREQ(told.certificate_issuer, tls ? "CN=Test authority,O=Test" : "");
             EXPECT_EQ(told.certificate_not_after > std::time(nullptr), tls);
             EXPECT_STREQ(told.certificate_refusal, "");
         }
