@@ -12,13 +12,9 @@
 #include "call_options.h"
 #include "progress.h"
 #include "replaced_file.h"
+#include "text_files.h"
 
 namespace cli {
-
-struct file_closer {
-    void operator()(std::FILE *file) const { std::fclose(file); }
-};
-using file_handle = std::unique_ptr<std::FILE, file_closer>;
 
 // The attachments of one context's messages. Its callbacks are set by `prepare`; the context must not outlive
 // it.

@@ -2,12 +2,9 @@
 #include "call_command.h"
 
 #include <algorithm>
-#include <cctype>
 #include <chrono>
 #include <cstdio>
-#include <cstdlib>
 #include <cstring>
-#include <sstream>
 
 #include <zuv_client_pro/soap_attachment.h>
 #include <zuv_client_pro/soap_envelope.h>
@@ -18,6 +15,7 @@
 #include "attachments.h"
 #include "connection.h"
 #include "documents.h"
+#include "endpoints.h"
 #include "failure.h"
 #include "fault_report.h"
 #include "json.h"
@@ -40,44 +38,10 @@ const port &port_of(const operation &op)
                          [&](const port &p) { return std::strcmp(p.name, op.port) == 0; });
 }
 
-// An address, with the port's usual path if it has none.
-std::string full_address(const std::string &address, const port &of)
-{
-    refuse_user(address);
-    const std::size_t scheme = address.find("://");
-    if ((!address.starts_with("http://") && !address.starts_with("https://")) ||
-        address.find_first_of(" \t\r\n") != std::string::npos)
-        throw failure(EXIT_USAGE, "--endpoint: http://HOST:PORT or https://HOST:PORT is wanted, not \"" +
-                                      printable(address) + "\"");
-    const std::size_t slash = address.find('/', scheme + 3);
-    if (slash != std::string::npos && slash + 1 < address.size())
-        return address;
-    return address.substr(0, slash) + of.path;
-}
-
-// All addresses in the form that the library expects: separated by blanks, each tried when the previous one
-// can't be reached.
-std::string addresses(const call_options &options, const port &of)
-{
-    std::vector<std::string> given = options.endpoints;
-    if (const char *const variable = std::getenv("ZUV_ENDPOINT"); given.empty() && variable != nullptr) {
-        std::istringstream words(variable);
-        for (std::string word; words >> word;)
-            given.push_back(word);
-    }
-    if (given.empty() && of.default_address == nullptr)
-        throw failure(EXIT_USAGE, std::string("the port ") + of.name +
-                                      " has no usual address: give one by --endpoint or ZUV_ENDPOINT");
-    std::string all;
-    for (const std::string &one : given)
-        all += (all.empty() ? "" : " ") + full_address(one, of);
-    return given.empty() ? of.default_address : all;
-}
-
 class caller {
 public:
     caller(const operation &op, const call_options &options)
-        : op_(op), options_(options), addresses_(addresses(options, port_of(op))),
+        : op_(op), options_(options), addresses_(call_addresses(options.endpoints, port_of(op))),
           connection_(options.connection), header_(options.header),
           files_(options.message, options.connection.quiet),
           request_(read_request_document(reader_, options.request_file, op)), context_(op.make_context())
@@ -108,13 +72,7 @@ public:
     }
 
 private:
-    std::string name() const
-    {
-        std::string text = op_.port;
-        std::transform(text.begin(), text.end(), text.begin(),
-                       [](unsigned char c) { return static_cast<char>(std::tolower(c)); });
-        return text + " " + op_.name;
-    }
+    std::string name() const { return lower(op_.port) + " " + op_.name; }
 
     int call_once()
     {

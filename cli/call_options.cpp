@@ -55,6 +55,16 @@ void connection_options::declare(CLI::App &app)
     app.add_flag("-q,--quiet", quiet, "Show no progress")->group("Output");
 }
 
+void declare_endpoints(CLI::App &app, std::vector<std::string> &endpoints)
+{
+    app.add_option("-e,--endpoint", endpoints,
+                   "Address of the service; further ones are tried when it can't be reached")
+        ->allow_extra_args(false)
+        ->take_all()
+        ->type_name("URL")
+        ->group("Connection");
+}
+
 void header_options::declare(CLI::App &app)
 {
     app.add_option("-t,--target", target, "URI of the document that the call is about")
@@ -121,12 +131,7 @@ void call_options::declare(CLI::App &app)
 {
     app.add_option("FILE", request_file,
                    "Request document, \"-\" for standard input; without it an empty one is sent");
-    app.add_option("-e,--endpoint", endpoints,
-                   "Address of the service; further ones are tried when it can't be reached")
-        ->allow_extra_args(false)
-        ->take_all()
-        ->type_name("URL")
-        ->group("Connection");
+    declare_endpoints(app, endpoints);
     header.declare(app);
     connection.declare(app);
     message.declare(app);

@@ -20,9 +20,13 @@ struct connection_options {
     double connect_limit = 30, silence_limit = 300;     // seconds; 0: none
     std::string trace_file;
     bool quiet = false, verbose = false;
+    std::string password, key_password, proxy_password; // of the configuration file, the last resort
 
     void declare(CLI::App &app);
 };
+
+// Adds -e: addresses of the service.
+void declare_endpoints(CLI::App &app, std::vector<std::string> &endpoints);
 
 struct header_options {
     std::string file;                     // a protocol:Header document
@@ -45,7 +49,7 @@ struct message_options {
 };
 
 struct call_options {
-    std::vector<std::string> endpoints; // from ZUV_ENDPOINT if none are given
+    std::vector<std::string> endpoints;
     connection_options connection;
     header_options header;
     message_options message;

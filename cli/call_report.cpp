@@ -20,12 +20,12 @@ public:
         va_start(values, format);
         std::vsnprintf(text, sizeof text, format, values);
         va_end(values);
-        text_ += "* " + printable(text) + "\n";
+        lines_.push_back(printable(text));
     }
-    std::string text() const { return text_; }
+    const std::vector<std::string> &all() const { return lines_; }
 
 private:
-    std::string text_;
+    std::vector<std::string> lines_;
 };
 
 double milliseconds(std::int64_t microseconds)
@@ -35,12 +35,7 @@ double milliseconds(std::int64_t microseconds)
 
 std::string day(std::int64_t seconds)
 {
-    const std::time_t time = seconds;
-    std::tm parts{};
-    char text[64] = "";
-    gmtime_r(&time, &parts);
-    std::strftime(text, sizeof text, "%Y-%m-%d", &parts);
-    return text;
+    return utc_time(seconds).substr(0, 10);
 }
 
 const char *ending(soap_ending by)
@@ -81,8 +76,9 @@ void add_tls(lines &out, const soap_report &told)
     if (*told.tls_version != '\0')
         out.add("%s, %s%s", told.tls_version, told.tls_cipher, told.resumed ? ", session resumed" : "");
     if (*told.certificate_subject != '\0')
-        out.add("certificate of %s, valid from %s to %s", told.certificate_subject,
-                day(told.certificate_not_before).c_str(), day(told.certificate_not_after).c_str());
+        out.add("certificate of %s, issued by %s, valid from %s to %s", told.certificate_subject,
+                told.certificate_issuer, day(told.certificate_not_before).c_str(),
+                day(told.certificate_not_after).c_str());
     if (*told.certificate_refusal != '\0')
         out.add("certificate refused: %s", told.certificate_refusal);
     if (told.tls_time >= 0)
@@ -101,7 +97,32 @@ void add_message(lines &out, const soap_report &told)
         out.add("HTTP status %d", told.http_status);
 }
 
+void add_ending(lines &out, const soap_report &told)
+{
+    if (const char *const how = ending(told.ended_by))
+        out.add("%s", how);
+}
+
 } // namespace
+
+std::string utc_time(std::int64_t seconds)
+{
+    const std::time_t time = seconds;
+    std::tm parts{};
+    char text[64] = "";
+    gmtime_r(&time, &parts);
+    std::strftime(text, sizeof text, "%Y-%m-%dT%H:%M:%SZ", &parts);
+    return text;
+}
+
+std::vector<std::string> connection_steps(const soap_report &told)
+{
+    lines out;
+    add_connection(out, told);
+    add_tls(out, told);
+    add_ending(out, told);
+    return out.all();
+}
 
 std::string call_report(const soap_report &told)
 {
@@ -110,11 +131,13 @@ std::string call_report(const soap_report &told)
     add_tls(out, told);
     if (told.wire_sent != 0)
         add_message(out, told);
-    if (const char *const how = ending(told.ended_by))
-        out.add("%s", how);
+    add_ending(out, told);
     if (told.total_time >= 0)
         out.add("over at %.3f ms", milliseconds(told.total_time));
-    return out.text();
+    std::string text;
+    for (const std::string &line : out.all())
+        text += "* " + line + "\n";
+    return text;
 }
 
 } // namespace cli

@@ -9,6 +9,8 @@
 
 #include "check.h"
 #include "documents.h"
+#include "failure.h"
+#include "json.h"
 #include "new_command.h"
 #include "text_files.h"
 
@@ -49,8 +51,19 @@ std::string reader_problem(const std::string &xml, const contract::data_class &t
 
 bool check_file(const std::string &file, const contract::data_class *expected)
 {
-    const std::string xml = read_file(file);
     const std::string name = file == "-" ? "standard input" : printable(file);
+    const std::string given = read_file(file);
+    std::string xml = given;
+    if (is_json(given)) {
+        try {
+            if (expected == nullptr)
+                throw failure(EXIT_DOCUMENT, name + ": JSON doesn't name its class: give it by --class");
+            xml = xml_of(given, *expected, name);
+        } catch (const failure &problem) {
+            std::fprintf(stderr, "%s\n", problem.what());
+            return false;
+        }
+    }
     const checked_document checked = check_document(xml, expected);
     std::string problems = finding_lines(name, checked.findings);
     if (checked.findings.empty() && checked.type != nullptr) {

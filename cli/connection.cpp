@@ -26,12 +26,12 @@ namespace {
 constexpr double MICROSECONDS_MAX = 2000; // seconds that still fit an int as microseconds
 constexpr std::int16_t GZIP = 2;
 
-std::string secret(const std::string &file, const char *variable)
+std::string secret(const std::string &file, const char *variable, const std::string &configured)
 {
     if (!file.empty())
         return read_secret(file);
     const char *const value = std::getenv(variable);
-    return value == nullptr ? "" : value;
+    return value == nullptr ? configured : value;
 }
 
 const char *text_or_null(const std::string &text)
@@ -57,6 +57,10 @@ void require_readable(const char *option, const std::string &path)
 
 void split_proxy(const std::string &proxy, std::string &host, int &port)
 {
+    if (proxy.find('@') != std::string::npos) // not shown: there may be a password in it
+        throw failure(EXIT_USAGE,
+                      "--proxy: HOST:PORT is wanted; the user is given by --proxy-user, the password by "
+                      "--proxy-password-file or ZUV_PROXY_PASSWORD");
     const std::size_t colon = proxy.rfind(':');
     const char *const end = proxy.data() + proxy.size();
     if (colon == std::string::npos || colon == 0 ||
@@ -70,9 +74,9 @@ void split_proxy(const std::string &proxy, std::string &host, int &port)
 } // namespace
 
 connection::connection(const connection_options &options)
-    : options_(options), password_(secret(options.password_file, "ZUV_PASSWORD")),
-      key_password_(secret(options.key_password_file, "ZUV_KEY_PASSWORD")),
-      proxy_password_(secret(options.proxy_password_file, "ZUV_PROXY_PASSWORD"))
+    : options_(options), password_(secret(options.password_file, "ZUV_PASSWORD", options.password)),
+      key_password_(secret(options.key_password_file, "ZUV_KEY_PASSWORD", options.key_password)),
+      proxy_password_(secret(options.proxy_password_file, "ZUV_PROXY_PASSWORD", options.proxy_password))
 {
     if (!options_.proxy.empty())
         split_proxy(options_.proxy, proxy_host_, proxy_port_);

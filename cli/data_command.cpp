@@ -2,7 +2,6 @@
 #include "data_command.h"
 
 #include <algorithm>
-#include <cerrno>
 #include <cstdio>
 #include <filesystem>
 #include <limits>
@@ -78,9 +77,7 @@ public:
 private:
     [[noreturn]] void fail_file(const char *what) const
     {
-        const int reason = errno;
-        throw failure(EXIT_FILE,
-                      options_.file + ": " + what + ": " + std::generic_category().message(reason));
+        cli::fail_file(options_.file == "-" ? "standard output" : options_.file, what);
     }
 
     int begin(int status, std::uint64_t size)

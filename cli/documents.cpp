@@ -70,6 +70,21 @@ std::string without_idle_declarations(std::string xml)
 
 } // namespace
 
+std::string namespace_declarations(const std::string &separator, const std::set<std::string> &prefixes)
+{
+    constexpr char XSI_URI[] = "http://www.w3.org/2001/XMLSchema-instance"; // the table's has a wildcard
+    std::string text;
+    for (const soap_namespace *row = soap_program_namespaces; row->prefix != nullptr; ++row)
+        if (prefixes.contains(row->prefix))
+            text.append(separator)
+                .append("xmlns:")
+                .append(row->prefix)
+                .append("=\"")
+                .append(row->prefix == std::string_view("xsi") ? XSI_URI : row->uri)
+                .append("\"");
+    return text;
+}
+
 document_reader::document_reader() : context_(std::make_unique<soap>(DOCUMENT_MODE | MODE_STRICT))
 {
     context_->user = this;

@@ -5,6 +5,7 @@
 
 #include <functional>
 #include <memory>
+#include <set>
 #include <string>
 #include <string_view>
 
@@ -36,5 +37,8 @@ private:
 // The XML that `write` writes, indented or in one line, without namespace declarations that nothing uses.
 // failure if the library refuses.
 std::string document_text(const std::function<int(soap *ctx)> &write, bool indent);
+
+// Declarations of the contract's prefixes, a separator before each: ` xmlns:protocol="http://..."`.
+std::string namespace_declarations(const std::string &separator, const std::set<std::string> &prefixes);
 
 } // namespace cli

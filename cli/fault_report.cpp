@@ -140,6 +140,21 @@ bool has_record(const soap *ctx)
     return ctx->fault != nullptr;
 }
 
+// The fault that the service has sent; null if the failure is another one.
+const SOAP_ENV__Fault *received_fault(soap *ctx)
+{
+    const exit_code kind = exit_code_of(ctx);
+    return kind == EXIT_SENDER || kind == EXIT_RECEIVER || kind == EXIT_FAULT ? ctx->fault : nullptr;
+}
+
+const SOAP_ENV__Detail *received_detail(soap *ctx)
+{
+    const SOAP_ENV__Fault *const fault = received_fault(ctx);
+    if (fault == nullptr)
+        return nullptr;
+    return fault->detail != nullptr ? fault->detail : fault->Detail;
+}
+
 } // namespace
 
 exit_code exit_code_of(soap *ctx)
@@ -172,21 +187,30 @@ exit_code exit_code_of(soap *ctx)
     }
 }
 
+std::string fault_name(soap *ctx)
+{
+    const std::vector<typed_fault> faults = typed_faults(received_detail(ctx));
+    return !faults.empty()                  ? faults.front().name
+           : received_fault(ctx) != nullptr ? text_of(*soap_fault_code_field(ctx))
+                                            : "";
+}
+
+std::string failure_line(soap *ctx)
+{
+    if (*soap_fault_code_field(ctx) == nullptr || *soap_fault_string_field(ctx) == nullptr)
+        soap_fault_text_fill(ctx);
+    return text_of(*soap_fault_string_field(ctx));
+}
+
 std::string fault_report(soap *ctx, const std::string &what, const std::string &where)
 {
     const exit_code kind = exit_code_of(ctx);
-    const bool received = kind == EXIT_SENDER || kind == EXIT_RECEIVER || kind == EXIT_FAULT;
-    const SOAP_ENV__Fault *const record = received ? ctx->fault : nullptr;
-    const SOAP_ENV__Detail *const parts = record == nullptr           ? nullptr
-                                          : record->detail != nullptr ? record->detail
-                                                                      : record->Detail;
-    const std::vector<typed_fault> faults = typed_faults(parts);
-    if (*soap_fault_code_field(ctx) == nullptr || *soap_fault_string_field(ctx) == nullptr)
-        soap_fault_text_fill(ctx);
+    const std::vector<typed_fault> faults = typed_faults(received_detail(ctx));
+    const std::string line = failure_line(ctx);
     report lines;
     const std::string code = text_of(*soap_fault_code_field(ctx));
-    lines.add("fault", faults.empty() ? (received ? code : "") : faults.front().name + " (" + code + ")");
-    lines.add("what", text_of(*soap_fault_string_field(ctx)));
+    lines.add("fault", faults.empty() ? fault_name(ctx) : faults.front().name + " (" + code + ")");
+    lines.add("what", line);
     const char *advice = http_advice(kind == EXIT_HTTP ? ctx->error : 0);
     if (const soap_report *const told = kind == EXIT_NETWORK ? soap_call_report(ctx) : nullptr)
         advice = ending_advice(told->ended_by);

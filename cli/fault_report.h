@@ -12,6 +12,13 @@ namespace cli {
 // The program's exit code for an error of the engine.
 exit_code exit_code_of(soap *ctx);
 
+// Name of the fault received: its typed detail's, "Client.ObjectNotFound", or else its code. Empty for another
+// failure.
+std::string fault_name(soap *ctx);
+
+// What happened, in one line.
+std::string failure_line(soap *ctx);
+
 // The report, lines with ends, fit for a terminal.
 //   what   "profile get"
 //   where  the endpoints called

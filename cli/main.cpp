@@ -1,9 +1,7 @@
 // main.cpp - zuv, the command line: its commands, and how failures are reported.
 //
 // Elsewhere: what the commands do, one file each (call_command.h, data_command.h, new_command.h,
-// check_command.h, trace_command.h).
-#include <algorithm>
-#include <cctype>
+// check_command.h, ping_command.h, trace_command.h).
 #include <cstdio>
 #include <functional>
 #include <list>
@@ -17,9 +15,12 @@
 #include "check_command.h"
 #include "completion.h"
 #include "data_command.h"
+#include "defaults.h"
 #include "failure.h"
 #include "nearest.h"
 #include "new_command.h"
+#include "ping_command.h"
+#include "text_files.h"
 #include "trace_command.h"
 
 namespace {
@@ -27,13 +28,6 @@ namespace {
 using namespace cli;
 
 using action = std::function<exit_code()>;
-
-std::string lower(std::string text)
-{
-    std::transform(text.begin(), text.end(), text.begin(),
-                   [](unsigned char c) { return static_cast<char>(std::tolower(c)); });
-    return text;
-}
 
 // The first sentence of a documentation.
 std::string summary(const std::string &text)
@@ -53,8 +47,12 @@ void declare_calls(CLI::App &app, std::list<call_options> &options, action &chos
             CLI::App *const command = group->add_subcommand(op.name, summary(op.documentation));
             call_options &own = options.emplace_back();
             own.declare(*command);
-            command->callback(
-                [&own, &op, &chosen] { chosen = [&own, &op] { return call_operation(op, own); }; });
+            command->callback([&own, &op, &chosen, command] {
+                chosen = [&own, &op, command] {
+                    apply_defaults(*command, own.connection);
+                    return call_operation(op, own);
+                };
+            });
         }
     }
 }
@@ -69,10 +67,30 @@ void declare_data(CLI::App &app, std::list<data_options> &options, action &chose
         CLI::App *const command = group->add_subcommand(name, about);
         data_options &own = options.emplace_back();
         own.declare(*command, delivers);
-        command->callback([&own, &chosen, perform] { chosen = [&own, perform] { return perform(own); }; });
+        command->callback([&own, &chosen, perform, command] {
+            chosen = [&own, perform, command] {
+                apply_defaults(*command, own.connection);
+                return perform(own);
+            };
+        });
     };
     add("get", "Fetches the data at an address.", false, fetch_data);
     add("put", "Delivers a file to an address.", true, deliver_data);
+}
+
+void declare_ping(CLI::App &app, ping_options &options, action &chosen)
+{
+    CLI::App *const command =
+        app.add_subcommand("ping",
+                           "Tells whether a service is there, its certificate, and which ports answer.")
+            ->group("Ports");
+    options.declare(*command);
+    command->callback([&options, &chosen, command] {
+        chosen = [&options, command] {
+            apply_defaults(*command, options.connection);
+            return ping_services(options);
+        };
+    });
 }
 
 // Options of the commands that work on documents and traces.
@@ -130,10 +148,12 @@ int run(int argc, char **argv)
                "9 fault of the service, 10 other fault, 11 file. More: man zuv");
     std::list<call_options> calls;
     std::list<data_options> transfers;
+    ping_options ping;
     tool_options tools;
     trace_options trace;
     action chosen;
     declare_calls(app, calls, chosen);
+    declare_ping(app, ping, chosen);
     declare_data(app, transfers, chosen);
     declare_documents(app, tools, chosen);
     declare_trace(app, trace, chosen);

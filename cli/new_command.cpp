@@ -8,9 +8,9 @@
 #include <set>
 #include <sstream>
 
-#include <zuv_client_pro/soap.h>
 #include <zuv_client_pro/soap_registry.h>
 
+#include "documents.h"
 #include "failure.h"
 #include "operations.h"
 #include "simple_types.h"
@@ -21,7 +21,6 @@ namespace cli {
 namespace {
 
 constexpr std::size_t COLUMNS = 110;
-constexpr const char XSI_URI[] = "http://www.w3.org/2001/XMLSchema-instance";
 
 // A comment of one or more lines; "--" is not allowed in one.
 std::string comment(const std::string &indent, const std::string &text)
@@ -84,12 +83,7 @@ std::string declarations(const contract::data_class &of)
     for (const contract::data_class *one : contract::lineage(of))
         for (const contract::member &member : one->members)
             add(member.tag);
-    std::string text;
-    for (const soap_namespace *row = soap_program_namespaces; row->prefix != nullptr; ++row)
-        if (prefixes.contains(row->prefix))
-            text += "\n    xmlns:" + std::string(row->prefix) + "=\"" +
-                    (row->prefix == std::string("xsi") ? XSI_URI : row->uri) + "\"";
-    return text;
+    return namespace_declarations("\n    ", prefixes);
 }
 
 std::string attribute_texts(const contract::data_class &of)

@@ -5,6 +5,7 @@
 
 #include "check.h"
 #include "failure.h"
+#include "json.h"
 #include "text_files.h"
 
 namespace cli {
@@ -21,7 +22,9 @@ namespace {
 void *read_document(document_reader &reader, const std::string &file, const contract::data_class &type,
                     const std::function<void *(soap *ctx)> &read)
 {
-    const std::string xml = read_file(file);
+    const std::string given = read_file(file);
+    const std::string xml =
+        is_json(given) ? xml_of(given, type, file == "-" ? "standard input" : printable(file)) : given;
     const checked_document checked = check_document(xml, nullptr);
     if (checked.type != nullptr && checked.type != &type)
         refuse(file,

@@ -10,7 +10,7 @@
 
 namespace cli {
 
-// An object of the reader. failure with EXIT_DOCUMENT and the findings if the document is not one of the
+// An object of the reader, of a document in XML or JSON. failure with EXIT_DOCUMENT and the findings if the document is not one of the
 // class.
 //   file  "-" for standard input
 //   read  reads the root element as the class

@@ -173,4 +173,10 @@ bool is_number(std::string_view type)
     return type == "xsd:int" || type == "xsd:double";
 }
 
+bool is_whole_number(std::string_view type)
+{
+    return type == "xsd:int" || type == "xsd:integer" || type == "xsd:nonNegativeInteger" ||
+           type == "xsd:positiveInteger";
+}
+
 } // namespace cli

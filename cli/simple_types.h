@@ -15,6 +15,8 @@ std::string value_words(std::string_view type);
 // A value of the type, to begin with; empty for texts.
 std::string sample_value(std::string_view type);
 
+// Types whose values JSON holds as numbers.
 bool is_number(std::string_view type);
+bool is_whole_number(std::string_view type);
 
 } // namespace cli

@@ -1,11 +1,11 @@
 // text_files.cpp - see text_files.h.
 #include "text_files.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <cstdint>
 #include <cstdio>
 #include <cstring>
-#include <memory>
 #include <optional>
 #include <system_error>
 
@@ -18,17 +18,6 @@ namespace {
 
 constexpr std::size_t STRETCH = 65536; // bytes
 
-struct closer {
-    void operator()(std::FILE *file) const { std::fclose(file); }
-};
-using open_file = std::unique_ptr<std::FILE, closer>;
-
-[[noreturn]] void fail(const std::string &path, const char *what)
-{
-    const int reason = errno;
-    throw failure(EXIT_FILE, path + ": " + what + ": " + std::generic_category().message(reason));
-}
-
 std::string read_all(std::FILE *file, const std::string &path)
 {
     std::string bytes;
@@ -37,7 +26,7 @@ std::string read_all(std::FILE *file, const std::string &path)
     while (const std::size_t got = std::fread(stretch, 1, sizeof stretch, file))
         bytes.append(stretch, got);
     if (std::ferror(file) != 0)
-        fail(path, "can't be read");
+        fail_file(path, "can't be read");
     return bytes;
 }
 
@@ -74,14 +63,24 @@ bool steers(std::uint32_t code)
 
 } // namespace
 
+void fail_file(const std::string &path, const char *what)
+{
+    const int reason = errno;
+    throw failure(EXIT_FILE, (path == "-" ? "standard input" : path) + ": " + what + ": " +
+                                 std::generic_category().message(reason));
+}
+
+file_handle open_to_read(const std::string &path)
+{
+    file_handle file(std::fopen(path.c_str(), "rb"));
+    if (!file)
+        fail_file(path, "can't be opened");
+    return file;
+}
+
 std::string read_file(const std::string &path)
 {
-    if (path == "-")
-        return read_all(stdin, "standard input");
-    const open_file file(std::fopen(path.c_str(), "rb"));
-    if (!file)
-        fail(path, "can't be opened");
-    return read_all(file.get(), path);
+    return path == "-" ? read_all(stdin, path) : read_all(open_to_read(path).get(), path);
 }
 
 std::string read_secret(const std::string &path)
@@ -92,12 +91,18 @@ std::string read_secret(const std::string &path)
 
 void write_file(const std::string &path, std::string_view bytes)
 {
+    write_file(path, [bytes](std::FILE *file) { std::fwrite(bytes.data(), 1, bytes.size(), file); });
+}
+
+void write_file(const std::string &path, const std::function<void(std::FILE *)> &write)
+{
     std::optional<replaced_file> replaced;
     if (path != "-")
         replaced.emplace(path);
     std::FILE *const file = replaced ? replaced->stream() : stdout;
-    if (std::fwrite(bytes.data(), 1, bytes.size(), file) != bytes.size() || std::fflush(file) != 0)
-        fail(replaced ? path : "standard output", "can't be written");
+    write(file);
+    if (std::fflush(file) != 0 || std::ferror(file) != 0)
+        fail_file(replaced ? path : "standard output", "can't be written");
     if (replaced)
         replaced->commit();
 }
@@ -107,6 +112,11 @@ std::string printable(std::string_view text, bool lines)
     std::string clean;
     clean.reserve(text.size());
     while (!text.empty()) {
+        const auto plain = std::find_if(text.begin(), text.end(), [](char c) { return c < ' ' || c > '~'; });
+        clean.append(text.begin(), plain);
+        text.remove_prefix(static_cast<std::size_t>(plain - text.begin()));
+        if (text.empty())
+            break;
         std::uint32_t code = 0;
         const std::size_t length = decode(text, code);
         const bool blank = code == '\n' || code == '\t' || code == '\r';
@@ -119,6 +129,13 @@ std::string printable(std::string_view text, bool lines)
         text.remove_prefix(length == 0 ? 1 : length);
     }
     return clean;
+}
+
+std::string lower(std::string text)
+{
+    std::transform(text.begin(), text.end(), text.begin(),
+                   [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c + ('a' - 'A')) : c; });
+    return text;
 }
 
 std::string size_words(unsigned long long bytes)

@@ -25,6 +25,13 @@ add_custom_target(docs_screenshots
     DEPENDS zuv zuv-service
     VERBATIM)
 
+if(TARGET classes_test) # documents as JSON, for every class
+    target_sources(classes_test PRIVATE tests/classes/json_test.cpp ${ZUV_GENERATED_DIR}/tools/contract_description.cpp
+        cli/json.cpp cli/contract.cpp cli/documents.cpp cli/nearest.cpp cli/replaced_file.cpp cli/simple_types.cpp cli/text_files.cpp)
+    target_include_directories(classes_test PRIVATE ${PROJECT_SOURCE_DIR}/cli)
+    target_link_libraries(classes_test PRIVATE CLI11::CLI11 nlohmann_json::nlohmann_json pugixml::pugixml)
+endif()
+
 # A test of a program is a Python script. They leave nothing in the source tree.
 if(ZUV_BUILD_TESTS)
     foreach(part cli service)

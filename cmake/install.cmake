@@ -39,5 +39,8 @@ foreach(program zuv-service zuv)
     install(TARGETS ${program} RUNTIME COMPONENT tools)
 endforeach()
 install(FILES cli/completion/zuv.bash DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions RENAME zuv COMPONENT tools)
+set(ZUV_ZSH_COMPLETIONS ${CMAKE_INSTALL_DATADIR}/zsh/vendor-completions CACHE STRING
+    "Where zsh looks for completions of packages; elsewhere than on Debian it is share/zsh/site-functions")
+install(FILES cli/completion/zuv.zsh DESTINATION ${ZUV_ZSH_COMPLETIONS} RENAME _zuv COMPONENT tools)
 install(FILES docs/command-line.md DESTINATION ${CMAKE_INSTALL_DOCDIR} COMPONENT tools)
 install(FILES service/README.md DESTINATION ${CMAKE_INSTALL_DOCDIR} RENAME zuv-service.md COMPONENT tools)

@@ -50,7 +50,8 @@ struct soap_report {
     std::int64_t certificate_not_after;  // without a certificate
     const char *certificate_refusal;     // why it wasn't accepted
     soap_ending ended_by;
-    int http_status; // received HTTP status; 0 for none
+    int http_status;                // received HTTP status; 0 for none
+    const char *certificate_issuer; // who signed the peer's certificate, as by RFC 2253
 };
 
 // The report of the last exchange, or of the one that runs.

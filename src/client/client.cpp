@@ -242,7 +242,7 @@ const soap_report &client::report() const
         soap_report none{};
         none.lookup_time = none.connect_time = none.tls_time = none.first_byte_time = none.total_time = -1;
         none.peer = none.local = none.tls_version = none.tls_cipher = none.certificate_subject =
-            none.certificate_refusal = "";
+            none.certificate_issuer = none.certificate_refusal = "";
         return none;
     }();
     const soap_report *const report = engine_ != nullptr ? soap_call_report(engine_) : nullptr;

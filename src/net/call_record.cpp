@@ -126,8 +126,10 @@ void describe_connection(soap_call_record &record)
     report.tls_cipher = text_or_empty(record.tls_cipher);
     if (record.certificate == nullptr)
         return;
-    tls_write_subject(record.certificate, record.subject, sizeof record.subject);
+    tls_write_name(X509_get_subject_name(record.certificate), record.subject, sizeof record.subject);
+    tls_write_name(X509_get_issuer_name(record.certificate), record.issuer, sizeof record.issuer);
     report.certificate_subject = record.subject;
+    report.certificate_issuer = record.issuer;
     report.certificate_not_before = seconds_of(X509_get0_notBefore(record.certificate));
     report.certificate_not_after = seconds_of(X509_get0_notAfter(record.certificate));
 }
@@ -195,7 +197,8 @@ const soap_report *soap_call_report(soap *ctx)
     if (record == nullptr || (record->began == 0 && !record->running)) // it serves soap_cancel only
         return nullptr;
     soap_report &report = record->report;
-    report.peer = report.local = report.tls_version = report.tls_cipher = report.certificate_subject = "";
+    report.peer = report.local = report.tls_version = report.tls_cipher = "";
+    report.certificate_subject = report.certificate_issuer = "";
     if (record->opened)
         describe_connection(*record);
     report.certificate_refusal = record->refusal;

@@ -30,7 +30,7 @@ struct soap_call_record {
     bool resumed;
 
     // Space of the report's texts.
-    char peer_text[64], local_text[64], subject[256], refusal[512];
+    char peer_text[64], local_text[64], subject[256], issuer[256], refusal[512];
 
     // For soap_cancel. The state alone decides; the descriptor only wakes who waits, and may do so for
     // nothing.

@@ -70,9 +70,9 @@ const char *tls_error_text(soap *ctx, int result);
 // Is the peer verified and the host asked for? By tls_flags. 0, or 30 with a fault.
 int tls_check_peer(soap *ctx, const char *host);
 
-// Writes the subject of a certificate as by RFC 2253, cut to `size` bytes. What could be markup or control an
-// output becomes "?".
-void tls_write_subject(const X509 *certificate, char *text, std::size_t size);
+// Writes a name of a certificate, its subject or issuer, as by RFC 2253, cut to `size` bytes. What could be
+// markup or control an output becomes "?".
+void tls_write_name(const X509_NAME *name, char *text, std::size_t size);
 
 // Why the chain of certificates was refused, as far as OpenSSL asked the verify callback.
 struct tls_verdict {

@@ -284,7 +284,7 @@ void note_verdict(tls_verdict *verdict, X509_STORE_CTX *store)
     verdict->depth = X509_STORE_CTX_get_error_depth(store);
     verdict->subject[0] = '\0';
     if (const X509 *const certificate = X509_STORE_CTX_get_current_cert(store))
-        tls_write_subject(certificate, verdict->subject, sizeof verdict->subject);
+        tls_write_name(X509_get_subject_name(certificate), verdict->subject, sizeof verdict->subject);
     call_note_certificate(verdict->ctx, X509_STORE_CTX_get0_cert(store));
 }
 
@@ -304,12 +304,12 @@ int listen_to_verdict(int result, X509_STORE_CTX *store)
 
 } // namespace
 
-void tls_write_subject(const X509 *certificate, char *text, std::size_t size)
+void tls_write_name(const X509_NAME *name, char *text, std::size_t size)
 {
-    const std::unique_ptr<BIO, bio_delete> name(BIO_new(BIO_s_mem()));
-    if (name)
-        X509_NAME_print_ex(name.get(), X509_get_subject_name(certificate), 0, XN_FLAG_RFC2253);
-    const int length = name ? BIO_read(name.get(), text, static_cast<int>(size - 1)) : 0;
+    const std::unique_ptr<BIO, bio_delete> out(BIO_new(BIO_s_mem()));
+    if (out)
+        X509_NAME_print_ex(out.get(), name, 0, XN_FLAG_RFC2253);
+    const int length = out ? BIO_read(out.get(), text, static_cast<int>(size - 1)) : 0;
     text[length > 0 ? length : 0] = '\0';
     std::replace_if(
         text, text + std::strlen(text), [](char c) { return !is_harmless(c); }, '?');

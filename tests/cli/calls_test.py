@@ -1,5 +1,6 @@
 #!/usr/bin/python3
 """Calls from the command line: every operation, the options, what comes back, and how failures are told."""
+import base64
 import email
 import email.policy
 import glob
@@ -75,6 +76,9 @@ class calls(unittest.TestCase):
                     self.assertEqual("5 calls in" in run.stderr, "repeat" in options)
             held = self.file("held.xml", zuv.run("profile", "get", "-t", uri, env=env).stdout)
             self.expect(zuv.run("profile", "set", held, "-t", uri, env=env), 0)  # an answer serves as a request
+            changed = json.dumps({**first, "identity": {"name": "Ada <&>"}})
+            run = self.expect(zuv.run("profile", "set", "-", "-t", uri, "--json", given=changed, env=env), 0)
+            self.assertEqual(json.loads(run.stdout)["identity"], {"name": "Ada <&>"})
             self.expect(zuv.run("profile", "get", "-t", uri, "-e", "http://127.0.0.1:1", "-e", address), 0)
 
     def test_ports_without_a_proxy_class_are_called_the_same_way(self):
@@ -171,16 +175,54 @@ class calls(unittest.TestCase):
             with self.subTest(arguments=arguments):
                 self.expect(zuv.run(*arguments), code, words)
 
+    def certificate(self, name, subject):
+        path = os.path.join(self.folder, name)
+        subprocess.run(["openssl", "req", "-x509", "-newkey", "rsa:2048", "-nodes", "-days", "2", "-keyout", path + ".key",
+                        "-out", path, "-subj", "/CN=x", "-addext", "subjectAltName=" + subject], check=True, capture_output=True)
+        with open(path + ".key") as key, open(path, "a") as both:
+            both.write(key.read())
+        return path
+
+    def test_ping_tells_what_is_there(self):
+        with zuv.service() as address:
+            self.expect(zuv.run("ping", env={"ZUV_ENDPOINT": address}), 0, "  connected to ", "\n  Profile          answers in ")
+            told, = json.loads(zuv.run("ping", "--json", "-e", address).stdout)
+            self.assertEqual((told["ok"], [port["answers"] for port in told["ports"].values()]), (True, [True] * 5))
+            self.expect(zuv.run("ping", "-e", address + "/elsewhere"), 6, "Profile          doesn't answer", "404")
+        self.expect(zuv.run("ping", "-e", "http://127.0.0.1:1"), 4, "no connection to", "Connection refused")
+        here = self.certificate("here.pem", "IP:127.0.0.1")
+        for code, options, answers in (7, ["--ca-file", here], [False, False, True, False, False]), (5, [], [False]):
+            with self.subTest(options=options), zuv.peer(*[zuv.answer(GOT)] * len(answers), certificate=here) as (address, _):
+                told, = json.loads(self.expect(zuv.run("ping", "--json", "-e", address, *options), code).stdout)
+                shown = told["certificate"]
+                self.assertEqual((shown["subject"], shown["issuer"], "refused" in shown), ("CN=x", "CN=x", not options))
+                self.assertEqual([port["answers"] for port in told["ports"].values()], answers)
+
+    def test_defaults_come_from_the_environment_and_a_file(self):
+        def configure(text, mode=0o600):
+            os.makedirs(os.path.join(self.folder, "zuv"), exist_ok=True)
+            os.chmod(self.file("zuv/config", text), mode)
+        env = {"XDG_CONFIG_HOME": self.folder}
+        rows = (([], {}, "urn:file", b"ada:s3cret"), ([], {"ZUV_TARGET": "urn:env", "ZUV_PASSWORD": "other"}, "urn:env", b"ada:other"),
+                (["-t", "urn:option", "--user", "eve"], {"ZUV_TARGET": "urn:env"}, "urn:option", b"eve:s3cret"))
+        with zuv.peer(*[zuv.answer(GOT)] * len(rows)) as (address, requests):
+            for (options, more, target, user), mode in zip(rows, (0o644, 0o600, 0o600)):
+                configure('endpoint = %s\nuser = ada\npassword = "s3cret"\ntarget = urn:all\nsoap12 = true\n[profile.get]\nsoap12=false\n'
+                          'target = urn:file\nnote = ["a", "b"]\n[data]\nuser = none\n' % address, mode)
+                run = self.expect(zuv.run("profile", "get", *options, env={**env, **more}), 0)
+                self.assertEqual(("others may read it" in run.stderr, "s3cret" in run.stderr), (mode == 0o644, False))
+                self.assertIn(b"Authorization: Basic " + base64.b64encode(user) + b"\r\n", requests[-1])
+                self.assertRegex(requests[-1].decode(), "text/xml(?s:.)*targetURI>%s<.*note>a<.*note>b<" % target)
+        for text, words in (("endpiont = x", 'no option "endpiont"; did you mean "endpoint"?'), ("connect-limit = soon", "connect-limit"),
+                            ("[profle]\nuser = x", "the section [profle]"), ('proxy = "u:s3cret@h:1"', "--proxy-user"),
+                            ('endpoint = "http://u:s3cret@h"', "--user")):
+            with self.subTest(text=text):
+                configure(text)
+                self.assertNotIn("s3cret", self.expect(zuv.run("profile", "get", env=env), 2, words).stderr)
+        self.expect(zuv.run("profile", "get", env={"ZUV_SILENCE_LIMIT": "long"}), 2, "ZUV_SILENCE_LIMIT: ")
+
     def test_tls_names_must_match_unless_told_otherwise(self):
-        def make(name, subject):
-            path = os.path.join(self.folder, name)
-            subprocess.run(["openssl", "req", "-x509", "-newkey", "rsa:2048", "-nodes", "-days", "2", "-keyout", path + ".key",
-                            "-out", path, "-subj", "/CN=x", "-addext", "subjectAltName=" + subject], check=True,
-                           capture_output=True)
-            with open(path + ".key") as key, open(path, "a") as both:
-                both.write(key.read())
-            return path
-        here, other = make("here.pem", "IP:127.0.0.1"), make("other.pem", "DNS:elsewhere.example")
+        here, other = self.certificate("here.pem", "IP:127.0.0.1"), self.certificate("other.pem", "DNS:elsewhere.example")
         trusted, refused = "TLSv certificate TLS sent first received HTTP", "certificate certificate sent received"
         for code, certificate, options, steps in (
                 (0, here, ["--ca-file", here], trusted), (5, here, [], refused), (5, other, ["--ca-file", other], "TLSv " + refused),

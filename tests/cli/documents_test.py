@@ -76,6 +76,29 @@ class documents(unittest.TestCase):
         run = check(ROOT + "<p:odd/>\n" * 500 + "</p:ProfileContent>")
         self.assertEqual(run.stderr.count("\n"), 100)
 
+    def test_json_that_is_no_document_of_the_class_is_told_with_its_place(self):
+        rows = (
+            ('{"identity": {"nme": "x"}}', '/identity: "nme" is no member of protocol:Identity; did you mean "name"?'),
+            ('{"state": 5}', "/state: should be one of active, "),
+            ('{"contact": [{}, {"@type": "protocol:Adress"}]}', "/contact/1/@type: should name protocol:Contact"),
+            ('{"contact": [5], "@odd": "1"}', "/contact/0: should be an object"),
+            ('{"identity": [{}]}', "/identity: should be one value, not an array"),
+            ('{"identity": {}, "identity": {}}', '"identity" stands twice'),
+            ('{"credentials": [{"expiration": 1}]}', "/credentials/0/expiration: should be a date and time"),
+            ('{"contact": {"name": "\\u0001"}}', "/contact/name: a control character"),
+            ('{"contact": {"name": {"text": "a", "x": 1}}}', '"x" is no member'),
+            ('{"state": null,', "not JSON: parse error at line 1"),
+            ('{"profile": [' * 600 + "]}" * 600, "more than 500 objects within each other"),
+        )
+        for document, words in rows:
+            with self.subTest(document=document[:60]):
+                run = check(document, "--class", "ProfileContent")
+                self.assertEqual((run.returncode, run.stdout), (3, ""))
+                self.assertIn(words, run.stderr)
+        self.assertIn("give it by --class", check("{}").stderr)
+        good = '{"state": null, "contact": {"name": "x"}, "credentials": [{"key": {"@href": "cid:1"}}]}'
+        self.assertEqual(check(good, "--class", "ProfileContent").returncode, 0)
+
     def test_what_is_right_passes_in_every_guise(self):
         content = ('<c:credentials><c:certificate>AQ ==</c:certificate><c:expiration> 2024-02-29T24:00:00.5+01:00 </c:expiration>'
                    '</c:credentials><p:state xsi:nil="true"/>')

@@ -30,7 +30,7 @@ def _pattern(lines):
 def check(test, rows, folder, **environment):
     script = "".join("{ %s\n} 2>&1; printf '\\0'\n" % command for command, _ in rows)
     run = subprocess.run(["bash", "-c", script], capture_output=True, text=True, timeout=zuv.LIMIT_S, cwd=folder, env={
-        **os.environ, "PATH": os.path.dirname(zuv.PROGRAM) + ":" + os.environ["PATH"], **environment})
+        **os.environ, "XDG_CONFIG_HOME": os.devnull, "PATH": os.path.dirname(zuv.PROGRAM) + ":" + os.environ["PATH"], **environment})
     outputs = run.stdout.split("\0")[:-1]
     test.assertEqual((len(outputs), run.stderr), (len(rows), ""))
     for (command, expected), output in zip(rows, outputs):

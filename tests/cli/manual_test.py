@@ -1,6 +1,6 @@
 #!/usr/bin/python3
 """The manual and the page about the command line: their examples do what they say, options and exit codes are the program's.
-And completion in bash."""
+And completion in bash and zsh."""
 import os
 import re
 import shutil
@@ -15,7 +15,7 @@ import programs  # of the interoperability tests: servers and certificates
 MANUAL = os.path.join(zuv.SOURCE, "docs", "man", "zuv.1")
 SERVICE_MANUAL = os.path.join(zuv.SOURCE, "docs", "man", "zuv-service.1")
 PAGE = os.path.join(zuv.SOURCE, "docs", "command-line.md")
-COMPLETION = os.path.join(zuv.SOURCE, "cli", "completion", "zuv.bash")
+COMPLETION = os.path.join(zuv.SOURCE, "cli", "completion", "zuv.")
 HELPERS = "/usr/share/bash-completion/bash_completion"
 
 def source():
@@ -50,7 +50,7 @@ class manual(unittest.TestCase):
     def test_options_and_exit_codes_are_those_of_the_program(self):
         told = set(re.findall(r"Fl Fl ([a-z0-9-]+)", source())) - {"help"}
         listed = set()
-        for command in ("profile get", "data get", "data put", "new", "check", "trace"):
+        for command in ("profile get", "ping", "data get", "data put", "new", "check", "trace"):
             listed |= set(re.findall(r"(?m)^  (?:-\w,)?--([a-z0-9-]+)", zuv.run(*command.split(), "--help").stdout))
         self.assertEqual(told, listed - {"help"})
         with open(SERVICE_MANUAL) as file:
@@ -68,25 +68,33 @@ class manual(unittest.TestCase):
         run = subprocess.run(["mandoc", "-T", "lint", "-W", "warning", MANUAL, SERVICE_MANUAL], capture_output=True, text=True)
         self.assertEqual((run.returncode, run.stdout), (0, ""))
 
-    def test_bash_completes_commands_options_and_classes(self):
-        if not os.path.exists(HELPERS):
-            self.skipTest("bash-completion is not installed")
+    def bash_completes(self, words):
+        line = "zuv " + " ".join(words)
+        split = re.findall(r":|[^:\s]+", line) + ([""] if line.endswith(" ") else [])
+        return ["bash", "-c", '. ' + HELPERS + '; . "$0"; '
+                'COMP_WORDBREAKS=" :"; COMP_WORDS=("$@"); COMP_CWORD=$(($# - 1)); COMP_LINE="%s"; COMP_POINT=${#COMP_LINE}; '
+                '_zuv; printf "%%s\\n" "${COMPREPLY[@]}"' % line, COMPLETION + "bash", *split]
+
+    def zsh_completes(self, words):
+        return ["zsh", "-fc", 'compadd() { shift; print -rl -- "$@" }; _files() { }; '
+                'words=("$@"); CURRENT=$#; PREFIX=${words[-1]}; . "$0"', COMPLETION + "zsh", "zuv", *words]
+
+    def test_shells_complete_commands_options_and_classes(self):
+        shells = [self.bash_completes] * os.path.exists(HELPERS) + [self.zsh_completes] * bool(shutil.which("zsh"))
+        if not shells:
+            self.skipTest("neither bash-completion nor zsh is installed")
         rows = ((["pro"], ["problemreport", "profile"]), (["profile", ""], ["add", "create", "get", "refreshCredentials", "remove", "set"]),
                 (["profile", "get", "--sil"], ["--silence-limit"]), (["new", "Client.Authentication.C"], ["Client.Authentication.CredentialsExpired",
                                                        "Client.Authentication.CredentialsMismatch"]), (["check", "--class", "Addr"], ["Address"]),
                 (["profile", "get", "--output", ""], []), (["trace", "--h"], ["--help", "--html"]), (["new", "protocol:Addr"], ["Address"]))
-        for words, expected in rows:
-            with self.subTest(words=words):
-                line = "zuv " + " ".join(words)
-                split = re.findall(r":|[^:\s]+", line) + ([""] if line.endswith(" ") else [])
-                script = ('. ' + HELPERS + '; . "$0"; '
-                          'COMP_WORDBREAKS=" :"; COMP_WORDS=("$@"); COMP_CWORD=$(($# - 1)); COMP_LINE="%s"; COMP_POINT=${#COMP_LINE}; '
-                          '_zuv; printf "%%s\\n" "${COMPREPLY[@]}"' % line)
-                run = subprocess.run(["bash", "-c", script, COMPLETION, *split], capture_output=True, text=True, timeout=60,
-                                     env={**os.environ, "PATH": os.path.dirname(zuv.PROGRAM) + ":" + os.environ["PATH"]})
-                self.assertEqual(run.stderr, "")
-                found = sorted(filter(None, run.stdout.split("\n")))
-                self.assertEqual(found, expected)
+        for shell in shells:
+            for words, expected in rows:
+                with self.subTest(shell=shell.__name__, words=words):
+                    run = subprocess.run(shell(words), capture_output=True, text=True, timeout=60,
+                                         env={**os.environ, "PATH": os.path.dirname(zuv.PROGRAM) + ":" + os.environ["PATH"]})
+                    self.assertEqual(run.stderr, "")
+                    prefix = "protocol:" if shell == self.zsh_completes and ":" in words[-1] else ""  # to bash a word of its own
+                    self.assertEqual(sorted(filter(None, run.stdout.split("\n"))), [prefix + one for one in expected])
 
 
 if __name__ == "__main__":

@@ -19,7 +19,7 @@ def run(*arguments, given=None, env=None, text=True, cwd=None):
     """The finished zuv: returncode, stdout, stderr."""
     clean = {name: value for name, value in os.environ.items() if not name.startswith("ZUV_")}
     return subprocess.run([PROGRAM, *arguments], input=given, capture_output=True, text=text, timeout=LIMIT_S, cwd=cwd,
-                          env={**clean, **(env or {})})
+                          env={**clean, "XDG_CONFIG_HOME": os.devnull, **(env or {})})
 
 
 def envelope(body, version=1):

@@ -329,6 +329,7 @@ TEST_F(client_reports, follow_a_call_on_a_new_connection_and_on_a_kept_one)
             EXPECT_STREQ(one->tls_version, tls ? "TLSv1.3" : "");
             EXPECT_EQ(*one->tls_cipher != '\0', tls);
             EXPECT_STREQ(one->certificate_subject, tls ? "CN=peer.test,O=Test" : "");
+            EXPECT_STREQ(one->certificate_issuer, tls ? "CN=Test authority,O=Test" : "");
             EXPECT_EQ(one->certificate_not_after > std::time(nullptr), tls);
             EXPECT_STREQ(one->certificate_refusal, "");
         }
