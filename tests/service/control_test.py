@@ -135,7 +135,8 @@ class control(unittest.TestCase):
                 self.assertEqual([one["number"] for one in recent(address, 65)["exchanges"]], list(range(16, 66)))
                 self.assertEqual(ask(address, "GET", RECENT, host="rebound.test").status, 403)
             before, after = (pathlib.Path(name).read_text().splitlines() for name in (log + ".1", log))
-            for line, words in zip((line for line in before if RECENT not in line), ("POST Profile/create 200", "- - 400", "GET /zuv/v1.0/data/*** 404", "GET /a%7F 404")):
+            for line, words in zip((line for line in before if RECENT not in line), (
+                    "POST Profile/create 200", "- - 400", "GET /zuv/v1.0/data/*** 404", "GET /a%7F 404")):
                 self.assertRegex(line, r"^\d{4}-\d\d-\d\dT[\d:.]+Z 127\.0\.0\.1:\d+ %s in=\d+ out=[1-9]\d* ms=[\d.]+$" % re.escape(words))
             self.assertEqual(os.stat(log).st_mode & 0o777, 0o600)
             self.assertGreaterEqual(len(before + after), 69, "one for each exchange")
@@ -145,7 +146,8 @@ class control(unittest.TestCase):
         browser.need(self)
         hostile = "&lt;/pre>&lt;img src=x onerror=alert(1)>"
         with zuv.service() as address:
-            exchange(address, post("Profile", envelope("Profile", request("create", "<profileAuthority>%s</profileAuthority>" % hostile))))
+            exchange(address, post("Profile", envelope("Profile", request(
+                "create", "<profileAuthority>%s</profileAuthority>" % hostile))))
             recent(address, 1)
             shown = browser.dom(address + "/#open", "--virtual-time-budget=3000")
         self.assertRegex(shown, r"<summary[^>]*>[^<]*POST Profile/create 200")
@@ -174,7 +176,8 @@ class control(unittest.TestCase):
                     urllib.request.urlopen(address, timeout=60)
                 with self.assertRaisesRegex(urllib.error.HTTPError, "401"):
                     urllib.request.urlopen(address, timeout=60, context=ssl.create_default_context(cafile=ca))
-            self.assertEqual([os.stat(os.path.join(made, name)).st_mode & 0o777 for name in ("server.pem", "client.pem")], 2 * [0o600])
+            self.assertEqual([os.stat(os.path.join(made, name)).st_mode & 0o777
+                              for name in ("server.pem", "client.pem")], 2 * [0o600])
             both = os.path.join(made, "server.pem")
             with zuv.service("--tls", "--cert", both, "--key", both, "--client-ca", ca) as address:
                 self.assertIn("portType", fetch(address, certificate=True))
