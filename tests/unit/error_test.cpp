@@ -217,6 +217,8 @@ TEST(fault_location, shows_the_input_around_the_place)
 {
     soap ctx;
     EXPECT_EQ(location(&ctx, 3, "<a>bc"), "") << "error 0";
+    ctx.error = SOAP_STOP;
+    EXPECT_EQ(location(&ctx, 3, "<a>bc"), "");
     ctx.error = SOAP_SYNTAX_ERROR;
     EXPECT_EQ(location(&ctx, 3, "<a>bc"), "<a>\n<!-- ** HERE ** -->\nb\n") << "the last byte is cut";
     EXPECT_EQ(location(&ctx, 5, "<a>bc"), "<a>bc\n<!-- ** HERE ** -->\n");

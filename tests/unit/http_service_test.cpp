@@ -151,6 +151,15 @@ TEST(request, that_waits_for_leave_gets_it)
     EXPECT_TRUE(response.sends.empty()); // a client gives no leave
 }
 
+TEST(request, of_http_1_0_gets_no_chunks)
+{
+    accepting_wire wire;
+    wire.output_mode = MODE_CHUNKED;
+    wire.receive("POST / HTTP/1.0\r\n\r\n");
+    EXPECT_EQ(http_read_head(&wire), 0);
+    EXPECT_EQ(wire.output_mode & MODE_IO_MASK, MODE_STORE);
+}
+
 TEST(request, informative_result_of_a_header_waits_for_the_end_of_the_head)
 {
     accepting_wire wire;
