@@ -33,7 +33,7 @@ public:
     void take_data(std::size_t size)
     {
         left_ -= known_ || chunked_ ? size : 0;
-        if (chunked_ && left_ == 0)
+        if (chunked_ && size != 0 && left_ == 0)
             state_ = state::line_end;
     }
 
