@@ -128,11 +128,16 @@ void declare_documents(CLI::App &app, tool_options &options, action &chosen)
 void declare_trace(CLI::App &app, trace_options &options, action &chosen)
 {
     CLI::App *const command =
-        app.add_subcommand("trace", "Shows a trace file: a table of its exchanges, or a page.")
+        app.add_subcommand("trace", "Shows a trace file: a table of its exchanges, one of them, or a page.")
             ->group("Documents");
     command->add_option("FILE", options.file, "Trace; \"-\" for standard input")->capture_default_str();
     command->add_option("--html", options.page, "Write a page on which each exchange can be opened")
         ->type_name("FILE");
+    command->add_option("--show", options.show, "Show the exchange of this number")
+        ->check(CLI::PositiveNumber)
+        ->type_name("N")
+        ->excludes("--html");
+    command->add_flag("--failed", options.failed, "Show only exchanges that failed")->excludes("--show");
     command->add_flag("--show-secrets", options.show_secrets,
                       "Show certificates, keys, passwords and tokens too");
     command->callback([&] { chosen = [&] { return show_trace(options); }; });

@@ -13,7 +13,7 @@ namespace {
 
 constexpr std::size_t CERTAIN = 16; // bytes of plain text that can't follow raw bytes by chance
 
-// Separates framing bytes from data, a byte at a time.
+// Separates framing bytes from data.
 class deframer {
 public:
     explicit deframer(const body_framing &framing)
@@ -23,20 +23,29 @@ public:
     bool ended() const { return ended_ || (!chunked_ && known_ && left_ == 0); }
     bool broken() const { return broken_; }
 
+    // How many of the next bytes are data for certain.
+    std::size_t data_size(std::size_t available) const
+    {
+        if (chunked_ ? state_ != state::data : !known_)
+            return chunked_ ? 0 : available;
+        return static_cast<std::size_t>(std::min<std::uint64_t>(available, left_));
+    }
+    void take_data(std::size_t size)
+    {
+        left_ -= known_ || chunked_ ? size : 0;
+        if (chunked_ && size != 0 && left_ == 0)
+            state_ = state::line_end;
+    }
+
     // True if the byte is data.
     bool take(char c)
     {
-        if (!chunked_) {
-            left_ -= known_ ? 1 : 0;
-            return true;
-        }
-        if (state_ == state::data) {
-            if (--left_ == 0)
-                state_ = state::line_end;
-            return true;
-        }
-        take_framing(c);
-        return false;
+        const bool data = data_size(1) != 0;
+        if (data)
+            take_data(1);
+        else
+            take_framing(c);
+        return data;
     }
 
 private:
@@ -150,9 +159,12 @@ trace_body read_plain(std::string_view trace, std::size_t begin, const body_fram
     deframer frame(framing);
     std::size_t at = begin;
     while (at < trace.size() && !frame.ended() && !frame.broken()) {
-        if (frame.take(trace[at]))
-            body.bytes += trace[at];
-        ++at;
+        const std::size_t data = frame.data_size(trace.size() - at);
+        body.bytes.append(trace.substr(at, data));
+        frame.take_data(data);
+        if (data == 0)
+            frame.take(trace[at]);
+        at += std::max<std::size_t>(data, 1);
     }
     body.end = at;
     body.complete = frame.ended() && !frame.broken();

@@ -3,13 +3,17 @@
 
 #include <algorithm>
 #include <array>
+#include <cstdio>
 #include <filesystem>
 #include <vector>
 
+#include "failure.h"
+#include "mapped_file.h"
 #include "text_files.h"
 #include "trace_exchange.h"
 #include "trace_page.h"
 #include "trace_secrets.h"
+#include "trace_text.h"
 
 namespace cli {
 
@@ -36,12 +40,14 @@ std::string cell(std::string_view text)
     return clean.substr(0, end) + "...";
 }
 
-row row_of(const exchange &one, std::size_t number, bool show_secrets)
+row row_of(const exchange &one, bool show_secrets)
 {
-    std::string about = one.fault;
+    std::string about = show_secrets ? one.fault : without_secrets(one.fault);
     if (about.empty() && !one.complete)
         about = "incomplete";
-    return {std::to_string(number),
+    if (about.empty())
+        about = one.doubt;
+    return {std::to_string(one.number),
             cell(one.operation.empty() ? "unknown" : one.operation),
             one.status == 0 ? "none" : std::to_string(one.status),
             one.soap12 ? "1.2" : "1.1",
@@ -50,12 +56,10 @@ row row_of(const exchange &one, std::size_t number, bool show_secrets)
             cell(shown_start_line(one.target, show_secrets)) + (about.empty() ? "" : "  " + cell(about))};
 }
 
-std::string table(const std::vector<exchange> &exchanges, bool show_secrets)
+std::string table(std::vector<row> rows)
 {
     constexpr bool RIGHT[COLUMNS] = {true, false, false, false, true, true, false};
-    std::vector<row> rows = {{"#", "operation", "status", "SOAP", "sent", "received", "target"}};
-    for (std::size_t i = 0; i < exchanges.size(); ++i)
-        rows.push_back(row_of(exchanges[i], i + 1, show_secrets));
+    rows.insert(rows.begin(), {"#", "operation", "status", "SOAP", "sent", "received", "target"});
     std::array<std::size_t, COLUMNS> widths{};
     for (const row &one : rows)
         for (std::size_t i = 0; i < COLUMNS; ++i)
@@ -75,16 +79,35 @@ std::string table(const std::vector<exchange> &exchanges, bool show_secrets)
 
 exit_code show_trace(const trace_options &options)
 {
-    const std::string bytes = read_file(options.file);
-    const std::vector<trace_message> messages = read_trace(bytes);
-    const std::vector<exchange> exchanges = exchanges_of(messages);
-    if (options.page.empty())
-        write_file("-", table(exchanges, options.show_secrets));
-    else
+    mapped_file file(options.file);
+    exchange_reader exchanges(file.bytes());
+    const auto next = [&](exchange &one) {
+        bool found = exchanges.next(one);
+        while (found && options.failed && !one.failed())
+            found = exchanges.next(one);
+        file.release_before(exchanges.position());
+        return found;
+    };
+    if (!options.page.empty()) {
+        const std::string title =
+            options.file == "-" ? "trace" : std::filesystem::path(options.file).filename().string();
         write_file(options.page,
-                   trace_page(options.file == "-" ? "trace"
-                                                  : std::filesystem::path(options.file).filename().string(),
-                              exchanges, options.show_secrets));
+                   [&](std::FILE *page) { write_trace_page(page, title, options.show_secrets, next); });
+        return EXIT_DONE;
+    }
+    std::vector<row> rows;
+    for (exchange one; next(one);) {
+        if (options.show == 0)
+            rows.push_back(row_of(one, options.show_secrets));
+        else if (one.number == options.show) {
+            write_file("-", exchange_text(one, options.show_secrets));
+            return EXIT_DONE;
+        }
+    }
+    if (options.show != 0)
+        throw failure(EXIT_USAGE,
+                      "--show: there is no exchange " + std::to_string(options.show) + " in the trace");
+    write_file("-", table(std::move(rows)));
     return EXIT_DONE;
 }
 

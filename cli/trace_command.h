@@ -1,6 +1,7 @@
-// trace_command.h - a trace file shown: as a table in the terminal, or as a page.
+// trace_command.h - a trace file shown: as a table or one exchange in the terminal, or as a page.
 #pragma once
 
+#include <cstddef>
 #include <string>
 
 #include "exit_codes.h"
@@ -9,7 +10,9 @@ namespace cli {
 
 struct trace_options {
     std::string file = "wsTrace.log";
-    std::string page; // file for the page; empty: the table
+    std::string page;     // file for the page; empty: the table
+    std::size_t show = 0; // number of the exchange to be shown; 0: the table
+    bool failed = false;  // only exchanges that failed
     bool show_secrets = false;
 };
 

@@ -1,272 +1,175 @@
 // trace_page.cpp - see trace_page.h.
 //
-// Always: text from the trace goes through `escaped`, and the page's policy allows no script and no request
-// at all.
+// Always: text from the trace goes through `shown`, and the page's policy allows its own script only, known by
+// its hash, and no request at all.
 #include "trace_page.h"
 
-#include <algorithm>
+#include <array>
+
+#include <openssl/evp.h>
 
 #include "text_files.h"
+#include "trace_script.h"
 #include "trace_secrets.h"
 #include "trace_style.h"
-#include "xml_tokens.h"
+#include "trace_text.h"
 
 namespace cli {
 
 namespace {
 
-constexpr std::size_t XML_SHOWN_MAX = 400000; // bytes of one document; of the rest only the size is shown
-constexpr std::size_t FOLDED_FROM = 3;        // namespace declarations of one tag
-constexpr std::size_t INDENT_MAX = 40;        // levels; deeper ones are not indented further
+// What a browser opens in a few seconds: bytes of one document, and of a document after so many on the page. Of
+// what is beyond only the size is shown.
+constexpr std::size_t DOCUMENT_MAX = 400000, PAGE_MAX = 16U << 20, DOCUMENT_AFTER_MAX = 1000;
 
-std::string escaped(std::string_view text, bool lines = true)
+std::string html(std::string_view text)
 {
-    std::string safe;
-    for (const char c : printable(text, lines)) {
-        switch (c) {
-        case '<':
-            safe += "&lt;";
-            break;
-        case '>':
-            safe += "&gt;";
-            break;
-        case '&':
-            safe += "&amp;";
-            break;
-        case '"':
-            safe += "&quot;";
-            break;
-        case '\'':
-            safe += "&#39;";
-            break;
-        default:
-            safe += c;
-        }
-    }
-    return safe;
+    return shown(text, text_form::html, false);
 }
 
-std::string span(const char *kind, std::string_view text)
+// The hash of the script as a browser's policy names it.
+std::string script_hash()
 {
-    return std::string("<span class=\"") + kind + "\">" + escaped(text) + "</span>";
+    std::array<unsigned char, EVP_MAX_MD_SIZE> hash{};
+    std::array<unsigned char, EVP_MAX_MD_SIZE * 2> base64{};
+    unsigned size = 0;
+    if (EVP_Digest(TRACE_SCRIPT, sizeof TRACE_SCRIPT - 1, hash.data(), &size, EVP_sha256(), nullptr) != 1)
+        throw std::bad_alloc();
+    EVP_EncodeBlock(base64.data(), hash.data(), static_cast<int>(size));
+    return reinterpret_cast<const char *>(base64.data());
 }
 
-// A document laid out and coloured: one line per element, or per element with text only.
-class xml_layout {
+class page_writer {
 public:
-    explicit xml_layout(bool show_secrets) : show_secrets_(show_secrets) {}
+    page_writer(std::FILE *file, bool show_secrets) : file_(file), show_secrets_(show_secrets) {}
 
-    std::string text(std::string_view xml)
+    void begin(const std::string &title)
     {
-        const std::size_t hidden = xml.size() > XML_SHOWN_MAX ? xml.size() - XML_SHOWN_MAX : 0;
-        xml_tokens tokens(xml.substr(0, XML_SHOWN_MAX));
-        for (xml_token token; tokens.next(token);)
-            add(token);
-        if (hidden != 0)
-            out_ += "\n" + span("n", "and " + size_words(hidden) + " more");
-        return std::move(out_);
+        put("<!DOCTYPE html>\n<html lang=\"en\"><head><meta charset=\"utf-8\">"
+            "<meta http-equiv=\"Content-Security-Policy\" content=\"default-src 'none'; style-src "
+            "'unsafe-inline'; script-src 'sha256-" +
+            script_hash() +
+            "'\"><meta name=\"viewport\" content=\"width=device-width, initial-scale=1\"><title>" +
+            html(title) + "</title><style>" + TRACE_STYLE + "</style></head><body><main>\n");
+    }
+
+    void add(const exchange &one)
+    {
+        ++count_;
+        failed_ += one.failed() ? 1 : 0;
+        sent_ += one.sent;
+        received_ += one.received;
+        const std::string status = one.status == 0 ? "no answer" : std::to_string(one.status);
+        std::string text =
+            std::string("<details class=\"exchange") + (one.failed() ? " failed" : "") +
+            "\"><summary><span class=\"number\">" + std::to_string(one.number) +
+            "</span><span class=\"badge " + outcome(one) + "\">" + status +
+            "</span><span class=\"operation\">" + html(one.operation.empty() ? "unknown" : one.operation) +
+            "</span><span class=\"target\">" + html(shown_start_line(one.target, show_secrets_)) +
+            remark(one.fault) + remark(one.doubt) + "</span><span class=\"size\">" +
+            (one.soap12 ? "<abbr>SOAP 1.2</abbr> " : "") + "&uarr; " + size_words(one.sent) + " &darr; " +
+            size_words(one.received) + "</span></summary>";
+        for (const trace_message &message : one.messages)
+            text += message_text(message, one.number);
+        put(text + "</details>\n");
+    }
+
+    // What is counted comes last; the style puts it first.
+    void end(const std::string &title)
+    {
+        const auto fact = [](const std::string &value, const char *label) {
+            return "<div><b>" + value + "</b><span>" + label + "</span></div>";
+        };
+        put((count_ == 0 ? "<p class=\"note\">There are no exchanges.</p>" : "") +
+            std::string("</main><header><h1>") + html(title) + "</h1><div class=\"facts\">" +
+            fact(std::to_string(count_), "exchanges") + fact(std::to_string(failed_), "failed") +
+            fact(size_words(sent_), "sent") + fact(size_words(received_), "received") +
+            "</div><form id=\"find\" hidden><input id=\"words\" type=\"search\" placeholder=\"Search\" "
+            "aria-label=\"Search\"><label><input id=\"failed\" type=\"checkbox\"> Failed only</label>"
+            "<output id=\"found\"></output></form></header><footer>" +
+            (show_secrets_ ? "Secrets are shown: keep this page to yourself."
+                           : "Certificates, keys, passwords and tokens are not shown.") +
+            "</footer><script>" + TRACE_SCRIPT + "</script></body></html>\n");
     }
 
 private:
-    void add(const xml_token &token)
+    void put(const std::string &text) { std::fwrite(text.data(), 1, text.size(), file_); }
+
+    static const char *outcome(const exchange &one)
     {
-        switch (token.kind) {
-        case xml_kind::start:
-            new_line();
-            if (!hides())
-                out_ += tag(token);
-            hide_within(token.name);
-            ++depth_;
-            after_start_ = true;
-            return;
-        case xml_kind::empty:
-            new_line();
-            if (!hides())
-                out_ += tag(token);
-            break;
-        case xml_kind::end:
-            add_end(token);
-            break;
-        case xml_kind::text:
-            add_text(token);
-            return;
-        case xml_kind::other:
-            new_line();
-            if (!hides())
-                out_ += span("c", token.source);
-            break;
+        if (one.status == 0)
+            return "none";
+        if (!one.failed())
+            return "good";
+        const bool carries_faults = one.status == 200 || one.status == 400 || one.status == 500;
+        return carries_faults && !one.fault.empty() ? "fault" : "bad";
+    }
+
+    std::string remark(const std::string &text) const
+    {
+        return text.empty() ? "" : "<em>" + html(show_secrets_ ? text : without_secrets(text)) + "</em>";
+    }
+
+    std::string message_text(const trace_message &message, std::size_t number)
+    {
+        std::string text = std::string("<section class=\"") + (message.request ? "request" : "answer") +
+                           "\"><h3>" + (message.request ? "Request" : "Answer") + " <small>" +
+                           size_words(message.wire_size) + " in the trace, body " +
+                           size_words(message.body.size()) + "</small></h3>";
+        if (!message.complete)
+            text += "<p class=\"note\">Incomplete: it broke off, or its body can't be made out.</p>";
+        if (!message.start_line.empty()) {
+            text += "<p class=\"start\">" + html(shown_start_line(message.start_line, show_secrets_)) +
+                    "</p><table>";
+            for (const auto &[name, value] : message.headers)
+                text += "<tr><th>" + html(name) + "</th><td>" +
+                        html(shown_header(name, value, show_secrets_)) + "</td></tr>";
+            text += "</table>";
         }
-        after_start_ = false;
+        const std::vector<body_part> parts = parts_of(message);
+        for (const body_part &part : parts)
+            text += part_text(part, parts.size() == 1, number);
+        return text + "</section>";
     }
 
-    void add_end(const xml_token &token)
+    std::string part_text(const body_part &part, bool alone, std::size_t number)
     {
-        depth_ -= depth_ == 0 ? 0 : 1;
-        if (hides()) {
-            if (token.name != secret_name_ || --secret_depth_ != 0)
-                return;
-            out_ += span("s", BLANKED);
-        }
-        if (!after_start_)
-            new_line();
-        out_ += span("t", token.source);
+        std::string text;
+        if (!alone)
+            text += "<p class=\"part\">" + html(part_label(part)) + "</p>";
+        const bool as_text = part.xml || (show_secrets_ && part.type.starts_with("text/"));
+        if (!as_text)
+            return text + "<p class=\"note\">" + (alone ? html(part_label(part)) + ", not" : "Not") +
+                   " shown</p>";
+        const std::size_t limit = shown_ < PAGE_MAX ? DOCUMENT_MAX : DOCUMENT_AFTER_MAX;
+        const std::string_view bytes = part.bytes.substr(0, limit);
+        shown_ += bytes.size();
+        text += "<pre>" +
+                (part.xml ? xml_text(bytes, text_form::html, show_secrets_, limit)
+                          : shown(bytes, text_form::html)) +
+                "</pre>";
+        if (part.bytes.size() > limit)
+            text += "<p class=\"note\">and " + size_words(part.bytes.size() - limit) +
+                    " more; zuv trace --show " + std::to_string(number) + " shows all</p>";
+        return text;
     }
 
-    void add_text(const xml_token &token)
-    {
-        if (hides() || token.source.find_first_not_of(" \t\r\n") == std::string_view::npos)
-            return;
-        if (!after_start_)
-            new_line();
-        out_ += span("x", token.source);
-    }
-
-    // A secret ends with the end tag of the element that it began with, whatever is inside.
-    void hide_within(std::string_view name)
-    {
-        if (hides())
-            secret_depth_ += name == secret_name_ ? 1 : 0;
-        else if (!show_secrets_ && is_secret_name(name)) {
-            secret_name_ = name;
-            secret_depth_ = 1;
-        }
-    }
-
-    bool hides() const { return secret_depth_ != 0; }
-
-    void new_line()
-    {
-        if (!hides())
-            out_ += (out_.empty() ? "" : "\n") + std::string(2 * std::min(depth_, INDENT_MAX), ' ');
-    }
-
-    // A tag; namespace declarations, when there are many, are folded.
-    std::string tag(const xml_token &token) const
-    {
-        std::string_view rest = token.source.substr(1 + token.name.size()), gap, name, value;
-        std::string attributes, declared;
-        std::size_t declarations = 0;
-        while (next_attribute(rest, gap, name, value)) {
-            const bool declares = name.starts_with("xmlns");
-            declarations += declares ? 1 : 0;
-            (declares ? declared : attributes) +=
-                " " + span(declares ? "c" : "a", name) + attribute_value(name, value, declares);
-        }
-        if (declarations > FOLDED_FROM)
-            declared = " <details class=\"names\"><summary>" + std::to_string(declarations) +
-                       " namespaces</summary>" + declared + "</details>";
-        return span("t", token.source.substr(0, 1 + token.name.size())) + attributes + declared +
-               span("t", rest);
-    }
-
-    std::string attribute_value(std::string_view name, std::string_view value, bool declares) const
-    {
-        if (value.empty())
-            return "";
-        if (!show_secrets_ && !declares && is_secret_name(name))
-            return "=" + span("s", BLANKED);
-        return "=" + span(declares ? "c" : "v", value);
-    }
-
-    bool show_secrets_, after_start_ = false;
-    std::string_view secret_name_;
-    std::size_t depth_ = 0, secret_depth_ = 0;
-    std::string out_;
+    std::FILE *file_;
+    bool show_secrets_;
+    std::size_t count_ = 0, failed_ = 0, sent_ = 0, received_ = 0;
+    std::size_t shown_ = 0; // bytes of documents
 };
-
-std::string part_text(const body_part &part, bool show_secrets, bool alone)
-{
-    std::string text;
-    if (!alone)
-        text += "<p class=\"part\">" + escaped(part.type.empty() ? "part without a type" : part.type, false) +
-                (part.id.empty() ? "" : ", " + escaped(part.id, false)) + ", " +
-                size_words(part.bytes.size()) + "</p>";
-    if (part.xml)
-        return text + "<pre>" + xml_layout(show_secrets).text(part.bytes) + "</pre>";
-    if (show_secrets && part.type.starts_with("text/"))
-        return text + "<pre>" + span("x", part.bytes.substr(0, XML_SHOWN_MAX)) + "</pre>";
-    return text + "<p class=\"note\">" + size_words(part.bytes.size()) + " of " +
-           escaped(part.type.empty() ? "data without a type" : part.type, false) + ", not shown</p>";
-}
-
-std::string message_text(const trace_message &message, bool show_secrets)
-{
-    std::string text = std::string("<section class=\"") + (message.request ? "request" : "answer") +
-                       "\"><h3>" + (message.request ? "Request" : "Answer") + " <small>" +
-                       size_words(message.wire_size) + " in the trace, body " +
-                       size_words(message.body.size()) + "</small></h3>";
-    if (!message.complete)
-        text += "<p class=\"note\">Incomplete: it broke off, or its body can't be made out.</p>";
-    if (!message.start_line.empty()) {
-        text += "<p class=\"start\">" + escaped(shown_start_line(message.start_line, show_secrets), false) +
-                "</p><table>";
-        for (const auto &[name, value] : message.headers)
-            text += "<tr><th>" + escaped(name, false) + "</th><td>" +
-                    escaped(shown_header(name, value, show_secrets), false) + "</td></tr>";
-        text += "</table>";
-    }
-    const std::vector<body_part> parts = parts_of(message);
-    for (const body_part &part : parts)
-        text += part_text(part, show_secrets, parts.size() == 1);
-    return text + "</section>";
-}
-
-const char *outcome(const exchange &one)
-{
-    if (one.status == 0)
-        return "none";
-    if (!one.failed())
-        return "good";
-    const bool carries_faults = one.status == 200 || one.status == 400 || one.status == 500;
-    return carries_faults && !one.fault.empty() ? "fault" : "bad";
-}
-
-std::string exchange_text(const exchange &one, std::size_t number, bool show_secrets)
-{
-    const std::string status = one.status == 0 ? "no answer" : std::to_string(one.status);
-    std::string text =
-        "<details class=\"exchange\"><summary><span class=\"number\">" + std::to_string(number) +
-        "</span><span class=\"badge " + outcome(one) + "\">" + status + "</span><span class=\"operation\">" +
-        escaped(one.operation.empty() ? "unknown" : one.operation, false) + "</span><span class=\"target\">" +
-        escaped(shown_start_line(one.target, show_secrets), false) +
-        (one.fault.empty() ? "" : "<em>" + escaped(one.fault, false) + "</em>") +
-        "</span><span class=\"size\">" + (one.soap12 ? "<abbr>SOAP 1.2</abbr> " : "") + "&uarr; " +
-        size_words(one.sent) + " &darr; " + size_words(one.received) + "</span></summary>";
-    for (const trace_message *message : one.messages)
-        text += message_text(*message, show_secrets);
-    return text + "</details>\n";
-}
 
 } // namespace
 
-std::string trace_page(const std::string &title, const std::vector<exchange> &exchanges, bool show_secrets)
+void write_trace_page(std::FILE *file, const std::string &title, bool show_secrets,
+                      const std::function<bool(exchange &)> &next)
 {
-    std::size_t sent = 0, received = 0;
-    for (const exchange &one : exchanges) {
-        sent += one.sent;
-        received += one.received;
-    }
-    const auto failed =
-        std::count_if(exchanges.begin(), exchanges.end(), [](const exchange &one) { return one.failed(); });
-    const auto fact = [](const std::string &value, const char *label) {
-        return "<div><b>" + value + "</b><span>" + label + "</span></div>";
-    };
-    std::string page = "<!DOCTYPE html>\n<html lang=\"en\"><head><meta charset=\"utf-8\">"
-                       "<meta http-equiv=\"Content-Security-Policy\" content=\"default-src 'none'; style-src "
-                       "'unsafe-inline'\">"
-                       "<meta name=\"viewport\" content=\"width=device-width, initial-scale=1\"><title>" +
-                       escaped(title, false) + "</title><style>" + TRACE_STYLE +
-                       "</style></head><body><header><h1>" + escaped(title, false) +
-                       "</h1><div class=\"facts\">" + fact(std::to_string(exchanges.size()), "exchanges") +
-                       fact(std::to_string(failed), "failed") + fact(size_words(sent), "sent") +
-                       fact(size_words(received), "received") + "</div></header><main>\n";
-    for (std::size_t i = 0; i < exchanges.size(); ++i)
-        page += exchange_text(exchanges[i], i + 1, show_secrets);
-    page += exchanges.empty() ? "<p class=\"note\">The trace is empty.</p>" : "";
-    return page + "</main><footer>" +
-           (show_secrets ? "Secrets are shown: keep this page to yourself."
-                         : "Certificates, keys, passwords and tokens are not shown.") +
-           "</footer></body></html>\n";
+    page_writer page(file, show_secrets);
+    page.begin(title);
+    for (exchange one; next(one);)
+        page.add(one);
+    page.end(title);
 }
 
 } // namespace cli

@@ -5,13 +5,12 @@
 #include <cctype>
 #include <charconv>
 
-#include "trace_body.h"
-
 namespace cli {
 
 namespace {
 
 constexpr std::size_t START_LINE_MAX = 4096, HEADERS_MAX = 1000, NOT_FOUND = std::string_view::npos;
+constexpr std::uint64_t INFLATED_PER_BYTE = 8; // of the trace, in all, beside what any trace may have
 constexpr std::string_view VERSION = "HTTP/1.";
 constexpr std::string_view METHODS[] = {"POST ", "GET ", "CONNECT ", "PUT ", "DELETE ", "OPTIONS ", "HEAD "};
 
@@ -172,26 +171,30 @@ std::string_view trace_message::header(std::string_view name) const
     return "";
 }
 
-std::vector<trace_message> read_trace(std::string_view trace)
+trace_reader::trace_reader(std::string_view trace) : trace_(trace)
 {
-    std::vector<trace_message> messages;
-    trace_budget budget;
-    for (std::size_t at = 0; (at = trace.find_first_not_of("\r\n", at)) != NOT_FOUND;) {
-        trace_message message;
-        const std::size_t begin = at;
-        if (is_start_line(trace, at)) {
-            message.request = !is_status_line(trace, at);
-            read_head(trace, at, message);
-            read_body(trace, at, message, budget);
-        } else {
-            at = next_start(trace, at);
-            message.body = trace.substr(begin, at - begin);
-            message.complete = false;
-        }
-        message.wire_size = at - begin;
-        messages.push_back(std::move(message));
+    budget_.inflated += INFLATED_PER_BYTE * trace.size();
+    budget_.compared += INFLATED_PER_BYTE * trace.size();
+}
+
+bool trace_reader::next(trace_message &message)
+{
+    at_ = std::min(trace_.find_first_not_of("\r\n", at_), trace_.size());
+    if (at_ == trace_.size())
+        return false;
+    message = {};
+    const std::size_t begin = at_;
+    if (is_start_line(trace_, at_)) {
+        message.request = !is_status_line(trace_, at_);
+        read_head(trace_, at_, message);
+        read_body(trace_, at_, message, budget_);
+    } else {
+        at_ = next_start(trace_, at_);
+        message.body = trace_.substr(begin, at_ - begin);
+        message.complete = false;
     }
-    return messages;
+    message.wire_size = at_ - begin;
+    return true;
 }
 
 } // namespace cli

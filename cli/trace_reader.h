@@ -13,6 +13,8 @@
 #include <utility>
 #include <vector>
 
+#include "trace_body.h"
+
 namespace cli {
 
 struct trace_message {
@@ -28,7 +30,18 @@ struct trace_message {
     std::string_view header(std::string_view name) const;
 };
 
-std::vector<trace_message> read_trace(std::string_view trace);
+// One message after the other.
+class trace_reader {
+public:
+    explicit trace_reader(std::string_view trace);
+    bool next(trace_message &message);           // false at the end
+    std::size_t position() const { return at_; } // of the bytes that are still to be read
+
+private:
+    std::string_view trace_;
+    std::size_t at_ = 0;
+    trace_budget budget_;
+};
 
 bool same_name(std::string_view a, std::string_view b); // ignoring case
 

@@ -11,6 +11,10 @@ inline constexpr std::string_view BLANKED = "[not shown]";
 // True if the content of an element, or the value of an attribute, of this name is secret.
 bool is_secret_name(std::string_view qname);
 
+// A text, without what is secret wherever it stands: PEM blocks, users with passwords in URLs, tokens and
+// signatures among the parameters of URLs.
+std::string without_secrets(std::string_view text);
+
 // The value of a header, without secrets.
 std::string shown_header(std::string_view name, std::string_view value, bool show_secrets);
 

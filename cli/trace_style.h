@@ -11,12 +11,16 @@ inline constexpr char TRACE_STYLE[] = R"css(
 --tag:#84adff;--attr:#bdb4fe;--value:#6ce9a6;--text:#e6e9ef;--good:#75e0a7;--good-back:#0b3b27;--bad:#fda29b;--bad-back:#55160c;
 --fault:#fec84b;--fault-back:#4e2f09;--none:#cecfd2;--none-back:#333a46}}
 *{box-sizing:border-box}
-body{margin:0;background:var(--back);color:var(--ink);font:15px/1.5 system-ui,"Segoe UI","DejaVu Sans",sans-serif}
-header,main,footer{max-width:1160px;margin:0 auto;padding:0 24px}
-header{display:flex;flex-wrap:wrap;gap:16px 40px;align-items:flex-end;justify-content:space-between;padding-top:32px;padding-bottom:20px}
+[hidden]{display:none!important}
+body{display:flex;flex-direction:column;margin:0;background:var(--back);color:var(--ink);font:15px/1.5 system-ui,"Segoe UI","DejaVu Sans",sans-serif}
+header,main,footer{width:100%;max-width:1160px;margin:0 auto;padding:0 24px}
+form{display:flex;gap:16px;align-items:center;width:100%;font-size:14px}
+#words{flex:1;max-width:420px;font:inherit;padding:6px 10px;color:var(--ink);background:var(--card);border:1px solid var(--line);border-radius:8px}
+#found{color:var(--dim)}
+header{order:-1;display:flex;flex-wrap:wrap;gap:16px 40px;align-items:flex-end;justify-content:space-between;padding-top:32px;padding-bottom:20px}
 h1{font-size:24px;line-height:1.2;margin:0;overflow-wrap:anywhere}
 .facts{display:flex;gap:32px}.facts b{display:block;font-size:20px;line-height:1.2}.facts span{color:var(--dim);font-size:13px}
-.exchange{background:var(--card);border:1px solid var(--line);border-radius:10px;margin:0 0 8px;overflow:hidden}
+.exchange{background:var(--card);border:1px solid var(--line);border-radius:10px;margin:0 0 8px;overflow:hidden;content-visibility:auto;contain-intrinsic-size:auto 44px}
 summary{display:grid;grid-template-columns:16px 36px 84px minmax(120px,190px) 1fr auto;gap:12px;align-items:baseline;padding:10px 16px;cursor:pointer;list-style:none}
 summary::-webkit-details-marker{display:none}
 summary::before{content:"\25B8";color:var(--dim)}details[open]>summary::before{content:"\25BE"}
