@@ -93,7 +93,7 @@ private:
         const auto began = clock::now();
         const int error = soap_call(ctx, addresses_.c_str(), action, op_.records, request_, &response_);
         times_.push_back(clock::now() - began);
-        connection_.tell(ctx);
+        connection_.report(ctx);
         return error;
     }
 

@@ -58,48 +58,48 @@ const char *ending(soap_ending by)
     return nullptr;
 }
 
-void add_connection(lines &out, const soap_report &told)
+void add_connection(lines &out, const soap_report &report)
 {
-    if (told.lookup_time >= 0)
-        out.add("looked up in %.3f ms", milliseconds(told.lookup_time));
-    if (told.reused)
-        out.add("kept connection to %s from %s", told.peer, told.local);
-    else if (told.connect_time >= 0)
-        out.add("connected to %s from %s at %.3f ms, addresses tried: %d", told.peer, told.local,
-                milliseconds(told.connect_time), told.addresses_tried);
-    else if (*told.peer != '\0')
-        out.add("no connection to %s, addresses tried: %d", told.peer, told.addresses_tried);
+    if (report.lookup_time >= 0)
+        out.add("looked up in %.3f ms", milliseconds(report.lookup_time));
+    if (report.reused)
+        out.add("kept connection to %s from %s", report.peer, report.local);
+    else if (report.connect_time >= 0)
+        out.add("connected to %s from %s at %.3f ms, addresses tried: %d", report.peer, report.local,
+                milliseconds(report.connect_time), report.addresses_tried);
+    else if (*report.peer != '\0')
+        out.add("no connection to %s, addresses tried: %d", report.peer, report.addresses_tried);
 }
 
-void add_tls(lines &out, const soap_report &told)
+void add_tls(lines &out, const soap_report &report)
 {
-    if (*told.tls_version != '\0')
-        out.add("%s, %s%s", told.tls_version, told.tls_cipher, told.resumed ? ", session resumed" : "");
-    if (*told.certificate_subject != '\0')
-        out.add("certificate of %s, issued by %s, valid from %s to %s", told.certificate_subject,
-                told.certificate_issuer, day(told.certificate_not_before).c_str(),
-                day(told.certificate_not_after).c_str());
-    if (*told.certificate_refusal != '\0')
-        out.add("certificate refused: %s", told.certificate_refusal);
-    if (told.tls_time >= 0)
-        out.add("TLS ready at %.3f ms", milliseconds(told.tls_time));
+    if (*report.tls_version != '\0')
+        out.add("%s, %s%s", report.tls_version, report.tls_cipher, report.resumed ? ", session resumed" : "");
+    if (*report.certificate_subject != '\0')
+        out.add("certificate of %s, issued by %s, valid from %s to %s", report.certificate_subject,
+                report.certificate_issuer, day(report.certificate_not_before).c_str(),
+                day(report.certificate_not_after).c_str());
+    if (*report.certificate_refusal != '\0')
+        out.add("certificate refused: %s", report.certificate_refusal);
+    if (report.tls_time >= 0)
+        out.add("TLS ready at %.3f ms", milliseconds(report.tls_time));
 }
 
-void add_message(lines &out, const soap_report &told)
+void add_message(lines &out, const soap_report &report)
 {
-    out.add("sent %llu bytes, %llu on the wire", static_cast<unsigned long long>(told.plain_sent),
-            static_cast<unsigned long long>(told.wire_sent));
-    if (told.first_byte_time >= 0)
-        out.add("first byte of the response at %.3f ms", milliseconds(told.first_byte_time));
-    out.add("received %llu bytes, %llu on the wire", static_cast<unsigned long long>(told.plain_received),
-            static_cast<unsigned long long>(told.wire_received));
-    if (told.http_status != 0)
-        out.add("HTTP status %d", told.http_status);
+    out.add("sent %llu bytes, %llu on the wire", static_cast<unsigned long long>(report.plain_sent),
+            static_cast<unsigned long long>(report.wire_sent));
+    if (report.first_byte_time >= 0)
+        out.add("first byte of the response at %.3f ms", milliseconds(report.first_byte_time));
+    out.add("received %llu bytes, %llu on the wire", static_cast<unsigned long long>(report.plain_received),
+            static_cast<unsigned long long>(report.wire_received));
+    if (report.http_status != 0)
+        out.add("HTTP status %d", report.http_status);
 }
 
-void add_ending(lines &out, const soap_report &told)
+void add_ending(lines &out, const soap_report &report)
 {
-    if (const char *const how = ending(told.ended_by))
+    if (const char *const how = ending(report.ended_by))
         out.add("%s", how);
 }
 
@@ -115,25 +115,25 @@ std::string utc_time(std::int64_t seconds)
     return text;
 }
 
-std::vector<std::string> connection_steps(const soap_report &told)
+std::vector<std::string> connection_steps(const soap_report &report)
 {
     lines out;
-    add_connection(out, told);
-    add_tls(out, told);
-    add_ending(out, told);
+    add_connection(out, report);
+    add_tls(out, report);
+    add_ending(out, report);
     return out.all();
 }
 
-std::string call_report(const soap_report &told)
+std::string call_report(const soap_report &report)
 {
     lines out;
-    add_connection(out, told);
-    add_tls(out, told);
-    if (told.wire_sent != 0)
-        add_message(out, told);
-    add_ending(out, told);
-    if (told.total_time >= 0)
-        out.add("over at %.3f ms", milliseconds(told.total_time));
+    add_connection(out, report);
+    add_tls(out, report);
+    if (report.wire_sent != 0)
+        add_message(out, report);
+    add_ending(out, report);
+    if (report.total_time >= 0)
+        out.add("over at %.3f ms", milliseconds(report.total_time));
     std::string text;
     for (const std::string &line : out.all())
         text += "* " + line + "\n";

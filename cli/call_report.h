@@ -1,4 +1,4 @@
-// call_report.h - what happened in an exchange, as --verbose tells it.
+// call_report.h - what happened in an exchange, as --verbose prints it.
 #pragma once
 
 #include <cstdint>
@@ -11,12 +11,12 @@ namespace cli {
 
 // How the connection of an exchange came about, a line for each step: look-up, connection, TLS and
 // certificate, what ended it.
-std::vector<std::string> connection_steps(const soap_report &told);
+std::vector<std::string> connection_steps(const soap_report &report);
 
 // Seconds since 1970 as "2026-11-21T05:06:00Z".
 std::string utc_time(std::int64_t seconds);
 
 // Lines that begin with "* ", one for each step that the exchange came to.
-std::string call_report(const soap_report &told);
+std::string call_report(const soap_report &report);
 
 } // namespace cli

@@ -243,7 +243,7 @@ private:
             return;
         }
         if (++counts[member] == 2 && !member->many)
-            note(child, "<" + std::string(child.name()) + "> stands here a second time");
+            note(child, "<" + std::string(child.name()) + "> is here a second time");
         check_element(child, *member, depth + 1);
     }
 

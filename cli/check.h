@@ -2,7 +2,7 @@
 //
 // Elsewhere: the command that prints it (check_command.cpp), the library's own reader (documents.h).
 //
-// Always: any bytes may be checked; time and memory grow with their number. Members may stand in any order,
+// Always: any bytes may be checked; time and memory grow with their number. Members may be in any order,
 // as the reader takes them in any order.
 #pragma once
 

@@ -18,7 +18,7 @@ namespace cli {
 
 namespace {
 
-// The document under its class's name, which tells the library what to read.
+// The document under its class's name, by which the library knows what to read.
 std::string under_class_name(const std::string &xml, const contract::data_class &type)
 {
     pugi::xml_document document;

@@ -47,7 +47,7 @@ int limit_of(double seconds)
     return -std::max(1, static_cast<int>(seconds * 1e6));
 }
 
-// OpenSSL tells neither which file it couldn't read nor why.
+// OpenSSL says neither which file it couldn't read nor why.
 void require_readable(const char *option, const std::string &path)
 {
     if (!path.empty() && access(path.c_str(), R_OK) != 0)
@@ -127,11 +127,11 @@ void connection::renew(soap *ctx) const
     ctx->auth_password = options_.user.empty() ? nullptr : password_.c_str();
 }
 
-void connection::tell(soap *ctx) const
+void connection::report(soap *ctx) const
 {
-    const soap_report *const told = options_.verbose ? soap_call_report(ctx) : nullptr;
-    if (told != nullptr)
-        std::fputs(call_report(*told).c_str(), stderr);
+    const soap_report *const last = options_.verbose ? soap_call_report(ctx) : nullptr;
+    if (last != nullptr)
+        std::fputs(call_report(*last).c_str(), stderr);
 }
 
 void refuse_user(const std::string &address)

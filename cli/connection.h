@@ -22,8 +22,8 @@ public:
     void prepare(soap *ctx) const;
     // HTTP credentials, which a received head clears: to be called before each call.
     void renew(soap *ctx) const;
-    // Tells on standard error what happened in the exchange that has ended, if that was asked for.
-    void tell(soap *ctx) const;
+    // Prints on standard error what happened in the exchange that has ended, if that was asked for.
+    void report(soap *ctx) const;
 
     bool quiet() const { return options_.quiet; }
 

@@ -143,7 +143,7 @@ private:
             std::fputs(fault_report(ctx, what, options_.address).c_str(), stderr);
         ctx->keep_alive = 0;
         soap_socket_release(ctx);
-        connection_.tell(ctx);
+        connection_.report(ctx);
         return code;
     }
 

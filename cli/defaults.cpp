@@ -172,7 +172,7 @@ void set(CLI::Option &option, const names &values, const std::string &source)
     }
 }
 
-// Addresses stand with blanks between.
+// Addresses are separated by blanks.
 names values_of(const std::string &option, const char *text)
 {
     if (option != "endpoint")

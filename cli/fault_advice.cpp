@@ -20,7 +20,7 @@ constexpr advice FAULT_ADVICE[] = { // the first that fits
     {"Client.ObjectNotAvailable", "the document exists, but can't be had now; ask again later"},
     {"Client.InvalidInformation.DataSequenceError", "send what comes first, then this again"},
     {"Client.InsufficientInformation",
-     "zuv new CLASS tells all members of a document; --target names the document"},
+     "zuv new CLASS lists all members of a document; --target names the document"},
     {"Client.DataPortIncompatibility", "ask for a data port of the kind in the detail"},
     {"Client.DeliveryIncompatibility", "ask for a delivery of the kind in the detail"},
     {"Client.LanguageIncompatibility", "ask for a language in the detail"},
@@ -31,10 +31,10 @@ constexpr advice FAULT_ADVICE[] = { // the first that fits
     {"Server.DataTooLarge", "send or ask for less at a time"},
     {"Server.UnsupportedRequest.FilterExpressionTooComplex", "make the filter simpler"},
     {"Server.UnsupportedRequest", "this service doesn't do that; ask its operator"},
-    {"Server", "try again; if it stays so, tell the service's operator"}};
+    {"Server", "try again; if it stays so, inform the service's operator"}};
 
 constexpr failure_words KINDS[] = {
-    {EXIT_NETWORK, "the network, or nobody listens there", "check the address and that the service runs"},
+    {EXIT_NETWORK, "the network, or nothing listens there", "check the address and that the service runs"},
     {EXIT_TLS, "this side and the service don't trust each other",
      "name the authority by --ca-file; the certificate must be made out to the host in the address (see "
      "--no-host-check)"},

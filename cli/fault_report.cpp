@@ -212,8 +212,8 @@ std::string fault_report(soap *ctx, const std::string &what, const std::string &
     lines.add("fault", faults.empty() ? fault_name(ctx) : faults.front().name + " (" + code + ")");
     lines.add("what", line);
     const char *advice = http_advice(kind == EXIT_HTTP ? ctx->error : 0);
-    if (const soap_report *const told = kind == EXIT_NETWORK ? soap_call_report(ctx) : nullptr)
-        advice = ending_advice(told->ended_by);
+    if (const soap_report *const last = kind == EXIT_NETWORK ? soap_call_report(ctx) : nullptr)
+        advice = ending_advice(last->ended_by);
     if (ctx->error == SOAP_VERSION_MISMATCH)
         advice = words_of(EXIT_FAULT).advice;
     lines.add("who", words_of(kind).who);

@@ -401,8 +401,7 @@ json parsed_json(std::string_view document, const std::string &file)
         throw failure(EXIT_DOCUMENT, file + ": not JSON: " + printable(words.substr(words.find("] ") + 2)));
     }
     if (!watch.twice().empty())
-        throw failure(EXIT_DOCUMENT,
-                      file + ": \"" + printable(watch.twice()) + "\" stands twice in one object");
+        throw failure(EXIT_DOCUMENT, file + ": \"" + printable(watch.twice()) + "\" is twice in one object");
     return value;
 }
 

@@ -1,12 +1,14 @@
 // mapped_file.cpp - see mapped_file.h.
 #include "mapped_file.h"
 
+#include <csignal>
 #include <cstdio>
 
 #include <sys/mman.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include "exit_codes.h"
 #include "text_files.h"
 
 namespace cli {
@@ -34,6 +36,14 @@ file_handle copy_of(std::FILE *source, const std::string &path)
     return copy;
 }
 
+// A trace may be cut short by what rotates it: its bytes are gone then, and there is nothing left to show.
+[[noreturn]] void end_without_bytes(int)
+{
+    constexpr std::string_view text = "zuv: the file became shorter while it was read\n";
+    static_cast<void>(!write(STDERR_FILENO, text.data(), text.size()));
+    _exit(EXIT_FILE);
+}
+
 } // namespace
 
 mapped_file::mapped_file(const std::string &path)
@@ -54,6 +64,7 @@ mapped_file::mapped_file(const std::string &path)
         fail_file(path, "can't be read");
     madvise(mapped, size_, MADV_SEQUENTIAL);
     data_ = static_cast<const char *>(mapped);
+    std::signal(SIGBUS, end_without_bytes);
 }
 
 mapped_file::~mapped_file()

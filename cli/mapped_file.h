@@ -7,7 +7,7 @@
 
 namespace cli {
 
-// The file must not become shorter meanwhile; what is appended to it is not seen.
+// What is appended meanwhile is not seen. A file that becomes shorter ends the program with EXIT_FILE.
 class mapped_file {
 public:
     // "-" for standard input, which is copied to a temporary file if it is a pipe. failure with EXIT_FILE.

@@ -40,7 +40,7 @@ struct operation {
 std::span<const port> all_ports();
 std::span<const operation> all_operations();
 
-// The operation one of whose elements has this name, or null. `is_request` tells which.
+// The operation one of whose elements has this name, or null. `is_request` says which.
 const operation *operation_of_element(const char *element, bool &is_request);
 
 } // namespace cli

@@ -117,24 +117,24 @@ private:
         answer.name = of.name;
         answer.address = full_address(endpoint_, of);
         soap_call(ctx, answer.address.c_str(), "", op.records, reader_.make(op.request_type), &response);
-        connection_.tell(ctx);
+        connection_.report(ctx);
         answer.code = exit_code_of(ctx);
         answer.fault = fault_name(ctx);
         answer.answers = answer.code == EXIT_DONE || !answer.fault.empty();
         if (answer.code != EXIT_DONE)
             answer.problem = failure_line(ctx);
-        const soap_report *const told = soap_call_report(ctx);
-        answer.milliseconds = told == nullptr ? 0 : milliseconds(told->total_time);
+        const soap_report *const last = soap_call_report(ctx);
+        answer.milliseconds = last == nullptr ? 0 : milliseconds(last->total_time);
         ports_.push_back(std::move(answer));
     }
 
     void note_connection()
     {
-        const soap_report *const told = soap_call_report(context_.get());
-        if (told == nullptr)
+        const soap_report *const last = soap_call_report(context_.get());
+        if (last == nullptr)
             throw std::bad_alloc();
-        steps_ = connection_steps(*told);
-        connected_ = told->connect_time;
+        steps_ = connection_steps(*last);
+        connected_ = last->connect_time;
         const exit_code code = ports_.front().code;
         if (connected_ < 0 || code == EXIT_TLS) {
             connected_ = -1;
@@ -144,20 +144,20 @@ private:
             if (time >= 0)
                 facts_[name] = milliseconds(time);
         };
-        add_time("lookup_ms", told->lookup_time);
-        add_time("connect_ms", told->connect_time);
-        add_time("tls_ms", told->tls_time);
-        if (*told->peer != '\0')
-            facts_["peer"] = told->peer;
-        if (*told->tls_version != '\0')
-            facts_["tls"] = {{"version", told->tls_version}, {"cipher", told->tls_cipher}};
-        if (*told->certificate_subject != '\0')
-            facts_["certificate"] = {{"subject", told->certificate_subject},
-                                     {"issuer", told->certificate_issuer},
-                                     {"valid_from", utc_time(told->certificate_not_before)},
-                                     {"valid_to", utc_time(told->certificate_not_after)}};
-        if (*told->certificate_refusal != '\0')
-            facts_["certificate"]["refused"] = told->certificate_refusal;
+        add_time("lookup_ms", last->lookup_time);
+        add_time("connect_ms", last->connect_time);
+        add_time("tls_ms", last->tls_time);
+        if (*last->peer != '\0')
+            facts_["peer"] = last->peer;
+        if (*last->tls_version != '\0')
+            facts_["tls"] = {{"version", last->tls_version}, {"cipher", last->tls_cipher}};
+        if (*last->certificate_subject != '\0')
+            facts_["certificate"] = {{"subject", last->certificate_subject},
+                                     {"issuer", last->certificate_issuer},
+                                     {"valid_from", utc_time(last->certificate_not_before)},
+                                     {"valid_to", utc_time(last->certificate_not_after)}};
+        if (*last->certificate_refusal != '\0')
+            facts_["certificate"]["refused"] = last->certificate_refusal;
     }
 
     static std::string port_line(const port_answer &one)

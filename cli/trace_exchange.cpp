@@ -248,7 +248,7 @@ void exchange_reader::take(trace_message &&message)
         to->content.number = ++count_;
         to->waits = message.request;
         if (!message.request && !message.start_line.empty())
-            to->content.doubt = "an answer whose request can't be told";
+            to->content.doubt = "an answer whose request isn't known";
     }
     to->size += message.body.size();
     const bool answers = !message.request && message.status() >= 200;

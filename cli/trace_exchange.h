@@ -48,7 +48,7 @@ public:
     std::size_t position() const { return messages_.position(); }
 
 private:
-    // Whether an answer came that was perhaps its own: one that tells no operation, or one for its operation.
+    // Whether an answer came that was perhaps its own: one that names no operation, or one for its operation.
     enum class contest { none, by_any, by_operation };
     struct entry {
         exchange content;

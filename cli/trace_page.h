@@ -12,7 +12,7 @@
 
 namespace cli {
 
-// Whatever the messages hold is shown as text. The file's error flag tells failures.
+// Whatever the messages hold is shown as text. The file's error flag shows failures.
 //   title  the trace's file name
 //   next   gives the exchanges; false at the end
 void write_trace_page(std::FILE *file, const std::string &title, bool show_secrets,

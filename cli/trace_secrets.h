@@ -11,7 +11,7 @@ inline constexpr std::string_view BLANKED = "[not shown]";
 // True if the content of an element, or the value of an attribute, of this name is secret.
 bool is_secret_name(std::string_view qname);
 
-// A text, without what is secret wherever it stands: PEM blocks, users with passwords in URLs, tokens and
+// A text, without what is secret anywhere in it: PEM blocks, users with passwords in URLs, tokens and
 // signatures among the parameters of URLs.
 std::string without_secrets(std::string_view text);
 

@@ -16,7 +16,7 @@ enum class text_form { plain, html };
 // Text that is safe in a form: "<" is "&lt;" on a page, control characters are "?" everywhere.
 std::string shown(std::string_view text, text_form form, bool lines = true);
 
-// XML, one line per element, or per element with text only. Of more than `shown_max` bytes only the size is told.
+// XML, one line per element, or per element with text only. Of more than `shown_max` bytes only the size is given.
 std::string xml_text(std::string_view xml, text_form form, bool show_secrets, std::size_t shown_max);
 
 // "text/xml, <id>, 1.2 kB", with the name of what is attached before it.

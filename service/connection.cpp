@@ -24,7 +24,7 @@ void let_peer_read(soap *ctx)
     using namespace std::chrono;
     const int socket = ctx->socket;
     if (ctx->tls_connection != nullptr)
-        SSL_shutdown(ctx->tls_connection); // tells the peer that nothing was cut off
+        SSL_shutdown(ctx->tls_connection); // shows the peer that nothing was cut off
     if (shutdown(socket, SHUT_WR) != 0)
         return;
     const auto end = steady_clock::now() + LINGER_LIMIT;

@@ -27,7 +27,7 @@ struct own_end {
         if (getsockname(socket, generic, &length) != 0 ||
             getnameinfo(generic, length, host, sizeof host, port, sizeof port,
                         NI_NUMERICHOST | NI_NUMERICSERV) != 0)
-            throw std::runtime_error("cannot tell the address of a socket");
+            throw std::runtime_error("cannot find the address of a socket");
     }
 };
 

@@ -12,7 +12,7 @@ namespace service {
 
 namespace {
 
-// Line breaks and blanks may stand anywhere; another character, bytes after the padding or an incomplete last
+// Line breaks and blanks may be anywhere; another character, bytes after the padding or an incomplete last
 // group are errors.
 class base64_decoder : public transfer_decoder {
 public:

@@ -1,5 +1,5 @@
 #!/usr/bin/python3
-"""Calls from the command line: every operation, the options, what comes back, and how failures are told."""
+"""Calls from the command line: every operation, the options, what comes back, and how failures are reported."""
 import base64
 import email
 import email.policy
@@ -186,17 +186,17 @@ class calls(unittest.TestCase):
     def test_ping_tells_what_is_there(self):
         with zuv.service() as address:
             self.expect(zuv.run("ping", env={"ZUV_ENDPOINT": address}), 0, "  connected to ", "\n  Profile          answers in ")
-            told, = json.loads(zuv.run("ping", "--json", "-e", address).stdout)
-            self.assertEqual((told["ok"], [port["answers"] for port in told["ports"].values()]), (True, [True] * 5))
+            noted, = json.loads(zuv.run("ping", "--json", "-e", address).stdout)
+            self.assertEqual((noted["ok"], [port["answers"] for port in noted["ports"].values()]), (True, [True] * 5))
             self.expect(zuv.run("ping", "-e", address + "/elsewhere"), 6, "Profile          doesn't answer", "404")
         self.expect(zuv.run("ping", "-e", "http://127.0.0.1:1"), 4, "no connection to", "Connection refused")
         here = self.certificate("here.pem", "IP:127.0.0.1")
         for code, options, answers in (7, ["--ca-file", here], [False, False, True, False, False]), (5, [], [False]):
             with self.subTest(options=options), zuv.peer(*[zuv.answer(GOT)] * len(answers), certificate=here) as (address, _):
-                told, = json.loads(self.expect(zuv.run("ping", "--json", "-e", address, *options), code).stdout)
-                shown = told["certificate"]
+                noted, = json.loads(self.expect(zuv.run("ping", "--json", "-e", address, *options), code).stdout)
+                shown = noted["certificate"]
                 self.assertEqual((shown["subject"], shown["issuer"], "refused" in shown), ("CN=x", "CN=x", not options))
-                self.assertEqual([port["answers"] for port in told["ports"].values()], answers)
+                self.assertEqual([port["answers"] for port in noted["ports"].values()], answers)
 
     def test_defaults_come_from_the_environment_and_a_file(self):
         def configure(text, mode=0o600):
@@ -229,8 +229,8 @@ class calls(unittest.TestCase):
                 (0, other, ["--ca-file", other, "--no-host-check"], trusted), (5, other, ["--ca-file", here], refused)):
             with self.subTest(options=options), zuv.peer(zuv.answer(GOT), certificate=certificate) as (address, _):
                 run = self.expect(zuv.run("profile", "get", "-v", "-e", address, *options), code, *(["--ca-file"] if code else []))
-                told = re.findall(r"^\* ([a-zA-Z]+)", run.stderr, re.M)
-                self.assertEqual(told, ["looked", "connected", *steps.split(), "over"], run.stderr)
+                noted = re.findall(r"^\* ([a-zA-Z]+)", run.stderr, re.M)
+                self.assertEqual(noted, ["looked", "connected", *steps.split(), "over"], run.stderr)
 
     def test_attachments_come_from_files_and_go_to_files(self):
         data = random.Random(1).randbytes(70000) + b"\r\n--\r\n"

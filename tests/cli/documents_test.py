@@ -54,7 +54,7 @@ class documents(unittest.TestCase):
     def test_what_is_wrong_is_told_with_its_place(self):
         rows = (
             ("<p:state>activ</p:state>", "2:1: <p:state> should be one of active, "),
-            ("<c:identity/>\n <c:identity/>", "3:2: <c:identity> stands here a second time"),
+            ("<c:identity/>\n <c:identity/>", "3:2: <c:identity> is here a second time"),
             ("<c:state/>", "2:1: <c:state> is no member of protocolProfile:ProfileContent; its namespace should be that of protocolProfile:state"),
             ("<p:nothing>\u00e9</p:nothing>", "2:1: <p:nothing> is no member"),
             ("\u00e9\u00e9", "1:"),
@@ -83,7 +83,7 @@ class documents(unittest.TestCase):
             ('{"contact": [{}, {"@type": "protocol:Adress"}]}', "/contact/1/@type: should name protocol:Contact"),
             ('{"contact": [5], "@odd": "1"}', "/contact/0: should be an object"),
             ('{"identity": [{}]}', "/identity: should be one value, not an array"),
-            ('{"identity": {}, "identity": {}}', '"identity" stands twice'),
+            ('{"identity": {}, "identity": {}}', '"identity" is twice'),
             ('{"credentials": [{"expiration": 1}]}', "/credentials/0/expiration: should be a date and time"),
             ('{"contact": {"name": "\\u0001"}}', "/contact/name: a control character"),
             ('{"contact": {"name": {"text": "a", "x": 1}}}', '"x" is no member'),

@@ -1,4 +1,4 @@
-"""Commands that a text shows, run as they stand there, one shell for all; what they print is what the text says.
+"""Commands that a text shows, run as they are there, one shell for all; what they print is what the text says.
 
 In the text a command begins with "$ " and goes on in lines with "> "; other lines are output, "..." whatever differs.
 """

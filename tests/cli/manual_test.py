@@ -48,15 +48,15 @@ class manual(unittest.TestCase):
                 examples.check(self, rows, folder, service=open_to_all, secured="https://127.0.0.1:%d" % port)
 
     def test_options_and_exit_codes_are_those_of_the_program(self):
-        told = set(re.findall(r"Fl Fl ([a-z0-9-]+)", source())) - {"help"}
+        noted = set(re.findall(r"Fl Fl ([a-z0-9-]+)", source())) - {"help"}
         listed = set()
         for command in ("profile get", "ping", "data get", "data put", "new", "check", "trace"):
             listed |= set(re.findall(r"(?m)^  (?:-\w,)?--([a-z0-9-]+)", zuv.run(*command.split(), "--help").stdout))
-        self.assertEqual(told, listed - {"help"})
+        self.assertEqual(noted, listed - {"help"})
         with open(SERVICE_MANUAL) as file:
-            told = set(re.findall(r"Fl Fl ([a-z0-9-]+)", file.read()))
+            noted = set(re.findall(r"Fl Fl ([a-z0-9-]+)", file.read()))
         run = subprocess.run([zuv.SERVICE, "--help"], capture_output=True, text=True, timeout=zuv.LIMIT_S)
-        self.assertEqual(told, set(re.findall(r"(?m)^  (?:-\w,)?--([a-z0-9-]+)", run.stdout)) - {"help"})
+        self.assertEqual(noted, set(re.findall(r"(?m)^  (?:-\w,)?--([a-z0-9-]+)", run.stdout)) - {"help"})
         self.assertEqual(subprocess.run([zuv.SERVICE, "--no"], capture_output=True, timeout=zuv.LIMIT_S).returncode, 2)
         codes = exit_codes()
         self.assertEqual(re.findall(r"(?m)^\.It (\d+)$", source()), codes)

@@ -4,6 +4,7 @@ import gzip
 import os
 import random
 import re
+import subprocess
 import tempfile
 import unittest
 import zlib
@@ -114,7 +115,7 @@ class trace(unittest.TestCase):
         for left in "Basic [not shown]", "a=1&amp;X-Amz-Signature=[not shown]&amp;b=2", "http://[not shown]@h/", ">[not shown]<":
             self.assertIn(left, shown)
 
-    def test_attachments_are_told_by_type_and_size(self):
+    def test_attachments_are_named_by_type_and_size(self):
         data = os.path.join(self.folder, "d.bin")
         with open(data, "wb") as file:
             file.write(b"\r\nHTTP/1.1 200 OK\r\n\r\n" * 50)  # what looks like a message is none
@@ -139,9 +140,9 @@ class trace(unittest.TestCase):
             ((request("get"), request("set"), answer("get"), answer("set")), ("get 200", "set 200")),
             ((request("get"), request("get"), answer("get"), answer("get")), ("get 200 several requests waited",) * 2),
             ((request("get"), request("set"), busy, answer("get")), ("get 200", "set 503 several requests waited")),
-            ((answer("get"), request("get"), answer("get")), ("unknown 200 request can't be told", "get 200")),
+            ((answer("get"), request("get"), answer("get")), ("unknown 200 request isn't known", "get 200")),
             ((request("get"), *(request("set"), answer("set")) * 9, answer("get")),
-             ("get none", *["set 200"] * 9, "unknown 200 request can't be told")),
+             ("get none", *["set 200"] * 9, "unknown 200 request isn't known")),
         )
         for parts, expected in rows:
             with self.subTest(expected=expected):
@@ -208,6 +209,12 @@ class trace(unittest.TestCase):
                        chunked(gzip.compress(b"\0" * (300 << 20)), "Content-Encoding: gzip")):
             self.assertEqual(zuv.run("trace", "-", given=bytes_, text=False).returncode, 0)
         self.assertEqual(zuv.run("trace", os.path.join(self.folder, "none")).returncode, 11)
+        self.write(seeds[1] * 20000)
+        with subprocess.Popen([zuv.PROGRAM, "trace", self.log], stdout=subprocess.PIPE, stderr=subprocess.PIPE) as running:
+            running.stdout.readline()  # it waits for a reader of the rest
+            os.truncate(self.log, 0)
+            self.assertIn(b"became shorter", running.communicate()[1])
+        self.assertEqual(running.returncode, 11)
 
 
 if __name__ == "__main__":

@@ -62,8 +62,8 @@ class control(unittest.TestCase):
                     if "cut_after" in rule:
                         self.assertEqual(len(answer.head + answer.body), rule["cut_after"])
                     if "length_error" in rule:
-                        told = int(re.search(rb"Content-Length: (\d+)", answer.head)[1])
-                        self.assertEqual(told - len(answer.body + rest), rule["length_error"])
+                        noted = int(re.search(rb"Content-Length: (\d+)", answer.head)[1])
+                        self.assertEqual(noted - len(answer.body + rest), rule["length_error"])
                     self.assertEqual(exchange(address, CREATE).status, 200, "it held for one call")
 
     def test_a_delay_holds_up_its_own_connection_alone(self):

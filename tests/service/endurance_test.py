@@ -98,7 +98,7 @@ class endurance(unittest.TestCase):
                       "<f:category>x</f:category></f:expression></inclusionFilter>" % (10000 * "<f:scope>requisite</f:scope>"))
         user = '<credentials id="c"><c:username>%s</c:username></credentials>' % (100000 * "u")
         address = self.started()
-        for rule, port, body, told in (
+        for rule, port, body, noted in (
                 ("an attachment within itself", "StatusReport",
                  request("create", '<c:attachment id="a"><c:attachment href="#a"/></c:attachment>'), "Client.InvalidInformation"),
                 ("attachments doubled", "StatusReport", request("create", doubled("c:attachment", 40)), "Server.DataTooLarge"),
@@ -122,7 +122,7 @@ class endurance(unittest.TestCase):
                 ("a small report", "ProblemReport", report("nothing to report"), "submitResponse"),
                 ("a query that is wanted", "Query", queries(1, "r:QueryReportsRequest", nothing), "nothing to report")):
             with self.subTest(rule):
-                self.assertIn(told, exchange(address, post(port, envelope(port, body))))
+                self.assertIn(noted, exchange(address, post(port, envelope(port, body))))
         if MEMORY_IS_MEASURED:
             self.assertLess(memory_of(address, "VmHWM"), 100 * MB)
 
@@ -131,12 +131,12 @@ class endurance(unittest.TestCase):
         self.expect_useful(address)
         before = memory_of(address, "VmRSS")
         text = '<thisURI id="u">%s</thisURI>' % (MB * "u")
-        for rule, content, told in (
+        for rule, content, noted in (
                 ("60 MB of empty elements", 2300000 * "<profile/>", "max_memory: more than %d bytes" % (256 * MB)),
                 ("a text copied 3000 times", text + 3000 * '<thisURI href="#u"/>', "copies by references and QNames: more than")):
             packed = gzip.compress(envelope("Profile", request("create", content)).encode(), 1)
             answer = exchange(address, post("Profile", packed, "Content-Encoding: gzip"))
-            self.assertEqual((answer.status, told in answer, "Connection: close" in answer), (413, True, True), (rule, answer))
+            self.assertEqual((answer.status, noted in answer, "Connection: close" in answer), (413, True, True), (rule, answer))
         most, until = memory_of(address, "VmHWM"), time.monotonic() + 20
         while memory_of(address, "VmRSS") >= before + 32 * MB and time.monotonic() < until:
             self.expect_useful(address)

@@ -83,7 +83,7 @@ class http(unittest.TestCase):
     def test_strict_it_names_what_it_would_drop(self):
         common = "http://www.zuv.example/xmlns/b2b/zuv/v1.0"
         with zuv.service() as lenient, zuv.service("--strict") as strict:
-            for rule, content, told in (
+            for rule, content, noted in (
                     ("nothing wrong", "<profileAuthority>x</profileAuthority>", ()),
                     ("another namespace", "<c:profileAuthority>x</c:profileAuthority>",
                      ("'profileAuthority'", "namespace '%s'" % common, "expected '%s/Profile'" % common)),
@@ -94,8 +94,8 @@ class http(unittest.TestCase):
                 sent = post("Profile", envelope("Profile", request("create", content)))
                 self.assertEqual(exchange(lenient, sent).status, 200, rule)
                 answer = exchange(strict, sent)
-                self.assertEqual(answer.first("subcode"), "Client.MalformedRequest" if told else None, answer)
-                for words in told:
+                self.assertEqual(answer.first("subcode"), "Client.MalformedRequest" if noted else None, answer)
+                for words in noted:
                     self.assertIn(words, answer.first("faultstring").replace("&apos;", "'"))
             after = post("Profile", envelope("Profile", request("create") + "<more/>"))
             self.assertEqual([exchange(one, after).status for one in (lenient, strict)], [200, 500])
@@ -140,7 +140,7 @@ class http(unittest.TestCase):
                 self.assertEqual((answer.status, len(answer.first("profileAuthority"))), (200, 5000000), framing)
 
     def test_a_connection_ends_with_bytes_after_a_request(self):
-        """A second request right after the first can't be told from bytes that belong to nobody: the first is answered."""
+        """A second request right after the first can't be noted from bytes that belong to nobody: the first is answered."""
         with zuv.service() as address:
             for after in post("Profile", CREATE), b"x":
                 with Connection(address) as peer:

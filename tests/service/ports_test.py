@@ -96,10 +96,10 @@ class ports(unittest.TestCase):
         self.assertEqual(send(path + "x", b"Content-Length: 1\r\n\r\nx"), 404)
 
         name = "attachmentURI=%s " % attached.first("attachmentURI")
-        for told, states, problem in (("percentComplete=40", ["pending", "open"], False),
+        for progress, states, problem in (("percentComplete=40", ["pending", "open"], False),
                                       ("percentComplete=100", ["complete", "closed"], False),
                                       ("problemEncountered=true recommendedAttachmentState=error", ["error", "closed"], True)):
-            noted = self.ask("StatusReport", "attachStatus", elements(name + told, "c:"), header)
+            noted = self.ask("StatusReport", "attachStatus", elements(name + progress, "c:"), header)
             self.assertEqual(noted.all("state")[-2:], states, noted)
             self.assertEqual("<protocol:error" in noted, problem, noted)
         self.ask("StatusReport", "attachStatus", elements("attachmentURI=urn:nothing", "c:"), header, "Client.ObjectNotFound")
@@ -143,14 +143,14 @@ class ports(unittest.TestCase):
 
     def test_what_cannot_be_delivered_is_told(self):
         post, ftp = "<medium>physical</medium>", "<c:dataPortPreference><c:transport>FTP</c:transport></c:dataPortPreference>"
-        for preferences, state, subcode, told in (
+        for preferences, state, subcode, noted in (
                 ([post], "preprocessed.identified", "Client.DeliveryIncompatibility", "medium>electronic<"),
                 ([ftp], "preprocessed.identified", "Client.DataPortIncompatibility", "transport>HTTP<"),
                 ([ftp, ""], "complete.available", None, "FW-100")):  # one way that works will do
             answer = self.ask("UpdateOrder", "submit", elements("updateId=FW-100") + "".join(
                 "<deliveryPreference>%s</deliveryPreference>" % one for one in preferences))
             self.assertEqual((answer.first("state"), answer.first("subcode")), (state, subcode), answer)
-            self.assertIn(told, answer)
+            self.assertIn(noted, answer)
 
     def test_nested_requests_are_authenticated_each_by_itself(self):
         def nested(user, password, inner=""):
