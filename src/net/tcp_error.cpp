@@ -16,8 +16,8 @@ std::size_t append_limit(char *text, std::size_t size, const char *what, int tim
 {
     if (timeout == 0)
         return 0;
-    const long amount = timeout < 0 ? -static_cast<long>(timeout) : timeout;
-    const int written = std::snprintf(text, size, " (%ld%cs %s)", amount, timeout < 0 ? 'u' : ' ', what);
+    const long long amount = timeout < 0 ? -static_cast<long long>(timeout) : timeout;
+    const int written = std::snprintf(text, size, " (%lld%cs %s)", amount, timeout < 0 ? 'u' : ' ', what);
     return static_cast<std::size_t>(written);
 }
 

@@ -18,7 +18,7 @@ namespace {
 
 constexpr std::int64_t MICROSECONDS = 1000000; // in a second
 constexpr tcp_deadline NEVER =
-    std::int64_t{100} * 365 * 24 * 3600 * MICROSECONDS; // after the machine's start
+    std::int64_t{50} * 365 * 24 * 3600 * MICROSECONDS; // after the machine's start; 32 bits hold its seconds
 
 std::int64_t microseconds_of(int timeout)
 {
