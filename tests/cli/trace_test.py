@@ -210,7 +210,7 @@ class trace(unittest.TestCase):
             self.assertEqual(zuv.run("trace", "-", given=bytes_, text=False).returncode, 0)
         self.assertEqual(zuv.run("trace", os.path.join(self.folder, "none")).returncode, 11)
         self.write(seeds[1] * 20000)
-        with subprocess.Popen([zuv.PROGRAM, "trace", self.log], stdout=subprocess.PIPE, stderr=subprocess.PIPE) as running:
+        with subprocess.Popen([zuv.PROGRAM, "trace", self.log, "--html", "-"], stdout=subprocess.PIPE, stderr=subprocess.PIPE) as running:
             running.stdout.readline()  # it waits for a reader of the rest
             os.truncate(self.log, 0)
             self.assertIn(b"became shorter", running.communicate()[1])

@@ -87,13 +87,15 @@ def check_commands(source, service):
     for command, (place, words) in RUN_BY.items():
         with open(os.path.join(source, place), encoding="utf-8") as file:
             assert words in file.read(), "%s doesn't run %s" % (place, command)
-    start = [one for one in commands(text["service/README.md"]) if one.startswith("zuv-service ")]
-    assert len(start) == 1, start
-    with tempfile.TemporaryDirectory() as folder:
-        arguments = start[0].replace("9080", "0").split()[1:]
-        with listening.started([service, *arguments], cwd=folder) as address:
-            assert re.fullmatch(r"http://[\d.]+:\d+", address), address
-        assert os.path.exists(os.path.join(folder, arguments[-1])), arguments
+    starts = [one.split()[1:] for one in commands(text["service/README.md"]) if one.startswith("zuv-service ")]
+    assert starts
+    for arguments in starts:
+        arguments += ["--port", "0"]  # the last one counts
+        with tempfile.TemporaryDirectory() as folder:
+            with listening.started([service, *arguments], cwd=folder) as address:
+                assert re.fullmatch(r"https?://[\w.]+:\d+", address), address
+            made = [one for one in arguments if re.search("[a-z]", one) and not one.startswith("-")]
+            assert all(os.path.exists(os.path.join(folder, one)) for one in made), arguments
 
 
 def check_run(program, arguments, expected, **environment):

@@ -147,7 +147,8 @@ const host_row HOSTS[] = {
 bool ends(client &own, soap_ending by, int least_ms = SILENCE_US / 2000)
 {
     const int code = own.call();
-    return code == SOAP_EOF && own.milliseconds >= least_ms && own.milliseconds < GUARD_S * 500 &&
+    return (code == SOAP_EOF || (code == SOAP_TCP_ERROR && by == ENDED_BY_CANCEL)) &&
+           own.milliseconds >= least_ms && own.milliseconds < GUARD_S * 500 &&
            soap_call_report(&own.proxy)->ended_by == by;
 }
 
