@@ -101,7 +101,7 @@ int poll_ready(int socket, int flags, const std::int64_t *limit_us, int wake)
         return -1;
     }
     int ready = ((found & POLLIN) != 0 ? WAIT_RECV : 0) | ((found & POLLOUT) != 0 ? WAIT_SEND : 0) |
-               ((found & POLLPRI) != 0 ? WAIT_ERROR : 0);
+                ((found & POLLPRI) != 0 ? WAIT_ERROR : 0);
     if ((found & (POLLERR | POLLHUP)) != 0)
         ready |= (flags & (WAIT_RECV | WAIT_SEND)) != 0 ? flags & (WAIT_RECV | WAIT_SEND) : WAIT_ERROR;
     return ready | (asked[1].revents != 0 ? WOKEN : 0);

@@ -31,8 +31,7 @@ std::vector<namespace_declaration> read_namespaces(const std::filesystem::path &
             throw contract_error(at, "a row has a prefix, a URI and a pattern (or \"-\")");
         for (const namespace_declaration &row : rows) {
             if (row.prefix == words[0] || row.uri == words[1])
-                throw contract_error(at,
-                                     "prefix or URI is in line " + std::to_string(row.at.line) + " too");
+                throw contract_error(at, "prefix or URI is in line " + std::to_string(row.at.line) + " too");
         }
         rows.push_back({at, words[0], words[1], words[2] == "-" ? "" : words[2]});
     });
