@@ -218,7 +218,7 @@ private:
         const bool whole = value.is_number_integer() && is_whole_number(type);
         const bool fits = value.is_string() || whole || (value.is_number() && type == "xsd:double") ||
                           (value.is_boolean() && type == "xsd:boolean");
-        const std::string text = value.is_string() ? value.get<std::string>() : value.dump();
+        std::string text = value.is_string() ? value.get<std::string>() : value.dump();
         std::string problem = fits ? value_problem(type, text) : value_words(type);
         if (value.is_number() && !fits)
             problem += is_whole_number(type) ? ", with quotes if it is long" : ", in quotes";
@@ -269,6 +269,8 @@ private:
     void add_attributes(const json &object, const contract::data_class &type, const std::string &path)
     {
         for (const auto &[key, value] : object.items()) {
+            if (key == "@nil" && !value.is_boolean())
+                note(path + "/@nil", "should be true or false");
             if (!key.starts_with('@') || key == "@nil" || add_class_attribute(key, value, type, path))
                 continue;
             std::vector<std::string> known = {"@type"};
@@ -304,7 +306,8 @@ private:
         if (depth > DEPTH_MAX)
             return note(path, "more than " + std::to_string(DEPTH_MAX) + " objects within each other");
         out_.append("<").append(name(tag));
-        const bool nil = value.is_null() || (value.is_object() && value.value("@nil", false));
+        const bool nil =
+            value.is_null() || (value.is_object() && value.contains("@nil") && value["@nil"] == true);
         if (value.is_object()) {
             const contract::data_class &type = type_of(value, expected, path);
             add_attributes(value, type, path);
@@ -354,7 +357,10 @@ private:
         if (is_array && !member.many)
             return note(path + "/" + key, "should be one value, not an array");
         for (std::size_t i = 0; i < count; ++i) {
-            const std::string place = path + "/" + key + (is_array ? "/" + std::to_string(i) : "");
+            std::string place = path;
+            place.append("/").append(key);
+            if (is_array)
+                place.append("/").append(std::to_string(i));
             const json &value = is_array ? (*found)[i] : *found;
             if (const contract::data_class *const type = contract::find_class(member.type))
                 add_class(value, member.tag, *type, place, depth + 1);
@@ -431,7 +437,7 @@ std::string xml_of(std::string_view document, const contract::data_class &type, 
     std::string xml = writer.document(parsed_json(document, file), type);
     std::string lines;
     for (const std::string &one : writer.findings())
-        lines += (lines.empty() ? "" : "\n") + file + ": " + one;
+        lines.append(lines.empty() ? "" : "\n").append(file).append(": ").append(one);
     if (!lines.empty())
         throw failure(EXIT_DOCUMENT, "not a " + std::string(type.name) + ":\n" + lines);
     return xml;

@@ -2,6 +2,7 @@
 #include "faults.h"
 
 #include <algorithm>
+#include <cstdlib>
 #include <iterator>
 
 #include "filter.h"
@@ -43,7 +44,9 @@ void refuse_by_name(soap *ctx, std::string_view name, std::string description)
 {
     if (const fault_row *const row = find_fault(name))
         row->refuse(ctx, std::move(description));
-    refuse<protocol__Server_x002eProcessing>(ctx, std::move(description));
+    else
+        refuse<protocol__Server_x002eProcessing>(ctx, std::move(description));
+    std::abort(); // not reached: a refusal throws
 }
 
 void refuse_not_found(soap *ctx, const std::string &uri)

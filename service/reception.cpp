@@ -139,7 +139,7 @@ std::size_t reception::receive(soap *ctx, char *buffer, std::size_t length)
         self.too_slow_ = left <= 0;
         if (self.too_slow_)
             return 0;
-        ctx->recv_timeout = static_cast<int>(std::min<long>(left, ctx->recv_timeout));
+        ctx->recv_timeout = static_cast<int>(std::min<std::int64_t>(left, ctx->recv_timeout));
     }
     const std::size_t received = tcp_recv(ctx, buffer, length);
     const auto end = steady_clock::now();

@@ -76,7 +76,7 @@ class documents(unittest.TestCase):
         run = check(ROOT + "<p:odd/>\n" * 500 + "</p:ProfileContent>")
         self.assertEqual(run.stderr.count("\n"), 100)
 
-    def test_json_that_is_no_document_of_the_class_is_told_with_its_place(self):
+    def test_json_that_is_no_document_of_the_class_is_refused_with_its_place(self):
         rows = (
             ('{"identity": {"nme": "x"}}', '/identity: "nme" is no member of protocol:Identity; did you mean "name"?'),
             ('{"state": 5}', "/state: should be one of active, "),
@@ -87,6 +87,7 @@ class documents(unittest.TestCase):
             ('{"credentials": [{"expiration": 1}]}', "/credentials/0/expiration: should be a date and time"),
             ('{"contact": {"name": "\\u0001"}}', "/contact/name: a control character"),
             ('{"contact": {"name": {"text": "a", "x": 1}}}', '"x" is no member'),
+            ('{"identity": {"@nil": "yes"}}', "/identity/@nil: should be true or false"),
             ('{"state": null,', "not JSON: parse error at line 1"),
             ('{"profile": [' * 600 + "]}" * 600, "more than 500 objects within each other"),
         )
