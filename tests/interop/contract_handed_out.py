@@ -175,7 +175,8 @@ def check_faults(schemas, address, database):
                 else:
                     caller.refused(fault, operation, *request)
     with sqlite3.connect(database) as connection:
-        connection.execute("ALTER TABLE document RENAME TO gone")
+        connection.execute("UPDATE document SET xml = x'3c'")
+        connection.execute("CREATE TRIGGER full BEFORE INSERT ON document BEGIN SELECT RAISE(FAIL, 'no space'); END")
     for caller, *refusal in broken:
         caller.refused(*refusal)
     for port, caller in callers.items():
