@@ -37,8 +37,9 @@ secret_place pem_block(std::string_view text, std::size_t at)
     if (!text.substr(at).starts_with(BEGIN))
         return {at, at};
     const std::size_t end = text.find(END, at);
-    const std::size_t dashes = end == text.npos ? text.npos : text.find("-----", end + END.size());
-    return {at, dashes == text.npos ? text.size() : dashes + 5};
+    const std::size_t dashes =
+        end == std::string_view::npos ? std::string_view::npos : text.find("-----", end + END.size());
+    return {at, dashes == std::string_view::npos ? text.size() : dashes + 5};
 }
 
 // "user:password" of "://user:password@host".
@@ -51,7 +52,7 @@ secret_place user_of_url(std::string_view text, std::size_t at)
     const std::string_view authority =
         text.substr(begin, text.find_first_of("/?# \t\r\n\"'<>", begin) - begin);
     const std::size_t user_end = authority.rfind('@');
-    return user_end == authority.npos ? secret_place{at, at} : secret_place{begin, begin + user_end};
+    return user_end == std::string_view::npos ? secret_place{at, at} : secret_place{begin, begin + user_end};
 }
 
 // The value of "?token=..." or "&token=...", also where the "&" is written as "&amp;".
@@ -60,7 +61,7 @@ secret_place url_parameter(std::string_view text, std::size_t at)
     if (text[at] != '?' && text[at] != '&' && text[at] != ';')
         return {at, at};
     const std::size_t end = text.find_first_of("=&;? \t\r\n\"'<>", at + 1);
-    if (end == text.npos || text[end] != '=')
+    if (end == std::string_view::npos || text[end] != '=')
         return {at, at};
     const std::string_view name = text.substr(at + 1, end - at - 1);
     if (!is_secret_name(name) && !has_any(lower(std::string(name)), SECRET_PARAMETERS))
@@ -74,7 +75,7 @@ std::string without_secrets(std::string_view text)
 {
     std::string shown;
     std::size_t done = 0;
-    for (std::size_t at = 0; (at = text.find_first_of("-:?&;", at)) != text.npos;) {
+    for (std::size_t at = 0; (at = text.find_first_of("-:?&;", at)) != std::string_view::npos;) {
         secret_place secret{at, at};
         for (const auto find : {pem_block, user_of_url, url_parameter})
             if (secret.end <= at)

@@ -23,7 +23,7 @@ namespace service {
 
 namespace {
 
-constexpr long HOUR = 3600, LIFETIME = 30 * 24 * HOUR; // seconds
+constexpr long HOUR = 3600, LIFETIME = 30L * 24 * HOUR; // seconds
 constexpr char SERVER_NAMES[] = "DNS:localhost,IP:127.0.0.1,IP:::1";
 
 template <auto Free> struct freed_by {
