@@ -95,7 +95,7 @@ TEST_F(memory, an_empty_block_is_shared_and_the_hosts_allocator_takes_the_place_
 
 TEST_F(memory, one_byte_into_the_padding_is_harmless_one_past_it_is_reported)
 {
-    const auto free_in = [this](soap *owner, void *block) {
+    const auto free_in = [](soap *owner, void *block) {
         return reported([&] { soap_block_free(owner, block); });
     };
     static_cast<char *>(soap_block_alloc(&ctx, 3))[5] = 'x'; // spans 8: three bytes of padding

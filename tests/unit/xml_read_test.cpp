@@ -497,8 +497,8 @@ constexpr const char *ROOT_HEADS[] = {
     " xmlns:p=\"urn:one\" xmlns:a_name_of_more_than_eight=\"urn:two\" xmlns:\xC3\xA9=\"urn:\xC3\xA9\"",
     " xmlns:e=\"http://schemas.xmlsoap.org/soap/envelope/\" xmlns:p=\"http://www.w3.org/1/soap-encoding\"",
     " xmlns:e=\"http://www.w3.org/2003/05/soap-envelope\" xmlns:p=\"urn:one\"",
-    " xmlns:e=\"http://www.w3.org/2003/05/soap-envelope\" "
-    "xmlns:f=\"http://schemas.xmlsoap.org/soap/envelope/\"/",
+    (" xmlns:e=\"http://www.w3.org/2003/05/soap-envelope\" "
+     "xmlns:f=\"http://schemas.xmlsoap.org/soap/envelope/\"/"),
     " xmlns:q=urn:one",
     " xmlns:e=\"http://www.w3.org/1/soap-envelope\" xmlns:p=\"http://www.w3.org/2003/05/soap-envelope\"",
 };
