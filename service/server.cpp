@@ -13,6 +13,7 @@
 #include <zuv_client_pro/soap_envelope.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_log.h>
+#include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_tcp.h>
 #include <zuv_client_pro/soap_tls.h>
 
@@ -168,6 +169,8 @@ void server::serve(soap *copy, std::list<connection>::iterator place)
     } catch (const std::exception &failure) {
         std::fprintf(stderr, "zuv-service: %s\n", failure.what());
     }
+    soap_discard_objects(copy, nullptr); // the fault of a handshake that failed
+    soap_discard_all(copy);
     soap_context_free(copy);
     const std::lock_guard<std::mutex> lock(mutex_);
     if (borrowed)
