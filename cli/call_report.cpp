@@ -107,7 +107,7 @@ void add_ending(lines &out, const soap_report &report)
 
 std::string utc_time(std::int64_t seconds)
 {
-    const std::time_t time = seconds;
+    const auto time = static_cast<std::time_t>(seconds);
     std::tm parts{};
     char text[64] = "";
     gmtime_r(&time, &parts);

@@ -413,14 +413,15 @@ TEST_F(id_numbers, long_chains_of_copies_are_filled_in_any_order)
 TEST_F(id_numbers, what_waits_moves_with_its_block)
 {
     constexpr std::size_t COUNT = 6; // elements
-    constexpr std::size_t WIDTH = 6; // words: pointer, two of a value, a small value, two of a value
+    constexpr std::size_t WIDTH = 6; // of 8 bytes: pointer, two of a value, a small value, two of a value
     pair_value object = {5, 6};
     void *fixed[COUNT] = {};
     soap_block_stack *stack = soap_block_stack_push(&ctx);
-    void **element = nullptr;
+    const auto pointer_at = [](std::uint64_t *word) { return reinterpret_cast<void **>(word); };
+    std::uint64_t *element = nullptr;
     for (std::size_t i = 0; i < COUNT; i++) {
-        element = static_cast<void **>(soap_block_stack_grow(&ctx, stack, WIDTH * sizeof(void *)));
-        refer(i % 2 == 0 ? "#p" : "#q", element);
+        element = static_cast<std::uint64_t *>(soap_block_stack_grow(&ctx, stack, WIDTH * sizeof *element));
+        refer(i % 2 == 0 ? "#p" : "#q", pointer_at(element));
         refer("#p", &fixed[i]); // the chain runs in and out of the blocks
         copy("#p", element + 1);
         copy("#n", element + 3, 1, 4);
@@ -428,7 +429,7 @@ TEST_F(id_numbers, what_waits_moves_with_its_block)
     }
     put("#q", element + 1); // an object within a block moves too
     EXPECT_EQ(soap_forward_has_pending(&ctx, element + 3, element + 4), -1);
-    void **array = static_cast<void **>(soap_block_stack_save(&ctx, stack, nullptr, 1));
+    auto *array = static_cast<std::uint64_t *>(soap_block_stack_save(&ctx, stack, nullptr, 1));
     ASSERT_NE(array, nullptr);
     EXPECT_EQ(soap_forward_has_pending(&ctx, array, array + 1), -1);
     std::int32_t number = 9;
@@ -436,9 +437,9 @@ TEST_F(id_numbers, what_waits_moves_with_its_block)
     put("#n", &number, 1, sizeof number);
     ASSERT_EQ(soap_forward_resolve(&ctx), 0);
     for (std::size_t i = 0; i < COUNT; i++) {
-        void **moved = array + WIDTH * i;
+        std::uint64_t *moved = array + WIDTH * i;
         void *q = array + WIDTH * (COUNT - 1) + 1;
-        EXPECT_EQ(moved[0], i % 2 == 0 ? static_cast<void *>(&object) : q) << i;
+        EXPECT_EQ(*pointer_at(moved), i % 2 == 0 ? static_cast<void *>(&object) : q) << i;
         EXPECT_EQ(fixed[i], &object);
         EXPECT_EQ(std::memcmp(&moved[1], &object, sizeof object), 0) << i;
         EXPECT_EQ(std::memcmp(&moved[4], &object, sizeof object), 0) << i;
