@@ -82,7 +82,7 @@ void declare_ping(CLI::App &app, ping_options &options, action &chosen)
 {
     CLI::App *const command =
         app.add_subcommand("ping",
-                           "Tells whether a service is there, its certificate, and which ports answer.")
+                           "Says whether a service is there, its certificate, and which ports answer.")
             ->group("Ports");
     options.declare(*command);
     command->callback([&options, &chosen, command] {
@@ -114,7 +114,7 @@ void declare_documents(CLI::App &app, tool_options &options, action &chosen)
         chosen = [&] { return options.list ? print_classes() : print_new_document(options.class_name); };
     });
     CLI::App *const check =
-        app.add_subcommand("check", "Tells whether documents are what the contract allows.")
+        app.add_subcommand("check", "Says whether documents are what the contract allows.")
             ->group("Documents");
     check->add_option("FILE", options.files, "Documents or SOAP messages; \"-\" for standard input")
         ->required();

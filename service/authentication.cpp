@@ -1,9 +1,8 @@
 // authentication.cpp - see authentication.h.
 #include "authentication.h"
 
-#include <openssl/crypto.h>
-
 #include "faults.h"
+#include "secrets.h"
 
 namespace service {
 
@@ -16,11 +15,6 @@ using response = protocolUpdateOrder__AuthenticateResponse;
 // and their answers may repeat one long user name.
 constexpr unsigned DEPTH_MAX = 100;
 constexpr std::uint64_t ANSWER_BYTES = 1000; // of one nested answer, the user's name left out
-
-bool same_secret(const std::string &given, const std::string &expected)
-{
-    return given.size() == expected.size() && CRYPTO_memcmp(given.data(), expected.data(), given.size()) == 0;
-}
 
 // Null if the credentials are good.
 protocol__Fault *fault_with(call &c, protocol__Credentials *credentials)

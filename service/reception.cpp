@@ -8,8 +8,6 @@
 #include <string_view>
 #include <utility>
 
-#include <openssl/crypto.h>
-
 #include <zuv_client_pro/soap_attachment.h>
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_http.h>
@@ -19,6 +17,7 @@
 #include "attachments.h"
 #include "contract_files.h"
 #include "data_port.h"
+#include "secrets.h"
 
 namespace service {
 
@@ -30,13 +29,6 @@ constexpr std::int16_t GZIP = 2; // of zlib_out
 char REALM[] = "zuv";
 // Attachments may be long, and at this pace their bytes don't count in the time that a request may take.
 constexpr std::chrono::microseconds ATTACHED_BYTE_TIME(10);
-
-// Compares in a time that does not reveal where the texts differ.
-bool same_secret(const char *given, const std::string &expected)
-{
-    const std::string_view text = given == nullptr ? std::string_view() : given;
-    return text.size() == expected.size() && CRYPTO_memcmp(text.data(), expected.data(), text.size()) == 0;
-}
 
 // For the journal; what there is no memory for is left out, since the library's hooks must not throw.
 void keep_some(std::string &text, const char *data, std::size_t length)
@@ -257,8 +249,9 @@ bool reception::knows_sender(const soap *ctx) const
 {
     if (config_.user.empty())
         return true;
-    const bool user = same_secret(ctx->auth_user, config_.user);
-    const bool password = same_secret(ctx->auth_password, config_.password);
+    const auto given = [](const char *text) { return std::string_view(text == nullptr ? "" : text); };
+    const bool user = same_secret(given(ctx->auth_user), config_.user);
+    const bool password = same_secret(given(ctx->auth_password), config_.password);
     return user && password;
 }
 

@@ -1,4 +1,4 @@
-// registry.h - the tables behind dispatch by type id: what the generator fills, what registry.cpp looks up.
+// registry.h - the tables that dispatch by type id uses: what the generator fills, what registry.cpp looks up.
 //
 // Here: the rows' layout. Elsewhere: the operations (registry.cpp), the rows (registry_tables.cpp,
 // generated).
