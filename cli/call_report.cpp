@@ -28,11 +28,6 @@ private:
     std::vector<std::string> lines_;
 };
 
-double milliseconds(std::int64_t microseconds)
-{
-    return static_cast<double>(microseconds) / 1000;
-}
-
 std::string day(std::int64_t seconds)
 {
     return utc_time(seconds).substr(0, 10);
@@ -104,6 +99,11 @@ void add_ending(lines &out, const soap_report &report)
 }
 
 } // namespace
+
+double milliseconds(std::int64_t microseconds)
+{
+    return static_cast<double>(microseconds) / 1000;
+}
 
 std::string utc_time(std::int64_t seconds)
 {

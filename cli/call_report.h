@@ -13,6 +13,9 @@ namespace cli {
 // certificate, what ended it.
 std::vector<std::string> connection_steps(const soap_report &report);
 
+// Of a time of the report.
+double milliseconds(std::int64_t microseconds);
+
 // Seconds since 1970 as "2026-11-21T05:06:00Z".
 std::string utc_time(std::int64_t seconds);
 

@@ -33,11 +33,6 @@ struct port_answer {
     double milliseconds = 0;
 };
 
-double milliseconds(std::int64_t microseconds)
-{
-    return static_cast<double>(microseconds) / 1000;
-}
-
 const operation &get_operation(const port &of)
 {
     for (const operation &op : all_operations())
