@@ -40,6 +40,9 @@ bool reuse_area(soap *ctx, std::size_t needed)
 
 void growing_text_free(soap *ctx)
 {
+    ctx->label_index = 0;
+    if (ctx->label_buffer == nullptr)
+        return;
     soap_memory_pools *pools = ctx->pools;
     const std::size_t size = ctx->label_size;
     if (size != 0 && pools != nullptr && size > pools->spare_text_size && size <= SPARE_TEXT_MAX &&
@@ -51,7 +54,6 @@ void growing_text_free(soap *ctx)
     SOAP_FREE(ctx, ctx->label_buffer);
     ctx->label_buffer = nullptr;
     ctx->label_size = 0;
-    ctx->label_index = 0;
 }
 
 int soap_text_buffer_reserve(soap *ctx, std::size_t bytes)

@@ -60,10 +60,15 @@ struct idle_pool {
     bool large = false;                       // the message that is released holds more than pool_limit
 };
 
+// True if so many more bytes may wait.
+inline bool idle_has_bytes(const idle_pool &idle, std::size_t bytes)
+{
+    return bytes <= idle.bytes_max && idle.bytes <= idle.bytes_max - bytes;
+}
+
 // True if one more record that holds so many bytes may wait.
 template <class Record>
 bool idle_has_space(const idle_pool &idle, const idle_list<Record> &list, std::size_t bytes)
 {
-    return bytes <= idle.bytes_max && idle.bytes <= idle.bytes_max - bytes &&
-           (!idle.large || list.count < list.usual);
+    return idle_has_bytes(idle, bytes) && (!idle.large || list.count < list.usual);
 }

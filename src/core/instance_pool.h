@@ -36,9 +36,10 @@ inline bool idle_has_space(const soap *ctx, int type_id, std::size_t bytes)
 inline void idle_give(soap *ctx, int type_id, soap_instance *instance, std::size_t bytes)
 {
     idle_pool &idle = ctx->pools->idle;
+    const auto type = static_cast<unsigned>(type_id);
     instance->array_size = static_cast<std::int32_t>(bytes);
-    idle.objects[type_id].push(instance, idle.large);
-    idle.used[type_id / 64] |= std::uint64_t{1} << type_id % 64;
+    idle.objects[type].push(instance, idle.large);
+    idle.used[type / 64] |= std::uint64_t{1} << type % 64;
     idle.bytes += bytes;
 }
 

@@ -55,7 +55,7 @@ bool keep_instance(soap *ctx, soap_instance *instance)
         instance->type_id >= IDLE_TYPES || !idle_has_space(ctx, instance->type_id, 1))
         return false;
     const std::size_t bytes = ctx->upcalls->recycle(ctx, instance);
-    if (bytes == 0 || !idle_has_space(ctx, instance->type_id, bytes))
+    if (bytes == 0 || !idle_has_bytes(ctx->pools->idle, bytes)) // texts of its vectors wait by now
         return false;
     idle_give(ctx, instance->type_id, instance, bytes);
     return true;

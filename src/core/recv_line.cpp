@@ -5,6 +5,10 @@
 #include <algorithm>
 #include <cstring>
 
+#if defined(__SSE2__)
+#include <emmintrin.h>
+#endif
+
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_io.h>
 
@@ -31,13 +35,19 @@ int end_of_input(soap *ctx)
 }
 
 // The first CR or LF, or `stop`.
-const char *stretch_end(const char *start, const char *stop)
+const char *stretch_end(const char *p, const char *stop)
 {
-    const auto find = [start](int c, const char *end) {
-        const void *const found = std::memchr(start, c, static_cast<std::size_t>(end - start));
-        return found != nullptr ? static_cast<const char *>(found) : end;
-    };
-    return find('\n', find('\r', stop)); // the search for a CR may go far only once for each line
+#if defined(__SSE2__)
+    const __m128i cr = _mm_set1_epi8('\r'), lf = _mm_set1_epi8('\n');
+    for (; stop - p >= 16; p += 16) {
+        const __m128i bytes = _mm_loadu_si128(reinterpret_cast<const __m128i *>(p));
+        const int hits =
+            _mm_movemask_epi8(_mm_or_si128(_mm_cmpeq_epi8(bytes, cr), _mm_cmpeq_epi8(bytes, lf)));
+        if (hits != 0)
+            return p + __builtin_ctz(static_cast<unsigned>(hits));
+    }
+#endif
+    return std::find_if(p, stop, [](char c) { return c == '\r' || c == '\n'; });
 }
 
 // Moves what is in the buffer up to a CR or LF, but no more than `left` bytes, to `end`, as far as that

@@ -1,7 +1,6 @@
 // head_memory.cpp - see head_memory.h.
 #include "net/head_memory.h"
 
-#include <algorithm>
 #include <charconv>
 #include <cstring>
 #include <string_view>
@@ -32,17 +31,20 @@ constexpr std::string_view LENGTH_LINE = "\r\nContent-Length: ";
 
 bool is_same_text(const memory &kept, std::size_t place, const char *text)
 {
-    if (text == nullptr || place == 0)
-        return text == nullptr && place == 0;
-    return std::strcmp(kept.bytes + place - 1, text) == 0;
+    if (place == 0)
+        return text == nullptr;
+    return text != nullptr && std::strcmp(kept.bytes + place - 1, text) == 0;
 }
 
 bool is_same(const memory &kept, const head_source &source)
 {
     if (kept.end == 0 || kept.port != source.port || kept.flags != source.flags)
         return false;
-    return std::equal(std::begin(kept.texts), std::end(kept.texts), std::begin(source.texts),
-                      [&](std::size_t place, const char *text) { return is_same_text(kept, place, text); });
+    for (std::size_t i = 0; i < head_source::TEXTS; ++i) {
+        if (!is_same_text(kept, kept.texts[i], source.texts[i]))
+            return false;
+    }
+    return true;
 }
 
 void forget(memory &kept)

@@ -25,15 +25,16 @@ std::int64_t microseconds_of(int timeout)
     return timeout >= 0 ? timeout * MICROSECONDS : -std::int64_t{timeout};
 }
 
-// One set of a select call: null for a direction that isn't waited for.
+// One set of a select call: null for a direction that isn't waited for. Of its bits those up to `last` are
+// defined, the greatest descriptor of the call: select looks at no others.
 class wait_set {
 public:
-    wait_set(bool wanted, int socket) : wanted_(wanted), used_(wanted), socket_(socket)
+    wait_set(bool wanted, int socket, int last) : wanted_(wanted), used_(wanted), socket_(socket), last_(last)
     {
         if (!wanted_)
             return;
-        set_ = {};
-        FD_SET(socket_, &set_);
+        clear();
+        set(socket_);
     }
     // Another descriptor; -1 is none.
     void add(int other)
@@ -41,17 +42,32 @@ public:
         if (other < 0)
             return;
         if (!used_)
-            set_ = {};
-        FD_SET(other, &set_);
+            clear();
+        set(other);
         used_ = true;
     }
     fd_set *get() { return used_ ? &set_ : nullptr; }
-    bool ready() const { return wanted_ && FD_ISSET(socket_, &set_); }
-    bool has(int other) const { return other >= 0 && FD_ISSET(other, &set_); }
+    bool ready() const { return wanted_ && has(socket_); }
+    bool has(int other) const { return other >= 0 && (set_.fds_bits[word(other)] & bit(other)) != 0; }
 
 private:
+    // Descriptors are below FD_SETSIZE: wait_for lets no other through.
+    static unsigned word(int descriptor) { return static_cast<unsigned>(descriptor) / NFDBITS; }
+    static fd_mask bit(int descriptor)
+    {
+        return static_cast<fd_mask>(1UL << static_cast<unsigned>(descriptor) % NFDBITS);
+    }
+    void set(int descriptor) { set_.fds_bits[word(descriptor)] |= bit(descriptor); }
+    void clear()
+    {
+        if (last_ < NFDBITS) // the usual case is one word
+            set_.fds_bits[0] = 0;
+        else
+            set_ = {};
+    }
+
     bool wanted_, used_;
-    int socket_;
+    int socket_, last_;
     fd_set set_;
 };
 
@@ -60,16 +76,17 @@ constexpr int WOKEN = 8; // besides WAIT_...: the waking descriptor is readable
 // What is ready of a socket (WAIT_...) and of the waking one, asked of select; 0 and -1 as of select.
 int select_ready(int socket, int flags, const std::int64_t *limit_us, int wake)
 {
-    wait_set readable((flags & WAIT_RECV) != 0, socket);
+    const int last = std::max(socket, wake);
+    wait_set readable((flags & WAIT_RECV) != 0, socket, last);
     readable.add(wake);
-    wait_set writable((flags & WAIT_SEND) != 0, socket);
-    wait_set exceptional((flags & WAIT_ERROR) != 0, socket);
+    wait_set writable((flags & WAIT_SEND) != 0, socket, last);
+    wait_set exceptional((flags & WAIT_ERROR) != 0, socket, last);
     timeval limit{};
     if (limit_us != nullptr) {
         limit.tv_sec = static_cast<std::time_t>(*limit_us / MICROSECONDS);
         limit.tv_usec = static_cast<suseconds_t>(*limit_us % MICROSECONDS);
     }
-    const int count = select(std::max(socket, wake) + 1, readable.get(), writable.get(), exceptional.get(),
+    const int count = select(last + 1, readable.get(), writable.get(), exceptional.get(),
                              limit_us != nullptr ? &limit : nullptr);
     if (count <= 0)
         return count;

@@ -36,11 +36,15 @@ bool same_texts(const soap_namespace &one, const soap_namespace &other)
     return one.prefix == other.prefix && one.uri == other.uri && one.pattern == other.pattern;
 }
 
-// True if the table holds just the rows measured last time, none with a received URI.
+// True if the table holds just the rows measured last time, none with a received URI. Of the working copy the
+// size is known.
 bool is_measured(const soap_namespace_scope *scope, const soap_namespace *table)
 {
-    return scope != nullptr && scope->rows != nullptr && count_rows(table) == scope->row_count &&
-           std::memcmp(scope->rows, table, scope->row_count * sizeof *table) == 0;
+    if (scope == nullptr || scope->rows == nullptr)
+        return false;
+    const std::size_t count = scope->row_count;
+    const bool as_long = table == scope->copy ? table[count].prefix == nullptr : count_rows(table) == count;
+    return as_long && std::memcmp(scope->rows, table, count * sizeof *table) == 0;
 }
 
 void forget_rows(soap *ctx, soap_namespace_scope *scope)

@@ -83,18 +83,19 @@ tag_view view_of_tag(const soap *ctx)
     return view_of_tag(ctx);
 }
 
-// The parts of a name, from what is known of the held tag where it is that one.
+// The parts of a name; of the held tag they are known.
 struct name_parts {
     const char *local;
     std::size_t prefix_length;
 };
 
-name_parts split_name(soap *ctx, const char *name)
+name_parts split_held(const soap *ctx, const tag_view &held)
 {
-    if (name == ctx->tag) {
-        const tag_view view = soap_held_tag(ctx);
-        return {view.local, ctx->tag_local != 0 ? ctx->tag_local - 1u : 0u};
-    }
+    return {held.local, ctx->tag_local != 0 ? ctx->tag_local - 1u : 0u};
+}
+
+name_parts split_name(const char *name)
+{
     const char *colon = std::strchr(name, ':');
     if (colon == nullptr)
         return {name, 0};
@@ -117,9 +118,8 @@ int compare_row(soap *ctx, int row, const char *read, const char *asked, std::si
 }
 
 // The held tag is spelled as the one asked for, and its prefix stands for the row of that name.
-bool is_spelled_so(soap *ctx, const char *asked)
+bool is_spelled_so(const soap *ctx, const tag_view &held, const char *asked)
 {
-    const tag_view held = soap_held_tag(ctx);
     return held.row >= 0 && ctx->tag_local > 1 && std::strcmp(ctx->tag, asked) == 0 &&
            namespace_row_has_prefix(ctx, held.row, asked, ctx->tag_local - 1U);
 }
@@ -180,9 +180,11 @@ int soap_tag_compare(soap *ctx, const char *read, const char *asked)
         return SOAP_OK;
     if (read == nullptr)
         return SOAP_TAG_MISMATCH;
-    if (read == ctx->tag && is_spelled_so(ctx, asked))
+    const bool is_held = read == ctx->tag;
+    const tag_view held = is_held ? soap_held_tag(ctx) : tag_view{};
+    if (is_held && is_spelled_so(ctx, held, asked))
         return SOAP_OK;
-    const name_parts name = split_name(ctx, read);
+    const name_parts name = is_held ? split_held(ctx, held) : split_name(read);
     const char *asked_colon = std::strchr(asked, ':');
     if (asked_colon == nullptr)
         return std::strcmp(name.local, asked) == 0 ? 0 : SOAP_TAG_MISMATCH;
@@ -191,7 +193,7 @@ int soap_tag_compare(soap *ctx, const char *read, const char *asked)
         return SOAP_TAG_MISMATCH;
     if (asked_colon == asked)
         return SOAP_OK;
-    const int row = read == ctx->tag ? ctx->tag_row : xml_prefix_row(ctx, read, name.prefix_length);
+    const int row = is_held ? held.row : xml_prefix_row(ctx, read, name.prefix_length);
     const int error =
         compare_row(ctx, row, read, asked, name.prefix_length, static_cast<std::size_t>(asked_colon - asked));
     return error == SOAP_NAMESPACE_ERROR ? SOAP_TAG_MISMATCH : error;
