@@ -46,9 +46,15 @@ void connection_options::declare(CLI::App &app)
         ->capture_default_str()
         ->type_name("SECONDS")
         ->group("Connection");
-    app.add_option("--trace", trace_file,
-                   "Append what goes over the wire to this file, \"-\" for standard output; see zuv trace")
-        ->type_name("FILE")
+    CLI::Option *trace =
+        app.add_option(
+               "--trace", trace_file,
+               "Append what goes over the wire to this file, \"-\" for standard output; see zuv trace")
+            ->type_name("FILE")
+            ->group("Output");
+    app.add_flag("--trace-times", trace_times,
+                 "Append the times of the trace's bytes to FILE.times beside it")
+        ->needs(trace)
         ->group("Output");
     app.add_flag("-v,--verbose", verbose, "Tell what happened: times, bytes, addresses, TLS")
         ->group("Output");

@@ -19,6 +19,7 @@ struct connection_options {
     std::string proxy, proxy_user, proxy_password_file; // ... in ZUV_PROXY_PASSWORD
     double connect_limit = 30, silence_limit = 300;     // seconds; 0: none
     std::string trace_file;
+    bool trace_times = false; // in a file beside it
     bool quiet = false, verbose = false;
     std::string password, key_password, proxy_password; // of the configuration file, the last resort
 

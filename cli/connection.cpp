@@ -95,6 +95,11 @@ void connection::prepare(soap *ctx) const
     const char *const trace = options_.trace_file == "-" ? "/dev/stdout" : text_or_null(options_.trace_file);
     if (soap_log_set_received(ctx, trace) != SOAP_OK || soap_log_set_sent(ctx, trace) != SOAP_OK)
         throw std::bad_alloc();
+    if (options_.trace_times && options_.trace_file == "-")
+        throw failure(EXIT_USAGE, "--trace-times: the trace must be a file");
+    const std::string times = options_.trace_file + ".times";
+    if (options_.trace_times && soap_log_set(ctx, SOAP_LOG_TIMES, times.c_str()) != SOAP_OK)
+        throw std::bad_alloc();
     prepare_tls(ctx);
 }
 

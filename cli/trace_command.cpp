@@ -19,7 +19,7 @@ namespace cli {
 
 namespace {
 
-constexpr std::size_t COLUMNS = 7, CELL_MAX = 60; // characters
+constexpr std::size_t COLUMNS = 9, CELL_MAX = 60; // characters
 using row = std::array<std::string, COLUMNS>;
 
 // Characters of UTF-8 text.
@@ -53,13 +53,20 @@ row row_of(const exchange &one, bool show_secrets)
             one.soap12 ? "1.2" : "1.1",
             size_words(one.sent),
             size_words(one.received),
+            moment_words(one.sent_first_us),
+            elapsed_words(one.sent_first_us, one.last_us),
             cell(shown_start_line(one.target, show_secrets)) + (about.empty() ? "" : "  " + cell(about))};
 }
 
+// Columns without any content are left out.
 std::string table(std::vector<row> rows)
 {
-    constexpr bool RIGHT[COLUMNS] = {true, false, false, false, true, true, false};
-    rows.insert(rows.begin(), {"#", "operation", "status", "SOAP", "sent", "received", "target"});
+    constexpr bool RIGHT[COLUMNS] = {true, false, false, false, true, true, false, true, false};
+    row heads = {"#", "operation", "status", "SOAP", "sent", "received", "began", "took", "target"};
+    for (std::size_t i = 0; i < COLUMNS && !rows.empty(); ++i)
+        if (std::all_of(rows.begin(), rows.end(), [i](const row &one) { return one[i].empty(); }))
+            heads[i].clear();
+    rows.insert(rows.begin(), heads);
     std::array<std::size_t, COLUMNS> widths{};
     for (const row &one : rows)
         for (std::size_t i = 0; i < COLUMNS; ++i)
@@ -67,6 +74,8 @@ std::string table(std::vector<row> rows)
     std::string text;
     for (const row &one : rows) {
         for (std::size_t i = 0; i < COLUMNS; ++i) {
+            if (widths[i] == 0)
+                continue;
             const std::string gap(widths[i] - width(one[i]), ' ');
             text += RIGHT[i] ? gap + one[i] : i + 1 < COLUMNS ? one[i] + gap : one[i];
             text += i + 1 < COLUMNS ? "  " : "\n";
@@ -77,10 +86,25 @@ std::string table(std::vector<row> rows)
 
 } // namespace
 
+namespace {
+
+// Read if the trace has them.
+trace_times times_beside(const std::string &trace)
+{
+    const std::string path = trace + ".times";
+    std::error_code error;
+    if (trace == "-" || !std::filesystem::is_regular_file(path, error))
+        return {};
+    return trace_times(mapped_file(path).bytes());
+}
+
+} // namespace
+
 exit_code show_trace(const trace_options &options)
 {
     mapped_file file(options.file);
-    exchange_reader exchanges(file.bytes());
+    const trace_times times = times_beside(options.file);
+    exchange_reader exchanges(file.bytes(), times);
     const auto next = [&](exchange &one) {
         bool found = exchanges.next(one);
         while (found && options.failed && !one.failed())

@@ -175,6 +175,15 @@ message_facts facts_of(const trace_message &message)
     return {};
 }
 
+void add_times(const trace_message &message, const trace_times &times, exchange &to)
+{
+    const trace_times::span span = times.of(message.request, message.begin, message.wire_size);
+    std::int64_t &first = message.request ? to.sent_first_us : to.received_first_us;
+    if (first == 0)
+        first = span.first_us;
+    to.last_us = std::max(to.last_us, span.last_us);
+}
+
 void add_message(trace_message &&message, const message_facts &facts, exchange &to)
 {
     to.complete = to.complete && message.complete;
@@ -252,6 +261,7 @@ void exchange_reader::take(trace_message &&message)
     }
     to->size += message.body.size();
     const bool answers = !message.request && message.status() >= 200;
+    add_times(message, times_, to->content);
     add_message(std::move(message), facts, to->content);
     if (!answers)
         return;

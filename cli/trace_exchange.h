@@ -2,12 +2,14 @@
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 #include <deque>
 #include <string>
 #include <string_view>
 #include <vector>
 
 #include "trace_reader.h"
+#include "trace_times.h"
 
 namespace cli {
 
@@ -34,6 +36,8 @@ struct exchange {
     bool soap12 = false;
     bool complete = true;
     std::size_t sent = 0, received = 0; // bytes in the trace
+    // When the first and last bytes of request and answer went over the wire; 0: not known.
+    std::int64_t sent_first_us = 0, received_first_us = 0, last_us = 0; // since 1970
 
     bool failed() const { return !fault.empty() || status == 0 || status >= 300 || !complete; }
 };
@@ -43,7 +47,7 @@ struct exchange {
 // is of, or else the last of them, and `doubt` says so.
 class exchange_reader {
 public:
-    explicit exchange_reader(std::string_view trace) : messages_(trace) {}
+    exchange_reader(std::string_view trace, const trace_times &times) : messages_(trace), times_(times) {}
     bool next(exchange &found); // false at the end
     std::size_t position() const { return messages_.position(); }
 
@@ -62,6 +66,7 @@ private:
     bool is_ready() const;
 
     trace_reader messages_;
+    const trace_times &times_;
     std::deque<entry> entries_;
     std::size_t count_ = 0;
     bool ended_ = false;

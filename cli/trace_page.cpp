@@ -67,8 +67,8 @@ public:
             "</span><span class=\"operation\">" + html(one.operation.empty() ? "unknown" : one.operation) +
             "</span><span class=\"target\">" + html(shown_start_line(one.target, show_secrets_)) +
             remark(one.fault) + remark(one.doubt) + "</span><span class=\"size\">" +
-            (one.soap12 ? "<abbr>SOAP 1.2</abbr> " : "") + "&uarr; " + size_words(one.sent) + " &darr; " +
-            size_words(one.received) + "</span></summary>";
+            (one.soap12 ? "<abbr>SOAP 1.2</abbr> " : "") + times(one) + "&uarr; " + size_words(one.sent) +
+            " &darr; " + size_words(one.received) + "</span></summary>";
         for (const trace_message &message : one.messages)
             text += message_text(message, one.number);
         put(text + "</details>\n");
@@ -103,6 +103,13 @@ private:
             return "good";
         const bool carries_faults = one.status == 200 || one.status == 400 || one.status == 500;
         return carries_faults && !one.fault.empty() ? "fault" : "bad";
+    }
+
+    static std::string times(const exchange &one)
+    {
+        const std::string took = elapsed_words(one.sent_first_us, one.last_us);
+        return one.sent_first_us == 0 ? ""
+                                      : "<time>" + moment_words(one.sent_first_us) + "</time> " + took + " ";
     }
 
     std::string remark(const std::string &text) const

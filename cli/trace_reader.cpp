@@ -193,6 +193,7 @@ bool trace_reader::next(trace_message &message)
         message.body = trace_.substr(begin, at_ - begin);
         message.complete = false;
     }
+    message.begin = begin;
     message.wire_size = at_ - begin;
     return true;
 }

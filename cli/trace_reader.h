@@ -21,9 +21,9 @@ struct trace_message {
     bool request = false;
     std::string start_line; // empty for bytes without an HTTP head before them
     std::vector<std::pair<std::string, std::string>> headers;
-    std::string body;          // framing and compression undone
-    std::size_t wire_size = 0; // bytes in the trace
-    bool complete = true;      // false: it is cut off, or its body can't be decoded
+    std::string body;                     // framing and compression undone
+    std::size_t begin = 0, wire_size = 0; // offset and bytes in the trace
+    bool complete = true;                 // false: it is cut off, or its body can't be decoded
 
     int status() const; // of an answer; 0 for none
     // Value of a header by its name, any case; empty for none.

@@ -220,6 +220,11 @@ std::string exchange_text(const exchange &one, bool show_secrets)
                        printable(one.operation.empty() ? "unknown" : one.operation) + ", " +
                        (one.status == 0 ? "no answer" : std::to_string(one.status)) +
                        (one.soap12 ? ", SOAP 1.2" : ", SOAP 1.1") + "\n";
+    if (one.sent_first_us != 0)
+        text += "began " + moment_words(one.sent_first_us) + ", last byte after " +
+                elapsed_words(one.sent_first_us, one.last_us) + "\n";
+    if (const std::string waited = elapsed_words(one.sent_first_us, one.received_first_us); !waited.empty())
+        text += "answer after " + waited + "\n";
     if (!one.fault.empty())
         text += "fault: " + printable(show_secrets ? one.fault : without_secrets(one.fault)) + "\n";
     if (!one.doubt.empty())

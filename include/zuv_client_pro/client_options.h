@@ -73,6 +73,7 @@ struct options {
     // "calls.log" becomes "calls-1.log" for the first client of the process, "calls-2.log" for the second.
     std::string trace;
     bool trace_as_named = false; // the file is called as `trace` says, and clients append to it in turn
+    bool trace_times = false;    // the times of its bytes go to a file beside it, called as it with ".times"
 
     retry_policy retry; // of calls
 };

@@ -9,7 +9,8 @@
 constexpr std::size_t SOAP_LOG_PATH_SIZE = 4096; // bytes of g_TraceLogFile, terminator included
 constexpr int SOAP_LOG_RECEIVED = 0;             // received bytes
 constexpr int SOAP_LOG_SENT = 1;                 // sent bytes
-constexpr int SOAP_LOG_THIRD = 2;                // the library writes nothing there
+constexpr int SOAP_LOG_THIRD = 2; // times of the bytes in the other two; without a path at first
+constexpr int SOAP_LOG_TIMES = SOAP_LOG_THIRD;
 
 // Path of the trace of contexts made from now on, relative to the working directory; "wsTrace.log" at first.
 // The host program may overwrite it, up to 4096 bytes; the empty text means no trace. Contexts keep the path
@@ -24,6 +25,10 @@ extern "C" ZUV_API char soapEnableDebug;
 //   path     null: no log
 //   SOAP_OK
 //   SOAP_OUT_OF_MEMORY  the channel is off
+//
+// With a path, SOAP_LOG_TIMES takes a line for each piece of bytes that is appended to one of the others:
+// where it begins in its file, in bytes, when that was, in microseconds since 1970, and "s" for sent or "r"
+// for received bytes. `zuv trace FILE` looks for it under FILE with ".times" appended.
 ZUV_API int soap_log_set(soap *ctx, int channel, const char *path);
 ZUV_API int soap_log_set_received(soap *ctx, const char *path);
 ZUV_API int soap_log_set_sent(soap *ctx, const char *path);

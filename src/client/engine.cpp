@@ -73,6 +73,8 @@ engine::engine(std::string_view to, const options &given)
     set_proxy();
     soap_log_set_sent(this, text_or_null(trace));
     soap_log_set_received(this, text_or_null(trace));
+    if (wanted.trace_times && !trace.empty())
+        soap_log_set(this, SOAP_LOG_TIMES, (trace + ".times").c_str());
 }
 
 void engine::discard()

@@ -6,7 +6,9 @@
 
 #include "core/failure.h"
 
+#include <cinttypes>
 #include <cstring>
+#include <ctime>
 #include <fcntl.h>
 #include <new>
 #include <unistd.h>
@@ -107,17 +109,45 @@ void trace_log_end(soap *ctx)
         set_path(ctx, channel, nullptr, 0);
 }
 
+namespace {
+
+// The channel's file, opened if need be; null without one.
+std::FILE *stream_of(soap *ctx, int channel)
+{
+    if (ctx->log_streams[channel] == nullptr)
+        soap_log_open(ctx, channel);
+    return ctx->log_streams[channel];
+}
+
+// Notes when the last `length` bytes of a channel's file were written.
+void note_time(soap *ctx, int channel, std::size_t length)
+{
+    std::FILE *times = stream_of(ctx, SOAP_LOG_TIMES);
+    if (times == nullptr)
+        return;
+    const off_t end = ftello(ctx->log_streams[channel]);
+    timespec now{};
+    if (end < static_cast<off_t>(length) || clock_gettime(CLOCK_REALTIME, &now) != 0)
+        return;
+    std::fprintf(times, "%" PRId64 " %" PRId64 "%06ld %c\n", static_cast<std::int64_t>(end - length),
+                 static_cast<std::int64_t>(now.tv_sec), now.tv_nsec / 1000,
+                 channel == SOAP_LOG_SENT ? 's' : 'r');
+    std::fflush(times);
+}
+
+} // namespace
+
 void soap_log_write(soap *ctx, int channel, const char *data, std::size_t length)
 {
     if (!is_channel(channel) || length == 0)
         return;
-    if (ctx->log_streams[channel] == nullptr)
-        soap_log_open(ctx, channel);
-    std::FILE *stream = ctx->log_streams[channel];
+    std::FILE *stream = stream_of(ctx, channel);
     if (stream == nullptr)
         return;
     std::fwrite(data, 1, length, stream);
     std::fflush(stream); // the trace must survive a crash of the host
+    if (channel != SOAP_LOG_TIMES && ctx->log_paths[SOAP_LOG_TIMES] != nullptr)
+        note_time(ctx, channel, length);
 }
 
 // ---------------------------------------------------------------------------------------------

@@ -163,6 +163,17 @@ class trace(unittest.TestCase):
         fault = b"HTTP/1.1 500 %s\r\n\r\n<E><Body><Fault><faultstring>a ]]>&lt;<![CDATA[%s]]></faultstring>" % (HOSTILE, HOSTILE)
         return post + parts + fault
 
+    def test_times_are_those_of_the_file_beside_the_trace(self):
+        with zuv.peer(zuv.answer(got(10).encode())) as (address, _):
+            zuv.run("profile", "get", "-e", address, "-t", "urn:one", "--trace", self.log, "--trace-times")
+        number, shown = r"\d+\.\d ms", zuv.run("trace", self.log, "--show", "1").stdout
+        self.assertRegex(shown, r"began 20\d\d-\d\d-\d\dT[\d:]{8}\.\d{3}Z, last byte after %s\nanswer after %s\n" % (number, number))
+        self.assertRegex(zuv.run("trace", self.log).stdout, r"began +took +target\n1 .*Z +%s  /" % number)
+        self.assertRegex(etree.tostring(self.made_page()).decode(), r"<time>20[^<]*Z</time> %s " % number)
+        with open(self.log + ".times", "wb") as file: # lines that say nothing, or of an impossible time, and an answer before its request
+            file.write(b"0 1700000000000000 r\n\xff 1 s\n0 9999999999999999999 s\n0 -5 s\n7 s\n1700000000 0 s\n0 1700000000250000 s\n0 17")
+        self.assertIn("began 2023-11-14T22:13:20.250Z, last byte after 0.0 ms\nanswer after -250.0 ms\n", zuv.run("trace", self.log, "--show", "1").stdout)
+
     def test_hostile_content_stays_text(self):
         self.write(self.hostile_trace())
         page = self.made_page()

@@ -1,4 +1,6 @@
 // trace_log_test.cpp - the trace files of a context, and certificates taken out of message texts.
+#include <ctime>
+#include <sstream>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -65,6 +67,26 @@ TEST_F(trace_log, a_channel_follows_its_own_path)
     EXPECT_EQ(content_of(path("default.log")), "a");
     EXPECT_EQ(content_of(path("sent.log")), "b");
     EXPECT_EQ(ctx.log_streams[SOAP_LOG_RECEIVED], nullptr);
+}
+
+TEST_F(trace_log, times_say_where_in_its_file_each_piece_begins_and_when_it_was_written)
+{
+    soap ctx;
+    const std::int64_t before = std::int64_t{std::time(nullptr)} * 1000000;
+    write(ctx, SOAP_LOG_SENT, "no times yet;");
+    ASSERT_EQ(soap_log_set(&ctx, SOAP_LOG_TIMES, path("times").c_str()), 0);
+    write(ctx, SOAP_LOG_SENT, "out;");
+    write(ctx, SOAP_LOG_RECEIVED, "in;");
+    std::istringstream times(content_of(path("times")));
+    long long place = 0, first = 0, second = 0;
+    char direction = 0;
+    ASSERT_TRUE(times >> place >> first >> direction);
+    EXPECT_EQ(std::pair(place, direction), std::pair(13LL, 's'));
+    ASSERT_TRUE(times >> place >> second >> direction);
+    EXPECT_EQ(std::pair(place, direction), std::pair(17LL, 'r'));
+    EXPECT_TRUE(before <= first && first <= second && second < before + 3600000000)
+        << before << ' ' << first << ' ' << second;
+    EXPECT_FALSE(times >> place);
 }
 
 TEST_F(trace_log, holds_the_bytes_on_the_wire_and_what_they_unpack_to)
