@@ -199,10 +199,12 @@ class trace(unittest.TestCase):
         dom = html.document_fromstring(browser.dom(self.page))
         self.assertEqual([e.text for e in dom.iterfind(".//span[@class='operation']")], ["get", "get"])
         self.assertEqual([e.text for e in dom.xpath("//span[starts-with(@class,'badge')]")], ["200", "503"])
-        picture = os.path.join(self.folder, "t.png")
-        browser.screenshot(self.page, picture)
-        with open(picture, "rb") as file:
-            self.assertTrue(file.read().startswith(b"\x89PNG"))
+        for dark in (True, False):
+            for width, needed, ink, paper in browser.measured(self.page, dark):
+                with self.subTest(dark=dark, width=width):
+                    self.assertLessEqual(needed, width)
+                    self.assertLess(*((paper, 0.05) if dark else (0.8, paper)))
+                    self.assertGreater((max(ink, paper) + 0.05) / (min(ink, paper) + 0.05), 7, "contrast")
 
     def test_any_bytes_are_a_trace(self):
         dice = random.Random(4)
