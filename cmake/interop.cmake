@@ -18,6 +18,7 @@ function(zuv_add_interop name)
 endfunction()
 zuv_add_interop(zeep_ports $<TARGET_FILE:zuv-service>)
 zuv_add_interop(contract_handed_out $<TARGET_FILE:zuv-service>)
+zuv_add_interop(mono_documents $<TARGET_FILE:zuv-service>)
 zuv_add_interop(client_ports $<TARGET_FILE:zuv> $<TARGET_FILE:care_host> $<TARGET_FILE:problem_report_host>
     $<TARGET_FILE:zuv-service> ${NPM_SERVICE})
 set_tests_properties(interop_client_ports PROPERTIES FIXTURES_REQUIRED npm_service)
