@@ -37,7 +37,7 @@ ZUV_API int soap_envelope_out_begin(soap *ctx);
 // Ends it: the end tag, CR LF and the record's padding. The counting pass computes the record's size and
 // header.
 //   SOAP_OK
-//   SOAP_DIME_ERROR  counting pass: two attachments have one id
+//   SOAP_DIME_ERROR  counting pass: two attachments have one id, or the XML takes 4 GB or more
 //   SOAP_MIME_ERROR  counting pass: two parts have one id
 //   returns          otherwise an error of writing
 ZUV_API int soap_envelope_out_end(soap *ctx);

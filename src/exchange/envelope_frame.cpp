@@ -20,9 +20,10 @@ namespace {
 
 constexpr std::size_t MIME_NAMES_MAX =
     944; // bytes of boundary and start id together, which a part head may take
-constexpr std::uint8_t DIME_FIRST = 0x24; // message begins; the type is an absolute URI
-constexpr std::uint8_t DIME_ONLY = 0x26;  // message begins and ends
-constexpr std::size_t DIME_HEADER = 12;   // bytes
+constexpr std::uint8_t DIME_FIRST = 0x24;           // message begins; the type is an absolute URI
+constexpr std::uint8_t DIME_ONLY = 0x26;            // message begins and ends
+constexpr std::size_t DIME_HEADER = 12;             // bytes
+constexpr std::uint64_t DIME_DATA_MAX = 0xFFFFFFFF; // bytes of a record, also where std::size_t holds no more
 
 bool has_modes(const soap *ctx, std::uint32_t set, std::uint32_t clear)
 {
@@ -73,7 +74,10 @@ const char *envelope_uri(const soap *ctx)
 // Makes the header of the SOAP record from what the counting pass found, and counts it.
 int prepare_dime_record(soap *ctx)
 {
-    ctx->dime.size = static_cast<std::size_t>(ctx->message_count) - ctx->dime.size;
+    const std::uint64_t length = ctx->message_count - ctx->dime.size;
+    if (length > DIME_DATA_MAX)
+        return fail(ctx, SOAP_DIME_ERROR);
+    ctx->dime.size = static_cast<std::size_t>(length);
     char id[SOAP_TEXT_SIZE];
     std::snprintf(id, sizeof id, ctx->dime_id_format, 0);
     const char *type = envelope_uri(ctx);

@@ -59,6 +59,12 @@ TEST(dime_out, cuts_texts_and_refuses_data_that_no_header_can_announce)
         wire.dime.size = std::size_t{1} << (sizeof wire.dime.size * 4);
         EXPECT_EQ(soap_dime_header_write(&wire), SOAP_DIME_ERROR);
     }
+    memory_wire large(0, SENDING | MODE_DIME);
+    soap_reset_call(&large);
+    ASSERT_EQ(soap_count_begin(&large), 0);
+    ASSERT_EQ(soap_envelope_out_begin(&large), 0);
+    large.message_count += std::uint64_t{1} << 32; // as if so much had been written
+    EXPECT_EQ(soap_envelope_out_end(&large), SOAP_DIME_ERROR);
 }
 
 // --- streams of the host ---
