@@ -8,6 +8,9 @@
 // A message that went beyond a limit brings no further input, and its connection carries no other message.
 #pragma once
 
+#include <algorithm>
+#include <cstddef>
+
 #include <zuv_client_pro/soap.h>
 
 constexpr std::uint64_t EXTRA_BYTES = std::uint64_t{1} << 20; // of copies, or raw bytes, for any message
@@ -40,8 +43,8 @@ int output_limit_check(soap *ctx, std::size_t length);
 void output_xml_begin(soap *ctx);
 int output_xml_end(soap *ctx);
 
-// Bytes that malloc takes for a block of `size` bytes.
-constexpr std::size_t ALLOCATION_UNIT = 16;
+// Bytes that malloc takes for a block of `size` bytes: 16, or 8 where nothing wants more.
+constexpr std::size_t ALLOCATION_UNIT = std::max(2 * sizeof(std::size_t), alignof(std::max_align_t));
 constexpr std::size_t allocation_size(std::size_t size)
 {
     return (size + sizeof(std::size_t) + ALLOCATION_UNIT - 1) & ~(ALLOCATION_UNIT - 1);

@@ -19,7 +19,8 @@ namespace {
 
 constexpr std::size_t LOAD_MAX = 1; // entries for each chain before the table doubles
 // Book-keeping of a block: its entry, and its part of the table.
-constexpr std::size_t BOOK_UNITS = (sizeof(soap_track_entry) + 2 * sizeof(void *)) / ALLOCATION_UNIT;
+constexpr std::size_t BOOK_UNITS =
+    (sizeof(soap_track_entry) + 2 * sizeof(void *) + ALLOCATION_UNIT - 1) / ALLOCATION_UNIT;
 
 std::int64_t bytes_held(const soap_track_entry *entry)
 {
