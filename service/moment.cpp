@@ -1,6 +1,7 @@
 // moment.cpp - see moment.h.
 #include "moment.h"
 
+#include <cstdint>
 #include <cstdio>
 #include <stdexcept>
 
@@ -26,7 +27,11 @@ std::optional<std::time_t> moment_of(soap *ctx, const std::string &text)
     std::time_t seconds = 0;
     const bool understood = soap_datetime_parse(ctx, text.c_str(), &seconds) == 0;
     ctx->error = error;
-    return understood ? std::optional(seconds) : std::nullopt;
+    if (!understood)
+        return std::nullopt;
+    if (sizeof seconds == 4 && seconds == -1) // beyond what it holds: after or before all that it does
+        return text < "1970" ? INT32_MIN : INT32_MAX;
+    return seconds;
 }
 
 std::string fresh_uuid()
