@@ -71,7 +71,7 @@ TEST_F(dates, without_a_zone_are_local_time_and_are_written_in_utc)
     EXPECT_EQ(parsed("2009-07-13T18:31:30.25"), "1247524290") << "in summer with daylight time";
     EXPECT_EQ(parsed("2009-07-13T22:31:30Z"), "1247524290") << "UTC does not depend on the zone of the host";
     EXPECT_STREQ(soap_datetime_text(ctx.get(), 1234567890), "2009-02-13T23:31:30Z");
-    EXPECT_STREQ(soap_datetime_text(ctx.get(), INT64_MAX), "1969-12-31T23:59:59Z");
+    EXPECT_STREQ(soap_datetime_text(ctx.get(), static_cast<std::time_t>(INT64_MAX)), "1969-12-31T23:59:59Z");
 }
 
 TEST_F(dates, random_dates_agree_with_python)
@@ -89,10 +89,13 @@ TEST_F(dates, random_dates_agree_with_python)
         {});
     ASSERT_EQ(answers.size(), 2000U);
     for (const std::string &answer : answers) {
-        const std::string text = answer.substr(0, answer.find(' '));
-        const std::string seconds = parsed(text);
-        ASSERT_EQ(text + " " + seconds + " " + soap_datetime_text(ctx.get(), std::atoll(seconds.c_str())),
-                  answer);
+        const std::size_t end = answer.find(' ');
+        const std::string text = answer.substr(0, end), seconds = parsed(text);
+        const long long right = std::stoll(answer.substr(end));
+        const bool held = static_cast<std::time_t>(right) == right; // not all are where it has 32 bits
+        ASSERT_EQ(text + " " + seconds + " " +
+                      soap_datetime_text(ctx.get(), static_cast<std::time_t>(std::stoll(seconds))),
+                  held ? answer : text + " -1 1969-12-31T23:59:59Z");
     }
 }
 
