@@ -106,13 +106,18 @@ TEST_F(numbers, floating_text_is_what_the_c_library_takes_and_names_in_any_case)
 
 TEST_F(numbers, the_hosts_locale_does_not_reach_the_wire)
 {
-    // A locale of our own, as glibc keeps it, whose decimal point is "~": no machine need have it.
-    static const char CATEGORY[] =
-        "\x14\x11\x03\x20\x06\0\0\0\x20\0\0\0\x22\0\0\0\x23\0\0\0\x24\0\0\0\x28\0\0\0"
-        "\x2C\0\0\0~\0\0\0~\0\0\0\0\0\0\0ANSI_X3.4-1968";
+    // A locale of our own whose decimal point is "~": no machine need have it. As glibc keeps it, in the machine's
+    // byte order.
+    static const struct {
+        std::uint32_t head[8] = {0x20031114, 6, 0x20, 0x22, 0x23, 0x24, 0x28, 0x2C};
+        char narrow[4] = "~";
+        std::uint32_t wide[2] = {'~'};
+        char codeset[15] = "ANSI_X3.4-1968";
+    } category;
     const std::string place = testing::TempDir() + "number_test_" + std::to_string(::getpid());
     std::filesystem::create_directories(place + "/zz_ZZ");
-    std::ofstream(place + "/zz_ZZ/LC_NUMERIC", std::ios::binary).write(CATEGORY, sizeof CATEGORY);
+    std::ofstream(place + "/zz_ZZ/LC_NUMERIC", std::ios::binary)
+        .write(reinterpret_cast<const char *>(&category), sizeof category);
     ::setenv("LOCPATH", place.c_str(), 1);
     const bool foreign = std::setlocale(LC_NUMERIC, "zz_ZZ") != nullptr;
     char shown[8] = "";
