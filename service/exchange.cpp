@@ -85,6 +85,53 @@ const operation *find_operation(soap *ctx, const port &target)
     refuse<protocol__Client_x002eMalformedRequest>(ctx, text + ".");
 }
 
+// An entry of the Header that is named as the contract's own, in none of the namespaces that an extension may
+// have.
+bool is_misplaced_header(soap *ctx)
+{
+    const std::string_view tag = ctx->tag, local = tag.substr(tag.find(':') + 1);
+    const char *const bound = soap_namespace_of(ctx, ctx->tag);
+    const std::string_view found = bound == nullptr ? std::string_view() : bound;
+    ctx->error = SOAP_OK; // of a prefix without a declaration
+    return local == "header" && (found.empty() || found.starts_with(namespaces_of_element("header").front()));
+}
+
+// As soap_header_get, but what the contract's own entry holds is refused like what is unknown in the Body.
+// Entries of others are extensions, to be skipped.
+void read_header_strictly(soap *ctx)
+{
+    if (soap_element_in_begin(ctx, "SOAP-ENV:Header", 0, nullptr) == SOAP_TAG_MISMATCH) {
+        ctx->message_part = PART_AFTER_HEADER;
+        ctx->error = SOAP_OK;
+        return;
+    }
+    demand(ctx->error);
+    const bool has_content = ctx->has_body != 0;
+    ctx->message_part = PART_HEADER;
+    soap_header_record(ctx);
+    while (has_content && ctx->error == SOAP_OK && soap_element_head_read(ctx) == SOAP_OK) {
+        const bool known = soap_tag_compare(ctx, ctx->tag, "protocol:header") == SOAP_OK;
+        if (known ? ctx->header->header != nullptr : is_misplaced_header(ctx))
+            refuse_unexpected(ctx);
+        if (!known) {
+            soap_element_skip(ctx);
+            continue;
+        }
+        ctx->message_part = PART_AFTER_HEADER; // here what is unknown is no extension
+        ctx->header->header = make<protocol__Header>(ctx);
+        if (ctx->header->header->soap_in(ctx, "protocol:header", nullptr) == nullptr &&
+            ctx->error == SOAP_TAG_MISMATCH)
+            refuse_unexpected(ctx);
+        ctx->message_part = PART_HEADER;
+    }
+    if (ctx->error == SOAP_NO_TAG)
+        ctx->error = SOAP_OK;
+    demand(ctx->error);
+    if (has_content)
+        demand(soap_element_in_end(ctx, "SOAP-ENV:Header"));
+    ctx->message_part = PART_AFTER_HEADER;
+}
+
 struct request {
     const operation *op;
     void *object;
@@ -93,8 +140,12 @@ struct request {
 // The request element, which is the first of the Body, and all that follows it.
 request read_request(soap *ctx, const port &target)
 {
+    const bool strict = (ctx->mode & MODE_STRICT) != 0;
     demand(soap_envelope_in_begin(ctx));
-    demand(soap_header_get(ctx));
+    if (strict)
+        read_header_strictly(ctx);
+    else
+        demand(soap_header_get(ctx));
     demand(soap_body_in_begin(ctx));
     if (ctx->message_part == PART_EMPTY_BODY || soap_element_head_read(ctx) == SOAP_NO_TAG)
         refuse<protocol__Client_x002eMalformedRequest>(ctx, "The Body holds no request.");
@@ -103,7 +154,6 @@ request read_request(soap *ctx, const port &target)
     if (op == nullptr)
         refuse_operation(ctx);
     void *const object = op->read(ctx, target.by_type ? nullptr : op->request_element);
-    const bool strict = (ctx->mode & MODE_STRICT) != 0;
     if (object != nullptr)
         soap_read_independents(ctx);
     if (ctx->error == SOAP_TAG_MISMATCH && strict)

@@ -72,6 +72,7 @@ server::server(const settings &config, database &place)
     sweep_data(place.data_directory,
                [&documents](std::string_view name) { return documents.data_size(name).has_value(); });
     master_.bind_flags = SO_REUSEADDR;
+    master_.wait_with_poll = 1; // the files of many sessions take descriptors beyond those of select
     master_.max_depth = config.depth_limit;
     master_.max_message = config.message_limit();
     master_.max_memory = config.memory_limit();

@@ -2,6 +2,7 @@
 """The service as an HTTP server: statuses, framings, versions, connections, and the files that it keeps."""
 import json
 import os
+import resource
 import stat
 import subprocess
 import tempfile
@@ -83,6 +84,12 @@ class http(unittest.TestCase):
     def test_strict_it_names_what_it_would_drop(self):
         common = "http://www.zuv.example/xmlns/b2b/zuv/v1.0"
         with zuv.service() as lenient, zuv.service("--strict") as strict:
+            def check(rule, message, noted):
+                self.assertEqual(exchange(lenient, post("Profile", message)).status, 200, rule)
+                answer = exchange(strict, post("Profile", message))
+                self.assertEqual(answer.first("subcode"), "Client.MalformedRequest" if noted else None, answer)
+                for words in noted:
+                    self.assertIn(words, answer.first("faultstring").replace("&apos;", "'"))
             for rule, content, noted in (
                     ("nothing wrong", "<profileAuthority>x</profileAuthority>", ()),
                     ("another namespace", "<c:profileAuthority>x</c:profileAuthority>",
@@ -91,12 +98,17 @@ class http(unittest.TestCase):
                     ("deeper", "<c:credentials><c:nam/></c:credentials>", ("'nam'", "the contract has no element of this name")),
                     ("one of elsewhere", "<credentials/>", ("/Profile'", "expected '%s'" % common)),
                     ("a second one", 2 * "<profileAuthority/>", ("'profileAuthority'", "not expected in this place"))):
-                sent = post("Profile", envelope("Profile", request("create", content)))
-                self.assertEqual(exchange(lenient, sent).status, 200, rule)
-                answer = exchange(strict, sent)
-                self.assertEqual(answer.first("subcode"), "Client.MalformedRequest" if noted else None, answer)
-                for words in noted:
-                    self.assertIn(words, answer.first("faultstring").replace("&apos;", "'"))
+                check(rule, envelope("Profile", request("create", content)), noted)
+            for rule, content, noted in (
+                    ("nothing wrong", "<c:targetURI>urn:x</c:targetURI>", ()),
+                    ("unknown", "<c:targetUri>urn:x</c:targetUri>", ("'targetUri'", "no element of this name")),
+                    ("another namespace", "<targetURI>urn:x</targetURI>", ("/Profile'", "expected '%s'" % common)),
+                    ("deeper", "<c:credentials><c:nam/></c:credentials>", ("'nam'",)),
+                    ("a header of its own", '</c:header><x:any xmlns:x="urn:x"><x:deep/></x:any><c:header>',
+                     ("'header'", "not once more")),
+                    ("an extension", '</c:header><x:header xmlns:x="urn:x"><x:deep/></x:header><c:header xmlns:c="%s/x">' % common,
+                     ("'header' of the namespace '%s/x'" % common, "expected '%s'" % common))):
+                check(rule, envelope("Profile", request("create"), content), noted)
             after = post("Profile", envelope("Profile", request("create") + "<more/>"))
             self.assertEqual([exchange(one, after).status for one in (lenient, strict)], [200, 500])
 
@@ -154,6 +166,14 @@ class http(unittest.TestCase):
                 self.assertEqual((answer.status, stalled.ended()), (408, True), limit)
                 self.assertTrue(limit != "--idle" or silent.ended())
                 # where it is open still, a silent connection does not hold up the service's end
+
+    def test_descriptors_beyond_those_of_select_are_served(self):
+        def use_up():
+            resource.setrlimit(resource.RLIMIT_NOFILE, 2 * resource.getrlimit(resource.RLIMIT_NOFILE)[1:])
+            for place in range(3, 1100):
+                os.dup2(0, place)
+        with zuv.service(close_fds=False, preexec_fn=use_up) as address:
+            self.assertEqual(exchange(address, post("Profile", CREATE)).status, 200)
 
     def test_it_does_not_start_without_what_it_needs(self):
         with zuv.service() as address:
