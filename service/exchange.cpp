@@ -25,6 +25,7 @@
 #include "data_port.h"
 #include "local_resources.h"
 #include "moment.h"
+#include "seed.h"
 
 namespace service {
 
@@ -46,43 +47,12 @@ void demand(int result)
 // ---------------------------------------------------------------------------------------------
 // Reading.
 
-const operation *find_operation(soap *ctx, const port &target)
-{
-    const bool typed = target.by_type && ctx->element_type[0] != '\0';
-    for (const operation &candidate : target.operations)
-        if (soap_tag_compare(ctx, typed ? ctx->element_type : ctx->tag, candidate.request_element) == 0)
-            return &candidate;
-    return nullptr;
-}
-
 [[noreturn]] void refuse_operation(soap *ctx)
 {
     ctx->error = SOAP_OK;
     const std::string name = ctx->tag;
     refuse<protocol__Client_x002eMalformedRequest>(
         ctx, "Method '" + name + "' not implemented: method name or namespace not recognized");
-}
-
-// In strict reading: names the element at which it stopped, its namespace and the one that the contract has for
-// such a name.
-[[noreturn]] void refuse_unexpected(soap *ctx)
-{
-    ctx->error = SOAP_OK;
-    const std::string_view tag = ctx->tag;
-    const std::string local(tag.substr(tag.find(':') + 1));
-    const char *const bound = soap_namespace_of(ctx, ctx->tag);
-    ctx->error = SOAP_OK; // of a prefix without a declaration
-    const std::string_view found = bound == nullptr ? std::string_view() : bound;
-    std::vector<std::string_view> others = namespaces_of_element(local);
-    const bool is_known = std::erase(others, found) != 0;
-    std::string text = "Element '" + local + "' of ";
-    text += found.empty() ? "no namespace" : "the namespace '" + std::string(found) + "'";
-    text += is_known         ? " is not expected in this place, or not once more"
-            : others.empty() ? ": the contract has no element of this name"
-                             : ": wrong namespace";
-    for (const std::string_view one : others)
-        text.append(one == others.front() ? "; expected '" : " or '").append(one).append("'");
-    refuse<protocol__Client_x002eMalformedRequest>(ctx, text + ".");
 }
 
 // An entry of the Header that is named as the contract's own, in none of the namespaces that an extension may
@@ -336,7 +306,10 @@ const void *run(soap *ctx, const request &asked, reception &received)
            received.message_bytes(),
            {{ctx}}};
     try {
-        return asked.op->run(c, asked.object);
+        const auto inside = borrowed.shared.gate.enter();
+        const void *const response = asked.op->run(c, asked.object);
+        received.enclosed().confirm_kept();
+        return response;
     } catch (const document_error &error) {
         refuse_document(ctx, error);
     }
@@ -356,7 +329,7 @@ int receive_rules(soap *ctx, reception &received)
 {
     if (!is_json(ctx->http_content))
         return ctx->error = UNSUPPORTED_TYPE;
-    rule_book &rules = received.borrowed().rules;
+    rule_book &rules = received.borrowed().shared.rules;
     std::string body;
     if (!read_body(ctx, [&body](const char *data, std::size_t length) { body.append(data, length); }))
         return ctx->error != SOAP_OK ? ctx->error : ctx->error = BAD_REQUEST;
@@ -369,15 +342,31 @@ int receive_rules(soap *ctx, reception &received)
     return send_file(ctx, JSON_TYPE, rules.waiting());
 }
 
+// Empties the store and seeds it again. What asks for it must say that it is JSON, as above.
+int reset_store(soap *ctx, reception &received)
+{
+    if (!is_json(ctx->http_content))
+        return ctx->error = UNSUPPORTED_TYPE;
+    if (!read_body(ctx, [](const char *, std::size_t) {}))
+        return ctx->error != SOAP_OK ? ctx->error : ctx->error = BAD_REQUEST;
+    std::size_t seeded = 0;
+    try {
+        const auto alone = received.borrowed().shared.gate.close();
+        empty_store(received.borrowed());
+        seeded = seed_store(received.borrowed(), received.config());
+    } catch (const std::runtime_error &wrong) {
+        settle_version(ctx);
+        return soap_fault_receiver(ctx, soap_string_dup(ctx, wrong.what()), nullptr, INTERNAL_ERROR);
+    }
+    return send_file(ctx, JSON_TYPE, "{\"seeded\":" + std::to_string(seeded) + "}");
+}
+
 // What the rules say of this call.
 void follow_rule(soap *ctx, const operation &op, reception &received)
 {
-    std::string_view name = op.request_element;
-    name.remove_prefix(name.find(':') + 1);
-    if (name.ends_with("Request"))
-        name.remove_suffix(std::string_view("Request").size());
+    const std::string_view name = name_of(op);
     received.note_operation(name);
-    const std::optional<rule> asked = received.borrowed().rules.take(received.target()->name, name);
+    const std::optional<rule> asked = received.borrowed().shared.rules.take(received.target()->name, name);
     if (!asked)
         return;
     wait(ctx->socket, asked->delay_ms);
@@ -401,7 +390,7 @@ void receive_and_answer(soap *ctx, reception &received)
         return;
     }
     if (received.at_control()) {
-        demand(receive_rules(ctx, received));
+        demand(received.at_reset() ? reset_store(ctx, received) : receive_rules(ctx, received));
         return;
     }
     if (received.target() == nullptr) { // XML without an HTTP head
@@ -412,7 +401,6 @@ void receive_and_answer(soap *ctx, reception &received)
     const request asked = read_request(ctx, *received.target());
     follow_rule(ctx, *asked.op, received);
     const void *const response = run(ctx, asked, received);
-    received.enclosed().confirm_kept();
     if (ctx->response_unfinished)
         ctx->keep_alive = 0; // bytes follow the request, which can't be distinguished from a next one
     settle_header(ctx);

@@ -4,7 +4,12 @@
 #include <algorithm>
 #include <cstdlib>
 #include <iterator>
+#include <vector>
 
+#include <zuv_client_pro/soap_error.h>
+#include <zuv_client_pro/soap_xml.h>
+
+#include "contract_files.h"
 #include "filter.h"
 
 namespace service {
@@ -55,6 +60,26 @@ void refuse_not_found(soap *ctx, const std::string &uri)
         make_fault<protocol__Client_x002eObjectNotFound>(ctx, "No document has the name " + uri + ".");
     fault->uri.push_back(uri);
     refuse(fault);
+}
+
+void refuse_unexpected(soap *ctx)
+{
+    ctx->error = SOAP_OK;
+    const std::string_view tag = ctx->tag;
+    const std::string local(tag.substr(tag.find(':') + 1));
+    const char *const bound = soap_namespace_of(ctx, ctx->tag);
+    ctx->error = SOAP_OK; // of a prefix without a declaration
+    const std::string_view found = bound == nullptr ? std::string_view() : bound;
+    std::vector<std::string_view> others = namespaces_of_element(local);
+    const bool is_known = std::erase(others, found) != 0;
+    std::string text = "Element '" + local + "' of ";
+    text += found.empty() ? "no namespace" : "the namespace '" + std::string(found) + "'";
+    text += is_known         ? " is not expected in this place, or not once more"
+            : others.empty() ? ": the contract has no element of this name"
+                             : ": wrong namespace";
+    for (const std::string_view one : others)
+        text.append(one == others.front() ? "; expected '" : " or '").append(one).append("'");
+    refuse<protocol__Client_x002eMalformedRequest>(ctx, text + ".");
 }
 
 using too_complex = protocol__Server_x002eUnsupportedRequest_x002eFilterExpressionTooComplex;

@@ -62,6 +62,10 @@ bool is_fault_name(std::string_view name);
 // No document has the name.
 [[noreturn]] void refuse_not_found(soap *ctx, const std::string &uri);
 
+// Strict reading has stopped at an element, which the fault names, with its namespace and the one that the contract
+// has for such a name.
+[[noreturn]] void refuse_unexpected(soap *ctx);
+
 // The fault for a filter that can't be evaluated, and the refusal of a request because of it.
 protocol__Fault *fault_of(soap *ctx, const filter_error &error);
 [[noreturn]] void refuse_filter(soap *ctx, const filter_error &error);

@@ -12,8 +12,9 @@
 
 namespace service {
 
-constexpr std::string_view CONTROL_PATH = "/zuv/v1.0/control"; // GET, POST and DELETE of rules (rules.h)
-constexpr std::string_view RECENT_PATH = "/zuv/v1.0/recent";   // GET, "?after=NUMBER"
+constexpr std::string_view CONTROL_PATH = "/zuv/v1.0/control";     // GET, POST and DELETE of rules (rules.h)
+constexpr std::string_view RESET_PATH = "/zuv/v1.0/control/reset"; // POST: the store as it began
+constexpr std::string_view RECENT_PATH = "/zuv/v1.0/recent";       // GET, "?after=NUMBER"
 constexpr char JSON_TYPE[] = "application/json";
 
 // HTML: what is served, and the last exchanges, which the page asks for itself.

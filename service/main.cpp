@@ -62,7 +62,11 @@ void declare(CLI::App &app, options &o)
     app.add_option("--rules", s.rules, "JSON file of rules that say how the next calls are answered")
         ->check(CLI::ExistingFile);
     app.add_flag("--control", s.control,
-                 "Take such rules from clients on this machine too, at /zuv/v1.0/control");
+                 "Take such rules from clients on this machine too, at /zuv/v1.0/control, and resets at "
+                 "/zuv/v1.0/control/reset");
+    app.add_option("--seed", s.seed,
+                   "File of a request, or folder of such files, that a store without documents begins with")
+        ->check(CLI::ExistingPath);
     app.add_option("--trace", s.trace, "File that takes a copy of all bytes received and sent");
     app.add_option("--port-file", o.port_file, "File that takes the port once the service listens");
     app.add_flag("--json", o.json, "Print the addresses of the ports as one line of JSON, in place of words");

@@ -40,6 +40,7 @@ struct call {
     document_codec &judged; // for documents that only a filter looks at; forgotten after each
     std::uint64_t bytes;    // of the request, framing and compression undone, without what went to files
     request_work work;
+    bool keeps_names = false; // new documents keep the names that they are given
 };
 
 struct operation {
@@ -85,6 +86,12 @@ constexpr std::string_view SERVICES_PATH = "/zuv/v1.0/services/";
 
 // The port at a path, or null.
 const port *find_port(std::string_view path);
+
+// The operation whose request element's start tag was read; null if the port has none of that name.
+const operation *find_operation(soap *ctx, const port &target);
+
+// "create" of "protocolProfile:createRequest".
+std::string_view name_of(const operation &op);
 
 // All ports, for the page that lists them.
 std::span<const port *const> all_ports();

@@ -197,7 +197,7 @@ void reception::note_exchange()
     note_.lasted = std::chrono::steady_clock::now() - begun_;
     if (const std::string_view head = note_.answer; head.starts_with("HTTP/1.") && head.size() > 12)
         note_.status = std::atoi(head.substr(9, 3).data());
-    borrowed_.notes.add(std::move(note_));
+    borrowed_.shared.notes.add(std::move(note_));
 }
 
 int reception::count_body(soap *ctx, const char *data, std::size_t length)
@@ -323,9 +323,12 @@ int reception::answer_local(soap *ctx)
 {
     if (!is_local())
         return ctx->error = FORBIDDEN;
+    if (at_reset())
+        return ctx->error = METHOD_NOT_ALLOWED;
     note_.shown = false;
     return send_file(ctx, JSON_TYPE,
-                     at_control() ? borrowed_.rules.waiting() : borrowed_.notes.recent(number_after(where_)));
+                     at_control() ? borrowed_.shared.rules.waiting()
+                                  : borrowed_.shared.notes.recent(number_after(where_)));
 }
 
 int reception::get(soap *ctx)
@@ -343,12 +346,12 @@ int reception::option_or_head(soap *ctx)
 int reception::erase(soap *ctx)
 {
     return answered(ctx, [ctx](reception &self) {
-        if (!self.at_control())
+        if (!self.at_control() || self.at_reset())
             return ctx->error = METHOD_NOT_ALLOWED;
         if (!self.is_local())
             return ctx->error = FORBIDDEN;
         end_without_body(ctx);
-        self.borrowed_.rules.clear();
+        self.borrowed_.shared.rules.clear();
         return http_method_default(ctx);
     });
 }

@@ -46,7 +46,8 @@ public:
 
     // What a rule says of the bytes of the answer to this request; before the answer is begun.
     void distort(soap *ctx, const rule &how);
-    bool at_control() const { return config_.control && where_.path == CONTROL_PATH; }
+    bool at_control() const { return config_.control && (where_.path == CONTROL_PATH || at_reset()); }
+    bool at_reset() const { return where_.path == RESET_PATH; }
 
     // Notes which operation the request is for, and writes the finished exchange in the journal.
     void note_operation(std::string_view name);

@@ -25,7 +25,7 @@ public:
     //   kind  part of the names given to its documents
     repository(call &c, const char *port, const char *kind) : call_(c), port_(port), kind_(kind) {}
 
-    // Gives a document a new name and keeps it.
+    // Keeps a document, under a new name unless the call keeps names.
     void keep(Document &document)
     {
         keep(document, [] {});
@@ -34,8 +34,14 @@ public:
     // The same; `prepare` is called first, within the transaction.
     template <class Prepare> void keep(Document &document, const Prepare &prepare)
     {
-        document.thisURI = {std::string("urn:zuv:") + kind_ + ":" + fresh_uuid()};
+        if (call_.keeps_names && !document.thisURI.empty() && !document.thisURI.front().empty())
+            document.thisURI.resize(1);
+        else
+            document.thisURI = {std::string("urn:zuv:") + kind_ + ":" + fresh_uuid()};
         store::writing transaction(call_.documents);
+        if (call_.keeps_names && call_.documents.find(port_, document.thisURI.front()))
+            refuse<protocol__Client_x002eInvalidInformation>(
+                call_.ctx, "There is a document named " + document.thisURI.front() + " already.");
         prepare();
         const std::string xml = call_.codec.write(document, call_.bytes);
         call_.documents.insert(port_, document.thisURI.front(), state_of(document), xml);

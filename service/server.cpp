@@ -21,6 +21,7 @@
 #include "connection.h"
 #include "data_files.h"
 #include "request_target.h"
+#include "seed.h"
 
 namespace service {
 
@@ -60,17 +61,18 @@ std::string listen_failure(soap *ctx, const settings &config)
 } // namespace
 
 server::server(const settings &config, database &place)
-    : config_(config), place_(place), notes_(config.access_log),
-      master_(input_mode_of(config), output_mode_of(config))
+    : config_(config), place_(place), shared_(config), master_(input_mode_of(config), output_mode_of(config))
 {
     idle_sessions_.push_back(
-        std::make_unique<session>(place, config, notes_, rules_)); // an unusable database fails now
+        std::make_unique<session>(place, config, shared_)); // an unusable database fails now
     if (!config.rules.empty())
-        rules_.add(text_of_file(config.rules));
+        shared_.rules.add(text_of_file(config.rules));
     store &documents = idle_sessions_.back()->documents;
     open_data_directory(place.data_directory);
     sweep_data(place.data_directory,
                [&documents](std::string_view name) { return documents.data_size(name).has_value(); });
+    if (documents.is_empty())
+        seed_store(*idle_sessions_.back(), config);
     master_.bind_flags = SO_REUSEADDR;
     master_.wait_with_poll = 1; // the files of many sessions take descriptors beyond those of select
     master_.max_depth = config.depth_limit;
@@ -157,7 +159,7 @@ std::unique_ptr<session> server::acquire_session()
             return borrowed;
         }
     }
-    return std::make_unique<session>(place_, config_, notes_, rules_);
+    return std::make_unique<session>(place_, config_, shared_);
 }
 
 void server::serve(soap *copy, std::list<connection>::iterator place)

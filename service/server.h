@@ -15,16 +15,16 @@
 #include <zuv_client_pro/soap.h>
 
 #include "exchange.h"
-#include "journal.h"
-#include "rules.h"
 #include "settings.h"
+#include "shared_state.h"
 #include "store.h"
 
 namespace service {
 
 class server {
 public:
-    // Starts to listen. Throws std::runtime_error if the address is not available, and store_error.
+    // Seeds a store without documents, and starts to listen. Throws std::runtime_error if the address is not
+    // available or the seed is wrong, and store_error.
     server(const settings &config, database &place);
     ~server(); // as `stop`
 
@@ -33,7 +33,7 @@ public:
     // Accepts connections on a thread of its own.
     void start();
 
-    void reopen_log() { notes_.reopen(); }
+    void reopen_log() { shared_.notes.reopen(); }
 
     // Ends: requests under way get their answers, within STOP_LIMIT, idle connections are closed.
     void stop();
@@ -55,8 +55,7 @@ private:
 
     const settings &config_;
     database &place_;
-    journal notes_;
-    rule_book rules_;
+    shared_state shared_;
     soap master_;
     int port_ = 0;
     std::thread acceptor_;

@@ -2,21 +2,19 @@
 #pragma once
 
 #include "document.h"
-#include "journal.h"
-#include "rules.h"
 #include "settings.h"
+#include "shared_state.h"
 #include "store.h"
 
 namespace service {
 
 struct session {
-    session(database &place, const settings &config, journal &shared_notes, rule_book &shared_rules)
-        : notes(shared_notes), rules(shared_rules), documents(place),
+    session(database &place, const settings &config, shared_state &common)
+        : shared(common), documents(place),
           codec(config.body_limit, config.depth_limit, config.memory_limit()),
           judged(config.body_limit, config.depth_limit, config.memory_limit())
     {}
-    journal &notes;   // of all connections
-    rule_book &rules; // of all connections
+    shared_state &shared;
     store documents;
     document_codec codec, judged;
 };

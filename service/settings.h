@@ -28,6 +28,7 @@ struct settings {
     std::string access_log; // file that takes a line for each exchange; "-": standard output, empty: none
     std::string rules;      // file of rules that hold from the start (rules.h); empty: none
     bool control = false;   // rules are taken from clients on this machine too
+    std::string seed;       // file or folder of requests that the store begins with (seed.h); empty: none
     std::string trace;      // file that takes a copy of all bytes; empty: none
     std::uint64_t body_limit = 64ULL << 20; // bytes of a request, framing and compression undone; 413 beyond
     std::uint64_t attachment_limit =

@@ -224,6 +224,23 @@ void store::remove(std::string_view port, std::string_view uri)
     run(remove_);
 }
 
+bool store::is_empty()
+{
+    return !step_to_row(prepare("SELECT 1 FROM document LIMIT 1"));
+}
+
+std::vector<std::string> store::clear()
+{
+    std::vector<std::string> names;
+    writing transaction(*this);
+    const statement each = prepare("SELECT name FROM data_file");
+    while (step_to_row(each))
+        names.emplace_back(blob_of(each.get()));
+    execute("DELETE FROM document; DELETE FROM data_file");
+    transaction.commit();
+    return names;
+}
+
 store::writing::writing(store &target) : target_(target), turn_(target.place_.writers)
 {
     target_.run(target_.begin_);

@@ -15,6 +15,7 @@
 #include <stdexcept>
 #include <string>
 #include <string_view>
+#include <vector>
 
 struct sqlite3;
 struct sqlite3_stmt;
@@ -73,6 +74,10 @@ public:
     void expect_data(std::string_view name);
     bool note_data(std::string_view name, std::uint64_t size); // false for an unknown name
     void forget_data(std::string_view name);
+
+    bool is_empty(); // without documents
+    // Forgets all documents and data, in a transaction of its own; the names of the data's files.
+    std::vector<std::string> clear();
 
 private:
     struct closer {

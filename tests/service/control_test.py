@@ -16,10 +16,11 @@ import urllib.request
 
 import browser  # of the tests of the command line
 import zuv
-from by_hand import Connection, envelope, exchange, post, request, target
+from by_hand import Connection, call, envelope, exchange, post, request, target
 
 CREATE = post("Profile", envelope("Profile", request("create")))
 GET = post("Profile", envelope("Profile", request("get"), target("urn:x")))
+ATTACH = "<attachment/><dataPortPreference><c:transport>HTTP</c:transport></dataPortPreference>"
 CONTROL, RECENT = "/zuv/v1.0/control", "/zuv/v1.0/recent"
 
 
@@ -106,6 +107,47 @@ class control(unittest.TestCase):
                     file.write('{"status": 99}')
                 run = subprocess.run([zuv.SERVICE, "--port", "0", "--rules", name], capture_output=True, text=True, timeout=60)
                 self.assertEqual((run.returncode, '"status"' in run.stderr), (1, True), run)
+
+    def test_a_seeded_store_is_reset_on_request(self):
+        seed = "<createRequest xmlns='%s'><thisURI>urn:%s</thisURI></createRequest>"
+        json_type = "Content-Type: application/json"
+        with tempfile.TemporaryDirectory() as folder:
+            def put(name, text):
+                pathlib.Path(folder, name + ".xml").write_text(text)
+            put("ada", seed % (zuv.PROFILE, "ada"))
+            put("bob", seed % (zuv.COMMON + "/StatusReport", "bob"))
+            base = os.path.join(folder, "documents.db")
+            with zuv.service("--seed", folder, "--control", "--database", base) as address:
+                names = ("Profile", "urn:ada"), ("StatusReport", "urn:bob"), ("Profile", call(address, "Profile", "create").first("thisURI"))
+                report = call(address, "StatusReport", "create").first("thisURI")
+                url = call(address, "StatusReport", "attach", ATTACH, target(report)).first("dataURI").removeprefix(address)
+                self.assertEqual(ask(address, "POST", url, "signal").status, 200)
+
+                def found():
+                    return [call(address, port, "get", header=target(uri)).status for port, uri in names]
+                self.assertEqual((found(), len(os.listdir(base + "-data"))), ([200, 200, 200], 1))
+                with Connection(address) as held:
+                    held.send(CREATE[:-40])  # a call that is arriving meanwhile
+                    answer = ask(address, "POST", CONTROL + "/reset", "{}", json_type)
+                    self.assertEqual((answer.status, json.loads(answer.body)), (200, {"seeded": 2}))
+                    self.assertEqual((found(), os.listdir(base + "-data")), ([200, 200, 500], []))
+                    self.assertEqual(held.send(CREATE[-40:]).receive().status, 200)
+                for method, kind, host, status in (("POST", "text/plain", "localhost", 415), ("POST", "application/json", "x.test", 403),
+                                                   ("GET", "", "localhost", 405), ("DELETE", "", "localhost", 405)):
+                    self.assertEqual(ask(address, method, CONTROL + "/reset", "{}", "Content-Type: " + kind, host=host).status, status)
+                put("bob", seed % (zuv.PROFILE, "ada"))
+                answer = ask(address, "POST", CONTROL + "/reset", "{}", json_type)
+                self.assertEqual((answer.status, "bob.xml: There is a document named urn:ada already" in answer), (500, True), answer)
+                self.assertEqual(found(), [500, 500, 500])
+                kept = call(address, "Profile", "create").first("thisURI")
+            with zuv.service("--seed", folder, "--database", base) as address:  # which isn't empty
+                self.assertEqual(call(address, "Profile", "get", header=target(kept)).status, 200)
+                self.assertEqual(ask(address, "POST", CONTROL + "/reset", "{}", json_type).status, 404)
+            for text, wrong in (("<a/>", "no operation"), ("", "no whole XML"), (CREATE.decode()[:-9], "no operation"),
+                                (seed.replace("<this", "<that").replace("</this", "</that") % (zuv.PROFILE, "x"), "'thatURI'")):
+                put("bob", text)
+                run = subprocess.run([zuv.SERVICE, "--port", "0", "--seed", folder], capture_output=True, text=True, timeout=60)
+                self.assertEqual((run.returncode, "bob.xml: " in run.stderr, wrong in run.stderr), (1, True, True), run)
 
     def test_exchanges_are_logged_and_shown_without_secrets(self):
         secret = ("<c:credentials><c:username>ada</c:username><c:password>sesame</c:password><c:token><![CDATA[sesame]]></c:token>"
