@@ -16,11 +16,12 @@ namespace {
 constexpr std::size_t FILE_PIECE = 32768; // bytes
 constexpr int OK = 200, BAD_REQUEST = 400, INTERNAL_ERROR = 500;
 
-// The Body's content.
+// The Body's content, or in place of the whole message its bytes.
 struct content {
     int (*put)(soap *ctx, const content &self);
     const operation *op = nullptr;
     const void *response = nullptr;
+    const std::string *message = nullptr;
 };
 
 int put_response(soap *ctx, const content &self)
@@ -35,6 +36,8 @@ int put_fault(soap *ctx, const content &)
 
 int write_message(soap *ctx, const content &body)
 {
+    if (body.message != nullptr)
+        return soap_send_bytes(ctx, body.message->data(), body.message->size());
     if (soap_envelope_out_begin(ctx) || soap_header_put(ctx) || soap_body_out_begin(ctx) ||
         body.put(ctx, body) || soap_body_out_end(ctx) || soap_envelope_out_end(ctx))
         return ctx->error;
@@ -97,6 +100,11 @@ int send_message(soap *ctx, int http_status, const content &body, enclosures *en
 int send_response(soap *ctx, const operation &op, const void *response, enclosures &enclosed)
 {
     return send_message(ctx, OK, {put_response, &op, response}, &enclosed);
+}
+
+int send_recorded(soap *ctx, const recorded_answer &answer)
+{
+    return send_message(ctx, answer.status, {nullptr, nullptr, nullptr, &answer.body}, nullptr);
 }
 
 int send_fault(soap *ctx, int http_status)

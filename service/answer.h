@@ -12,12 +12,16 @@
 
 #include "faults.h"
 #include "port.h"
+#include "recording.h"
 
 namespace service {
 
 // Sends the response of an operation in the SOAP version of the request, with ctx->header as its header, and
 // the files that are attached to it.
 int send_response(soap *ctx, const operation &op, const void *response, enclosures &enclosed);
+
+// Sends a recorded answer, framed as others are. Its Content-Type is the caller's affair.
+int send_recorded(soap *ctx, const recorded_answer &answer);
 
 // Sends ctx->fault under an HTTP status, with ctx->header as its header.
 int send_fault(soap *ctx, int http_status);

@@ -352,6 +352,7 @@ int reset_store(soap *ctx, reception &received)
     std::size_t seeded = 0;
     try {
         const auto alone = received.borrowed().shared.gate.close();
+        received.borrowed().shared.played.rewind();
         empty_store(received.borrowed());
         seeded = seed_store(received.borrowed(), received.config());
     } catch (const std::runtime_error &wrong) {
@@ -365,7 +366,7 @@ int reset_store(soap *ctx, reception &received)
 void follow_rule(soap *ctx, const operation &op, reception &received)
 {
     const std::string_view name = name_of(op);
-    received.note_operation(name);
+    received.note_operation(ctx, name);
     const std::optional<rule> asked = received.borrowed().shared.rules.take(received.target()->name, name);
     if (!asked)
         return;
@@ -377,6 +378,22 @@ void follow_rule(soap *ctx, const operation &op, reception &received)
                        : asked->status < INTERNAL_ERROR ? "Client"
                                                         : "Server",
                        asked->text.empty() ? "A rule asks for this answer." : asked->text);
+}
+
+// Answers with what is recorded for such a call.
+void replay(soap *ctx, const request &asked, reception &received)
+{
+    try {
+        const recorded_answer &answer = received.borrowed().shared.played.take(
+            received.target()->name, name_of(*asked.op), received.request_body());
+        received.replay(answer);
+        if (ctx->response_unfinished)
+            ctx->keep_alive = 0;
+        if (send_recorded(ctx, answer) != SOAP_OK)
+            answer_unsent(ctx);
+    } catch (const no_recording &none) {
+        refuse<protocol__Server_x002eProcessing>(ctx, none.what());
+    }
 }
 
 void receive_and_answer(soap *ctx, reception &received)
@@ -400,6 +417,10 @@ void receive_and_answer(soap *ctx, reception &received)
     received.enclosed().add_form(ctx->mode & MODE_MTOM);
     const request asked = read_request(ctx, *received.target());
     follow_rule(ctx, *asked.op, received);
+    if (received.borrowed().shared.played.is_on()) {
+        replay(ctx, asked, received);
+        return;
+    }
     const void *const response = run(ctx, asked, received);
     if (ctx->response_unfinished)
         ctx->keep_alive = 0; // bytes follow the request, which can't be distinguished from a next one
@@ -429,6 +450,7 @@ void serve(soap *ctx, reception &received)
 bool serve_exchange(soap *ctx, reception &received)
 {
     received.reset();
+    ctx->on_send_filter = nullptr;
     try {
         serve(ctx, received);
     } catch (const std::exception &failure) { // not even an answer could be made
@@ -436,6 +458,7 @@ bool serve_exchange(soap *ctx, reception &received)
         ctx->keep_alive = 0;
     }
     received.note_memory(ctx->memory_held);
+    received.record_exchange(ctx);
     received.note_exchange();
     received.borrowed().codec.reset();
     received.borrowed().judged.reset();

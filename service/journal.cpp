@@ -20,7 +20,8 @@ namespace service {
 namespace {
 
 constexpr std::size_t PATH_MAX_SHOWN = 200; // characters
-constexpr std::string_view SECRET_WORDS[] = {"password", "passwd", "passphrase", "secret", "token", "key"};
+constexpr std::string_view SECRET_WORDS[] = {"password", "passwd", "passphrase",    "secret",
+                                             "token",    "key",    "authorization", "cookie"};
 
 // A new handle to the file, or null with errno.
 std::FILE *open_log(const std::string &path)
@@ -42,19 +43,6 @@ void close_log(std::FILE *log)
         std::fclose(log);
 }
 
-std::string utc(std::chrono::system_clock::time_point moment)
-{
-    using namespace std::chrono;
-    const std::time_t seconds = system_clock::to_time_t(moment);
-    const auto thousandths = duration_cast<milliseconds>(moment.time_since_epoch()).count() % 1000;
-    std::tm parts{};
-    gmtime_r(&seconds, &parts);
-    char date[32], text[48];
-    std::strftime(date, sizeof date, "%Y-%m-%dT%H:%M:%S", &parts);
-    std::snprintf(text, sizeof text, "%s.%03dZ", date, static_cast<int>(thousandths));
-    return text;
-}
-
 double milliseconds_of(std::chrono::steady_clock::duration lasted)
 {
     return std::chrono::duration<double, std::milli>(lasted).count();
@@ -63,15 +51,6 @@ double milliseconds_of(std::chrono::steady_clock::duration lasted)
 const char *or_dash(const std::string &text)
 {
     return text.empty() ? "-" : text.c_str();
-}
-
-bool is_secret(std::string_view tag)
-{
-    std::string name(tag.substr(tag.find(':') + 1)); // all of it without a colon
-    std::transform(name.begin(), name.end(), name.begin(),
-                   [](unsigned char c) { return static_cast<char>(std::tolower(c)); });
-    return std::any_of(std::begin(SECRET_WORDS), std::end(SECRET_WORDS),
-                       [&](std::string_view word) { return name.find(word) != std::string::npos; });
 }
 
 } // namespace
@@ -107,7 +86,7 @@ void journal::log(const exchange_note &note)
 {
     if (log_ == nullptr)
         return;
-    std::fprintf(log_, "%s %s %s %s %d in=%llu out=%llu ms=%.3f\n", utc(note.begun).c_str(),
+    std::fprintf(log_, "%s %s %s %s %d in=%llu out=%llu ms=%.3f\n", time_text(note.begun).c_str(),
                  or_dash(note.peer), or_dash(note.method), or_dash(note.target), note.status,
                  static_cast<unsigned long long>(note.received), static_cast<unsigned long long>(note.sent),
                  milliseconds_of(note.lasted));
@@ -135,7 +114,7 @@ std::string journal::recent(std::uint64_t after) const
         if (++number <= after)
             continue;
         list.push_back({{"number", number},
-                        {"time", utc(note.begun)},
+                        {"time", time_text(note.begun)},
                         {"milliseconds", milliseconds_of(note.lasted)},
                         {"peer", note.peer},
                         {"method", note.method},
@@ -167,7 +146,30 @@ std::string loggable_path(std::string_view path)
     return path.size() > PATH_MAX_SHOWN ? result + "..." : result;
 }
 
-std::string without_secrets(std::string_view xml)
+std::string time_text(std::chrono::system_clock::time_point moment, int digits)
+{
+    using namespace std::chrono;
+    const std::time_t seconds = system_clock::to_time_t(moment);
+    const auto millionths = duration_cast<microseconds>(moment.time_since_epoch()).count() % 1000000;
+    std::tm parts{};
+    gmtime_r(&seconds, &parts);
+    char date[32], text[48];
+    std::strftime(date, sizeof date, "%Y-%m-%dT%H:%M:%S", &parts);
+    std::snprintf(text, sizeof text, "%s.%0*dZ", date, digits,
+                  static_cast<int>(digits == 6 ? millionths : millionths / 1000));
+    return text;
+}
+
+bool names_secret(std::string_view tag)
+{
+    std::string name(tag.substr(tag.find(':') + 1)); // all of it without a colon
+    std::transform(name.begin(), name.end(), name.begin(),
+                   [](unsigned char c) { return static_cast<char>(std::tolower(c)); });
+    return std::any_of(std::begin(SECRET_WORDS), std::end(SECRET_WORDS),
+                       [&](std::string_view word) { return name.find(word) != std::string::npos; });
+}
+
+std::string without_secrets(std::string_view xml, char filler)
 {
     std::string result;
     for (std::size_t at = 0; at < xml.size();) {
@@ -181,10 +183,12 @@ std::string without_secrets(std::string_view xml)
         at = end + 1;
         const std::string_view name =
             head.substr(1, std::min(head.find_first_of(" \t\r\n/>", 1), head.size()) - 1);
-        if (!name.empty() && !head.ends_with("/>") && is_secret(name)) {
-            at = std::min(xml.find("</", at), xml.size()); // all forms of text: references, CDATA
-            result.append("***");
-        }
+        if (name.empty() || head.ends_with("/>") || !names_secret(name))
+            continue;
+        // All forms of content: references, CDATA, elements.
+        const std::size_t next = std::min(xml.find(std::string("</").append(name), at), xml.size());
+        result.append(filler == '\0' ? "***" : std::string(next - at, filler));
+        at = next;
     }
     return result;
 }

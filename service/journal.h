@@ -62,7 +62,13 @@ private:
 // 200 characters are left out.
 std::string loggable_path(std::string_view path);
 
-// The text with "***" in the place of secrets.
-std::string without_secrets(std::string_view xml);
+// The text with "***" in the place of secrets; with `filler`, with this in the place of each of their bytes.
+std::string without_secrets(std::string_view xml, char filler = '\0');
+
+// Whether the value under such a name, of an element or a header, is a secret.
+bool names_secret(std::string_view name);
+
+// "2031-05-01T12:00:00.250Z", to the millisecond or, with 6 digits, the microsecond.
+std::string time_text(std::chrono::system_clock::time_point moment, int digits = 3);
 
 } // namespace service

@@ -67,6 +67,11 @@ void declare(CLI::App &app, options &o)
     app.add_option("--seed", s.seed,
                    "File of a request, or folder of such files, that a store without documents begins with")
         ->check(CLI::ExistingPath);
+    auto *const record =
+        app.add_option("--record", s.record, "File that takes each call and its answer, a line of JSON each");
+    app.add_option("--replay", s.replay, "Such a file: calls get the answers recorded there")
+        ->check(CLI::ExistingFile)
+        ->excludes(record);
     app.add_option("--trace", s.trace, "File that takes a copy of all bytes received and sent");
     app.add_option("--port-file", o.port_file, "File that takes the port once the service listens");
     app.add_flag("--json", o.json, "Print the addresses of the ports as one line of JSON, in place of words");
@@ -139,6 +144,23 @@ void settle_tls(options &o)
     }
     if (o.config.certificate.empty())
         throw std::invalid_argument("--tls needs --cert or --make-ca");
+}
+
+// What is recorded must not be mixed with what else is written.
+void check_record(const service::settings &s)
+{
+    namespace fs = std::filesystem;
+    const std::pair<const char *, const std::string &> others[] = {
+        {"--database", s.database}, {"--access-log", s.access_log}, {"--rules", s.rules},
+        {"--seed", s.seed},         {"--trace", s.trace},           {"--key", s.key},
+        {"--cert", s.certificate}};
+    for (const auto &[name, path] : others) {
+        std::error_code none; // of files that aren't there yet
+        if (!s.record.empty() && !path.empty() &&
+            (fs::equivalent(s.record, path, none) ||
+             fs::weakly_canonical(s.record, none) == fs::weakly_canonical(path, none)))
+            throw std::invalid_argument(std::string("--record and ") + name + " name the same file");
+    }
 }
 
 // A directory for the documents of one run.
@@ -240,6 +262,7 @@ int run(int argc, char **argv)
     split_accounts(o);
     split_basic(o);
     settle_tls(o);
+    check_record(o.config);
     service::the_catalogue(); // read now, while there is only one thread
     serve_until_signal(o);
     return 0;

@@ -40,6 +40,20 @@ void keep_some(std::string &text, const char *data, std::size_t length)
     }
 }
 
+// For a recording, which is incomplete with a body that is too large.
+void keep_all(recorded_exchange &exchange, std::string &body, const char *data, std::size_t length)
+{
+    try {
+        exchange.complete = exchange.complete && length <= RECORDED_MAX - body.size();
+        if (exchange.complete)
+            body.append(data, length);
+        else
+            body = {};
+    } catch (const std::bad_alloc &) {
+        exchange.complete = false;
+    }
+}
+
 // A request that should have no body is at its end. A body that it has all the same, or bytes after it,
 // would be taken for the next request.
 void end_without_body(soap *ctx)
@@ -76,6 +90,8 @@ reception::reception(soap *ctx, const settings &config, session &borrowed)
     ctx->on_head = ctx->on_options = option_or_head;
     ctx->on_put = refuse_method;
     ctx->on_delete = erase;
+    if (borrowed_.shared.recorded.is_on())
+        ctx->on_parse_header = keep_line;
     install_attachment_hooks(ctx);
 }
 
@@ -113,6 +129,8 @@ void reception::reset()
     where_ = {};
     distortion_ = {};
     note_ = {};
+    exchange_ = {};
+    played_type_ = nullptr;
     enclosures_.reset();
 }
 
@@ -165,8 +183,12 @@ int reception::send_head(soap *ctx, int status, std::uint64_t length)
     reception &self = of(ctx);
     const std::uint64_t error = static_cast<std::uint64_t>(self.distortion_.length_error);
     self.note_.answer.clear(); // an interim head
-    return http_write_response(ctx, self.distortion_.status == 0 ? status : self.distortion_.status,
-                               self.distortion_.length_error < 0 && length < -error ? 0 : length + error);
+    self.writes_head_ = true;
+    const int result =
+        http_write_response(ctx, self.distortion_.status == 0 ? status : self.distortion_.status,
+                            self.distortion_.length_error < 0 && length < -error ? 0 : length + error);
+    self.writes_head_ = false;
+    return result;
 }
 
 void reception::distort(soap *ctx, const rule &how)
@@ -184,9 +206,48 @@ void reception::distort(soap *ctx, const rule &how)
         ctx->keep_alive = 0; // the peer can't know where the next answer begins
 }
 
-void reception::note_operation(std::string_view name)
+// The request has been read, and its answer begins.
+void reception::note_operation(soap *ctx, std::string_view name)
 {
     note_.target.append("/").append(name);
+    if (ctx->content_length_given && ctx->zlib_in == 0 && ctx->content_length < exchange_.request.size())
+        exchange_.request.resize(
+            static_cast<std::size_t>(ctx->content_length)); // what follows belongs to nobody
+    if (!borrowed_.shared.recorded.is_on())
+        return;
+    exchange_.begun = note_.begun;
+    exchange_.port = target_->name;
+    exchange_.operation = name;
+    exchange_.start_line = note_.method + " " + loggable_path(where_.path) + " HTTP/1.1";
+    ctx->on_send_filter = keep_answer;
+}
+
+// Sees the answer before it is compressed and framed; its head is written after a body whose size has to be known.
+int reception::keep_answer(soap *ctx, const char **data, std::size_t *length)
+{
+    recorded_exchange &kept = of(ctx).exchange_;
+    if ((ctx->mode & MODE_COUNTING) == 0)
+        keep_all(kept, of(ctx).writes_head_ ? kept.answer_head : kept.answer, *data, *length);
+    return SOAP_OK;
+}
+
+int reception::keep_line(soap *ctx, const char *key, const char *value)
+{
+    recorded_exchange &kept = of(ctx).exchange_;
+    try {
+        kept.request_head.push_back(std::string(key) + ": " + (names_secret(key) ? "***" : value));
+    } catch (const std::bad_alloc &) {
+        kept.complete = false;
+    }
+    return http_parse_header(ctx, key, value);
+}
+
+void reception::record_exchange(const soap *ctx)
+{
+    const bool was_sent = ctx->error == SOAP_OK || ctx->error == SOAP_STOP;
+    if (was_sent && !exchange_.operation.empty())
+        borrowed_.shared.recorded.add(exchange_);
+    exchange_ = {}; // which may be large
 }
 
 void reception::note_exchange()
@@ -203,8 +264,11 @@ void reception::note_exchange()
 int reception::count_body(soap *ctx, const char *data, std::size_t length)
 {
     reception &self = of(ctx);
-    if (self.target_ != nullptr)
+    if (self.target_ != nullptr) {
         keep_some(self.note_.request, data, length);
+        if (self.borrowed_.shared.recorded.is_on() || self.borrowed_.shared.played.is_on())
+            keep_all(self.exchange_, self.exchange_.request, data, length);
+    }
     self.body_bytes_ += length;
     if (!self.data_name().empty())
         self.deadline_ += ATTACHED_BYTE_TIME * static_cast<long>(length);
@@ -295,6 +359,8 @@ int reception::write_line(soap *ctx, const char *key, const char *value)
         return ctx->error;
     if (end && ctx->status == METHOD_NOT_ALLOWED && http_write_line(ctx, "Allow", "POST"))
         return ctx->error;
+    if (!end && of(ctx).played_type_ != nullptr && std::string_view(key) == "Content-Type")
+        value = of(ctx).played_type_;
     return http_write_line(ctx, key, value);
 }
 

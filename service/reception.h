@@ -50,8 +50,14 @@ public:
     bool at_reset() const { return where_.path == RESET_PATH; }
 
     // Notes which operation the request is for, and writes the finished exchange in the journal.
-    void note_operation(std::string_view name);
+    void note_operation(soap *ctx, std::string_view name);
     void note_exchange();
+
+    // For --record and --replay. The whole body of a call's request, framing and compression undone; what the answer
+    // is to say of its type; and the finished exchange, written to the file.
+    const std::string &request_body() const { return exchange_.request; }
+    void replay(const recorded_answer &answer) { played_type_ = answer.type.c_str(); }
+    void record_exchange(const soap *ctx);
 
     // What the exchange held in its context, and the documents that were read for it.
     void note_memory(std::int64_t bytes)
@@ -79,6 +85,8 @@ private:
     static reception &of(soap *ctx) { return *static_cast<reception *>(ctx->user); }
     static int read_head(soap *ctx);
     static int send(soap *ctx, const char *data, std::size_t length);
+    static int keep_answer(soap *ctx, const char **data, std::size_t *length);
+    static int keep_line(soap *ctx, const char *key, const char *value);
     static int send_head(soap *ctx, int status, std::uint64_t length);
     static int count_body(soap *ctx, const char *data, std::size_t length);
     static std::size_t receive(soap *ctx, char *buffer, std::size_t length);
@@ -100,6 +108,9 @@ private:
     const peer_address peer_;
     rule distortion_;
     exchange_note note_;
+    recorded_exchange exchange_; // filled if exchanges are recorded or replayed
+    bool writes_head_ = false;
+    const char *played_type_ = nullptr; // Content-Type of a recorded answer
     std::chrono::steady_clock::time_point begun_;
     enclosures enclosures_;
 };

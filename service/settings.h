@@ -29,6 +29,8 @@ struct settings {
     std::string rules;      // file of rules that hold from the start (rules.h); empty: none
     bool control = false;   // rules are taken from clients on this machine too
     std::string seed;       // file or folder of requests that the store begins with (seed.h); empty: none
+    std::string record;     // file that takes all calls (recording.h); empty: none
+    std::string replay;     // such a file, whose answers calls get in place of being carried out; empty: none
     std::string trace;      // file that takes a copy of all bytes; empty: none
     std::uint64_t body_limit = 64ULL << 20; // bytes of a request, framing and compression undone; 413 beyond
     std::uint64_t attachment_limit =

@@ -5,6 +5,7 @@
 #include <shared_mutex>
 
 #include "journal.h"
+#include "recording.h"
 #include "rules.h"
 #include "settings.h"
 
@@ -30,9 +31,13 @@ private:
 };
 
 struct shared_state {
-    explicit shared_state(const settings &config) : notes(config.access_log) {}
+    explicit shared_state(const settings &config)
+        : notes(config.access_log), recorded(config.record), played(config.replay)
+    {}
     journal notes;
     rule_book rules;
+    recorder recorded;
+    recording played;
     reset_gate gate;
 };
 

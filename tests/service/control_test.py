@@ -1,10 +1,13 @@
 #!/usr/bin/python3
 """What serves developers: faults and delays on request, the access log, the last exchanges and the page that shows them."""
+import base64
+import concurrent.futures
 import gzip
 import json
 import os
 import pathlib
 import re
+import resource
 import signal
 import ssl
 import subprocess
@@ -149,8 +152,96 @@ class control(unittest.TestCase):
                 run = subprocess.run([zuv.SERVICE, "--port", "0", "--seed", folder], capture_output=True, text=True, timeout=60)
                 self.assertEqual((run.returncode, "bob.xml: " in run.stderr, wrong in run.stderr), (1, True, True), run)
 
+    def test_recorded_calls_are_answered_again(self):
+        data = bytes(range(256)) * 500
+        secret = "<c:credentials><c:password>sesame</c:password><c:token>a&lt;sesame</c:token></c:credentials>"
+        attached = ('--edge\r\nContent-Type: text/xml\r\n\r\n%s\r\n--edge\r\nContent-ID: <x>\r\n\r\n' % envelope("ProblemReport", request(
+            "submit", "<c:attachment><c:dataHandler>cid:x</c:dataHandler></c:attachment>"))).encode() + data + b"\r\n--edge--"
+        mime = "multipart/related; boundary=edge"
+        with tempfile.TemporaryDirectory() as folder:
+            file = os.path.join(folder, "calls")
+            with zuv.service("--record", file, "--control") as address:
+                sent = [post("Profile", envelope("Profile", request("create", secret)), "Authorization: Basic c2VzYW1l"), GET,
+                        post("ProblemReport", attached, kind=mime)]
+                sent += [CREATE, CREATE]
+                rules(address, *[{"port": "Profile", "operation": "get"}, {"operation": "submit"}, {"operation": "create", "times": 2},
+                                 {"operation": "create", "gzip": True, "chunked": True}])
+                given = [exchange(address, one) for one in sent]
+                report = given[2].first("thisURI")
+                sent.append(post("ProblemReport", b"--edge\r\nContent-Type: text/xml\r\n\r\n%s\r\n--edge--" % envelope(
+                    "ProblemReport", request("get"), target(report)).encode(), kind=mime))
+                given.append(exchange(address, sent[5]))
+                given[4].body = gzip.decompress(given[4].body)
+                self.assertIn(data, given[5])
+
+                def many(_):
+                    with Connection(address) as peer:
+                        return [peer.send(GET).receive().status for _ in range(20)]
+                with concurrent.futures.ThreadPoolExecutor(8) as threads:
+                    self.assertEqual(sum(threads.map(many, range(8)), []), 160 * [500])
+            lines = pathlib.Path(file).read_text().splitlines()
+            lines.sort()  # the first member is the time
+            kept = [json.loads(line) for line in lines]
+            self.assertEqual((len(kept), os.stat(file).st_mode & 0o777), (166, 0o600))
+            self.assertEqual([(one["port"] + "/" + one["operation"], one["response"]["status"]) for one in kept[:7]], [
+                ("Profile/create", 200), ("Profile/get", 500), ("ProblemReport/submit", 200), ("Profile/create", 200),
+                ("Profile/create", 200), ("ProblemReport/get", 200), ("Profile/get", 500)])
+            self.assertTrue(data in base64.b64decode(kept[2]["request"]["body_base64"]) and "Authorization: ***" in kept[0]["request"]["head"])
+            self.assertFalse(re.search("sesame|c2VzYW1l", str(lines)))
+            pathlib.Path(file).write_text("\n".join(lines[5::-1]) + "\n")
+            with zuv.service("--replay", file, "--control", "--chunked") as address:
+                for _ in range(2):
+                    for place in 3, 0, 5, 1, 4, 2:
+                        answer = exchange(address, sent[place])
+                        expected = given[place].body.replace(b"a&lt;sesame", 11 * b"X").replace(b"sesame", b"XXXXXX")
+                        self.assertEqual((answer.status, answer.body, "chunked" in answer), (given[place].status, expected, True), place)
+                    self.assertIn("Nothing is recorded of Profile/remove; what is: ProblemReport/get (1), ProblemReport/submit (1), "
+                                  "Profile/create (3), Profile/get (1).", call(address, "Profile", "remove"))
+                    self.assertIn("The 3 recorded of Profile/create have been answered", exchange(address, CREATE))
+                    self.assertEqual(ask(address, "POST", CONTROL + "/reset", "{}", "Content-Type: application/json").status, 200)
+
+    def test_what_is_no_recording_is_refused_at_the_start(self):
+        good = {"time": "t", "port": "p", "operation": "o", "request": {"body": ""}, "response": {"status": 200, "head": ["content-type: x"], "body": ""}}
+        line = json.dumps(good)
+        with tempfile.TemporaryDirectory() as folder:
+            file = os.path.join(folder, "calls")
+            rows = [(line + "\n" + text, "--replay", "line 2: " + words) for text, words in (
+                (line[:-9], "not well-formed"), ("\n", "not well-formed"), ("\0\xff", "not well-formed"), (100000 * "[", "no exchange"),
+                ("3", "no exchange"), (line.replace('"p"', "7"), "no exchange"), (line.replace("200", "199"), "the status"),
+                (line.replace("200", "1e2"), "no exchange"), (line.replace("content", "x"), "the head"),
+                (line.replace('body": ""}}', 'body_base64": "x-"}}'), '"body_base64"'))]
+            for text, option, words in rows + [("", "--replay", "no exchange"), (line, "--record", "cut short"), (None, "--record", "directory")]:
+                if text is None:
+                    file = folder
+                else:
+                    pathlib.Path(file).write_text(text, encoding="latin-1")
+                run = subprocess.run([zuv.SERVICE, "--port", "0", option, file], capture_output=True, text=True, timeout=60)
+                self.assertEqual((run.returncode, "recording %s: " % file in run.stderr, words in run.stderr), (1, True, True), (text, run))
+            one = os.path.join(folder, "one")
+            run = subprocess.run([zuv.SERVICE, "--port", "0", "--record", one, "--trace", folder + "/./one"], capture_output=True, text=True)
+            self.assertEqual((run.returncode, os.path.exists(one)), (1, False), run)
+
+    def test_calls_that_a_full_disk_leaves_out_are_reported_once(self):
+        with tempfile.TemporaryDirectory() as folder, tempfile.TemporaryFile("w+") as log:
+            file = os.path.join(folder, "calls")
+            with zuv.service("--record", file, stderr=log) as address:
+                exchange(address, GET)
+                while not os.stat(file).st_size:
+                    pass  # it is recorded after its answer
+                limit = os.stat(file).st_size + 100
+                resource.prlimit(address.process.pid, resource.RLIMIT_FSIZE, (limit, resource.RLIM_INFINITY))
+                self.assertEqual([exchange(address, GET).status for _ in range(3)], 3 * [500])
+                with Connection(address) as peer:  # its second answer comes once the first call is recorded, or not
+                    peer.send(GET).receive()
+                    peer.send(GET).receive()
+                    resource.prlimit(address.process.pid, resource.RLIMIT_FSIZE, 2 * (resource.RLIM_INFINITY,))
+                    self.assertIn("ObjectNotFound", peer.send(GET).receive())
+            log.seek(0)
+            self.assertEqual(log.read(), "zuv-service: recording %s: File too large; exchanges are missing from here on\n" % file)
+            self.assertGreaterEqual(len([json.loads(line) for line in pathlib.Path(file).read_text().splitlines()]), 2)
+
     def test_exchanges_are_logged_and_shown_without_secrets(self):
-        secret = ("<c:credentials><c:username>ada</c:username><c:password>sesame</c:password><c:token><![CDATA[sesame]]></c:token>"
+        secret = ("<c:credentials><c:username>ada</c:username><c:password>sesame</c:password><c:token><![CDATA[a</b>sesame]]></c:token>"
                   "</c:credentials><profileAuthority>&lt;script></profileAuthority>")
         with tempfile.TemporaryDirectory() as folder:
             log = os.path.join(folder, "access")
