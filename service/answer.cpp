@@ -104,6 +104,8 @@ int send_response(soap *ctx, const operation &op, const void *response, enclosur
 
 int send_recorded(soap *ctx, const recorded_answer &answer)
 {
+    if (answer.body.empty()) // no chunk can hold that
+        ctx->output_mode = (ctx->output_mode & ~MODE_IO_MASK) | MODE_BUFFERED;
     return send_message(ctx, answer.status, {nullptr, nullptr, nullptr, &answer.body}, nullptr);
 }
 

@@ -210,9 +210,6 @@ void reception::distort(soap *ctx, const rule &how)
 void reception::note_operation(soap *ctx, std::string_view name)
 {
     note_.target.append("/").append(name);
-    if (ctx->content_length_given && ctx->zlib_in == 0 && ctx->content_length < exchange_.request.size())
-        exchange_.request.resize(
-            static_cast<std::size_t>(ctx->content_length)); // what follows belongs to nobody
     if (!borrowed_.shared.recorded.is_on())
         return;
     exchange_.begun = note_.begun;
@@ -261,13 +258,24 @@ void reception::note_exchange()
     borrowed_.shared.notes.add(std::move(note_));
 }
 
+// Without what follows a body whose length is known, and belongs to nobody.
+std::size_t reception::length_in_body(const soap *ctx, std::size_t length) const
+{
+    const bool chunked = (ctx->mode & MODE_IO_MASK) == MODE_CHUNKED;
+    if (!ctx->content_length_given || chunked || ctx->zlib_in != 0)
+        return length;
+    const std::uint64_t kept = exchange_.request.size();
+    return static_cast<std::size_t>(
+        std::min<std::uint64_t>(length, ctx->content_length - std::min(ctx->content_length, kept)));
+}
+
 int reception::count_body(soap *ctx, const char *data, std::size_t length)
 {
     reception &self = of(ctx);
     if (self.target_ != nullptr) {
         keep_some(self.note_.request, data, length);
         if (self.borrowed_.shared.recorded.is_on() || self.borrowed_.shared.played.is_on())
-            keep_all(self.exchange_, self.exchange_.request, data, length);
+            keep_all(self.exchange_, self.exchange_.request, data, self.length_in_body(ctx, length));
     }
     self.body_bytes_ += length;
     if (!self.data_name().empty())

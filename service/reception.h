@@ -88,6 +88,7 @@ private:
     static int keep_answer(soap *ctx, const char **data, std::size_t *length);
     static int keep_line(soap *ctx, const char *key, const char *value);
     static int send_head(soap *ctx, int status, std::uint64_t length);
+    std::size_t length_in_body(const soap *ctx, std::size_t length) const;
     static int count_body(soap *ctx, const char *data, std::size_t length);
     static std::size_t receive(soap *ctx, char *buffer, std::size_t length);
     static int write_line(soap *ctx, const char *key, const char *value);

@@ -163,7 +163,8 @@ class control(unittest.TestCase):
             with zuv.service("--record", file, "--control") as address:
                 sent = [post("Profile", envelope("Profile", request("create", secret)), "Authorization: Basic c2VzYW1l"), GET,
                         post("ProblemReport", attached, kind=mime)]
-                sent += [CREATE, CREATE]
+                body = CREATE.partition(b"\r\n\r\n")[2]
+                sent += [post("Profile", gzip.compress(body), "Content-Encoding: gzip"), CREATE + b"x"]
                 rules(address, *[{"port": "Profile", "operation": "get"}, {"operation": "submit"}, {"operation": "create", "times": 2},
                                  {"operation": "create", "gzip": True, "chunked": True}])
                 given = [exchange(address, one) for one in sent]
@@ -187,6 +188,7 @@ class control(unittest.TestCase):
                 ("Profile/create", 200), ("Profile/get", 500), ("ProblemReport/submit", 200), ("Profile/create", 200),
                 ("Profile/create", 200), ("ProblemReport/get", 200), ("Profile/get", 500)])
             self.assertTrue(data in base64.b64decode(kept[2]["request"]["body_base64"]) and "Authorization: ***" in kept[0]["request"]["head"])
+            self.assertEqual([one["request"]["body"] for one in kept[3:5]], 2 * [body.decode()])
             self.assertFalse(re.search("sesame|c2VzYW1l", str(lines)))
             pathlib.Path(file).write_text("\n".join(lines[5::-1]) + "\n")
             with zuv.service("--replay", file, "--control", "--chunked") as address:
