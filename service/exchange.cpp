@@ -79,6 +79,8 @@ void read_header_strictly(soap *ctx)
     const bool has_content = ctx->has_body != 0;
     ctx->message_part = PART_HEADER;
     soap_header_record(ctx);
+    if (ctx->header == nullptr)
+        throw std::bad_alloc();
     while (has_content && ctx->error == SOAP_OK && soap_element_head_read(ctx) == SOAP_OK) {
         const bool known = soap_tag_compare(ctx, ctx->tag, "protocol:header") == SOAP_OK;
         if (known ? ctx->header->header != nullptr : is_misplaced_header(ctx))

@@ -220,6 +220,7 @@ void reception::note_operation(soap *ctx, std::string_view name)
 }
 
 // Sees the answer before it is compressed and framed; its head is written after a body whose size has to be known.
+// NOLINTNEXTLINE(readability-non-const-parameter): the callback's type
 int reception::keep_answer(soap *ctx, const char **data, std::size_t *length)
 {
     recorded_exchange &kept = of(ctx).exchange_;

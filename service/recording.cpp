@@ -32,8 +32,8 @@ using json = nlohmann::ordered_json;
 
 constexpr std::string_view TYPE_HEADER = "Content-Type:";
 constexpr std::size_t LISTED_MAX = 20; // operations that a fault lists
-constexpr int STATUS_OK = 200, STATUS_MIN = 400, STATUS_MAX = 599,
-              DEPTH_MAX = 8; // of JSON values within each other
+constexpr int DEPTH_MAX = 8;           // of JSON values within each other
+constexpr int STATUS_OK = 200, STATUS_MIN = 400, STATUS_MAX = 599;
 
 [[noreturn]] void fail(const std::string &path, const std::string &why)
 {

@@ -26,6 +26,11 @@ namespace {
 
 constexpr std::uint32_t SEED_MODE = MODE_BARE_XML | MODE_BUFFERED | MODE_UTF_STRINGS | MODE_STRICT;
 
+[[noreturn]] void fail(const std::string &path, const std::string &why)
+{
+    throw std::runtime_error("seed " + path + ": " + why);
+}
+
 std::vector<std::string> seed_files(const std::string &place)
 {
     if (!std::filesystem::is_directory(place))
@@ -35,7 +40,7 @@ std::vector<std::string> seed_files(const std::string &place)
         if (entry.path().extension() == ".xml")
             files.push_back(entry.path());
     if (files.empty())
-        throw std::runtime_error("seed " + place + ": the folder holds no .xml file");
+        fail(place, "the folder holds no .xml file");
     std::sort(files.begin(), files.end());
     return files;
 }
@@ -128,7 +133,7 @@ std::size_t seed_store(session &borrowed, const settings &config)
         if (wrong.empty())
             continue;
         empty_store(borrowed);
-        throw std::runtime_error("seed " + file + ": " + wrong);
+        fail(file, wrong);
     }
     return files.size();
 }
