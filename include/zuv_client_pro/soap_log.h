@@ -9,8 +9,8 @@
 constexpr std::size_t SOAP_LOG_PATH_SIZE = 4096; // bytes of g_TraceLogFile, terminator included
 constexpr int SOAP_LOG_RECEIVED = 0;             // received bytes
 constexpr int SOAP_LOG_SENT = 1;                 // sent bytes
-constexpr int SOAP_LOG_THIRD = 2; // times of the bytes in the other two; without a path at first
-constexpr int SOAP_LOG_TIMES = SOAP_LOG_THIRD;
+constexpr int SOAP_LOG_THIRD = 2;              // times of the bytes in the other two; without a path at first
+constexpr int SOAP_LOG_TIMES = SOAP_LOG_THIRD; // the same, by what it takes
 
 // Path of the trace of contexts made from now on, relative to the working directory; "wsTrace.log" at first.
 // The host program may overwrite it, up to 4096 bytes; the empty text means no trace. Contexts keep the path
