@@ -1,6 +1,7 @@
 // mapped_file.cpp - see mapped_file.h.
 #include "mapped_file.h"
 
+#include <cerrno>
 #include <csignal>
 #include <cstdio>
 
@@ -57,6 +58,10 @@ mapped_file::mapped_file(const std::string &path)
         is_regular(file, status);
     }
     size_ = static_cast<std::size_t>(status.st_size);
+    if (static_cast<off_t>(size_) != status.st_size) { // more than addresses reach
+        errno = EFBIG;
+        fail_file(path, "can't be read");
+    }
     if (size_ == 0)
         return;
     void *const mapped = mmap(nullptr, size_, PROT_READ, MAP_PRIVATE, fileno(file), 0);
