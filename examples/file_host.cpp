@@ -10,6 +10,7 @@
 // Who owns what: the host its files, whose addresses are the handles of the attachments; the library hands
 // them to the callbacks. What came with an answer, and the answer, are the proxy's until `destroy`.
 #include <chrono>
+#include <cstdint>
 #include <cstdio>
 #include <cstring>
 #include <memory>
@@ -56,16 +57,16 @@ long memory_kb(const char *name)
 // How far a transfer has come, on one line of the terminal, and its pace at the end.
 class progress {
 public:
-    progress(const char *verb, std::size_t total) : verb_(verb), total_(total) {}
+    progress(const char *verb, std::uint64_t total) : verb_(verb), total_(total) {}
 
     void advance(std::size_t bytes)
     {
         done_ += bytes;
-        const std::size_t percent = total_ == 0 ? 100 : done_ * 100 / total_;
+        const std::uint64_t percent = total_ == 0 ? 100 : done_ * 100 / total_;
         if (percent == shown_ || !isatty(STDOUT_FILENO))
             return;
         shown_ = percent;
-        std::printf("\r    %-9s %3zu %%", verb_, percent);
+        std::printf("\r    %-9s %3ju %%", verb_, percent);
         std::fflush(stdout);
     }
 
@@ -73,13 +74,13 @@ public:
     {
         const std::chrono::duration<double> time = std::chrono::steady_clock::now() - start_;
         const double megabytes = static_cast<double>(done_) / MEGABYTE;
-        std::printf("%s    %-9s %zu bytes in %.3f s, %.0f MB/s\n", isatty(STDOUT_FILENO) ? "\r" : "", verb_,
+        std::printf("%s    %-9s %ju bytes in %.3f s, %.0f MB/s\n", isatty(STDOUT_FILENO) ? "\r" : "", verb_,
                     done_, time.count(), megabytes / time.count());
     }
 
 private:
     const char *verb_;
-    std::size_t total_, done_ = 0, shown_ = 101;
+    std::uint64_t total_, done_ = 0, shown_ = 101;
     std::chrono::steady_clock::time_point start_ = std::chrono::steady_clock::now();
 };
 
@@ -87,7 +88,7 @@ private:
 // Files, and the callbacks that read and write them. DIME and MIME ask for the same.
 
 struct transfer {
-    transfer(const char *path, const char *how, const char *verb, std::size_t size)
+    transfer(const char *path, const char *how, const char *verb, std::uint64_t size)
         : file(std::fopen(path, how), std::fclose), shown(verb, size)
     {
         if (!file)
@@ -169,10 +170,10 @@ struct form {
 
     // The XML refers to it by the id "cid:file". A stream of length 0 is one of unknown length, so an empty
     // file goes without one.
-    void attach(soap *ctx, transfer &source, std::size_t file_size) const
+    void attach(soap *ctx, transfer &source, std::uint64_t file_size) const
     {
         char *const handle = file_size == 0 ? nullptr : reinterpret_cast<char *>(&source);
-        const std::size_t size = chunked ? 0 : file_size;
+        const std::uint64_t size = chunked ? 0 : file_size;
         const int error =
             dime ? soap_dime_attach(ctx, handle, size, MEDIA_TYPE, "file", 0, nullptr)
                  : soap_mime_attach(ctx, handle, size, MIME_BINARY, MEDIA_TYPE, "<file>", nullptr, nullptr);
@@ -198,7 +199,7 @@ public:
         header_.targetURI = &document_;
     }
 
-    void hand_in(const char *path, std::size_t size)
+    void hand_in(const char *path, std::uint64_t size)
     {
         std::string reference = "cid:file", size_text = std::to_string(size);
         protocol__Attachment attachment;
@@ -218,7 +219,7 @@ public:
         proxy_.destroy();
     }
 
-    void fetch(const char *path, std::size_t size)
+    void fetch(const char *path, std::uint64_t size)
     {
         transfer target(path, "wb", "received", size);
         host_.expected = &target;
@@ -274,17 +275,17 @@ private:
     std::string document_;
 };
 
-std::size_t size_of(const char *path)
+std::uint64_t size_of(const char *path)
 {
     struct stat about = {};
     if (stat(path, &about) != 0 || !S_ISREG(about.st_mode))
         throw std::runtime_error(std::string("not a file: ") + path);
-    return static_cast<std::size_t>(about.st_size);
+    return static_cast<std::uint64_t>(about.st_size);
 }
 
 void keep_and_fetch(const std::string &service, const form &f, const char *path, const char *copy)
 {
-    const std::size_t size = size_of(path);
+    const std::uint64_t size = size_of(path);
     file_keeper keeper(service, f);
     const long idle = memory_kb("VmRSS");
     keeper.hand_in(path, size);

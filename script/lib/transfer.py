@@ -38,8 +38,9 @@ def memory_kb(process, what):
 
 
 @contextlib.contextmanager
-def service(program, folder):
-    process = subprocess.Popen([program, "--port", "0", "--database", os.path.join(folder, "documents.db")],
+def service(program, folder, size):
+    process = subprocess.Popen([program, "--port", "0", "--database", os.path.join(folder, "documents.db"),
+                                "--max-attachments", str(size)],
                                stdout=subprocess.PIPE, text=True)
     try:
         yield process, process.stdout.readline().rpartition(" ")[2].strip()
@@ -96,7 +97,7 @@ def data_port(zuv, url):
 
 
 def main(size, file_host, service_program, zuv):
-    with tempfile.TemporaryDirectory() as folder, service(service_program, folder) as (process, url):
+    with tempfile.TemporaryDirectory() as folder, service(service_program, folder, size) as (process, url):
         source = os.path.join(folder, "source")
         make_file(source, int(size))
         transfers = Transfers(folder, int(size), source)
