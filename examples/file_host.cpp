@@ -10,6 +10,7 @@
 // Who owns what: the host its files, whose addresses are the handles of the attachments; the library hands
 // them to the callbacks. What came with an answer, and the answer, are the proxy's until `destroy`.
 #include <chrono>
+#include <cinttypes>
 #include <cstdint>
 #include <cstdio>
 #include <cstring>
@@ -66,7 +67,7 @@ public:
         if (percent == shown_ || !isatty(STDOUT_FILENO))
             return;
         shown_ = percent;
-        std::printf("\r    %-9s %3ju %%", verb_, percent);
+        std::printf("\r    %-9s %3" PRIu64 " %%", verb_, percent);
         std::fflush(stdout);
     }
 
@@ -74,8 +75,8 @@ public:
     {
         const std::chrono::duration<double> time = std::chrono::steady_clock::now() - start_;
         const double megabytes = static_cast<double>(done_) / MEGABYTE;
-        std::printf("%s    %-9s %ju bytes in %.3f s, %.0f MB/s\n", isatty(STDOUT_FILENO) ? "\r" : "", verb_,
-                    done_, time.count(), megabytes / time.count());
+        std::printf("%s    %-9s %" PRIu64 " bytes in %.3f s, %.0f MB/s\n", isatty(STDOUT_FILENO) ? "\r" : "",
+                    verb_, done_, time.count(), megabytes / time.count());
     }
 
 private:

@@ -64,10 +64,11 @@ std::string without_secrets_of_message(std::string_view body)
 
 void put_body(json &target, const std::string &body)
 {
-    std::string masked = without_secrets_of_message(body);
+    const std::string masked = without_secrets_of_message(body);
+    json text = masked;
     try {
-        json(masked).dump(); // which refuses what isn't UTF-8
-        target["body"] = std::move(masked);
+        text.dump(); // which refuses what isn't UTF-8
+        target["body"] = std::move(text);
     } catch (const json::type_error &) {
         target["body_base64"] = base64_of(masked);
     }

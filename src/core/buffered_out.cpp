@@ -167,7 +167,8 @@ int output_close(soap *ctx)
         return ctx->error;
     if ((ctx->mode & MODE_DEFLATE) != 0 && soap_deflate_finish(ctx) != SOAP_OK)
         return ctx->error;
-    return io_bits(ctx->mode) == MODE_CHUNKED ? transmit(ctx, LAST_CHUNK, sizeof LAST_CHUNK - 1) : SOAP_OK;
+    const std::string_view end = io_bits(ctx->mode) == MODE_CHUNKED ? chunks_end(ctx) : "";
+    return end.empty() ? SOAP_OK : transmit(ctx, end.data(), end.size());
 }
 
 int output_send_stored(soap *ctx)

@@ -188,6 +188,9 @@ TEST(buffered_out, the_buffer_leaves_when_it_is_exactly_full_and_chunks_close_ea
                                    : "10000\r\n" + body.substr(0, SOAP_BUFFER_SIZE) + "\r\nA\r\n" +
                                          body.substr(SOAP_BUFFER_SIZE) + "\r\n0\r\n\r\n");
     }
+    memory_wire none(0, MODE_CHUNKED);
+    ASSERT_EQ(soap_send_begin(&none) + soap_send_finish(&none), 0);
+    EXPECT_EQ(none.sent(), "0\r\n\r\n");
 }
 
 // Streams with a dictionary come back in framing_test.cpp.
