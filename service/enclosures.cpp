@@ -145,7 +145,7 @@ void enclosures::end_decoding(soap *ctx, arriving_part &part)
     attachment.encoding = MIME_BINARY;
     if (part.file) {
         part.file->write(part.memory.data(), part.memory.size());
-        attachment.size = static_cast<std::size_t>(part.file->size());
+        attachment.size = part.file->size();
         return;
     }
     attachment.size = part.memory.size();
@@ -213,7 +213,7 @@ std::size_t enclosures::read(void *handle, char *buffer, std::size_t length)
 int enclosures::attach_all(soap *ctx)
 {
     for (outgoing &o : outgoing_) {
-        const auto size = static_cast<std::size_t>(o.file.size());
+        const std::uint64_t size = o.file.size();
         char *const handle =
             size == 0 ? nullptr : reinterpret_cast<char *>(&o.file); // 0 is an unknown length
         const int result = (form_ & MODE_MIME) != 0
