@@ -1,5 +1,5 @@
 #!/usr/bin/python3
-"""Pictures for the documentation: the page of a trace of some calls to the reference service.
+"""Pictures for the documentation: some calls to the reference service, on its own page and on that of their trace.
 
 Usage: screenshots.py FOLDER; programs come from the environment as for the tests.
 """
@@ -18,22 +18,22 @@ PROFILE = """<p:ProfileContent xmlns:p="%s" xmlns:c="%s"><c:identity><c:type>org
 CREDENTIALS = '<c:Credentials xmlns:c="%s"><c:username>ada</c:username><c:password>x</c:password></c:Credentials>' % zuv.COMMON
 
 
-def make_trace(folder, log):
+def make_calls(folder, log, address):
     credentials = os.path.join(folder, "credentials.xml")
     with open(credentials, "w") as file:
         file.write(CREDENTIALS)
-    with zuv.service() as address:
-        def call(*arguments, **more):
-            return zuv.run(*arguments, "-e", address, "--trace", log, **more).stdout
-        created = call("profile", "create", "-", "--credentials", credentials, given=PROFILE)
-        uri = re.search("urn:[^<]*", created)[0]
-        call("profile", "get", "--soap12", "-t", uri)
-        call("profile", "set", "-", "-t", uri, "--gzip", "--chunked", given=PROFILE)
-        call("updateorder", "submit")
-        call("statusreport", "create")
-        call("problemreport", "submit")
-        call("profile", "get", "-t", "urn:zuv:profile:unknown")
-        zuv.run("profile", "get", "-e", address + "/elsewhere", "--trace", log)
+
+    def call(*arguments, **more):
+        return zuv.run(*arguments, "-e", address, "--trace", log, "--trace-times", **more).stdout
+    created = call("profile", "create", "-", "--credentials", credentials, given=PROFILE)
+    uri = re.search("urn:[^<]*", created)[0]
+    call("profile", "get", "--soap12", "-t", uri)
+    call("profile", "set", "-", "-t", uri, "--gzip", "--chunked", given=PROFILE)
+    call("updateorder", "submit")
+    call("statusreport", "create")
+    call("problemreport", "submit")
+    call("profile", "get", "-t", "urn:zuv:profile:unknown")
+    zuv.run("profile", "get", "-e", address + "/elsewhere", "--trace", log, "--trace-times")
 
 
 def main():
@@ -43,7 +43,9 @@ def main():
     os.makedirs(target, exist_ok=True)
     with tempfile.TemporaryDirectory() as folder:
         log, page = os.path.join(folder, "wsTrace.log"), os.path.join(folder, "trace.html")
-        make_trace(folder, log)
+        with zuv.service("--control") as address:
+            make_calls(folder, log, address)
+            browser.screenshot(address + "/#open", os.path.join(target, "service.png"), (1240, 1200), "--virtual-time-budget=3000")
         zuv.run("trace", log, "--html", page)
         browser.screenshot(page, os.path.join(target, "trace.png"), (1240, 620))
         with open(page) as file:
@@ -51,7 +53,7 @@ def main():
         with open(page, "w") as file:
             file.write(text.replace('<details class="exchange">', '<details class="exchange" open>', 1))
         browser.screenshot(page, os.path.join(target, "trace-open.png"), (1240, 1250))
-    print("\n".join(os.path.join(target, name) for name in ("trace.png", "trace-open.png")))
+    print("\n".join(os.path.join(target, name) for name in ("service.png", "trace.png", "trace-open.png")))
 
 
 if __name__ == "__main__":

@@ -27,8 +27,8 @@ def dom(page, *options):
     return _run(page, "--dump-dom", *options)
 
 
-def screenshot(page, picture, size=(1240, 1000)):
-    _run(page, "--window-size=%d,%d" % size, "--screenshot=" + os.path.abspath(picture))
+def screenshot(page, picture, size=(1240, 1000), *options):
+    _run(page, *options, "--window-size=%d,%d" % size, "--screenshot=" + os.path.abspath(picture))
 
 
 WIDTHS = (360, 768, 1400)  # a telephone's, a tablet's, a screen's

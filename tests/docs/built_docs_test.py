@@ -15,7 +15,7 @@ import sys
 import tempfile
 import zlib
 
-PICTURES = {"trace.png", "trace-open.png"}
+PICTURES = {"service.png", "trace.png", "trace-open.png"}
 # Of the page of a class: a member as it is declared, and words of what is said there of it or of its arguments.
 MEMBERS = {
     "classProfileSoapBindingProxy.html": [

@@ -285,7 +285,13 @@ class control(unittest.TestCase):
                 "create", "<profileAuthority>%s</profileAuthority>" % hostile))))
             recent(address, 1)
             shown = browser.dom(address + "/#open", "--virtual-time-budget=3000")
-        self.assertRegex(shown, r"<summary[^>]*>[^<]*POST Profile/create 200")
+            with tempfile.NamedTemporaryFile(suffix=".html") as page, urllib.request.urlopen(address) as answer:
+                page.write(answer.read())
+                page.flush()
+                for dark in (True, False):
+                    for width, needed, *_ in browser.measured(page.name, dark):
+                        self.assertLessEqual(needed, width)
+        self.assertRegex(shown, r">200</span><span[^>]*>POST Profile/create</span>")
         self.assertIn("&lt;profileAuthority&gt;" + hostile.replace("&", "&amp;").replace(">", "&gt;"), shown)
         self.assertIn("1 exchanges so far", shown)
 
