@@ -3,8 +3,9 @@
 in the first file of a process and then finds faults in the next that aren't there.
 
 Usage: tidy.py JOBS < UNITS, in the source tree; by build/release/compile_commands.json, which leaves out units that it doesn't name.
-A unit that passed isn't looked at again while it, what it includes, the checks and clang-tidy stay as they were: build/tidy holds
-an empty file for each that passed. Exit status 1: something was found.
+A unit that passed isn't looked at again while it, what it includes, its compilation, the checks and clang-tidy stay as they were,
+wherever the tree is: the user's cache (XDG_CACHE_HOME, ~/.cache) has an empty file in zuv-tidy for each that passed; remove the folder
+to begin anew. Exit status 1: something was found.
 """
 import concurrent.futures
 import hashlib
@@ -15,22 +16,25 @@ import shlex
 import subprocess
 import sys
 
-BUILD, PASSED = "build/release", pathlib.Path("build/tidy")
+ROOT, BUILD = os.getcwd(), "build/release"
+PASSED = pathlib.Path(os.environ.get("XDG_CACHE_HOME") or os.path.expanduser("~/.cache")) / "zuv-tidy"
 CONFIGURATIONS = (".clang-tidy", "tests/.clang-tidy")
-# A comment may switch a check off, so they count.
-PREPROCESS = ["-E", "-CC", "-o", "-"]
+# A comment may switch a check off, so they count; lines' numbers and files' places don't.
+PREPROCESS = ["-E", "-CC", "-P", "-o", "-"]
 
 
 def key(command, common):
     """Of all that the result depends on; None if that can't be made out."""
-    words, kept = iter(shlex.split(command["command"])), []
+    words, kept = iter(shlex.split(command["command"].removeprefix("ccache "))), []
     for word in words:
         if word in ("-o", "-MT", "-MF"):
             next(words)
         elif word != "-MD":
             kept.append(word)
     run = subprocess.run([*kept, *PREPROCESS], cwd=command["directory"], capture_output=True)
-    return hashlib.sha256(common + command["command"].encode() + run.stdout).hexdigest() if run.returncode == 0 else None
+    if run.returncode != 0:
+        return None
+    return hashlib.sha256(common + (" ".join(kept).encode() + run.stdout).replace(ROOT.encode(), b"")).hexdigest()
 
 
 def check(command, common):
