@@ -123,8 +123,8 @@ class endurance(unittest.TestCase):
                 ("a query that is wanted", "Query", queries(1, "r:QueryReportsRequest", nothing), "nothing to report")):
             with self.subTest(rule):
                 self.assertIn(noted, exchange(address, post(port, envelope(port, body))))
-        if MEMORY_IS_MEASURED:
-            self.assertLess(memory_of(address, "VmHWM"), 100 * MB)
+        if MEMORY_IS_MEASURED: # one takes up to 55 MB, and may not have given them back when the next one comes
+            self.assertLess(memory_of(address, "VmHWM"), 150 * MB)
 
     def test_the_memory_of_a_request_is_bounded_and_comes_back(self):
         address = self.started()
