@@ -84,10 +84,6 @@ std::string table(std::vector<row> rows)
     return text;
 }
 
-} // namespace
-
-namespace {
-
 // Read if the trace has them.
 trace_times times_beside(const std::string &trace)
 {
