@@ -17,6 +17,14 @@ soap_prefix *xml_prefix_find(const soap *ctx, std::string_view prefix);
 // soap_prefix_push_in, with a terminated URI whose length is known.
 soap_prefix *xml_prefix_declare(soap *ctx, std::string_view prefix, std::string_view uri);
 
+// The element whose tag is read declares its default namespace to be that of a row that it is sure of: declarations
+// of elements that have ended leave the stack, this one is on it, and the held tag, which has no prefix, is resolved.
+// False, with the error set: no memory, or too many are in scope.
+bool xml_default_redeclare(soap *ctx, std::int16_t row);
+
+// The row takes declarations of its own URI whatever was received before; no other row does.
+bool xml_row_is_sure(const soap *ctx, std::int16_t row);
+
 // Row of a table's first `row` ones whose pattern takes the URI of the next, or the same URI: true if the row
 // isn't the first that a declaration of its URI could be bound to.
 bool xml_row_is_shadowed(const soap_namespace *rows, const struct namespace_lengths *lengths,

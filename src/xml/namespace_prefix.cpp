@@ -136,6 +136,12 @@ void pop_head(soap *ctx)
     drop_record(ctx, scope, record);
 }
 
+// The record, which may be null, is of an element that has ended.
+bool ends(const soap *ctx, const soap_prefix *record)
+{
+    return record != nullptr && record->level >= ctx->nesting_level;
+}
+
 bool is_canonical(const soap *ctx)
 {
     return (ctx->mode & MODE_CANONICAL) != 0;
@@ -320,6 +326,34 @@ soap_prefix *xml_prefix_declare(soap *ctx, std::string_view prefix, std::string_
     return push(ctx, prefix, index == UNBOUND ? uri.data() : nullptr, uri.size(), index);
 }
 
+bool xml_row_is_sure(const soap *ctx, std::int16_t row)
+{
+    const namespace_lengths *lengths =
+        row >= 0 ? namespace_row_lengths(ctx, static_cast<std::size_t>(row)) : nullptr;
+    return lengths != nullptr && sure_row(ctx, {ctx->local_namespaces[row].uri, lengths->uri}) == row;
+}
+
+bool xml_default_redeclare(soap *ctx, std::int16_t row)
+{
+    const soap_namespace_scope *scope = ctx->namespace_scope;
+    while (ends(ctx, ctx->prefix_list) && ends(ctx, ctx->prefix_list->next))
+        pop_head(ctx);
+    soap_prefix *head = ctx->prefix_list;
+    const bool stays = ends(ctx, head) && head != scope->root.first && head->prefix_length == 0 &&
+                       head->index == row && head->uri == nullptr;
+    if (stays) { // of the element before, which declared the same
+        head->level = ctx->nesting_level;
+    } else {
+        if (ends(ctx, head))
+            pop_head(ctx);
+        if (push(ctx, {}, nullptr, 0, row) == nullptr)
+            return false;
+    }
+    ctx->bare_declarations = 1;
+    xml_tag_has_default(ctx, row);
+    return true;
+}
+
 soap_prefix *soap_prefix_push_in(soap *ctx, const char *prefix, const char *uri)
 {
     return xml_prefix_declare(ctx, prefix, uri);
@@ -350,7 +384,7 @@ bool xml_row_is_shadowed(const soap_namespace *rows, const namespace_lengths *le
 void soap_prefix_pop(soap *ctx)
 {
     ctx->bare_declarations = 0;
-    while (ctx->prefix_list != nullptr && ctx->prefix_list->level >= ctx->nesting_level)
+    while (ends(ctx, ctx->prefix_list))
         pop_head(ctx);
 }
 

@@ -23,13 +23,15 @@ constexpr std::size_t SPARE_ATTRIBUTES_MAX = 64;
 constexpr std::size_t SPARE_ATTRIBUTE_SIZE =
     1024; // bytes of value; a record with a larger one is freed at once
 
-constexpr std::size_t URI_SLOTS = 64;        // power of two
-constexpr std::size_t ROOT_BYTES_MAX = 4096; // for a remembered root element
-constexpr std::size_t RECEIVED_SIZE = 128;   // bytes; longer received URIs have blocks of their own
-constexpr std::size_t RECEIVED_KEPT = 4;     // blocks for received URIs that stay from call to call
-constexpr unsigned TAG_GUESS_BITS = 6;       // of the number of a tag_guess
-constexpr std::size_t TAG_GUESS_PROBES = 4;  // places that one may be in, from its number on
-constexpr std::size_t ROOT_RECEIVED_MAX = 8; // rows that took a URI in it
+constexpr std::size_t URI_SLOTS = 64;          // power of two
+constexpr std::size_t ROOT_BYTES_MAX = 4096;   // for a remembered root element
+constexpr std::size_t DEFAULT_HEADS = 8;       // power of two
+constexpr std::size_t DEFAULT_HEAD_SIZE = 124; // bytes; longer ones are not remembered
+constexpr std::size_t RECEIVED_SIZE = 128;     // bytes; longer received URIs have blocks of their own
+constexpr std::size_t RECEIVED_KEPT = 4;       // blocks for received URIs that stay from call to call
+constexpr unsigned TAG_GUESS_BITS = 6;         // of the number of a tag_guess
+constexpr std::size_t TAG_GUESS_PROBES = 4;    // places that one may be in, from its number on
+constexpr std::size_t ROOT_RECEIVED_MAX = 8;   // rows that took a URI in it
 
 // Bytes in a row's own texts.
 struct namespace_lengths {
@@ -68,6 +70,14 @@ struct remembered_root {
     } received[ROOT_RECEIVED_MAX];
 };
 
+// What followed the name of a tag that declares its default namespace; see default_head.h.
+struct default_head {
+    std::uint8_t length;           // 0: nothing is remembered
+    bool empty_tag;                // the tag ends in "/>"
+    std::int16_t row;              // of the namespace table
+    char bytes[DEFAULT_HEAD_SIZE]; // from after the name up to and with the ">"
+};
+
 struct soap_namespace_scope {
     soap_prefix *chains[PREFIX_CHAINS]; // innermost first
     std::uint32_t in_scope;             // records in the chains, which are those of soap::prefix_list
@@ -85,6 +95,7 @@ struct soap_namespace_scope {
     const soap_namespace *copy;  // the working copy: row_count rows and their end; null for none
     bool copy_received;          // a row of it has or had a received URI
     remembered_root root;
+    default_head default_heads[DEFAULT_HEADS];
     char *received[RECEIVED_KEPT];   // blocks of RECEIVED_SIZE for received URIs; owned; null until first use
     unsigned received_used;          // bit n: a row has received[n]
     std::uint8_t tag_prefix;         // the reader's last tag: place of its prefix in soap::prefix_cache

@@ -51,6 +51,7 @@ void forget_rows(soap *ctx, soap_namespace_scope *scope)
 {
     xml_root_forget(ctx);
     std::memset(scope->guesses, 0, sizeof scope->guesses); // they know prefixes of rows
+    std::memset(scope->default_heads, 0, sizeof scope->default_heads);
     SOAP_FREE(ctx, scope->spare_table);
     scope->spare_table = nullptr;
     SOAP_FREE(ctx, scope->declarations);

@@ -40,6 +40,15 @@ const soap_namespace *table_row(const soap *ctx, int row)
     return table != nullptr ? table + row : nullptr;
 }
 
+// What is remembered is of the stack as it is now.
+void cache_follow(soap *ctx)
+{
+    if (ctx->prefix_cache_list == ctx->prefix_list)
+        return;
+    ctx->prefix_cache_list = ctx->prefix_list;
+    ctx->prefix_cache_valid = 0;
+}
+
 // Prefixes that come in turn should have places of their own: "protocol" and those of each port do.
 std::size_t cache_place(const char *prefix, std::size_t length)
 {
@@ -128,10 +137,7 @@ bool is_spelled_so(const soap *ctx, const tag_view &held, const char *asked)
 
 int xml_prefix_row(soap *ctx, const char *prefix, std::size_t length)
 {
-    if (ctx->prefix_cache_list != ctx->prefix_list) {
-        ctx->prefix_cache_list = ctx->prefix_list;
-        ctx->prefix_cache_valid = 0;
-    }
+    cache_follow(ctx);
     const std::size_t place = cache_place(prefix, length);
     soap_prefix_cache &entry = ctx->prefix_cache[place];
     const auto bit = static_cast<std::uint8_t>(1u << place);
@@ -149,6 +155,22 @@ int xml_prefix_row(soap *ctx, const char *prefix, std::size_t length)
         ctx->prefix_cache_valid |= bit;
     }
     return row;
+}
+
+void xml_tag_has_default(soap *ctx, std::int16_t row)
+{
+    const std::size_t place = cache_place(nullptr, 0);
+    soap_prefix_cache &entry = ctx->prefix_cache[place];
+    cache_follow(ctx);
+    if (entry.length != 0)
+        ++ctx->namespace_scope->prefix_changes[place];
+    entry.length = 0;
+    entry.row = row;
+    ctx->prefix_cache_valid |= static_cast<std::uint8_t>(1U << place);
+    ctx->tag_local = 0;
+    ctx->tag_row = row;
+    ctx->tag_resolved = true;
+    ctx->namespace_scope->tag_prefix = static_cast<std::uint8_t>(place);
 }
 
 bool xml_row_has_prefix(const soap *ctx, int row, const char *prefix, std::size_t length)

@@ -28,6 +28,10 @@ tag_view soap_held_tag(soap *ctx);
 // needs no declaration, counts as unbound.
 int xml_prefix_row(soap *ctx, const char *prefix, std::size_t length);
 
+// The held tag has no prefix, and the innermost default namespace is that of the row: both are known from here on.
+// The context must have its namespace scope.
+void xml_tag_has_default(soap *ctx, std::int16_t row);
+
 // For the prefix stack: whenever a declaration is pushed or popped, remembered rows are forgotten.
 inline void xml_prefix_rows_forget(soap *ctx)
 {

@@ -15,6 +15,7 @@
 
 #include "core/failure.h"
 #include "xml/attributes.h"
+#include "xml/default_head.h"
 #include "xml/namespace.h"
 #include "xml/root_head.h"
 
@@ -129,32 +130,29 @@ int find_start_tag(soap *ctx)
     return find_start_tag_slow(ctx);
 }
 
-// Takes the name at `name` and the ">" after it, which most tags are, if it is short. False: nothing was
-// consumed. The buffer must hold SHORT_NAME bytes there.
-template <template <bool> class Stop> bool take_plain_name(soap *ctx, const char *name)
+// The end of the name at `name` if it is short, else null. The buffer must hold SHORT_NAME bytes there.
+template <template <bool> class Stop> const char *short_name_end(const char *name)
 {
     const char *stop = Stop<true>::find(name, name + SHORT_NAME);
-    if (stop == name + SHORT_NAME || *stop != '>')
-        return false;
+    return stop != name + SHORT_NAME ? stop : nullptr;
+}
+
+void keep_short_name(soap *ctx, const char *name, const char *stop)
+{
     std::memcpy(ctx->tag, name, SHORT_NAME);
     ctx->tag_length = static_cast<std::uint16_t>(stop - name);
     ctx->tag[ctx->tag_length] = '\0';
-    input_consume(ctx, stop + 1);
-    return true;
 }
 
-// Reads a start tag that is a short name in brackets and is whole in the buffer. False: the next thing is
-// another, and nothing was consumed.
-bool read_plain_tag(soap *ctx)
+// Takes the name at `name`, of an end tag, and the ">" after it, which most are, if it is short. False: nothing
+// was consumed. The buffer must hold SHORT_NAME bytes there.
+[[gnu::always_inline]] inline bool take_end_name(soap *ctx, const char *name)
 {
-    if (ctx->look_ahead != 0 || ctx->in_cdata != CDATA_OUTSIDE)
+    const char *const stop = short_name_end<end_name_stop>(name);
+    if (stop == nullptr || *stop != '>')
         return false;
-    const char *const p = xml_after_blanks(ctx);
-    if (input_end(ctx) - p <= static_cast<std::ptrdiff_t>(SHORT_NAME) || p[0] != '<' ||
-        static_cast<unsigned char>(p[1]) <= '?' || // one of the marks that lead to something else
-        !take_plain_name<tag_name_stop>(ctx, p + 1))
-        return false;
-    ctx->has_body = 1;
+    keep_short_name(ctx, name, stop);
+    input_consume(ctx, stop + 1);
     return true;
 }
 
@@ -198,7 +196,34 @@ int read_tag_end(soap *ctx)
         xml_attributes_hide(ctx);
 }
 
-// A start tag of any kind; the rest of soap_element_head_read where it isn't a plain one.
+// Reads a start tag that is a short name in brackets, with nothing but a default namespace known by now, and is
+// whole in the buffer. False: the next thing is another, and nothing was consumed.
+bool read_short_tag(soap *ctx)
+{
+    if (ctx->look_ahead != 0 || ctx->in_cdata != CDATA_OUTSIDE)
+        return false;
+    const char *const p = xml_after_blanks(ctx);
+    if (input_end(ctx) - p <= static_cast<std::ptrdiff_t>(SHORT_NAME) || p[0] != '<' ||
+        static_cast<unsigned char>(p[1]) <= '?') // one of the marks that lead to something else
+        return false;
+    const char *const name = p + 1, *const stop = short_name_end<tag_name_stop>(name);
+    if (stop == nullptr)
+        return false;
+    if (*stop == '>') {
+        input_consume(ctx, stop + 1);
+        ctx->has_body = 1;
+        if (xml_prefixes_end(ctx) || ctx->attributes_set != 0)
+            leave_previous_head(ctx);
+    } else if (!default_head_resume(ctx, name, stop)) {
+        return false;
+    } else if (ctx->attributes_set != 0) {
+        xml_attributes_hide(ctx);
+    }
+    keep_short_name(ctx, name, stop);
+    return true;
+}
+
+// A start tag of any kind; the rest of soap_element_head_read where it isn't a short one.
 [[gnu::noinline]] int read_head(soap *ctx)
 {
     if (find_start_tag(ctx) != 0 || read_tag_name(ctx) != 0)
@@ -219,8 +244,10 @@ int read_tag_end(soap *ctx)
         return no_tag(ctx, error == SOAP_EOF ? end_of_input(ctx) : error);
     if (read_tag_end(ctx) != 0)
         return ctx->error;
-    if (root && all_taken)
+    if (all_taken && root)
         root_head_learn(ctx, start);
+    else if (all_taken)
+        default_head_learn(ctx, start);
     if (ctx->attributes_set != 0)
         xml_attributes_apply(ctx, names_wide);
     return ctx->error = 0;
@@ -241,7 +268,7 @@ int read_end_tag_name(soap *ctx)
 {
     ctx->tag_resolved = false;
     if (ctx->look_ahead == 0 && input_end(ctx) - input_here(ctx) >= static_cast<std::ptrdiff_t>(SHORT_NAME) &&
-        take_plain_name<end_name_stop>(ctx, input_here(ctx)))
+        take_end_name(ctx, input_here(ctx)))
         return SOAP_OK;
     ctx->tag_length = static_cast<std::uint16_t>(xml_name_read<end_name_stop>(ctx, ctx->tag));
     const std::int32_t byte = input_skip_blanks(ctx);
@@ -376,11 +403,7 @@ int soap_element_head_read(soap *ctx)
     if (ctx->peeked != 0)
         return ctx->tag[0] != '\0' ? 0 : fail(ctx, SOAP_NO_TAG);
     xml_tag_forget(ctx);
-    if (!read_plain_tag(ctx))
-        return read_head(ctx);
-    if (xml_prefixes_end(ctx) || ctx->attributes_set != 0)
-        leave_previous_head(ctx);
-    return ctx->error = 0;
+    return read_short_tag(ctx) ? ctx->error = 0 : read_head(ctx);
 }
 
 bool xml_head_guess(const soap *ctx, tag_guess &guess)
@@ -411,7 +434,7 @@ bool xml_next_end_read(soap *ctx)
         return false;
     const char *const p = xml_after_blanks(ctx);
     if (input_end(ctx) - p <= static_cast<std::ptrdiff_t>(SHORT_NAME) + 1 || p[0] != '<' || p[1] != '/' ||
-        !take_plain_name<end_name_stop>(ctx, p + 2))
+        !take_end_name(ctx, p + 2))
         return false;
     xml_tag_forget(ctx);
     ctx->peeked = 0;

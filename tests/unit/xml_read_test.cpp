@@ -1,4 +1,6 @@
 // xml_read_test.cpp - elements on input: tags, attributes, namespaces, the envelope's frame.
+#include <random>
+
 #include "support/reader_input.h"
 #include "xml/namespace.h"
 #include "xml/namespace_scope.h"
@@ -557,6 +559,92 @@ TEST(xml_read, a_root_element_like_the_last_one_is_read_as_if_it_were_the_first)
                 EXPECT_EQ(seen(kept, next, SOAP_BUFFER_SIZE), expected);
             }
         }
+}
+
+// Elements within each other, most with a default namespace, as toolkits without prefixes write them.
+std::string random_elements(std::mt19937 &random, int depth)
+{
+    static constexpr const char *heads[] = {
+        "",
+        " xmlns='urn:one'",
+        " xmlns=\"urn:one\"",
+        " xmlns=\"urn:two\"",
+        " xmlns=\"urn:two\"",
+        " xmlns=\"\"",
+        " xmlns=\"urn:none\"",
+        "\n xmlns=\"urn:one\" ",
+        " xmlns=\"urn:one\" a=\"1\"",
+        " xmlns:p=\"urn:one\"",
+        " xmlns=\"urn:one\" xmlns=\"urn:two\"",
+        " xmlns=\"urn:two\" xmlns:x=\"urn:one\"",
+        " a=\"2\"",
+        " xmlns=\"http://www.w3.org/1/soap-encoding\"",
+        " xmlns=\"http://schemas.xmlsoap.org/soap/encoding/\"",
+    };
+    static constexpr const char *names[] = {"x", "x", "y", "p:x", "x:y", "a-name-of-more-bytes-than-eight"};
+    std::string text;
+    for (auto count = 1 + random() % 3; count > 0; --count) {
+        const std::string name = names[random() % std::size(names)];
+        const std::string head = "<" + name + heads[random() % std::size(heads)];
+        const bool empty = random() % 4 == 0;
+        text += empty ? head + "/>"
+                      : head + ">" + (depth > 0 ? random_elements(random, depth - 1) : "text") + "</" + name +
+                            ">";
+    }
+    return text;
+}
+
+// Each element with its row, what it declares, and what the rows have received.
+std::string rows_of_elements(soap *ctx, std::mt19937 random)
+{
+    std::string text;
+    while (soap_element_head_read(ctx) == 0) {
+        text += ctx->tag;
+        if (random() % 2 == 0)
+            text += attributes(ctx);
+        if (random() % 2 == 0)
+            text += " " + std::to_string(soap_held_tag(ctx).row) +
+                    std::to_string(soap_tag_compare(ctx, ctx->tag, "one:x"));
+        for (const char *name : {"x", "p:x", "x:x"})
+            text += " " + std::to_string(soap_tag_compare(ctx, name, "two:x"));
+        for (const soap_prefix *p = ctx->prefix_list; p != nullptr; p = p->next)
+            text += " <" + std::to_string(p->index) + "@" + std::to_string(p->level);
+        text += ctx->local_namespaces[1].received ? " received" : "";
+        const bool skips = random() % 8 == 0;
+        if (skips ? soap_element_skip(ctx) : soap_element_in_begin(ctx, nullptr, 1, nullptr))
+            return text + failure(ctx);
+        if (skips || ctx->has_body == 0)
+            continue;
+        text += "{" + rows_of_elements(ctx, random) + "}";
+        if (soap_element_in_end(ctx, nullptr) != 0)
+            return text + failure(ctx);
+    }
+    return text + failure(ctx);
+}
+
+TEST(xml_read, a_default_namespace_declared_again_is_read_as_if_it_were_the_first)
+{
+    static constexpr soap_namespace other_rows[] = {
+        NAMESPACES[0], NAMESPACES[1], NAMESPACES[2], NAMESPACES[3],
+        NAMESPACES[4], NAMESPACES[6], NAMESPACES[5], NAMESPACES[7],
+    };
+    std::mt19937 random(20261122);
+    reception kept("");
+    for (int round = 0; round < 600; ++round) {
+        const std::string document = "<x xmlns:x=\"urn:two\">" + random_elements(random, 4) + "</x>";
+        const auto seen = [&](reception &in, std::size_t piece) {
+            in.receive(document, piece, piece);
+            soap_reset_call(in);
+            in->namespaces = round % 7 == 6 ? other_rows : NAMESPACES;
+            in->mode = round % 5 == 0 ? MODE_STRICT : 0;
+            soap_namespace_table_copy(in);
+            return rows_of_elements(in, std::mt19937(static_cast<unsigned>(round)));
+        };
+        reception bytewise(""); // which has no declaration whole in the buffer
+        const std::string expected = seen(bytewise, 1);
+        EXPECT_EQ(seen(kept, SOAP_BUFFER_SIZE), expected) << document;
+        EXPECT_EQ(seen(kept, 100 + random() % 100), expected) << document;
+    }
 }
 
 // The rows of prefixes are kept by a few places, which prefixes of other lengths share: none at all among them.
