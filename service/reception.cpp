@@ -65,6 +65,13 @@ void end_without_body(soap *ctx)
         ctx->response_unfinished = false;
 }
 
+// A request that tells no length has no body. SOAP messages of old peers may all the same end with the connection.
+void settle_length(soap *ctx)
+{
+    if ((ctx->input_mode & MODE_IO_MASK) != MODE_CHUNKED)
+        ctx->content_length_given = true;
+}
+
 // Chunks are only for peers that know them: those whose start line says HTTP/1.1.
 void settle_framing(soap *ctx, bool chunks_wanted)
 {
@@ -312,8 +319,10 @@ int reception::read_head(soap *ctx)
     if (std::string_view(ctx->message_text).find(" HTTP/1.") == std::string_view::npos)
         return ctx->error = BAD_REQUEST; // the library leaves what isn't HTTP to its caller
     return answered(ctx, [ctx](const reception &known) {
-        if (known.at_control())
+        if (known.at_control()) {
+            settle_length(ctx);
             return known.is_local() ? 0 : ctx->error = FORBIDDEN;
+        }
         return known.target_ == nullptr && known.data_name().empty() ? ctx->error = NOT_FOUND : 0;
     });
 }

@@ -138,6 +138,9 @@ class control(unittest.TestCase):
                 for method, kind, host, status in (("POST", "text/plain", "localhost", 415), ("POST", "application/json", "x.test", 403),
                                                    ("GET", "", "localhost", 405), ("DELETE", "", "localhost", 405)):
                     self.assertEqual(ask(address, method, CONTROL + "/reset", "{}", "Content-Type: " + kind, host=host).status, status)
+                with Connection(address) as bare:  # no length: no body to wait for
+                    bare.send(("POST %s/reset HTTP/1.1\r\nHost: localhost\r\n%s\r\n\r\n" % (CONTROL, json_type)).encode())
+                    self.assertEqual(bare.receive().status, 200)
                 put("bob", seed % (zuv.PROFILE, "ada"))
                 answer = ask(address, "POST", CONTROL + "/reset", "{}", json_type)
                 self.assertEqual((answer.status, "bob.xml: There is a document named urn:ada already" in answer), (500, True), answer)
