@@ -31,7 +31,7 @@ endif()
 # A GoogleTest executable, one CTest case.
 function(zuv_add_test name)
     add_executable(${name} ${ARGN})
-    target_include_directories(${name} PRIVATE ${ZUV_GENERATED_DIR}/src)
+    target_include_directories(${name} PRIVATE ${ZUV_GENERATED_DIR}/src ${ZUV_GENERATED_DIR}/tools)
     target_link_libraries(${name} PRIVATE zuv_test_support zuv_objects GTest::gtest_main)
     if(ZUV_TEST_LAUNCHER)
         add_test(NAME ${name} COMMAND ${ZUV_TEST_LAUNCHER} $<TARGET_FILE:${name}>)

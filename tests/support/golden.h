@@ -1,6 +1,6 @@
 // golden.h - requests as a person can read them, and as they go over the wire.
 //
-// request.txt holds what all requests have in common, a file of each port what is a request's own. The head's
+// request.txt holds what all requests have in common, members.txt what is a request's own. The head's
 // lines end with CR LF on the wire. The body's line breaks and the blanks before each line are for the reader
 // alone; "\n" and "\r" stand for the bytes, "~" at the start of a line for a blank. A line that begins with
 // "#" is a remark.
@@ -38,15 +38,16 @@ inline std::string body_bytes(const std::string &line)
     return replaced(replaced(text.starts_with('~') ? " " + text.substr(1) : text, "\\n", "\n"), "\\r", "\r");
 }
 
-// What is an operation's own: its section begins with "== ", the names of operations and traits.
+// What is an operation's own: its section begins with "== ", the names of ports and operations, and traits.
 struct section {
-    explicit section(const std::string &port, const std::string &operation)
+    section(const std::string &port, const std::string &operation)
     {
-        std::ifstream file = open(port);
+        std::ifstream file = open("members");
         bool own = false;
         for (std::string line; std::getline(file, line);) {
             if (line.starts_with("== ")) {
-                own = line.find(" " + operation + " ") != line.npos;
+                own =
+                    line.find(" " + port + " ") != line.npos && line.find(" " + operation + " ") != line.npos;
                 heading += own ? line : "";
             } else if (own) {
                 members += body_bytes(line);
@@ -78,10 +79,12 @@ inline message read(const std::string &port, const std::string &operation)
     const section own(port, operation);
     std::string low = port;
     std::transform(low.begin(), low.end(), low.begin(), [](char c) { return c < 'a' ? c + 32 : c; });
+    const auto named = [&](const std::string &text) {
+        return replaced(replaced(replaced(text, "@Port", port), "@port", low), "@operation", operation);
+    };
     std::stringstream common;
     common << open("request").rdbuf();
-    std::istringstream lines(
-        replaced(replaced(replaced(common.str(), "@Port", port), "@port", low), "@operation", operation));
+    std::istringstream lines(named(common.str()));
     message result;
     std::string line;
     while (std::getline(lines, line) && !line.empty()) {
@@ -90,7 +93,7 @@ inline message read(const std::string &port, const std::string &operation)
     }
     while (std::getline(lines, line))
         result.body += body_bytes(own.line_of(line));
-    result.body = replaced(result.body, "@members", own.members);
+    result.body = replaced(result.body, "@members", named(own.members));
     result.head = replaced(result.head, "*", std::to_string(result.body.size())) + "\r\n";
     return result;
 }
