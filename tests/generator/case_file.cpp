@@ -44,6 +44,18 @@ std::string schema_text(const std::string &prefix, const std::string &body)
            prefix + "\" elementFormDefault=\"qualified\">" + body + "</xsd:schema>\n";
 }
 
+std::string port_text(const std::string &body)
+{
+    return "<w:definitions xmlns:w=\"http://schemas.xmlsoap.org/wsdl/\" xmlns:t=\"http://www.zuv.example/t\" "
+           "xmlns:s=\"http://schemas.xmlsoap.org/wsdl/soap/\" targetNamespace=\"http://www.zuv.example/t\">"
+           "<w:message name=\"m\"><w:part name=\"p\" element=\"t:go\"/></w:message><w:portType "
+           "name=\"Port\">" +
+           body +
+           "</w:portType><w:binding name=\"PortSoapBinding\" type=\"t:Port\"><s:binding style=\"document\"/>"
+           "</w:binding><w:service name=\"Port\"><w:port name=\"p\" binding=\"t:PortSoapBinding\">"
+           "<s:address location=\"http://127.0.0.1/\"/></w:port></w:service></w:definitions>\n";
+}
+
 void write_input(const std::filesystem::path &directory, const std::string &name, const std::string &text)
 {
     std::ofstream(directory / name, std::ios::binary) << text;
@@ -81,8 +93,8 @@ std::vector<contract_case> read_cases(const std::filesystem::path &path)
         section.line = number;
         if (section.kind == "schema")
             words >> section.argument >> std::ws;
-        std::getline(words,
-                     section.kind == "schema" || section.kind == "types" ? section.text : section.argument);
+        const bool is_text = section.kind == "schema" || section.kind == "types" || section.kind == "port";
+        std::getline(words, is_text ? section.text : section.argument);
         section.text += section.text.empty() ? "" : "\n";
         cases.back().sections.push_back(section);
     }
@@ -130,6 +142,10 @@ translation translate(const contract_case &contract)
                         schema_text(section.argument, section.text));
         else if (section.kind == "members")
             write_class_of(directory.path, section.argument, type_ids);
+        else if (section.kind == "port")
+            write_input(directory.path, "Port.wsdl", port_text(section.text));
+        else if (section.kind == "contract")
+            return translate(std::filesystem::path(GENERATOR_TEST_DATA) / section.argument);
         else if (section.kind == "file")
             write_input(directory.path, section.argument, section.text);
     }

@@ -5,10 +5,12 @@
 //   types            rows of type_ids.txt; those of BASE_TYPE_IDS follow them
 //   schema PREFIX    what is inside xsd:schema in PREFIX.xsd, whose first line is the section's
 //   members XML      schema t with the one class Thing, id 20, of these elements, all in its first line
+//   port             what is inside the portType of Port.wsdl, with a message m; the first line is the section's
 //   file NAME        any other input file, as it is
+//   contract FOLDER  all of it in place of the above: a folder of tests/generator
 //   expect PATH      lines that come together in this output; "model": in the dump of the model
 //   error MESSAGE    what refuses the contract
-// A schema or types of one line are in the line of their section. Lines before the first section say what the
+// A schema, a port or types of one line are in the line of their section. Lines before the first section say what the
 // case is about.
 #pragma once
 

@@ -17,9 +17,9 @@ namespace {
 constexpr char DOCUMENT[] =
     "<all:Everything xmlns:all=\"http://www.zuv.example/all\" "
     "xmlns:xsi=\"http://www.w3.org/2001/XMLSchema-instance\">"
-    "<all:text>a text</all:text>"
+    "<all:operator>a text</all:operator>"
     "<all:moment>2020-02-02T02:02:02Z</all:moment>"
-    "<all:share>12.50</all:share>"
+    "<all:fix-pack>12.50</all:fix-pack>"
     "<all:flag>true</all:flag>"
     "<all:count>-7</all:count>"
     "<all:weight>1.5</all:weight>"
