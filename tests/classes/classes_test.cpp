@@ -3,8 +3,6 @@
 // Elsewhere: valid by its schema (tests/foreign, tests/interop).
 //
 // Nothing here names a class: the registry says which there are, so that none can be forgotten.
-#include <gtest/gtest.h>
-
 #include <utility>
 
 #include <zuv_client_pro/protocolProfile.h>
@@ -15,8 +13,7 @@
 
 #include "core/message_store.h"
 #include "exchange/request.h"
-#include "support/memory_wire.h"
-#include "support/random_objects.h"
+#include "support/every_class.h"
 #include "traits_protocol.h"
 #include "traits_protocolProfile.h"
 
@@ -56,35 +53,13 @@ protected:
         soap_set_namespaces(&ctx, soap_program_namespaces);
     }
 
-    void begin_message(const binding::class_ops &ops, const void *object)
-    {
-        ctx.sends.clear();
-        ctx.encoding_style = nullptr;
-        soap_reset_call(&ctx);
-        ops.mark(object, &ctx);
-    }
-
     // The object as a document of its own: the element "root" of no namespace has the type.
     std::string write(const binding::class_ops &ops, const void *object, std::uint32_t mode)
     {
         ctx.output_mode = MODE_BARE_XML | mode;
-        begin_message(ops, object);
-        EXPECT_EQ(0, soap_count_begin(&ctx));
-        std::uint64_t counted = 0;
-        if ((mode & MODE_IO_MASK) == MODE_BUFFERED) {
-            ctx.mode |= MODE_COUNTING;
-            EXPECT_EQ(0, put(ops, object));
-            counted = ctx.message_count;
-        }
-        EXPECT_EQ(0, soap_count_end(&ctx));
-        EXPECT_EQ(0, soap_send_begin(&ctx));
-        EXPECT_EQ(0, put(ops, object));
-        EXPECT_EQ(0, soap_send_finish(&ctx));
-        const std::string sent = ctx.sent();
-        if (counted != 0 && !(mode & MODE_DEFLATE)) {
-            EXPECT_EQ(counted, sent.size()) << ops.xml_type;
-        }
-        return sent;
+        ctx.encoding_style = nullptr;
+        return message_of(
+            ctx, [&] { ops.mark(object, &ctx); }, [&] { return put(ops, object); });
     }
 
     int put(const binding::class_ops &ops, const void *object)
@@ -104,22 +79,6 @@ protected:
         return object && soap_receive_finish(&ctx) == 0 ? object : nullptr;
     }
 
-    template <class Use> void each_class(Use use)
-    {
-        int classes = 0;
-        for (int id = 1; id <= binding::TYPE_ID_MAX; ++id) {
-            const binding::type_entry *entry = binding::type_entry_of(id);
-            if (!entry || entry->kind != binding::type_kind::object || id == 10)
-                continue;
-            ++classes;
-            ASSERT_NE(nullptr, row_of(id)) << entry->xml_name;
-            use(id, *entry->ops);
-            soap_discard_objects(&ctx, nullptr);
-            soap_discard_all(&ctx);
-        }
-        EXPECT_EQ(407, classes);
-    }
-
     memory_wire ctx;
 };
 
@@ -132,7 +91,8 @@ TEST_F(every_class, come_back_equal_from_every_framing_and_mode)
                                    MODE_BUFFERED | MODE_NIL,
                                    MODE_BUFFERED | MODE_DEFAULT_NAMESPACE,
                                    MODE_BUFFERED | MODE_CANONICAL};
-    each_class([&](int id, const binding::class_ops &ops) {
+    for_each_class(ctx, [&](int id, const binding::type_entry &entry) {
+        const binding::class_ops &ops = *entry.ops;
         source random(&ctx, static_cast<unsigned>(id));
         void *object = soap_instantiate(&ctx, id, nullptr, nullptr, nullptr);
         row_of(id)->fill(random, object, DEPTH);
@@ -155,7 +115,8 @@ TEST_F(every_class, come_back_equal_from_every_framing_and_mode)
 // A peer that goes away, or whose message breaks off, at every place that a class can be left at.
 TEST_F(every_class, end_in_an_error_wherever_their_bytes_stop)
 {
-    each_class([&](int id, const binding::class_ops &ops) {
+    for_each_class(ctx, [&](int id, const binding::type_entry &entry) {
+        const binding::class_ops &ops = *entry.ops;
         source random(&ctx, static_cast<unsigned>(id));
         void *object = soap_instantiate(&ctx, id, nullptr, nullptr, nullptr);
         row_of(id)->fill(random, object, 1);
@@ -166,7 +127,9 @@ TEST_F(every_class, end_in_an_error_wherever_their_bytes_stop)
             if (sends[taken][0] != '<')
                 continue;
             ctx.send_limit = taken;
-            begin_message(ops, object);
+            ctx.sends.clear();
+            soap_reset_call(&ctx);
+            ops.mark(object, &ctx);
             EXPECT_TRUE(soap_count_begin(&ctx) || soap_count_end(&ctx) || soap_send_begin(&ctx) ||
                         put(ops, object) || soap_send_finish(&ctx));
             EXPECT_EQ(-1, ctx.error);
@@ -257,7 +220,8 @@ TEST_F(requests, written_once_are_those_written_twice)
                                    MODE_CANONICAL,
                                    MODE_WSU_ID,
                                    MODE_NULL_STRINGS | MODE_UTF_STRINGS | SOAP_XML_TREE};
-    each_class([&](int id, const binding::class_ops &ops) {
+    for_each_class(ctx, [&](int id, const binding::type_entry &entry) {
+        const binding::class_ops &ops = *entry.ops;
         source random(&ctx, static_cast<unsigned>(id), id % 2 != 0);
         void *object = soap_instantiate(&ctx, id, nullptr, nullptr, nullptr);
         row_of(id)->fill(random, object, DEPTH);
