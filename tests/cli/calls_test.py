@@ -7,6 +7,7 @@ import glob
 import gzip
 import json
 import os
+import pathlib
 import random
 import re
 import signal
@@ -35,8 +36,7 @@ class calls(unittest.TestCase):
 
     def file(self, name, content):
         path = os.path.join(self.folder, name)
-        with open(path, "wb") as file:
-            file.write(content if isinstance(content, bytes) else content.encode())
+        pathlib.Path(path).write_bytes(content if isinstance(content, bytes) else content.encode())
         return path
 
     def expect(self, run, code, *parts):
@@ -249,8 +249,7 @@ class calls(unittest.TestCase):
             self.assertTrue(json.loads(run.stdout)["credentials"][0]["key"]["@href"].startswith("cid:.."))
             self.assertEqual(run.stderr.count("saved "), 2, run.stderr)
             self.assertEqual(sorted(os.listdir(kept)), ["1-.._.._x_", "2"])
-            with open(os.path.join(kept, "1-.._.._x_"), "rb") as file:
-                self.assertEqual(file.read(), data)
+            self.assertEqual(pathlib.Path(kept, "1-.._.._x_").read_bytes(), data)
             if options:
                 with zuv.peer(zuv.answer(GOT)) as (address, requests):
                     self.expect(zuv.run("profile", "get", "-e", address, "--dime", "--attach", one), 0)
@@ -272,8 +271,7 @@ class calls(unittest.TestCase):
             uri = json.loads(self.expect(held, 0).stdout)["attachment"][0]["dataPort"][0]["dataURI"]
             self.expect(zuv.run("data", "put", uri, source), 0)
             self.expect(zuv.run("data", "get", uri, "-o", back), 0)
-            with open(back, "rb") as file:
-                self.assertEqual(file.read(), data)
+            self.assertEqual(pathlib.Path(back).read_bytes(), data)
             self.assertEqual(zuv.run("data", "get", uri, text=False).stdout, data)
             self.expect(zuv.run("data", "get", uri + "-not"), 6, "404")
         with zuv.peer(zuv.answer(b"x" * 5)[:-2]) as (address, _):

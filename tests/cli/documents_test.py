@@ -2,6 +2,7 @@
 """zuv new and zuv check: documents made from the contract, and held against it."""
 import glob
 import os
+import pathlib
 import tempfile
 import unittest
 
@@ -28,8 +29,7 @@ class documents(unittest.TestCase):
                 run = zuv.run("new", name)
                 self.assertEqual(run.returncode, 0, run.stderr)
                 self.assertIn(documentation.split()[0], run.stdout, name)
-                with open(os.path.join(folder, name), "w") as file:
-                    file.write(run.stdout)
+                pathlib.Path(folder, name).write_text(run.stdout)
             run = zuv.run("check", *(os.path.join(folder, name) for name, _ in classes))
             self.assertEqual((run.returncode, run.stderr), (0, ""))
             self.assertEqual(run.stdout.count(": valid, "), len(classes))
@@ -121,8 +121,7 @@ class documents(unittest.TestCase):
     def test_the_library_s_examples_of_messages_are_what_the_contract_allows(self):
         seeds = glob.glob(os.path.join(zuv.SOURCE, "tests", "fuzz", "corpus", "*", "*"))
         for path in seeds:  # no input ends it otherwise
-            with open(path, "rb") as file:
-                run = zuv.run("check", "-", given=file.read(), text=False)
+            run = zuv.run("check", "-", given=pathlib.Path(path).read_bytes(), text=False)
             self.assertIn(run.returncode, (0, 3), (path, run))
 
 

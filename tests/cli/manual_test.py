@@ -2,6 +2,7 @@
 """The manual and the page about the command line: their examples do what they say, options and exit codes are the program's.
 And completion in bash and zsh."""
 import os
+import pathlib
 import re
 import shutil
 import subprocess
@@ -19,13 +20,11 @@ COMPLETION = os.path.join(zuv.SOURCE, "cli", "completion", "zuv.")
 HELPERS = "/usr/share/bash-completion/bash_completion"
 
 def source():
-    with open(MANUAL) as file:
-        return file.read()
+    return pathlib.Path(MANUAL).read_text()
 
 
 def exit_codes():
-    with open(os.path.join(zuv.SOURCE, "cli", "exit_codes.h")) as file:
-        return re.findall(r"EXIT_\w+ = (\d+)", file.read())
+    return re.findall(r"EXIT_\w+ = (\d+)", pathlib.Path(zuv.SOURCE, "cli", "exit_codes.h").read_text())
 
 
 class manual(unittest.TestCase):
@@ -36,8 +35,7 @@ class manual(unittest.TestCase):
             examples.check(self, rows, folder, ZUV_ENDPOINT=address)
 
     def test_so_does_the_page_about_the_command_line(self):
-        with open(PAGE) as file:
-            text = file.read().replace("http://127.0.0.1:9080", "$service")
+        text = pathlib.Path(PAGE).read_text().replace("http://127.0.0.1:9080", "$service")
         rows = examples.of(re.findall(r"(?ms)^```console\n(.*?)^```$", text))
         self.assertGreater(len(rows), 30)
         self.assertEqual(re.findall(r"(?m)^\| (\d+) \|", text), exit_codes())
@@ -53,8 +51,7 @@ class manual(unittest.TestCase):
         for command in ("profile get", "ping", "data get", "data put", "new", "check", "trace"):
             listed |= set(re.findall(r"(?m)^  (?:-\w,)?--([a-z0-9-]+)", zuv.run(*command.split(), "--help").stdout))
         self.assertEqual(noted, listed - {"help"})
-        with open(SERVICE_MANUAL) as file:
-            noted = set(re.findall(r"Fl Fl ([a-z0-9-]+)", file.read()))
+        noted = set(re.findall(r"Fl Fl ([a-z0-9-]+)", pathlib.Path(SERVICE_MANUAL).read_text()))
         run = subprocess.run([zuv.SERVICE, "--help"], capture_output=True, text=True, timeout=zuv.LIMIT_S)
         self.assertEqual(noted, set(re.findall(r"(?m)^  (?:-\w,)?--([a-z0-9-]+)", run.stdout)) - {"help"})
         self.assertEqual(subprocess.run([zuv.SERVICE, "--no"], capture_output=True, timeout=zuv.LIMIT_S).returncode, 2)

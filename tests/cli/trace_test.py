@@ -2,6 +2,7 @@
 """zuv trace: what the library logs is made out again, hides secrets, and is harmless whatever it holds."""
 import gzip
 import os
+import pathlib
 import random
 import re
 import subprocess
@@ -56,8 +57,7 @@ class trace(unittest.TestCase):
         return html.parse(self.page, html.HTMLParser(encoding="utf-8")).getroot()
 
     def write(self, *parts):
-        with open(self.log, "wb") as file:
-            file.write(b"".join(parts))
+        pathlib.Path(self.log).write_bytes(b"".join(parts))
 
     def test_every_form_of_framing_and_compression_is_undone(self):
         gzipped = "Content-Encoding: gzip"
@@ -91,22 +91,19 @@ class trace(unittest.TestCase):
 
     def test_secrets_are_not_shown_unless_asked_for(self):
         credentials = os.path.join(self.folder, "c.xml")
-        with open(credentials, "w") as file:
-            file.write(CREDENTIALS)
+        pathlib.Path(credentials).write_text(CREDENTIALS)
         body = zuv.envelope('<p:getResponse><p:x><c:Password a="1">inner-8<c:b/></c:x>inner-8</c:Password></p:x>'
                             '<p:y userToken="pass-7" at="http://u:url-10@h/">-----BEGIN X-----pem-9-----END X-----</p:y>'
                             '<p:z>see https://h/d?a=1&amp;X-Amz-Signature=sign-11&amp;b=2 </p:z></p:getResponse>')
         with zuv.peer(zuv.answer(body, headers=["Set-Cookie: cookie-5", "X-Auth-Token: head-12", "Via: ftp://u:url-13@h"])) as (address, _):
             zuv.run("profile", "get", "-e", address + "/at?token=query-6", "--credentials", credentials, "--user", "ada",
                     "--trace", self.log, env={"ZUV_PASSWORD": "pass-4"})
-        with open(self.log) as file:
-            logged = file.read()
+        logged = pathlib.Path(self.log).read_text()
         self.made_page()
         with open(self.page) as file:
             shown = file.read() + zuv.run("trace", self.log).stdout + zuv.run("trace", self.log, "--show", "1").stdout
         self.made_page("--show-secrets")
-        with open(self.page) as file:
-            everything = file.read()
+        everything = pathlib.Path(self.page).read_text()
         for secret in SECRETS:
             secret = "YWRhOnBhc3MtNA==" if secret == "pass-4" else secret
             self.assertIn(secret, logged)
@@ -117,8 +114,7 @@ class trace(unittest.TestCase):
 
     def test_attachments_are_named_by_type_and_size(self):
         data = os.path.join(self.folder, "d.bin")
-        with open(data, "wb") as file:
-            file.write(b"\r\nHTTP/1.1 200 OK\r\n\r\n" * 50)  # what looks like a message is none
+        pathlib.Path(data).write_bytes(b"\r\nHTTP/1.1 200 OK\r\n\r\n" * 50)  # what looks like a message is none
         with zuv.peer(zuv.answer(got(5))) as (address, _):
             zuv.run("profile", "get", "-e", address, "--attach", data + ",type=image/png,id=pic", "--trace", self.log)
         exchange, = self.made_page().xpath(".//details[starts-with(@class, 'exchange')]")
@@ -183,8 +179,7 @@ class trace(unittest.TestCase):
         self.assertEqual(table.returncode, 0)
         for byte in b"\x1b", b"\xff":
             self.assertNotIn(byte, table.stdout)
-            with open(self.page, "rb") as file:
-                self.assertNotIn(byte, file.read())
+            self.assertNotIn(byte, pathlib.Path(self.page).read_bytes())
         browser.need(self)
         dom = browser.dom(self.page)
         self.assertNotIn("owned</title>", dom)

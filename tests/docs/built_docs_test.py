@@ -8,6 +8,7 @@ Usage: built_docs_test.py SOURCE_DIR DOXYFILE FOLDER
 import glob
 import html
 import os
+import pathlib
 import re
 import struct
 import subprocess
@@ -43,8 +44,7 @@ MEMBERS = {
 
 def picture(path):
     """Width, height and the bytes of the rows of a PNG file, each part of which is as its checksum says."""
-    with open(path, "rb") as file:
-        data = file.read()
+    data = pathlib.Path(path).read_bytes()
     assert data[:8] == b"\x89PNG\r\n\x1a\n", path
     place, kind, size, rows = 8, b"", (0, 0), b""
     while kind != b"IEND":
@@ -71,8 +71,7 @@ def spelled(text):
 
 def check_members(folder):
     for name, members in MEMBERS.items():
-        with open(os.path.join(folder, name), encoding="utf-8") as file:
-            page = file.read()
+        page = pathlib.Path(folder, name).read_text("utf-8")
         for declaration, said in members:
             assert spelled(html.escape(declaration)) in spelled(page), "%s lacks %s" % (name, declaration)
             assert said in words(page), "%s doesn't say \"%s\"" % (name, said)
@@ -82,12 +81,10 @@ def check_functions(source, folder):
     """No function of the hand-written headers is lost on the way."""
     count = 0
     for path in glob.glob(os.path.join(source, "include", "zuv_client_pro", "*.h")):
-        with open(path, encoding="utf-8") as file:
-            names = re.findall(r"^(?:extern \"C\" )?ZUV_API[^;{}(]*?(\w+)\(", file.read(), re.M)
+        names = re.findall(r"^(?:extern \"C\" )?ZUV_API[^;{}(]*?(\w+)\(", pathlib.Path(path).read_text("utf-8"), re.M)
         page = os.path.join(folder, os.path.basename(path).replace("_", "__").replace(".h", "_8h.html"))
         if names:
-            with open(page, encoding="utf-8") as file:
-                shown = words(file.read())
+            shown = words(pathlib.Path(page).read_text("utf-8"))
             missing = [name for name in names if name + " (" not in shown]
             assert not missing, "%s: not shown: %s" % (page, missing)
         count += len(names)
@@ -101,8 +98,7 @@ def check_undocumented(source, doxyfile):
     for comment, accepted in ((whole, True), ("", False), ("// Doubles.\n//   y        a number\n//   returns  two\n", False),
                               ("// Doubles.\n//   x        a number\n", False), ("// Doubles.\n//   returns  two\n", False)):
         with tempfile.TemporaryDirectory() as folder:
-            with open(os.path.join(folder, "a.h"), "w", encoding="utf-8") as file:
-                file.write(header % comment)
+            pathlib.Path(folder, "a.h").write_text(header % comment, "utf-8")
             settings = "@INCLUDE = %s\nINPUT = %s\nOUTPUT_DIRECTORY = %s\nSTRIP_FROM_PATH =\nIMAGE_PATH =\n" % (
                 doxyfile, os.path.join(folder, "a.h"), folder)
             run = subprocess.run(["doxygen", "-"], input=settings, text=True, capture_output=True, cwd=source, timeout=60)
@@ -117,8 +113,7 @@ def main():
     check_undocumented(source, doxyfile)
     with open(os.path.join(folder, "index.html"), encoding="utf-8") as file:
         assert 'href="command_line.html"' in file.read(), "the first page doesn't lead to the command line"
-    with open(os.path.join(folder, "command_line.html"), encoding="utf-8") as file:
-        page = file.read()
+    page = pathlib.Path(folder, "command_line.html").read_text("utf-8")
     shown = set(re.findall(r'<img src="([^"]+)"', page))
     assert shown == PICTURES, shown
     assert "zuv trace" in page and "<!--picture" not in page.replace(" ", "")

@@ -6,6 +6,7 @@ Usage: pages_test.py SOURCE_DIR ZUV_SERVICE GUIDE README_HOST. The programs call
 """
 import http.server
 import os
+import pathlib
 import re
 import subprocess
 import sys
@@ -44,8 +45,7 @@ def anchors(page):
 
 
 def check_links(path):
-    with open(path, encoding="utf-8") as file:
-        page = file.read()
+    page = pathlib.Path(path).read_text("utf-8")
     for target in re.findall(r"\]\(([^)\s]+)\)", page):
         if re.match(r"https?:", target):
             continue
@@ -53,15 +53,12 @@ def check_links(path):
         place = os.path.join(os.path.dirname(path), name) if name else path
         assert os.path.exists(place), "%s: no file for the link %s" % (path, target)
         if anchor:
-            with open(place, encoding="utf-8") as file:
-                assert anchor in anchors(file.read()), "%s: no heading for the link %s" % (path, target)
+            assert anchor in anchors(pathlib.Path(place).read_text("utf-8")), "%s: no heading for the link %s" % (path, target)
 
 
 def check_guide(source):
-    with open(os.path.join(source, "docs", "host-guide.md"), encoding="utf-8") as page:
-        pieces = blocks(page.read(), "cpp")
-    with open(os.path.join(source, "examples", "guide.cpp"), encoding="utf-8") as program:
-        compiled = words(program.read())
+    pieces = blocks(pathlib.Path(source, "docs", "host-guide.md").read_text("utf-8"), "cpp")
+    compiled = words(pathlib.Path(source, "examples", "guide.cpp").read_text("utf-8"))
     assert len(pieces) > 10, "the guide's code was not found"
     for piece in pieces:
         assert words(piece) in compiled, "not in examples/guide.cpp:\n" + piece
@@ -79,14 +76,12 @@ def check_commands(source, service):
     """Each command of the README is run somewhere; scripts that any page names are there; the service's own page starts it."""
     text = {}
     for page in ("README.md", "CONTRIBUTING.md", "docs/host-guide.md", "docs/command-line.md", "service/README.md"):
-        with open(os.path.join(source, page), encoding="utf-8") as file:
-            text[page] = file.read()
+        text[page] = pathlib.Path(source, page).read_text("utf-8")
         for script in re.findall(r"(?<![\w/])(?:script/[\w-]+(?:\.\w+)?|\.ci/run)", text[page]):
             assert os.path.exists(os.path.join(source, script)), "%s: there is no %s" % (page, script)
     assert {one for one in commands(text["README.md"]) if " " in one or "/" in one} == set(RUN_BY), commands(text["README.md"])
     for command, (place, words) in RUN_BY.items():
-        with open(os.path.join(source, place), encoding="utf-8") as file:
-            assert words in file.read(), "%s doesn't run %s" % (place, command)
+        assert words in pathlib.Path(source, place).read_text("utf-8"), "%s doesn't run %s" % (place, command)
     starts = [one.split()[1:] for one in commands(text["service/README.md"]) if one.startswith("zuv-service ")]
     assert starts
     for arguments in starts:

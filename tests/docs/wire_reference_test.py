@@ -5,6 +5,7 @@ Usage: wire_reference_test.py SOURCE_DIR GENERATED_DIR
 """
 import glob
 import os
+import pathlib
 import re
 import subprocess
 import sys
@@ -22,8 +23,7 @@ TEST_URI = "urn:test"
 
 
 def cpp_classes():
-    with open(os.path.join(generated, "src", "class_list.h"), encoding="utf-8") as file:
-        return set(re.findall(r"X\((\w+)\)", file.read()))
+    return set(re.findall(r"X\((\w+)\)", pathlib.Path(generated, "src", "class_list.h").read_text("utf-8")))
 
 
 def check_pages(folder):
@@ -31,8 +31,7 @@ def check_pages(folder):
     places, links = set(), set()
     for path in glob.glob(os.path.join(folder, "*.html")):
         name = os.path.basename(path)
-        with open(path, encoding="utf-8") as file:
-            text = file.read()
+        text = pathlib.Path(path).read_text("utf-8")
         places |= {name} | {"%s#%s" % (name, anchor) for anchor in re.findall(r'<h2 id="([^"]+)"', text)}
         links |= {link if not link.startswith("#") else name + link for link in re.findall(r'href="([^"]+)"', text)}
     assert len(links) > 400 and links <= places, sorted(links - places)

@@ -1,6 +1,7 @@
 """Splits SOAP messages, and holds what is in them against the published schemas."""
 import copy
 import os
+import pathlib
 import re
 import subprocess
 import tempfile
@@ -57,8 +58,7 @@ def _body(head, rest):
 
 def in_trace(path):
     """The SOAP messages in a file of HTTP requests, of answers, or of both in turn."""
-    with open(path, "rb") as file:
-        rest = file.read()
+    rest = pathlib.Path(path).read_bytes()
     while rest:
         head, _, rest = rest.partition(b"\r\n\r\n")
         body, rest = _body(head, rest)
@@ -89,11 +89,9 @@ def validate(schemas, ports, elements):
     """Lets xmllint validate each element as a document of its own; raises AssertionError with its words."""
     with tempfile.TemporaryDirectory() as folder:
         schema = os.path.join(folder, "ports.xsd")
-        with open(schema, "w", encoding="utf-8") as file:
-            file.write(_schema_of(schemas, ports))
+        pathlib.Path(schema).write_text(_schema_of(schemas, ports), "utf-8")
         names = [os.path.join(folder, "%d.xml" % number) for number in range(len(elements))]
         for name, element in zip(names, elements):
-            with open(name, "wb") as file:
-                file.write(etree.tostring(_without_envelope_attributes(element), with_tail=False))
+            pathlib.Path(name).write_bytes(etree.tostring(_without_envelope_attributes(element), with_tail=False))
         run = subprocess.run(["xmllint", "--noout", "--nonet", "--schema", schema, *names], capture_output=True, text=True)
         assert run.returncode == 0, [line for line in run.stderr.splitlines() if not line.endswith(" validates")]

@@ -1,6 +1,7 @@
 """What the tests of servers and networks share: programs on free ports, certificates, and calls by call_client."""
 import contextlib
 import os
+import pathlib
 import re
 import shutil
 import socket
@@ -58,15 +59,13 @@ def server(folder, name, arguments, configuration, count=1, **options):
     for _ in range(5):
         ports = [free_port() for _ in range(count)]
         text = filled(configuration, {"folder": folder, **{"port%d" % number: str(port) for number, port in enumerate(ports)}})
-        with open(file, "w", encoding="utf-8") as out:
-            out.write(text)
+        pathlib.Path(file).write_text(text, "utf-8")
         with open(log_file, "w", encoding="utf-8") as log:
             process = _started([argument.replace("@file@", file) for argument in arguments], ports, log, options)
         if process:
             break
     else:
-        with open(log_file, encoding="utf-8") as log:
-            raise RuntimeError("%s did not start: %s" % (name, log.read()))
+        raise RuntimeError("%s did not start: %s" % (name, pathlib.Path(log_file).read_text("utf-8")))
     try:
         yield ports
     finally:
@@ -94,8 +93,7 @@ def password_file(path):
     """Makes a file of passwords as web servers read it: that of Aladdin is "sesame"."""
     made = subprocess.run(["openssl", "passwd", "-apr1", "-salt", "x", "sesame"], check=True, capture_output=True,
                           text=True)
-    with open(path, "w", encoding="utf-8") as file:
-        file.write("Aladdin:" + made.stdout)
+    pathlib.Path(path).write_text("Aladdin:" + made.stdout, "utf-8")
 
 
 def _openssl(*arguments):
@@ -114,8 +112,7 @@ def certificates(folder):
                  "-keyout", path(name + ".key"), "-out", path(name + ".crt"))
         with open(path(name + ".pem"), "w", encoding="utf-8") as both:
             for part in (".crt", ".key"):
-                with open(path(name + part), encoding="utf-8") as file:
-                    both.write(file.read())
+                both.write(pathlib.Path(path(name + part)).read_text("utf-8"))
     return folder
 
 

@@ -6,6 +6,7 @@ README names; nothing is installed outside a folder for the time of the test.
 """
 import glob
 import os
+import pathlib
 import re
 import subprocess
 import sys
@@ -45,8 +46,7 @@ def check_packages(readme, prefix):
 
 
 def main():
-    with open(os.path.join(source, "README.md"), encoding="utf-8") as file:
-        readme = file.read()
+    readme = pathlib.Path(source, "README.md").read_text("utf-8")
     with tempfile.TemporaryDirectory() as folder:
         prefix = os.path.join(folder, "usr")
         run(found(r"`(cmake --install [^`]*)`", readme).replace("build/release", build) + " --prefix " + prefix, folder)
@@ -56,8 +56,7 @@ def main():
         with zuv_service.running(os.path.join(build, "zuv-service")) as address:
             with open(os.path.join(folder, "host.cpp"), "w", encoding="utf-8") as file:
                 file.write(found(r"^```cpp\n(.*?)^```", readme).replace("http://127.0.0.1:9080", address))
-            with open(os.path.join(folder, "CMakeLists.txt"), "w", encoding="utf-8") as file:
-                file.write(PROJECT + found(r"^```cmake\n(.*?)^```", readme))
+            pathlib.Path(folder, "CMakeLists.txt").write_text(PROJECT + found(r"^```cmake\n(.*?)^```", readme), "utf-8")
             for command, host in ((found(r"``(g\+\+ .*?)``", readme), "./a.out"), ("cmake -B b && cmake --build b", "b/host")):
                 run(command, folder, **where)
                 assert run(host, folder, **where).startswith("kept as urn:zuv:profile:"), host

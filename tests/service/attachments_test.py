@@ -3,6 +3,7 @@
 import base64
 import json
 import os
+import pathlib
 import random
 import shutil
 import signal
@@ -58,14 +59,12 @@ class attachments(unittest.TestCase):
         return [name for name in os.listdir(self.database + "-data") if not name.startswith("arriving-")]
 
     def content(self, name):
-        with open(os.path.join(self.folder, name), "rb") as file:
-            return file.read()
+        return pathlib.Path(self.folder, name).read_bytes()
 
     def test_they_come_back_as_they_were_in_every_form(self):
         data = {"large": some_bytes(300001), "small": b"in memory"}
         for name, content in data.items():
-            with open(os.path.join(self.folder, name), "wb") as file:
-                file.write(content)
+            pathlib.Path(self.folder, name).write_bytes(content)
         inner = "<c:attachment><c:dataHandler>cid:small</c:dataHandler></c:attachment>"  # attachments may hold attachments
         document = ('<s:createRequest xmlns:s="%s/StatusReport" xmlns:c="%s"><c:attachment>%s<c:dataHandler>cid:la%%72ge'
                     "</c:dataHandler></c:attachment></s:createRequest>" % (zuv.COMMON, zuv.COMMON, inner))
@@ -209,8 +208,7 @@ class attachments(unittest.TestCase):
             uri = exchange(address, mime_post(report("cid:data"), [part("data", b"kept")])).first("thisURI")
             address.process.kill()
         for name in "arriving-ABCDEF", "00000000-0000-4000-8000-000000000000":
-            with open(os.path.join(self.database + "-data", name), "w", encoding="ascii") as left:
-                left.write("nobody's")
+            pathlib.Path(self.database + "-data", name).write_text("nobody's", "ascii")
         with zuv.service("--database", self.database) as address:
             self.assertEqual(len(os.listdir(self.database + "-data")), 1, "what an earlier end left over is removed")
             self.assertIn("\r\n\r\nkept\r\n--", exchange(address, mime_post(about(uri, "get"))))
