@@ -1,5 +1,5 @@
 #!/usr/bin/python3
-"""Calls through servers and proxies as they are met in the field: nginx, HAProxy and stunnel before zuv-service, nginx also before
+"""Calls through servers and proxies as they are met in the field: nginx and HAProxy before zuv-service, nginx also before
 a service on an independent stack, Squid and Tinyproxy. Elsewhere: sessions of TLS (tests/unit/tls_test.cpp).
 
 Usage: servers.py CALL_CLIENT ZUV ZUV_SERVICE NPM_FOLDER SCHEMA_DIR. All run from a directory of their own, on free ports of the
@@ -231,14 +231,6 @@ def through_haproxy(caller, folder, words):
         caller.run("HAProxy, service silent", plain + "silent", codes=504, least_ms=900)
 
 
-def through_stunnel(caller, folder, words):
-    with stunnel(folder, words["zuv"]) as (port,):
-        endpoint = "https://localhost:%d%s" % (port, PATH)
-        trust = ["--ca", os.path.join(folder, "ca.pem")]
-        caller.run("stunnel", endpoint, *trust, "--keep-alive", "--calls", 30, "--size", 30000, codes=0, connections=1)
-        caller.run("stunnel, anew each time", endpoint, *trust, "--calls", 10, codes=0, connections=10)
-
-
 def all_ways(caller, name, proxy, plain, secure, trust, locked):
     """Through one proxy: plain and CONNECT, with the password where one is wanted."""
     through = ["--proxy", "127.0.0.1", "--proxy-port", proxy]
@@ -294,7 +286,7 @@ def main():
                  "silent": str(silent.getsockname()[1]), "dead": str(dead.getsockname()[1])}
         profiles_through_nginx(program, folder, words, False)
         profiles_through_nginx(program, folder, {**words, "zuv": chunked.removeprefix("http://")}, True)
-        for part in through_nginx, through_haproxy, through_stunnel, through_proxies:
+        for part in through_nginx, through_haproxy, through_proxies:
             part(caller, folder, words)
 
 
