@@ -1,11 +1,12 @@
 // soak_test.cpp - one proxy, very many calls: it stays as small and as fast as it was at the beginning, and
 // so does the reference service.
 //
+// Elsewhere: calls in memory, by their allocations (call_allocation_test.cpp).
+//
 // ZUV_SOAK_CALLS in the environment: how many calls each test makes.
 #include <chrono>
 #include <csignal>
 
-#include "support/call_wire.h"
 #include "support/scripted_client.h"
 #include "support/socket_calls.h"
 
@@ -211,34 +212,6 @@ TEST(long_run, over_tls)
         return caller.call(2000) == 0;
     });
     EXPECT_EQ(caller.connections, calls() / ANEW);
-}
-
-TEST(long_run, in_memory)
-{
-    rich_document document;
-    call_wire wire;
-    ProfileSoapBindingProxy proxy(static_cast<int>(MODE_KEEP_ALIVE));
-    wire.carry(proxy);
-    const std::string answer = http_answer(
-        "<E:Envelope xmlns:E=\"http://schemas.xmlsoap.org/soap/envelope/\""
-        " xmlns:p=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0/Profile\""
-        " xmlns:c=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0\"><E:Header><c:header><c:transactionId>t"
-        "</c:transactionId></c:header></E:Header><E:Body><p:setResponse><p:thisURI id=\"u\">urn:1</p:thisURI>"
-        "<p:thisURI href=\"#u\"/><c:contact href=\"#c\"/><c:contact id=\"c\"><c:name>n</c:name></c:contact>"
-        "<c:credentials><c:certificate>AAEC/w==</c:certificate></c:credentials></p:setResponse></E:Body>"
-        "</E:Envelope>");
-    __protocolProfile__setResponse response{};
-    soak([&](int) {
-        wire.sent.clear();
-        wire.answers.push_back(answer);
-        const bool right = proxy.set(&document.profile, response) == 0 &&
-                           response.result->contact.size() == 2 &&
-                           response.result->contact[0] == response.result->contact[1];
-        proxy.soap_noheader(); // the one received
-        proxy.destroy();
-        return right;
-    });
-    EXPECT_EQ(1, wire.opened);
 }
 
 } // namespace

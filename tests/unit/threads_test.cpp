@@ -103,18 +103,7 @@ TEST_P(proxy_threads, call_by_proxies_of_their_own)
     EXPECT_EQ(server.connections(), THREADS * (CALLS / ANEW));
 }
 
-TEST_P(proxy_threads, call_by_copies_of_one_context)
-{
-    const crowd_server server(GetParam());
-    const client settings(server);
-    on_threads([&] {
-        client own(settings);
-        call_all(own);
-    });
-    EXPECT_EQ(settings.connections, 0);
-}
-
-TEST_P(proxy_threads, share_a_plug_in)
+TEST_P(proxy_threads, call_by_copies_of_one_context_and_share_its_plug_in)
 {
     const crowd_server server(GetParam());
     for (const auto create : {share, share_and_note}) {
@@ -126,6 +115,7 @@ TEST_P(proxy_threads, share_a_plug_in)
                 client own(settings);
                 call_all(own);
             });
+            EXPECT_EQ(settings.connections, 0);
         }
         EXPECT_GT(counted.received, THREADS * CALLS * 100L);
         EXPECT_EQ(counted.contexts, 0);
