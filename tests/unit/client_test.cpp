@@ -343,6 +343,9 @@ TEST_F(client_reports, and_texts_say_what_ended_a_call)
 {
     using options = zuv::options;
     using text = std::string;
+    constexpr std::size_t LARGE = 1 << 24;
+    std::atomic<bool> over = false; // the call, for a peer that neither reads nor ends
+    const auto slow_to_send = [](options &wanted, text &) { wanted.send_limit = 50ms; };
     const struct {
         const char *rule;
         bool tls;
@@ -351,6 +354,7 @@ TEST_F(client_reports, and_texts_say_what_ended_a_call)
         script first;
         std::function<void(options &wanted, text &endpoint)> change = {};
         const char *refusal = "";
+        std::size_t length = 6; // of the name in the request
     } rows[] = {
         {"closed", false, ENDED_BY_PEER, "The peer closed the connection without an answer",
          after_request(CLOSE)},
@@ -363,6 +367,16 @@ TEST_F(client_reports, and_texts_say_what_ended_a_call)
          [](options &wanted, text &) { wanted.recv_limit = 50ms; }},
         {"silent for the whole call", true, ENDED_BY_CALL_LIMIT, "call limit", STAY_SILENT,
          [](options &wanted, text &) { wanted.total_limit = 200ms; }},
+        {"reads nothing of a large request", false, ENDED_BY_SEND_LIMIT, "(50000us send delay)",
+         [&](line &) { over.wait(false); }, slow_to_send, "", LARGE},
+        {"reads nothing under TLS", true, ENDED_BY_SEND_LIMIT, "(50000us send delay)",
+         [&](line &) { over.wait(false); }, slow_to_send, "", LARGE},
+        {"ends while a large request is sent", false, ENDED_BY_PEER,
+         "End of file or no input: ", [](line &end) { end.bytes(100000); }, nullptr, "", LARGE},
+        {"an alert for a handshake", false, ENDED_BY_NOTHING,
+         "alert handshake failure: SSL_connect error in tcp_connect()",
+         [](line &end) { end.send(text("\x15\x03\x03\x00\x02\x02\x28", 7)); },
+         [](options &, text &endpoint) { endpoint.insert(4, "s"); }},
         {"another answer", false, ENDED_BY_NOTHING, "not a SOAP message: it is of type text/html",
          after_request([](line &end) {
              end.send("HTTP/1.1 200 OK\r\nContent-Type: text/html; charset=x\r\n\r\n<html></html>");
@@ -385,13 +399,16 @@ TEST_F(client_reports, and_texts_say_what_ended_a_call)
     };
     for (const auto &row : rows) {
         SCOPED_TRACE(row.rule);
+        over = false;
         const scripted::server peer(row.first, row.tls);
         zuv::options wanted = trusting();
         std::string endpoint = peer.endpoint();
         if (row.change)
             row.change(wanted, endpoint);
         zuv::profile_client client(endpoint, wanted);
-        const profile_result result = create_one(client);
+        const profile_result result = create_one(client, std::string(row.length, 'x'));
+        over = true;
+        over.notify_all();
         EXPECT_EQ(client.report().ended_by, row.ended_by);
         EXPECT_NE(result.failure().message().find(row.words), std::string::npos)
             << result.failure().message();

@@ -1,10 +1,9 @@
 // hostile_server_test.cpp - calls to a server that does what no healthy server does.
 //
 // Each call ends within its time limits, with its own answer or an error, and never with another's answer.
-// The table of what was found is printed.
+// The table of what was found is printed. Elsewhere: what a client meets before an answer (client_test.cpp).
 #include <atomic>
 #include <chrono>
-#include <future>
 
 #include "support/scripted_client.h"
 #include "support/socket_calls.h"
@@ -213,56 +212,6 @@ TEST_F(hostile_server, costs_the_call_and_nothing_more)
     for (const bool tls : {false, true})
         for (const hostility &peer : all_peers())
             call_all(peer, tls);
-}
-
-// What a client meets before a first answer, by the raw socket of the peer. Elsewhere: silence (tcp_test.cpp), a peer
-// without TLS (client_test.cpp).
-const struct {
-    const char *name;
-    void (*meet)(int socket, const std::shared_future<void> &over);
-    bool tls;
-    std::size_t padding; // bytes of text in the request
-    int code;
-    const char *detail; // of the fault
-    int least_ms;       // of the limits below
-} OBSTACLES[] = {
-    {"reads nothing of a large request", [](int, const std::shared_future<void> &over) { over.wait(); },
-     false, 50000000, SOAP_EOF, "(null)", -BRIEF_US / 1000},
-    {"an alert for a handshake",
-     [](int socket, const std::shared_future<void> &) {
-         loopback::write_text(socket, std::string("\x15\x03\x03\x00\x02\x02\x28", 7));
-     },
-     true, 0, SOAP_TLS_ERROR, "SSL_connect error in tcp_connect()", 0},
-    {"ends while a large request is sent",
-     [](int socket, const std::shared_future<void> &) { loopback::read_bytes(socket, 100000); }, false,
-     50000000, SOAP_EOF, "(null)", 0},
-};
-
-TEST_F(hostile_server, meets_a_call_before_its_answer)
-{
-    for (const auto &o : OBSTACLES) {
-        SCOPED_TRACE(o.name);
-        std::promise<void> over;
-        const loopback::peer peer([&, end = over.get_future().share()](int socket) { o.meet(socket, end); });
-        const server well(serve_well, o.tls);
-        client caller(well);
-        const std::string endpoint =
-            (o.tls ? "https://peer.test:" : "http://peer.test:") + std::to_string(peer.port()) + "/";
-        const std::string good = std::exchange(caller.endpoint, endpoint);
-        caller.proxy.connect_timeout = 1;
-        caller.proxy.send_timeout = BRIEF_US;
-        const int code = caller.call(o.padding);
-        over.set_value();
-        const std::string detail = text_of(soap_fault_detail_value(&caller.proxy));
-        std::printf("%-35s code %2d %5d ms %s\n", o.name, code, caller.milliseconds, detail.c_str());
-        EXPECT_EQ(code, o.code);
-        EXPECT_EQ(detail, o.detail);
-        EXPECT_GE(caller.milliseconds, o.least_ms);
-        EXPECT_LT(caller.milliseconds, o.least_ms + SLACK_MS);
-        caller.endpoint = good;
-        caller.proxy.connect_timeout = caller.proxy.send_timeout = 0; // they were for the obstacle
-        EXPECT_EQ(caller.call(), 0);
-    }
 }
 
 // A call whose peer's bytes come one by one, each taking seconds by the clock.

@@ -169,20 +169,6 @@ TEST_F(tls, a_call_on_a_kept_connection_costs_three_system_calls_and_two_more_wi
     }
 }
 
-TEST_F(tls, transfers_end_when_time_is_up)
-{
-    std::promise<void> over;
-    tls_peer server(server_for(BY_NAME), [&](SSL *) { over.get_future().wait(); });
-    connected ctx(server.port(), -20000);
-    char byte;
-    EXPECT_EQ(tcp_recv(ctx.get(), &byte, 1), 0u);
-    EXPECT_EQ(ctx->errno_value, 0);
-    const std::string message(1 << 24, 'm');
-    EXPECT_EQ(tcp_send(ctx.get(), message.data(), message.size()), -1);
-    EXPECT_EQ(ctx->errno_value, 0);
-    over.set_value();
-}
-
 TEST_F(tls, messages_of_the_protocol_alone_are_read_no_longer_than_the_call_may_last)
 {
     std::promise<void> sent, over;
