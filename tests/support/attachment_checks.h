@@ -42,17 +42,4 @@ inline void expect_survival_of_every_refused_allocation(const std::string &bytes
         11, [&] { return std::make_unique<reception>(bytes); }, [](reception &read) { return read.run(); });
 }
 
-// Megabytes that look like delimiters go out and come back.
-inline void expect_megabytes_unchanged(std::uint32_t output_mode, std::uint32_t input_mode)
-{
-    std::string bytes(3000000, '\0');
-    for (std::size_t i = 0; i < bytes.size(); ++i)
-        bytes[i] = "\r\n-=x\0\xFFy"[i * 2654435761U >> 13 & 7];
-    memory_wire wire(0, output_mode);
-    ASSERT_EQ(send(wire, {make_value(bytes, "cid:big", "a/b")}), 0);
-    reception read(wire.sent(), input_mode, 1000, 50000);
-    ASSERT_EQ(read.run(), 0);
-    EXPECT_TRUE(read.values[0].bytes() == bytes);
-}
-
 } // namespace attachment_exchange

@@ -308,22 +308,6 @@ TEST_F(binding, the_registry_makes_finds_and_destroys_by_id)
     EXPECT_EQ(0, soap_type_by_name("protocol:address"));
 }
 
-TEST_F(binding, a_vector_named_by_a_reference_is_filled_through_its_id)
-{
-    auto *texts = static_cast<std::vector<std::string> *>(
-        soap_instantiate(&ctx, SOAP_TYPE_vector_of_xsd__string, nullptr, nullptr, nullptr));
-    texts->resize(2);
-    const std::string text = "late";
-    soap_insert_into_vector(&ctx, SOAP_TYPE_xsd__string, SOAP_TYPE_vector_of_xsd__string, texts, 1, &text,
-                            sizeof text);
-    EXPECT_EQ("late", texts->at(1));
-    const auto *read_back = read<protocolProfile__ProfileContent>(
-        "<p><protocolProfile:thisURI href=\"#t\"/><protocolProfile:thisURI "
-        "id=\"t\">urn:1</protocolProfile:thisURI></p>");
-    ASSERT_NE(nullptr, read_back) << ctx.error;
-    EXPECT_EQ((std::vector<std::string>{"urn:1", "urn:1"}), read_back->thisURI);
-}
-
 // What a reader that begins anew with each text gives: the error and where the reading ended, or the profile.
 std::string outcome_of(memory_wire &ctx, const std::string &content, std::uint32_t mode)
 {

@@ -48,20 +48,6 @@ TEST_F(context, ends_quietly_and_only_once_and_may_start_again)
     EXPECT_TRUE(is_open(0) && is_open(1));
 }
 
-TEST_F(context, the_end_closes_what_the_context_opened)
-{
-    int pair[2];
-    ASSERT_EQ(socketpair(AF_UNIX, SOCK_STREAM, 0, pair), 0);
-    {
-        soap ctx;
-        ctx.master_socket = pair[0];
-        ctx.socket = pair[1];
-        ctx.output_mode = MODE_UDP;
-    }
-    EXPECT_FALSE(is_open(pair[0]));
-    EXPECT_FALSE(is_open(pair[1])) << "of a datagram context too";
-}
-
 // A class with members where the base's padding lies, deleted through the base.
 struct derived : soap {
     derived() : soap(MODE_STRICT) {}

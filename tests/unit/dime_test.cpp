@@ -221,9 +221,4 @@ TEST(dime_in, survives_every_refused_allocation)
         record(ME, MEDIA, "b", "", "y"));
 }
 
-TEST(dime, carries_megabytes_unchanged)
-{
-    expect_megabytes_unchanged(SENDING, 0);
-}
-
 } // namespace

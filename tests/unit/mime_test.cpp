@@ -603,7 +603,10 @@ TEST(streams, of_the_host_take_what_is_received_or_end_the_message)
 // A whole HTTP request in each framing, read as its receiver would.
 TEST(http_exchange, carries_attachments_in_every_framing)
 {
-    const std::string bytes = "some bytes", more(70000, 'm');
+    const std::string bytes = "some bytes";
+    std::string more(300000, '\0'); // looks like delimiters
+    for (std::size_t i = 0; i < more.size(); ++i)
+        more[i] = "\r\n-=x\0\xFFy"[i * 2654435761U >> 13 & 7];
     for (const std::uint32_t form : {MODE_MTOM, MTOM, std::uint32_t{0}}) { // 0: DIME
         for (const std::uint32_t framing :
              {MODE_DIRECT, MODE_BUFFERED, MODE_STORE, MODE_CHUNKED, MODE_DIRECT | MODE_DEFLATE,
@@ -622,11 +625,6 @@ TEST(http_exchange, carries_attachments_in_every_framing)
                       "[cid:i a/b some bytes][cid:id2 c/d " + more + "]");
         }
     }
-}
-
-TEST(mime, carries_megabytes_unchanged)
-{
-    expect_megabytes_unchanged(SENDING | MTOM, MODE_MTOM);
 }
 
 } // namespace

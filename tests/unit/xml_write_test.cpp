@@ -492,15 +492,6 @@ TEST(xml_write, short_ways_write_what_the_long_ways_do)
                   document(mode, [&](soap *ctx) { many(ctx, by_long_ways); }));
 }
 
-TEST(xml_write, a_failed_send_ends_the_call)
-{
-    writer w;
-    w.ctx->on_send = [](soap *, const char *, std::size_t) -> int { return SOAP_TCP_ERROR; };
-    w.ctx->mode = MODE_DIRECT;
-    EXPECT_EQ(soap_element_out_begin(w.ctx.get(), "a:e", 1, "t"), SOAP_TCP_ERROR);
-    EXPECT_EQ(soap_text_write(w.ctx.get(), "t", 0), SOAP_TCP_ERROR);
-}
-
 // --- Values.
 
 TEST(xml_write, arrays_are_typed_by_version)
