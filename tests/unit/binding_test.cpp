@@ -276,6 +276,36 @@ TEST_F(binding, references_reach_texts_by_value_and_their_errors_have_codes)
     }
 }
 
+// Values that several members share, whichever of them has it and whichever comes first.
+TEST_F(binding, references_reach_switches_words_and_lists_of_words)
+{
+    const auto both_ways = [](const std::string &one, const std::string &other, const std::string &value) {
+        return std::vector<std::string>{
+            "<u><" + one + " id=\"v\">" + value + "</" + one + "><" + other + " href=\"#v\"/></u>",
+            "<u><" + one + " href=\"#v\"/><" + other + " id=\"v\">" + value + "</" + other + "></u>"};
+    };
+    const std::string order = "protocolUpdateOrder:", word = "protocol:contactPreference";
+    for (const std::string &xml : both_ways(order + "includeData", order + "includeMetaData", "false")) {
+        const auto *content = read<protocolUpdateOrder__UpdateOrderContent>(xml);
+        ASSERT_NE(nullptr, content) << ctx.error << xml;
+        EXPECT_TRUE(!content->includeData && !content->includeMetaData) << xml;
+    }
+    for (const std::string &xml : both_ways(order + "includePatches", order + "notifyWhenComplete", "true")) {
+        const auto *content = read<protocolUpdateOrder__UpdateOrderContent>(xml);
+        ASSERT_NE(nullptr, content) << ctx.error << xml;
+        EXPECT_TRUE(content->includePatches && *content->includePatches && content->notifyWhenComplete &&
+                    *content->notifyWhenComplete)
+            << xml;
+    }
+    for (const std::string &xml : both_ways(word, word, "fax")) {
+        const auto *contact = read<protocol__Contact>(xml);
+        ASSERT_NE(nullptr, contact) << ctx.error << xml;
+        EXPECT_EQ((std::vector{protocol__ContactPreference::fax, protocol__ContactPreference::fax}),
+                  contact->contactPreference)
+            << xml;
+    }
+}
+
 TEST_F(binding, strict_reading_takes_no_object_with_wanted_members_by_reference)
 {
     const auto code_of = [this]<class T>(const T &) {
