@@ -102,8 +102,10 @@ int transfers::end(soap *ctx, int code)
         const std::string made = name + ".part";
         if (code != SOAP_OK || !each->whole)
             std::remove(made.c_str());
-        else if (std::rename(made.c_str(), name.c_str()) != 0)
+        else if (std::rename(made.c_str(), name.c_str()) != 0) {
             code = refuse(ctx, "can't write the file of an attachment", name);
+            std::remove(made.c_str());
+        }
     }
     incoming.clear();
     return code;

@@ -633,7 +633,7 @@ TEST(client_attachments, pass_between_files_memory_and_functions)
                 : answer_of("multipart/related; boundary=B; start=\"<m>\"; type=\"text/xml\"", mime);
         wired<zuv::status_report_client> to_memory;
         auto &[wire, client] = to_memory;
-        std::uint64_t reported = 0;
+        std::uint64_t reported = 0, kept = 0;
         int asked = 0;
         std::string second;
         zuv::attachments files;
@@ -643,7 +643,7 @@ TEST(client_attachments, pass_between_files_memory_and_functions)
             .send(zuv::memory_part("of the memory"))
             .receive([&](const zuv::received_part &about) {
                 return about.id.find("one") != about.id.npos
-                           ? zuv::to_file(into)
+                           ? zuv::to_file(into, [&](std::uint64_t done, std::uint64_t) { kept = done; })
                            : zuv::to_callback([&second](const char *data, std::size_t size) {
                                  second.append(data, size);
                                  return true;
@@ -657,6 +657,7 @@ TEST(client_attachments, pass_between_files_memory_and_functions)
         EXPECT_EQ(reported, 1111U);
         EXPECT_EQ(second, "second");
         EXPECT_EQ(bytes_of(into), "first bytes");
+        EXPECT_EQ(kept, 11U);
         EXPECT_EQ(result.attachments().size(), 2U);
         for (const char *const part : {"of the file", "of the memory"})
             EXPECT_NE(wire.sent.find(part), std::string::npos) << part;
@@ -672,6 +673,30 @@ TEST(client_attachments, pass_between_files_memory_and_functions)
         EXPECT_EQ(asked, 2);
         EXPECT_EQ(bytes_of(into), "first bytes");
         EXPECT_FALSE(std::filesystem::exists(into + ".part"));
+
+        // What can't be kept ends the call, says why, and leaves no file.
+        const std::string folder = into + ".d", full = into + ".full";
+        std::filesystem::create_directory(folder);
+        std::filesystem::create_symlink("/dev/full", full + ".part");
+        for (const auto &[refused, words] :
+             {std::pair(zuv::to_file("/nowhere/at/all"), "attachment: /nowhere/at/all"),
+              std::pair(zuv::to_file(folder), "client_got.d"),
+              std::pair(zuv::to_file(full), "client_got.full"),
+              std::pair(zuv::to_callback([](const char *, std::size_t) { return false; }),
+                        "doesn't want it")}) {
+            wire.answers.assign(1, answer);
+            zuv::attachments unwanted;
+            unwanted.form(form).receive([&sink = refused](const zuv::received_part &about) {
+                return about.id.find("one") != about.id.npos ? sink : zuv::sink();
+            });
+            const auto failed = client.create(report, zuv::extras().carry(unwanted));
+            ASSERT_FALSE(failed) << words;
+            EXPECT_NE(failed.failure().message().find(words), std::string::npos)
+                << failed.failure().message();
+        }
+        for (const std::string &made : {folder + ".part", full + ".part", full})
+            EXPECT_FALSE(std::filesystem::exists(std::filesystem::symlink_status(made))) << made;
+        std::filesystem::remove(folder);
 
         // Without extras the same client sends plain messages, and what comes is kept in memory.
         wire.sent.clear();
