@@ -92,25 +92,23 @@ TEST_F(binding, xsi_type_makes_the_derived_class_and_an_unknown_one_the_base)
     EXPECT_EQ(SOAP_TYPE_protocol__MetaData, query->metaData[1]->soap_type());
     EXPECT_EQ(SOAP_TYPE_protocol__MetaData, query->metaData[2]->soap_type()) << "a class outside the family";
     // Among white space, and by prefixes that no string of Latin-1 may hold.
-    const struct {
-        const char *declared, *used;
-        std::uint32_t mode;
-    } prefixes[] = {{"p", "p", 0},
-                    {"\xC3\xA9", "\xC3\xA9", 0},
-                    {"\xC3\xA9", "&#xE9;", 0},
-                    {"\xE9", "\xE9", MODE_LATIN1},
-                    {"\xE9", "&#233;", MODE_LATIN1},
-                    {"\xD1\x82\xD0\xB8\xD0\xBF", "\xD1\x82\xD0\xB8\xD0\xBF", 0}};
-    for (const auto &c : prefixes)
+    const std::tuple<const char *, const char *, std::uint32_t> prefixes[] = {
+        {"p", "p", 0},
+        {"\xC3\xA9", "\xC3\xA9", 0},
+        {"\xC3\xA9", "&#xE9;", 0},
+        {"\xE9", "\xE9", MODE_LATIN1},
+        {"\xE9", "&#233;", MODE_LATIN1},
+        {"\xD1\x82\xD0\xB8\xD0\xBF", "\xD1\x82\xD0\xB8\xD0\xBF", 0}};
+    for (const auto &[declared, used, mode] : prefixes)
         for (const std::uint32_t strings : {0U, MODE_UTF_STRINGS}) {
             const auto *derived = read<protocolUpdateOrder__UpdateIdExpansionDetail>(
-                std::string("<d><protocolUpdateOrder:metaData type='&#xE9;' xsi:type=' \n") + c.used +
-                    ":UpdateMetaData\t' xmlns:" + c.declared +
+                std::string("<d><protocolUpdateOrder:metaData type='&#xE9;' xsi:type=' \n") + used +
+                    ":UpdateMetaData\t' xmlns:" + declared +
                     "='http://www.zuv.example/xmlns/b2b/zuv/v1.0/UpdateOrder'/></d>",
-                c.mode | strings);
-            ASSERT_NE(nullptr, derived) << ctx.error << c.declared;
+                mode | strings);
+            ASSERT_NE(nullptr, derived) << ctx.error << declared;
             EXPECT_EQ(SOAP_TYPE_protocolUpdateOrder__UpdateMetaData, derived->metaData[0]->soap_type())
-                << c.declared << " in mode " << (c.mode | strings);
+                << declared << " in mode " << (mode | strings);
         }
     const std::string undeclared = "<d><protocolUpdateOrder:metaData xsi:type=\"undeclared:MetaData\"/></d>";
     EXPECT_NE(nullptr, read<protocolUpdateOrder__UpdateIdExpansionDetail>(undeclared));

@@ -151,11 +151,7 @@ TEST(buffered_in, a_false_mark_keeps_its_last_byte)
 
 TEST(buffered_in, bodies_read_the_same_at_every_split)
 {
-    struct {
-        const char *rule;
-        std::string body;
-        outcome expected;
-    } rows[] = {
+    const std::tuple<const char *, std::string, outcome> rows[] = {
         {"two chunks", "3\r\n<a>\r\n4\r\n</a>\r\n0\r\n\r\n", {0, "<a></a>", 0, true}},
         {"extensions", "4;x=1\r\n<a/>\r\n0;y\r\n\r\n", {0, "<a/>", 0, true}},
         {"no carriage returns", "4\n<a/>\n0\n\n", {0, "<a/>", 0, true}},
@@ -171,8 +167,8 @@ TEST(buffered_in, bodies_read_the_same_at_every_split)
         {"a chunk cut short", "9\r\n<a/>", {0, "<a/>", 0, false}},
         {"the largest size", "FFFFFFFFFFFFFFFF\r\n<a/>", {0, "<a/>", 0, false}},
     };
-    for (const auto &row : rows)
-        check_every_reading(row.rule, CHUNKED_HEAD + row.body, row.expected);
+    for (const auto &[rule, body, expected] : rows)
+        check_every_reading(rule, CHUNKED_HEAD + body, expected);
     check_every_reading("a length", with_length("<a/>", 4), {0, "<a/>", 0, true});
 
     const std::string text = "<a>compressed compressed compressed</a>";
@@ -213,10 +209,7 @@ TEST(buffered_in, bodies_read_the_same_at_every_split)
 TEST(buffered_in, the_framing_settles_the_result_and_whether_the_connection_is_kept)
 {
     const std::string typed = "Content-Type: text/xml\r\nContent-Length: 0\r\n\r\n";
-    const struct {
-        std::string bytes;
-        outcome expected;
-    } rows[] = {
+    const std::pair<std::string, outcome> rows[] = {
         {with_length("<a/>", 3), {0, "<a/>", 0, false}},
         {with_length("<a/>", 5), {0, "<a/>", 0, false}},
         {OK_HEAD + "\r\n<a/>", {0, "<a/>", 0, false}},
@@ -228,8 +221,8 @@ TEST(buffered_in, the_framing_settles_the_result_and_whether_the_connection_is_k
         {"HTTP/1.1 500 Oops\r\nContent-Length: 5\r\n\r\n", {500, "", 0, false}},
         {"POST / HTTP/1.1\r\n" + typed, {SOAP_EOF, "", 0, false}},
     };
-    for (const auto &row : rows)
-        EXPECT_EQ(read_on_kept_connection(row.bytes), row.expected) << row.bytes;
+    for (const auto &[bytes, expected] : rows)
+        EXPECT_EQ(read_on_kept_connection(bytes), expected) << bytes;
 }
 
 TEST(buffered_in, lines_between_chunks_are_bounded)
@@ -268,22 +261,18 @@ TEST(buffered_in, what_the_reader_left_of_a_body_is_dropped_up_to_a_bound)
 
 TEST(buffered_in, no_more_is_asked_for_after_the_end)
 {
-    const struct {
-        const char *rule;
-        std::string message;
-        std::size_t receives;
-    } rows[] = {
+    const std::tuple<const char *, std::string, std::size_t> rows[] = {
         {"the length is zero", OK_HEAD + "Content-Length: 0\r\n\r\n", 1},
         {"the end of the length", with_length("<a>", 3), 1},
         {"the end of the connection", "<a>", 2},
     };
-    for (const auto &row : rows) {
-        SCOPED_TRACE(row.rule);
-        kept_wire wire(row.message);
+    for (const auto &[rule, message, receives] : rows) {
+        SCOPED_TRACE(rule);
+        kept_wire wire(message);
         read_message(wire);
         EXPECT_EQ(soap_recv_byte(&wire), -1);
         EXPECT_EQ(soap_recv_skip(&wire, 1), -1);
-        EXPECT_EQ(wire.receives, row.receives);
+        EXPECT_EQ(wire.receives, receives);
     }
 }
 

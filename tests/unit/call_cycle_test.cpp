@@ -154,10 +154,7 @@ TEST_F(call_cycle, an_answer_cut_anywhere_is_an_error_until_its_envelope_is_whol
 
 TEST_F(call_cycle, maps_fault_codes_in_both_versions)
 {
-    static const struct {
-        const char *version, *code;
-        int error;
-    } cases[] = {
+    static const std::tuple<const char *, const char *, int> cases[] = {
         {ENVELOPE_11, "E:Client", SOAP_CLIENT_FAULT},
         {ENVELOPE_11, "E:Server", SOAP_SERVER_FAULT},
         {ENVELOPE_11, "E:MustUnderstand", SOAP_MUST_UNDERSTAND},
@@ -170,10 +167,10 @@ TEST_F(call_cycle, maps_fault_codes_in_both_versions)
         {ENVELOPE_12, "E:Sender", SOAP_CLIENT_FAULT},
         {ENVELOPE_12, "E:Receiver", SOAP_SERVER_FAULT},
     };
-    for (const auto &c : cases) {
-        const bool v12 = std::string(c.version) == ENVELOPE_12;
-        EXPECT_EQ(c.error, get(v12 ? fault_12(c.code) : fault_11(c.code), c.version)) << c.code;
-        EXPECT_EQ(c.error, proxy.error);
+    for (const auto &[version, code, error] : cases) {
+        const bool v12 = std::string(version) == ENVELOPE_12;
+        EXPECT_EQ(error, get(v12 ? fault_12(code) : fault_11(code), version)) << code;
+        EXPECT_EQ(error, proxy.error);
         EXPECT_EQ(nullptr, response.result);
         ASSERT_NE(nullptr, proxy.soap_fault());
         EXPECT_STREQ("no such thing", proxy.soap_fault_string());

@@ -528,10 +528,7 @@ TEST(client_options, take_the_proxy_of_the_environment_when_asked)
     setenv("http_proxy", "http://plain.test:1", 1);
     setenv("https_proxy", "[::1]:2", 1);
     setenv("no_proxy", "exempt.test, .domain.test,ported.test:8080", 1);
-    const struct {
-        const char *endpoint, *host;
-        int port;
-    } rows[] = {
+    const std::tuple<const char *, const char *, int> rows[] = {
         {"http://a.test/", "plain.test", 1},
         {"HTTPS://a.test/", "::1", 2},
         {"http://exempt.test:7/x", "(null)", 0},
@@ -544,10 +541,10 @@ TEST(client_options, take_the_proxy_of_the_environment_when_asked)
     };
     zuv::options wanted;
     wanted.proxy_from_environment = true;
-    for (const auto &row : rows) {
-        zuv::profile_client client(row.endpoint, wanted);
-        EXPECT_EQ(text_of(client.context()->proxy_host), row.host) << row.endpoint;
-        EXPECT_EQ(row.port == 0 ? 0 : client.context()->proxy_port, row.port);
+    for (const auto &[endpoint, host, port] : rows) {
+        zuv::profile_client client(endpoint, wanted);
+        EXPECT_EQ(text_of(client.context()->proxy_host), host) << endpoint;
+        EXPECT_EQ(port == 0 ? 0 : client.context()->proxy_port, port);
     }
     EXPECT_EQ(zuv::profile_client("http://a.test/").context()->proxy_host, nullptr) << "not asked";
     for (const char *name : {"http_proxy", "https_proxy", "no_proxy"})

@@ -32,10 +32,7 @@ protected:
 
 TEST_F(dates, are_read_in_all_forms_and_zones)
 {
-    const struct {
-        const char *text;
-        const char *seconds;
-    } cases[] = {
+    const std::pair<const char *, const char *> cases[] = {
         {"2009-02-13T23:31:30.999Z", "1234567890"},
         {"20090213T23:31:30Z", "1234567890"},
         {"20090213T233130Z", "1234567890"},
@@ -57,8 +54,8 @@ TEST_F(dates, are_read_in_all_forms_and_zones)
         {"-2147483648-01-01T00:00:00Z", "refused"},
         {"2009-01-2147483647T2147483647:2147483647:2147483647-2147483647", "refused"},
     };
-    for (const auto &row : cases)
-        EXPECT_EQ(parsed(row.text), row.seconds) << row.text;
+    for (const auto &[text, seconds] : cases)
+        EXPECT_EQ(parsed(text), seconds) << text;
     std::time_t kept = 5;
     EXPECT_EQ(soap_datetime_parse(ctx.get(), nullptr, &kept), ctx->error);
     EXPECT_EQ(kept, 5);

@@ -166,11 +166,7 @@ TEST(dime_in, reports_what_is_wrong_with_a_message)
         return START + record(ME, MEDIA, "a", "t", "x", options);
     };
     const std::string begun = record(MB | CF, URI, "m", "", envelope("").substr(0, 101)); // with padding
-    const struct {
-        const char *rule;
-        std::string message;
-        int error;
-    } cases[] = {
+    const std::tuple<const char *, std::string, int> cases[] = {
         {"good", START + good, 0},
         {"version", START + with_byte(good, 0, 0x10), SOAP_DIME_VERSION},
         {"no end", START + record(0, MEDIA, "a", "t", "x"), SOAP_EOF},
@@ -191,8 +187,8 @@ TEST(dime_in, reports_what_is_wrong_with_a_message)
         {"options of the largest size", with_options(std::string("\1\2\xFF\xFFopt", 7)), SOAP_DIME_ERROR},
         {"options without a length", with_options("\1"), SOAP_DIME_ERROR},
     };
-    for (const auto &c : cases)
-        EXPECT_EQ(reception(c.message).run(), c.error) << c.rule;
+    for (const auto &[rule, message, error] : cases)
+        EXPECT_EQ(reception(message).run(), error) << rule;
     EXPECT_NE(reception(with_byte(START + good, 11, 10)).run(), 0) << "a record shorter than the message";
 }
 

@@ -56,10 +56,7 @@ std::string filled_text(int error)
 
 TEST(error_text, is_composed_of_what_is_known)
 {
-    static const struct {
-        int error;
-        const char *text;
-    } cases[] = {
+    static const std::pair<int, const char *> cases[] = {
         {-1, "End of file or no input: Operation interrupted or timed out"},
         {0, "Error 0"},
         {3, "Validation constraint violation: tag name or namespace mismatch in element 't:tag'"},
@@ -78,8 +75,8 @@ TEST(error_text, is_composed_of_what_is_known)
         {600, "Error 600"},
         {1001, "Error 1001"},
     };
-    for (const auto &c : cases)
-        EXPECT_EQ(filled_text(c.error), c.text) << c.error;
+    for (const auto &[error, text] : cases)
+        EXPECT_EQ(filled_text(error), text) << error;
 }
 
 TEST(error_text, every_code_has_a_text_of_its_own)

@@ -346,24 +346,20 @@ struct connecting_wire : memory_wire {
 
 TEST(connect, tries_a_list_until_an_endpoint_takes_the_connection)
 {
-    static const struct {
-        const char *endpoints;
-        std::size_t tried;
-        int result;
-    } cases[] = {
+    static const std::tuple<const char *, std::size_t, int> cases[] = {
         {"http://one/", 1, 0},
         {"http://dead/", 1, SOAP_TCP_ERROR},
         {"http://dead/ http://one/ http://two/", 2, 0},
         {"  http://dead1/  http://dead2/  ", 2, SOAP_TCP_ERROR},
         {"http://dead/ http://one/ ", 2, 0},
     };
-    for (const auto &c : cases) {
+    for (const auto &[endpoints, tried, result] : cases) {
         connecting_wire wire(0);
-        EXPECT_EQ(wire.call(c.endpoints), c.result) << c.endpoints;
-        EXPECT_EQ(wire.error, c.result);
-        EXPECT_EQ(wire.opened.size(), c.tried) << c.endpoints;
-        EXPECT_EQ(wire.sent().find("SOAPAction: \"urn:a\"\r\n") != std::string::npos, c.result == 0);
-        if (c.result == 0) {
+        EXPECT_EQ(wire.call(endpoints), result) << endpoints;
+        EXPECT_EQ(wire.error, result);
+        EXPECT_EQ(wire.opened.size(), tried) << endpoints;
+        EXPECT_EQ(wire.sent().find("SOAPAction: \"urn:a\"\r\n") != std::string::npos, result == 0);
+        if (result == 0) {
             EXPECT_EQ(wire.fault, nullptr); // of the dead ones nothing is left
         }
     }

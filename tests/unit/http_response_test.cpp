@@ -9,10 +9,7 @@ namespace {
 
 TEST(tag_match, compares_without_case_up_to_a_quote_with_dash_and_star)
 {
-    static const struct {
-        const char *text, *pattern;
-        bool matches;
-    } cases[] = {
+    static const std::tuple<const char *, const char *, bool> cases[] = {
         {"Content-Type", "content-type", true},
         {"Content_Type", "Content-Type", true},
         {"ContentType", "Content-Type", false},
@@ -31,8 +28,8 @@ TEST(tag_match, compares_without_case_up_to_a_quote_with_dash_and_star)
         {"a.b", "*-*", true},
         {"[", "{", false}, // letters only: these two differ by the bit of the case
     };
-    for (const auto &c : cases)
-        EXPECT_EQ(soap_tag_match(c.text, c.pattern) == 0, c.matches) << c.text << " against " << c.pattern;
+    for (const auto &[text, pattern, matches] : cases)
+        EXPECT_EQ(soap_tag_match(text, pattern) == 0, matches) << text << " against " << pattern;
 }
 
 TEST(tag_match, takes_quadratic_work_at_most)
@@ -96,18 +93,16 @@ line_result read_line(const std::string &bytes, std::size_t size, std::size_t pi
 
 TEST(recv_line, joins_folded_lines_and_keeps_their_blank)
 {
-    static const struct {
-        const char *bytes, *line;
-    } cases[] = {
+    static const std::pair<const char *, const char *> cases[] = {
         {"a: b\r\n\r\n", "a: b"}, {"a: b\n\n", "a: b"},    {"a:\r\n b\r\n\tc\r\n\r\n", "a: b\tc"},
         {"\r\n x", ""},           {"a\rbc\r\n\r\n", "ac"}, {"last\r\n", "last"},
         {"a\n \r\nb", "a "},
     };
-    for (const auto &c : cases) {
+    for (const auto &[bytes, line] : cases) {
         for (const std::size_t piece : {65536U, 1U, 2U, 3U}) {
-            const line_result read = read_line(c.bytes, 64, piece);
-            EXPECT_EQ(read.error, SOAP_OK) << c.bytes;
-            EXPECT_EQ(read.line, c.line) << c.bytes;
+            const line_result read = read_line(bytes, 64, piece);
+            EXPECT_EQ(read.error, SOAP_OK) << bytes;
+            EXPECT_EQ(read.line, line) << bytes;
         }
     }
     for (const char *const cut : {"no end", "no line feed\r", ""})
@@ -331,10 +326,7 @@ TEST(response_head, bounds_an_error_body)
 
 TEST(response_head, keeps_the_connection_by_version_and_consent)
 {
-    static const struct {
-        const char *head;
-        std::int16_t keep;
-    } cases[] = {
+    static const std::pair<const char *, std::int16_t> cases[] = {
         {"HTTP/1.1 200 OK\r\n", 1},
         {"HTTP/1.1 200 OK\r\nConnection: Keep-Alive\r\n", 1},
         {"HTTP/1.1 200 OK\r\nConnection: close\r\n", 0},
@@ -345,10 +337,10 @@ TEST(response_head, keeps_the_connection_by_version_and_consent)
         {"POST /a\r\nConnection: keep-alive\r\n", 1},
         {"HTTP/ 200\r\n", 0},
     };
-    for (const auto &c : cases) {
-        read_wire wire(std::string(c.head) + "Content-Length: 4\r\n\r\n<a/>", MODE_KEEP_ALIVE);
-        EXPECT_EQ(wire.result, 0) << c.head;
-        EXPECT_EQ(wire.keep_alive, c.keep) << c.head;
+    for (const auto &[head, keep] : cases) {
+        read_wire wire(std::string(head) + "Content-Length: 4\r\n\r\n<a/>", MODE_KEEP_ALIVE);
+        EXPECT_EQ(wire.result, 0) << head;
+        EXPECT_EQ(wire.keep_alive, keep) << head;
     }
     read_wire not_asked("HTTP/1.1 200 OK\r\nConnection: keep-alive\r\nContent-Length: 4\r\n\r\n<a/>");
     EXPECT_EQ(not_asked.keep_alive, 0);

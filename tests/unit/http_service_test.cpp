@@ -21,11 +21,7 @@ struct accepting_wire : memory_wire {
 
 TEST(request, is_recognised_by_its_method)
 {
-    static const struct {
-        const char *head;
-        int result;
-        const char *endpoint;
-    } cases[] = {
+    static const std::tuple<const char *, int, const char *> cases[] = {
         {"POST /a/HTTP/b HTTP/1.1\r\nHost: me:80\r\n", 0, "http://me:80/a/HTTP/b"},
         {"POST http://you/b HTTP/1.1\r\nHost: me\r\n", 0, "http://you/b"},
         {"POST /a HTTP/1.1\r\n", 0, "/a"},
@@ -35,10 +31,10 @@ TEST(request, is_recognised_by_its_method)
         {"BREW /a HTTP/1.1\r\n", 405, ""},
         {"POSTAGE /a HTTP/1.1\r\n", 405, ""},
     };
-    for (const auto &c : cases) {
+    for (const auto &[head, result, endpoint] : cases) {
         accepting_wire wire;
-        EXPECT_EQ(wire.request(std::string(c.head) + "\r\n<a/>"), c.result) << c.head;
-        EXPECT_STREQ(wire.endpoint, c.endpoint) << c.head;
+        EXPECT_EQ(wire.request(std::string(head) + "\r\n<a/>"), result) << head;
+        EXPECT_STREQ(wire.endpoint, endpoint) << head;
     }
     accepting_wire wire;
     EXPECT_EQ(wire.request("POST /" + std::string(900, 'p') + " HTTP/1.1\r\nHost: " + std::string(2000, 'h') +

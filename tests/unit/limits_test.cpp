@@ -98,25 +98,23 @@ int send_document(memory_wire &wire, const std::string &text)
 
 TEST(max_message, counts_the_plain_bytes_of_what_is_sent)
 {
-    const struct {
-        const char *form;
-        std::uint32_t modes;
-    } rows[] = {{"counted", MODE_BUFFERED},
-                {"direct", MODE_DIRECT},
-                {"chunks", MODE_CHUNKED},
-                {"stored", MODE_STORE},
-                {"no HTTP", MODE_BUFFERED | MODE_BARE_XML},
-                {"compressed chunks", MODE_CHUNKED | MODE_DEFLATE},
-                {"compressed and stored", MODE_STORE | MODE_DEFLATE}};
+    const std::pair<const char *, std::uint32_t> rows[] = {
+        {"counted", MODE_BUFFERED},
+        {"direct", MODE_DIRECT},
+        {"chunks", MODE_CHUNKED},
+        {"stored", MODE_STORE},
+        {"no HTTP", MODE_BUFFERED | MODE_BARE_XML},
+        {"compressed chunks", MODE_CHUNKED | MODE_DEFLATE},
+        {"compressed and stored", MODE_STORE | MODE_DEFLATE}};
     for (const std::size_t size : {std::size_t{300}, std::size_t{150000}}) {
         memory_wire plain(0, MODE_BARE_XML);
         const std::string text(size, 'x');
         ASSERT_EQ(send_document(plain, text), 0);
         const std::uint64_t whole = plain.sent().size() - std::string("the head\r\n").size();
-        for (const auto &row : rows) {
+        for (const auto &[form, modes] : rows) {
             for (const std::uint64_t limit : {whole, whole - 1}) {
-                SCOPED_TRACE(std::string(row.form) + ", " + std::to_string(size));
-                memory_wire wire(0, row.modes);
+                SCOPED_TRACE(std::string(form) + ", " + std::to_string(size));
+                memory_wire wire(0, modes);
                 wire.max_message = limit;
                 EXPECT_EQ(send_document(wire, text), limit == whole ? 0 : SOAP_LENGTH);
                 if (limit == whole)

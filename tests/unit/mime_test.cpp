@@ -57,22 +57,18 @@ TEST(mime_out, mtom_puts_an_include_in_the_element_and_brackets_around_the_id)
         make_value(second, "cid:two%20", "a/b"), make_value(first, nullptr, nullptr)};
     const std::string include =
         "<data><xop:Include xmlns:xop=\"http://www.w3.org/2004/08/xop/include\" href=";
-    const struct {
-        std::uint32_t mode;
-        std::string begin;
-        const char *end;
-    } forms[] = {
+    const std::tuple<std::uint32_t, std::string, const char *> forms[] = {
         {MTOM, include, "/></data>"},
         {MODE_MTOM, include, "/></data>"},
         {MTOM | MODE_CANONICAL, include, "></xop:Include></data>"},
         {MTOM | MODE_DEFAULT_NAMESPACE,
          "<data><Include xmlns=\"http://www.w3.org/2004/08/xop/include\" href=", "/></data>"},
     };
-    for (const auto &form : forms) {
-        memory_wire wire(0, SENDING | form.mode);
+    for (const auto &[mode, begin, end] : forms) {
+        memory_wire wire(0, SENDING | mode);
         ASSERT_EQ(send(wire, values), 0);
-        const std::string sent = wire.sent(), two = form.begin + "\"cid:two%20\"" + form.end;
-        EXPECT_NE(sent.find(form.begin + "\"cid:id1\"" + form.end + two + two + "<data>Zmlyc3Q=</data>"),
+        const std::string sent = wire.sent(), two = begin + "\"cid:two%20\"" + end;
+        EXPECT_NE(sent.find(begin + "\"cid:id1\"" + end + two + two + "<data>Zmlyc3Q=</data>"),
                   std::string::npos)
             << sent;
         EXPECT_NE(sent.find("\r\nContent-Type: image/png\r\nContent-Transfer-Encoding: binary\r\n"
@@ -307,10 +303,7 @@ TEST(mime_in, survives_every_refused_allocation)
 
 TEST(cid, means_an_id_in_several_spellings)
 {
-    static const struct {
-        const char *href, *id;
-        bool same;
-    } cases[] = {
+    static const std::tuple<const char *, const char *, bool> cases[] = {
         {"cid:a", "<a>", true},      {"cid:a", "a", true},           {"a", "<a>", true},
         {"cid:a", "cid:a", true},    {"<a>", "<a>", true},           {"cid:a%40b", "<a@b>", true},
         {"cid:a%4", "<a%4>", true},  {"cid:a%40b", "<a%40b>", true}, {"cid:A", "<a>", false},
@@ -319,9 +312,8 @@ TEST(cid, means_an_id_in_several_spellings)
         {"cid:a%00b", "<a>", false},
     };
     memory_wire wire;
-    for (const auto &c : cases)
-        EXPECT_EQ(soap_cid_compare(&wire, c.href, c.id) == 0, c.same)
-            << text_of(c.href) << " and " << text_of(c.id);
+    for (const auto &[href, id, same] : cases)
+        EXPECT_EQ(soap_cid_compare(&wire, href, id) == 0, same) << text_of(href) << " and " << text_of(id);
 }
 
 TEST(references, are_answered_in_linear_time_in_any_order_and_spelling)

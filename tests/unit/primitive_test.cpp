@@ -351,10 +351,7 @@ TEST_F(elements, positions_are_read_up_to_their_limit)
     std::string many = "[0";
     for (int i = 1; i < 40; i++)
         many += "," + std::to_string(i);
-    const struct {
-        std::string text;
-        int count, last;
-    } cases[] = {
+    const std::tuple<std::string, int, int> cases[] = {
         {"[3,-4]", 2, -4},
         {"3", 0, 0},
         {"[]", 0, 0},
@@ -363,10 +360,10 @@ TEST_F(elements, positions_are_read_up_to_their_limit)
         {"[2147483647]", 1, INT_MAX},
         {many, SOAP_POSITIONS_MAX, SOAP_POSITIONS_MAX - 1},
     };
-    for (const auto &row : cases) {
+    for (const auto &[text, count, last] : cases) {
         int numbers[SOAP_POSITIONS_MAX] = {};
-        EXPECT_EQ(soap_position_parse(row.text.c_str(), numbers), row.count) << row.text;
-        EXPECT_EQ(row.count == 0 ? 0 : numbers[row.count - 1], row.last) << row.text;
+        EXPECT_EQ(soap_position_parse(text.c_str(), numbers), count) << text;
+        EXPECT_EQ(count == 0 ? 0 : numbers[count - 1], last) << text;
     }
 }
 

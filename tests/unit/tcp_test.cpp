@@ -62,14 +62,13 @@ TEST_F(tcp, options_are_set_on_a_connected_socket)
     getsockopt(socket, SOL_SOCKET, SO_LINGER, &lingering, &size);
     EXPECT_EQ(lingering.l_onoff, 1);
     EXPECT_EQ(lingering.l_linger, 7);
-    static const struct {
-        int level, name, value;
-    } options[] = {{SOL_SOCKET, SO_KEEPALIVE, 1},      {IPPROTO_TCP, TCP_NODELAY, 1},
-                   {SOL_SOCKET, SO_SNDBUF, 2 * 65536}, // the system reports twice what was set
-                   {SOL_SOCKET, SO_RCVBUF, 2 * 65536}, {IPPROTO_TCP, TCP_KEEPIDLE, 11},
-                   {IPPROTO_TCP, TCP_KEEPINTVL, 12},   {IPPROTO_TCP, TCP_KEEPCNT, 13}};
-    for (const auto &option : options)
-        EXPECT_EQ(option_of(socket, option.level, option.name), option.value) << option.name;
+    static const std::tuple<int, int, int> options[] = {
+        {SOL_SOCKET, SO_KEEPALIVE, 1},      {IPPROTO_TCP, TCP_NODELAY, 1},
+        {SOL_SOCKET, SO_SNDBUF, 2 * 65536}, // the system reports twice what was set
+        {SOL_SOCKET, SO_RCVBUF, 2 * 65536}, {IPPROTO_TCP, TCP_KEEPIDLE, 11},
+        {IPPROTO_TCP, TCP_KEEPINTVL, 12},   {IPPROTO_TCP, TCP_KEEPCNT, 13}};
+    for (const auto &[level, name, value] : options)
+        EXPECT_EQ(option_of(socket, level, name), value) << name;
     EXPECT_NE(fcntl(socket, F_GETFD) & FD_CLOEXEC, 0);
 }
 

@@ -333,14 +333,12 @@ TEST_F(tls_setup, a_server_takes_its_diffie_hellman_group_from_file_or_size)
         EVP_PKEY_free(parameters);
         EVP_PKEY_CTX_free(generator);
     });
-    const struct {
-        const char *dh;
-        int bits;
-    } cases[] = {{"512", 2048}, {"2049", 3072}, {file.c_str(), 3072}, {nullptr, 0}};
-    for (const auto &c : cases) {
+    const std::pair<const char *, int> cases[] = {
+        {"512", 2048}, {"2049", 3072}, {file.c_str(), 3072}, {nullptr, 0}};
+    for (const auto &[dh, bits] : cases) {
         context service, client;
         client->connect_timeout = 10;
-        const int port = listen_with(service, server, TLS_NO_DEFAULT_CA, nullptr, c.dh);
+        const int port = listen_with(service, server, TLS_NO_DEFAULT_CA, nullptr, dh);
         std::future<accept_outcome> outcome = serve_one(service);
         ASSERT_EQ(set_up_client(client), 0);
         SSL_CTX_set_max_proto_version(client->tls_context, TLS1_2_VERSION);
@@ -348,8 +346,8 @@ TEST_F(tls_setup, a_server_takes_its_diffie_hellman_group_from_file_or_size)
         ASSERT_GE(open_to(client, port), 0) << client.fault_text();
         EVP_PKEY *temporary = nullptr;
         ASSERT_EQ(SSL_get_peer_tmp_key(client->tls_connection, &temporary), 1);
-        if (c.bits != 0) {
-            EXPECT_EQ(EVP_PKEY_get_bits(temporary), c.bits) << c.dh;
+        if (bits != 0) {
+            EXPECT_EQ(EVP_PKEY_get_bits(temporary), bits) << dh;
         }
         EVP_PKEY_free(temporary);
         EXPECT_EQ(exchange(client, "x"), "x");

@@ -168,9 +168,7 @@ std::string redacted(const std::string &message)
 
 TEST(redaction, blanks_certificates_of_the_two_prefixes)
 {
-    static const struct {
-        const char *rule, *message, *expected;
-    } cases[] = {
+    static const std::tuple<const char *, const char *, const char *> cases[] = {
         {"protocol", "<a><protocol:certificate>MIIC<b/></protocol:certificate></a>",
          "<a><protocol:certificate>...</protocol:certificate></a>"},
         {"p760", "<p760:certificate>MIIC</p760:certificate>x", "<p760:certificate>...</p760:certificate>x"},
@@ -189,8 +187,8 @@ TEST(redaction, blanks_certificates_of_the_two_prefixes)
         {"cut tag", "<protocol:certificat", "<protocol:certificat"},
         {"empty", "", ""},
     };
-    for (const auto &c : cases)
-        EXPECT_EQ(redacted(c.message), c.expected) << c.rule;
+    for (const auto &[rule, message, expected] : cases)
+        EXPECT_EQ(redacted(message), expected) << rule;
     std::int32_t length = -1;
     delete[] soap_log_redact_certificates("x", -1, &length);
     EXPECT_EQ(length, 0) << "a negative size is an empty message";

@@ -382,11 +382,7 @@ TEST(xml_read, skipping_deep_content_takes_no_stack_and_no_memory)
 
 TEST(xml_read, skipped_elements_count_as_open)
 {
-    const struct {
-        std::string content;
-        std::uint32_t limit;
-        int error;
-    } cases[] = {
+    const std::tuple<std::string, std::uint32_t, int> cases[] = {
         {"<b><c><d>x</d></c></b>", 0, 0},
         {"<b><c><d>x</d></c></b>", 4, 0},
         {"<b><c><d>x</d></c></b>", 3, SOAP_LENGTH},
@@ -394,19 +390,19 @@ TEST(xml_read, skipped_elements_count_as_open)
         {"<b><e/><c><d/><d>x</d></c></b>", 3, SOAP_LENGTH},
         {"<b>x</b>", 1, SOAP_LENGTH},
     };
-    for (const auto &c : cases)
+    for (const auto &[content, limit, error] : cases)
         for (const char *way :
              {"to the end tag", "to the end tag past a text", "from a held tag", "the element"}) {
-            SCOPED_TRACE(c.content + way);
-            reception in((std::strstr(way, "text") ? "<a>x" : "<a>") + c.content + "</a>");
-            in->max_depth = c.limit;
+            SCOPED_TRACE(content + way);
+            reception in((std::strstr(way, "text") ? "<a>x" : "<a>") + content + "</a>");
+            in->max_depth = limit;
             in.in_root();
             const bool held = std::strstr(way, "held") != nullptr;
             const int begun = held ? soap_element_head_read(in) : 0;
             EXPECT_EQ(begun, 0);
             EXPECT_EQ(*way == 't' && std::strstr(way, "tag") == nullptr ? soap_element_skip(in)
                                                                         : soap_element_in_end(in, "a"),
-                      c.error);
+                      error);
         }
 }
 

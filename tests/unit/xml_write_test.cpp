@@ -615,24 +615,20 @@ TEST(xml_write, the_envelope_names_its_encoding_in_soap_11)
 
 TEST(xml_write, the_part_head_names_what_the_part_is)
 {
-    static const struct {
-        std::uint32_t mode;
-        std::int16_t version;
-        const char *type;
-    } cases[] = {
+    static const std::tuple<std::uint32_t, std::int16_t, const char *> cases[] = {
         {MODE_MIME, 1, "text/xml; charset=utf-8"},
         {MODE_MIME, 2, "application/soap+xml; charset=utf-8"},
         {MODE_MIME | MODE_MTOM, 1, "application/xop+xml; charset=utf-8; type=\"text/xml\""},
         {MODE_MIME | MODE_MTOM, 2, "application/xop+xml; charset=utf-8; type=\"application/soap+xml\""},
     };
     std::string boundary = "==b==", start = "<s>", large(941, 'b'); // the last leaves no head at all
-    for (const auto &c : cases)
+    for (const auto &[mode, version, type] : cases)
         for (std::string *chosen : {&boundary, &large}) {
-            writer w(c.mode, c.version);
+            writer w(mode, version);
             w.ctx->encoding_style = nullptr;
             w.ctx->mime.boundary = chosen->data();
             w.ctx->mime.start = start.data();
-            const std::string head = "--==b==\r\nContent-Type: " + std::string(c.type) +
+            const std::string head = "--==b==\r\nContent-Type: " + std::string(type) +
                                      "\r\nContent-Transfer-Encoding: binary\r\nContent-ID: <s>\r\n\r\n";
             EXPECT_TRUE(
                 inside(w, envelope).starts_with((chosen == &large ? "" : head) + "<SOAP-ENV:Envelope>"));
