@@ -407,3 +407,15 @@ TEST(buffered_in, blocks_hold_their_bytes_and_cost_no_more_than_what_came)
     EXPECT_EQ(wire.error, SOAP_EOF);
     EXPECT_EQ(wire.block_stack, nullptr);
 }
+
+TEST(buffered_in, a_reading_that_stops_midway_is_over_with_the_next_message)
+{
+    kept_wire wire(OK_HEAD + "Content-Encoding: gzip\r\n\r\n" + gzipped("<a/>"));
+    ASSERT_EQ(soap_receive_begin(&wire), 0);
+    EXPECT_TRUE(wire.response_unfinished);
+    ASSERT_EQ(wire.zlib_state, 2);
+    wire.buffer_index = wire.buffer_length;
+    wire.receive(with_length("<b/>", 4));
+    EXPECT_EQ(read_message(wire).body, "<b/>");
+    EXPECT_EQ(wire.zlib_state, 0);
+}
