@@ -293,6 +293,23 @@ TEST_F(tcp, wait_reports_what_is_ready_and_refuses_large_descriptors)
     }
 }
 
+TEST_F(tcp, a_descriptor_that_select_cannot_serve_is_no_connection)
+{
+    const peer server(wait_for_end);
+    context ctx;
+    std::vector<int> low; // so many open that the next one is large
+    while (low.empty() || low.back() < 1023)
+        if (low.emplace_back(open("/dev/null", O_RDONLY)) < 0)
+            break;
+    if (low.back() == 1023) {
+        EXPECT_EQ(open_to(ctx, server.port()), -1);
+        EXPECT_EQ(ctx->error, SOAP_FD_EXCEEDED);
+        EXPECT_EQ(ctx->socket, -1);
+    }
+    for (const int descriptor : low)
+        close(descriptor);
+}
+
 // --- bytes ---
 
 TEST_F(tcp, a_receive_gives_up_after_so_many_false_alarms_but_not_for_signals)
