@@ -2,7 +2,8 @@
 file(GLOB ZUV_SOURCES CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/src/*/*.cpp)
 if(ZUV_SHARED_OBJECTS) # bound to itself: what it asks for can be distinguished from what a test asks for
     add_library(zuv_objects SHARED ${ZUV_SOURCES})
-    target_link_options(zuv_objects PRIVATE LINKER:-Bsymbolic-functions)
+    target_link_options(zuv_objects PRIVATE LINKER:-Bsymbolic-functions
+        LINKER:--version-script=${PROJECT_SOURCE_DIR}/cmake/shared_objects.map)
 else()
     add_library(zuv_objects STATIC ${ZUV_SOURCES})
 endif()

@@ -19,6 +19,7 @@ TEST(dime_out, is_one_record_for_the_message_and_one_for_each_attachment)
     const std::string second = "second!!";
     memory_wire wire(0, SENDING);
     char *options = soap_dime_options_make(&wire, 7, "opt");
+    ASSERT_NE(options, nullptr);
     options[5] = '\0'; // the length says where they end
     ASSERT_EQ(soap_dime_attach(&wire, const_cast<char *>("host's"), 6, nullptr, "own", 0, "o"), 0);
     ASSERT_EQ(
@@ -50,6 +51,7 @@ TEST(dime_out, cuts_texts_and_refuses_data_that_no_header_can_announce)
     wire.mode = MODE_BUFFERED | MODE_DIME;
     wire.dime.id = long_text.data();
     wire.dime.options = soap_dime_options_make(&wire, 0, long_text.c_str());
+    ASSERT_NE(wire.dime.options, nullptr);
     EXPECT_EQ(std::strlen(wire.dime.options + 4), 65531U);
     EXPECT_EQ(soap_dime_header_write(&wire), 0);
     soap_send_flush(&wire);
