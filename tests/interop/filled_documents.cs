@@ -16,11 +16,12 @@ static class FilledDocuments
     const string REFERENCE = "dataHandler"; // to what comes with the message
     static readonly string[] OF_THE_SERVICE = {
         "thisURI", "state", "submitDateTime", "lastModifiedDateTime", "answer", "error", "updateIdExpansion", "updateIdExpansionDetail"};
-    static int filled, wrong;
+    static int filled, wrong; // what is filled depends on the order, which is by name everywhere: Mono's own differs from run to run
 
     static IEnumerable<PropertyInfo> Members(Type type)
     {
-        return type.GetProperties().Where(one => one.CanRead && one.CanWrite && one.Name != REFERENCE);
+        return type.GetProperties().Where(one => one.CanRead && one.CanWrite && one.Name != REFERENCE)
+            .OrderBy(one => one.Name, StringComparer.Ordinal);
     }
 
     static object Value(Type type, string name, int depth)
@@ -42,12 +43,21 @@ static class FilledDocuments
         return type == typeof(object) ? name : Filled(type, depth);
     }
 
-    // An object of the type, or of one derived from it, in turn. Null where the nesting ends.
+    // Whether such an object may hold others of the type, as a filter's "and" holds expressions, without which it isn't valid.
+    static bool Holds(Type holder, Type type)
+    {
+        return Members(holder).Any(one => (one.PropertyType.GetElementType() ?? one.PropertyType) == type);
+    }
+
+    // An object of the type, or of one derived from it, in turn. Null where the nesting ends, before which nothing is chosen that
+    // would have to hold more.
     static object Filled(Type type, int depth)
     {
         if (depth == 0 || type.Namespace == "System.Xml") return null; // what the contract leaves open
         var derived = type.GetCustomAttributes<XmlIncludeAttribute>(false).Select(one => one.Type).Where(type.IsAssignableFrom);
-        var choice = derived.Concat(type.IsAbstract ? new Type[0] : new[] {type}).ToArray();
+        var choice = derived.OrderBy(one => one.FullName, StringComparer.Ordinal).Concat(type.IsAbstract ? new Type[0] : new[] {type}).ToArray();
+        if (depth == 1 && choice.Any(one => !Holds(one, type)))
+            choice = choice.Where(one => !Holds(one, type)).ToArray();
         var made = Activator.CreateInstance(choice[filled % choice.Length]);
         foreach (var member in Members(made.GetType()))
             member.SetValue(made, Value(member.PropertyType, member.Name, depth - 1));
@@ -126,7 +136,8 @@ static class FilledDocuments
 
     static int Main(string[] arguments)
     {
-        var clients = Assembly.GetExecutingAssembly().GetTypes().Where(one => one.IsSubclassOf(typeof(SoapHttpClientProtocol)));
+        var clients = Assembly.GetExecutingAssembly().GetTypes().Where(one => one.IsSubclassOf(typeof(SoapHttpClientProtocol)))
+            .OrderBy(one => one.Name, StringComparer.Ordinal);
         foreach (var type in clients)
             foreach (var version in new[] {SoapProtocolVersion.Soap11, SoapProtocolVersion.Soap12})
                 Try(type, arguments[0], version);
