@@ -440,7 +440,7 @@ TEST(xml_read, the_envelope_settles_the_version)
                              (empty ? "/></e:Envelope>" : ">x</e:Body></e:Envelope>"),
                          11, 11);
             in->soap_version = 0;
-            EXPECT_EQ(soap_envelope_in_begin(in), c.error);
+            ASSERT_EQ(soap_envelope_in_begin(in), c.error);
             EXPECT_EQ(in->soap_version, c.version);
             if (c.encoding != nullptr) {
                 EXPECT_STREQ(in->local_namespaces[1].received, c.encoding);
