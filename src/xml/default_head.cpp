@@ -22,7 +22,7 @@ default_head &place_of(soap_namespace_scope *scope, const char *bytes, std::size
 // What a declaration is bound to by the row's own URI: it has received no other, and one of its own changes nothing.
 bool is_bound(const soap *ctx, std::int16_t row)
 {
-    return row >= 0 && namespace_row_lengths(ctx, static_cast<std::size_t>(row)) != nullptr &&
+    return namespace_row_lengths(ctx, static_cast<std::size_t>(row)) != nullptr &&
            ctx->local_namespaces[row].received == nullptr;
 }
 
@@ -55,7 +55,7 @@ void default_head_learn(soap *ctx, const char *start)
     const soap_prefix *const record = ctx->prefix_list;
     const auto length = static_cast<std::size_t>(input_here(ctx) - start);
     if (ctx->bare_declarations != 1 || record->prefix_length != 0 || length > DEFAULT_HEAD_SIZE ||
-        length < DEFAULT_HEAD_MIN || !is_bound(ctx, record->index) || !xml_row_is_sure(ctx, record->index))
+        length < DEFAULT_HEAD_MIN || !xml_row_is_sure(ctx, record->index) || !is_bound(ctx, record->index))
         return;
     default_head &head = place_of(ctx->namespace_scope, start, length);
     head.length = static_cast<std::uint8_t>(length);
