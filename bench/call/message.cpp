@@ -105,12 +105,13 @@ bool bind(char *body, std::size_t length, profile &into)
     return into.contacts.size() == CONTACTS;
 }
 
-std::string request_body(const order &what)
+std::string request_body(const order &what, const std::string &further)
 {
     return "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<E:Envelope"
            " xmlns:E=\"http://schemas.xmlsoap.org/soap/envelope/\""
            " xmlns:c=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0\""
-           " xmlns:p=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0/Profile\"><E:Body><p:createRequest>" +
+           " xmlns:p=\"http://www.zuv.example/xmlns/b2b/zuv/v1.0/Profile\"" +
+           further + "><E:Body><p:createRequest>" +
            element("identity", element("type", escaped(what.type)) + element("name", escaped(what.name))) +
            "</p:createRequest></E:Body></E:Envelope>\r\n";
 }

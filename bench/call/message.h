@@ -35,7 +35,7 @@ std::string answer();
 // bytes.
 bool bind(char *body, std::size_t length, profile &into);
 
-// The request's envelope, put together by hand.
-std::string request_body(const order &what);
+// The request's envelope, put together by hand; with further declarations of namespaces, " xmlns:..." each.
+std::string request_body(const order &what, const std::string &further = "");
 
 } // namespace call_bench

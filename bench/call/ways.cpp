@@ -37,8 +37,10 @@ void expect(bool holds, const char *who)
 
 class library {
 public:
-    library(const target &to, bool keeps, bool resumes) : url_(to.url()), ca_(to.ca), resumes_(resumes)
+    library(const target &to, bool keeps, bool resumes, bool polls = false)
+        : url_(to.url()), ca_(to.ca), resumes_(resumes)
     {
+        proxy_.wait_with_poll = polls ? 1 : 0;
         soap_log_set_received(&proxy_, nullptr);
         soap_log_set_sent(&proxy_, nullptr);
         proxy_.endpoint = url_.c_str();
@@ -130,47 +132,63 @@ public:
     {
         connection_.send(request_);
         for (std::size_t have = 0; have < length_;)
-            have += connection_.recv(room_, sizeof room_);
+            have += connection_.recv(buffer_, sizeof buffer_);
     }
 
 private:
     connection connection_;
     std::string request_;
     std::size_t length_;
-    char room_[65536];
+    char buffer_[65536];
 };
 
-// What a careful host would write: records to XML, a head, the answer's head, pugixml, records again.
+// What a careful host would write: records to XML, a head, the answer's head, pugixml, records again. Its
+// request declares the three namespaces that it uses and the further ones.
 class hand_made {
 public:
-    explicit hand_made(int port) : connection_(port), port_(port) {}
+    hand_made(int port, std::string further) : connection_(port), port_(port), further_(std::move(further)) {}
     void call()
     {
-        const std::string body = request_body(order_);
+        const std::string body = request_body(order_, further_);
         connection_.send("POST /profile HTTP/1.1\r\nHost: 127.0.0.1:" + std::to_string(port_) +
                          "\r\nContent-Type: text/xml; charset=utf-8\r\nContent-Length: " +
                          std::to_string(body.size()) + "\r\nSOAPAction: \"\"\r\n\r\n" + body);
         std::size_t have = 0, head = 0, length = 0;
         do {
-            have += connection_.recv(room_ + have, sizeof room_ - 1 - have);
-            room_[have] = '\0';
+            have += connection_.recv(buffer_ + have, sizeof buffer_ - 1 - have);
+            buffer_[have] = '\0';
             if (head == 0)
-                if (const char *const end = std::strstr(room_, "\r\n\r\n")) {
-                    head = static_cast<std::size_t>(end - room_) + 4;
-                    expect(std::strncmp(room_, "HTTP/1.1 200", 12) == 0, "hand-made");
-                    length = std::strtoul(std::strstr(room_, "Content-Length: ") + 16, nullptr, 10);
+                if (const char *const end = std::strstr(buffer_, "\r\n\r\n")) {
+                    head = static_cast<std::size_t>(end - buffer_) + 4;
+                    expect(std::strncmp(buffer_, "HTTP/1.1 200", 12) == 0, "hand-made");
+                    length = std::strtoul(std::strstr(buffer_, "Content-Length: ") + 16, nullptr, 10);
                 }
         } while (head == 0 || have < head + length);
         profile got;
-        expect(bind(room_ + head, length, got), "hand-made");
+        expect(bind(buffer_ + head, length, got), "hand-made");
     }
 
 private:
     connection connection_;
     int port_;
+    std::string further_;
     order order_;
-    char room_[65536];
+    char buffer_[65536];
 };
+
+// The declarations among the library's bytes that the request made by hand lacks.
+std::string further_declarations(const std::string &sent)
+{
+    const std::string own = request_body({}), start = " xmlns:";
+    std::string further;
+    for (std::size_t at = sent.find(start), end; at != std::string::npos; at = sent.find(start, end)) {
+        const std::size_t uri = sent.find('"', at);
+        end = sent.find('"', uri + 1) + 1;
+        if (own.find(sent.substr(uri, end - uri)) == std::string::npos)
+            further += sent.substr(at, end - at);
+    }
+    return further;
+}
 
 // --- libcurl ---
 
@@ -240,11 +258,15 @@ template <class Caller, class... Arguments> way make(const char *name, Arguments
 std::vector<way> kept_ways(const target &to)
 {
     std::vector<way> ways;
+    const std::string sent = to.ca.empty() ? library(to, true, true).sent() : "";
     if (to.ca.empty())
-        ways.push_back(make<bare_exchange>("bare exchange", to.port, library(to, true, true).sent()));
+        ways.push_back(make<bare_exchange>("bare exchange", to.port, sent));
     ways.push_back(make<library>("library", to, true, true));
-    if (to.ca.empty())
-        ways.push_back(make<hand_made>("hand-made call", to.port));
+    ways.push_back(make<library>("library, wait_with_poll", to, true, true, true));
+    if (to.ca.empty()) {
+        ways.push_back(make<hand_made>("hand-made call", to.port, further_declarations(sent)));
+        ways.push_back(make<hand_made>("hand-made call, three namespaces", to.port, ""));
+    }
     ways.push_back(make<curl_call>("libcurl", to, false, true, true));
     ways.push_back(make<curl_call>("libcurl + pugixml", to, true, true, true));
     return ways;

@@ -79,8 +79,9 @@ class Transfers:
             began = time.monotonic()
             subprocess.run(["curl", "-sSf", *arguments], check=True, stdout=subprocess.DEVNULL)
             return self.size / 1e6 / (time.monotonic() - began)
-        up = timed("-H", "Content-Type: application/octet-stream", "-H", "Expect:", "--data-binary", "@" + self.source, address)
-        self.show("curl --data-binary", up, timed("-o", self.copy, address))
+        # By --data-binary it would take the whole file into memory first.
+        up = timed("-X", "POST", "-H", "Content-Type: application/octet-stream", "-H", "Expect:", "-T", self.source, address)
+        self.show("curl", up, timed("-o", self.copy, address))
         assert self.arrived()
 
 
@@ -113,7 +114,7 @@ def main(size, file_host, service_program, zuv):
         assert more < MEMORY_LIMIT_KB
         for what, (up, down) in transfers.paces.items():
             print("%-18s %.2f of curl's pace up, %.2f down" % (
-                what, up / transfers.paces["curl --data-binary"][0], down / transfers.paces["curl --data-binary"][1]))
+                what, up / transfers.paces["curl"][0], down / transfers.paces["curl"][1]))
 
 
 if __name__ == "__main__":
