@@ -2,7 +2,9 @@
 #include "trace_text.h"
 
 #include <algorithm>
+#include <set>
 
+#include "contract.h"
 #include "text_files.h"
 #include "trace_secrets.h"
 #include "xml_tokens.h"
@@ -20,6 +22,8 @@ public:
 
     std::string text(std::string_view xml, std::size_t shown_max)
     {
+        if (!show_secrets_)
+            find_shared_secrets(xml);
         xml_tokens tokens(xml.substr(0, shown_max));
         for (xml_token token; tokens.next(token);)
             add(token);
@@ -45,7 +49,7 @@ private:
             new_line();
             if (!hides())
                 put_tag(token);
-            hide_within(token.name);
+            hide_within(token);
             ++depth_;
             after_start_ = true;
             return;
@@ -91,13 +95,36 @@ private:
         put_open(token.source);
     }
 
+    // A value that several elements share stands outside of them: an element with the id that they refer to.
+    void find_shared_secrets(std::string_view xml)
+    {
+        xml_tokens tokens(xml);
+        for (xml_token token; tokens.next(token);)
+            if ((token.kind == xml_kind::start || token.kind == xml_kind::empty) &&
+                is_secret_name(token.name))
+                for (const std::string_view name : {"href", "ref"})
+                    if (const std::string_view to = attribute_of(token, name); !to.empty())
+                        shared_secrets_.insert(to.substr(to.front() == '#' ? 1 : 0));
+    }
+
+    // Without quotes, whatever the prefix of its name; empty for none.
+    static std::string_view attribute_of(const xml_token &tag, std::string_view wanted)
+    {
+        std::string_view rest = tag.source.substr(1 + tag.name.size()), gap, name, value;
+        while (next_attribute(rest, gap, name, value))
+            if (contract::local_name(name) == wanted)
+                return value.size() > 2 ? value.substr(1, value.size() - 2) : std::string_view();
+        return {};
+    }
+
     // A secret ends with the end tag of the element that it began with, whatever is inside.
-    void hide_within(std::string_view name)
+    void hide_within(const xml_token &tag)
     {
         if (hides())
-            secret_depth_ += name == secret_name_ ? 1 : 0;
-        else if (!show_secrets_ && is_secret_name(name)) {
-            secret_name_ = name;
+            secret_depth_ += tag.name == secret_name_ ? 1 : 0;
+        else if (!show_secrets_ &&
+                 (is_secret_name(tag.name) || shared_secrets_.count(attribute_of(tag, "id")) != 0)) {
+            secret_name_ = tag.name;
             secret_depth_ = 1;
         }
     }
@@ -155,6 +182,7 @@ private:
     text_form form_;
     bool show_secrets_, after_start_ = false;
     std::string_view secret_name_;
+    std::set<std::string_view> shared_secrets_; // ids
     std::size_t depth_ = 0, secret_depth_ = 0;
     std::string out_;
 };

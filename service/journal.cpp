@@ -5,6 +5,7 @@
 #include <cctype>
 #include <cerrno>
 #include <ctime>
+#include <set>
 #include <system_error>
 #include <utility>
 
@@ -22,6 +23,49 @@ namespace {
 constexpr std::size_t PATH_MAX_SHOWN = 200; // characters
 constexpr std::string_view SECRET_WORDS[] = {"password", "passwd", "passphrase",    "secret",
                                              "token",    "key",    "authorization", "cookie"};
+
+constexpr std::string_view BLANKS = " \t\r\n";
+
+// What a tag gives to the attribute, whatever the prefix of its name; empty for none.
+std::string_view attribute_of(std::string_view tag, std::string_view wanted)
+{
+    for (std::size_t at = 0; (at = tag.find('=', at)) != std::string_view::npos; ++at) {
+        const std::size_t quote = tag.find_first_not_of(BLANKS, at + 1);
+        if (quote == std::string_view::npos || (tag[quote] != '"' && tag[quote] != '\''))
+            continue;
+        std::string_view name = tag.substr(0, tag.find_last_not_of(BLANKS, at - 1) + 1);
+        name.remove_prefix(std::min(name.find_last_of(" \t\r\n:") + 1, name.size()));
+        at = std::min(tag.find(tag[quote], quote + 1), tag.size() - 1);
+        if (name == wanted)
+            return tag.substr(quote + 1, at - quote - 1);
+    }
+    return {};
+}
+
+// The tag from its "<" at `at` on, and its name.
+std::string_view tag_at(std::string_view xml, std::size_t at)
+{
+    return xml.substr(at, std::min(xml.find('>', at), xml.size() - 1) + 1 - at);
+}
+std::string_view name_of(std::string_view tag)
+{
+    return tag.substr(1, std::min(tag.find_first_of(" \t\r\n/>", 1), tag.size()) - 1);
+}
+
+// Of the elements that those named as secrets refer to: a value that several share stands outside of them.
+std::set<std::string_view> ids_of_secrets(std::string_view xml)
+{
+    std::set<std::string_view> ids;
+    for (std::size_t at = 0; (at = xml.find('<', at)) != std::string_view::npos; ++at) {
+        const std::string_view tag = tag_at(xml, at);
+        for (const std::string_view name : {"href", "ref"}) {
+            const std::string_view to = attribute_of(tag, name);
+            if (!to.empty() && names_secret(name_of(tag)))
+                ids.insert(to.substr(to.front() == '#' ? 1 : 0));
+        }
+    }
+    return ids;
+}
 
 // A new handle to the file, or null with errno.
 std::FILE *open_log(const std::string &path)
@@ -171,19 +215,18 @@ bool names_secret(std::string_view tag)
 
 std::string without_secrets(std::string_view xml, char filler)
 {
+    const std::set<std::string_view> ids = ids_of_secrets(xml);
     std::string result;
     for (std::size_t at = 0; at < xml.size();) {
         const std::size_t tag = std::min(xml.find('<', at), xml.size());
-        const std::size_t end = std::min(xml.find('>', tag), xml.size() - 1);
         result.append(xml.substr(at, tag - at));
         if (tag == xml.size())
             break;
-        const std::string_view head = xml.substr(tag, end + 1 - tag);
+        const std::string_view head = tag_at(xml, tag), name = name_of(head);
         result.append(head);
-        at = end + 1;
-        const std::string_view name =
-            head.substr(1, std::min(head.find_first_of(" \t\r\n/>", 1), head.size()) - 1);
-        if (name.empty() || head.ends_with("/>") || !names_secret(name))
+        at = tag + head.size();
+        if (name.empty() || head.ends_with("/>") ||
+            !(names_secret(name) || (!ids.empty() && ids.count(attribute_of(head, "id")) != 0)))
             continue;
         // All forms of content: references, CDATA, elements.
         const std::size_t next = std::min(xml.find(std::string("</").append(name), at), xml.size());

@@ -15,7 +15,7 @@ from lxml import etree, html
 import browser
 import zuv
 
-SECRETS = ("pass-1", "dG9rLTI=", "tok-3", "pass-4", "cookie-5", "query-6", "pass-7", "inner-8", "pem-9", "url-10", "sign-11", "head-12", "url-13")
+SECRETS = ("pass-1", "dG9rLTI=", "tok-3", "pass-4", "cookie-5", "query-6", "pass-7", "inner-8", "pem-9", "url-10", "sign-11", "head-12", "url-13", "shared-14")
 CREDENTIALS = ('<c:Credentials xmlns:c="%s"><c:password>pass-1</c:password><c:key>dG9rLTI=</c:key><c:token>tok-3</c:token>'
                '</c:Credentials>' % zuv.COMMON)
 HOSTILE = b"""</pre></details><script>document.title='owned'</script><img src=x onerror="document.title='owned'">\x1b[2J\xff"""
@@ -94,7 +94,7 @@ class trace(unittest.TestCase):
         pathlib.Path(credentials).write_text(CREDENTIALS)
         body = zuv.envelope('<p:getResponse><p:x><c:Password a="1">inner-8<c:b/></c:x>inner-8</c:Password></p:x>'
                             '<p:y userToken="pass-7" at="http://u:url-10@h/">-----BEGIN X-----pem-9-----END X-----</p:y>'
-                            '<p:z>see https://h/d?a=1&amp;X-Amz-Signature=sign-11&amp;b=2 </p:z></p:getResponse>')
+                            '<p:z>see https://h/d?a=1&amp;X-Amz-Signature=sign-11&amp;b=2 </p:z><p:token e:ref="#s"/></p:getResponse><p:shared e:id=\'s\'>shared-14</p:shared>')
         with zuv.peer(zuv.answer(body, headers=["Set-Cookie: cookie-5", "X-Auth-Token: head-12", "Via: ftp://u:url-13@h"])) as (address, _):
             zuv.run("profile", "get", "-e", address + "/at?token=query-6", "--credentials", credentials, "--user", "ada",
                     "--trace", self.log, env={"ZUV_PASSWORD": "pass-4"})

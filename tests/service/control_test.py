@@ -164,7 +164,7 @@ class control(unittest.TestCase):
         with tempfile.TemporaryDirectory() as folder:
             file = os.path.join(folder, "calls")
             with zuv.service("--record", file, "--control") as address:
-                sent = [post("Profile", envelope("Profile", request("create", secret)), "Authorization: Basic c2VzYW1l"), GET,
+                sent = [post("Profile", envelope("Profile", request("create", secret) + '<x id = "s">sesame</x>'), "Authorization: Basic c2VzYW1l"), GET,
                         post("ProblemReport", attached, kind=mime)]
                 body = CREATE.partition(b"\r\n\r\n")[2]
                 sent += [post("Profile", gzip.compress(body), "Content-Encoding: gzip"), CREATE + b"x"]
@@ -247,12 +247,12 @@ class control(unittest.TestCase):
 
     def test_exchanges_are_logged_and_shown_without_secrets(self):
         secret = ("<c:credentials><c:username>ada</c:username><c:password>sesame</c:password><c:token><![CDATA[a</b>sesame]]></c:token>"
-                  "</c:credentials><profileAuthority>&lt;script></profileAuthority>")
+                  "<c:key href='#s'/></c:credentials><profileAuthority>&lt;script></profileAuthority>")
         with tempfile.TemporaryDirectory() as folder:
             log = os.path.join(folder, "access")
             with zuv.service("--access-log", log) as address:
                 for number, sent in enumerate((
-                        post("Profile", envelope("Profile", request("create", secret)), "Authorization: Basic c2VzYW1l"),
+                        post("Profile", envelope("Profile", request("create", secret) + '<x id = "s">sesame</x>'), "Authorization: Basic c2VzYW1l"),
                         "no HTTP\r\n\r\n", "GET /zuv/v1.0/data/sesame?token=sesame HTTP/1.1\r\n\r\n",
                         "GET /a\x7f?token=sesame HTTP/1.1\r\n\r\n"), 1):
                     exchange(address, sent)
