@@ -3,8 +3,9 @@
 //
 // For each document: bytes per second of CPU time (the best of the repetitions), what that is relative to the
 // peers, and blocks and most memory taken for one document. ZUV_BENCH_HUGE=1 adds a document of 100 MB. Before
-// measuring, all ways must agree on what the document says. Of the largest documents the first reading of a
-// process is measured too, by processes of its own: no memory has been released yet.
+// measuring, all ways must agree on what the document says. Reading the largest documents is bounded by memory and
+// by what was done with it before, so that is measured in processes of its own, too.
+#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -33,9 +34,11 @@
 
 namespace {
 
-constexpr std::size_t FIRST_READ_BYTES =
-    5 * 1000 * 1000;           // from which the first reading of a process is measured
-constexpr int FIRST_READS = 5; // processes for each way; the best counts
+constexpr std::size_t ALONE_BYTES = 5 * 1000 * 1000; // from which reading is measured in processes of its own
+constexpr int PROCESSES = 5;                         // of each way; the best counts
+constexpr std::size_t LATER_READS = 9;
+constexpr std::size_t POOL_FACTOR = 64; // a large pool_limit, in sizes of the document
+constexpr const char *ENGINE = "engine", *LARGE_POOL = "engine, large pool", *BY_HAND = "pugixml by hand";
 
 struct libxml2_sink {
     xmlTextWriterPtr writer;
@@ -57,6 +60,7 @@ struct libxml2_sink {
 struct peer_content {
     virtual ~peer_content() = default;
     virtual bool read(const std::string &bytes) = 0; // keeps what it read
+    virtual void drop() = 0;
     virtual bool read_and_drop(const std::string &bytes) const = 0;
     virtual void put(peer::append_sink sink, const char *element) const = 0;
     virtual void put(libxml2_sink sink, const char *element) const = 0;
@@ -65,6 +69,7 @@ struct peer_content {
 template <class Content> struct peer_content_of final : peer_content {
     Content kept;
     bool read(const std::string &bytes) override { return peer::read(bytes, kept = {}); }
+    void drop() override { kept = {}; }
     bool read_and_drop(const std::string &bytes) const override
     {
         Content target;
@@ -259,7 +264,7 @@ std::unique_ptr<document> make(const content_kind &kind, const char *name, const
     auto doc = std::make_unique<document>(kind, name);
     doc->objects = objects;
     doc->bytes = doc->engine.written(objects);
-    doc->pooled.pool_limit = 64 * doc->bytes.size();
+    doc->pooled.pool_limit = POOL_FACTOR * doc->bytes.size();
     const std::size_t begin = doc->bytes.find(std::string("<") + kind.element);
     const std::size_t end = doc->bytes.rfind("</SOAP-ENV:Body>");
     if (begin == std::string::npos || end == std::string::npos || !doc->structs->read(doc->bytes) ||
@@ -291,9 +296,9 @@ struct way {
 
 constexpr way ways[] = {
     {"read", "memcpy", read_memcpy},
-    {"read", "engine", read_engine},
-    {"read", "engine, large pool", read_pooled},
-    {"read", "pugixml by hand", read_by_hand},
+    {"read", ENGINE, read_engine},
+    {"read", LARGE_POOL, read_pooled},
+    {"read", BY_HAND, read_by_hand},
     {"read", "pugixml DOM", read_pugixml},
     {"read", "expat", read_expat},
     {"read", "libxml2 reader", read_libxml2},
@@ -364,7 +369,7 @@ void print_table(const best_of &results, const std::vector<std::unique_ptr<docum
             };
             std::printf("%-6s%-18s %9.1f %9.0f %10.1f %10.2f", shown.direction, shown.name,
                         found->second.speed / 1e6, found->second.blocks, found->second.peak / 1024,
-                        relative(reads ? "pugixml by hand" : "append loop"));
+                        relative(reads ? BY_HAND : "append loop"));
             if (reads)
                 std::printf(" %11.2f", relative("expat"));
             std::printf("\n");
@@ -375,7 +380,9 @@ void print_table(const best_of &results, const std::vector<std::unique_ptr<docum
                 "the append loop.\n");
 }
 
-// ------------------------------------------------------------------------------------------ first reading
+// ------------------------------------------------------------------------------------------ processes
+
+// Reading in a process that does nothing else, as a host's: what other ways leave of the heap has no part in it.
 
 double cpu_seconds()
 {
@@ -384,22 +391,39 @@ double cpu_seconds()
     return static_cast<double>(now.tv_sec) + static_cast<double>(now.tv_nsec) * 1e-9;
 }
 
-// In a process of its own: reads the document at standard input once and prints the seconds.
-int run_first_read(const std::string &kind_name, const std::string &way_name)
+// In a process of its own: reads the document at standard input, at first without releasing what was read. Prints
+// the seconds of the first reading and the median of the later ones, which release it.
+int run_alone(const std::string &kind_name, const std::string &way_name)
 {
     document doc(kind_name == REPORTS.name ? REPORTS : PROFILES, kind_name);
     char buffer[65536];
     for (std::size_t got = 0; (got = std::fread(buffer, 1, sizeof buffer, stdin)) > 0;)
         doc.bytes.append(buffer, got);
+    const bool by_hand = way_name == BY_HAND;
+    if (way_name == LARGE_POOL)
+        doc.engine.pool_limit = POOL_FACTOR * doc.bytes.size();
     const double began = cpu_seconds();
-    if (!(way_name == "engine" ? doc.engine.read(doc.bytes) != nullptr : doc.structs->read(doc.bytes)))
+    if (!(by_hand ? doc.structs->read(doc.bytes) : doc.engine.read(doc.bytes) != nullptr))
         refuse(doc, "it can't be read");
-    std::printf("%.9f\n", cpu_seconds() - began);
+    const double first = cpu_seconds() - began;
+    by_hand ? doc.structs->drop() : doc.engine.release();
+    std::vector<double> later(LATER_READS);
+    for (double &seconds : later) {
+        const double start = cpu_seconds();
+        by_hand ? read_by_hand(doc) : read_engine(doc);
+        seconds = cpu_seconds() - start;
+    }
+    std::nth_element(later.begin(), later.begin() + LATER_READS / 2, later.end());
+    std::printf("%.9f %.9f\n", first, later[LATER_READS / 2]);
     return 0;
 }
 
-// Bytes per second of the first reading of a process; the best of some.
-double first_read_speed(const document &doc, const char *way_name)
+struct alone_speed {
+    double first = 0, later = 0; // bytes per second
+};
+
+// The best of some processes.
+alone_speed speed_alone(const document &doc, const char *way_name)
 {
     const int file = memfd_create("document", 0);
     for (std::size_t done = 0; done < doc.bytes.size();) {
@@ -409,30 +433,36 @@ double first_read_speed(const document &doc, const char *way_name)
         done += static_cast<std::size_t>(count);
     }
     const std::string self = "/proc/" + std::to_string(getpid());
-    const std::string command = self + "/exe --first-read " + doc.kind.name + ' ' + way_name + " < " + self +
+    const std::string command = self + "/exe --alone " + doc.kind.name + " '" + way_name + "' < " + self +
                                 "/fd/" + std::to_string(file);
-    double best = 0;
-    for (int i = 0; i < FIRST_READS; ++i) {
+    const auto bytes = static_cast<double>(doc.bytes.size());
+    alone_speed best;
+    for (int i = 0; i < PROCESSES; ++i) {
         std::FILE *const output = popen(command.c_str(), "r");
-        double seconds = 0;
-        const bool read = output && std::fscanf(output, "%lf", &seconds) == 1;
+        double first = 0, later = 0;
+        const bool read = output && std::fscanf(output, "%lf %lf", &first, &later) == 2;
         if (!output || pclose(output) != 0 || !read)
-            refuse(doc, "its first reading failed");
-        best = std::max(best, static_cast<double>(doc.bytes.size()) / seconds);
+            refuse(doc, "its reading in a process of its own failed");
+        best = {std::max(best.first, bytes / first), std::max(best.later, bytes / later)};
     }
     close(file);
     return best;
 }
 
-void print_first_reads(const std::vector<std::unique_ptr<document>> &documents)
+void print_alone(const std::vector<std::unique_ptr<document>> &documents)
 {
-    std::printf("\n%-40s %12s %12s %10s\n", "first reading of a process", "engine MB/s", "by hand", "ratio");
+    std::printf("\n%-32s %12s %10s %12s %10s\n", "read in a process of its own", "first, MB/s", "by hand=1",
+                "later, MB/s", "by hand=1");
     for (const auto &doc : documents) {
-        if (doc->bytes.size() < FIRST_READ_BYTES)
+        if (doc->bytes.size() < ALONE_BYTES)
             continue;
-        const double engine = first_read_speed(*doc, "engine"), by_hand = first_read_speed(*doc, "hand");
-        std::printf("%-40s %12.1f %12.1f %10.2f\n", doc->name.c_str(), engine / 1e6, by_hand / 1e6,
-                    engine / by_hand);
+        const alone_speed by_hand = speed_alone(*doc, BY_HAND);
+        std::printf("%s\n", doc->name.c_str());
+        for (const char *const name : {ENGINE, LARGE_POOL, BY_HAND}) {
+            const alone_speed found = name == BY_HAND ? by_hand : speed_alone(*doc, name);
+            std::printf("  %-30s %12.1f %10.2f %12.1f %10.2f\n", name, found.first / 1e6,
+                        found.first / by_hand.first, found.later / 1e6, found.later / by_hand.later);
+        }
     }
 }
 
@@ -440,8 +470,8 @@ void print_first_reads(const std::vector<std::unique_ptr<document>> &documents)
 
 int main(int argc, char **argv)
 {
-    if (argc == 4 && std::strcmp(argv[1], "--first-read") == 0)
-        return run_first_read(argv[2], argv[3]);
+    if (argc == 4 && std::strcmp(argv[1], "--alone") == 0)
+        return run_alone(argv[2], argv[3]);
     benchmark::Initialize(&argc, argv);
     if (benchmark::ReportUnrecognizedArguments(argc, argv))
         return 1;
@@ -473,6 +503,6 @@ int main(int argc, char **argv)
     best_of results;
     benchmark::RunSpecifiedBenchmarks(&results);
     print_table(results, documents);
-    print_first_reads(documents);
+    print_alone(documents);
     return 0;
 }
