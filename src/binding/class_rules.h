@@ -43,9 +43,18 @@ template <class T> constexpr auto member_class_tag()
 }
 template <class T> using member_class = std::remove_pointer_t<decltype(member_class_tag<T>())>;
 
-// Calls `visit` with each own element of T as a constant, in order, until it gives true: the result says
-// whether it did. Constants, and not references into the tuple, so that a member costs no more than its own
-// code.
+// Calls `visit` with each own element of T as a constant, in order. Constants, and not references into the
+// tuple, so that a member costs no more than its own code.
+template <class T, class Visit> constexpr void each_element(Visit visit)
+{
+    [&]<std::size_t... I>(std::index_sequence<I...>)
+    {
+        (visit(std::integral_constant<std::size_t, I>{}), ...);
+    }
+    (std::make_index_sequence<own_count<T>>{});
+}
+
+// The same until `visit` gives true: the result says whether it did.
 template <class T, class Visit> constexpr bool any_element(Visit visit)
 {
     return [&]<std::size_t... I>(std::index_sequence<I...>)
@@ -53,6 +62,28 @@ template <class T, class Visit> constexpr bool any_element(Visit visit)
         return (... || visit(std::integral_constant<std::size_t, I>{}));
     }
     (std::make_index_sequence<own_count<T>>{});
+}
+
+// Whether T or one of its bases has attributes; vectors that can hold too few items.
+template <class T> constexpr bool has_attributes()
+{
+    if constexpr (std::is_void_v<T>)
+        return false;
+    else
+        return std::tuple_size_v<decltype(traits<T>::attributes)> > 0 ||
+               has_attributes<typename traits<T>::base>();
+}
+
+template <class T> constexpr bool has_minima()
+{
+    if constexpr (std::is_void_v<T>) {
+        return false;
+    } else {
+        return has_minima<typename traits<T>::base>() ||
+               std::apply(
+                   [](const auto &...row) { return (... || (row.how == occurs::many && row.minimum > 0)); },
+                   traits<T>::elements);
+    }
 }
 
 // --- defaulting ---
@@ -65,10 +96,9 @@ template <class T> void reset_members(T &object)
                traits<T>::attributes);
     if constexpr (traits<T>::text != nullptr)
         (object.*traits<T>::text).clear();
-    any_element<T>([&](auto index) {
+    each_element<T>([&](auto index) {
         constexpr const auto &row = std::get<index>(traits<T>::elements);
         reset_value(object.*row.member, row.initial);
-        return false;
     });
 }
 
@@ -78,10 +108,9 @@ template <class T> void mark_members(soap *ctx, const T &object)
 {
     if constexpr (!std::is_void_v<typename traits<T>::base>)
         mark_members<typename traits<T>::base>(ctx, object);
-    any_element<T>([&](auto index) {
+    each_element<T>([&](auto index) {
         constexpr const auto &row = std::get<index>(traits<T>::elements);
         mark_value(ctx, object.*row.member, row.item_type);
-        return false;
     });
 }
 
@@ -108,7 +137,7 @@ template <class T> int write_content(soap *ctx, const void *object, const char *
 template <class T> int write_attributes(soap *ctx, const void *object)
 {
     const T &self = *static_cast<const T *>(object);
-    if constexpr (!std::is_void_v<typename traits<T>::base>) {
+    if constexpr (has_attributes<typename traits<T>::base>()) {
         if (write_attributes<typename traits<T>::base>(ctx,
                                                        static_cast<const typename traits<T>::base *>(&self)))
             return ctx->error;
@@ -124,7 +153,7 @@ template <class T> int write_attributes(soap *ctx, const void *object)
 template <class T> bool read_attributes(soap *ctx, void *object)
 {
     T &self = *static_cast<T *>(object);
-    if constexpr (!std::is_void_v<typename traits<T>::base>) {
+    if constexpr (has_attributes<typename traits<T>::base>()) {
         if (!read_attributes<typename traits<T>::base>(ctx, static_cast<typename traits<T>::base *>(&self)))
             return false;
     }
@@ -141,20 +170,20 @@ template <class T, std::size_t I> bool read_member(soap *ctx, const char *tag, v
     return read_value(ctx, tag, static_cast<T *>(object)->*row.member, row.item_type, row.vector_type);
 }
 
-template <class V> inline constexpr bool is_vector = false;
-template <class V> inline constexpr bool is_vector<std::vector<V>> = true;
-
 template <class T> bool holds_minima(const void *object)
 {
     const T &self = *static_cast<const T *>(object);
-    if constexpr (!std::is_void_v<typename traits<T>::base>) {
+    if constexpr (has_minima<typename traits<T>::base>()) {
         if (!holds_minima<typename traits<T>::base>(static_cast<const typename traits<T>::base *>(&self)))
             return false;
     }
-    return !any_element<T>([&](auto index) {
+    bool held = true;
+    each_element<T>([&](auto index) {
         constexpr const auto &row = std::get<index>(traits<T>::elements);
-        return !holds_minimum(self.*row.member, row.minimum);
+        if constexpr (row.how == occurs::many && row.minimum > 0)
+            held &= (self.*row.member).size() >= row.minimum;
     });
+    return held;
 }
 
 // --- the table of members ---
@@ -176,18 +205,6 @@ template <class T, std::size_t N> constexpr void add_entries(std::array<member_e
         add_entries<typename traits<T>::base>(entries);
         add_own_entries<T>(entries, total_count<typename traits<T>::base>(),
                            std::make_index_sequence<own_count<T>>{});
-    }
-}
-
-template <class T> constexpr bool has_minima()
-{
-    if constexpr (std::is_void_v<T>) {
-        return false;
-    } else {
-        return has_minima<typename traits<T>::base>() ||
-               std::apply(
-                   [](const auto &...row) { return (... || (row.how == occurs::many && row.minimum > 0)); },
-                   traits<T>::elements);
     }
 }
 
@@ -304,10 +321,8 @@ template <class T> std::size_t content_bytes(const T &object)
         bytes += content_bytes<member_class<typename traits<T>::base>>(object);
     if constexpr (traits<T>::text != nullptr)
         bytes += content_of(object.*traits<T>::text);
-    any_element<T>([&](auto index) {
-        bytes += content_of(object.*std::get<index>(traits<T>::elements).member);
-        return false;
-    });
+    each_element<T>(
+        [&](auto index) { bytes += content_of(object.*std::get<index>(traits<T>::elements).member); });
     return bytes;
 }
 
@@ -335,9 +350,8 @@ template <class T> std::size_t release_members(soap *owner, T &object)
         bytes += release_members<member_class<typename traits<T>::base>>(owner, object);
     if constexpr (traits<T>::text != nullptr)
         bytes += release_value(owner, object.*traits<T>::text);
-    any_element<T>([&](auto index) {
+    each_element<T>([&](auto index) {
         bytes += release_value(owner, object.*std::get<index>(traits<T>::elements).member);
-        return false;
     });
     return bytes;
 }
@@ -402,15 +416,6 @@ template <class T> constexpr auto content_writer()
 template <class T> constexpr content_reader reader_of()
 {
     return traits<T>::text != nullptr ? &read_simple_content : &read_members;
-}
-
-template <class T> constexpr bool has_attributes()
-{
-    if constexpr (std::is_void_v<T>)
-        return false;
-    else
-        return std::tuple_size_v<decltype(traits<T>::attributes)> > 0 ||
-               has_attributes<typename traits<T>::base>();
 }
 
 template <class T> constexpr class_ops make_ops()

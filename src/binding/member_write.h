@@ -145,14 +145,4 @@ template <class V> int write_attribute(soap *ctx, const char *name, const V &mem
     }
 }
 
-// Fewest items of a vector.
-template <class V> bool holds_minimum(const V &, std::uint8_t)
-{
-    return true;
-}
-template <class V> bool holds_minimum(const std::vector<V> &member, std::uint8_t minimum)
-{
-    return member.size() >= minimum;
-}
-
 } // namespace binding
