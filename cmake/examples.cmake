@@ -2,6 +2,6 @@
 foreach(name profile_host care_host problem_report_host file_host guide)
     add_executable(${name} ${PROJECT_SOURCE_DIR}/examples/${name}.cpp)
     target_include_directories(${name} PRIVATE ${ZUV_GENERATED_DIR}/include)
-    target_link_libraries(${name} PRIVATE zuv_client_pro zuv_flags)
+    target_link_libraries(${name} PRIVATE ${ZUV_PROGRAM_LIBRARY} zuv_flags)
     add_dependencies(${name} zuv_generated)
 endforeach()

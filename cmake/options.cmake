@@ -11,7 +11,7 @@ option(ZUV_BUILD_BENCH "Build the benchmarks" OFF)
 option(ZUV_SANITIZE "Build with AddressSanitizer and UndefinedBehaviorSanitizer" OFF)
 option(ZUV_THREADS "Build with ThreadSanitizer" OFF)
 option(ZUV_COVERAGE "Build with coverage counters" OFF)
-option(ZUV_SHARED_OBJECTS "Let the tests load src/ as a shared object, for script/mutants and script/torture" OFF)
+option(ZUV_SHARED_OBJECTS "Let the tests load src/ as a shared object, for script/mutants, script/torture and script/coverage" OFF)
 option(ZUV_FUZZ "Build the libFuzzer targets (needs clang)" OFF)
 
 if((ZUV_BUILD_TESTS OR ZUV_BUILD_BENCH) AND NOT ZUV_BUILD_PROGRAMS)
