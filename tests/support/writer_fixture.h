@@ -1,8 +1,10 @@
 // writer_fixture.h - a context that writes to a string, and one helper that writes the same thing every way.
 //
 // Elsewhere: what is written. Always: a check runs the calls in a counting pass, buffered, unbuffered and
-// through a filter, and demands the same bytes of all.
+// through a filter, and demands the same bytes of all; and with sends that are refused, wherever that begins.
 #pragma once
+
+#include <gtest/gtest-spi.h>
 
 #include "support/testing.h"
 
@@ -25,12 +27,6 @@ inline const soap_namespace *table()
     return rows;
 }
 
-inline int collect(soap *ctx, const char *data, std::size_t length)
-{
-    static_cast<std::string *>(ctx->user)->append(data, length);
-    return 0;
-}
-
 inline int pass_on(soap *, const char **, std::size_t *)
 {
     return 0;
@@ -43,14 +39,21 @@ using calls = std::function<void(soap *)>;
 struct writer {
     std::unique_ptr<soap> ctx = std::make_unique<soap>();
     std::string sent;
+    std::size_t sends = 0, sends_left = SIZE_MAX; // of a pass; further ones are refused
 
     explicit writer(std::uint32_t mode = 0, std::int16_t version = 1)
     {
         soap_log_set_sent(ctx.get(), nullptr);
         EXPECT_EQ(soap_set_namespaces(ctx.get(), table()), 0);
         ctx->soap_version = version;
-        ctx->on_send = collect;
-        ctx->user = &sent;
+        ctx->user = this;
+        ctx->on_send = [](soap *c, const char *data, std::size_t length) {
+            writer &own = *static_cast<writer *>(c->user);
+            if (own.sends++ >= own.sends_left)
+                return static_cast<int>(SOAP_EOF);
+            own.sent.append(data, length);
+            return 0;
+        };
         ctx->output_mode = mode;
     }
 
@@ -66,13 +69,33 @@ struct writer {
         ctx->message_part = 0;
         ctx->message_count = 0;
         sent.clear();
+        sends = 0;
         write(ctx.get());
-        if (!(io & MODE_COUNTING)) {
+        if (sends_left == SIZE_MAX && !(io & MODE_COUNTING)) {
             EXPECT_EQ(soap_send_flush(ctx.get()), 0);
         }
         return sent;
     }
 };
+
+// Once a send is refused, the calls report it, and what went out is how they begin. Not of long messages.
+inline void expect_an_error_wherever_sends_end(writer &w, start where, const calls &write)
+{
+    const std::string whole = w.pass(MODE_DIRECT, where, write);
+    const std::size_t sends = w.sends < 100 ? w.sends : 0;
+    for (w.sends_left = 0; w.sends_left < sends; ++w.sends_left) {
+        testing::TestPartResultArray unmet; // of the calls' own expectations
+        {
+            const testing::ScopedFakeTestPartResultReporter reporter(&unmet);
+            w.pass(MODE_DIRECT, where, write);
+        }
+        EXPECT_EQ(w.ctx->error, SOAP_EOF) << w.sends_left << " of " << whole;
+        EXPECT_TRUE(whole.starts_with(w.sent)) << w.sent << "\n" << whole;
+        soap_attr_table_reset(w.ctx.get());
+        w.ctx->error = w.ctx->encoding_flag = 0;
+    }
+    w.sends_left = SIZE_MAX;
+}
 
 // The bytes that the calls write, the same in all passes.
 inline std::string written(writer &w, start where, const calls &write)
@@ -87,6 +110,7 @@ inline std::string written(writer &w, start where, const calls &write)
     EXPECT_EQ(counted, buffered.size());
     EXPECT_EQ(buffered, direct);
     EXPECT_EQ(buffered, filtered);
+    expect_an_error_wherever_sends_end(w, where, write);
     return buffered;
 }
 

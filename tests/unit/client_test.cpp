@@ -61,7 +61,7 @@ std::string fault_answer(const std::string &code, const std::string &detail)
 constexpr char NOT_FOUND[] =
     "<c:Client.ObjectNotFound><c:description>gone</c:description><c:detail><c:nestedFault "
     "xsi:type=\"c:Server.System\"><c:description>disk</c:description></c:nestedFault></c:detail>"
-    "<c:uri>urn:a</c:uri></c:Client.ObjectNotFound>";
+    "<c:uri>urn:a</c:uri><c:subcode>urn:s</c:subcode></c:Client.ObjectNotFound>";
 
 std::string name_of(const profile_result &result)
 {
@@ -86,6 +86,7 @@ TEST(client_results, live_as_long_as_they_are_kept)
         EXPECT_EQ(name_of(first), "(none)");
         EXPECT_EQ(failed.failure().faults().at(0).as<protocol__Client_x002eObjectNotFound>()->uri.at(0),
                   "urn:a");
+        EXPECT_STREQ(failed.failure().faults().at(0).subcode(), "urn:s");
         EXPECT_STREQ(failed.failure().fault_text(), "no such thing");
         kept.insert(kept.begin(), wired.get(named_answer("elsewhere")));
         std::thread([result = std::move(kept.front())] { EXPECT_EQ(name_of(result), "elsewhere"); }).join();
@@ -122,7 +123,8 @@ TEST(client_results, are_kept_or_refused_when_memory_runs_out)
         failing_malloc::refuse::one,
         [&] {
             const profile_result next = wired.client.get(request);
-            EXPECT_TRUE(next || next.failure().code().value() == SOAP_OUT_OF_MEMORY);
+            EXPECT_EQ(next.failure().kind(), next ? zuv::failure_kind::none : zuv::failure_kind::memory);
+            EXPECT_EQ(std::string(next.failure().advice()).empty(), static_cast<bool>(next));
         },
         [&](bool) {
             EXPECT_EQ(name_of(kept), "kept");
@@ -182,12 +184,15 @@ TEST(client_failures, say_what_happened_and_what_to_do)
         EXPECT_EQ(name_of(result), "(none)");
     }
     std::set<std::string> texts;
-    for (const int code : {-1, 0, 8, 12, 13, 20, 28, 31, 45, 404, 999, 5000})
+    for (const int code : {-1, 0, 8, 12, 13, 20, 28, 31, 45, 404, 999, 5000, static_cast<int>(SOAP_FORM)})
         texts.insert(zuv::error_category().message(code));
-    EXPECT_EQ(texts.size(), 12U);
+    EXPECT_EQ(texts.size(), 13U);
+    EXPECT_STREQ(zuv::error_category().name(), "zuv");
     for (const std::string &text : texts)
         EXPECT_TRUE(!text.empty() && text.find('%') == text.npos && text.back() != ' ') << text;
-    EXPECT_EQ(zuv::profile_client("htps://x/").get({}).failure().kind(), kind::request);
+    const profile_result unsent = zuv::profile_client("htps://x/").get({});
+    EXPECT_EQ(unsent.failure().kind(), kind::request);
+    EXPECT_TRUE(unsent.failure().message().ends_with("Change the request as the text says."));
     wired_client circle;
     const profile_result result = circle.get(fault_answer(
         "Client", "<c:Client id=\"a\"><c:detail><c:nestedFault href=\"#a\"/></c:detail></c:Client>"));
@@ -419,6 +424,20 @@ TEST_F(client_reports, and_texts_say_what_ended_a_call)
     }
 }
 
+TEST_F(client_reports, name_addresses_of_ipv6)
+{
+    soap listening;
+    if (soap_bind(&listening, "::1", 0, 1) < 0)
+        GTEST_SKIP() << "no IPv6";
+    const std::string address = "[::1]:" + std::to_string(loopback::port_of(listening.master_socket));
+    zuv::options wanted = trusting();
+    wanted.recv_limit = 50ms;
+    zuv::profile_client client("http://" + address, wanted);
+    EXPECT_EQ(client.get({}).failure().kind(), zuv::failure_kind::out_of_time);
+    EXPECT_EQ(client.report().peer, address);
+    EXPECT_TRUE(std::string(client.report().local).starts_with("[::1]:"));
+}
+
 std::atomic<soap *> signalled; // what is cancelled; armed before it is here
 
 TEST_F(client_reports, of_calls_that_are_cancelled_wherever_they_wait)
@@ -510,14 +529,26 @@ TEST(client_options, reach_the_context)
     EXPECT_STREQ(ctx->tls_ca_file, "ca.pem");
     EXPECT_STREQ(ctx->proxy_host, "proxy.test");
     EXPECT_EQ(ctx->proxy_port, 3128);
+    EXPECT_EQ(made.endpoint(), "http://peer.test/");
     EXPECT_STREQ(ctx->proxy_password, "p@ss");
     EXPECT_EQ(made.trace_file() + to_memory.client.trace_file(), "/tmp/a.b/calls-1/tmp/a.b/calls-2");
+    protocol__Header record;
+    std::string transaction = "t-1";
+    record.transactionId = &transaction;
     for (int i = 0; i < 2; ++i) {
-        EXPECT_TRUE(to_memory.get(named_answer("x"), zuv::extras().target("urn:doc").repeatable()));
+        EXPECT_TRUE(
+            to_memory.get(named_answer("x"), zuv::extras().header(record).target("urn:doc").repeatable()));
+        EXPECT_NE(to_memory.wire.sent.find("transactionId>t-1<"), std::string::npos);
         EXPECT_NE(to_memory.wire.sent.find("Authorization: Basic YWRhOnNlY3JldA=="), std::string::npos);
         EXPECT_NE(to_memory.wire.sent.find("targetURI>urn:doc<"), std::string::npos);
         to_memory.wire.sent.clear();
     }
+    wanted.compression = wanted.chunked = wanted.strict_reading = wanted.trace_times = true;
+    wanted.keep_alive = wanted.strict_check = false;
+    wired_client changed(wanted);
+    EXPECT_EQ(changed.client.context()->output_mode, MODE_UTF_STRINGS | MODE_DEFLATE | MODE_CHUNKED);
+    EXPECT_EQ(changed.client.context()->input_mode, MODE_UTF_STRINGS | MODE_STRICT);
+    EXPECT_EQ(changed.client.context()->tls_flags, TLS_VERIFY_PEER);
     wanted.proxy = "nonsense:port";
     EXPECT_EQ(zuv::profile_client("http://peer.test/", wanted).get({}).failure().kind(),
               zuv::failure_kind::request);

@@ -69,6 +69,35 @@ TEST(dime_out, cuts_texts_and_refuses_data_that_no_header_can_announce)
     EXPECT_EQ(soap_envelope_out_end(&large), SOAP_DIME_ERROR);
 }
 
+// Parts of the host's memory and of its streams, whose ends are closed; MIME as well as DIME.
+TEST(attachments_out, end_in_an_error_wherever_sends_are_refused)
+{
+    const std::string first = "first";
+    for (const std::uint32_t form : {MODE_DIME, MODE_MIME | MODE_MTOM, MODE_MTOM | MODE_CANONICAL}) {
+        const bool dime = form == MODE_DIME;
+        std::size_t all = 1;
+        for (std::size_t limit = SIZE_MAX; limit == SIZE_MAX || limit < all;
+             ++limit) { // first all, then from 0 on
+            SCOPED_TRACE(std::to_string(form) + " after " + std::to_string(limit));
+            host_stream source = {std::string(2500, 's')};
+            stream_host host;
+            memory_wire wire(0, MODE_DIRECT | MODE_BARE_XML | form);
+            host.serve(wire);
+            wire.send_limit = limit;
+            auto *const handle = reinterpret_cast<char *>(&source);
+            if (dime)
+                soap_dime_attach(&wire, handle, 2500, "a/b", "s", 1, "options");
+            else
+                soap_mime_attach(&wire, handle, 2500, MIME_BINARY, "a/b", "<s>", "there", "what");
+            const int result = send(wire, {make_value(first, "cid:memory", "image/png")});
+            EXPECT_EQ(result, limit == SIZE_MAX ? 0 : -1);
+            EXPECT_EQ(source.closed, source.at != 0 ? 1 : source.closed);
+            all = limit == SIZE_MAX ? wire.sends.size() : all;
+        }
+        EXPECT_GT(all, 20U);
+    }
+}
+
 // --- streams of the host ---
 
 TEST(dime_stream, goes_out_as_one_record_or_in_chunks_if_its_length_is_unknown)

@@ -58,6 +58,22 @@ std::vector<const protocol__Fault *> faults_in(const SOAP_ENV__Detail &detail)
     return found;
 }
 
+// What was sent, again: with each send refused, and cut after each tag.
+template <class Fill> void fails_wherever_it_ends(const sender &whole, std::int16_t version, Fill fill)
+{
+    for (std::size_t sends = 0; sends < whole.sends.size(); ++sends) {
+        sender failing(version);
+        fill(failing);
+        failing.send_limit = sends;
+        EXPECT_NE(failing.put(false), 0) << "after " << sends << " pieces";
+    }
+    memory_wire in;
+    const std::string xml = whole.sent();
+    for (std::size_t cut = xml.find('>'); cut + 1 < xml.size(); cut = xml.find('>', cut + 1))
+        EXPECT_TRUE(read_fault(in, version, xml.substr(0, cut)) != 0 || in.fault == nullptr)
+            << xml.substr(0, cut);
+}
+
 template <class F>
 void goes_both_ways(const char *spelled, F *SOAP_ENV__Detail::*member, std::int16_t version)
 {
@@ -79,15 +95,7 @@ void goes_both_ways(const char *spelled, F *SOAP_ENV__Detail::*member, std::int1
     EXPECT_EQ(*read->description, why);
     EXPECT_TRUE(!detail_of(in)->__any && !detail_of(in)->fault);
 
-    for (std::size_t sends = 0; sends < out.sends.size(); ++sends) {
-        sender failing(version);
-        failing.send_limit = sends;
-        detail_of(failing)->*member = &fault;
-        EXPECT_NE(failing.put(false), 0) << "after " << sends << " pieces";
-    }
-    for (std::size_t cut = xml.find("Client"); cut != xml.npos; cut = xml.find('>', cut + 1))
-        EXPECT_TRUE(read_fault(in, version, xml.substr(0, cut)) != 0 || in.fault == nullptr)
-            << xml.substr(0, cut);
+    fails_wherever_it_ends(out, version, [&](sender &again) { detail_of(again)->*member = &fault; });
 }
 
 TEST(fault_detail, brings_every_fault_in_both_versions)
@@ -106,22 +114,35 @@ TEST(fault_detail, brings_every_fault_in_both_versions)
     EXPECT_EQ(faults, 2 * 29);
 }
 
-// What the detail's own members don't take: another class of the registry, and raw text.
+// What the detail's own members don't take: another class of the registry, and raw text; and all that the fault
+// has besides.
 TEST(fault_detail, brings_an_object_of_any_class_and_raw_text)
 {
     protocol__Contact contact;
     std::string name = "n";
     contact.name = &name;
-    sender out(1);
-    out.fault->detail->__type = contact.soap_type();
-    out.fault->detail->fault = &contact;
-    *soap_fault_detail_field(&out) = "<raw/>";
-    ASSERT_EQ(out.put(true), 0);
-    memory_wire in;
-    ASSERT_EQ(read_fault(in, 1, out.sent()), 0);
-    ASSERT_EQ(in.fault->detail->__type, contact.soap_type()) << out.sent();
-    EXPECT_EQ(*static_cast<protocol__Contact *>(in.fault->detail->fault)->name, name);
-    EXPECT_NE(std::string(soap_fault_detail_value(&in)).find("raw"), std::string::npos);
+    const auto fill = [&](sender &out) {
+        detail_of(out)->__type = contact.soap_type();
+        detail_of(out)->fault = &contact;
+        *soap_fault_detail_field(&out) = "<raw/>";
+        *soap_fault_subcode_field(&out) = "SOAP-ENV:Client.Sub";
+        out.fault->faultactor = out.fault->Node = out.fault->Role = const_cast<char *>("urn:who");
+    };
+    for (const std::int16_t version : {std::int16_t{1}, std::int16_t{2}}) {
+        SCOPED_TRACE(version);
+        sender out(version);
+        fill(out);
+        ASSERT_EQ(out.put(true), 0);
+        memory_wire in;
+        ASSERT_EQ(read_fault(in, version, out.sent()), 0) << out.sent();
+        ASSERT_EQ(detail_of(in)->__type, contact.soap_type()) << out.sent();
+        EXPECT_EQ(*static_cast<protocol__Contact *>(detail_of(in)->fault)->name, name);
+        EXPECT_NE(std::string(soap_fault_detail_value(&in)).find("raw"), std::string::npos);
+        EXPECT_STREQ(soap_fault_subcode_value(&in), version == 1 ? nullptr : "SOAP-ENV:Client.Sub");
+        EXPECT_STREQ(in.fault->faultactor, "urn:who");
+        EXPECT_STREQ(in.fault->Role, "urn:who");
+        fails_wherever_it_ends(out, version, fill);
+    }
 }
 
 TEST(fault_detail, refers_to_what_was_marked_twice)

@@ -222,6 +222,33 @@ TEST_F(tcp_service, a_client_is_accepted_and_named)
     }
 }
 
+TEST_F(tcp_service, hosts_of_ipv6_are_served_named_and_answered)
+{
+    for (const std::uint32_t mode : {0U, MODE_UDP}) {
+        const bool udp = mode != 0;
+        const char *const endpoint = udp ? "soap.udp://x/" : "http://x/";
+        context service(mode), client(mode), stray(mode), group(mode);
+        if (soap_bind(service.get(), "::1", 0, 5) < 0)
+            GTEST_SKIP() << "no IPv6";
+        const int port = loopback::port_of(service->master_socket);
+        ASSERT_GE(tcp_connect(client.get(), endpoint, "::1", port), 0) << client.fault_text();
+        EXPECT_EQ(tcp_send(client.get(), "ping", 4), 0);
+        ASSERT_GE(soap_accept(service.get()), 0);
+        EXPECT_EQ(receive(service), "ping");
+        EXPECT_STREQ(service->host, udp ? "" : "::1");
+        if (udp) {
+            ASSERT_GE(tcp_connect(stray.get(), endpoint, "::1", loopback::port_of(client->socket)), 0);
+            EXPECT_EQ(tcp_send(stray.get(), "stray", 5), 0);
+            group->ipv6_multicast_scope = 1;
+            EXPECT_GE(tcp_connect(group.get(), endpoint, "ff01::1", port), 0);
+            EXPECT_EQ(reinterpret_cast<sockaddr_in6 *>(group->peer)->sin6_scope_id, 1U);
+            EXPECT_TRUE(client->peer_fixed && !group->peer_fixed) << "anyone may answer for a group";
+        }
+        EXPECT_EQ(tcp_send(service.get(), "pong", 4), 0);
+        EXPECT_EQ(receive(client), "pong");
+    }
+}
+
 TEST_F(tcp_service, listening_and_accepting_name_what_failed)
 {
     context ctx, other;

@@ -280,17 +280,25 @@ TEST_F(tls_setup, a_client_certificate_is_asked_for_and_verified)
     const std::string unknown = ca().write_pair("unknown.pem", own.get(), client_key.get());
     const struct {
         const char *pair, *password;
-        bool accepted;
-        const char *detail; // of the fault
-    } cases[] = {{good.c_str(), "secret", true, nullptr},
-                 {unknown.c_str(), nullptr, false,
-                  "SSL_accept() failed in soap_ssl_accept(): self-signed certificate (at depth 0: "
-                  "CN=client.test,O=Test)"},
-                 {nullptr, nullptr, false, "SSL_accept() failed in soap_ssl_accept()"}};
+        bool accepted, by_host; // by_host: whose own verification lets everyone in
+        const char *detail;     // of the fault
+    } cases[] = {
+        {good.c_str(), "secret", true, false, nullptr},
+        {good.c_str(), "secret", true, true, nullptr},
+        {unknown.c_str(), nullptr, false, false,
+         "SSL_accept() failed in soap_ssl_accept(): self-signed certificate (at depth 0: "
+         "CN=client.test,O=Test)"},
+        {unknown.c_str(), nullptr, false, true,
+         "SSL certificate presented by peer cannot be verified in soap_ssl_accept()"},
+        {nullptr, nullptr, false, false, "SSL_accept() failed in soap_ssl_accept()"},
+        {nullptr, nullptr, false, true, "No SSL certificate was presented by the peer in soap_ssl_accept()"}};
     for (const auto &c : cases) {
         context service, client;
         const int port =
             listen_with(service, server, TLS_REQUIRE_CLIENT_CERT | TLS_NO_DEFAULT_CA, trusted.c_str());
+        if (c.by_host)
+            SSL_CTX_set_verify(service->tls_context, SSL_VERIFY_PEER,
+                               [](int, X509_STORE_CTX *) { return 1; });
         std::future<accept_outcome> outcome = serve_one(service);
         ASSERT_EQ(soap_ssl_client_context(client.get(), VERIFIED, c.pair, c.password, trusted.c_str(),
                                           nullptr, nullptr),
