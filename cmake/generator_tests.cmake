@@ -3,7 +3,7 @@ set(GENERATOR_TESTS ${PROJECT_SOURCE_DIR}/tests/generator)
 
 # Contracts in, text or a refusal out. Not where the generator was built elsewhere: its tests belong there as well.
 if(TARGET contract_translator)
-    add_executable(generator_test ${GENERATOR_TESTS}/generator_test.cpp ${GENERATOR_TESTS}/case_file.cpp)
+    add_executable(generator_test ${GENERATOR_TESTS}/generator_test.cpp)
     target_compile_definitions(generator_test PRIVATE
         GENERATOR_TEST_DATA="${GENERATOR_TESTS}"
         PUBLISHED_CONTRACT="${PROJECT_SOURCE_DIR}/schema"
