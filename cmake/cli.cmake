@@ -13,7 +13,7 @@ add_dependencies(zuv zuv_generated)
 # Where the Python scripts find the programs and each other.
 set(ZUV_CLI_ENVIRONMENT "ZUV_SOURCE_DIR=${PROJECT_SOURCE_DIR}" "ZUV_BUILD_DIR=${PROJECT_BINARY_DIR}"
     "ZUV_PROGRAM=$<TARGET_FILE:zuv>" "ZUV_SERVICE_PROGRAM=$<TARGET_FILE:zuv-service>"
-    "PYTHONPATH=${PROJECT_SOURCE_DIR}/tests/cli:${PROJECT_SOURCE_DIR}/tests/interop")
+    "PYTHONPATH=${PROJECT_SOURCE_DIR}/tests/cli:${PROJECT_SOURCE_DIR}/tests/interop:${PROJECT_SOURCE_DIR}/tests/service")
 if(ZUV_SANITIZE OR ZUV_FUZZ)
     list(APPEND ZUV_CLI_ENVIRONMENT ZUV_SANITIZED=1)
 endif()
@@ -38,7 +38,7 @@ if(ZUV_BUILD_TESTS)
         file(GLOB scripts CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/tests/${part}/*_test.py)
         foreach(script ${scripts})
             get_filename_component(name ${script} NAME_WE)
-            add_test(NAME ${part}_${name} COMMAND /usr/bin/python3 -B ${script})
+            add_test(NAME ${part}_${name} COMMAND /usr/bin/python3 -B -m unittest ${name})
             set_tests_properties(${part}_${name} PROPERTIES LABELS ${part} TIMEOUT 300 ENVIRONMENT "${ZUV_CLI_ENVIRONMENT}")
         endforeach()
     endforeach()

@@ -1,4 +1,3 @@
-#!/usr/bin/python3
 """Calls from the command line: every operation, the options, what comes back, and how failures are reported."""
 import base64
 import email
@@ -30,9 +29,7 @@ PATH = "/zuv/v1.0/services/Profile"
 
 class calls(unittest.TestCase):
     def setUp(self):
-        folder = tempfile.TemporaryDirectory()
-        self.addCleanup(folder.cleanup)
-        self.folder = folder.name
+        self.folder = self.enterContext(tempfile.TemporaryDirectory())
 
     def file(self, name, content):
         path = os.path.join(self.folder, name)
@@ -320,7 +317,3 @@ class calls(unittest.TestCase):
                 run = zuv.run("profile", "get", "-e", address, "--json", "--silence-limit", "20", text=False)
                 self.assertIn(run.returncode, (0, 4, 6, 7, 8, 10), (bytes_, run))
                 self.assertNotIn(b"\x1b", run.stdout + run.stderr)
-
-
-if __name__ == "__main__":
-    unittest.main()

@@ -1,4 +1,3 @@
-#!/usr/bin/python3
 """zuv new and zuv check: documents made from the contract, and held against it."""
 import glob
 import os
@@ -123,7 +122,3 @@ class documents(unittest.TestCase):
         for path in seeds:  # no input ends it otherwise
             run = zuv.run("check", "-", given=pathlib.Path(path).read_bytes(), text=False)
             self.assertIn(run.returncode, (0, 3), (path, run))
-
-
-if __name__ == "__main__":
-    unittest.main()

@@ -1,4 +1,3 @@
-#!/usr/bin/python3
 """The manual and the page about the command line: their examples do what they say, options and exit codes are the program's.
 And completion in bash and zsh."""
 import os
@@ -92,7 +91,3 @@ class manual(unittest.TestCase):
                     self.assertEqual(run.stderr, "")
                     prefix = "protocol:" if shell == self.zsh_completes and ":" in words[-1] else ""  # to bash a word of its own
                     self.assertEqual(sorted(filter(None, run.stdout.split("\n"))), [prefix + one for one in expected])
-
-
-if __name__ == "__main__":
-    unittest.main()

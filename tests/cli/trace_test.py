@@ -1,4 +1,3 @@
-#!/usr/bin/python3
 """zuv trace: what the library logs is made out again, hides secrets, and is harmless whatever it holds."""
 import gzip
 import os
@@ -46,10 +45,8 @@ def bare_deflate(body):
 
 class trace(unittest.TestCase):
     def setUp(self):
-        folder = tempfile.TemporaryDirectory()
-        self.addCleanup(folder.cleanup)
-        self.log, self.page = (os.path.join(folder.name, name) for name in ("t.log", "t.html"))
-        self.folder = folder.name
+        self.folder = self.enterContext(tempfile.TemporaryDirectory())
+        self.log, self.page = (os.path.join(self.folder, name) for name in ("t.log", "t.html"))
 
     def made_page(self, *options):
         run = zuv.run("trace", self.log, "--html", self.page, *options)
@@ -100,8 +97,7 @@ class trace(unittest.TestCase):
                     "--trace", self.log, env={"ZUV_PASSWORD": "pass-4"})
         logged = pathlib.Path(self.log).read_text()
         self.made_page()
-        with open(self.page) as file:
-            shown = file.read() + zuv.run("trace", self.log).stdout + zuv.run("trace", self.log, "--show", "1").stdout
+        shown = pathlib.Path(self.page).read_text() + "".join(zuv.run("trace", self.log, *how).stdout for how in ([], ["--show", "1"]))
         self.made_page("--show-secrets")
         everything = pathlib.Path(self.page).read_text()
         for secret in SECRETS:
@@ -223,7 +219,3 @@ class trace(unittest.TestCase):
             os.truncate(self.log, 0)
             self.assertIn(b"became shorter", running.communicate()[1])
         self.assertEqual(running.returncode, 11)
-
-
-if __name__ == "__main__":
-    unittest.main()

@@ -1,6 +1,7 @@
 """Runs zuv for the tests, and peers that play a script. Programs and places come from the environment (cmake/cli.cmake)."""
 import contextlib
 import os
+import re
 import socket
 import ssl
 import subprocess
@@ -38,21 +39,17 @@ def answer(body, status="200 OK", headers=()):
 
 
 def _read_request(connection):
-    request = b""
-    while b"\r\n\r\n" not in request:
-        part = connection.recv(65536)
-        if not part:
-            return request
-        request += part
-    head, _, body = request.partition(b"\r\n\r\n")
-    chunked = b"transfer-encoding: chunked" in head.lower()
-    lengths = [line for line in head.lower().split(b"\r\n") if line.startswith(b"content-length:")]
-    while not body.endswith(b"\r\n0\r\n\r\n") if chunked else lengths and len(body) < int(lengths[0].split(b":")[1]):
+    request, chunked, length = b"", False, None
+    while not (request.endswith(b"\r\n0\r\n\r\n") if chunked else len(request) == length):
         part = connection.recv(65536)
         if not part:
             break
-        body += part
-    return head + b"\r\n\r\n" + body
+        request += part
+        head, end, _ = request.partition(b"\r\n\r\n")
+        chunked = b"\r\nTransfer-Encoding: chunked" in head
+        size = re.search(rb"\r\nContent-Length: (\d+)", head)
+        length = len(head + end) + (int(size[1]) if size else 0) if end else None
+    return request
 
 
 @contextlib.contextmanager

@@ -111,8 +111,8 @@ def main():
     check_members(folder)
     check_functions(source, folder)
     check_undocumented(source, doxyfile)
-    with open(os.path.join(folder, "index.html"), encoding="utf-8") as file:
-        assert 'href="command_line.html"' in file.read(), "the first page doesn't lead to the command line"
+    first = pathlib.Path(folder, "index.html").read_text("utf-8")
+    assert 'href="command_line.html"' in first, "the first page doesn't lead to the command line"
     page = pathlib.Path(folder, "command_line.html").read_text("utf-8")
     shown = set(re.findall(r'<img src="([^"]+)"', page))
     assert shown == PICTURES, shown

@@ -10,18 +10,17 @@ import re
 import sqlite3
 import sys
 import tempfile
-import urllib.error
 import urllib.request
 
 import zeep
 from lxml import etree
 
+import by_hand
 import listening
 import messages
+from by_hand import target
 
 WSDL = "{http://schemas.xmlsoap.org/wsdl/}"
-SOAP = "http://schemas.xmlsoap.org/soap/envelope/"
-XSI = "http://www.w3.org/2001/XMLSchema-instance"
 MAX_BODY = 60000  # bytes; small, so that documents soon are too large
 # For services that say less than this one, or other faults.
 UNUSED = {"Client", "Client.Authentication", "Server", "Server.ServiceUnavailable"}
@@ -75,21 +74,13 @@ def declared(schemas, port):
 
 
 class Caller:
-    """Writes requests to one port by hand. The prefix c is for what is common, the default namespace is the port's."""
+    """Writes requests to one port by hand."""
 
     def __init__(self, address, port):
-        self.url, self.port, self.answered = address + messages.service_path(port), port, {}
+        self.address, self.port, self.answered = address, port, {}
 
-    def send(self, operation, content="", header=""):
-        uri = messages.namespace(self.port)
-        request = ('<e:Envelope xmlns:e="%s" xmlns:c="%s" xmlns:f="%s/Filter" xmlns="%s" xmlns:xsi="%s">'
-                   "<e:Header><c:header>%s</c:header></e:Header><e:Body><%sRequest>%s</%sRequest></e:Body></e:Envelope>"
-                   % (SOAP, messages.COMMON, uri, uri, XSI, header, operation, content, operation))
-        try:
-            with urllib.request.urlopen(self.url, data=request.encode(), timeout=60) as answer:
-                return etree.fromstring(answer.read())
-        except urllib.error.HTTPError as refused:
-            return etree.fromstring(refused.read())
+    def send(self, *request):
+        return etree.fromstring(by_hand.call(self.address, self.port, *request).body)
 
     def refused(self, fault, operation, *request):
         entries = [etree.QName(one).localname for one in messages.parts(self.send(operation, *request))]
@@ -99,10 +90,6 @@ class Caller:
     def name_in(self, kind, *request):
         """The first name of something of the kind in the answer."""
         return re.search(r"urn:zuv:%s:[\w-]+" % kind.lower(), etree.tostring(self.send(*request)).decode())[0]
-
-
-def target(uri):
-    return "<c:targetURI>%s</c:targetURI>" % uri
 
 
 def chain(tag):

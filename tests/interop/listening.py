@@ -7,11 +7,6 @@ READY = "listening on "
 LIMIT_S = 60
 
 
-def _first_line(process):
-    ready, _, _ = select.select([process.stdout], [], [], LIMIT_S)
-    return process.stdout.readline() if ready else ""
-
-
 class Address(str):
     """That of a program which listens, such as http://127.0.0.1:40001."""
     process = None  # subprocess.Popen
@@ -25,7 +20,8 @@ def started(command, end_status=0, **options):
     """
     process = subprocess.Popen(command, stdout=subprocess.PIPE, text=True, **options)
     try:
-        line = _first_line(process)
+        ready, _, _ = select.select([process.stdout], [], [], LIMIT_S)
+        line = process.stdout.readline() if ready else ""
         if not line.startswith(READY):
             raise RuntimeError("%s did not start: %r" % (command[0], line))
         address = Address(line[len(READY):].strip())

@@ -12,7 +12,7 @@ import sys
 import listening
 import messages
 import zuv_service
-from programs import Call, Caller, EOF_ERROR, LIMIT_S, TCP_ERROR, command, free_port
+from programs import Call, Caller, EOF_ERROR, LIMIT_S, TCP_ERROR, command, words
 
 CLIENT, SERVER = "10.213.7.1", "10.213.7.2"  # each in a namespace of its own, so nothing else sees them
 NO_HOST = "10.213.7.9"
@@ -55,17 +55,14 @@ class Network:
         for end in self.ends:
             end.communicate()
 
+    @contextlib.contextmanager
     def unplugged(self):
         """From here to the end of the block packets leave and vanish, both ways."""
-        return self._far_neighbours("02:00:00:00:00:09")
-
-    @contextlib.contextmanager
-    def _far_neighbours(self, address):
-        for inside, other in ((self.in_near, SERVER), (self.in_far, CLIENT)):
-            assert run(*inside, command("ip"), "neigh", "replace", other, "lladdr", address, "dev", "cable").returncode == 0
-        yield
-        for inside, other in ((self.in_near, SERVER), (self.in_far, CLIENT)):
-            assert run(*inside, command("ip"), "neigh", "del", other, "dev", "cable").returncode == 0
+        for step in ["replace", "lladdr", "02:00:00:00:00:09"], ["del"]:
+            for inside, other in ((self.in_near, SERVER), (self.in_far, CLIENT)):
+                assert run(*inside, command("ip"), "neigh", step[0], other, *step[1:], "dev", "cable").returncode == 0
+            if step != ["del"]:
+                yield
 
     def impaired(self, *how):
         """Makes the cable so, both ways. An error text, or none."""
@@ -80,7 +77,7 @@ class Steps:
     """A call_client that makes its calls when it is asked to."""
 
     def __init__(self, before, client, *options):
-        self.process = subprocess.Popen([*before, client, *map(str, options), "--steps"], stdin=subprocess.PIPE,
+        self.process = subprocess.Popen([*before, client, *words(options), "--steps"], stdin=subprocess.PIPE,
                                         stdout=subprocess.PIPE, text=True)
 
     def call(self):
@@ -104,13 +101,13 @@ def expect(rule, call, code, least_ms):
 
 
 def silent_network(network, client, endpoint):
-    limits = ["--connect", 1, "--send", 1, "--recv", 1]
+    limits = ["--connect 1 --send 1 --recv 1"]
     caller = Caller(client)
-    caller.run("no host there", "http://%s:80/" % NO_HOST, *limits, "--calls", 2, codes=TCP_ERROR, least_ms=1000,
+    caller.run("no host there", "http://%s:80/" % NO_HOST, *limits, "--calls 2", codes=TCP_ERROR, least_ms=1000,
                most_ms=1000 + SLACK_MS, before=network.in_near)
     caller.run("no host there, then a service", "http://%s:80/ %s" % (NO_HOST, endpoint), *limits, codes=0, least_ms=1000,
                most_ms=1000 + SLACK_MS, before=network.in_near)
-    steps = Steps(network.in_near, client, endpoint, *limits, "--keep-alive", "--calls", 10, "--size", 100)
+    steps = Steps(network.in_near, client, endpoint, *limits, "--keep-alive --calls 10 --size 100")
     expect("a cable", steps.call(), 0, 0)
     expect("the kept connection", steps.next(), 0, 0)
     with network.unplugged():
@@ -118,10 +115,9 @@ def silent_network(network, client, endpoint):
         expect("no cable, anew", steps.next(), TCP_ERROR, 1000)
     expect("the cable is back", steps.next(), 0, 0)
     steps.end()
-    caller.run("no host there, and a brief whole", "http://%s:80/ %s" % (NO_HOST, endpoint), "--connect", 30, "--whole", 1,
+    caller.run("no host there, and a brief whole", "http://%s:80/ %s" % (NO_HOST, endpoint), "--connect 30 --whole 1",
                codes=TCP_ERROR, least_ms=1000, most_ms=1000 + SLACK_MS, before=network.in_near)
-    steps = Steps(network.in_near, client, endpoint, "--connect", 1, "--send", 1, "--recv", 30, "--keep-alive", "--calls", 10,
-                  "--size", 8_000_000)
+    steps = Steps(network.in_near, client, endpoint, "--connect 1 --send 1 --recv 30 --keep-alive --calls 10 --size 8000000")
     expect("a large message", steps.call(), 0, 0)
     with network.unplugged():
         expect("no cable while a large message is sent", steps.next(), EOF_ERROR, 1000)
@@ -131,20 +127,20 @@ def silent_network(network, client, endpoint):
 
 def slow_network(network, client, endpoint):
     caller = Caller(client)
-    limits = ["--connect", 20, "--send", 20, "--recv", 20]
+    limits = ["--connect 20 --send 20 --recv 20"]
     failure = network.impaired("delay", "50ms")
     if failure:
         print("left out: delay and loss, for this kernel has no netem (%s)" % failure)
         return
-    caller.run("50 ms each way", endpoint, *limits, "--keep-alive", "--calls", 3, codes=0, connections=1, least_ms=100,
+    caller.run("50 ms each way", endpoint, *limits, "--keep-alive --calls 3", codes=0, connections=1, least_ms=100,
                before=network.in_near)
-    caller.run("50 ms each way, a brief limit", endpoint, "--recv", -60000, "--connect", 5, "--calls", 2, codes=EOF_ERROR,
-               least_ms=60, before=network.in_near)
-    caller.run("50 ms each way, connected too late", endpoint, "--connect", -60000, "--calls", 2, codes=TCP_ERROR, least_ms=60,
+    caller.run("50 ms each way, a brief limit", endpoint, "--recv -60000 --connect 5 --calls 2", codes=EOF_ERROR, least_ms=60,
+               before=network.in_near)
+    caller.run("50 ms each way, connected too late", endpoint, "--connect -60000 --calls 2", codes=TCP_ERROR, least_ms=60,
                before=network.in_near)
     assert not network.impaired("delay", "10ms", "5ms", "loss", "5%")
-    caller.run("one of 20 packets lost", endpoint, *limits, "--keep-alive", "--calls", 20, "--size", 20000, codes=0,
-               connections=1, before=network.in_near)
+    caller.run("one of 20 packets lost", endpoint, *limits, "--keep-alive --calls 20 --size 20000", codes=0, connections=1,
+               before=network.in_near)
 
 
 def main():

@@ -110,10 +110,14 @@ def certificates(folder):
         _openssl("req", "-x509", *key, "-subj", "/CN=" + subject, "-addext", "subjectAltName=" + names,
                  "-addext", "basicConstraints=critical,CA:FALSE", "-CA", path("ca.pem"), "-CAkey", path("ca.key"),
                  "-keyout", path(name + ".key"), "-out", path(name + ".crt"))
-        with open(path(name + ".pem"), "w", encoding="utf-8") as both:
-            for part in (".crt", ".key"):
-                both.write(pathlib.Path(path(name + part)).read_text("utf-8"))
+        both = (pathlib.Path(path(name + part)).read_text("utf-8") for part in (".crt", ".key"))
+        pathlib.Path(path(name + ".pem")).write_text("".join(both), "utf-8")
     return folder
+
+
+def words(options):
+    """Options of call_client, several of which may be one text."""
+    return " ".join(map(str, options)).split()
 
 
 class Call:
@@ -135,8 +139,7 @@ class Caller:
 
     def run(self, rule, endpoint, *options, codes, connections=None, least_ms=0, most_ms=20000, before=()):
         """`codes`: one for all calls, a list, or a set of which each call has one. Gives the calls."""
-        run = subprocess.run([*before, self.program, endpoint, *map(str, options)], capture_output=True, text=True,
-                             timeout=LIMIT_S)
+        run = subprocess.run([*before, self.program, endpoint, *words(options)], capture_output=True, text=True, timeout=LIMIT_S)
         what = (rule, run.stdout, run.stderr)
         assert run.returncode == 0 and "descriptors left: 0\n" in run.stdout, what
         calls = [Call(line) for line in run.stdout.splitlines() if line.startswith("code=")]

@@ -145,37 +145,35 @@ def through_nginx(caller, folder, words):
         at = lambda place: "http://127.0.0.1:%d/%s" % (plain, place)
         whole = PATH[1:]
         for framing in ([], ["--chunked"], ["--gzip"]):
-            caller.run("nginx " + " ".join(framing), at(whole), "--keep-alive", "--calls", 50, "--size", 3000, *framing,
-                       codes=0, connections=1)
-        caller.run("nginx, no keeping asked for", at(whole), "--calls", 5, codes=0, connections=5)
-        caller.run("nginx, 3 calls a connection", at("few"), "--keep-alive", "--calls", 10, codes=0, connections=4)
-        caller.run("nginx, keeps no connection", at("hasty"), "--keep-alive", "--calls", 5, codes=0, connections=5)
-        caller.run("nginx, gzip in chunks", at("packed"), "--keep-alive", "--calls", 20, "--size", 200000, codes=0,
-                   connections=1)
-        caller.run("nginx, a slow body", at("slow"), "--keep-alive", "--size", 60000, "--recv", 5, codes=0, least_ms=500)
-        caller.run("nginx, locked", at("locked"), "--keep-alive", "--calls", 2, codes=401)
-        caller.run("nginx, wrong password", at("locked"), "--user", "Aladdin:x", codes=401)
-        caller.run("nginx, password", at("locked"), "--keep-alive", "--calls", 5, "--user", "Aladdin:sesame", codes=0,
-                   connections=1)
-        caller.run("nginx, request too large", at("small"), "--size", 5000, "--calls", 2, codes=413)
-        caller.run("nginx, moved", at("moved"), "--calls", 2, "--keep-alive", codes=301)
-        caller.run("nginx, no body", at("empty"), "--calls", 2, "--keep-alive", codes=NO_DATA)
-        caller.run("nginx, no XML", at("text"), "--calls", 2, "--keep-alive", codes=200)
-        caller.run("nginx, service gone", at("dead"), "--calls", 2, "--keep-alive", codes=502)
+            caller.run("nginx " + " ".join(framing), at(whole), "--keep-alive --calls 50 --size 3000", *framing, codes=0,
+                       connections=1)
+        caller.run("nginx, no keeping asked for", at(whole), "--calls 5", codes=0, connections=5)
+        caller.run("nginx, 3 calls a connection", at("few"), "--keep-alive --calls 10", codes=0, connections=4)
+        caller.run("nginx, keeps no connection", at("hasty"), "--keep-alive --calls 5", codes=0, connections=5)
+        caller.run("nginx, gzip in chunks", at("packed"), "--keep-alive --calls 20 --size 200000", codes=0, connections=1)
+        caller.run("nginx, a slow body", at("slow"), "--keep-alive --size 60000 --recv 5", codes=0, least_ms=500)
+        caller.run("nginx, locked", at("locked"), "--keep-alive --calls 2", codes=401)
+        caller.run("nginx, wrong password", at("locked"), "--user Aladdin:x", codes=401)
+        caller.run("nginx, password", at("locked"), "--keep-alive --calls 5 --user Aladdin:sesame", codes=0, connections=1)
+        caller.run("nginx, request too large", at("small"), "--size 5000 --calls 2", codes=413)
+        caller.run("nginx, moved", at("moved"), "--calls 2 --keep-alive", codes=301)
+        caller.run("nginx, no body", at("empty"), "--calls 2 --keep-alive", codes=NO_DATA)
+        caller.run("nginx, no XML", at("text"), "--calls 2 --keep-alive", codes=200)
+        caller.run("nginx, service gone", at("dead"), "--calls 2 --keep-alive", codes=502)
         caller.run("nginx, service silent", at("silent"), "--keep-alive", codes=504, least_ms=900)
-        caller.run("nginx, service silent, own limit", at("silent"), "--recv", -200000, codes=EOF_ERROR, least_ms=200,
+        caller.run("nginx, service silent, own limit", at("silent"), "--recv -200000", codes=EOF_ERROR, least_ms=200,
                    most_ms=5000)
         trust = ["--ca", os.path.join(folder, "ca.pem")]
         for version, port in (("1.2", tls12), ("1.3", tls13)):
             endpoint = "https://localhost:%d%s" % (port, PATH)
-            caller.run("nginx, TLS " + version, endpoint, *trust, "--keep-alive", "--calls", 50, "--size", 30000, codes=0,
+            caller.run("nginx, TLS " + version, endpoint, *trust, "--keep-alive --calls 50 --size 30000", codes=0,
                        connections=1)
-            caller.run("nginx, TLS %s, limits" % version, endpoint, *trust, "--recv", 10, "--send", 10, "--connect", 10,
-                       "--calls", 5, "--size", 300000, codes=0, connections=5)
+            caller.run("nginx, TLS %s, limits" % version, endpoint, *trust,
+                       "--recv 10 --send 10 --connect 10 --calls 5 --size 300000", codes=0, connections=5)
         endpoint = "https://localhost:%d%s" % (closed, PATH)
         key = ["--key", os.path.join(folder, "client.pem")]
-        caller.run("nginx, client's certificate", endpoint, *trust, *key, "--calls", 3, codes=0, connections=3)
-        caller.run("nginx, no client's certificate", endpoint, *trust, "--calls", 2, codes={3, 5, 6, 39, 400})
+        caller.run("nginx, client's certificate", endpoint, *trust, *key, "--calls 3", codes=0, connections=3)
+        caller.run("nginx, no client's certificate", endpoint, *trust, "--calls 2", codes={3, 5, 6, 39, 400})
         caller.run("nginx, TLS to a plain port", "https://localhost:%d/" % plain, *trust, codes=TLS_ERROR)
         caller.run("nginx, plain to a TLS port", "http://localhost:%d/" % tls12, codes={3, 5, 6, 39, 400})
         caller.run("nginx, not trusted", endpoint, "--ca", os.path.join(folder, "client.crt"), codes=TLS_ERROR)
@@ -221,13 +219,13 @@ def through_haproxy(caller, folder, words):
         at = lambda port: "https://127.0.0.1:%d%s" % (port, PATH)
         strict = ["--tls-flags", 1 | 16 | 512]
         for version, port in zip(("1.2", "1.3"), ports):
-            caller.run("HAProxy, TLS " + version, at(port), *trust, *strict, "--keep-alive", "--calls", 50, "--size", 30000,
-                       codes=0, connections=1)
-            caller.run("HAProxy, TLS %s, anew each time" % version, at(port), *trust, "--calls", 10, codes=0, connections=10)
-        caller.run("HAProxy, client's certificate", at(ports[2]), *trust, *key, "--calls", 2, codes=0)
-        caller.run("HAProxy, no client's certificate", at(ports[2]), *trust, "--calls", 2, codes={EOF_ERROR, TLS_ERROR})
+            caller.run("HAProxy, TLS " + version, at(port), *trust, *strict, "--keep-alive --calls 50 --size 30000", codes=0,
+                       connections=1)
+            caller.run("HAProxy, TLS %s, anew each time" % version, at(port), *trust, "--calls 10", codes=0, connections=10)
+        caller.run("HAProxy, client's certificate", at(ports[2]), *trust, *key, "--calls 2", codes=0)
+        caller.run("HAProxy, no client's certificate", at(ports[2]), *trust, "--calls 2", codes={EOF_ERROR, TLS_ERROR})
         plain = "http://127.0.0.1:%d/" % ports[3]
-        caller.run("HAProxy, service gone", plain, "--calls", 2, codes=503)
+        caller.run("HAProxy, service gone", plain, "--calls 2", codes=503)
         caller.run("HAProxy, service silent", plain + "silent", codes=504, least_ms=900)
 
 
@@ -238,21 +236,21 @@ def all_ways(caller, name, proxy, plain, secure, trust, locked):
     name += ", locked" if locked else ""
     # Tinyproxy ends a connection after each answer without having said so; a call may come upon the end.
     kept = {0, EOF_ERROR} if name.startswith("tinyproxy") else 0
-    for limits in ([], ["--connect", 10, "--send", 10, "--recv", 10]):
+    for limits in ([], ["--connect 10 --send 10 --recv 10"]):
         what = name + (", limits" if limits else "")
-        caller.run(what + ", plain", plain, *through, *user, *limits, "--keep-alive", "--calls", 20, "--size", 5000, codes=kept)
-        caller.run(what + ", plain, anew", plain, *through, *user, *limits, "--calls", 3, codes=0, connections=3)
-        caller.run(what + ", CONNECT", secure, *through, *user, *limits, *trust, "--keep-alive", "--calls", 20, "--size", 5000,
-                   codes=0, connections=1)
-        caller.run(what + ", CONNECT, anew", secure, *through, *user, *limits, *trust, "--calls", 3, codes=0, connections=3)
+        caller.run(what + ", plain", plain, *through, *user, *limits, "--keep-alive --calls 20 --size 5000", codes=kept)
+        caller.run(what + ", plain, anew", plain, *through, *user, *limits, "--calls 3", codes=0, connections=3)
+        caller.run(what + ", CONNECT", secure, *through, *user, *limits, *trust, "--keep-alive --calls 20 --size 5000", codes=0,
+                   connections=1)
+        caller.run(what + ", CONNECT, anew", secure, *through, *user, *limits, *trust, "--calls 3", codes=0, connections=3)
     if locked:
         for wrong in ([], ["--proxy-user", "Aladdin:x"]):
             what = name + (", wrong password" if wrong else ", no password")
             answer = 407 if name.startswith("squid") else {401, 407}
-            caller.run(what, plain, *through, *wrong, "--keep-alive", "--calls", 2, codes=answer)
-            caller.run(what + ", CONNECT", secure, *through, *wrong, *trust, "--keep-alive", "--calls", 2, codes=answer)
+            caller.run(what, plain, *through, *wrong, "--keep-alive --calls 2", codes=answer)
+            caller.run(what + ", CONNECT", secure, *through, *wrong, *trust, "--keep-alive --calls 2", codes=answer)
     for scheme in ("http", "https"):
-        caller.run("%s, %s service gone" % (name, scheme), scheme + "://127.0.0.1:9/", *through, *user, *trust, "--calls", 2,
+        caller.run("%s, %s service gone" % (name, scheme), scheme + "://127.0.0.1:9/", *through, *user, *trust, "--calls 2",
                    codes={500, 502, 503})
 
 
@@ -269,7 +267,7 @@ def through_proxies(caller, folder, words):
                     ("tinyproxy", filled(TINYPROXY, {"access": "BasicAuth Aladdin sesame" if locked else ""}), ["-d", "-c"])):
                 with server(folder, name, [command(name), *arguments, "@file@"], text) as (port,):
                     all_ways(caller, name, port, plain, secure, trust, locked)
-    caller.run("no proxy there", plain, "--proxy", "127.0.0.1", "--proxy-port", 9, codes=TCP_ERROR)
+    caller.run("no proxy there", plain, "--proxy", "127.0.0.1", "--proxy-port 9", codes=TCP_ERROR)
 
 
 def main():

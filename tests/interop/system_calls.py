@@ -18,13 +18,13 @@ from programs import Caller, certificates, stunnel
 
 FEW, MANY = 10, 110
 TRANSFERS = {"sendto": 1, "recvfrom": 1}
-LIMITS = ["--connect", 10, "--send", 10, "--recv", 10, "--whole", 10]
+LIMITS = ["--connect 10 --send 10 --recv 10 --whole 10"]
 
 
 def counted(caller, folder, rule, endpoint, calls, *options):
     """The system calls of a whole run, by name."""
     file = os.path.join(folder, "strace")
-    caller.run("%s, %d calls" % (rule, calls), endpoint, "--keep-alive", "--calls", calls, *options, codes=0, connections=1,
+    caller.run("%s, %d calls" % (rule, calls), endpoint, "--keep-alive --calls", calls, *options, codes=0, connections=1,
                before=["strace", "-f", "-c", "-o", file])
     with open(file, encoding="utf-8") as table:
         rows = re.findall(r"^ *[\d.]+ +[\d.]+ +\d+ +(\d+)(?: +\d+)? +(\w+)$", table.read(), re.MULTILINE)

@@ -54,8 +54,8 @@ def main():
         library = os.path.dirname(glob.glob(os.path.join(prefix, "lib", "**", "libzuv_client_pro.so"), recursive=True)[0])
         where = {"LD_LIBRARY_PATH": library, "PKG_CONFIG_PATH": os.path.join(library, "pkgconfig"), "CMAKE_PREFIX_PATH": prefix}
         with zuv_service.running(os.path.join(build, "zuv-service")) as address:
-            with open(os.path.join(folder, "host.cpp"), "w", encoding="utf-8") as file:
-                file.write(found(r"^```cpp\n(.*?)^```", readme).replace("http://127.0.0.1:9080", address))
+            source_text = found(r"^```cpp\n(.*?)^```", readme).replace("http://127.0.0.1:9080", address)
+            pathlib.Path(folder, "host.cpp").write_text(source_text, "utf-8")
             pathlib.Path(folder, "CMakeLists.txt").write_text(PROJECT + found(r"^```cmake\n(.*?)^```", readme), "utf-8")
             for command, host in ((found(r"``(g\+\+ .*?)``", readme), "./a.out"), ("cmake -B b && cmake --build b", "b/host")):
                 run(command, folder, **where)

@@ -1,4 +1,3 @@
-#!/usr/bin/python3
 """Data that travels in the same message as a document that refers to it: kept as files, given back, forgotten."""
 import base64
 import json
@@ -50,9 +49,8 @@ def addition(uri, reference):
 
 class attachments(unittest.TestCase):
     def setUp(self):
-        folder = tempfile.TemporaryDirectory()
-        self.addCleanup(folder.cleanup)
-        self.folder, self.database = folder.name, os.path.join(folder.name, "documents.db")
+        self.folder = self.enterContext(tempfile.TemporaryDirectory())
+        self.database = os.path.join(self.folder, "documents.db")
 
     def kept(self):
         """Names of the files of data; what arrives and is not wanted is gone only after the answer."""
@@ -212,7 +210,3 @@ class attachments(unittest.TestCase):
         with zuv.service("--database", self.database) as address:
             self.assertEqual(len(os.listdir(self.database + "-data")), 1, "what an earlier end left over is removed")
             self.assertIn("\r\n\r\nkept\r\n--", exchange(address, mime_post(about(uri, "get"))))
-
-
-if __name__ == "__main__":
-    unittest.main()

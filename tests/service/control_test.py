@@ -1,4 +1,3 @@
-#!/usr/bin/python3
 """What serves developers: faults and delays on request, the access log, the last exchanges and the page that shows them."""
 import base64
 import concurrent.futures
@@ -330,7 +329,3 @@ class control(unittest.TestCase):
             for options in (["--tls"], ["--cert", both], ["--tls", "--cert", basic], ["--tls", "--cert", both, "--key", ca]):
                 run = subprocess.run([zuv.SERVICE, "--port", "0", *options], capture_output=True, text=True, timeout=60)
                 self.assertEqual((run.returncode in (1, 2), run.stdout, run.stderr == ""), (True, "", False), run)
-
-
-if __name__ == "__main__":
-    unittest.main()

@@ -1,4 +1,3 @@
-#!/usr/bin/python3
 """The service when its disk takes no more, or another holds its database: a fault, a line in the log, and it goes on."""
 import os
 import resource
@@ -55,7 +54,3 @@ class disk(unittest.TestCase):
             self.expect_failure(call(address, "Profile", "create"), "database is locked")
             other.execute("ROLLBACK")
             self.assertEqual(call(address, "Profile", "create").status, 200)
-
-
-if __name__ == "__main__":
-    unittest.main()

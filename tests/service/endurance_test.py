@@ -1,4 +1,3 @@
-#!/usr/bin/python3
 """What the service outlives: garbage, cut requests, work out of all proportion, its own violent end, many clients at once."""
 import concurrent.futures
 import gzip
@@ -40,10 +39,7 @@ def doubled(tag, depth, content=""):
 
 class endurance(unittest.TestCase):
     def started(self, *options, **how):
-        running = zuv.service(*options, **how)
-        address = running.__enter__()
-        self.addCleanup(running.__exit__, None, None, None)  # which fails if it ended before or otherwise than with 0
-        return address
+        return self.enterContext(zuv.service(*options, **how))  # whose end fails if it ended before or otherwise than with 0
 
     def expect_useful(self, address):
         self.assertEqual(exchange(address, create("x")).status, 200)
@@ -179,7 +175,3 @@ class endurance(unittest.TestCase):
             self.assertEqual(list(pool.map(work, range(clients))), clients * [calls * [200]])
         held = call(address, "Profile", "get", header=header).all("contact")
         self.assertEqual(len(held), clients * calls, "no change was lost")
-
-
-if __name__ == "__main__":
-    unittest.main()

@@ -1,4 +1,3 @@
-#!/usr/bin/python3
 """The service as an HTTP server: statuses, framings, versions, connections, and the files that it keeps."""
 import json
 import os
@@ -218,7 +217,3 @@ class http(unittest.TestCase):
             with open(trace, encoding="utf-8") as file:
                 text = file.read()
             self.assertTrue("createRequest" in text and "createResponse" in text, text)
-
-
-if __name__ == "__main__":
-    unittest.main()

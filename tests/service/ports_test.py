@@ -1,4 +1,3 @@
-#!/usr/bin/python3
 """What the ports do beyond the walk through all operations, which tests/interop takes, and the faults that they may answer
 with, which contract_handed_out.py asks for."""
 import datetime
@@ -20,9 +19,7 @@ def elements(words, prefix=""):
 class ports(unittest.TestCase):
     @classmethod
     def setUpClass(cls):
-        running = zuv.service("--account", "ada:sesame", "--account", "bob:x")
-        cls.address = running.__enter__()
-        cls.addClassCleanup(running.__exit__, None, None, None)
+        cls.address = cls.enterClassContext(zuv.service("--account", "ada:sesame", "--account", "bob:x"))
 
     def ask(self, port, operation, content="", header="", fault=None):
         """The answer; with the fault of this name in it, or none."""
@@ -34,8 +31,6 @@ class ports(unittest.TestCase):
 
     def made(self, port, operation="create", content=""):
         return self.ask(port, operation, content).first("thisURI")
-
-    # --- profiles ---
 
     def test_credentials_of_the_same_holder_are_refreshed_and_new_ones_added(self):
         uri = self.made("Profile", content=ADA)
@@ -70,8 +65,6 @@ class ports(unittest.TestCase):
                               fault="Client.Authentication.CredentialsExpired")
             self.assertEqual(len(answer.all("credentials")), 1, "those that have expired")
         self.ask("Profile", "get", header=header + good)
-
-    # --- reports ---
 
     def test_a_report_stays_as_it_ended(self):
         header = target(self.made("StatusReport"))
@@ -126,8 +119,6 @@ class ports(unittest.TestCase):
             self.assertTrue(answer.first("submitDateTime"))
             self.assertEqual(answer.first("confidence"), "90" if title == "Question" else answer.first("confidence"))
 
-    # --- update orders ---
-
     def test_the_state_of_an_order_says_how_far_it_came(self):
         quiet = elements("includeData=false includeUpdateIdExpansionDetail=false")
         for order, state, details in ((elements("updateId=FW-100") + quiet, "complete.available", 0),
@@ -163,8 +154,6 @@ class ports(unittest.TestCase):
         self.assertEqual(answer.first("username"), "ada")
         self.assertNotIn("sesam", answer, "secrets are not sent back")
 
-    # --- queries ---
-
     def test_each_query_of_a_batch_is_answered(self):
         def query(type_, content=""):
             batch = '<c:QueryRequests><c:queryRequest xsi:type="%s">%s</c:queryRequest></c:QueryRequests>' % (type_, content)
@@ -199,7 +188,3 @@ class ports(unittest.TestCase):
                 self.assertNotIn(absent, answer)
         ping = by_hand.envelope("Query", '<any xsi:type="c:PingRequest"/>', version=2)
         self.assertIn("protocol:PingResponse", by_hand.exchange(self.address, by_hand.post("Query", ping)))
-
-
-if __name__ == "__main__":
-    unittest.main()

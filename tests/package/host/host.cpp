@@ -1,7 +1,6 @@
-// host.cpp - a stranger's host: nothing but installed headers and the installed library.
-//
-// Usage: host ENDPOINT of a Profile port. Calls through a proxy, through callbacks of its own, and in a call
-// cycle of its own, and lets an exception of its own cross the library. Says what failed; 0 when nothing did.
+// host.cpp - a stranger's host: nothing but installed headers and the installed library. Usage: host ENDPOINT
+// of a Profile port. Calls through a proxy, through callbacks of its own, and in a call cycle of its own, and
+// lets an exception of its own cross the library. Says what failed; 0 when nothing did.
 #include <cstdio>
 #include <cstring>
 #include <stdexcept>
