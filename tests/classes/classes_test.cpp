@@ -1,15 +1,8 @@
-// classes_test.cpp - every class of the contract: written, read back, the same.
-//
-// Elsewhere: valid by its schema (tests/foreign, tests/interop).
-//
-// Nothing here names a class: the registry says which there are, so that none can be forgotten.
-#include <utility>
+// classes_test.cpp - every class of the contract: written, read back, the same. Elsewhere: valid by its
+// schema (tests/foreign, tests/interop). Nothing here names a class: the registry says which there are, so
+// that none can be forgotten.
 
 #include <zuv_client_pro/protocolProfile.h>
-#include <zuv_client_pro/soap_attachment.h>
-#include <zuv_client_pro/soap_envelope.h>
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_xml.h>
 
 #include "core/message_store.h"
 #include "exchange/request.h"
@@ -84,19 +77,15 @@ protected:
 
 TEST_F(every_class, come_back_equal_from_every_framing_and_mode)
 {
-    const std::uint32_t modes[] = {MODE_BUFFERED,
-                                   MODE_STORE,
-                                   MODE_DIRECT,
-                                   MODE_BUFFERED | SOAP_XML_GRAPH,
-                                   MODE_BUFFERED | MODE_NIL,
-                                   MODE_BUFFERED | MODE_DEFAULT_NAMESPACE,
-                                   MODE_BUFFERED | MODE_CANONICAL};
     for_each_class(ctx, [&](int id, const binding::type_entry &entry) {
         const binding::class_ops &ops = *entry.ops;
         source random(&ctx, static_cast<unsigned>(id));
         void *object = soap_instantiate(&ctx, id, nullptr, nullptr, nullptr);
         row_of(id)->fill(random, object, DEPTH);
-        for (const std::uint32_t mode : modes) {
+        for (const std::uint32_t mode :
+             {MODE_BUFFERED, MODE_STORE, MODE_DIRECT, MODE_BUFFERED | SOAP_XML_GRAPH,
+              MODE_BUFFERED | MODE_NIL, MODE_BUFFERED | MODE_DEFAULT_NAMESPACE,
+              MODE_BUFFERED | MODE_CANONICAL}) {
             SCOPED_TRACE(std::string(ops.xml_type) + " mode " + std::to_string(mode));
             const std::string document = write(ops, object, mode);
             const void *back = read(ops, document, 0);
@@ -140,10 +129,7 @@ TEST_F(every_class, end_in_an_error_wherever_their_bytes_stop)
     });
 }
 
-// ---------------------------------------------------------------------------------------------
-// Messages of a call: written once, which is the short way, or twice.
-
-// What a caller sees of a message that was sent.
+// What a caller sees of a message that was sent: written once, which is the short way, or twice.
 struct sent_message {
     int error;
     std::vector<std::string> sends;
@@ -176,24 +162,19 @@ protected:
         message_store_wipe(&ctx);
         ctx.socket = -1;
         ctx.buffer_index = 0;
-        return {error,
-                ctx.sends,
-                ctx.exceeded != nullptr ? ctx.exceeded : "",
-                ctx.fault != nullptr ? text_of(*soap_fault_string_field(&ctx)) : "",
-                ctx.mode,
-                ctx.message_part,
-                ctx.message_count};
+        const std::string fault = ctx.fault != nullptr ? text_of(*soap_fault_string_field(&ctx)) : "";
+        const std::string limit = ctx.exceeded != nullptr ? ctx.exceeded : "";
+        return {error, ctx.sends, limit, fault, ctx.mode, ctx.message_part, ctx.message_count};
     }
 
-    // The same both ways; true if it went the short way.
     bool same_both_ways(const binding::class_ops &ops, const void *object, std::uint32_t mode = 0)
     {
         const sent_message long_way = send(false, ops, object, mode);
         EXPECT_EQ(0U, message.stored);
         const sent_message short_way = send(true, ops, object, mode);
         EXPECT_TRUE(long_way == short_way)
-            << ops.xml_type << " mode " << std::hex << mode << std::dec << " errors " << long_way.error << " "
-            << short_way.error << " sends " << long_way.sends.size() << " " << short_way.sends.size();
+            << ops.xml_type << " mode " << mode << " errors " << long_way.error << " " << short_way.error
+            << " sends " << long_way.sends.size() << " " << short_way.sends.size();
         return message.stored != 0;
     }
 
@@ -211,15 +192,6 @@ protected:
 
 TEST_F(requests, written_once_are_those_written_twice)
 {
-    const std::uint32_t modes[] = {0,
-                                   MODE_BUFFERED,
-                                   MODE_INDENT,
-                                   MODE_NIL,
-                                   MODE_NO_TYPE,
-                                   MODE_DEFAULT_NAMESPACE,
-                                   MODE_CANONICAL,
-                                   MODE_WSU_ID,
-                                   MODE_NULL_STRINGS | MODE_UTF_STRINGS | SOAP_XML_TREE};
     for_each_class(ctx, [&](int id, const binding::type_entry &entry) {
         const binding::class_ops &ops = *entry.ops;
         source random(&ctx, static_cast<unsigned>(id), id % 2 != 0);
@@ -227,7 +199,9 @@ TEST_F(requests, written_once_are_those_written_twice)
         row_of(id)->fill(random, object, DEPTH);
         ctx.max_depth = 40; // those that share hold cycles
         ctx.max_message = 3 * SOAP_STORE_SIZE;
-        for (const std::uint32_t mode : modes)
+        for (const std::uint32_t mode :
+             {0U, MODE_BUFFERED, MODE_INDENT, MODE_NIL, MODE_NO_TYPE, MODE_DEFAULT_NAMESPACE, MODE_CANONICAL,
+              MODE_WSU_ID, MODE_NULL_STRINGS | MODE_UTF_STRINGS | SOAP_XML_TREE})
             same_both_ways(ops, object, mode);
         const sent_message whole = send(true, ops, object);
         std::size_t bytes = 0;
@@ -282,11 +256,20 @@ struct own_contact : protocol__Contact {
 
 TEST_F(requests, go_the_long_way_where_a_host_could_see_the_short_one)
 {
-    const struct {
-        const char *rule;
-        void (*change)(soap &ctx);
-        std::uint32_t mode = 0;
-    } cases[] = {
+    const auto expect_long_way = [this](const std::string &rule, std::uint32_t mode, void (*change)(soap &)) {
+        memory_wire wire(0, mode);
+        soap_set_namespaces(&wire, soap_program_namespaces);
+        wire.encoding_style = nullptr;
+        soap_reset_call(&wire);
+        change(wire);
+        request_message asked{"protocol:root", &binding::traits<protocol__Contact>::ops, contact_with(9)};
+        EXPECT_EQ(0, request_count(&wire, asked)) << rule;
+        EXPECT_EQ(nullptr, wire.store) << rule;
+    };
+    for (const std::uint32_t mode :
+         {MODE_CHUNKED, MODE_STORE, MODE_DEFLATE, SOAP_XML_GRAPH, MODE_MIME, MODE_DIME, MODE_BARE_XML})
+        expect_long_way("mode " + std::to_string(mode), mode, [](soap &) {});
+    const std::pair<const char *, void (*)(soap &)> cases[] = {
         {"a filter",
          [](soap &c) { c.on_send_filter = [](soap *, const char **, std::size_t *) { return 0; }; }},
         {"a hook at the start", [](soap &c) { c.on_send_prepare_begin = [](soap *) { return 0; }; }},
@@ -304,24 +287,9 @@ TEST_F(requests, go_the_long_way_where_a_host_could_see_the_short_one)
          [](soap &c) { c.on_header_line = [](soap *, const char *, const char *) { return 0; }; }},
         {"an attachment",
          [](soap &c) { soap_dime_attach(&c, nullptr, 0, "text/plain", "cid:x", 0, nullptr); }},
-        {"chunks", [](soap &) {}, MODE_CHUNKED},
-        {"stored", [](soap &) {}, MODE_STORE},
-        {"compressed", [](soap &) {}, MODE_DEFLATE},
-        {"a graph", [](soap &) {}, SOAP_XML_GRAPH},
-        {"MIME", [](soap &) {}, MODE_MIME},
-        {"DIME", [](soap &) {}, MODE_DIME},
-        {"no HTTP", [](soap &) {}, MODE_BARE_XML},
     };
-    for (const auto &c : cases) {
-        memory_wire wire(0, c.mode);
-        soap_set_namespaces(&wire, soap_program_namespaces);
-        wire.encoding_style = nullptr;
-        soap_reset_call(&wire);
-        c.change(wire);
-        request_message asked{"protocol:root", &binding::traits<protocol__Contact>::ops, contact_with(9)};
-        EXPECT_EQ(0, request_count(&wire, asked)) << c.rule;
-        EXPECT_EQ(nullptr, wire.store) << c.rule;
-    }
+    for (const auto &[rule, change] : cases)
+        expect_long_way(rule, 0, change);
     own_contact own;
     protocolProfile__ProfileContent profile;
     contact_with(3);

@@ -1,12 +1,7 @@
 // graph_test.cpp - objects that are shared and that form cycles, in all modes that can carry them: what is
-// read back is the same graph.
-//
-// Elsewhere: which object gets an id (identity_test.cpp), classes as trees (classes_test.cpp).
+// read back is the same graph. Elsewhere: which object gets an id (identity_test.cpp), classes as trees
+// (classes_test.cpp).
 #include <regex>
-
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_identity.h>
-#include <zuv_client_pro/soap_xml.h>
 
 #include "support/every_class.h"
 

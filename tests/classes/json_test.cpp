@@ -1,7 +1,5 @@
-// json_test.cpp - every class as JSON and back: the same object.
-//
-// Elsewhere: which documents are refused, and in which words (tests/cli/documents_test.py).
-#include <zuv_client_pro/soap_xml.h>
+// json_test.cpp - every class as JSON and back: the same object. Elsewhere: which documents are refused, and
+// in which words (tests/cli/documents_test.py).
 
 #include "json.h" // of the command line
 #include "support/every_class.h"

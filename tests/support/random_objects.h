@@ -5,20 +5,13 @@
 // places, those that are just being filled included, so that there are cycles.
 #pragma once
 
-#include <cstring>
 #include <map>
-#include <random>
-#include <string>
-#include <type_traits>
-#include <vector>
 
-#include <zuv_client_pro/soap_binary.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_registry.h>
 #include <zuv_client_pro/type_ids.h>
 
 #include "binding/registry.h"
 #include "binding/traits_binary.h"
+#include "support/library.h"
 
 namespace random_objects {
 
@@ -113,8 +106,6 @@ private:
 
 template <class T> void fill(source &random, T &object, int depth);
 template <class T> bool equal(const T &one, const T &other);
-
-// --- values ---
 
 template <class V> void fill_new(source &random, V &value, int type_id, int depth);
 
@@ -213,16 +204,9 @@ template <class V> bool equal_value(const V &one, const V &other)
 
 template <class V> bool equal_value(const std::vector<V> &one, const std::vector<V> &other)
 {
-    if (one.size() != other.size())
-        return false;
-    for (std::size_t i = 0; i < one.size(); ++i) {
-        if (!equal_value(one[i], other[i]))
-            return false;
-    }
-    return true;
+    const auto alike = [](const V &each, const V &its_like) { return equal_value(each, its_like); };
+    return std::equal(one.begin(), one.end(), other.begin(), other.end(), alike);
 }
-
-// --- members ---
 
 template <class V>
 void fill_member(source &random, V &member, binding::occurs how, int type_id, std::size_t, int depth)
@@ -278,11 +262,8 @@ template <class T> bool equal(const T &one, const T &other)
             return false;
     }
     return std::apply(
-               [&](const auto &...row) { return (... && equal_value(one.*row.member, other.*row.member)); },
-               traits::attributes) &&
-           std::apply(
-               [&](const auto &...row) { return (... && equal_value(one.*row.member, other.*row.member)); },
-               traits::elements);
+        [&](const auto &...row) { return (... && equal_value(one.*row.member, other.*row.member)); },
+        std::tuple_cat(traits::attributes, traits::elements));
 }
 
 template <class T>
