@@ -4,7 +4,7 @@ file(GLOB ZUV_TEST_SUPPORT CONFIGURE_DEPENDS ${PROJECT_SOURCE_DIR}/tests/support
 add_library(zuv_test_support OBJECT ${ZUV_TEST_SUPPORT})
 target_include_directories(zuv_test_support PUBLIC ${PROJECT_SOURCE_DIR}/tests ${PROJECT_SOURCE_DIR}/src
     ${PROJECT_SOURCE_DIR}/include)
-target_link_libraries(zuv_test_support PUBLIC zuv_flags GTest::gtest Threads::Threads)
+target_link_libraries(zuv_test_support PUBLIC zuv_flags GTest::gmock Threads::Threads)
 
 # For script/torture: what a test is linked with, and a service that it starts loads.
 if(ZUV_SHARED_OBJECTS)

@@ -4,15 +4,7 @@
 // bytes: MODE is a number of reader's mode bits, TAG the element asked for, "*" for any; CLASS "?" leaves the
 // choice to the dispatch by name. A record of <out> is a line "ERROR LENGTH" and the document written. What
 // the documents mean is not known here.
-#include <cstdio>
-#include <fstream>
 #include <iostream>
-
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_identity.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_registry.h>
-#include <zuv_client_pro/soap_xml.h>
 
 #include "binding/registry.h"
 #include "support/memory_wire.h"

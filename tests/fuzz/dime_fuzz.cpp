@@ -1,7 +1,5 @@
 // dime_fuzz.cpp - DIME messages of any bytes. Seeds are annotated samples, which begin with "#"; their
 // mutations are those of the bytes that they describe.
-#include <cstdint>
-#include <cstring>
 
 #include "support/annotated_bytes.h"
 #include "support/attachment_fuzz.h"

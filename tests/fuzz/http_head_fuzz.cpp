@@ -1,11 +1,5 @@
-// http_head_fuzz.cpp - heads of requests and responses, read by the default callbacks.
-//
-// With ZUV_FUZZ_FAULT it has a fault on purpose, for fault_is_found.sh to see that one is found.
-#include <cstdint>
-#include <cstring>
-#include <string>
-
-#include <zuv_client_pro/soap_http.h>
+// http_head_fuzz.cpp - heads of requests and responses, read by the default callbacks. With ZUV_FUZZ_FAULT it
+// has a fault on purpose, for fault_is_found.sh to see that one is found.
 
 #include "support/memory_wire.h"
 

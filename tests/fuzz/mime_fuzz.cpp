@@ -1,5 +1,4 @@
 // mime_fuzz.cpp - MIME messages of any bytes, with an HTTP head or without.
-#include <cstdint>
 
 #include "support/attachment_fuzz.h"
 

@@ -1,11 +1,4 @@
-// primitives_fuzz.cpp - texts of simple values. What a parser takes, its writer gives back with the same
-// value.
-#include <cstdint>
-#include <cstdlib>
-#include <cstring>
-#include <string>
-
-#include <zuv_client_pro/soap_primitive.h>
+// primitives_fuzz.cpp - texts of simple values. What a parser takes, its writer gives back with the same value.
 
 #include "support/memory_wire.h"
 

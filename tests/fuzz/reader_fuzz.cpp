@@ -1,15 +1,5 @@
-// reader_fuzz.cpp - XML into objects of every class that an element's name or type can call up, without HTTP.
-//
-// The first byte chooses mode and cuts, the rest is the document. Two ways must agree: read whole, and read
-// in pieces.
-#include <cstdint>
-#include <cstdlib>
-#include <string>
-
-#include <zuv_client_pro/soap_error.h>
-#include <zuv_client_pro/soap_memory.h>
-#include <zuv_client_pro/soap_registry.h>
-#include <zuv_client_pro/soap_xml.h>
+// reader_fuzz.cpp - XML into objects of every class that an element's name or type can call up, without HTTP. The
+// first byte chooses mode and cuts, the rest is the document. Two ways must agree: read whole, and read in pieces.
 
 #include "contract_namespaces.h"
 #include "support/memory_wire.h"

@@ -1,12 +1,6 @@
-// refill_fuzz.cpp - chunks and compression: bytes through every framing, and any bytes as a framed body.
-//
-// An even first byte sends the rest through a framing and reads it back, which must give the same bytes. An
-// odd one takes the rest for what a peer sent after a head that announces chunks or compression.
-#include <cstdint>
-#include <cstdlib>
-#include <string>
-
-#include <zuv_client_pro/soap_io.h>
+// refill_fuzz.cpp - chunks and compression: bytes through every framing, and any bytes as a framed body. An
+// even first byte sends the rest through a framing and reads it back, which must give the same bytes. An odd
+// one takes the rest for what a peer sent after a head that announces chunks or compression.
 
 #include "support/memory_wire.h"
 

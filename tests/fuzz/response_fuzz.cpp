@@ -1,14 +1,6 @@
-// response_fuzz.cpp - a response from the first byte of its HTTP head to the typed objects.
-//
-// The first byte of the input chooses the mode and how the rest is cut into receives; the rest is what the
-// peer sends. The answer that was read is written again in every framing: the two passes must agree on its
-// length.
-#include <cstdint>
-#include <cstdlib>
-#include <string>
-
-#include <zuv_client_pro/ProfileSoapBindingProxy.h>
-#include <zuv_client_pro/protocolProfile.h>
+// response_fuzz.cpp - a response from the first byte of its HTTP head to the typed objects. The first byte of
+// the input chooses the mode and how the rest is cut into receives; the rest is what the peer sends. The
+// answer that was read is written again in every framing: the two passes must agree on its length.
 
 #include "support/call_wire.h"
 

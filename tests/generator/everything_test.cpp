@@ -1,12 +1,8 @@
 // everything_test.cpp - the classes that the generator makes of everything/, compiled, written and read back.
-//
 // Here: that generated lists and the rules fit together, for each form of member. Elsewhere: the text of the
 // output (generator_test.cpp), the rules on the library's own classes (the tests of the binding).
-#include <gtest/gtest.h>
 
 #include <zuv_client_pro/all.h>
-#include <zuv_client_pro/soap_binary.h>
-#include <zuv_client_pro/soap_error.h>
 
 #include "contract_namespaces.h"
 #include "support/reader_input.h"

@@ -1,12 +1,9 @@
 // call_client.cpp - a host that calls Profile's create and says what came of each call, for the tests of
-// servers, proxies and networks.
-//
-// Usage: call_client ENDPOINT [options]; see declare. A line for each call; the program ends with 1 if an
-// answer isn't the one to its request, or if a descriptor is left open.
+// servers, proxies and networks. Usage: call_client ENDPOINT [options]; see declare. A line for each call;
+// the program ends with 1 if an answer isn't the one to its request, or if a descriptor is left open.
 #include <cstdio>
 #include <filesystem>
 #include <iostream>
-#include <string>
 #include <vector>
 
 #include <CLI/CLI.hpp>

@@ -1,7 +1,6 @@
-// filled_documents.cs - clients that Mono made from the WSDL: documents whose every member is filled go to the service, are got
-// again and compared member by member.
-//
-// Usage: filled_documents.exe ADDRESS. Prints what differs, and exits with 1 then.
+// filled_documents.cs - clients that Mono made from the WSDL: documents whose every member is filled go to
+// the service, are got again and compared member by member. Usage: filled_documents.exe ADDRESS. Prints what
+// differs, and exits with 1 then.
 using System;
 using System.Collections;
 using System.Collections.Generic;

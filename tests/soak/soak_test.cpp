@@ -1,11 +1,6 @@
 // soak_test.cpp - one proxy, very many calls: it stays as small and as fast as it was at the beginning, and
-// so does the reference service.
-//
-// Elsewhere: calls in memory, by their allocations (call_allocation_test.cpp).
-//
+// so does the reference service. Elsewhere: calls in memory, by their allocations (call_allocation_test.cpp).
 // ZUV_SOAK_CALLS in the environment: how many calls each test makes.
-#include <chrono>
-#include <csignal>
 
 #include "support/scripted_client.h"
 #include "support/socket_calls.h"
@@ -112,8 +107,7 @@ private:
 };
 
 // Makes all calls; looks at memory, descriptors and the pace after each stretch. The pace is that of this
-// process's processor time, in which other programs' load hardly shows; of several stretches the fastest
-// counts.
+// process's processor time, in which other programs' load hardly shows; of several stretches the fastest counts.
 template <class Call> void soak(Call call, pid_t service = 0)
 {
     std::vector<watched> processes{{"this process", getpid(), OUR_SLACK}};

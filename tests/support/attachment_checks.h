@@ -35,7 +35,6 @@ inline void expect_survival_of_every_change(const std::string &bytes, std::uint3
     }
 }
 
-// Each allocation of a good message may fail.
 inline void expect_survival_of_every_refused_allocation(const std::string &bytes)
 {
     expect_out_of_memory_at_each_allocation(

@@ -1,7 +1,6 @@
-// attachment_exchange.h - small SOAP messages with binary values next to them, written and read.
-//
-// A message is an Envelope whose Body holds elements "data". For tests and fuzz targets of attachments; the
-// expectations of the tests are in attachment_checks.h.
+// attachment_exchange.h - small SOAP messages with binary values next to them, written and read. A message is
+// an Envelope whose Body holds elements "data". For tests and fuzz targets of attachments; the expectations
+// of the tests are in attachment_checks.h.
 #pragma once
 
 #include "support/memory_wire.h"
@@ -12,7 +11,6 @@ constexpr int VALUE_TYPE = 10;           // type id of the values
 constexpr int LENGTH_DIFFERS = -1000000; // result of send: not the length that was counted before
 constexpr char ENVELOPE_URI[] = "http://schemas.xmlsoap.org/soap/envelope/";
 
-// A message by hand.
 inline std::string envelope(const std::string &body)
 {
     return std::string("<SOAP-ENV:Envelope xmlns:SOAP-ENV=\"") + ENVELOPE_URI + "\"><SOAP-ENV:Body>" + body +

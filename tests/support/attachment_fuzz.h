@@ -21,36 +21,25 @@ inline int outcome(const soap *ctx, int error)
     return error != 0 && (ctx->mode & MODE_DEFLATE) != 0 ? static_cast<int>(SOAP_ZLIB_ERROR) : error;
 }
 
-inline reading read_in_memory(const std::string &bytes, std::size_t piece)
+// In pieces of this size at most; into memory, or through callbacks.
+inline reading read_message(const std::string &bytes, std::size_t piece, bool streams = false)
 {
     reception read(bytes, 0, piece, piece);
+    stream_host host;
+    if (streams)
+        host.serve(*read.wire);
     const soap *const ctx = read.wire.get();
     const int error = read.run();
     reading result = {outcome(ctx, error), {}};
     if (result.error == SOAP_ZLIB_ERROR)
         return result; // what came before the break may differ as well
     for (const soap_attachment *list : {ctx->dime.list, ctx->mime.list})
-        for (const soap_attachment *a = list; a != nullptr; a = a->next)
-            if (a != ctx->mime.root && a->content != nullptr)
-                result.attachments += text_of(a->id) + "=" + std::string(a->content, a->size) + ";";
-    return result;
-}
-
-inline reading read_through_callbacks(const std::string &bytes)
-{
-    reception read(bytes, 0, 1000, 1000);
-    stream_host host;
-    host.serve(*read.wire);
-    const soap *const ctx = read.wire.get();
-    const int error = read.run();
-    reading result = {outcome(ctx, error), {}};
-    for (const soap_attachment *list : {ctx->dime.list, ctx->mime.list})
         for (const soap_attachment *a = list; a != nullptr; a = a->next) {
             if (a == ctx->mime.root || a->content == nullptr)
                 continue;
             const auto *const stream = host.find(a->content);
-            result.attachments += text_of(a->id) + "=" +
-                                  (stream == nullptr ? std::string(a->content, a->size) : stream->data) + ";";
+            result.attachments +=
+                text_of(a->id) + "=" + (stream ? stream->data : std::string(a->content, a->size)) + ";";
         }
     return result;
 }
@@ -79,10 +68,10 @@ inline void demand(bool holds, const char *what)
 // comes back.
 inline void check_any_bytes(const std::string &bytes)
 {
-    const reading whole = read_in_memory(bytes, SOAP_BUFFER_SIZE);
-    demand(whole == read_in_memory(bytes, 1), "byte by byte is different");
-    demand(whole == read_in_memory(bytes, 1 + bytes.size() % 61), "in pieces is different");
-    const reading streamed = read_through_callbacks(bytes);
+    const reading whole = read_message(bytes, SOAP_BUFFER_SIZE);
+    demand(whole == read_message(bytes, 1), "byte by byte is different");
+    demand(whole == read_message(bytes, 1 + bytes.size() % 61), "in pieces is different");
+    const reading streamed = read_message(bytes, 1000, true);
     demand(whole.error == streamed.error, "the callbacks give another outcome");
     demand(whole.error != 0 || whole.attachments == streamed.attachments, "the callbacks got other bytes");
     read_lazily(bytes);

@@ -1,5 +1,4 @@
 // call_wire.h - a proxy whose connection is memory: what calls send is kept, the answers are given in turn.
-//
 // No socket is opened and no trace is written. An answer ends where the peer would wait for the next request;
 // an empty list means that the peer closes.
 #pragma once

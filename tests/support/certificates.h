@@ -1,5 +1,4 @@
-// certificates.h - keys and certificates made by the test itself, and the files that a TLS set-up wants them
-// in.
+// certificates.h - keys and certificates made by the test itself, and the files that a TLS set-up wants them in.
 #pragma once
 
 #include <cstdio>
@@ -98,7 +97,6 @@ public:
         return make(who, subject_key, certificate_.get(), key_.get(), ++serial_);
     }
 
-    // Path of the authority's certificate.
     std::string ca_file() const { return path("ca.pem"); }
     std::string path(const std::string &name) const { return directory_ / name; }
 

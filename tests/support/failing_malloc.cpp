@@ -1,6 +1,5 @@
-// failing_malloc.cpp - the replaced allocation functions and the counters that arm them.
-//
-// Underneath lies the C library's allocator, or the sanitizer's where there is one.
+// failing_malloc.cpp - the replaced allocation functions and the counters that arm them. Underneath lies the
+// C library's allocator, or the sanitizer's where there is one.
 #include "support/failing_malloc.h"
 
 #include <cerrno>
@@ -29,18 +28,7 @@ extern "C" __attribute__((visibility("default"))) const char *__asan_default_opt
 
 namespace {
 
-struct thread_state {
-    std::size_t asked = 0;
-    std::size_t refuse_from = 0; // number of the first allocation to refuse; 0 none
-    std::size_t refuse_to = 0;   // number of the last one
-    std::size_t refused = 0;
-    std::ptrdiff_t held = 0; // blocks handed out and not freed
-    const void *watched = nullptr;
-    char *last_sight = nullptr;
-    std::size_t sight_length = 0;
-};
-
-constinit thread_local thread_state state;
+using failing_malloc::state;
 
 bool refuse_this_one(const void *caller)
 {
@@ -106,41 +94,3 @@ extern "C" __attribute__((visibility("default"))) void free(void *block)
     else
         __libc_free(block);
 }
-
-namespace failing_malloc {
-
-scope::scope(std::size_t nth, refuse how)
-{
-    state.refused = 0;
-    state.refuse_from = state.asked + nth;
-    state.refuse_to = how == refuse::one ? state.refuse_from : static_cast<std::size_t>(-1);
-}
-
-scope::~scope()
-{
-    state.refuse_from = 0;
-}
-
-std::size_t scope::refused() const
-{
-    return state.refused;
-}
-
-std::size_t allocations()
-{
-    return state.asked;
-}
-
-std::ptrdiff_t held()
-{
-    return state.held;
-}
-
-void watch_free(const void *block, char *copy, std::size_t length)
-{
-    state.watched = block;
-    state.last_sight = copy;
-    state.sight_length = length;
-}
-
-} // namespace failing_malloc

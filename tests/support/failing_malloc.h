@@ -14,27 +14,55 @@ namespace failing_malloc {
 
 enum class refuse { one, all_from };
 
-// While it lives, allocation number `nth` (counted from 1) of this thread is refused, or every one from there
-// on.
+struct thread_state {
+    std::size_t asked = 0;
+    std::size_t refuse_from = 0; // number of the first allocation to refuse; 0 none
+    std::size_t refuse_to = 0;   // number of the last one
+    std::size_t refused = 0;
+    std::ptrdiff_t held = 0; // blocks handed out and not freed
+    const void *watched = nullptr;
+    char *last_sight = nullptr;
+    std::size_t sight_length = 0;
+};
+
+inline constinit thread_local thread_state state;
+
+// While it lives, allocation number `nth` (counted from 1) of this thread is refused, or every one from there on.
 class scope {
 public:
-    explicit scope(std::size_t nth, refuse how = refuse::one);
-    ~scope();
+    explicit scope(std::size_t nth, refuse how = refuse::one)
+    {
+        state.refused = 0;
+        state.refuse_from = state.asked + nth;
+        state.refuse_to = how == refuse::one ? state.refuse_from : static_cast<std::size_t>(-1);
+    }
+    ~scope() { state.refuse_from = 0; }
     scope(const scope &) = delete;
     scope &operator=(const scope &) = delete;
 
-    std::size_t refused() const; // allocations refused so far
+    std::size_t refused() const { return state.refused; } // allocations refused so far
 };
 
 // Allocations asked for by this thread since its start.
-std::size_t allocations();
+inline std::size_t allocations()
+{
+    return state.asked;
+}
 
 // Blocks that this thread was handed out, less those that it has freed. It may be negative where others'
 // blocks are freed: only a difference says something.
-std::ptrdiff_t held();
+inline std::ptrdiff_t held()
+{
+    return state.held;
+}
 
 // When this thread frees `block`, its first `length` bytes are copied to `copy` as they are then.
-void watch_free(const void *block, char *copy, std::size_t length);
+inline void watch_free(const void *block, char *copy, std::size_t length)
+{
+    state.watched = block;
+    state.last_sight = copy;
+    state.sight_length = length;
+}
 
 // Runs `call` with allocation 1, 2, 3... refused, each followed by `check`, which may assert, until a run
 // needs no more allocations. `check` takes whether an allocation was refused. Returns the number of runs in

@@ -1,16 +1,13 @@
 // golden.h - requests as a person can read them, and as they go over the wire.
 //
-// request.txt holds what all requests have in common, members.txt what is a request's own. The head's
-// lines end with CR LF on the wire. The body's line breaks and the blanks before each line are for the reader
-// alone; "\n" and "\r" stand for the bytes, "~" at the start of a line for a blank. A line that begins with
-// "#" is a remark.
+// request.txt holds what all requests have in common, members.txt what is a request's own. The head's lines end
+// with CR LF on the wire. The body's line breaks and the blanks before each line are for the reader alone; "\n"
+// and "\r" stand for the bytes, "~" at the start of a line for a blank. A line that begins with "#" is a remark.
 #pragma once
 
-#include <algorithm>
-#include <fstream>
-#include <sstream>
 #include <stdexcept>
-#include <string>
+
+#include "support/library.h"
 
 namespace golden {
 
@@ -29,7 +26,6 @@ inline std::string replaced(std::string text, const std::string &from, const std
     return text;
 }
 
-// The bytes of a line of a body.
 inline std::string body_bytes(const std::string &line)
 {
     const std::string text = line.substr(std::min(line.find_first_not_of(' '), line.size()));

@@ -1,7 +1,5 @@
 // library.h - the library's public headers, what of the standard library most tests work with, and small
-// texts.
-//
-// Elsewhere: the classes of the service (their own headers), GoogleTest (testing.h).
+// texts. Elsewhere: the classes of the service (their own headers), GoogleTest (testing.h).
 #pragma once
 
 #include <algorithm>
@@ -11,6 +9,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <ctime>
 #include <deque>
 #include <filesystem>
 #include <fstream>
@@ -64,6 +63,20 @@ inline std::string in_chunks_of(std::size_t size, const std::string &body)
     for (std::size_t at = 0; at < body.size(); at += size)
         chunks += chunk(body.substr(at, size));
     return chunks + "0\r\n\r\n";
+}
+
+inline std::string file_content(const std::string &path)
+{
+    std::ifstream file(path, std::ios::binary);
+    return {std::istreambuf_iterator<char>(file), {}};
+}
+
+// Seconds that this thread has computed: what a busy machine doesn't change.
+inline double cpu_time()
+{
+    std::timespec now{};
+    clock_gettime(CLOCK_THREAD_CPUTIME_ID, &now);
+    return static_cast<double>(now.tv_sec) + static_cast<double>(now.tv_nsec) / 1e9;
 }
 
 // The parts of a text between its blanks.

@@ -1,5 +1,4 @@
-// loopback.h - what tests of the transport share: peers on the loopback, a context, a count of open
-// descriptors.
+// loopback.h - what tests of the transport share: peers on the loopback, a context, a count of open descriptors.
 #pragma once
 
 #include <arpa/inet.h>
@@ -92,8 +91,7 @@ private:
     std::thread thread_;
 };
 
-// A peer that serves all its clients at the same time, each on a thread. Its end waits for those being
-// served.
+// A peer that serves all its clients at the same time, each on a thread. Its end waits for those being served.
 class crowd {
 public:
     crowd(std::function<void(int)> serve, int clients)
@@ -133,7 +131,6 @@ inline void write_text(int socket, const std::string &text)
     EXPECT_EQ(send(socket, text.data(), text.size(), MSG_NOSIGNAL), static_cast<ssize_t>(text.size()));
 }
 
-// Reads up to the empty line that ends an HTTP head.
 inline std::string read_head(int socket)
 {
     std::string head;

@@ -1,5 +1,4 @@
 // memory_wire.h - a context whose peer is memory: what it sends is kept, what it receives is given in pieces.
-//
 // For tests of framing. Nothing is written to a trace file, no socket is opened.
 #pragma once
 

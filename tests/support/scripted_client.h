@@ -2,12 +2,9 @@
 // many connections.
 #pragma once
 
-#include <atomic>
-#include <chrono>
-#include <string>
+#include <sys/wait.h>
 
 #include "support/create_call.h"
-#include "support/library.h"
 #include "support/scripted_server.h"
 
 namespace scripted {
@@ -76,5 +73,12 @@ private:
     int (*open_)(soap *, const char *, const char *, int) = nullptr;
     inline static std::atomic<int> names_ = 1000000; // no two clients say the same, and none says more
 };
+
+inline void expect_exit(pid_t child, int status)
+{
+    int ended = 0;
+    EXPECT_EQ(waitpid(child, &ended, 0), child);
+    EXPECT_EQ(ended, status << 8);
+}
 
 } // namespace scripted

@@ -1,10 +1,8 @@
-// scripted_server.h - a server that answers calls of Profile's create as a test has it, over TCP or TLS.
-//
-// An answer shows whose it is: the name in the request comes back in it.
+// scripted_server.h - a server that answers calls of Profile's create as a test has it, over TCP or TLS. An
+// answer shows whose it is: the name in the request comes back in it.
 #pragma once
 
 #include <atomic>
-#include <netinet/tcp.h>
 
 #include "support/tls_peer.h"
 
@@ -41,17 +39,11 @@ public:
             count = read(all.data() + have, static_cast<int>(length - have));
         return all.substr(0, have);
     }
-    void send(const std::string &bytes)
+    bool send(const std::string &bytes) // false: the client has ended
     {
-        if (tls_ && !bytes.empty())
-            SSL_write(tls_, bytes.data(), static_cast<int>(bytes.size()));
-        else
-            ::send(socket_, bytes.data(), bytes.size(), MSG_NOSIGNAL);
-    }
-    bool send_while_it_lasts(const std::string &bytes)
-    {
-        return (tls_ ? SSL_write(tls_, bytes.data(), static_cast<int>(bytes.size()))
-                     : static_cast<int>(::send(socket_, bytes.data(), bytes.size(), MSG_NOSIGNAL))) > 0;
+        return (tls_ && !bytes.empty()
+                    ? SSL_write(tls_, bytes.data(), static_cast<int>(bytes.size()))
+                    : static_cast<int>(::send(socket_, bytes.data(), bytes.size(), MSG_NOSIGNAL))) > 0;
     }
     void await_end()
     {
@@ -124,7 +116,7 @@ inline void serve_well(line &client)
 template <class Acceptor> class basic_server {
 public:
     explicit basic_server(std::function<void(line &)> first, bool tls = false)
-        : context_(tls ? tls_peers::server_for({"peer.test", ""}) : nullptr),
+        : context_(tls ? tls_peers::server_for(tls_peers::BY_NAME) : nullptr),
           peer_([this, first = std::move(first)](int client) { serve(client, first); }, 1000000)
     {}
     int port() const { return peer_.port(); }
@@ -137,17 +129,13 @@ public:
 private:
     void serve(int client, const std::function<void(line &)> &first)
     {
-        const auto &script = connections_++ == 0 ? first : WELL;
-        const tls_peers::server_connection tls(context_ ? SSL_new(context_.get()) : nullptr);
-        if (tls) {
-            SSL_set_fd(tls.get(), client);
-            if (SSL_accept(tls.get()) != 1)
-                return;
-        }
-        line end(client, tls.get());
-        script(end);
-        if (tls && SSL_get_shutdown(tls.get()) != 0)
-            SSL_shutdown(tls.get());
+        const auto serve = [&, script = connections_++ == 0 ? first : WELL](SSL *tls) {
+            line end(client, tls);
+            script(end);
+            if (tls && SSL_get_shutdown(tls) != 0)
+                SSL_shutdown(tls);
+        };
+        context_ ? tls_peers::serve_over_tls(context_.get(), client, serve) : serve(nullptr);
     }
     inline static const std::function<void(line &)> WELL = serve_well;
     std::atomic<int> connections_ = 0;

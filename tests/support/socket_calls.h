@@ -1,14 +1,10 @@
-// socket_calls.h - counts and bends the socket calls that a test executable makes.
+// socket_calls.h - counts and bends the socket calls that a test executable makes. Include it in one source
+// of the executable: it defines send, recv and the like, which pass on to the system's. The counts and orders
+// are those of the calling thread, so a peer's thread in the same test is left alone.
 //
-// Include it in one source of the executable: it defines send, recv and the like, which pass on to the
-// system's. The counts and orders are those of the calling thread, so a peer's thread in the same test is
-// left alone.
-//
-// Names that end in ".test" resolve to the loopback: "two.test" to 127.0.0.9 and then 127.0.0.1, "six.test"
-// to ::1 and then 127.0.0.1, as "localhost" does on most machines, all else to 127.0.0.1.
-//
-// The monotonic clock may be faster than the system's, so that a test of time limits takes no time; the wall
-// clock may be set back.
+// Names that end in ".test" resolve to the loopback: "two.test" to 127.0.0.9 and then 127.0.0.1, "six.test" to ::1
+// and then 127.0.0.1, as "localhost" does on most machines, all else to 127.0.0.1. The monotonic clock may be
+// faster than the system's, so that a test of time limits takes no time; the wall clock may be set back.
 #pragma once
 
 #include <atomic>

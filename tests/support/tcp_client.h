@@ -1,7 +1,6 @@
 // tcp_client.h - what the tests of sockets say often: connect, receive, look at an option or a failure.
 #pragma once
 
-#include "support/library.h"
 #include "support/loopback.h"
 #include "support/socket_calls.h"
 

@@ -1,10 +1,13 @@
 // testing.h - what every unit test uses: GoogleTest, the library, allocations that fail.
 #pragma once
 
+#include <gmock/gmock-matchers.h>
 #include <gtest/gtest.h>
 
 #include "support/failing_malloc.h"
 #include "support/library.h"
+
+using testing::HasSubstr, testing::Not;
 
 // Runs `call` on what `make` makes, with each allocation refused in turn: it gives SOAP_OUT_OF_MEMORY then,
 // and 0 without a refusal. `call` takes a reference; at least so many allocations are expected.

@@ -17,6 +17,7 @@ using certificates::subject;
 using loopback::context;
 using loopback::peer;
 
+const subject BY_NAME{"peer.test", ""};
 constexpr std::uint16_t VERIFIED = TLS_VERIFY_PEER | TLS_NO_DEFAULT_CA;
 
 inline authority &ca()
@@ -48,27 +49,31 @@ inline server_context make_server_context(X509 *certificate, int version = 0)
     return made;
 }
 
+inline void serve_over_tls(SSL_CTX *context, int client, const std::function<void(SSL *)> &serve)
+{
+    const server_connection connection(SSL_new(context));
+    SSL_set_fd(connection.get(), client);
+    if (SSL_accept(connection.get()) == 1)
+        serve(connection.get());
+}
+
 // A TLS server. Each client that comes through the handshake is served; the others are dropped.
 class tls_peer {
 public:
     using service = std::function<void(SSL *)>;
 
     tls_peer(server_context made, service serve, int clients = 1)
-        : context_(std::move(made)),
-          peer_([this, serve = std::move(serve)](int client) { shake_hands(client, serve); }, clients)
+        : context_(std::move(made)), peer_(
+                                         [this, serve = std::move(serve)](int client) {
+                                             const int on = 1;
+                                             setsockopt(client, IPPROTO_TCP, TCP_NODELAY, &on, sizeof on);
+                                             serve_over_tls(context_.get(), client, serve);
+                                         },
+                                         clients)
     {}
     int port() const { return peer_.port(); }
 
 private:
-    void shake_hands(int client, const service &serve)
-    {
-        const server_connection connection(SSL_new(context_.get()));
-        SSL_set_fd(connection.get(), client);
-        const int on = 1;
-        setsockopt(client, IPPROTO_TCP, TCP_NODELAY, &on, sizeof on);
-        if (SSL_accept(connection.get()) == 1)
-            serve(connection.get());
-    }
     server_context context_;
     peer peer_;
 };

@@ -1,5 +1,4 @@
-// torture.cpp - see torture.h. Here: whose an allocation is, the numbering, the list of live blocks, the
-// report.
+// torture.cpp - see torture.h. Here: whose an allocation is, the numbering, the list of live blocks, the report.
 #ifdef ZUV_SHARED_OBJECTS
 #include "support/torture.h"
 
@@ -76,7 +75,6 @@ const char *site(std::uintptr_t address, char (&text)[256])
     return text;
 }
 
-// ---------------------------------------------------------------------------------------------
 // Whose an allocation is.
 
 struct walk {
@@ -121,8 +119,7 @@ walk unwind(_Unwind_Trace_Fn step)
     return way;
 }
 
-// The address that an allocation is charged to; 0: neither the library's nor, where that counts, the
-// program's.
+// The address that an allocation is charged to; 0: neither the library's nor, where that counts, the program's.
 std::uintptr_t owner_of(const void *caller)
 {
     const auto address = reinterpret_cast<std::uintptr_t>(caller);
@@ -147,7 +144,6 @@ void note_path(std::uint64_t number)
     report("path %llu %llx\n", static_cast<unsigned long long>(number), static_cast<unsigned long long>(key));
 }
 
-// ---------------------------------------------------------------------------------------------
 // Start and end.
 
 int find_ranges(dl_phdr_info *object, std::size_t, void *)
@@ -277,44 +273,17 @@ void taken_back(void *block)
 
 } // namespace torture
 
-// ---------------------------------------------------------------------------------------------
 // What the library asks of C++ comes by malloc's name too, but then from the runtime.
 
-#define CALLER __builtin_return_address(0)
-
-namespace {
-
-void *new_block(std::size_t size, const void *caller)
+void *operator new(std::size_t size) // the other forms end here, too
 {
+    const void *const caller = __builtin_return_address(0);
     void *const block = torture::refuses(caller) ? nullptr : std::malloc(size ? size : 1);
+    if (!block)
+        throw std::bad_alloc();
     return torture::given(block, caller);
 }
-
-} // namespace
-
-void *operator new(std::size_t size)
-{
-    void *const block = new_block(size, CALLER);
-    if (!block)
-        throw std::bad_alloc();
-    return block;
-}
-void *operator new[](std::size_t size)
-{
-    void *const block = new_block(size, CALLER);
-    if (!block)
-        throw std::bad_alloc();
-    return block;
-}
-void *operator new(std::size_t size, const std::nothrow_t &) noexcept
-{
-    return new_block(size, CALLER);
-}
-void *operator new[](std::size_t size, const std::nothrow_t &) noexcept
-{
-    return new_block(size, CALLER);
-}
-void operator delete(void *block) noexcept // those of arrays end here, too
+void operator delete(void *block) noexcept
 {
     std::free(block);
 }

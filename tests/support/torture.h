@@ -1,5 +1,4 @@
-// torture.h - refuses one allocation of the library in a whole process, chosen from outside by
-// script/torture.
+// torture.h - refuses one allocation of the library in a whole process, chosen from outside by script/torture.
 //
 // Only in a build with ZUV_SHARED_OBJECTS, where the library is a shared object and its calls can be distinguished
 // from those of a test or of GoogleTest: an allocation belongs to the library if the innermost function that

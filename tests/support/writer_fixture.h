@@ -1,5 +1,4 @@
 // writer_fixture.h - a context that writes to a string, and one helper that writes the same thing every way.
-//
 // Elsewhere: what is written. Always: a check runs the calls in a counting pass, buffered, unbuffered and
 // through a filter, and demands the same bytes of all; and with sends that are refused, wherever that begins.
 #pragma once

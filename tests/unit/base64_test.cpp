@@ -58,15 +58,9 @@ protected:
     }
 };
 
-struct text_case {
-    const char *rule;
-    const char *text;
-    const char *bytes; // "refused", or the bytes in brackets
-};
-
 TEST_F(base64, whole_texts_are_decoded_up_to_padding)
 {
-    const text_case cases[] = {
+    const std::tuple<const char *, const char *, const char *> cases[] = {
         {"one byte left over", "Zg==", "[f]"},
         {"padding may lack", "Zm9vYg", "[foob]"},
         {"a lone digit carries nothing", "Zm9vY", "[foo]"},
@@ -75,8 +69,8 @@ TEST_F(base64, whole_texts_are_decoded_up_to_padding)
         {"the other alphabet", "Zm9-", "refused"},
         {"a high byte", "Zm9v\xc3", "refused"},
     };
-    for (const text_case &row : cases)
-        EXPECT_EQ(decoded(row.text), row.bytes) << row.rule;
+    for (const auto &[rule, text, bytes] : cases)
+        EXPECT_EQ(decoded(text), bytes) << rule;
     EXPECT_EQ(decoded(nullptr), "[]");
     int length = -1;
     ctx.error = SOAP_FAULT;
@@ -109,32 +103,29 @@ TEST_F(base64, bytes_are_encoded_into_a_target_or_none)
 
 TEST_F(base64, content_of_a_message_reads_the_same_at_every_cut)
 {
-    const struct {
-        text_case text;
-        unsigned char *(*read)(soap *, int *);
-    } cases[] = {
-        {{"broken into lines", "Zm9v\r\n YmFy\n", "[foobar]"}, soap_base64_inline_read},
-        {{"line breaks as references", "Zm9v&#xD;&#10;YmFy", "[foobar]"}, soap_base64_inline_read},
-        {{"a digit as a reference", "Zm9vYmF&#121;", "[foobar]"}, soap_base64_inline_read},
-        {{"in a section", "<![CDATA[Zm9v]]>YmFy", "[foobar]"}, soap_base64_inline_read},
-        {{"around a comment", "Zm9v<!-- x -->YmFy", "[foobar]"}, soap_base64_inline_read},
-        {{"the rest after padding is dropped", "Zm8=Zm9v!", "[fo]"}, soap_base64_inline_read},
-        {{"up to a child", "Zm9v<child>Zm9v</child>", "[foo]"}, soap_base64_inline_read},
-        {{"up to a mark", "Zm9v>Zm9v", "[foo]"}, soap_base64_inline_read},
-        {{"empty", "", "[]"}, soap_base64_inline_read},
-        {{"not in the alphabet", "Zm9v-", "refused"}, soap_base64_inline_read},
-        {{"both cases", "666f6F", "[foo]"}, soap_hex_inline_read},
-        {{"blanks before", " \n66", "[f]"}, soap_hex_inline_read},
-        {{"up to a blank", "66 6f", "[f]"}, soap_hex_inline_read},
-        {{"a lone digit", "666", "refused"}, soap_hex_inline_read},
-        {{"a lone digit and more", "6g", "refused"}, soap_hex_inline_read},
-        {{"no digit", "xyz", "[]"}, soap_hex_inline_read},
-        {{"no hexadecimal digits", "", "[]"}, soap_hex_inline_read},
+    using reader = unsigned char *(*)(soap *, int *);
+    const std::tuple<const char *, const char *, const char *, reader> cases[] = {
+        {"broken into lines", "Zm9v\r\n YmFy\n", "[foobar]", soap_base64_inline_read},
+        {"line breaks as references", "Zm9v&#xD;&#10;YmFy", "[foobar]", soap_base64_inline_read},
+        {"a digit as a reference", "Zm9vYmF&#121;", "[foobar]", soap_base64_inline_read},
+        {"in a section", "<![CDATA[Zm9v]]>YmFy", "[foobar]", soap_base64_inline_read},
+        {"around a comment", "Zm9v<!-- x -->YmFy", "[foobar]", soap_base64_inline_read},
+        {"the rest after padding is dropped", "Zm8=Zm9v!", "[fo]", soap_base64_inline_read},
+        {"up to a child", "Zm9v<child>Zm9v</child>", "[foo]", soap_base64_inline_read},
+        {"up to a mark", "Zm9v>Zm9v", "[foo]", soap_base64_inline_read},
+        {"empty", "", "[]", soap_base64_inline_read},
+        {"not in the alphabet", "Zm9v-", "refused", soap_base64_inline_read},
+        {"both cases", "666f6F", "[foo]", soap_hex_inline_read},
+        {"blanks before", " \n66", "[f]", soap_hex_inline_read},
+        {"up to a blank", "66 6f", "[f]", soap_hex_inline_read},
+        {"a lone digit", "666", "refused", soap_hex_inline_read},
+        {"a lone digit and more", "6g", "refused", soap_hex_inline_read},
+        {"no digit", "xyz", "[]", soap_hex_inline_read},
+        {"no hexadecimal digits", "", "[]", soap_hex_inline_read},
     };
-    for (const auto &row : cases)
+    for (const auto &[rule, text, bytes, read] : cases)
         for (std::size_t piece = 1; piece < 30; piece++)
-            EXPECT_EQ(read_inline(row.read, row.text.text, piece), row.text.bytes)
-                << row.text.rule << ", " << piece;
+            EXPECT_EQ(read_inline(read, text, piece), bytes) << rule << ", " << piece;
     ctx.has_body = 0;
     int length = -1;
     EXPECT_NE(soap_base64_inline_read(&ctx, &length), nullptr);

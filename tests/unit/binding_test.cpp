@@ -1,5 +1,4 @@
 // binding_test.cpp - the rules of data classes, on documents read from memory and objects written to it.
-//
 // Elsewhere: order and number of members, words and values that are refused, in every class (tests/foreign).
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
 #include <zuv_client_pro/protocol.h>
@@ -40,7 +39,6 @@ template <class T> T *read_on(memory_wire &ctx, const std::string &xml, std::uin
     return soap_receive_finish(&ctx) ? nullptr : object;
 }
 
-// A context that reads such documents, and writes bare XML.
 class binding : public testing::Test {
 protected:
     binding() : ctx(0, MODE_BARE_XML | MODE_BUFFERED)

@@ -44,13 +44,11 @@ outcome read_message(memory_wire &wire)
 
 using piece_sizes = std::function<std::size_t(std::size_t)>;
 
-// Two pieces.
 piece_sizes split_at(std::size_t split)
 {
     return [split](std::size_t given) { return given < split ? split - given : SOAP_BUFFER_SIZE; };
 }
 
-// Pieces of one byte.
 std::size_t bytewise(std::size_t)
 {
     return 1;
@@ -98,13 +96,7 @@ int hook(soap *, const char *data, std::size_t length)
 
 TEST(buffered_in, the_first_bytes_decide_what_is_read)
 {
-    struct {
-        const char *rule;
-        std::string bytes;
-        int result;
-        std::uint32_t mode;
-        std::int32_t first; // byte that the reader gets
-    } rows[] = {
+    const std::tuple<const char *, std::string, int, std::uint32_t, std::int32_t> rows[] = {
         {"plain XML", "<a/>", 0, MODE_LATIN1, '<'},
         {"blanks first", " \r\n\t<a/>", 0, MODE_LATIN1, '<'},
         {"nothing", "", SOAP_EOF, MODE_LATIN1, -1},
@@ -121,18 +113,18 @@ TEST(buffered_in, the_first_bytes_decide_what_is_read)
          MODE_LATIN1 | MODE_DEFLATE, -1},
         {"HTTP", with_length("x", 1), 0, MODE_LATIN1, 'x'},
     };
-    for (const auto &row : rows) {
+    for (const auto &[rule, bytes, result, mode, first] : rows) {
         for (const piece_sizes &pieces : {piece_sizes(), piece_sizes(bytewise)}) {
             memory_wire wire(MODE_LATIN1);
-            wire.receive(row.bytes);
+            wire.receive(bytes);
             wire.piece = pieces;
-            EXPECT_EQ(soap_receive_begin(&wire), row.result) << row.rule;
-            EXPECT_EQ(wire.error, row.result) << row.rule;
-            EXPECT_EQ(wire.mode & (MODE_LATIN1 | MODE_DEFLATE | MODE_MIME | MODE_DIME), row.mode) << row.rule;
-            if (row.result == 0) {
-                EXPECT_EQ(soap_recv_byte(&wire), row.first) << row.rule;
+            EXPECT_EQ(soap_receive_begin(&wire), result) << rule;
+            EXPECT_EQ(wire.error, result) << rule;
+            EXPECT_EQ(wire.mode & (MODE_LATIN1 | MODE_DEFLATE | MODE_MIME | MODE_DIME), mode) << rule;
+            if (result == 0) {
+                EXPECT_EQ(soap_recv_byte(&wire), first) << rule;
             } else {
-                EXPECT_EQ(wire.keep_alive, 0) << row.rule;
+                EXPECT_EQ(wire.keep_alive, 0) << rule;
             }
         }
     }
@@ -178,10 +170,7 @@ TEST(buffered_in, bodies_read_the_same_at_every_split)
         "\x78\x27" + std::string(1, '\0') + "\xD8\xFF" + text + "\x03" + std::string(1, '\0');
     std::string with_flags = gzip;
     with_flags[3] = 8; // a file name announced and not there: the flags are not looked at
-    const struct {
-        const char *rule, *head;
-        std::string body;
-    } compressed[] = {
+    const std::tuple<const char *, const char *, std::string> compressed[] = {
         {"gzip", "gzip\r\n\r\n", gzip},
         {"deflate", "deflate\r\n\r\n", deflate},
         {"deflate sent as gzip", "gzip\r\n\r\n", deflate},
@@ -197,11 +186,11 @@ TEST(buffered_in, bodies_read_the_same_at_every_split)
          in_chunks_of(1, raw)},
         {"stored", "deflate\r\n\r\n", stored},
     };
-    for (const auto &row : compressed) {
-        std::string head = OK_HEAD + "Content-Encoding: " + row.head;
+    for (const auto &[rule, encoding, body] : compressed) {
+        std::string head = OK_HEAD + "Content-Encoding: " + encoding;
         if (head.find("chunked") == head.npos)
-            head.insert(OK_HEAD.size(), "Content-Length: " + std::to_string(row.body.size()) + "\r\n");
-        check_every_reading(row.rule, head + row.body, {0, text, 0, true});
+            head.insert(OK_HEAD.size(), "Content-Length: " + std::to_string(body.size()) + "\r\n");
+        check_every_reading(rule, head + body, {0, text, 0, true});
     }
     check_every_reading("gzip alone", gzip, {0, text, 0, false});
 }

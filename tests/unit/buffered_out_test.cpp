@@ -78,59 +78,51 @@ std::string inflated(const std::string &bytes, int window_bits)
     return out;
 }
 
-struct mode_row {
-    const char *rule;
-    std::uint32_t output_mode;
-    bool prepare_hook;
-    bool socket_open;
-    std::uint64_t counted;
-    std::uint32_t counting; // ctx->mode after soap_count_begin
-    std::uint32_t sending;  // ctx->mode after soap_send_begin
-};
-
 constexpr std::uint32_t B = MODE_BUFFERED, S = MODE_STORE, C = MODE_CHUNKED, N = MODE_COUNTING,
                         X = MODE_BARE_XML, Z = MODE_DEFLATE, U = MODE_UDP, D = MODE_DIME, M = MODE_MIME,
                         T = MODE_MTOM;
-const mode_row MODES[] = {
-    {"direct, no socket", 0, false, false, 9, N, 0},
-    {"direct to a socket, counted", 0, false, true, 9, N, B},
-    {"bare direct to a socket", X, false, true, 0, X, X | B},
-    {"buffered", B, false, true, 9, B | N, B},
-    {"buffered bare", B | X, false, true, 0, B | X, B | X},
-    {"buffered bare, hook", B | X, true, true, 9, B | X | N, B | X},
-    {"store", S, false, true, 0, S, S},
-    {"store, hook", S, true, true, 0, S, S},
-    {"chunked", C, false, true, 0, C, C},
-    {"chunked, hook", C, true, true, 9, C | N, C},
-    {"direct deflate", Z, false, true, 0, Z | S, Z | S},
-    {"direct deflate bare", Z | X, false, true, 0, Z | X | B, Z | X | B},
-    {"buffered deflate", Z | B, false, true, 0, Z | S, Z | S},
-    {"buffered deflate bare", Z | B | X, false, true, 0, Z | X | B, Z | X | B},
-    {"chunked deflate", Z | C, false, true, 0, Z | C, Z | C},
-    {"stored deflate", Z | S, false, true, 0, Z | S, Z | S},
-    {"datagram", U, false, true, 0, U | X, U | X | B},
-    {"datagram, hook", U | B, true, true, 9, U | X | B | N, U | X | B},
-    {"DIME", B | D, false, true, 9, B | D | N, B | D},
-    {"DIME stored", S | D, false, true, 9, S | D | N, S | D},
-    {"DIME deflate", Z | D, false, true, 9, Z | S | D | N, Z | S | D},
-    {"MTOM alone means nothing", B | T, false, true, 9, B | N, B},
-    {"MTOM in MIME", B | T | M, false, true, 9, B | T | M | N, B | T | M},
-    {"DIME and MTOM is MIME", B | D | T, false, true, 9, B | D | T | M | N, B | T | M},
+const std::tuple<const char *, std::uint32_t, bool, bool, std::uint64_t, std::uint32_t, std::uint32_t>
+    MODES[] = {
+        {"direct, no socket", 0, false, false, 9, N, 0},
+        {"direct to a socket, counted", 0, false, true, 9, N, B},
+        {"bare direct to a socket", X, false, true, 0, X, X | B},
+        {"buffered", B, false, true, 9, B | N, B},
+        {"buffered bare", B | X, false, true, 0, B | X, B | X},
+        {"buffered bare, hook", B | X, true, true, 9, B | X | N, B | X},
+        {"store", S, false, true, 0, S, S},
+        {"store, hook", S, true, true, 0, S, S},
+        {"chunked", C, false, true, 0, C, C},
+        {"chunked, hook", C, true, true, 9, C | N, C},
+        {"direct deflate", Z, false, true, 0, Z | S, Z | S},
+        {"direct deflate bare", Z | X, false, true, 0, Z | X | B, Z | X | B},
+        {"buffered deflate", Z | B, false, true, 0, Z | S, Z | S},
+        {"buffered deflate bare", Z | B | X, false, true, 0, Z | X | B, Z | X | B},
+        {"chunked deflate", Z | C, false, true, 0, Z | C, Z | C},
+        {"stored deflate", Z | S, false, true, 0, Z | S, Z | S},
+        {"datagram", U, false, true, 0, U | X, U | X | B},
+        {"datagram, hook", U | B, true, true, 9, U | X | B | N, U | X | B},
+        {"DIME", B | D, false, true, 9, B | D | N, B | D},
+        {"DIME stored", S | D, false, true, 9, S | D | N, S | D},
+        {"DIME deflate", Z | D, false, true, 9, Z | S | D | N, Z | S | D},
+        {"MTOM alone means nothing", B | T, false, true, 9, B | N, B},
+        {"MTOM in MIME", B | T | M, false, true, 9, B | T | M | N, B | T | M},
+        {"DIME and MTOM is MIME", B | D | T, false, true, 9, B | D | T | M | N, B | T | M},
 };
 
 } // namespace
 
 TEST(buffered_out, modes_are_settled_by_the_table)
 {
-    for (const mode_row &row : MODES) {
-        memory_wire wire(0, row.output_mode);
-        wire.on_send_prepare = row.prepare_hook ? see : nullptr;
-        ASSERT_EQ(soap_count_begin(&wire), 0) << row.rule;
-        EXPECT_EQ(wire.mode & HOST_BITS, row.counting) << row.rule;
-        wire.message_count = row.counted;
-        wire.socket = row.socket_open ? 77 : -1;
-        ASSERT_EQ(soap_send_begin(&wire), 0) << row.rule;
-        EXPECT_EQ(wire.mode & HOST_BITS, row.sending) << row.rule;
+    // The last two are what soap_count_begin and soap_send_begin leave in ctx->mode.
+    for (const auto &[rule, output_mode, prepare_hook, socket_open, counted, counting, sending] : MODES) {
+        memory_wire wire(0, output_mode);
+        wire.on_send_prepare = prepare_hook ? see : nullptr;
+        ASSERT_EQ(soap_count_begin(&wire), 0) << rule;
+        EXPECT_EQ(wire.mode & HOST_BITS, counting) << rule;
+        wire.message_count = counted;
+        wire.socket = socket_open ? 77 : -1;
+        ASSERT_EQ(soap_send_begin(&wire), 0) << rule;
+        EXPECT_EQ(wire.mode & HOST_BITS, sending) << rule;
         EXPECT_EQ(wire.message_part, PART_BEGIN);
         wire.socket = -1;
     }
@@ -144,11 +136,7 @@ TEST(buffered_out, modes_are_settled_by_the_table)
 
 TEST(buffered_out, each_mode_has_its_form_on_the_wire)
 {
-    struct {
-        std::uint32_t mode;
-        int status;
-        const char *wire;
-    } rows[] = {
+    const std::tuple<std::uint32_t, int, const char *> rows[] = {
         {MODE_DIRECT, 0, "hello world"},
         {MODE_BUFFERED, 0, "hello world"},
         {MODE_CHUNKED, 0, "B\r\nhello world\r\n0\r\n\r\n"},
@@ -157,17 +145,17 @@ TEST(buffered_out, each_mode_has_its_form_on_the_wire)
         {MODE_STORE, STATUS_STOP, "hello world"},
         {MODE_STORE | MODE_BARE_XML, 0, "hello world"},
     };
-    for (const auto &row : rows) {
-        memory_wire wire(0, row.mode | MODE_WSU_ID);
+    for (const auto &[mode, status, expected] : rows) {
+        memory_wire wire(0, mode | MODE_WSU_ID);
         wire.on_response = test_response;
         wire.on_post = test_post;
-        wire.status = row.status;
+        wire.status = status;
         ASSERT_EQ(send_message(wire, "hello world"), 0);
-        EXPECT_EQ(wire.sent(), row.wire) << std::hex << row.mode << ' ' << std::dec << row.status;
-        EXPECT_EQ(wire.output_mode, row.mode);
+        EXPECT_EQ(wire.sent(), expected) << std::hex << mode << ' ' << std::dec << status;
+        EXPECT_EQ(wire.output_mode, mode);
         EXPECT_EQ(wire.message_count, 0U);
         EXPECT_EQ(wire.block_stack, nullptr);
-        EXPECT_EQ(wire.response_unfinished, row.status >= STATUS_POST);
+        EXPECT_EQ(wire.response_unfinished, status >= STATUS_POST);
     }
 }
 
@@ -193,7 +181,6 @@ TEST(buffered_out, the_buffer_leaves_when_it_is_exactly_full_and_chunks_close_ea
     EXPECT_EQ(none.sent(), "0\r\n\r\n");
 }
 
-// Streams with a dictionary come back in framing_test.cpp.
 TEST(buffered_out, compressed_streams_are_what_zlib_reads)
 {
     for (const std::size_t size : {0U, 1U, 700000U})
@@ -268,11 +255,7 @@ TEST(buffered_out, the_error_of_a_hook_is_that_of_the_message)
 {
     static const auto see_none = [](soap *, const char *, std::size_t) { return 77; };
     static const auto pass_none = [](soap *, const char **, std::size_t *) { return 77; };
-    static const struct {
-        const char *rule;
-        std::uint32_t mode;
-        void (*set)(soap &);
-    } rows[] = {
+    static const std::tuple<const char *, std::uint32_t, void (*)(soap &)> rows[] = {
         {"send", MODE_BUFFERED, [](soap &ctx) { ctx.on_send = see_none; }},
         {"send of a stored message", MODE_STORE, [](soap &ctx) { ctx.on_send = see_none; }},
         {"send of a chunk", MODE_CHUNKED, [](soap &ctx) { ctx.on_send = see_none; }},
@@ -281,11 +264,11 @@ TEST(buffered_out, the_error_of_a_hook_is_that_of_the_message)
         {"storing", MODE_STORE, [](soap &ctx) { ctx.on_send_prepare = see_none; }},
         {"filter", MODE_BUFFERED, [](soap &ctx) { ctx.on_send_filter = pass_none; }},
     };
-    for (const auto &row : rows) {
-        memory_wire wire(0, row.mode);
-        row.set(wire);
-        EXPECT_EQ(send_message(wire, "hello world"), 77) << row.rule;
-        EXPECT_EQ(wire.error, 77) << row.rule;
+    for (const auto &[rule, mode, set] : rows) {
+        memory_wire wire(0, mode);
+        set(wire);
+        EXPECT_EQ(send_message(wire, "hello world"), 77) << rule;
+        EXPECT_EQ(wire.error, 77) << rule;
     }
     memory_wire wire(0, MODE_BUFFERED);
     wire.on_send = see_none;

@@ -1,5 +1,4 @@
-// call_allocation_test.cpp - every allocation of a call refused once: a code comes back, and the next call
-// works.
+// call_allocation_test.cpp - every allocation of a call refused once: a code comes back, and the next call works.
 #include "core/tracking.h"
 #include "support/call_wire.h"
 #include "support/testing.h"
@@ -304,10 +303,7 @@ TEST(released_objects, are_wiped_and_stay_in_their_context)
     steady_calls calls;
     using answer = protocolProfile__ProfileContent;
     const std::string secret = "a password that is too long for its place";
-    const struct {
-        std::string before, secret, after;
-        const char *(*place)(const answer &);
-    } rows[] = {
+    const std::tuple<std::string, std::string, std::string, const char *(*)(const answer &)> rows[] = {
         {"<p:association><p:password>", secret, "</p:password></p:association>",
          [](const answer &got) -> const char * { return got.association[0]->password->data(); }},
         {"<p:thisURI>", secret, "</p:thisURI>",
@@ -319,15 +315,15 @@ TEST(released_objects, are_wiped_and_stay_in_their_context)
              return reinterpret_cast<const char *>(got.credentials[0]->certificate->content);
          }},
     };
-    for (const auto &row : rows) {
-        calls.wire.answers = {http_answer(answer_envelope(
-            "<E:Body><p:getResponse>" + row.before + row.secret + row.after + "</p:getResponse></E:Body>"))};
+    for (const auto &[before, sent, after, place] : rows) {
+        calls.wire.answers = {http_answer(answer_envelope("<E:Body><p:getResponse>" + before + sent + after +
+                                                          "</p:getResponse></E:Body>"))};
         ASSERT_EQ(0, calls.get());
-        const char *const bytes = row.place(*calls.got.result);
-        const std::string held = row.secret.back() == '=' ? "A key of its own" : row.secret;
+        const char *const bytes = place(*calls.got.result);
+        const std::string held = sent.back() == '=' ? "A key of its own" : sent;
         ASSERT_EQ(held, std::string(bytes, held.size()));
         calls.proxy.destroy();
-        EXPECT_EQ(std::string(held.size(), '\0'), std::string(bytes, held.size())) << row.before;
+        EXPECT_EQ(std::string(held.size(), '\0'), std::string(bytes, held.size())) << before;
     }
     soap copy(calls.proxy);
     EXPECT_EQ(copy.pool_limit, SOAP_POOL_LIMIT);

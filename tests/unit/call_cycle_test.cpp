@@ -1,5 +1,4 @@
-// call_cycle_test.cpp - a call from its endpoint to its release: where it goes, how it ends, what stays of
-// it.
+// call_cycle_test.cpp - a call from its endpoint to its release: where it goes, how it ends, what stays of it.
 #include "support/call_wire.h"
 #include "support/testing.h"
 
@@ -69,16 +68,14 @@ TEST_F(call_cycle, refuses_an_endpoint_that_leads_nowhere_before_anything_is_sen
         "http://h]/ htps://h/ ftp://h/ HTTPG://h/ soap.tcp://h/ httpsoap.udp.long://h/ h/x?q=http://i/");
     refused.insert(refused.end(), {"", " "});
     const std::string endless = "http://" + std::string(2000, '?');
-    const struct {
-        const char *rule, *endpoint;
-        std::string quoted;
-    } quoted_otherwise[] = {{"the one of several", "http://h/ htps://i/ http://j/", "htps://i/"},
-                            {"no controls", "http://h/a\tb\x7F", "http://h/a?b?"},
-                            {"no line breaks", "http://h\r\nX: y/", "http://h??X:"},
-                            {"no password", "http://u:pw@h/", "http://...@h/"},
-                            {"none with an @", "https://u:p@w@h:443/x@y", "https://...@h:443/x@y"},
-                            {"none without a scheme", "u:pw@h/", "...@h/"},
-                            {"so much of it", endless.c_str(), endless.substr(0, 881)}};
+    const std::tuple<const char *, const char *, std::string> quoted_otherwise[] = {
+        {"the one of several", "http://h/ htps://i/ http://j/", "htps://i/"},
+        {"no controls", "http://h/a\tb\x7F", "http://h/a?b?"},
+        {"no line breaks", "http://h\r\nX: y/", "http://h??X:"},
+        {"no password", "http://u:pw@h/", "http://...@h/"},
+        {"none with an @", "https://u:p@w@h:443/x@y", "https://...@h:443/x@y"},
+        {"none without a scheme", "u:pw@h/", "...@h/"},
+        {"so much of it", endless.c_str(), endless.substr(0, 881)}};
     const auto call_at = [this](const char *endpoint) {
         wire.opened = 0;
         wire.sent.clear();
@@ -100,8 +97,8 @@ TEST_F(call_cycle, refuses_an_endpoint_that_leads_nowhere_before_anything_is_sen
             EXPECT_EQ(0, call_at(endpoint.c_str())) << endpoint << " " << time;
     for (const std::string &endpoint : refused)
         refuses(endpoint.c_str(), endpoint);
-    for (const auto &c : quoted_otherwise)
-        refuses(c.endpoint, c.quoted);
+    for (const auto &[rule, endpoint, quoted] : quoted_otherwise)
+        refuses(endpoint, quoted);
     proxy.legacy = LEGACY_ANY_ENDPOINT;
     EXPECT_EQ(0, call_at("htps://h:99999/"));
     EXPECT_EQ(0, call_at("")) << "by descriptor, or the hooks in its place";
@@ -109,11 +106,7 @@ TEST_F(call_cycle, refuses_an_endpoint_that_leads_nowhere_before_anything_is_sen
 
 TEST_F(call_cycle, a_failure_never_shows_the_fault_of_an_earlier_call)
 {
-    static const struct {
-        const char *rule;
-        void (*fail)(soap &ctx);
-        const char *text;
-    } cases[] = {
+    static const std::tuple<const char *, void (*)(soap &), const char *> cases[] = {
         {"no answer", [](soap &) {}, "End of file or no input: Operation interrupted or timed out"},
         {"not sent", [](soap &ctx) { ctx.on_send = [](soap *, const char *, std::size_t) { return -1; }; },
          "End of file or no input: Operation interrupted or timed out"},
@@ -124,14 +117,14 @@ TEST_F(call_cycle, a_failure_never_shows_the_fault_of_an_earlier_call)
          [](soap &ctx) { ctx.on_send_prepare_begin = [](soap *c) { return c->error = SOAP_USER_ERROR; }; },
          "User data error"},
     };
-    for (const auto &c : cases) {
-        SCOPED_TRACE(c.rule);
+    for (const auto &[rule, fail, text] : cases) {
+        SCOPED_TRACE(rule);
         ASSERT_EQ(SOAP_CLIENT_FAULT, get(fault_11("E:Client", "<detail><x/></detail>")));
-        c.fail(proxy);
+        fail(proxy);
         EXPECT_NE(0, proxy.get(&request, response));
         std::ostringstream printed;
         proxy.soap_stream_fault(printed);
-        EXPECT_EQ("SOAP-ENV:Client [no subcode]\n\"" + std::string(c.text) + "\"\nDetail: [no detail]\n",
+        EXPECT_EQ("SOAP-ENV:Client [no subcode]\n\"" + std::string(text) + "\"\nDetail: [no detail]\n",
                   printed.str().substr(printed.str().find("SOAP-ENV")));
         proxy.on_connect = nullptr;
         proxy.on_send_prepare_begin = nullptr;
@@ -248,7 +241,6 @@ TEST_F(call_cycle, a_bad_value_does_not_hide_the_fault)
         << "broken XML is no fault";
 }
 
-// Parts of a fault may come after it, as those of any object.
 TEST_F(call_cycle, the_references_of_a_fault_are_followed)
 {
     const std::string detail = "<c:Client.ObjectNotFound><c:uri>u</c:uri></c:Client.ObjectNotFound>",
@@ -385,7 +377,6 @@ TEST_F(call_cycle, what_cannot_be_written_is_refused_before_anything_is_sent)
     }
 }
 
-// As after any other failure: attachments belong to one call.
 TEST_F(call_cycle, attachments_that_are_refused_are_gone_for_the_next_call)
 {
     proxy.output_mode = MODE_DIME;

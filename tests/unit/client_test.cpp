@@ -1,9 +1,6 @@
 // client_test.cpp - the clients of include/zuv_client_pro/client.h: whose memory a result is, what a failure
 // says, when a call is repeated, requests and responses without pointers by hand, attachments.
 #include <chrono>
-#include <csignal>
-#include <ctime>
-#include <thread>
 
 #include <zuv_client_pro/client.h>
 #include <zuv_client_pro/client_attachment.h>
@@ -21,7 +18,6 @@ using namespace std::chrono_literals;
 using scripted::line;
 using profile_result = zuv::result<protocolProfile__ProfileContent>;
 
-// A client whose connection is memory.
 template <class Client> struct wired {
     explicit wired(const zuv::options &wanted = {}, const char *endpoint = "http://peer.test/")
         : client(endpoint, wanted)
@@ -145,14 +141,7 @@ TEST(client_results, are_kept_or_refused_when_memory_runs_out)
 TEST(client_failures, say_what_happened_and_what_to_do)
 {
     using kind = zuv::failure_kind;
-    const struct {
-        const char *rule;
-        std::string answer;
-        int code;
-        kind expected;
-        int status;
-        std::string faults;
-    } rows[] = {
+    const std::tuple<const char *, std::string, int, kind, int, std::string> rows[] = {
         {"typed", fault_answer("Client", NOT_FOUND), SOAP_CLIENT_FAULT, kind::refused, 500,
          "Client.ObjectNotFound: gone, Server.System: disk, "},
         {"server", fault_answer("Server", ""), SOAP_SERVER_FAULT, kind::failed, 500, ""},
@@ -166,19 +155,19 @@ TEST(client_failures, say_what_happened_and_what_to_do)
     };
     zuv::options small;
     small.max_message = 3000;
-    for (const auto &row : rows) {
-        SCOPED_TRACE(row.rule);
+    for (const auto &[rule, answer, code, expected, status, described] : rows) {
+        SCOPED_TRACE(rule);
         wired_client wired(small);
-        const profile_result result = wired.get(row.answer);
+        const profile_result result = wired.get(answer);
         const zuv::failure &failure = result.failure();
         std::string faults;
         for (const zuv::fault_info &fault : failure.faults())
             faults += std::string(fault.name()) + ": " + fault.description() + ", ";
         EXPECT_FALSE(result);
-        EXPECT_EQ(failure.code().value(), row.code);
-        EXPECT_EQ(failure.kind(), row.expected);
-        EXPECT_EQ(failure.http_status(), row.status);
-        EXPECT_EQ(faults, row.faults);
+        EXPECT_EQ(failure.code().value(), code);
+        EXPECT_EQ(failure.kind(), expected);
+        EXPECT_EQ(failure.http_status(), status);
+        EXPECT_EQ(faults, described);
         EXPECT_TRUE(failure.message().starts_with("get failed: ")) << failure.message();
         EXPECT_TRUE(failure.message().ends_with(failure.advice()) && *failure.advice() != '\0');
         EXPECT_EQ(name_of(result), "(none)");
@@ -199,8 +188,6 @@ TEST(client_failures, say_what_happened_and_what_to_do)
     EXPECT_LE(result.failure().faults().size(), 64U) << "of references in a circle";
     EXPECT_FALSE(result.failure().message().empty());
 }
-
-// --- repeating ---
 
 profile_result create_one(zuv::profile_client &client, const std::string &name = "call-1",
                           const zuv::extras &how = zuv::extras::none())
@@ -238,14 +225,7 @@ const script STAY_SILENT = [](line &end) { end.await_end(); };
 TEST(client_calls, are_repeated_only_if_the_request_was_not_taken)
 {
     using kind = zuv::failure_kind;
-    const struct {
-        const char *rule;
-        script first; // the first connection; later ones are served well
-        bool repeatable;
-        int calls; // the last one counts
-        kind expected;
-        int connections;
-    } rows[] = {
+    const std::tuple<const char *, script, bool, int, kind, int> rows[] = {
         {"kept and closed with the request", after_answer(CLOSE), false, 2, kind::none, 2},
         {"kept and reset with the request", after_answer([](auto &end) { end.reset(); }), false, 2,
          kind::none, 2},
@@ -259,18 +239,19 @@ TEST(client_calls, are_repeated_only_if_the_request_was_not_taken)
     zuv::options brief;
     brief.recv_limit = 200ms;
     brief.retry.first_pause = 1ms;
-    for (const auto &row : rows) {
-        SCOPED_TRACE(row.rule);
-        const scripted::server peer(row.first);
+    // first: the first connection; later ones are served well
+    for (const auto &[rule, first, repeatable, calls, expected, connections] : rows) {
+        SCOPED_TRACE(rule);
+        const scripted::server peer(first);
         zuv::profile_client client("http://127.0.0.1:" + std::to_string(peer.port()) + "/", brief);
         zuv::extras how;
-        if (row.repeatable)
+        if (repeatable)
             how.repeatable();
-        for (int left = row.calls; left > 1; --left)
+        for (int left = calls; left > 1; --left)
             EXPECT_EQ(name_of(create_one(client, "call-1", how)), "call-1");
         const profile_result last = create_one(client, "call-1", how);
-        EXPECT_EQ(last.failure().kind(), row.expected) << last.failure().message();
-        EXPECT_EQ(peer.connections(), row.connections);
+        EXPECT_EQ(last.failure().kind(), expected) << last.failure().message();
+        EXPECT_EQ(peer.connections(), connections);
     }
 }
 
@@ -290,8 +271,6 @@ TEST(client_calls, wait_between_attempts_within_the_total_limit)
         EXPECT_TRUE(attempts == 1 || steady_clock::now() - began >= 100ms) << "half of 40, 80 and 80";
     }
 }
-
-// --- what happened in a call ---
 
 class client_reports : public tls_peers::tls_test {};
 
@@ -415,8 +394,7 @@ TEST_F(client_reports, and_texts_say_what_ended_a_call)
         over = true;
         over.notify_all();
         EXPECT_EQ(client.report().ended_by, row.ended_by);
-        EXPECT_NE(result.failure().message().find(row.words), std::string::npos)
-            << result.failure().message();
+        EXPECT_THAT(result.failure().message(), HasSubstr(row.words));
         EXPECT_EQ(std::string(client.report().certificate_refusal).substr(0, std::strlen(row.refusal)),
                   row.refusal);
         EXPECT_EQ(std::string(client.report().certificate_subject) == "CN=peer.test,O=Test",
@@ -499,8 +477,7 @@ TEST_F(client_reports, of_calls_that_are_cancelled_wherever_they_wait)
         EXPECT_LT(std::chrono::steady_clock::now() - began, 10s);
         done.wait(false); // soap_cancel must have returned before the client ends
         EXPECT_EQ(result.failure().kind(), zuv::failure_kind::cancelled);
-        EXPECT_NE(result.failure().message().find("The call was cancelled"), std::string::npos)
-            << result.failure().message();
+        EXPECT_THAT(result.failure().message(), HasSubstr("The call was cancelled"));
         EXPECT_EQ(client.report().ended_by, ENDED_BY_CANCEL);
         EXPECT_FALSE(soap_cancel(signalled)) << "nothing runs";
         if (endpoint == peer.endpoint()) {
@@ -538,9 +515,9 @@ TEST(client_options, reach_the_context)
     for (int i = 0; i < 2; ++i) {
         EXPECT_TRUE(
             to_memory.get(named_answer("x"), zuv::extras().header(record).target("urn:doc").repeatable()));
-        EXPECT_NE(to_memory.wire.sent.find("transactionId>t-1<"), std::string::npos);
-        EXPECT_NE(to_memory.wire.sent.find("Authorization: Basic YWRhOnNlY3JldA=="), std::string::npos);
-        EXPECT_NE(to_memory.wire.sent.find("targetURI>urn:doc<"), std::string::npos);
+        EXPECT_THAT(to_memory.wire.sent, HasSubstr("transactionId>t-1<"));
+        EXPECT_THAT(to_memory.wire.sent, HasSubstr("Authorization: Basic YWRhOnNlY3JldA=="));
+        EXPECT_THAT(to_memory.wire.sent, HasSubstr("targetURI>urn:doc<"));
         to_memory.wire.sent.clear();
     }
     wanted.compression = wanted.chunked = wanted.strict_reading = wanted.trace_times = true;
@@ -581,8 +558,6 @@ TEST(client_options, take_the_proxy_of_the_environment_when_asked)
     for (const char *name : {"http_proxy", "https_proxy", "no_proxy"})
         unsetenv(name);
 }
-
-// --- requests and responses ---
 
 TEST(client_documents, own_what_members_are_set_to)
 {
@@ -626,8 +601,6 @@ TEST(client_documents, read_what_is_absent_as_empty)
     EXPECT_TRUE(result.attachments().empty());
 }
 
-// --- ports and attachments ---
-
 constexpr char STATUS_ANSWER[] = "<E:Body><p:createResponse/></E:Body>";
 
 TEST(client_attachments, pass_between_files_memory_and_functions)
@@ -647,10 +620,6 @@ TEST(client_attachments, pass_between_files_memory_and_functions)
     const auto answer_of = [](const std::string &type, const std::string &content) {
         return "HTTP/1.1 200 OK\r\nContent-Type: " + type +
                "\r\nContent-Length: " + std::to_string(content.size()) + "\r\n\r\n" + content;
-    };
-    const auto bytes_of = [](const std::string &path) {
-        std::ifstream file(path);
-        return std::string(std::istreambuf_iterator<char>(file), {});
     };
     for (const auto form :
          {zuv::attachment_form::mtom, zuv::attachment_form::mime, zuv::attachment_form::dime}) {
@@ -684,11 +653,11 @@ TEST(client_attachments, pass_between_files_memory_and_functions)
         ASSERT_TRUE(result) << result.failure().message();
         EXPECT_EQ(reported, 1111U);
         EXPECT_EQ(second, "second");
-        EXPECT_EQ(bytes_of(into), "first bytes");
+        EXPECT_EQ(file_content(into), "first bytes");
         EXPECT_EQ(kept, 11U);
         EXPECT_EQ(result.attachments().size(), 2U);
         for (const char *const part : {"of the file", "of the memory"})
-            EXPECT_NE(wire.sent.find(part), std::string::npos) << part;
+            EXPECT_THAT(wire.sent, HasSubstr(part));
 
         // A response that breaks off leaves the file as it was; the part that was sent is asked for once.
         wire.answers.push_back(answer.substr(0, answer.find("second")));
@@ -699,7 +668,7 @@ TEST(client_attachments, pass_between_files_memory_and_functions)
             .receive([&](const zuv::received_part &) { return zuv::to_file(into); });
         EXPECT_FALSE(client.create(report, zuv::extras().repeatable().carry(once)));
         EXPECT_EQ(asked, 2);
-        EXPECT_EQ(bytes_of(into), "first bytes");
+        EXPECT_EQ(file_content(into), "first bytes");
         EXPECT_FALSE(std::filesystem::exists(into + ".part"));
 
         // What can't be kept ends the call, says why, and leaves no file.
@@ -719,8 +688,7 @@ TEST(client_attachments, pass_between_files_memory_and_functions)
             });
             const auto failed = client.create(report, zuv::extras().carry(unwanted));
             ASSERT_FALSE(failed) << words;
-            EXPECT_NE(failed.failure().message().find(words), std::string::npos)
-                << failed.failure().message();
+            EXPECT_THAT(failed.failure().message(), HasSubstr(words));
         }
         for (const std::string &made : {folder + ".part", full + ".part", full})
             EXPECT_FALSE(std::filesystem::exists(std::filesystem::symlink_status(made))) << made;
@@ -731,8 +699,8 @@ TEST(client_attachments, pass_between_files_memory_and_functions)
         wire.answers.assign(1, answer);
         const auto plain = client.create(report);
         ASSERT_TRUE(plain) << plain.failure().message();
-        EXPECT_EQ(wire.sent.find("multipart"), std::string::npos);
-        EXPECT_EQ(wire.sent.find("chunked"), std::string::npos);
+        EXPECT_THAT(wire.sent, Not(HasSubstr("multipart")));
+        EXPECT_THAT(wire.sent, Not(HasSubstr("chunked")));
         EXPECT_EQ(plain.attachments().at(1).content, "second");
     }
     zuv::attachments missing;
@@ -756,7 +724,7 @@ TEST(client_ports, call_a_port_without_a_proxy_class)
     const auto result = client.submit(protocolProblemReport__ProblemReportContent());
     ASSERT_TRUE(result) << result.failure().message();
     EXPECT_STREQ(zuv::text(result->title), "slow");
-    EXPECT_NE(wire.sent.find("submitRequest"), std::string::npos);
+    EXPECT_THAT(wire.sent, HasSubstr("submitRequest"));
 }
 
 } // namespace

@@ -209,29 +209,20 @@ TEST_F(context_copy, outlives_its_source_and_keeps_the_tls_context)
 TEST_F(context_copy, frees_what_its_target_held_and_the_tls_context_that_it_makes)
 {
     const soap source;
-    const std::function<void()> rounds[] = {[&] {
-                                                soap target;
-                                                soap_string_dup(&target, "its own");
-                                                soap_log_set_sent(&target, "sent.log");
-                                                EXPECT_EQ(soap_context_copy(&target, &source), &target);
-                                                EXPECT_EQ(soap_context_copy(&target, &source), &target);
-                                            },
-                                            [&] {
-                                                soap copy(source);
-                                                EXPECT_EQ(soap_ssl_client_context(&copy, TLS_NO_DEFAULT_CA,
-                                                                                  nullptr, nullptr, nullptr,
-                                                                                  nullptr, nullptr),
-                                                          0);
-                                            }};
-    for (const auto &round : rounds) {
-        round(); // what a process makes but once
-        const std::ptrdiff_t before = failing_malloc::held();
-        round();
-        EXPECT_EQ(failing_malloc::held(), before);
+    std::ptrdiff_t before = 0;
+    for (int round = 0; round < 2; ++round) { // the first makes what a process makes but once
+        before = failing_malloc::held();
+        soap target, copy(source);
+        soap_string_dup(&target, "its own");
+        soap_log_set_sent(&target, "sent.log");
+        EXPECT_EQ(soap_context_copy(&target, &source), &target);
+        EXPECT_EQ(soap_context_copy(&target, &source), &target);
+        EXPECT_EQ(
+            soap_ssl_client_context(&copy, TLS_NO_DEFAULT_CA, nullptr, nullptr, nullptr, nullptr, nullptr),
+            0);
     }
+    EXPECT_EQ(failing_malloc::held(), before);
 }
-
-// --- connections ---
 
 // A proxy in the middle of its life: connected, the last answer's rest unread, with a fault and a header.
 struct busy_proxy {
@@ -269,10 +260,7 @@ TEST_F(context_copy, starts_without_a_connection_however_it_is_made)
 {
     using proxy = ProfileSoapBindingProxy;
     using made = std::unique_ptr<soap>;
-    static const struct {
-        const char *how;
-        made (*make)(const proxy &source);
-    } cases[] = {
+    static const std::tuple<const char *, made (*)(const proxy &source)> cases[] = {
         {"context of a proxy", [](const proxy &source) { return std::make_unique<soap>(source); }},
         {"proxy of a context",
          [](const proxy &source) -> made {
@@ -286,11 +274,11 @@ TEST_F(context_copy, starts_without_a_connection_however_it_is_made)
              return target;
          }},
     };
-    for (const auto &c : cases) {
-        SCOPED_TRACE(c.how);
+    for (const auto &[how, make] : cases) {
+        SCOPED_TRACE(how);
         busy_proxy busy;
         {
-            const made copy = c.make(busy.proxy);
+            const made copy = make(busy.proxy);
             expect_no_connection(*copy);
             EXPECT_NE(copy->log_paths[SOAP_LOG_SENT], busy.proxy.log_paths[SOAP_LOG_SENT]);
             const auto *const as_proxy = dynamic_cast<proxy *>(copy.get());

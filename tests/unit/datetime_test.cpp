@@ -18,7 +18,6 @@ class dates : public testing::Test {
 protected:
     std::unique_ptr<soap> ctx = std::make_unique<soap>();
 
-    // Seconds, or "4" for a refused text.
     std::string parsed(const std::string &text)
     {
         std::time_t seconds = -77;

@@ -32,9 +32,9 @@ TEST(dime_out, is_one_record_for_the_message_and_one_for_each_attachment)
     const std::size_t xml_size =
         static_cast<unsigned char>(sent[10]) * 256U + static_cast<unsigned char>(sent[11]);
     const std::string xml = sent.substr(xml_at, xml_size);
-    EXPECT_NE(xml.find("<data href=\"cid:id1\""), std::string::npos) << xml;
-    EXPECT_NE(xml.find("<data href=\"cid:two\""), std::string::npos) << xml;
-    EXPECT_NE(xml.find("<data>Zmlyc3Q=</data>"), std::string::npos) << xml; // neither id nor type: inline
+    EXPECT_THAT(xml, HasSubstr("<data href=\"cid:id1\""));
+    EXPECT_THAT(xml, HasSubstr("<data href=\"cid:two\""));
+    EXPECT_THAT(xml, HasSubstr("<data>Zmlyc3Q=</data>")); // neither id nor type: inline
     EXPECT_EQ(xml.substr(xml.size() - 2), "\r\n");
     EXPECT_EQ(sent, record(MB, URI, "cid:id0", ENVELOPE_URI, xml) +
                         record(0, MEDIA, "own", "", "host's", std::string("\0\0\0\1o", 5)) +
@@ -97,8 +97,6 @@ TEST(attachments_out, end_in_an_error_wherever_sends_are_refused)
         EXPECT_GT(all, 20U);
     }
 }
-
-// --- streams of the host ---
 
 TEST(dime_stream, goes_out_as_one_record_or_in_chunks_if_its_length_is_unknown)
 {
@@ -180,12 +178,10 @@ TEST(dime_stream, of_more_than_32_bits_goes_out_in_chunks)
     ASSERT_EQ(write_message(&wire, {}), 0);
     ASSERT_EQ(soap_send_finish(&wire), 0);
     EXPECT_EQ(sent, counted);
-    EXPECT_NE(headers.find(header(CF, MEDIA, 0, 1, 3, 0xFFFFFFFC)), std::string::npos);
+    EXPECT_THAT(headers, HasSubstr(header(CF, MEDIA, 0, 1, 3, 0xFFFFFFFC)));
     EXPECT_EQ(headers.find(header(ME, UNCHANGED, 0, 0, 0, 5)), headers.size() - 12 - 8);
 #endif
 }
-
-// --- received ---
 
 TEST(dime_in, reports_what_is_wrong_with_a_message)
 {

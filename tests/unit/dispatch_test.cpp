@@ -1,6 +1,5 @@
-// dispatch_test.cpp - what is done by type id alone, over every id there is.
-//
-// Elsewhere: objects that are shared (tests/classes/graph_test.cpp).
+// dispatch_test.cpp - what is done by type id alone, over every id there is. Elsewhere: objects that are
+// shared (tests/classes/graph_test.cpp).
 #include <stdexcept>
 
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
@@ -19,7 +18,6 @@ class dispatch : public testing::Test {
 protected:
     dispatch() { soap_set_namespaces(&ctx, ProfileSoapBindingProxy().namespaces); }
 
-    // What a test can't go on without.
     static void *given(void *made)
     {
         if (made == nullptr)
@@ -213,10 +211,7 @@ TEST_F(dispatch, arrays_are_made_of_whatever_may_be_in_one)
 
 TEST_F(dispatch, elements_that_were_not_asked_for_are_known_by_type_name_or_id)
 {
-    const struct {
-        const char *rule, *xml;
-        int type, error;
-    } cases[] = {
+    const std::tuple<const char *, const char *, int, int> cases[] = {
         {"xsi:type", "<x xsi:type=\"protocol:Address\"/>", SOAP_TYPE_protocol__Address, 0},
         {"the type's name as tag", "<protocol:Address/>", SOAP_TYPE_protocol__Address, 0},
         {"a simple type", "<x xsi:type=\"xsd:int\">7</x>", SOAP_TYPE_xsd__int, 0},
@@ -225,13 +220,13 @@ TEST_F(dispatch, elements_that_were_not_asked_for_are_known_by_type_name_or_id)
         {"no element", "", 0, SOAP_NO_TAG},
         {"a wrong number", "<x xsi:type=\"xsd:int\">seven</x>", SOAP_TYPE_xsd__int, SOAP_TYPE_MISMATCH},
     };
-    for (const auto &c : cases) {
-        SCOPED_TRACE(c.rule);
-        receive(c.xml);
+    for (const auto &[rule, xml, expected, error] : cases) {
+        SCOPED_TRACE(rule);
+        receive(xml);
         int type = -1;
-        EXPECT_EQ(c.error == 0, soap_read_element(&ctx, &type) != nullptr);
-        EXPECT_EQ(c.type, type);
-        EXPECT_EQ(c.error, ctx.error);
+        EXPECT_EQ(error == 0, soap_read_element(&ctx, &type) != nullptr);
+        EXPECT_EQ(expected, type);
+        EXPECT_EQ(error, ctx.error);
     }
 }
 

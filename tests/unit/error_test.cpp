@@ -17,7 +17,6 @@ std::string printed_to_stream(soap *ctx)
     return stream.str();
 }
 
-// What `print` writes to a file.
 template <class Print> std::string written(Print print)
 {
     std::FILE *file = std::tmpfile();
@@ -104,11 +103,7 @@ TEST(error_text, constraint_text_names_the_element_if_there_is_one)
 
 TEST(fault, the_code_follows_the_version_unless_the_error_has_its_own)
 {
-    static const struct {
-        int error;
-        std::int16_t version;
-        const char *code, *subcode;
-    } cases[] = {
+    static const std::tuple<int, std::int16_t, const char *, const char *> cases[] = {
         {5, 1, "SOAP-ENV:Client", nullptr},
         {5, 2, "SOAP-ENV:Sender", nullptr},
         {12, 1, "SOAP-ENV:Client", nullptr},
@@ -119,14 +114,14 @@ TEST(fault, the_code_follows_the_version_unless_the_error_has_its_own)
         {25, 2, "SOAP-ENV:Sender", "SOAP-ENC:MissingID"},
         {25, 1, "SOAP-ENV:Client", nullptr},
     };
-    for (const auto &c : cases) {
-        SCOPED_TRACE(c.error);
+    for (const auto &[error, version, code, subcode] : cases) {
+        SCOPED_TRACE(error);
         soap ctx;
-        ctx.soap_version = c.version;
-        ctx.error = c.error;
+        ctx.soap_version = version;
+        ctx.error = error;
         soap_fault_text_fill(&ctx);
-        EXPECT_STREQ(*soap_fault_code_field(&ctx), c.code);
-        EXPECT_STREQ(soap_fault_subcode_value(&ctx), c.subcode);
+        EXPECT_STREQ(*soap_fault_code_field(&ctx), code);
+        EXPECT_STREQ(soap_fault_subcode_value(&ctx), subcode);
     }
 }
 
@@ -237,8 +232,7 @@ TEST(fault, without_memory_a_fault_is_still_printed)
         soap_fault_print_text(&ctx, buffer, sizeof buffer);
         EXPECT_EQ(soap_fault_sender_copied(&ctx, "a", "b", "c"), SOAP_OUT_OF_MEMORY);
     }
-    EXPECT_NE(std::string(buffer).find(" fault: SOAP-ENV:Client [no subcode]\n"), std::string::npos)
-        << buffer;
+    EXPECT_THAT(buffer, HasSubstr(" fault: SOAP-ENV:Client [no subcode]\n"));
 }
 
 } // namespace

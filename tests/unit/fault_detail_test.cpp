@@ -1,7 +1,5 @@
 // fault_detail_test.cpp - each fault that a detail may bring, as a service writes it and a client reads it:
-// whole, met twice and cut short.
-//
-// Elsewhere: with each allocation refused (call_allocation_test.cpp).
+// whole, met twice and cut short. Elsewhere: with each allocation refused (call_allocation_test.cpp).
 #include <regex>
 
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
@@ -46,7 +44,6 @@ int read_fault(memory_wire &ctx, std::int16_t version, const std::string &xml)
     return soap_fault_read(&ctx);
 }
 
-// The members of a detail that are set.
 std::vector<const protocol__Fault *> faults_in(const SOAP_ENV__Detail &detail)
 {
     std::vector<const protocol__Fault *> found;
@@ -85,7 +82,7 @@ void goes_both_ways(const char *spelled, F *SOAP_ENV__Detail::*member, std::int1
     ASSERT_EQ(out.put(true), 0);
     const std::string xml = out.sent();
     const std::string name = "protocol:" + std::regex_replace(spelled, std::regex("_x002e"), ".");
-    EXPECT_NE(xml.find("</" + name + ">"), xml.npos) << xml;
+    EXPECT_THAT(xml, HasSubstr("</" + name + ">"));
     memory_wire in;
     ASSERT_EQ(read_fault(in, version, xml), 0) << xml;
     const F *read = detail_of(in)->*member;
@@ -137,7 +134,7 @@ TEST(fault_detail, brings_an_object_of_any_class_and_raw_text)
         ASSERT_EQ(read_fault(in, version, out.sent()), 0) << out.sent();
         ASSERT_EQ(detail_of(in)->__type, contact.soap_type()) << out.sent();
         EXPECT_EQ(*static_cast<protocol__Contact *>(detail_of(in)->fault)->name, name);
-        EXPECT_NE(std::string(soap_fault_detail_value(&in)).find("raw"), std::string::npos);
+        EXPECT_THAT(soap_fault_detail_value(&in), HasSubstr("raw"));
         EXPECT_STREQ(soap_fault_subcode_value(&in), version == 1 ? nullptr : "SOAP-ENV:Client.Sub");
         EXPECT_STREQ(in.fault->faultactor, "urn:who");
         EXPECT_STREQ(in.fault->Role, "urn:who");

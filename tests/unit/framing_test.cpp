@@ -164,7 +164,6 @@ TEST(framing, damaged_messages_end_with_bounded_work)
     }
 }
 
-// Those of sending are refused in call_allocation_test.cpp.
 TEST(framing, every_allocation_of_reading_may_fail_once)
 {
     const std::string text = "<a>stored and compressed, stored and compressed!</a>";

@@ -1,13 +1,7 @@
-// host_conditions_test.cpp - what a host does to its own process doesn't reach a call.
-//
-// Elsewhere: a host that forks (fork_test.cpp), its locale and its floating point mode (number_test.cpp).
-#include <atomic>
-#include <dlfcn.h>
-#include <fcntl.h>
+// host_conditions_test.cpp - what a host does to its own process doesn't reach a call. Elsewhere: a host that
+// forks (fork_test.cpp), its locale and its floating point mode (number_test.cpp).
 #include <pthread.h>
 #include <sys/resource.h>
-#include <sys/wait.h>
-#include <thread>
 
 #include <zuv_client_pro/soap_report.h>
 
@@ -21,8 +15,6 @@ using namespace scripted;
 constexpr int CHILD_LIMIT_S = 120;    // qemu is slow
 constexpr std::size_t LARGE = 300000; // bytes of text in a request, and in the name that comes back
 constexpr int SILENCE_US = 200000;
-
-// --- what a host does, and its calls ---
 
 bool calls_well(client &own)
 {
@@ -196,9 +188,7 @@ template <class Server> void expect_right(const host_row &row, const Server &ser
         own.reset();
         _exit(right ? 0 : 1);
     }
-    int status = 0;
-    EXPECT_EQ(waitpid(child, &status, 0), child);
-    EXPECT_EQ(status, 0);
+    expect_exit(child, 0);
 }
 
 TEST_F(host_conditions, do_not_reach_a_call)
@@ -255,9 +245,7 @@ TEST_F(host_conditions, a_plug_in_with_a_library_of_its_own_comes_and_goes)
     const pid_t child = fork(); // with the hooks of libraries that are gone
     if (child == 0)
         _exit(0);
-    int status = 0;
-    EXPECT_EQ(waitpid(child, &status, 0), child);
-    EXPECT_EQ(status, 0);
+    expect_exit(child, 0);
 }
 #endif
 

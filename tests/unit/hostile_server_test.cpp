@@ -1,9 +1,6 @@
-// hostile_server_test.cpp - calls to a server that does what no healthy server does.
-//
-// Each call ends within its time limits, with its own answer or an error, and never with another's answer.
-// The table of what was found is printed. Elsewhere: what a client meets before an answer (client_test.cpp).
-#include <atomic>
-#include <chrono>
+// hostile_server_test.cpp - calls to a server that does what no healthy server does. Each call ends within
+// its time limits, with its own answer or an error, and never with another's answer. The table of what was
+// found is printed. Elsewhere: what a client meets before an answer (client_test.cpp).
 
 #include "support/scripted_client.h"
 #include "support/socket_calls.h"
@@ -16,8 +13,6 @@ constexpr int BRIEF_US = -800000; // as a time limit: microseconds, and enough f
 constexpr int SLACK_MS = 60000;   // for a machine that is busy: what has no limit takes for ever
 
 class hostile_server : public tls_peers::tls_test {};
-
-// --- scripts of the first connection ---
 
 using script = std::function<void(line &)>;
 using text = const std::string &;
@@ -96,7 +91,7 @@ void send_another_answer_later(line &end)
 void flood(line &end, text start, text rest)
 {
     end.send(start);
-    while (end.send_while_it_lasts(rest)) {
+    while (end.send(rest)) {
     }
 }
 
@@ -214,22 +209,12 @@ TEST_F(hostile_server, costs_the_call_and_nothing_more)
             call_all(peer, tls);
 }
 
-// A call whose peer's bytes come one by one, each taking seconds by the clock.
-struct drip_case {
-    const char *rule;
-    const char *scheme; // of the endpoint
-    bool kept;          // drips only on a kept connection
-    bool proxy;         // between
-    int call_limit;     // seconds; no limit of a single step is met by drops
-    int code;
-    const char *text; // of the fault; null: none
-};
-
 constexpr const char *CALL_OVER =
     "End of file or no input: Operation interrupted or timed out (5 s call limit)";
 constexpr const char *CONNECT_OVER = "Operation interrupted or timed out (5 s call limit)";
 
-const drip_case DRIPS[] = {
+// Calls whose peer's bytes come one by one, each taking seconds by the clock.
+const std::tuple<const char *, const char *, bool, bool, int, int, const char *> DRIPS[] = {
     {"answer, no limit", "http", true, false, 0, 0, nullptr},
     {"answer", "http", true, false, 5, SOAP_EOF, CALL_OVER},
     {"answer, TLS, no limit", "https", true, false, 0, 0, nullptr},
@@ -242,32 +227,34 @@ const drip_case DRIPS[] = {
 
 TEST_F(hostile_server, is_left_in_time_though_it_drips)
 {
-    for (const drip_case &c : DRIPS) {
+    // It drips on a kept connection only, or with a proxy between; seconds of a call, as drops meet no limit of a
+    // single step; the text of the fault, or null.
+    for (const auto &[rule, scheme, kept, through_proxy, call_limit, code, text_of_fault] : DRIPS) {
         const loopback::peer proxy([](int socket) {
             loopback::read_head(socket);
             loopback::write_text(socket, "HTTP/1.1 200 OK\r\nX: " + std::string(500, 'x') + "\r\n\r\n");
             loopback::read_head(socket);
         });
-        const server one(serve_well, c.scheme == std::string("https"));
+        const server one(serve_well, scheme == std::string("https"));
         client caller(one);
-        caller.proxy.call_timeout = c.call_limit;
-        if (c.proxy) {
+        caller.proxy.call_timeout = call_limit;
+        if (through_proxy) {
             caller.proxy.proxy_host = "127.0.0.1";
             caller.proxy.proxy_port = proxy.port();
         }
-        if (c.kept) {
-            EXPECT_EQ(caller.call(), 0) << c.rule;
+        if (kept) {
+            EXPECT_EQ(caller.call(), 0) << rule;
         }
         EXPECT_EQ(caller.proxy.call_deadline, 0) << "the time between calls is no call's";
         socket_calls::drips = true;
         socket_calls::call_takes_us = 1000000;
-        EXPECT_EQ(caller.call(), c.code) << c.rule;
+        EXPECT_EQ(caller.call(), code) << rule;
         socket_calls::reset();
         soap_fault_text_fill(&caller.proxy);
-        EXPECT_STREQ(c.text ? caller.proxy.soap_fault_string() : nullptr, c.text) << c.rule;
-        std::printf("%-25s code %2d, %3d s\n", c.rule, caller.proxy.error, caller.milliseconds / 1000);
+        EXPECT_STREQ(text_of_fault ? caller.proxy.soap_fault_string() : nullptr, text_of_fault) << rule;
+        std::printf("%-25s code %2d, %3d s\n", rule, caller.proxy.error, caller.milliseconds / 1000);
         caller.proxy.proxy_host = nullptr;
-        EXPECT_EQ(caller.call(), 0) << c.rule;
+        EXPECT_EQ(caller.call(), 0) << rule;
     }
 }
 

@@ -1,6 +1,5 @@
-// http_request_test.cpp - request heads byte for byte, endpoints, and the choice of a connection.
-//
-// Elsewhere: response heads (http_response_test.cpp), the accepting side (http_service_test.cpp).
+// http_request_test.cpp - request heads byte for byte, endpoints, and the choice of a connection. Elsewhere:
+// response heads (http_response_test.cpp), the accepting side (http_service_test.cpp).
 #include <malloc.h>
 #include <sys/socket.h>
 #include <unistd.h>
@@ -12,11 +11,7 @@ namespace {
 
 TEST(parse_endpoint, splits_urls)
 {
-    static const struct {
-        const char *url, *host;
-        int port;
-        const char *path;
-    } cases[] = {
+    static const std::tuple<const char *, const char *, int, const char *> cases[] = {
         {"http://host/a/b", "host", 80, "/a/b"},
         {"https://host/a", "host", 443, "/a"},
         {"HTTPS://host", "host", 443, "/"},
@@ -35,15 +30,15 @@ TEST(parse_endpoint, splits_urls)
     };
     memory_wire wire;
     char text[64]; // changed in place
-    for (const auto &c : cases) {
-        std::strcpy(text, c.url);
+    for (const auto &[url, host, port, path] : cases) {
+        std::strcpy(text, url);
         for (const char *const time : {"first", "again"}) { // it is remembered then
-            SCOPED_TRACE(std::string(c.url) + " " + time);
+            SCOPED_TRACE(std::string(url) + " " + time);
             soap_parse_endpoint(&wire, text);
-            EXPECT_STREQ(wire.endpoint, c.url);
-            EXPECT_STREQ(wire.host, c.host);
-            EXPECT_EQ(wire.port, c.port);
-            EXPECT_STREQ(wire.path, c.path);
+            EXPECT_STREQ(wire.endpoint, url);
+            EXPECT_STREQ(wire.host, host);
+            EXPECT_EQ(wire.port, port);
+            EXPECT_STREQ(wire.path, path);
         }
     }
     soap_parse_endpoint(&wire, nullptr);
@@ -58,9 +53,6 @@ TEST(parse_endpoint, splits_urls)
     EXPECT_STREQ(wire.endpoint, "http://a:5/b");
 }
 
-// --- request heads ---
-
-// A wire that writes a POST; each case changes what its rule is about.
 struct request_wire : memory_wire {
     request_wire() : memory_wire(0, MODE_BUFFERED)
     {
@@ -109,7 +101,6 @@ const std::string AGENT = "User-Agent: zuv_client_pro/1.5.1\r\n", CLOSE = "Conne
                   PROXY = "Proxy-Authorization: Basic cDo=\r\n",
                   PLAIN = "POST /path HTTP/1.1\r\n" + HOST + XML + LENGTH + CLOSE + ACCEPT + ACTION;
 
-// The plain head, or another one, with a part replaced.
 std::string with(const std::string &part, const std::string &other, std::string head = PLAIN)
 {
     return head.replace(head.find(part), part.size(), other);
@@ -304,8 +295,6 @@ TEST(request_head, stops_at_the_first_failure_of_a_line)
     }
 }
 
-// --- connecting ---
-
 // Connections are socket pairs; a host whose name begins with "dead" refuses.
 struct connecting_wire : memory_wire {
     explicit connecting_wire(std::uint32_t modes) : memory_wire(modes, modes | MODE_BUFFERED)
@@ -430,7 +419,7 @@ TEST(connect, uses_a_kept_connection_only_where_it_may)
         EXPECT_EQ(wire.socket == -1, *c.second == '\0');
         EXPECT_FALSE(wire.socket_abandoned);
         EXPECT_EQ(wire.keep_alive, c.modes != 0 && *c.second != '\0' ? 1 : 0);
-        EXPECT_EQ(wire.sent().find("Proxy-Authorization"), std::string::npos);
+        EXPECT_THAT(wire.sent(), Not(HasSubstr("Proxy-Authorization")));
     }
 }
 

@@ -1,11 +1,8 @@
-// http_response_test.cpp - what a received head does to the context, and the lines and lists that it is made
-// of.
+// http_response_test.cpp - what a received head does to the context, and the lines and lists that it is made of.
 #include "support/memory_wire.h"
 #include "support/testing.h"
 
 namespace {
-
-// --- small pieces ---
 
 TEST(tag_match, compares_without_case_up_to_a_quote_with_dash_and_star)
 {
@@ -30,20 +27,14 @@ TEST(tag_match, compares_without_case_up_to_a_quote_with_dash_and_star)
     };
     for (const auto &[text, pattern, matches] : cases)
         EXPECT_EQ(soap_tag_match(text, pattern) == 0, matches) << text << " against " << pattern;
-}
-
-TEST(tag_match, takes_quadratic_work_at_most)
-{
+    // With quadratic work at most.
     EXPECT_NE(soap_tag_match(repeat_text("a", 8000).c_str(), (repeat_text("*a", 200) + "*b").c_str()), 0);
 }
 
 TEST(attr_value, finds_items_of_lists)
 {
     const std::string long_value(3000, 'v');
-    const struct {
-        std::string list;
-        const char *key, *value; // null: no such item
-    } cases[] = {
+    const std::tuple<std::string, const char *, const char *> cases[] = {
         {"multipart/related; boundary=\"x;y\"; start=z", "boundary", "x;y"},
         {"multipart/related; boundary=\"x\"; start=z", "start", "z"},
         {"multipart/related; boundary=x", "multipart/related", ""},
@@ -65,15 +56,13 @@ TEST(attr_value, finds_items_of_lists)
         {long_value + "=1;l=2", "l", "2"},
     };
     memory_wire wire;
-    for (const auto &c : cases)
-        EXPECT_EQ(text_of(soap_attr_value(&wire, c.list.c_str(), c.key)), text_of(c.value)) << c.list;
+    for (const auto &[list, key, value] : cases)
+        EXPECT_EQ(text_of(soap_attr_value(&wire, list.c_str(), key)), text_of(value)) << list;
     for (const char *const start : {"k=", "k=\""})
         EXPECT_EQ(text_of(soap_attr_value(&wire, (start + long_value).c_str(), "k")).size(),
                   SOAP_TEXT_SIZE - 1);
     EXPECT_EQ(soap_attr_value(&wire, nullptr, "k"), nullptr);
 }
-
-// --- lines ---
 
 struct line_result {
     int error;
@@ -121,30 +110,24 @@ TEST(recv_line, has_a_limit)
     EXPECT_EQ(read_line(x(8000) + "\r\n " + x(190) + "\r\n\r\n", size).error, SOAP_HEADER_LINE);
 }
 
-// --- responses ---
-
 constexpr char OK_HEAD[] = "HTTP/1.1 200 OK\r\n";
 
 TEST(response_head, takes_each_header_over)
 {
     // What a head leaves in a context, as far as it differs from what was there.
     const auto taken = [](const soap &c) {
-        const std::pair<const char *, std::string> members[] = {{"type", text_of(c.http_content)},
-                                                                {"action", text_of(c.action)},
-                                                                {"boundary", text_of(c.mime.boundary)},
-                                                                {"start", text_of(c.mime.start)},
-                                                                {"length", std::to_string(c.content_length)},
-                                                                {"in", std::to_string(c.zlib_in)},
-                                                                {"out", std::to_string(c.zlib_out)},
-                                                                {"realm", text_of(c.auth_realm)},
-                                                                {"user", text_of(c.auth_user)},
-                                                                {"password", text_of(c.auth_password)},
-                                                                {"endpoint", c.endpoint},
-                                                                {"for", text_of(c.forwarded_for)}};
         std::string all;
-        for (const auto &[name, value] : members)
-            if (value != "(null)" && value != "0" && (name != std::string("endpoint") || !value.empty()))
+        const auto add = [&all](const char *name, const std::string &value, const char *none = "(null)") {
+            if (value != none)
                 all += (all.empty() ? "" : " ") + (name + ("=" + value));
+        };
+        add("type", text_of(c.http_content)), add("action", text_of(c.action));
+        add("boundary", text_of(c.mime.boundary)), add("start", text_of(c.mime.start));
+        add("length", std::to_string(c.content_length), "0");
+        add("in", std::to_string(c.zlib_in), "0"), add("out", std::to_string(c.zlib_out), "0");
+        add("realm", text_of(c.auth_realm)), add("user", text_of(c.auth_user));
+        add("password", text_of(c.auth_password)), add("endpoint", c.endpoint, "");
+        add("for", text_of(c.forwarded_for));
         return all;
     };
     static const struct {
@@ -255,7 +238,7 @@ TEST(response_head, names_the_encoding_where_neither_the_document_nor_the_host_d
             text = place;
         else
             text = "!" + std::to_string(wire.error) + " " + text_of(*soap_fault_string_field(&wire));
-        EXPECT_NE(text.find(c.read + (*c.read == '!' ? 4 : 0)), std::string::npos) << c.type << ": " << text;
+        EXPECT_THAT(text, HasSubstr(c.read + (*c.read == '!' ? 4 : 0))) << c.type;
         EXPECT_EQ(text.substr(0, 3), std::string(c.read).substr(0, 3)) << c.type;
     }
 }

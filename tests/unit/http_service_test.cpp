@@ -1,12 +1,9 @@
 // http_service_test.cpp - the accepting side of HTTP: requests by their heads, and the heads of answers.
-//
 // Elsewhere: both in use (tests/service).
 #include "support/memory_wire.h"
 #include "support/testing.h"
 
 namespace {
-
-// --- requests ---
 
 struct accepting_wire : memory_wire {
     accepting_wire() : memory_wire(0, MODE_BUFFERED) {}
@@ -82,10 +79,7 @@ TEST(request, brings_its_credentials_and_a_clients_own_answer_does_not)
 TEST(credentials, are_wiped_when_they_are_forgotten)
 {
     static constexpr char ENCODED[] = "QWxhZGRpbjpvcGVuIHNlc2FtZQ==", PASSWORD[] = "open sesame";
-    static const struct {
-        const char *rule;
-        void (*bring)(accepting_wire &wire);
-    } cases[] = {
+    static const std::pair<const char *, void (*)(accepting_wire &)> cases[] = {
         {"received",
          [](accepting_wire &wire) {
              EXPECT_EQ(wire.request(std::string("POST / HTTP/1.1\r\nAuthorization: Basic ") + ENCODED +
@@ -106,28 +100,28 @@ TEST(credentials, are_wiped_when_they_are_forgotten)
         {"moved to another context",
          [](accepting_wire &wire) {
              accepting_wire other;
-             cases[0].bring(other);
+             cases[0].second(other);
              wire.auth_password = other.auth_password;
              soap_blocks_move(&other, &wire);
          }},
     };
-    for (const auto &c : cases) {
+    for (const auto &[rule, bring] : cases) {
         accepting_wire wire;
-        c.bring(wire);
-        ASSERT_STREQ(wire.auth_password, PASSWORD) << c.rule;
+        bring(wire);
+        ASSERT_STREQ(wire.auth_password, PASSWORD) << rule;
         wire.pool_limit = SOAP_POOL_LIMIT; // the block waits for its next use, and
         const char *const password = wire.auth_password;
         char freed[sizeof PASSWORD] = "never freed";
         failing_malloc::watch_free(password, freed, sizeof freed);
         soap_discard_all(&wire);
-        EXPECT_EQ(std::string(password, sizeof PASSWORD), std::string(sizeof PASSWORD, '\0')) << c.rule;
+        EXPECT_EQ(std::string(password, sizeof PASSWORD), std::string(sizeof PASSWORD, '\0')) << rule;
         wire.pool_limit = 0; // is freed
         soap_discard_all(&wire);
-        EXPECT_EQ(std::string(freed, sizeof freed), std::string(sizeof freed, '\0')) << c.rule;
+        EXPECT_EQ(std::string(freed, sizeof freed), std::string(sizeof freed, '\0')) << rule;
         const auto whole = [](const auto &text) { return std::string(text, sizeof text); };
         for (const std::string &place : {whole(wire.buffer), whole(wire.scratch_text)}) {
-            EXPECT_EQ(place.find(ENCODED), std::string::npos) << c.rule;
-            EXPECT_EQ(place.find(PASSWORD), std::string::npos) << c.rule;
+            EXPECT_EQ(place.find(ENCODED), std::string::npos) << rule;
+            EXPECT_EQ(place.find(PASSWORD), std::string::npos) << rule;
         }
     }
 }
@@ -147,15 +141,6 @@ TEST(request, that_waits_for_leave_gets_it)
     EXPECT_TRUE(response.sends.empty()); // a client gives no leave
 }
 
-TEST(request, of_http_1_0_gets_no_chunks)
-{
-    accepting_wire wire;
-    wire.output_mode = MODE_CHUNKED;
-    wire.receive("POST / HTTP/1.0\r\n\r\n");
-    EXPECT_EQ(http_read_head(&wire), 0);
-    EXPECT_EQ(wire.output_mode & MODE_IO_MASK, MODE_STORE);
-}
-
 TEST(request, informative_result_of_a_header_waits_for_the_end_of_the_head)
 {
     accepting_wire wire;
@@ -165,8 +150,6 @@ TEST(request, informative_result_of_a_header_waits_for_the_end_of_the_head)
     wire.on_form = [](soap *ctx) { return std::strcmp(ctx->http_content, "form") == 0 ? 0 : 1; };
     EXPECT_EQ(wire.request("POST / HTTP/1.1\r\nX: 1\r\nContent-Type: form\r\n\r\na=b"), SOAP_STOP);
 }
-
-// --- response heads out ---
 
 TEST(response_out, names_the_status)
 {

@@ -7,8 +7,6 @@
 
 namespace {
 
-// --- the pointer table ---
-
 void expect_empty_table(const soap &ctx)
 {
     for (const soap_pointer_record *head : ctx.pointer_table)
@@ -94,8 +92,6 @@ TEST(mark_pass, enters_an_object_once_and_then_knows_it_is_shared)
     EXPECT_EQ(poor.error, SOAP_OUT_OF_MEMORY);
     EXPECT_EQ(soap_mark_pointer(&poor, &single, 30), 0);
 }
-
-// --- the form in which an object is written ---
 
 enum style { LITERAL, ENCODED };
 enum pass { COUNT, SEND };
@@ -205,8 +201,6 @@ TEST_F(forms, an_independent_object_is_begun_once)
     EXPECT_EQ(ctx.encoding_flag, 0);
 }
 
-// --- the id table ---
-
 std::string id_of(std::size_t number)
 {
     return "#" + std::to_string(number);
@@ -246,8 +240,6 @@ TEST(id_table, many_ids_of_one_bucket_stay_cheap_and_are_never_mixed_up)
     soap_id_table_reset(&ctx);
     EXPECT_EQ(soap_id_type(&ctx, texts[0].c_str()), 0);
 }
-
-// --- registering and references ---
 
 struct pair_value {
     std::uint64_t one, two;
@@ -301,11 +293,7 @@ TEST_F(id_numbers, disagreement_and_repetition_are_errors)
         std::size_t size = sizeof(pair_value);
         soap_copy_hook hook = nullptr;
     };
-    const struct {
-        const char *rule;
-        step first, second;
-        int error;
-    } cases[] = {
+    const std::tuple<const char *, step, step, int> cases[] = {
         {"two objects", {PUT}, {PUT}, 24},
         {"copy of another type", {PUT}, {COPY, 21}, 26},
         {"copy of another size", {PUT}, {COPY, 20, 8}, 26},
@@ -316,8 +304,8 @@ TEST_F(id_numbers, disagreement_and_repetition_are_errors)
         {"object of another type than a pointer's", {REFER}, {PUT, 21}, 26},
         {"object of another size than a pointer's: allowed", {REFER}, {PUT, 20, 8}, 0},
     };
-    for (const auto &row : cases) {
-        SCOPED_TRACE(row.rule);
+    for (const auto &[rule, first, second, error] : cases) {
+        SCOPED_TRACE(rule);
         soap_id_table_reset(&ctx);
         ctx.error = 0;
         ctx.element_id[0] = '\0';
@@ -328,10 +316,10 @@ TEST_F(id_numbers, disagreement_and_repetition_are_errors)
                    : s.what == COPY ? copy("#i", &values[i], s.type, s.size, s.hook)
                                     : refer("#i", &places[i], s.type, s.size);
         };
-        EXPECT_NE(run(row.first, 0), nullptr);
-        EXPECT_EQ(run(row.second, 1) != nullptr, row.error == 0);
-        EXPECT_EQ(ctx.error, row.error);
-        EXPECT_STREQ(ctx.element_id, row.error != 0 ? "#i" : "");
+        EXPECT_NE(run(first, 0), nullptr);
+        EXPECT_EQ(run(second, 1) != nullptr, error == 0);
+        EXPECT_EQ(ctx.error, error);
+        EXPECT_STREQ(ctx.element_id, error != 0 ? "#i" : "");
     }
 }
 

@@ -3,7 +3,6 @@
 
 namespace {
 
-// What a call prints to standard error.
 std::string reported(const std::function<void()> &call)
 {
     testing::internal::CaptureStderr();
@@ -127,7 +126,7 @@ TEST_F(memory, frees_one_block_or_one_instance_by_address_and_then_all_with_the_
     int object = 0;
     soap_instance_register(&ctx, &object, 4, -1, note_destruction);
     soap_block_free(&ctx, first);
-    EXPECT_NE(reported([&] { tracked_free(&ctx, "c", 1, first); }).find("double free"), std::string::npos);
+    EXPECT_THAT(reported([&] { tracked_free(&ctx, "c", 1, first); }), HasSubstr("double free"));
     EXPECT_TRUE(destroyed.empty());
     soap_block_free(&ctx, &object);
     EXPECT_EQ(destroyed, std::vector<int>{4});

@@ -2,7 +2,6 @@
 #include <regex>
 
 #include "support/attachment_checks.h"
-#include "support/cpu_time.h"
 #include "support/host_streams.h"
 
 using namespace attachment_exchange;
@@ -24,8 +23,6 @@ std::string root(const std::string &body)
 
 constexpr char END[] = "\r\n--bb--";
 const std::string NO_REFERENCE = "!" + std::to_string(SOAP_MIME_HREF);
-
-// --- out ---
 
 TEST(mime_out, writes_heads_with_the_fields_that_are_set)
 {
@@ -68,21 +65,17 @@ TEST(mime_out, mtom_puts_an_include_in_the_element_and_brackets_around_the_id)
         memory_wire wire(0, SENDING | mode);
         ASSERT_EQ(send(wire, values), 0);
         const std::string sent = wire.sent(), two = begin + "\"cid:two%20\"" + end;
-        EXPECT_NE(sent.find(begin + "\"cid:id1\"" + end + two + two + "<data>Zmlyc3Q=</data>"),
-                  std::string::npos)
-            << sent;
-        EXPECT_NE(sent.find("\r\nContent-Type: image/png\r\nContent-Transfer-Encoding: binary\r\n"
-                            "Content-ID: <id1>\r\n\r\nfirst\r\n--"),
-                  std::string::npos)
-            << sent;
-        EXPECT_NE(sent.find("Content-ID: <two%20>"), std::string::npos) << sent;
+        EXPECT_THAT(sent, HasSubstr(begin + "\"cid:id1\"" + end + two + two + "<data>Zmlyc3Q=</data>"));
+        EXPECT_THAT(sent, HasSubstr("\r\nContent-Type: image/png\r\nContent-Transfer-Encoding: binary\r\n"
+                                    "Content-ID: <id1>\r\n\r\nfirst\r\n--"));
+        EXPECT_THAT(sent, HasSubstr("Content-ID: <two%20>"));
         const std::string both = "[cid:two%20 a/b " + second + "]";
         EXPECT_EQ(reception(sent, MODE_MTOM).summary(),
                   "[cid:id1 image/png first]" + both + both + "[(null) (null) first]");
     }
     memory_wire plain(0, SENDING | MODE_MTOM); // nothing to attach: no MIME
     ASSERT_EQ(send(plain, {make_value(first, nullptr, nullptr)}), 0);
-    EXPECT_EQ(plain.sent().find("--"), std::string::npos);
+    EXPECT_THAT(plain.sent(), Not(HasSubstr("--")));
 
     memory_wire wire; // an Include asked for by name takes the reference itself
     wire.mode = MODE_BUFFERED | MTOM;
@@ -107,8 +100,6 @@ TEST(mime_out, draws_boundaries_that_differ)
     }
     EXPECT_EQ(seen.size(), 100U);
 }
-
-// --- in ---
 
 TEST(mime_in, reads_part_heads)
 {
@@ -170,13 +161,8 @@ TEST(mime_in, takes_a_delimiter_at_every_place_around_the_end_of_the_buffer)
 
 TEST(mime_in, reports_what_is_wrong_with_a_message)
 {
-    struct wrong_case {
-        const char *rule;
-        std::string rest;
-        int error;
-    };
     const std::string a = part("Content-ID: <a>\r\n", "x");
-    const wrong_case cases[] = {
+    const std::tuple<const char *, std::string, int> cases[] = {
         {"good", a + END, 0},
         {"blanks after the boundary", "\r\n--bb \t\r\nContent-ID: <a>\r\n\r\nx\r\n--bb--", 0},
         {"epilogue", a + END + "\r\nepilogue", 0},
@@ -189,8 +175,8 @@ TEST(mime_in, reports_what_is_wrong_with_a_message)
          SOAP_HEADER_LINE},
         {"no such attachment", END, SOAP_DIME_HREF},
     };
-    for (const wrong_case &c : cases)
-        EXPECT_EQ(reception(root("<data href=\"cid:a\"/>") + c.rest).run(), c.error) << c.rule;
+    for (const auto &[rule, rest, error] : cases)
+        EXPECT_EQ(reception(root("<data href=\"cid:a\"/>") + rest).run(), error) << rule;
     const std::string endless = part(repeat_text("Content-ID: <a>\r\n", 1100), "x");
     EXPECT_EQ(reception(root("") + endless + END).run(), SOAP_MIME_ERROR);
 }
@@ -299,8 +285,6 @@ TEST(mime_in, survives_every_refused_allocation)
         part("Content-Disposition: x; name=b\r\nContent-Location: l\r\n", "") + END);
 }
 
-// --- references ---
-
 TEST(cid, means_an_id_in_several_spellings)
 {
     static const std::tuple<const char *, const char *, bool> cases[] = {
@@ -369,7 +353,6 @@ TEST(references, take_no_attachment_larger_than_a_value_can_hold)
     EXPECT_EQ(v.size, 0);
 }
 
-// What came with a part's description in place of options is no DIME options block.
 TEST(references, answered_by_a_part_go_out_in_a_record)
 {
     for (const char *description : {"", "d", "longer than it says"}) {
@@ -382,8 +365,6 @@ TEST(references, answered_by_a_part_go_out_in_a_record)
         EXPECT_EQ(reception(wire.sent()).summary(), "[cid:a (null) A]");
     }
 }
-
-// --- DIME and MIME alike ---
 
 constexpr std::uint32_t FORMS[] = {0, MTOM}; // of values: DIME, MTOM
 
@@ -441,7 +422,6 @@ TEST(values, over_one_buffer_go_out_each_in_its_form)
             }
 }
 
-// As the reader would: no receiver could tell which of them a reference means.
 TEST(attachments, of_one_id_are_refused_by_the_writer)
 {
     const std::string bytes = "some", others = "more";
@@ -454,39 +434,33 @@ TEST(attachments, of_one_id_are_refused_by_the_writer)
     };
     const value a = make_value(bytes, "cid:a", "a/b"), typed = make_value(bytes, "cid:a", "c/d"),
                 elsewhere = make_value(others, "cid:a", "a/b"), b = make_value(others, "cid:b", "a/b");
-    const struct {
-        const char *rule;
-        std::deque<value> values;
-        std::vector<const char *> ids; // of the host's own
-        std::uint32_t form;
-        int error;
-    } cases[] = {
-        {"different", {a, b}, {"c", nullptr, nullptr}, 0, 0},
-        {"different parts", {a, b}, {"<c>", nullptr, nullptr}, MTOM, 0},
-        {"one value twice", {a, a}, {}, 0, 0},
-        {"two types", {a, typed}, {}, 0, SOAP_DIME_ERROR},
-        {"two types in parts", {a, typed}, {}, MTOM, SOAP_MIME_ERROR},
-        {"two buffers", {a, elsewhere}, {}, MTOM, SOAP_MIME_ERROR},
-        {"a value's and the host's", {a, b}, {"b"}, 0, SOAP_DIME_ERROR},
-        {"a value's and the host's part", {a, b}, {"<b>"}, MTOM, SOAP_MIME_ERROR},
-        {"without the brackets", {a, b}, {"b"}, MTOM, SOAP_MIME_ERROR},
-        {"two of the host's", {a}, {"c", "c"}, 0, SOAP_DIME_ERROR},
-        {"two spellings of one id", {a}, {"<x@y>", "<x%40y>"}, MTOM, SOAP_MIME_ERROR},
-        {"the message's part", {a}, {"<root>"}, MTOM, SOAP_MIME_ERROR},
-    };
-    for (const auto &c : cases)
+    const std::tuple<const char *, std::deque<value>, std::vector<const char *>, std::uint32_t, int> cases[] =
+        {
+            {"different", {a, b}, {"c", nullptr, nullptr}, 0, 0},
+            {"different parts", {a, b}, {"<c>", nullptr, nullptr}, MTOM, 0},
+            {"one value twice", {a, a}, {}, 0, 0},
+            {"two types", {a, typed}, {}, 0, SOAP_DIME_ERROR},
+            {"two types in parts", {a, typed}, {}, MTOM, SOAP_MIME_ERROR},
+            {"two buffers", {a, elsewhere}, {}, MTOM, SOAP_MIME_ERROR},
+            {"a value's and the host's", {a, b}, {"b"}, 0, SOAP_DIME_ERROR},
+            {"a value's and the host's part", {a, b}, {"<b>"}, MTOM, SOAP_MIME_ERROR},
+            {"without the brackets", {a, b}, {"b"}, MTOM, SOAP_MIME_ERROR},
+            {"two of the host's", {a}, {"c", "c"}, 0, SOAP_DIME_ERROR},
+            {"two spellings of one id", {a}, {"<x@y>", "<x%40y>"}, MTOM, SOAP_MIME_ERROR},
+            {"the message's part", {a}, {"<root>"}, MTOM, SOAP_MIME_ERROR},
+        };
+    for (const auto &[rule, values, ids, form, error] : cases)
         for (const std::uint32_t framing : {MODE_BUFFERED, MODE_STORE, MODE_CHUNKED}) {
-            memory_wire wire(0, framing | MODE_BARE_XML | c.form);
-            if (c.form != 0)
+            memory_wire wire(0, framing | MODE_BARE_XML | form);
+            if (form != 0)
                 soap_mime_start(&wire, "bb", "<root>");
-            for (const char *id : c.ids)
-                attach(wire, c.form, id);
-            EXPECT_EQ(send(wire, c.values, framing != MODE_CHUNKED), c.error) << c.rule;
-            EXPECT_TRUE(c.error == 0 || framing == MODE_CHUNKED || wire.sent().empty()) << c.rule;
+            for (const char *id : ids)
+                attach(wire, form, id);
+            EXPECT_EQ(send(wire, values, framing != MODE_CHUNKED), error) << rule;
+            EXPECT_TRUE(error == 0 || framing == MODE_CHUNKED || wire.sent().empty()) << rule;
         }
 }
 
-// What the callbacks of the host do wrong, and that a stream once opened is closed.
 TEST(streams, of_the_host_that_misbehave_end_the_message)
 {
     static std::size_t excess;
@@ -547,7 +521,7 @@ TEST(streams, of_the_host_that_misbehave_end_the_message)
             EXPECT_EQ(source.closed, opened);
             char reported[1024] = "";
             soap_fault_print_text(&wire, reported, sizeof reported);
-            EXPECT_NE(std::string(reported).find(c.text), std::string::npos) << reported;
+            EXPECT_THAT(reported, HasSubstr(c.text));
             EXPECT_TRUE(c.error != 0 || std::ranges::count(wire.sent(), 'x') >= static_cast<long>(c.has));
         }
 }
@@ -555,36 +529,32 @@ TEST(streams, of_the_host_that_misbehave_end_the_message)
 TEST(streams, of_the_host_take_what_is_received_or_end_the_message)
 {
     const std::string bytes(5000, 's');
-    const struct {
-        const char *rule;
-        bool opens;
-        int refusal, error;
-    } cases[] = {{"takes it", true, 0, 0},
-                 {"refuses its bytes", true, 55, 55},
-                 {"opens nothing", false, 0, SOAP_USER_ERROR}};
+    const std::tuple<const char *, bool, int, int> cases[] = {{"takes it", true, 0, 0},
+                                                              {"refuses its bytes", true, 55, 55},
+                                                              {"opens nothing", false, 0, SOAP_USER_ERROR}};
     for (const std::uint32_t form : FORMS)
-        for (const auto &c : cases) {
-            SCOPED_TRACE(c.rule);
+        for (const auto &[rule, opens, refusal, error] : cases) {
+            SCOPED_TRACE(rule);
             memory_wire wire(0, SENDING | form);
             ASSERT_EQ(send(wire, {make_value(bytes, "cid:a", "a/b")}), 0);
             reception read(wire.sent(), form & MODE_MTOM, 7, 500);
             stream_host host;
             host.serve(*read.wire);
-            host.refusal = c.refusal;
-            if (!c.opens) {
+            host.refusal = refusal;
+            if (!opens) {
                 read.wire->dime_write_open = [](soap *, auto...) -> void * { return nullptr; };
                 read.wire->mime_write_open = [](soap *, auto...) -> void * { return nullptr; };
             }
-            EXPECT_EQ(read.run(), c.error);
+            EXPECT_EQ(read.run(), error);
             char reported[1024] = "";
             soap_fault_print_text(read.wire.get(), reported, sizeof reported);
-            const char *const reason = c.opens ? "" : "open callback gave null for \"";
-            EXPECT_NE(std::string(reported).find(reason), std::string::npos) << reported;
-            if (!c.opens)
+            const char *const reason = opens ? "" : "open callback gave null for \"";
+            EXPECT_THAT(reported, HasSubstr(reason));
+            if (!opens)
                 continue;
             const host_stream &target = host.of(form == 0 ? "a" : "<a>");
             EXPECT_EQ(target.closed, 1);
-            if (c.error == 0) {
+            if (error == 0) {
                 EXPECT_EQ(target.data, bytes);
                 EXPECT_EQ(static_cast<const void *>(read.values[0].content), &target);
                 EXPECT_EQ(read.values[0].size, 5000);
@@ -592,7 +562,6 @@ TEST(streams, of_the_host_take_what_is_received_or_end_the_message)
         }
 }
 
-// A whole HTTP request in each framing, read as its receiver would.
 TEST(http_exchange, carries_attachments_in_every_framing)
 {
     const std::string bytes = "some bytes";

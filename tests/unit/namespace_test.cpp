@@ -1,6 +1,5 @@
 // The namespace table's working copy and the prefixes in scope.
 
-#include "support/cpu_time.h"
 #include "support/writer_fixture.h"
 #include "xml/namespace.h"
 
@@ -25,9 +24,15 @@ std::string uri_of(soap *ctx, const char *name)
     return uri ? uri : "(none)";
 }
 
+class namespaces : public testing::Test {
+protected:
+    writer w;
+    soap *const ctx = w.ctx.get();
+};
+
 } // namespace
 
-TEST(namespaces, the_copy_is_made_once_and_sets_the_version)
+TEST(namespace_table, the_copy_is_made_once_and_sets_the_version)
 {
     static const soap_namespace soap12[] = {{"SOAP-ENV", SOAP12_ENVELOPE, nullptr, nullptr},
                                             {nullptr, nullptr, nullptr, nullptr}};
@@ -60,7 +65,7 @@ TEST(namespaces, the_copy_is_made_once_and_sets_the_version)
     EXPECT_EQ(ctx.soap_version, 2);
 }
 
-TEST(namespaces, an_encoding_style_from_the_table_does_not_outlive_it)
+TEST(namespace_table, an_encoding_style_from_the_table_does_not_outlive_it)
 {
     for (const bool received : {false, true}) {
         writer w;
@@ -79,14 +84,9 @@ TEST(namespaces, an_encoding_style_from_the_table_does_not_outlive_it)
     }
 }
 
-TEST(namespaces, a_declaration_is_bound_by_uri_pattern_or_what_was_received)
+TEST_F(namespaces, a_declaration_is_bound_by_uri_pattern_or_what_was_received)
 {
-    static const struct {
-        const char *rule;
-        const char *uri;
-        int row;
-        const char *received; // by row 0 afterwards
-    } steps[] = {
+    static const std::tuple<const char *, const char *, int, const char *> steps[] = {
         {"own", "http://schemas.xmlsoap.org/soap/envelope/", 0, nullptr},
         {"pattern", SOAP12_ENVELOPE, 0, SOAP12_ENVELOPE},
         {"received again", SOAP12_ENVELOPE, 0, SOAP12_ENVELOPE},
@@ -97,21 +97,17 @@ TEST(namespaces, a_declaration_is_bound_by_uri_pattern_or_what_was_received)
         {"longer than a row", "urn:ab", -1, "http://www.w3.org/1/soap-envelope"},
         {"empty", "", -1, "http://www.w3.org/1/soap-envelope"},
     };
-    writer w;
-    soap *ctx = w.ctx.get();
-    for (const auto &step : steps) {
-        SCOPED_TRACE(step.rule);
-        EXPECT_EQ(declare(ctx, "p", step.uri), step.row);
-        EXPECT_EQ(uri_of(ctx, "p:x"), step.uri);
+    for (const auto &[rule, uri, row, then_received] : steps) {
+        SCOPED_TRACE(rule);
+        EXPECT_EQ(declare(ctx, "p", uri), row);
+        EXPECT_EQ(uri_of(ctx, "p:x"), uri);
         const char *received = ctx->local_namespaces[0].received;
-        EXPECT_EQ(received ? std::string(received) : "", step.received ? step.received : "");
+        EXPECT_EQ(received ? std::string(received) : "", then_received ? then_received : "");
     }
 }
 
-TEST(namespaces, a_uri_received_over_and_over_is_kept_once)
+TEST_F(namespaces, a_uri_received_over_and_over_is_kept_once)
 {
-    writer w;
-    soap *ctx = w.ctx.get();
     ASSERT_EQ(declare(ctx, "e", SOAP12_ENVELOPE), 0);
     const char *kept = ctx->local_namespaces[0].received;
     const std::size_t allocations = failing_malloc::allocations();
@@ -128,11 +124,9 @@ TEST(namespaces, a_uri_received_over_and_over_is_kept_once)
     EXPECT_LE(failing_malloc::allocations() - allocations, 10U + 2 * records.size());
 }
 
-TEST(namespaces, inner_declarations_hide_outer_ones_until_their_element_ends)
+TEST_F(namespaces, inner_declarations_hide_outer_ones_until_their_element_ends)
 {
-    writer w;
-    soap *ctx = w.ctx.get();
-    const auto expect = [ctx](const char *named, const char *unnamed) {
+    const auto expect = [this](const char *named, const char *unnamed) {
         EXPECT_EQ(uri_of(ctx, "p:x"), named);
         EXPECT_EQ(uri_of(ctx, "x"), unnamed);
     };
@@ -156,10 +150,8 @@ TEST(namespaces, inner_declarations_hide_outer_ones_until_their_element_ends)
     EXPECT_EQ(ctx->error, SOAP_NAMESPACE_ERROR);
 }
 
-TEST(namespaces, many_prefixes_in_scope_are_found_fast_and_bounded)
+TEST_F(namespaces, many_prefixes_in_scope_are_found_fast_and_bounded)
 {
-    writer w;
-    soap *ctx = w.ctx.get();
     for (std::uint32_t i = 0; i < SOAP_PREFIXES_MAX; ++i)
         ASSERT_EQ(declare(ctx, ("p" + std::to_string(i)).c_str(), ("urn:" + std::to_string(i)).c_str()), -1);
     EXPECT_EQ(soap_prefix_push_in(ctx, "more", "urn:more"), nullptr);
@@ -174,10 +166,8 @@ TEST(namespaces, many_prefixes_in_scope_are_found_fast_and_bounded)
     EXPECT_EQ(xml_prefix_find(ctx, "p777"), nullptr);
 }
 
-TEST(namespaces, texts_of_any_length_are_kept)
+TEST_F(namespaces, texts_of_any_length_are_kept)
 {
-    writer w;
-    soap *ctx = w.ctx.get();
     for (const std::size_t length : {1U, 100U, 60000U, 126U, 127U, 128U, 1U, 60000U}) {
         ctx->nesting_level = 1;
         const std::string prefix(length, 'p');
@@ -190,7 +180,7 @@ TEST(namespaces, texts_of_any_length_are_kept)
     EXPECT_EQ(ctx->error, SOAP_LENGTH);
 }
 
-TEST(namespaces, a_prefix_that_waits_for_its_declaration_is_forgotten_with_the_message)
+TEST(namespace_table, a_prefix_that_waits_for_its_declaration_is_forgotten_with_the_message)
 {
     writer w(MODE_CANONICAL);
     soap *ctx = w.ctx.get();

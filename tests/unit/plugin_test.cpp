@@ -21,7 +21,6 @@ int refuse_copy(soap *, soap_plugin_record *, soap_plugin_record *)
     return SOAP_PLUGIN_ERROR;
 }
 
-// What a plug-in of the tests wants to be; its address is the argument of the registration.
 struct wanted {
     const char *id;
     const char *data;

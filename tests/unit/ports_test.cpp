@@ -14,8 +14,6 @@ namespace {
 
 constexpr char OTHER_PLACE[] = "http://other.example/place";
 
-// --- one operation ---
-
 struct outcome {
     int error;
     bool answered; // the response record was filled
@@ -26,8 +24,7 @@ struct operation {
     int request_id, response_id;
     std::unique_ptr<call_wire> wire = std::make_unique<call_wire>(); // outlives the context
     std::shared_ptr<soap> ctx = {};
-    // A call with the row's request; by the full form if there is an action, with no response record if
-    // asked.
+    // A call with the row's request; by the full form if there is an action, with no response record if asked.
     std::function<outcome(const operation &own, const char *action, bool reads)> call = {};
     std::string answer_content = {};
     std::function<void()> expect_answer = {}; // the response holds what answer_content says
@@ -35,7 +32,6 @@ struct operation {
     std::string tag() const { return "protocol" + port + ":" + name; }
     golden::message golden() const { return golden::read(port, name); }
 
-    // The connection from now on, with one answer.
     void connect(std::string answer)
     {
         wire->carry(*ctx);
@@ -69,8 +65,7 @@ template <class R> R *request_of(const operation &row, soap *ctx)
     return request;
 }
 
-// --- answers, by class of the response; "p" is the port's prefix, "c" the common one ---
-
+// Answers, by class of the response; "p" is the port's prefix, "c" the common one.
 template <class R> std::string content_of(const R *)
 {
     return "<p:thisURI>urn:1</p:thisURI><p:state>closed</p:state><c:contact><c:name>Ada</c:name></c:contact>"
@@ -115,7 +110,6 @@ __attribute__((no_sanitize("undefined"))) int call_one_way(P &proxy, int (P::*sh
     return (proxy.*short_form)(request, *nowhere);
 }
 
-// An operation of a proxy.
 template <class P, class R, class S>
 operation proxy_row(operation row, int (P::*short_form)(R *, S &),
                     int (P::*full_form)(const char *, const char *, R *, S &))
@@ -135,7 +129,6 @@ operation proxy_row(operation row, int (P::*short_form)(R *, S &),
     return row;
 }
 
-// An operation of the port without a proxy.
 template <class W, class S> operation host_row(operation row)
 {
     using response_class = std::remove_pointer_t<decltype(S::result)>;
@@ -154,8 +147,6 @@ template <class W, class S> operation host_row(operation row)
     set_answer(row, response);
     return row;
 }
-
-// --- the rows ---
 
 std::vector<operation> all_rows()
 {

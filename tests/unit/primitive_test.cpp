@@ -43,12 +43,7 @@ template <auto Read> bool reads(soap *ctx, const char *type)
 // Each reader with the types that it takes besides its own, and one that it must refuse.
 TEST_F(elements, accept_the_types_that_fit_their_reader)
 {
-    const struct {
-        const char *own;
-        bool (*read)(soap *, const char *own);
-        const char *refused;
-        std::string also; // local names
-    } cases[] = {
+    const std::tuple<const char *, bool (*)(soap *, const char *own), const char *, std::string> cases[] = {
         {"xsd:byte", reads<soap_byte_in>, "short", "byte"},
         {"xsd:short", reads<soap_short_in>, "int", "short byte"},
         {"xsd:int", reads<soap_int_in>, "long", "int"},
@@ -67,16 +62,16 @@ TEST_F(elements, accept_the_types_that_fit_their_reader)
          "long int short byte unsignedLong unsignedInt unsignedShort unsignedByte"},
         {"xsd:double", reads<soap_double_in>, "boolean", "float double decimal unsignedByte"},
     };
-    for (const auto &row : cases) {
-        std::istringstream names(row.also);
+    for (const auto &[own, read, refused, also] : cases) {
+        std::istringstream names(also);
         for (std::string name; names >> name;) {
             receive("<v xsi:type=\"s:" + name + "\">12</v>");
-            EXPECT_TRUE(row.read(&ctx, row.own) && at_last()) << row.own << " from " << name;
+            EXPECT_TRUE(read(&ctx, own) && at_last()) << own << " from " << name;
         }
-        receive("<v xsi:type=\"s:" + std::string(row.refused) + "\">12</v>");
-        EXPECT_FALSE(row.read(&ctx, row.own)) << row.own << " from " << row.refused;
+        receive("<v xsi:type=\"s:" + std::string(refused) + "\">12</v>");
+        EXPECT_FALSE(read(&ctx, own)) << own << " from " << refused;
         EXPECT_EQ(ctx.error, SOAP_TYPE_MISMATCH);
-        EXPECT_TRUE(row.read(&ctx, nullptr) && at_last())
+        EXPECT_TRUE(read(&ctx, nullptr) && at_last())
             << "the element was given back, and no type accepts any";
     }
     receive("<v xsi:type=\"s:dateTime\">2009-02-13T23:31:30Z</v>");
@@ -177,15 +172,9 @@ TEST_F(elements, array_types_may_be_any_type)
     }
 }
 
-// --- QNames ---
-
 TEST_F(elements, q_names_are_mapped_to_the_table)
 {
-    const struct {
-        const char *rule;
-        const char *text;
-        const char *mapped;
-    } cases[] = {
+    const std::tuple<const char *, const char *, const char *> cases[] = {
         {"the table's prefix", "p:x", "a:x"},
         {"a row for other names of a namespace", "q:x", "\"urn:b\":x"},
         {"not in the table", "u:x", "\"urn:u\":x"},
@@ -199,12 +188,12 @@ TEST_F(elements, q_names_are_mapped_to_the_table)
     const std::string declared =
         " xmlns:p=\"urn:a\" xmlns:q=\"urn:b\" xmlns:u=\"urn:u\" xmlns:\xC3\xA9=\"urn:a\""
         " xmlns:u\xC3\xA9=\"urn:\xC3\xA9\" xmlns:\xD0\xB6=\"urn:a\"";
-    for (const auto &row : cases) {
+    for (const auto &[rule, text, expected] : cases) {
         receive("<e" + declared + "></e>");
         ASSERT_EQ(soap_element_in_begin(&ctx, "e", 0, nullptr), 0);
         char *mapped = nullptr;
-        EXPECT_EQ(soap_qname_read_map(&ctx, row.text, &mapped, -1, -1), 0);
-        EXPECT_STREQ(mapped, row.mapped) << row.rule;
+        EXPECT_EQ(soap_qname_read_map(&ctx, text, &mapped, -1, -1), 0);
+        EXPECT_STREQ(mapped, expected) << rule;
     }
     // Of a message, whatever its prefixes: the rest of a word is a string like any other.
     receive("<e" + declared + ">\xC3\xA9:\xC3\xA9 \xD0\xB6:\xD0\xB6 u\xC3\xA9:x</e>");
@@ -252,8 +241,6 @@ TEST_F(elements, q_names_go_out_under_the_prefixes_of_the_table)
     EXPECT_EQ(soap_qname_write_map(&ctx, nullptr), nullptr);
 }
 
-// --- tables ---
-
 TEST_F(elements, tables_of_names_are_searched_exactly)
 {
     const soap_code_row table[] = {{1, "one"}, {2, "two"}, {4, "four"}, {6, "both"}, {0, nullptr}};
@@ -274,15 +261,9 @@ TEST_F(elements, tables_of_names_are_searched_exactly)
     EXPECT_EQ(soap_flags_to_names(&ctx, wide, 3), (lengthy + " " + lengthy).substr(0, SOAP_TEXT_SIZE - 1));
 }
 
-// --- arrays ---
-
 TEST_F(elements, array_sizes_multiply_within_their_bound)
 {
-    const struct {
-        const char *text;
-        int dimensions, product;
-        int first, second; // 99 where no size was stored
-    } cases[] = {
+    const std::tuple<const char *, int, int, int, int> cases[] = {
         {"[5]", 1, 5, 5, 99},
         {"[2,3]", 2, 6, 2, 3},
         {"2 3", 2, 6, 2, 3},
@@ -296,30 +277,28 @@ TEST_F(elements, array_sizes_multiply_within_their_bound)
         {"[1001,1000]", 2, -1, 99, 1000},
         {"[99999999999999999999]", 1, -1, 99, 99},
     };
-    for (const auto &row : cases) {
+    // first: 99 where no size was stored
+    for (const auto &[text, dimensions, product, first, second] : cases) {
         int sizes[2] = {99, 99};
-        EXPECT_EQ(soap_array_dims_parse(row.text, sizes, row.dimensions), row.product) << row.text;
-        EXPECT_EQ(sizes[0], row.first) << row.text;
-        EXPECT_EQ(sizes[1], row.second) << row.text;
+        EXPECT_EQ(soap_array_dims_parse(text, sizes, dimensions), product) << text;
+        EXPECT_EQ(sizes[0], first) << text;
+        EXPECT_EQ(sizes[1], second) << text;
     }
 }
 
 TEST_F(elements, offsets_count_from_the_start_of_the_array)
 {
-    const struct {
-        const char *text, *offset_text;
-        int rest, offset;
-    } cases[] = {
+    const std::tuple<const char *, const char *, int, int> cases[] = {
         {"[5]", "", 5, 0},         {"[5]", "[2]", 3, 2},
         {"[2,3]", "[1,1]", 2, 4},  {"2 3", "", 6, 0},
         {"[5]", nullptr, 5, 0},    {"[x]", "", -1, 99},
         {"[5]", "[-1]", -1, 99},   {"[2,]", "", -1, 99},
         {"[1000001]", "", -1, 99}, {"[5]", "[99999999999]", -1, 99},
     };
-    for (const auto &row : cases) {
+    for (const auto &[text, offset_text, expected_rest, expected_offset] : cases) {
         int offset = 99;
-        EXPECT_EQ(soap_array_dims_offset_parse(row.text, row.offset_text, &offset), row.rest) << row.text;
-        EXPECT_EQ(offset, row.offset) << row.text;
+        EXPECT_EQ(soap_array_dims_offset_parse(text, offset_text, &offset), expected_rest) << text;
+        EXPECT_EQ(offset, expected_offset) << text;
     }
     const struct {
         const char *text;

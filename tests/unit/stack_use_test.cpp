@@ -1,7 +1,5 @@
 // stack_use_test.cpp - what one nesting level of a document costs of the stack, when reading and when
-// writing.
-//
-// Meaningful in an optimised build only: others are skipped.
+// writing. Meaningful in an optimised build only: others are skipped.
 #include <pthread.h>
 #include <sys/mman.h>
 
@@ -38,7 +36,6 @@ std::size_t stack_used_by(std::function<void()> work)
     return static_cast<std::size_t>(end - deepest);
 }
 
-// Sends the request, which is answered by `content`.
 int set(protocolProfile__ProfileContent &request, const std::string &content)
 {
     profile_call call(0);
@@ -47,7 +44,6 @@ int set(protocolProfile__ProfileContent &request, const std::string &content)
     return call.proxy.set(&request, call.held);
 }
 
-// A level more costs no more than the limit.
 void expect_bounded(const char *rule, const std::function<void(std::size_t)> &with_levels)
 {
 #if defined(ZUV_SANITIZED) || !defined(__OPTIMIZE__)

@@ -1,7 +1,5 @@
-// tcp_test.cpp - stream sockets of a context against peers on the loopback.
-//
-// Elsewhere: datagrams, proxies and the accepting side (tcp_service_test.cpp).
-#include <fcntl.h>
+// tcp_test.cpp - stream sockets of a context against peers on the loopback. Elsewhere: datagrams, proxies and
+// the accepting side (tcp_service_test.cpp).
 #include <netinet/tcp.h>
 #include <optional>
 
@@ -42,8 +40,6 @@ struct pipe_ends {
     int ends[2];
 };
 
-// --- connecting ---
-
 TEST_F(tcp, options_are_set_on_a_connected_socket)
 {
     const peer server(wait_for_end);
@@ -74,19 +70,16 @@ TEST_F(tcp, options_are_set_on_a_connected_socket)
 
 TEST_F(tcp, sockets_block_unless_a_transfer_has_a_limit)
 {
-    static const struct {
-        int connect, send, recv;
-        bool blocking;
-    } cases[] = {{0, 0, 0, true}, {5, 0, 0, true}, {0, 5, 0, false}, {0, 0, -5, false}, {5, 5, 5, false}};
-    for (const auto &c : cases) {
+    static const std::tuple<int, int, int, bool> cases[] = {
+        {0, 0, 0, true}, {5, 0, 0, true}, {0, 5, 0, false}, {0, 0, -5, false}, {5, 5, 5, false}};
+    for (const auto &[connect, send, recv, blocking] : cases) {
         const peer server(wait_for_end);
         context ctx;
-        ctx->connect_timeout = c.connect;
-        ctx->send_timeout = c.send;
-        ctx->recv_timeout = c.recv;
+        ctx->connect_timeout = connect;
+        ctx->send_timeout = send;
+        ctx->recv_timeout = recv;
         ASSERT_GE(open_to(ctx, server.port()), 0);
-        EXPECT_EQ((fcntl(ctx->socket, F_GETFL) & O_NONBLOCK) == 0, c.blocking)
-            << c.connect << c.send << c.recv;
+        EXPECT_EQ((fcntl(ctx->socket, F_GETFL) & O_NONBLOCK) == 0, blocking) << connect << send << recv;
     }
 }
 
@@ -256,8 +249,6 @@ TEST_F(tcp, a_new_connection_closes_the_old_one_through_the_hook)
     }
 }
 
-// --- waiting ---
-
 TEST_F(tcp, wait_reports_what_is_ready_and_refuses_large_descriptors)
 {
     for (const int with_poll : {0, 1}) {
@@ -310,8 +301,6 @@ TEST_F(tcp, a_descriptor_that_select_cannot_serve_is_no_connection)
         close(descriptor);
 }
 
-// --- bytes ---
-
 TEST_F(tcp, a_receive_gives_up_after_so_many_false_alarms_but_not_for_signals)
 {
     const peer server([](int client) {
@@ -326,8 +315,6 @@ TEST_F(tcp, a_receive_gives_up_after_so_many_false_alarms_but_not_for_signals)
     socket_calls::fail_recv = {150, EINTR};
     EXPECT_EQ(receive(ctx), "x");
 }
-
-// --- time limits ---
 
 constexpr int LIMIT_S = 1;
 constexpr socket_calls::interruption SIGNALS{100, 200000}; // each a fifth of the limit after the last
@@ -474,8 +461,6 @@ TEST_F(tcp, a_stream_that_fails_is_an_error_even_if_it_throws)
     }
 }
 
-// --- the end ---
-
 TEST_F(tcp, no_connection_is_as_good_as_a_quiet_one_and_a_listening_context_has_none_to_serve)
 {
     context ctx;
@@ -486,29 +471,26 @@ TEST_F(tcp, no_connection_is_as_good_as_a_quiet_one_and_a_listening_context_has_
 
 TEST_F(tcp, release_keeps_or_closes_by_the_keep_alive_rule)
 {
-    static const struct {
-        int error;
-        std::int16_t keep_alive;
-        bool unfinished, kept;
-    } cases[] = {{0, 1, false, true},   {0, -1, false, true},  {0, 0, false, false},  {0, 1, true, false},
-                 {-1, 1, false, false}, {28, 1, false, false}, {30, 1, false, false}, {12, 1, false, true},
-                 {3, 1, false, true},   {3, 1, true, false}};
-    for (const auto &c : cases) {
-        SCOPED_TRACE(testing::PrintToString(std::tuple(c.error, c.keep_alive, c.unfinished)));
+    static const std::tuple<int, std::int16_t, bool, bool> cases[] = {
+        {0, 1, false, true},   {0, -1, false, true},  {0, 0, false, false},  {0, 1, true, false},
+        {-1, 1, false, false}, {28, 1, false, false}, {30, 1, false, false}, {12, 1, false, true},
+        {3, 1, false, true},   {3, 1, true, false}};
+    for (const auto &[error, keep_alive, unfinished, stays] : cases) {
+        SCOPED_TRACE(testing::PrintToString(std::tuple(error, keep_alive, unfinished)));
         const peer server(wait_for_end);
         connected ctx(server.port());
-        ctx->error = c.error;
-        ctx->keep_alive = c.keep_alive;
-        ctx->response_unfinished = c.unfinished;
+        ctx->error = error;
+        ctx->keep_alive = keep_alive;
+        ctx->response_unfinished = unfinished;
         soap_attachment *const part =
             soap_attachment_add(ctx.get(), &ctx->dime.list, &ctx->dime.last, nullptr, 0);
         ctx->mime.list = ctx->mime.last = part;
-        EXPECT_EQ(soap_socket_release(ctx.get()), c.error);
+        EXPECT_EQ(soap_socket_release(ctx.get()), error);
         for (const soap_attachment *kept : {ctx->dime.list, ctx->dime.last, ctx->mime.list, ctx->mime.last})
-            EXPECT_EQ(kept, c.error == 0 ? part : nullptr);
-        EXPECT_EQ(ctx->error, c.error);
-        EXPECT_EQ(ctx->socket != -1, c.kept);
-        EXPECT_EQ(ctx->keep_alive, c.kept ? c.keep_alive : 0);
+            EXPECT_EQ(kept, error == 0 ? part : nullptr);
+        EXPECT_EQ(ctx->error, error);
+        EXPECT_EQ(ctx->socket != -1, stays);
+        EXPECT_EQ(ctx->keep_alive, stays ? keep_alive : 0);
         EXPECT_FALSE(ctx->response_unfinished);
     }
 }
@@ -530,10 +512,7 @@ TEST_F(tcp, hooks_may_refuse_the_release)
 
 TEST_F(tcp, socket_errors_have_texts_by_their_mode)
 {
-    static const struct {
-        int mode, value, recv, send;
-        const char *text;
-    } cases[] = {
+    static const std::tuple<int, int, int, int, const char *> cases[] = {
         {1, 0, 0, 0, "WSAStartup failed"},
         {2, 1, 0, 0, "Host not found"},
         {2, 4, 0, 0, "No Data"},
@@ -545,12 +524,12 @@ TEST_F(tcp, socket_errors_have_texts_by_their_mode)
         {0, 0, 0, INT_MIN, "Operation interrupted or timed out (2147483648us send delay)"},
     };
     context ctx;
-    for (const auto &c : cases) {
-        ctx->error_mode = c.mode;
-        ctx->errno_value = c.value;
-        ctx->recv_timeout = c.recv;
-        ctx->send_timeout = c.send;
-        EXPECT_STREQ(tcp_error_text(ctx.get()), c.text);
+    for (const auto &[mode, value, recv, send, text] : cases) {
+        ctx->error_mode = mode;
+        ctx->errno_value = value;
+        ctx->recv_timeout = recv;
+        ctx->send_timeout = send;
+        EXPECT_STREQ(tcp_error_text(ctx.get()), text);
     }
 }
 

@@ -1,9 +1,6 @@
 // threads_test.cpp - proxies on threads of their own: no call takes another's answer, and nothing that they
-// share is written without order.
-//
-// In an ordinary build this looks at the answers; the preset "tsan" looks at the memory as well.
-#include <atomic>
-#include <thread>
+// share is written without order. In an ordinary build this looks at the answers; the preset "tsan" looks at
+// the memory as well.
 
 #include "support/scripted_client.h"
 #include "support/socket_calls.h"
@@ -15,8 +12,6 @@ using namespace scripted;
 constexpr int THREADS = 8;
 constexpr int CALLS = 40; // of each thread
 constexpr int ANEW = 10;  // one call in so many goes over a new connection
-
-// --- a plug-in that counts what its contexts receive ---
 
 const char COUNTER[] = "receive-counter";
 
@@ -62,9 +57,6 @@ int share_and_note(soap *ctx, soap_plugin_record *record, void *argument)
     return share(ctx, record, argument);
 }
 
-// --- the threads ---
-
-// Runs in each thread, at the same time as in all the others.
 void on_threads(const std::function<void()> &work)
 {
     std::atomic<int> missing = THREADS; // outlives the threads, which its end would not wait for

@@ -1,6 +1,5 @@
 // tls_identity_test.cpp - which certificates are accepted: a table of certificates by flags, under TLS 1.2
 // and 1.3. The outcome of a connection is one letter.
-#include <openssl/ssl.h>
 #include <regex>
 
 #include "net/tls_connection.h"
@@ -47,7 +46,7 @@ struct row {
     kind made = kind::issued;
 };
 
-constexpr long EXPIRED = -DAY;
+constexpr long PAST = -DAY;
 
 const row ROWS[] = {
     {"common name", {"peer.test", ""}, "peer.test", "............"},
@@ -79,16 +78,12 @@ const row ROWS[] = {
     {"address in the common name", {"127.0.0.1", ""}, "127.0.0.1", "....M.M....M"},
     {"address as a name", {"", "DNS:127.0.0.1"}, "127.0.0.1", ".M.MM.MMM..M"},
     {"wildcard for an address", {"*.0.0.1", ""}, "127.0.0.1", ".M.MM.MMM..M"},
-    {"expired",
-     {"peer.test", "", 2 * EXPIRED, EXPIRED},
-     "peer.test",
-     ".RR.RR.RRRRR",
-     "certificate has expired"},
-    {"expired, wrong name", {"other.test", "", 2 * EXPIRED, EXPIRED}, "peer.test", ".RRMRRMRRRRR"},
+    {"expired", {"peer.test", "", 2 * PAST, PAST}, "peer.test", ".RR.RR.RRRRR", "certificate has expired"},
+    {"expired, wrong name", {"other.test", "", 2 * PAST, PAST}, "peer.test", ".RRMRRMRRRRR"},
     {"not yet valid", {"x", "", DAY, 2 * DAY}, "peer.test", ".RRRRRRRRRRR", "certificate is not yet valid"},
     {"self-signed", {"x", ""}, "peer.test", ".RRRRRRRRRRR", "self-signed certificate", kind::self_signed},
     {"revoked", {"x", ""}, "peer.test", ".RRRRRRRRRRR", "certificate revoked", kind::revoked},
-    {"revoked, expired", {"x", "", 2 * EXPIRED, EXPIRED}, "peer.test", ".RRRRRRRRRRR", "", kind::revoked},
+    {"revoked, expired", {"x", "", 2 * PAST, PAST}, "peer.test", ".RRRRRRRRRRR", "", kind::revoked},
     {"no certificate", {}, "peer.test", ".N.NN.NNN.NN", "", kind::none},
 };
 
@@ -104,7 +99,6 @@ server_context anonymous_context()
     return made;
 }
 
-// How the fault's detail begins.
 std::string detail_of(const row &r, char outcome)
 {
     if (outcome == 'R')

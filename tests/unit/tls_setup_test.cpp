@@ -1,7 +1,6 @@
 // tls_setup_test.cpp - the set-up of TLS, and the library's own server side.
 #include <future>
 #include <openssl/err.h>
-#include <openssl/ssl.h>
 
 #include "support/socket_calls.h"
 #include "support/tls_peer.h"
@@ -12,19 +11,12 @@ using namespace tls_peers;
 
 class tls_setup : public tls_test {};
 
-const subject BY_NAME{"peer.test", ""};
-
-// --- set-up ---
-
 TEST_F(tls_setup, a_set_up_that_fails_says_why_and_leaves_no_context)
 {
     const std::string junk = ca().write("junk.pem", [](std::FILE *file) { std::fputs("junk\n", file); });
     const std::string lone = ca().ca_file(); // a certificate without a key
     const std::string why = ": No such file or directory";
-    const struct {
-        const char *key, *ca, *dh, *random;
-        std::string detail;
-    } cases[] = {
+    const std::tuple<const char *, const char *, const char *, const char *, std::string> cases[] = {
         {nullptr, "/nonexistent", nullptr, nullptr, "Can't read CA file: /nonexistent" + why},
         {nullptr, junk.c_str(), nullptr, nullptr, "Can't read CA file: " + junk},
         {"/nonexistent", nullptr, nullptr, nullptr, "Can't read certificate key file: /nonexistent" + why},
@@ -35,13 +27,13 @@ TEST_F(tls_setup, a_set_up_that_fails_says_why_and_leaves_no_context)
         {nullptr, nullptr, junk.c_str(), nullptr, "Can't set DH parameters"},
         {nullptr, nullptr, "8193", nullptr, "Can't set DH parameters"},
     };
-    for (const auto &c : cases) {
+    for (const auto &[key, ca, dh, random, detail] : cases) {
         context ctx;
-        EXPECT_EQ(soap_ssl_server_context(ctx.get(), TLS_NO_DEFAULT_CA, c.key, nullptr, c.ca, nullptr, c.dh,
-                                          c.random, nullptr),
+        EXPECT_EQ(soap_ssl_server_context(ctx.get(), TLS_NO_DEFAULT_CA, key, nullptr, ca, nullptr, dh, random,
+                                          nullptr),
                   SOAP_TLS_ERROR);
         EXPECT_EQ(ctx.fault_text(), "SSL/TLS error");
-        EXPECT_EQ(ctx.fault_detail(), c.detail);
+        EXPECT_EQ(ctx.fault_detail(), detail);
         EXPECT_EQ(ctx->tls_context, nullptr);
     }
     context ctx;
@@ -80,13 +72,7 @@ TEST_F(tls_setup, new_rules_take_force_at_the_next_call_of_the_context_that_has_
 {
     const subject expired{"peer.test", "", -2 * DAY, -DAY};
     const std::string trusted = ca().ca_file();
-    const struct {
-        const char *rule;
-        const subject &server;
-        unsigned first_flags, second_flags;
-        const char *second_ca;
-        int set_up, code;
-    } cases[] = {
+    const std::tuple<const char *, const subject &, unsigned, unsigned, const char *, int, int> cases[] = {
         {"the same", BY_NAME, VERIFIED, VERIFIED, trusted.c_str(), 0, 0},
         {"expired certificates are refused again", expired, VERIFIED | TLS_ALLOW_EXPIRED, VERIFIED,
          trusted.c_str(), 0, SOAP_TLS_ERROR},
@@ -94,29 +80,29 @@ TEST_F(tls_setup, new_rules_take_force_at_the_next_call_of_the_context_that_has_
         {"the set-up fails", BY_NAME, VERIFIED, VERIFIED, "/nonexistent", SOAP_TLS_ERROR, SOAP_TLS_ERROR},
     };
     for (const int version : {TLS1_2_VERSION, TLS1_3_VERSION}) {
-        for (const auto &c : cases) {
-            SCOPED_TRACE(std::string(c.rule) + (version == TLS1_2_VERSION ? ", 1.2" : ", 1.3"));
+        for (const auto &[rule, who, first_flags, second_flags, second_ca, set_up, code] : cases) {
+            SCOPED_TRACE(std::string(rule) + (version == TLS1_2_VERSION ? ", 1.2" : ", 1.3"));
             std::vector<int> resumed;
             {
-                tls_peer server(server_for(c.server, version), noting(resumed, answer_each), 10);
+                tls_peer server(server_for(who, version), noting(resumed, answer_each), 10);
                 context ctx(MODE_KEEP_ALIVE);
-                ASSERT_EQ(set_up_client(ctx, c.first_flags), 0);
+                ASSERT_EQ(set_up_client(ctx, first_flags), 0);
                 EXPECT_EQ(get(ctx.get(), server.port()), 0) << ctx.fault_text();
                 EXPECT_EQ(get(ctx.get(), server.port()), 0);
                 soap copy(*ctx.get());
-                EXPECT_EQ(soap_ssl_client_context(ctx.get(), static_cast<std::uint16_t>(c.second_flags),
-                                                  nullptr, nullptr, c.second_ca, nullptr, nullptr),
-                          c.set_up);
+                EXPECT_EQ(soap_ssl_client_context(ctx.get(), static_cast<std::uint16_t>(second_flags),
+                                                  nullptr, nullptr, second_ca, nullptr, nullptr),
+                          set_up);
                 EXPECT_EQ(ctx->socket, -1) << "the kept connection is closed";
-                EXPECT_EQ(get(ctx.get(), server.port()), c.code);
+                EXPECT_EQ(get(ctx.get(), server.port()), code);
                 tcp_disconnect(ctx.get());
                 copy.keep_alive = 0;
                 EXPECT_EQ(get(&copy, server.port()), 0) << "made before, it keeps the rules that it had";
                 tcp_disconnect(&copy);
-                ASSERT_EQ(set_up_client(ctx, c.first_flags), 0);
+                ASSERT_EQ(set_up_client(ctx, first_flags), 0);
                 EXPECT_EQ(get(ctx.get(), server.port()), 0);
             }
-            EXPECT_EQ(resumed, std::vector<int>(c.code == 0 ? 4 : 3, 0));
+            EXPECT_EQ(resumed, std::vector<int>(code == 0 ? 4 : 3, 0));
         }
     }
 }
@@ -227,9 +213,6 @@ TEST_F(tls_setup, the_password_callback_needs_room_for_the_terminator)
     EXPECT_EQ(tls_password_callback(buffer, 5, 0, nullptr), 0);
 }
 
-// --- the server side of the library ---
-
-// Sets up a server on a free port; its port.
 int listen_with(context &service, const std::string &pair, unsigned flags = TLS_NO_DEFAULT_CA,
                 const char *trusted = nullptr, const char *dh = nullptr)
 {
@@ -278,11 +261,8 @@ TEST_F(tls_setup, a_client_certificate_is_asked_for_and_verified)
     const certificates::certificate own =
         certificates::make(client_name, client_key.get(), nullptr, client_key.get(), 7);
     const std::string unknown = ca().write_pair("unknown.pem", own.get(), client_key.get());
-    const struct {
-        const char *pair, *password;
-        bool accepted, by_host; // by_host: whose own verification lets everyone in
-        const char *detail;     // of the fault
-    } cases[] = {
+    // The fourth: the host's own verification lets everyone in.
+    const std::tuple<const char *, const char *, bool, bool, const char *> cases[] = {
         {good.c_str(), "secret", true, false, nullptr},
         {good.c_str(), "secret", true, true, nullptr},
         {unknown.c_str(), nullptr, false, false,
@@ -292,27 +272,27 @@ TEST_F(tls_setup, a_client_certificate_is_asked_for_and_verified)
          "SSL certificate presented by peer cannot be verified in soap_ssl_accept()"},
         {nullptr, nullptr, false, false, "SSL_accept() failed in soap_ssl_accept()"},
         {nullptr, nullptr, false, true, "No SSL certificate was presented by the peer in soap_ssl_accept()"}};
-    for (const auto &c : cases) {
+    for (const auto &[pair, password, accepted, by_host, detail] : cases) {
         context service, client;
         const int port =
             listen_with(service, server, TLS_REQUIRE_CLIENT_CERT | TLS_NO_DEFAULT_CA, trusted.c_str());
-        if (c.by_host)
+        if (by_host)
             SSL_CTX_set_verify(service->tls_context, SSL_VERIFY_PEER,
                                [](int, X509_STORE_CTX *) { return 1; });
         std::future<accept_outcome> outcome = serve_one(service);
-        ASSERT_EQ(soap_ssl_client_context(client.get(), VERIFIED, c.pair, c.password, trusted.c_str(),
-                                          nullptr, nullptr),
+        ASSERT_EQ(soap_ssl_client_context(client.get(), VERIFIED, pair, password, trusted.c_str(), nullptr,
+                                          nullptr),
                   0);
         client->recv_timeout = 10;
         ASSERT_GE(open_to(client, port), 0) << client.fault_text();
-        EXPECT_EQ(exchange(client, "x"), c.accepted ? "x" : "");
+        EXPECT_EQ(exchange(client, "x"), accepted ? "x" : "");
         tcp_disconnect(client.get());
         const accept_outcome end = outcome.get();
-        EXPECT_EQ(end.result, c.accepted ? 0 : SOAP_TLS_ERROR) << end.text;
-        EXPECT_EQ(end.closed, !c.accepted);
-        EXPECT_EQ((service->input_mode & MODE_TLS) != 0, c.accepted) << "addresses would begin with http:";
-        if (!c.accepted) {
-            EXPECT_EQ(end.detail, c.detail);
+        EXPECT_EQ(end.result, accepted ? 0 : SOAP_TLS_ERROR) << end.text;
+        EXPECT_EQ(end.closed, !accepted);
+        EXPECT_EQ((service->input_mode & MODE_TLS) != 0, accepted) << "addresses would begin with http:";
+        if (!accepted) {
+            EXPECT_EQ(end.detail, detail);
         }
     }
     for (const char *const password : {"wrong", static_cast<const char *>(nullptr)}) {
@@ -375,7 +355,7 @@ TEST_F(tls_setup, a_server_handshake_without_a_socket_or_a_client_fails)
     EXPECT_EQ(soap_ssl_accept(service.get()), SOAP_TLS_ERROR);
     EXPECT_EQ(service->socket, -1);
     EXPECT_EQ(service.fault_detail(), "SSL_accept() failed in soap_ssl_accept()");
-    EXPECT_NE(service.fault_text().find("http request"), std::string::npos) << service.fault_text();
+    EXPECT_THAT(service.fault_text(), HasSubstr("http request"));
 }
 
 } // namespace

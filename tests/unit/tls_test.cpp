@@ -1,16 +1,12 @@
-// tls_test.cpp - TLS connections of a context to OpenSSL servers: handshake, sessions, bytes, the end.
-//
-// Elsewhere: who the peer is (tls_identity_test.cpp), set-up and the library's server side
-// (tls_setup_test.cpp).
+// tls_test.cpp - TLS connections of a context to OpenSSL servers: handshake, sessions, bytes, the end. Elsewhere:
+// who the peer is (tls_identity_test.cpp), set-up and the library's server side (tls_setup_test.cpp).
 #include <future>
-#include <openssl/ssl.h>
 #include <optional>
 
 #include "net/tcp_socket.h"
 #include "net/tls_connection.h"
 #include "support/scripted_server.h"
 #include "support/socket_calls.h"
-#include "support/tls_peer.h"
 
 namespace {
 
@@ -18,9 +14,6 @@ using namespace tls_peers;
 
 class tls : public tls_test {};
 
-const subject BY_NAME{"peer.test", ""};
-
-// A client that has come through the handshake.
 struct connected : context {
     explicit connected(int port, int transfer_limit = 0)
     {
@@ -46,8 +39,6 @@ TEST_F(tls, a_plain_connection_after_a_failed_tls_one_is_plain)
     EXPECT_EQ(exchange(ctx, "plain"), "plain");
 }
 
-// --- handshake ---
-
 TEST_F(tls, the_first_https_connection_sets_up_by_default)
 {
     tls_peer server(server_for(BY_NAME), echo);
@@ -66,10 +57,7 @@ TEST_F(tls, a_tunnel_through_a_proxy_leads_to_the_host_after_it)
     peer proxy([&](int client) {
         head = loopback::read_head(client);
         loopback::write_text(client, "HTTP/1.0 200 Connection established\r\nContent-Type: text/x\r\n\r\n");
-        const server_connection connection(SSL_new(beyond.get()));
-        SSL_set_fd(connection.get(), client);
-        if (SSL_accept(connection.get()) == 1)
-            echo(connection.get());
+        serve_over_tls(beyond.get(), client, echo);
     });
     context ctx;
     ASSERT_EQ(set_up_client(ctx), 0);
@@ -102,7 +90,7 @@ TEST_F(tls, a_tunnel_through_a_proxy_leads_to_the_host_after_it)
     EXPECT_NE(ctx->output_mode & MODE_TLS, 0u);
     EXPECT_STREQ(ctx->endpoint, "https://far.example/service");
     EXPECT_EQ(exchange(ctx, "hello"), "hello");
-    EXPECT_NE(head.find("\r\nProxy-Authorization: Basic cDpw\r\n"), std::string::npos) << head;
+    EXPECT_THAT(head, HasSubstr("\r\nProxy-Authorization: Basic cDpw\r\n"));
     std::string within; // the head that the host after the proxy reads
     ctx->user = &within;
     ctx->on_header_line = [](soap *line_ctx, const char *key, const char *) {
@@ -110,12 +98,10 @@ TEST_F(tls, a_tunnel_through_a_proxy_leads_to_the_host_after_it)
         return 0;
     };
     EXPECT_EQ(http_write_request(ctx.get(), ctx->endpoint, ctx->host, 443, "/service", "", 1), 0);
-    EXPECT_NE(within.find("\nHost\n"), std::string::npos) << within;
-    EXPECT_EQ(within.find("Proxy-Authorization"), std::string::npos) << within;
+    EXPECT_THAT(within, HasSubstr("\nHost\n"));
+    EXPECT_THAT(within, Not(HasSubstr("Proxy-Authorization")));
     ctx->action = ctx->auth_user = nullptr;
 }
-
-// --- sessions ---
 
 TEST_F(tls, a_session_is_resumed_by_its_own_host_and_port_only)
 {
@@ -148,8 +134,6 @@ TEST_F(tls, a_session_is_resumed_by_its_own_host_and_port_only)
         EXPECT_EQ(reused, (std::vector<int>{0, 1, 0, 0, 1, 0, 0})) << version;
     }
 }
-
-// --- transfers ---
 
 TEST_F(tls, a_call_on_a_kept_connection_costs_three_system_calls_and_two_more_with_limits)
 {
@@ -238,8 +222,6 @@ TEST_F(tls, its_bio_says_why_a_transfer_fails_and_whether_another_try_helps)
     ctx->socket_abandoned = false;
 }
 
-// --- liveness and the end ---
-
 TEST_F(tls, a_ticket_is_no_reason_to_end_a_kept_connection_but_an_unannounced_end_is)
 {
     for (const bool ticket : {true, false}) {
@@ -292,8 +274,6 @@ TEST_F(tls, neither_the_question_nor_the_end_waits_for_a_peer_that_reads_nothing
         EXPECT_EQ(socket_calls::counts.select, legacy == 0 ? 0 : 5) << "seconds";
     }
 }
-
-// --- the same over TCP and TLS ---
 
 using scripted::line;
 using scripted::server;

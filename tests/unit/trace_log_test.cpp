@@ -1,6 +1,5 @@
 // trace_log_test.cpp - the trace files of a context, and certificates taken out of message texts.
 #include <ctime>
-#include <sstream>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -8,14 +7,6 @@
 #include "support/testing.h"
 
 namespace {
-
-std::string content_of(const std::string &path)
-{
-    std::ifstream file(path, std::ios::binary);
-    std::ostringstream text;
-    text << file.rdbuf();
-    return text.str();
-}
 
 class trace_log : public testing::Test {
 protected:
@@ -47,12 +38,12 @@ TEST_F(trace_log, both_directions_go_to_the_default_file_at_their_first_byte)
     EXPECT_FALSE(std::filesystem::exists(path("default.log")));
     write(ctx, SOAP_LOG_SENT, std::string("out\0put;", 8));
     write(ctx, SOAP_LOG_RECEIVED, "input;");
-    EXPECT_EQ(content_of(path("default.log")), std::string("out\0put;input;", 14)) << "at each write";
+    EXPECT_EQ(file_content(path("default.log")), std::string("out\0put;input;", 14)) << "at each write";
     EXPECT_FALSE(std::filesystem::exists(path("later.log")));
     soap_discard_all(&ctx);
     EXPECT_EQ(ctx.log_streams[SOAP_LOG_SENT], nullptr);
     write(ctx, SOAP_LOG_SENT, "!");
-    EXPECT_EQ(content_of(path("default.log")), std::string("out\0put;input;!", 15)) << "appended";
+    EXPECT_EQ(file_content(path("default.log")), std::string("out\0put;input;!", 15)) << "appended";
 }
 
 TEST_F(trace_log, a_channel_follows_its_own_path)
@@ -64,8 +55,8 @@ TEST_F(trace_log, a_channel_follows_its_own_path)
     EXPECT_EQ(soap_log_set(&ctx, SOAP_LOG_SENT, ctx.log_paths[SOAP_LOG_SENT]), 0) << "its own text";
     write(ctx, SOAP_LOG_SENT, "b");
     write(ctx, SOAP_LOG_RECEIVED, "lost");
-    EXPECT_EQ(content_of(path("default.log")), "a");
-    EXPECT_EQ(content_of(path("sent.log")), "b");
+    EXPECT_EQ(file_content(path("default.log")), "a");
+    EXPECT_EQ(file_content(path("sent.log")), "b");
     EXPECT_EQ(ctx.log_streams[SOAP_LOG_RECEIVED], nullptr);
 }
 
@@ -77,7 +68,7 @@ TEST_F(trace_log, times_say_where_in_its_file_each_piece_begins_and_when_it_was_
     ASSERT_EQ(soap_log_set(&ctx, SOAP_LOG_TIMES, path("times").c_str()), 0);
     write(ctx, SOAP_LOG_SENT, "out;");
     write(ctx, SOAP_LOG_RECEIVED, "in;");
-    std::istringstream times(content_of(path("times")));
+    std::istringstream times(file_content(path("times")));
     long long place = 0, first = 0, second = 0;
     char direction = 0;
     ASSERT_TRUE(times >> place >> first >> direction);
@@ -98,11 +89,11 @@ TEST_F(trace_log, holds_the_bytes_on_the_wire_and_what_they_unpack_to)
     ASSERT_EQ(soap_send_begin(&wire), 0);
     ASSERT_EQ(soap_send_text(&wire, body.c_str()), 0);
     ASSERT_EQ(soap_send_finish(&wire), 0);
-    EXPECT_EQ(content_of(sent), wire.sent());
+    EXPECT_EQ(file_content(sent), wire.sent());
     wire.receive(wire.sent());
     ASSERT_EQ(soap_receive_begin(&wire), 0);
     EXPECT_EQ(wire.read_all(), body);
-    EXPECT_EQ(content_of(received), wire.sent() + body);
+    EXPECT_EQ(file_content(received), wire.sent() + body);
 }
 
 TEST_F(trace_log, a_new_file_is_for_its_owner_alone_and_an_old_one_is_left_as_it_is)
@@ -120,7 +111,7 @@ TEST_F(trace_log, a_new_file_is_for_its_owner_alone_and_an_old_one_is_left_as_it
     };
     EXPECT_EQ(rights("new.log"), std::filesystem::perms{0600});
     EXPECT_EQ(rights("old.log"), std::filesystem::perms{0666});
-    EXPECT_EQ(content_of(path("old.log")), "old;more");
+    EXPECT_EQ(file_content(path("old.log")), "old;more");
 }
 
 TEST_F(trace_log, a_file_that_cannot_be_opened_is_tried_again)
@@ -131,7 +122,7 @@ TEST_F(trace_log, a_file_that_cannot_be_opened_is_tried_again)
     EXPECT_EQ(ctx.error, 0);
     std::filesystem::create_directories(path("missing"));
     write(ctx, SOAP_LOG_SENT, "kept");
-    EXPECT_EQ(content_of(path("missing/sent.log")), "kept");
+    EXPECT_EQ(file_content(path("missing/sent.log")), "kept");
 }
 
 TEST_F(trace_log, a_default_without_text_or_terminator_is_safe)

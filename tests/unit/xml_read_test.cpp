@@ -1,5 +1,4 @@
 // xml_read_test.cpp - elements on input: tags, attributes, namespaces, the envelope's frame.
-#include <random>
 
 #include "support/reader_input.h"
 #include "xml/namespace.h"
@@ -54,7 +53,6 @@ std::string tree(soap *ctx)
 
 TEST(xml_read, elements_and_attributes_come_out_as_they_are)
 {
-    // What is well-formed is compared with another parser, in xml_reference_test.cpp.
     const reading rows[] = {
         {"blanks everywhere", " <a \n><b  />\t< c >x</ c ></a >", "a{b; c{'x'!5"},
         {"byte-order mark", "\xEF\xBB\xBF<a/>", "a; !-1"},
@@ -220,12 +218,7 @@ std::string fields(const soap *ctx)
 TEST(xml_read, attributes_of_the_engine_are_understood_by_version)
 {
     const auto name_of = [](std::size_t length) { return std::string(length, 'n'); };
-    const struct {
-        std::string attribute;
-        std::int16_t version;
-        std::string expected;
-        std::uint32_t mode;
-    } cases[] = {
+    const std::tuple<std::string, std::int16_t, std::string, std::uint32_t> cases[] = {
         {"id='x'", 1, "id=#x", 0},
         {"id='x'", 0, "", 0},
         {"id='x'", 1, "", SOAP_XML_TREE},
@@ -264,12 +257,12 @@ TEST(xml_read, attributes_of_the_engine_are_understood_by_version)
         {"w:required='true'", 0, "must=1", 0},
         {"w:required='true'", 1, "", 0},
     };
-    for (const auto &c : cases) {
-        reception in("<a " + c.attribute + DECLARATIONS + "/>", 9, 9, c.mode);
-        in->soap_version = c.version;
+    for (const auto &[attribute, version, expected, mode] : cases) {
+        reception in("<a " + attribute + DECLARATIONS + "/>", 9, 9, mode);
+        in->soap_version = version;
         in->actor = "urn:me";
         EXPECT_EQ(soap_element_head_read(in), 0);
-        EXPECT_EQ(fields(in), c.expected) << c.attribute << " in version " << c.version;
+        EXPECT_EQ(fields(in), expected) << attribute << " in version " << version;
     }
     reception in("<a><b id='" + std::string(2000, 'x') + "' href='" + std::string(2000, 'y') + "'/><b/></a>");
     begin(in.in_root(), "b");
@@ -280,18 +273,14 @@ TEST(xml_read, attributes_of_the_engine_are_understood_by_version)
 
 TEST(xml_read, consuming_checks_type_nil_actor_and_depth)
 {
-    const struct {
-        const char *attribute;
-        std::uint32_t mode;
-        int nil_allowed, expected;
-    } cases[] = {
+    const std::tuple<const char *, std::uint32_t, int, int> cases[] = {
         {"i:type='c:int'", 0, 0, 0},      {"i:type='c:long'", 0, 0, SOAP_TYPE_MISMATCH},
         {"i:nil='1'", 0, 0, 0},           {"i:nil='1'", MODE_STRICT, 0, SOAP_NIL},
         {"i:nil='1'", MODE_STRICT, 1, 0}, {"e:actor='urn:you'", 0, 0, SOAP_TAG_MISMATCH},
     };
-    for (const auto &c : cases) {
-        reception in("<a " + std::string(c.attribute) + DECLARATIONS + "/>", 9, 9, c.mode);
-        EXPECT_EQ(soap_element_in_begin(in, "a", c.nil_allowed, "SOAP-ENC:int"), c.expected) << c.attribute;
+    for (const auto &[attribute, mode, nil_allowed, expected] : cases) {
+        reception in("<a " + std::string(attribute) + DECLARATIONS + "/>", 9, 9, mode);
+        EXPECT_EQ(soap_element_in_begin(in, "a", nil_allowed, "SOAP-ENC:int"), expected) << attribute;
     }
     for (const std::uint32_t limit : {0u, 3u}) {
         reception in("<a><a><a><a/><a>");
@@ -422,31 +411,26 @@ TEST(xml_read, strict_reading_compares_end_tags)
 
 TEST(xml_read, the_envelope_settles_the_version)
 {
-    const struct {
-        const char *uri;
-        int error;
-        int version;
-        const char *encoding;
-    } cases[] = {
+    const std::tuple<const char *, int, int, const char *> cases[] = {
         {"http://schemas.xmlsoap.org/soap/envelope/", 0, 1, "http://schemas.xmlsoap.org/soap/encoding/"},
         {"http://www.w3.org/2003/05/soap-envelope", 0, 2, "http://www.w3.org/2003/05/soap-encoding"},
         {"http://www.w3.org/2002/12/soap-envelope", 0, 0, nullptr},
         {"urn:other", SOAP_VERSION_MISMATCH, 0, nullptr},
     };
-    for (const auto &c : cases)
+    for (const auto &[uri, error, version, encoding] : cases)
         for (const bool empty : {false, true}) {
-            SCOPED_TRACE(c.uri);
-            reception in("<?xml version='1.0'?><e:Envelope xmlns:e='" + std::string(c.uri) + "'><e:Body" +
+            SCOPED_TRACE(uri);
+            reception in("<?xml version='1.0'?><e:Envelope xmlns:e='" + std::string(uri) + "'><e:Body" +
                              (empty ? "/></e:Envelope>" : ">x</e:Body></e:Envelope>"),
                          11, 11);
             in->soap_version = 0;
-            ASSERT_EQ(soap_envelope_in_begin(in), c.error);
-            EXPECT_EQ(in->soap_version, c.version);
-            if (c.encoding != nullptr) {
-                EXPECT_STREQ(in->local_namespaces[1].received, c.encoding);
+            ASSERT_EQ(soap_envelope_in_begin(in), error);
+            EXPECT_EQ(in->soap_version, version);
+            if (encoding != nullptr) {
+                EXPECT_STREQ(in->local_namespaces[1].received, encoding);
             }
             EXPECT_STREQ(in->local_namespaces[0].uri, "http://schemas.xmlsoap.org/soap/envelope/");
-            if (c.error != 0)
+            if (error != 0)
                 continue;
             EXPECT_EQ(soap_body_in_begin(in), 0);
             EXPECT_EQ(in->message_part, empty ? PART_EMPTY_BODY : PART_BODY);
@@ -454,11 +438,7 @@ TEST(xml_read, the_envelope_settles_the_version)
             EXPECT_EQ(soap_envelope_in_end(in), 0);
             EXPECT_EQ(in->message_part, PART_AFTER_ENVELOPE);
         }
-    const struct {
-        const char *document;
-        std::int16_t status;
-        int error;
-    } responses[] = {
+    const std::tuple<const char *, std::int16_t, int> responses[] = {
         {"<html/>", 0, SOAP_TAG_MISMATCH},
         {"<html/>", 200, 200},
         {"<html/>", 404, 404},
@@ -468,10 +448,10 @@ TEST(xml_read, the_envelope_settles_the_version)
         {"<html", 500, 500},
         {"<Envelope xmlns='urn:x'/>", 500, SOAP_VERSION_MISMATCH},
     };
-    for (const auto &c : responses) {
-        reception in(c.document);
-        in->status = c.status;
-        EXPECT_EQ(soap_envelope_in_begin(in), c.error) << c.document << " with " << c.status;
+    for (const auto &[document, status, error] : responses) {
+        reception in(document);
+        in->status = status;
+        EXPECT_EQ(soap_envelope_in_begin(in), error) << document << " with " << status;
     }
 }
 

@@ -1,7 +1,6 @@
-// xml_reference_test.cpp - the reader against another parser: both must see the same document.
-//
-// Documents come from a small random grammar with fixed seeds. Texts, attribute values and the order of tags are
-// compared. Left out of account: white space in attributes, which the reader keeps as it is.
+// xml_reference_test.cpp - the reader against another parser: both must see the same document. Documents come
+// from a small random grammar with fixed seeds. Texts, attribute values and the order of tags are compared.
+// Left out of account: white space in attributes, which the reader keeps as it is.
 #include <libxml/xmlreader.h>
 
 #include "support/reader_input.h"

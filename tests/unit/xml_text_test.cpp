@@ -69,8 +69,7 @@ TEST(xml_text, strings_hold_characters_and_nested_elements)
     EXPECT_EQ(soap_string_read(in.in_root(), CHARACTERS, -1, -1), half + "&" + half);
 }
 
-// The text in one of the forms that strings come in: attributes, raw XML, characters, simple value, wide
-// string.
+// The text in one of the forms that strings come in: attributes, raw XML, characters, simple value, wide string.
 std::string in_form(int form, soap *ctx)
 {
     std::string text;
@@ -246,21 +245,17 @@ TEST(xml_text, simple_values_are_trimmed_and_bounded)
 
 TEST(xml_text, wide_strings_hold_code_points)
 {
-    const struct {
-        const char *body;
-        int form;
-        const char *text;
-    } cases[] = {
+    const std::tuple<const char *, int, const char *> cases[] = {
         {"a\xC3\xA9\xE2\x82\xAC&#x1F600;&lt;", CHARACTERS, "a#233#8364#128512<"},
         {"<b c=\"1\">x</b><![CDATA[<&>\"]]>", CHARACTERS, "<b c=\"1\">x</b><&>\""},
         {"<b c=\"1\">&amp;&lt;</b><![CDATA[<&>\"]]>", RAW, "<b c=\"1\">&amp;&lt;</b>&lt;&amp;&gt;&quot;"},
         {"", CHARACTERS, ""},
     };
-    for (const auto &c : cases) {
-        const reading row[] = {{c.body, "<a>" + std::string(c.body) + "</a>", c.text}};
-        expect_readings(row, [&c](soap *ctx) {
+    for (const auto &[body, form, expected] : cases) {
+        const reading row[] = {{body, "<a>" + std::string(body) + "</a>", expected}};
+        expect_readings(row, [form = form](soap *ctx) {
             soap_element_in_begin(ctx, "a", 1, nullptr);
-            const char32_t *text = soap_wide_string_read(ctx, c.form, -1, -1);
+            const char32_t *text = soap_wide_string_read(ctx, form, -1, -1);
             const std::string result = text != nullptr ? narrow(text) : failure(ctx);
             return soap_element_in_end(ctx, "a") == 0 ? result : failure(ctx);
         });
@@ -281,12 +276,7 @@ TEST(xml_text, wide_strings_hold_code_points)
 
 TEST(xml_text, string_elements_tell_absent_nil_and_empty_apart)
 {
-    const struct {
-        const char *document;
-        const char *tag;
-        long minimum;
-        const char *expected;
-    } cases[] = {
+    const std::tuple<const char *, const char *, long, const char *> cases[] = {
         {"<s>text</s>", "s", -1, "text"},
         {"<s/>", "s", -1, ""},
         {"<s></s>", "s", -1, ""},
@@ -299,14 +289,14 @@ TEST(xml_text, string_elements_tell_absent_nil_and_empty_apart)
         {"</o>", "-s", -1, "!6"},
         {"</o>", "s", -1, "!6"},
     };
-    for (const auto &c : cases) {
-        const reading row[] = {{c.document, c.document, c.expected}};
-        expect_readings(row, [&c](soap *ctx) {
-            char **place = soap_string_element_in(ctx, c.tag, nullptr, nullptr, 4, 1, c.minimum, -1);
+    for (const auto &[document, tag, minimum, expected] : cases) {
+        const reading row[] = {{document, document, expected}};
+        expect_readings(row, [tag = tag, minimum = minimum](soap *ctx) {
+            char **place = soap_string_element_in(ctx, tag, nullptr, nullptr, 4, 1, minimum, -1);
             return place == nullptr ? failure(ctx) : std::string(*place == nullptr ? "null" : *place);
         });
-        expect_readings(row, [&c](soap *ctx) {
-            char32_t **place = soap_wide_string_element_in(ctx, c.tag, nullptr, nullptr, 4, 1, c.minimum, -1);
+        expect_readings(row, [tag = tag, minimum = minimum](soap *ctx) {
+            char32_t **place = soap_wide_string_element_in(ctx, tag, nullptr, nullptr, 4, 1, minimum, -1);
             return place == nullptr ? failure(ctx) : narrow(*place == nullptr ? U"null" : *place);
         });
     }
@@ -333,18 +323,16 @@ TEST(xml_text, raw_elements_give_their_content)
 
 TEST(xml_text, a_leaf_in_place_counts_as_an_open_element_and_is_for_lenient_reading)
 {
-    const struct {
-        std::uint32_t max_depth, mode;
-        const char *text;
-    } cases[] = {{1, 0, ""}, {2, 0, "text"}, {2, MODE_STRICT, ""}};
-    for (const auto &c : cases) {
-        reception in("<r><a>text</a></r>", SOAP_BUFFER_SIZE, SOAP_BUFFER_SIZE, c.mode);
-        in->max_depth = c.max_depth;
+    const std::tuple<std::uint32_t, std::uint32_t, const char *> cases[] = {
+        {1, 0, ""}, {2, 0, "text"}, {2, MODE_STRICT, ""}};
+    for (const auto &[max_depth, mode, content] : cases) {
+        reception in("<r><a>text</a></r>", SOAP_BUFFER_SIZE, SOAP_BUFFER_SIZE, mode);
+        in->max_depth = max_depth;
         std::string_view text;
         EXPECT_FALSE(xml_leaf_in_place(in.in_root(), &text)) << "nothing is held";
         soap_element_head_read(in);
-        EXPECT_EQ(xml_leaf_in_place(in, &text), *c.text != '\0');
-        EXPECT_EQ(text, c.text);
+        EXPECT_EQ(xml_leaf_in_place(in, &text), *content != '\0');
+        EXPECT_EQ(text, content);
     }
 }
 

@@ -89,7 +89,6 @@ TEST(xml_tokens, references_give_their_character_and_never_markup)
     }
 }
 
-// What becomes of them in strings is told in xml_text_test.cpp.
 TEST(xml_tokens, bytes_are_decoded_by_the_encoding)
 {
     const reading rows[] = {

@@ -33,7 +33,6 @@ void element(soap *ctx, const char *tag, const calls &content = {}, int id = 0, 
     EXPECT_EQ(soap_element_out_end(ctx, tag), 0);
 }
 
-// Gives the next start tag attributes, in this order.
 void set_attributes(soap *ctx, std::initializer_list<std::pair<const char *, const char *>> attributes)
 {
     for (const auto &[name, value] : attributes)
@@ -58,8 +57,6 @@ std::string canonical_form(const std::string &text, const char *form)
 }
 
 } // namespace
-
-// --- Text.
 
 // The table of escapes once more, a byte at a time.
 static std::string escaped(const std::string &text, int flag, std::uint32_t mode)
@@ -91,13 +88,7 @@ static std::string escaped(const std::string &text, int flag, std::uint32_t mode
 
 TEST(xml_write, escapes_follow_place_and_mode)
 {
-    static const struct {
-        const char *rule;
-        std::uint32_t mode;
-        int flag;
-        const char *text;
-        const char *bytes;
-    } cases[] = {
+    static const std::tuple<const char *, std::uint32_t, int, const char *, const char *> cases[] = {
         {"element text", 0, 0, "\t\n\r\"&'<>\x7F", "\t&#xA;&#xD;\"&amp;'&lt;&gt;\x7F"},
         {"canonical text", MODE_CANONICAL, 0, "\t\n\r\"&'<>", "\t\n&#xD;\"&amp;'&lt;&gt;"},
         {"attribute", 0, 1, "\t\n\r\"&'<>", "&#x9;&#xA;&#xD;&quot;&amp;'&lt;>"},
@@ -109,10 +100,10 @@ TEST(xml_write, escapes_follow_place_and_mode)
         {"utf-8 attribute", MODE_UTF_STRINGS, 1, "\xC3\xA9", "\xC3\xA9"},
         {"empty", 0, 0, "", ""},
     };
-    for (const auto &c : cases) {
-        SCOPED_TRACE(c.rule);
-        EXPECT_EQ(inside(c.mode, [&](soap *ctx) { soap_text_write(ctx, c.text, c.flag); }), c.bytes);
-        EXPECT_EQ(escaped(c.text, c.flag, c.mode), c.bytes);
+    for (const auto &[rule, mode, flag, text, bytes] : cases) {
+        const auto write = [text = text, flag = flag](soap *ctx) { soap_text_write(ctx, text, flag); };
+        EXPECT_EQ(inside(mode, write), bytes) << rule;
+        EXPECT_EQ(escaped(text, flag, mode), bytes) << rule;
     }
 }
 
@@ -220,8 +211,6 @@ TEST(xml_write, code_points_take_one_to_six_bytes_and_are_escaped_like_bytes)
                       escaped(text, flag, mode | MODE_UTF_STRINGS));
 }
 
-// --- Tags.
-
 TEST(xml_write, a_start_tag_carries_what_waits_for_it)
 {
     static const auto understand = [](soap *ctx, const char *actor) {
@@ -238,14 +227,8 @@ TEST(xml_write, a_start_tag_carries_what_waits_for_it)
         ctx->positions[0] = 3;
         ctx->positions[1] = -2147483647 - 1;
     };
-    static const struct {
-        const char *attributes; // of the tag
-        int id;
-        const char *type;
-        std::uint32_t mode;
-        std::int16_t version;
-        void (*before)(soap *);
-    } cases[] = {
+    using set_up = void (*)(soap *);
+    static const std::tuple<const char *, int, const char *, std::uint32_t, std::int16_t, set_up> cases[] = {
         {"", 0, nullptr, 0, 1, nullptr},
         {" id=\"_7\"", 7, "", 0, 1, nullptr},
         {" xsi:type=\"xsd:int\"", 0, "xsd:int", 0, 1, nullptr},
@@ -265,17 +248,17 @@ TEST(xml_write, a_start_tag_carries_what_waits_for_it)
         {" SOAP-ENV:encodingStyle=\"urn:enc\"", 0, nullptr, 0, 1, [](soap *c) { encode(c, "urn:enc"); }},
         {"", 0, nullptr, 0, 1, [](soap *c) { encode(c, nullptr); }},
     };
-    for (const auto &c : cases) {
-        const auto write = [&](soap *ctx) {
-            if (c.before)
-                c.before(ctx);
-            EXPECT_EQ(soap_element_out_begin(ctx, "a:e", c.id, c.type), 0);
+    for (const auto &[attributes, id, type, mode, version, before] : cases) {
+        const auto write = [id = id, type = type, before = before](soap *ctx) {
+            if (before)
+                before(ctx);
+            EXPECT_EQ(soap_element_out_begin(ctx, "a:e", id, type), 0);
             EXPECT_EQ(ctx->null_flag + ctx->position_count + ctx->must_understand + ctx->encoding_flag, 0);
             EXPECT_EQ(ctx->nesting_level, 1U);
             EXPECT_EQ(soap_element_out_end(ctx, "a:e"), 0);
             EXPECT_EQ(ctx->nesting_level, 0U);
         };
-        EXPECT_EQ(inside(c.mode, write, c.version), "<a:e" + std::string(c.attributes) + "></a:e>");
+        EXPECT_EQ(inside(mode, write, version), "<a:e" + std::string(attributes) + "></a:e>");
     }
 }
 
@@ -408,13 +391,8 @@ TEST(xml_write, a_wsu_id_is_shown_to_the_signer)
 
 TEST(xml_write, null_values_are_left_out_or_nil)
 {
-    static const struct {
-        const char *rule, *bytes;
-        int id;
-        std::int16_t version, positions;
-        std::uint32_t mode;
-        const char *attribute;
-    } cases[] = {
+    using text = const char *;
+    static const std::tuple<text, text, int, std::int16_t, std::int16_t, std::uint32_t, text> cases[] = {
         {"nothing to say", "", 0, 1, 0, 0, nullptr},
         {"a position is said in SOAP 1.2 alone", "", -1, 1, 1, 0, nullptr},
         {"mode", "<e xsi:type=\"t\" xsi:nil=\"true\"/>", 0, 1, 0, MODE_NIL, nullptr},
@@ -422,20 +400,20 @@ TEST(xml_write, null_values_are_left_out_or_nil)
         {"position", "<e xsi:type=\"t\" SOAP-ENC:position=\"[4]\" xsi:nil=\"true\"/>", 0, 2, 1, 0, nullptr},
         {"attribute", "<e xsi:type=\"t\" k=\"v\"/>", 0, 1, 0, 0, "k"},
     };
-    for (const auto &c : cases) {
-        SCOPED_TRACE(c.rule);
-        const auto write = [&](soap *ctx) {
+    for (const auto &[rule, bytes, id, version, positions, mode, attribute] : cases) {
+        SCOPED_TRACE(rule);
+        const auto write = [id = id, positions = positions, attribute = attribute, bytes = bytes](soap *ctx) {
             ctx->null_flag = 1;
-            ctx->position_count = c.positions;
+            ctx->position_count = positions;
             ctx->positions[0] = 4;
-            if (c.attribute)
-                set_attributes(ctx, {{c.attribute, "v"}});
-            EXPECT_EQ(soap_element_null(ctx, "e", c.id, "t"), 0);
+            if (attribute)
+                set_attributes(ctx, {{attribute, "v"}});
+            EXPECT_EQ(soap_element_null(ctx, "e", id, "t"), 0);
             EXPECT_EQ(ctx->nesting_level, 0U);
             EXPECT_EQ(ctx->position_count, 0);
-            EXPECT_EQ(ctx->null_flag, *c.bytes == '\0' ? 1 : 0);
+            EXPECT_EQ(ctx->null_flag, *bytes == '\0' ? 1 : 0);
         };
-        EXPECT_EQ(inside(c.mode, write, c.version), c.bytes);
+        EXPECT_EQ(inside(mode, write, version), bytes);
     }
 }
 
@@ -492,8 +470,6 @@ TEST(xml_write, short_ways_write_what_the_long_ways_do)
                   document(mode, [&](soap *ctx) { many(ctx, by_long_ways); }));
 }
 
-// --- Values.
-
 TEST(xml_write, arrays_are_typed_by_version)
 {
     const auto write = [](soap *ctx) {
@@ -546,7 +522,6 @@ TEST(xml_write, literal_content_is_not_escaped)
     std::string text = "<b>\xC3\xA9&amp;</b>";
     std::u32string wide = U"<b>\u00E9&amp;</b>";
     static const std::tuple<const char *, std::string, std::string> cases[] = {
-        // tag, before, after
         {"a:x", "<x xmlns=\"urn:a\">", "</x>"},
         {"q:x", "<x xmlns=\"\">", "</x>"},
         {"x", "<x>", "</x>"},
@@ -585,8 +560,6 @@ TEST(xml_write, strings_are_elements_with_an_identity)
     EXPECT_EQ(inside(MODE_NULL_STRINGS, write), first + "<a:s id=\"_3\" xsi:nil=\"true\"/>" + last);
     EXPECT_EQ(inside(MODE_NIL, write), first + "<a:s id=\"_3\"></a:s><a:s xsi:nil=\"true\"/>" + last);
 }
-
-// --- The envelope.
 
 static void envelope(soap *ctx)
 {
@@ -636,8 +609,6 @@ TEST(xml_write, the_part_head_names_what_the_part_is)
         }
 }
 
-// --- Canonical output.
-
 static void namespaces_where_used(soap *ctx)
 {
     element(ctx, "SOAP-ENV:Envelope", [](soap *c) {
@@ -654,13 +625,8 @@ static void namespaces_where_used(soap *ctx)
 static void attributes_in_order(soap *ctx)
 {
     element(ctx, "b:root", [](soap *c) {
-        set_attributes(c, {{"z", "\t\n\r<>&\"'\xE9"},
-                           {"b:a", "1"},
-                           {"xsi:n", "2"},
-                           {"a:z", "3"},
-                           {"a:b", "4"},
-                           {"xml:lang", "en"},
-                           {"b", "5"}});
+        set_attributes(c, {{"z", "\t\n\r<>&\"'\xE9"}, {"b:a", "1"}, {"xsi:n", "2"}, {"a:z", "3"}});
+        set_attributes(c, {{"a:b", "4"}, {"xml:lang", "en"}, {"b", "5"}});
         element(c, "a:e", [](soap *d) {
             set_attributes(d, {{"a:b", "6"}, {"SOAP-ENC:q", "7"}});
             element(d, "b:e");
@@ -709,12 +675,7 @@ TEST(xml_write, canonical_output_is_what_canonicalisation_makes_of_the_plain_for
 {
     if (std::system("xmllint --version >/dev/null 2>&1") != 0)
         GTEST_SKIP() << "xmllint is not installed";
-    static const struct {
-        const char *rule;
-        void (*write)(soap *);
-        std::int16_t version;
-        bool is_exclusive; // names in values keep prefixes declared that the exclusive form drops
-    } cases[] = {
+    static const std::tuple<const char *, void (*)(soap *), std::int16_t, bool> cases[] = {
         {"namespaces where used", namespaces_where_used, 1, true},
         {"attributes in order", attributes_in_order, 1, true},
         {"prefixes redefined", prefixes_redefined, 1, true},
@@ -722,15 +683,16 @@ TEST(xml_write, canonical_output_is_what_canonicalisation_makes_of_the_plain_for
         {"arrays of 1.2", types_and_arrays, 2, false},
         {"envelope", envelope, 1, true},
     };
-    for (const auto &c : cases) {
-        SCOPED_TRACE(c.rule);
-        std::string bytes = document(MODE_CANONICAL, c.write, c.version);
+    // is_exclusive: names in values keep prefixes declared that the exclusive form drops
+    for (const auto &[rule, write, version, is_exclusive] : cases) {
+        SCOPED_TRACE(rule);
+        std::string bytes = document(MODE_CANONICAL, write, version);
         if (bytes.ends_with("\r\n"))
             bytes.resize(bytes.size() - 2); // after the document element
         EXPECT_NE(bytes, "");
         EXPECT_EQ(bytes, canonical_form(bytes, "--c14n"));
-        if (c.is_exclusive) {
-            EXPECT_EQ(bytes, canonical_form(document(0, c.write, c.version), "--exc-c14n"));
+        if (is_exclusive) {
+            EXPECT_EQ(bytes, canonical_form(document(0, write, version), "--exc-c14n"));
         }
     }
 }
