@@ -83,7 +83,6 @@ inline std::string answer_envelope(const std::string &content, const std::string
            port + "\">" + content + "</E:Envelope>";
 }
 
-// A proxy of Profile on a wire of its own, and its calls.
 struct profile_call {
     explicit profile_call(std::uint32_t mode = MODE_KEEP_ALIVE) : proxy(static_cast<int>(mode))
     {

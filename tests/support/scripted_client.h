@@ -12,7 +12,6 @@ namespace scripted {
 constexpr int GUARD_S = 10;         // time limit of transfers where none should be met
 constexpr int OTHERS_ANSWER = 9999; // in place of a code
 
-// A client that keeps its connection and counts those it needed.
 class client {
 public:
     template <class Server> explicit client(const Server &to) : endpoint(to.endpoint())

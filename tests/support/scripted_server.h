@@ -144,7 +144,6 @@ private:
 };
 using server = basic_server<loopback::peer>;
 
-// Serves all its clients at once, and well.
 class crowd_server : public basic_server<loopback::crowd> {
 public:
     explicit crowd_server(bool tls) : basic_server(serve_well, tls) {}

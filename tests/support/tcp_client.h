@@ -8,7 +8,6 @@ namespace tcp_clients {
 
 using loopback::context;
 
-// A test that may bend socket calls and the clock.
 class socket_test : public loopback::descriptor_test {
 protected:
     void TearDown() override

@@ -146,7 +146,6 @@ TEST_F(tls_setup, a_kept_connection_carries_calls_of_its_own_rules_only)
     }
 }
 
-// A handshake in memory, as far as it goes.
 bool come_together(SSL_CTX *one, SSL_CTX *other)
 {
     SSL_CTX_set_cipher_list(one, "ALL:@SECLEVEL=0"); // OpenSSL's level alone would refuse the older versions
