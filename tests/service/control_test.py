@@ -163,7 +163,7 @@ class control(unittest.TestCase):
         with tempfile.TemporaryDirectory() as folder:
             file = os.path.join(folder, "calls")
             with zuv.service("--record", file, "--control") as address:
-                sent = [post("Profile", envelope("Profile", request("create", secret) + '<x id = "s">sesame</x>'), "Authorization: Basic c2VzYW1l"), GET,
+                sent = [post("Profile", envelope("Profile", request("create", secret)), "Authorization: Basic c2VzYW1l"), GET,
                         post("ProblemReport", attached, kind=mime)]
                 body = CREATE.partition(b"\r\n\r\n")[2]
                 sent += [post("Profile", gzip.compress(body), "Content-Encoding: gzip"), CREATE + b"x"]

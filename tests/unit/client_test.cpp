@@ -506,6 +506,7 @@ TEST(client_options, reach_the_context)
     EXPECT_STREQ(ctx->tls_ca_file, "ca.pem");
     EXPECT_STREQ(ctx->proxy_host, "proxy.test");
     EXPECT_EQ(ctx->proxy_port, 3128);
+    EXPECT_EQ(ctx->wait_with_poll, 1);
     EXPECT_EQ(made.endpoint(), "http://peer.test/");
     EXPECT_STREQ(ctx->proxy_password, "p@ss");
     EXPECT_EQ(made.trace_file() + to_memory.client.trace_file(), "/tmp/a.b/calls-1/tmp/a.b/calls-2");
