@@ -57,7 +57,6 @@ struct class_ops {
     void *(*create)(soap *owner, int count); // count < 0: one object; null if memory runs out
     void (*destroy)(void *object, int count);
     void (*assign)(void *target, const void *source);
-    void (*reset)(void *object, soap *owner);               // virtual soap_default
     int (*type_of)(const void *object);                     // virtual soap_type
     const std::type_info *(*type_info)(const void *object); // of the object, which a host may have derived
     const std::type_info *own_type_info;                    // of the class

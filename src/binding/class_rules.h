@@ -338,11 +338,6 @@ void copy_hook(soap *ctx, int, int, void *place, std::size_t, const void *source
     }
 }
 
-template <class T> void reset_object(void *object, soap *owner)
-{
-    static_cast<T *>(object)->soap_default(owner);
-}
-
 template <class T> std::size_t release_members(soap *owner, T &object)
 {
     std::size_t bytes = 0;
@@ -430,7 +425,6 @@ template <class T> constexpr class_ops make_ops()
             &create<T>,
             &destroy<T>,
             &assign<T>,
-            &reset_object<T>,
             &type_of_object<T>,
             &type_info_of<T>,
             &typeid(T),
