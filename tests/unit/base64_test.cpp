@@ -180,6 +180,10 @@ TEST_F(base64, writing_stops_at_the_first_error)
     ctx.error = 0;
     EXPECT_EQ(soap_hex_write(&ctx, bytes_of("\xaf\x01"), 2), 0);
     EXPECT_EQ(ctx.sent(), "AF01");
+    EXPECT_NE(soap_hex_write(&ctx, bytes_of(bytes), bytes.size()), 0);
+    ctx.error = 0;
+    EXPECT_STREQ(soap_hex_decode(&ctx, nullptr, nullptr, 0, nullptr), "");
+    EXPECT_STREQ(soap_hex_decode(&ctx, "4a4B4", nullptr, 0, nullptr), "JK");
 }
 
 } // namespace

@@ -302,6 +302,50 @@ TEST_F(binding, references_reach_switches_words_and_lists_of_words)
     }
 }
 
+TEST_F(binding, references_reach_words_by_value)
+{
+    const auto *fault = read<protocol__Server_x002eRedirection>(
+        "<f><protocol:term href=\"#t\"></protocol:term><protocol:detail><protocol:nestedFault "
+        "xsi:type=\"protocol:Server.Redirection\"><protocol:term id=\"t\">exchange</protocol:term>"
+        "</protocol:nestedFault></protocol:detail></f>");
+    ASSERT_NE(nullptr, fault) << ctx.error;
+    EXPECT_EQ(protocol__Server_x002eRedirection_term::exchange, fault->term);
+}
+
+// A message whose element is a reference to what comes after it.
+TEST_F(binding, an_object_by_reference_gets_all_that_its_target_holds)
+{
+    const auto read_whole = [this]<class T>(T &object, const std::string &content) {
+        const std::string type = soap_type_name(object.soap_type());
+        const std::string uri = "http://www.zuv.example/xmlns/b2b/zuv/v1.0";
+        soap_reset_call(&ctx);
+        ctx.receive("<c href=\"#o\"></c><o id=\"o\" xmlns:protocol=\"" + uri +
+                    "\" xmlns:xsi=\"http://www.w3.org/2001/XMLSchema-instance\" xsi:type=\"" + type +
+                    content);
+        soap_receive_begin(&ctx);
+        ctx.soap_version = 1;
+        return object.soap_get(&ctx, "c", nullptr) != nullptr && soap_forward_resolve(&ctx) == 0;
+    };
+    protocol__Data data;
+    EXPECT_TRUE(read_whole(data, "\" encoding=\"base64\">text</o>")) << ctx.error;
+    EXPECT_EQ("text", data.value);
+    ASSERT_NE(nullptr, data.encoding);
+    protocol__Server_x002eRedirection fault;
+    EXPECT_TRUE(read_whole(
+        fault, "\"><protocol:description>d</protocol:description><protocol:uri>u</protocol:uri></o>"))
+        << ctx.error;
+    EXPECT_EQ("u d", fault.uri + " " + *fault.description);
+    protocol__Contact contact;
+    EXPECT_TRUE(read_whole(contact, "\"><protocol:contactPreference>fax</protocol:contactPreference></o>"))
+        << ctx.error;
+    EXPECT_EQ(1U, contact.contactPreference.size());
+    xsd__base64Binary bytes;
+    ctx.receive("<c>YQ==</c>");
+    soap_reset_call(&ctx);
+    EXPECT_NE(nullptr, bytes.soap_get(&ctx, "c", nullptr)) << ctx.error;
+    EXPECT_EQ("<c>YQ==</c>", write(bytes, "c"));
+}
+
 TEST_F(binding, strict_reading_takes_no_object_with_wanted_members_by_reference)
 {
     const auto code_of = [this]<class T>(const T &) {

@@ -293,6 +293,18 @@ TEST(request_head, stops_at_the_first_failure_of_a_line)
         EXPECT_EQ(wire.result, 77);
         EXPECT_EQ(wire.error, 77);
     }
+    request_wire whole;
+    whole.http_content = "a/b";
+    whole.auth_user = whole.auth_password = "s";
+    whole.go_through_proxy();
+    for (whole.send_limit = 0; whole.send_limit < 100; ++whole.send_limit) { // each part sent by itself
+        soap_parse_endpoint(&whole, "http://host/path");
+        whole.sends.clear();
+        whole.mode = MODE_DIRECT | MODE_DEFLATE;
+        const int result = http_write_request(&whole, whole.endpoint, "::1", 81, "/path", "urn:a", 1);
+        EXPECT_EQ(result, whole.sent().ends_with("\r\n\r\n") ? 0 : -1) << whole.sent();
+    }
+    EXPECT_LT(whole.sends.size(), 100U);
 }
 
 // Connections are socket pairs; a host whose name begins with "dead" refuses.

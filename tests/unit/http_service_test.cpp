@@ -204,6 +204,18 @@ TEST(response_out, names_the_status)
         EXPECT_EQ(line_of(sent, "Server"), "zuv_client_pro/1.5.1");
         EXPECT_EQ(line_of(sent, "Content-Type"), c.type) << c.rule;
         EXPECT_EQ(sent.substr(sent.size() - 4), "\r\n\r\n");
+        int result = -1;
+        for (std::size_t limit = 0; result != 0 && limit < 100; ++limit) { // each part sent by itself
+            memory_wire failing(0, MODE_BUFFERED);
+            failing.socket = 1000000;
+            c.prepare(failing);
+            failing.mode = MODE_DIRECT;
+            failing.send_limit = limit;
+            result = http_write_response(&failing, c.status, c.count);
+            failing.socket = -1;
+            EXPECT_EQ(result, failing.sent() == sent ? 0 : -1) << c.rule << " after " << limit;
+        }
+        EXPECT_EQ(result, 0);
     }
     memory_wire wire(0, MODE_BUFFERED);
     wire.http_version = "1.1.1";

@@ -239,6 +239,9 @@ TEST_F(elements, q_names_go_out_under_the_prefixes_of_the_table)
     EXPECT_EQ(soap_element_out_begin(&ctx, "a:e", 0, ""), 0);
     EXPECT_EQ(ctx.sent(), "<a:e xmlns:_10=\"urn:w\" xmlns:_9=\"urn:u\">");
     EXPECT_EQ(soap_qname_write_map(&ctx, nullptr), nullptr);
+    ctx.mode = MODE_CANONICAL;
+    ctx.next_id = 8;
+    EXPECT_STREQ(soap_qname_write_map(&ctx, "a:x plain \"urn:u\":y"), "a:x plain _9:y");
 }
 
 TEST_F(elements, tables_of_names_are_searched_exactly)
@@ -271,6 +274,7 @@ TEST_F(elements, array_sizes_multiply_within_their_bound)
         {"[2,3]", 1, 3, 3, 99},
         {"[]", 1, 0, 0, 99},
         {"", 1, -1, 99, 99},
+        {nullptr, 1, -1, 99, 99},
         {"[-1]", 1, -1, 99, 99},
         {"[1000000]", 1, 1000000, 1000000, 99},
         {"[1000001]", 1, -1, 99, 99},
@@ -280,9 +284,9 @@ TEST_F(elements, array_sizes_multiply_within_their_bound)
     // first: 99 where no size was stored
     for (const auto &[text, dimensions, product, first, second] : cases) {
         int sizes[2] = {99, 99};
-        EXPECT_EQ(soap_array_dims_parse(text, sizes, dimensions), product) << text;
-        EXPECT_EQ(sizes[0], first) << text;
-        EXPECT_EQ(sizes[1], second) << text;
+        EXPECT_EQ(soap_array_dims_parse(text, sizes, dimensions), product) << text_of(text);
+        EXPECT_EQ(sizes[0], first) << text_of(text);
+        EXPECT_EQ(sizes[1], second) << text_of(text);
     }
 }
 

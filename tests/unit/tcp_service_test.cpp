@@ -246,6 +246,16 @@ TEST_F(tcp_service, listening_and_accepting_name_what_failed)
     ASSERT_GE(soap_bind(ctx.get(), "127.0.0.1", 0, 1), 0);
     EXPECT_EQ(soap_accept(ctx.get()), -1);
     expect_failure(ctx, 28, "Timeout", "accept failed in soap_accept()");
+    {
+        context client; // that seems to have gone each time
+        ASSERT_GE(open_to(client, loopback::port_of(ctx->master_socket)), 0);
+        ctx->on_accept = [](soap *, int, void *, int *) { return errno = EAGAIN, -1; };
+        EXPECT_EQ(soap_accept(ctx.get()), -1);
+        expect_failure(ctx, 28, "Timeout", "accept failed in soap_accept()");
+        ctx->on_accept = nullptr;
+        EXPECT_EQ(soap_accept(ctx.get()), -1);
+        expect_failure(ctx, 28, "Function not implemented", "accept failed in soap_accept()");
+    }
     EXPECT_EQ(soap_bind(other.get(), "127.0.0.1", loopback::port_of(ctx->master_socket), 1), -1);
     EXPECT_EQ(other->master_socket, -1);
     expect_failure(other, 28, "Address already in use", "bind failed in soap_bind()");

@@ -3,6 +3,7 @@
 #include <netinet/tcp.h>
 #include <optional>
 
+#include <openssl/bio.h>
 #include <zuv_client_pro/soap_report.h>
 
 #include "net/tcp_socket.h"
@@ -443,6 +444,16 @@ TEST_F(tcp, streams_and_descriptors_take_the_place_of_a_socket)
     EXPECT_EQ(out.str(), "to a stream");
     EXPECT_EQ(receive(ctx), "from a stream");
     EXPECT_EQ(receive(ctx), "");
+
+    context of_host;
+    const std::unique_ptr<BIO, decltype(&BIO_free)> bio(BIO_new(BIO_s_mem()), BIO_free);
+    of_host->tls_bio = bio.get();
+    of_host->socket = 900; // never used
+    EXPECT_EQ(tcp_send(of_host.get(), "through a BIO", 13), 0);
+    EXPECT_EQ(receive(of_host), "through a BIO");
+    EXPECT_EQ(receive(of_host), "");
+    of_host->tls_bio = nullptr;
+    of_host->socket = -1;
 }
 
 TEST_F(tcp, a_stream_that_fails_is_an_error_even_if_it_throws)

@@ -294,6 +294,17 @@ TEST_F(tls_setup, a_client_certificate_is_asked_for_and_verified)
             EXPECT_EQ(end.detail, detail);
         }
     }
+    context service, trusting; // by verification of its own
+    const int port = listen_with(service, server);
+    std::future<accept_outcome> outcome = serve_one(service);
+    ASSERT_EQ(soap_ssl_client_context(trusting.get(), VERIFIED, nullptr, nullptr, nullptr, nullptr, nullptr),
+              0);
+    SSL_CTX_set_verify(trusting->tls_context, SSL_VERIFY_PEER, [](int, X509_STORE_CTX *) { return 1; });
+    EXPECT_EQ(open_to(trusting, port), -1);
+    EXPECT_TRUE(trusting.fault_detail().starts_with(
+        "SSL/TLS certificate presented by peer cannot be verified in tcp_connect()"))
+        << trusting.fault_detail();
+    outcome.get();
     for (const char *const password : {"wrong", static_cast<const char *>(nullptr)}) {
         context refused;
         EXPECT_EQ(soap_ssl_client_context(refused.get(), VERIFIED, good.c_str(), password, nullptr, nullptr,
