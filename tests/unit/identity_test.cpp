@@ -29,6 +29,7 @@ TEST(pointer_table, finds_objects_by_address_and_type_at_every_size)
         EXPECT_EQ(soap_pointer_find(&ctx, &objects[7], 20, nullptr), 0);
     }
     EXPECT_EQ(ctx.pointer_chains, ctx.pointer_table);
+    EXPECT_EQ(ctx.pointer_count, 0U) << "else tables grow with the number of messages";
     expect_empty_table(ctx);
 }
 

@@ -196,7 +196,9 @@ TEST_F(tls, its_bio_says_why_a_transfer_fails_and_whether_another_try_helps)
         const int count = writes ? BIO_write(bio.get(), bytes, sizeof bytes) : BIO_read(bio.get(), bytes, 9);
         return outcome(count, count < 0 ? errno : 0, BIO_should_read(bio.get()), BIO_should_write(bio.get()));
     };
-    EXPECT_EQ(BIO_get_fd(bio.get(), nullptr), ends[0]);
+    int descriptor = -1;
+    EXPECT_EQ(BIO_get_fd(bio.get(), &descriptor), ends[0]);
+    EXPECT_EQ(descriptor, ends[0]);
     EXPECT_EQ(transfer(false), outcome(-1, EAGAIN, true, false)) << "nothing has come";
     EXPECT_EQ(transfer(true), outcome(4096, 0, false, false));
     for (const int error : {EINTR, ECONNRESET}) {
