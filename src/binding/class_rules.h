@@ -334,7 +334,7 @@ void copy_hook(soap *ctx, int, int, void *place, std::size_t, const void *source
     try {
         assign<T>(place, source);
     } catch (const std::bad_alloc &) {
-        fail(ctx, 20);
+        fail(ctx, SOAP_OUT_OF_MEMORY);
     }
 }
 

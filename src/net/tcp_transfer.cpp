@@ -152,7 +152,7 @@ ssize_t send_once(soap *ctx, const char *data, std::size_t length, bool limited,
     *wait_for = WAIT_SEND;
     errno = 0;
     if (ctx->tls_bio != nullptr)
-        return BIO_write(ctx->tls_bio, data, length < INT_MAX ? static_cast<int>(length) : INT_MAX);
+        return BIO_write(ctx->tls_bio, data, tls_length(length));
     const ssize_t sent = tcp_is_udp(ctx) ? send_datagram_with_retries(ctx, data, length, limited)
                                          : send(ctx->socket, data, length, send_flags(ctx, limited));
     call_note_sent(ctx, sent);
@@ -236,7 +236,7 @@ ssize_t recv_once(soap *ctx, char *buffer, std::size_t length, bool limited, int
     }
     if (ctx->tls_bio != nullptr) {
         const int received =
-            BIO_read(ctx->tls_bio, buffer, length < INT_MAX ? static_cast<int>(length) : INT_MAX);
+            BIO_read(ctx->tls_bio, buffer, tls_length(length));
         return received > 0 ? received : 0;
     }
     const int flags = ctx->socket_flags | (limited ? MSG_DONTWAIT : 0);

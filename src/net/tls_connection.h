@@ -6,6 +6,8 @@
 // may outlive a failed attempt, to be cleared and used by the next. The BIO never closes the socket.
 #pragma once
 
+#include <algorithm>
+#include <climits>
 #include <cstddef>
 #include <cstdint>
 
@@ -48,7 +50,15 @@ BIO *tls_bio_new(soap *ctx);
 // Never block from now on (or again as the socket's mode says). Each transfer says anew what it wants.
 void tls_bio_set_nonblocking(BIO *bio, bool nonblocking);
 
+// A length as OpenSSL's calls take it: a longer transfer is made in part.
+inline int tls_length(std::size_t length)
+{
+    return static_cast<int>(std::min<std::size_t>(length, INT_MAX));
+}
+
 // --- tls_transfer.cpp ---
+// What to wait for after a call of OpenSSL that returned `result`; 0: it has failed or ended. Leaves errno alone.
+int tls_wait_flag(const SSL *ssl, int result);
 // One SSL_write or SSL_read, which doesn't block if it is limited in time. Above 0: bytes. Otherwise
 // *wait_for is the WAIT_ flag to wait for before a retry, or 0 if no retry helps; errno has the system's
 // reason, 0 for none.

@@ -25,20 +25,6 @@ constexpr int HANDSHAKE_S = 10; // time limit where the host sets none, seconds
 
 enum class handshake { done, refused, wait_failed, out_of_time };
 
-int wait_flag(const SSL *ssl, int result)
-{
-    switch (SSL_get_error(ssl, result)) {
-    case SSL_ERROR_WANT_READ:
-        return WAIT_RECV;
-    case SSL_ERROR_WANT_WRITE:
-    case SSL_ERROR_WANT_CONNECT:
-    case SSL_ERROR_WANT_ACCEPT:
-        return WAIT_SEND;
-    default:
-        return 0;
-    }
-}
-
 // Runs SSL_connect or SSL_accept to its end. *result is what it returned last.
 handshake take_steps(soap *ctx, int (*step)(SSL *), int timeout, int *result)
 {
@@ -51,7 +37,7 @@ handshake take_steps(soap *ctx, int (*step)(SSL *), int timeout, int *result)
         if (*result > 0 && SSL_is_init_finished(ctx->tls_connection))
             return handshake::done;
         tcp_save_errno(ctx);
-        const int flag = wait_flag(ctx->tls_connection, *result);
+        const int flag = tls_wait_flag(ctx->tls_connection, *result);
         if (flag == 0)
             return handshake::refused;
         const int ready = tcp_wait_until(ctx, ctx->socket, flag | WAIT_ERROR, deadline);

@@ -2,9 +2,9 @@
 //
 // Elsewhere: repeating and waiting (tcp_transfer.cpp), the handshake (tls_handshake.cpp).
 #include <cerrno>
-#include <climits>
 #include <cstdio>
 #include <cstring>
+#include <iterator>
 
 #include <openssl/err.h>
 #include <openssl/ssl.h>
@@ -15,45 +15,17 @@
 
 namespace {
 
-int capped(std::size_t length)
-{
-    return length < INT_MAX ? static_cast<int>(length) : INT_MAX;
-}
-
-// What to wait for after a call that returned `result`; 0: it has failed or ended. Leaves errno alone.
-int wait_flag(const SSL *ssl, int result)
-{
-    switch (SSL_get_error(ssl, result)) {
-    case SSL_ERROR_WANT_READ:
-        return WAIT_RECV;
-    case SSL_ERROR_WANT_WRITE:
-        return WAIT_SEND;
-    default:
-        return 0;
-    }
-}
+constexpr const char *ERROR_NAMES[] = {
+    "SSL_ERROR_SSL",     "SSL_ERROR_WANT_READ",   "SSL_ERROR_WANT_WRITE",  "SSL_ERROR_WANT_X509_LOOKUP",
+    "SSL_ERROR_SYSCALL", "SSL_ERROR_ZERO_RETURN", "SSL_ERROR_WANT_CONNECT"};
+static_assert(SSL_ERROR_SSL == 1 && SSL_ERROR_WANT_CONNECT == std::size(ERROR_NAMES));
 
 const char *error_name(int code, char *space, std::size_t size)
 {
-    switch (code) {
-    case SSL_ERROR_SSL:
-        return "SSL_ERROR_SSL";
-    case SSL_ERROR_ZERO_RETURN:
-        return "SSL_ERROR_ZERO_RETURN";
-    case SSL_ERROR_WANT_READ:
-        return "SSL_ERROR_WANT_READ";
-    case SSL_ERROR_WANT_WRITE:
-        return "SSL_ERROR_WANT_WRITE";
-    case SSL_ERROR_WANT_CONNECT:
-        return "SSL_ERROR_WANT_CONNECT";
-    case SSL_ERROR_WANT_X509_LOOKUP:
-        return "SSL_ERROR_WANT_X509_LOOKUP";
-    case SSL_ERROR_SYSCALL:
-        return "SSL_ERROR_SYSCALL";
-    default:
-        ERR_error_string_n(static_cast<unsigned long>(code), space, size);
-        return space;
-    }
+    if (code >= SSL_ERROR_SSL && code <= SSL_ERROR_WANT_CONNECT)
+        return ERROR_NAMES[code - SSL_ERROR_SSL];
+    ERR_error_string_n(static_cast<unsigned long>(code), space, size);
+    return space;
 }
 
 // A text that grows in a fixed buffer and is cut at its end.
@@ -91,13 +63,25 @@ bool tls_has_own_rules(const soap *ctx)
     return ctx->tls_connection != nullptr && SSL_get_SSL_CTX(ctx->tls_connection) == ctx->tls_context;
 }
 
+int tls_wait_flag(const SSL *ssl, int result)
+{
+    switch (SSL_get_error(ssl, result)) {
+    case SSL_ERROR_WANT_READ:
+        return WAIT_RECV;
+    case SSL_ERROR_WANT_WRITE:
+        return WAIT_SEND;
+    default:
+        return 0;
+    }
+}
+
 int tls_write(soap *ctx, const char *data, std::size_t length, bool limited, int *wait_for)
 {
     ERR_clear_error();
     tls_bio_set_nonblocking(SSL_get_wbio(ctx->tls_connection), limited);
     errno = 0;
-    const int result = SSL_write(ctx->tls_connection, data, capped(length));
-    *wait_for = result > 0 ? 0 : wait_flag(ctx->tls_connection, result);
+    const int result = SSL_write(ctx->tls_connection, data, tls_length(length));
+    *wait_for = result > 0 ? 0 : tls_wait_flag(ctx->tls_connection, result);
     return result;
 }
 
@@ -106,8 +90,8 @@ int tls_read(soap *ctx, char *buffer, std::size_t length, bool limited, int *wai
     ERR_clear_error();
     tls_bio_set_nonblocking(SSL_get_rbio(ctx->tls_connection), limited);
     errno = 0;
-    const int result = SSL_read(ctx->tls_connection, buffer, capped(length));
-    *wait_for = result > 0 ? 0 : wait_flag(ctx->tls_connection, result);
+    const int result = SSL_read(ctx->tls_connection, buffer, tls_length(length));
+    *wait_for = result > 0 ? 0 : tls_wait_flag(ctx->tls_connection, result);
     return result;
 }
 
@@ -133,7 +117,7 @@ int tls_peek(soap *ctx)
     ERR_clear_error();
     tls_bio_set_nonblocking(SSL_get_rbio(ssl), true);
     const int result = SSL_peek(ssl, &byte, 1);
-    return result <= 0 && wait_flag(ssl, result) == WAIT_RECV && !SSL_has_pending(ssl) ? 0 : -1;
+    return result <= 0 && tls_wait_flag(ssl, result) == WAIT_RECV && !SSL_has_pending(ssl) ? 0 : -1;
 }
 
 const char *tls_error_text(soap *ctx, int result)

@@ -34,6 +34,11 @@ TEST_F(tls, a_plain_connection_after_a_failed_tls_one_is_plain)
     ASSERT_EQ(set_up_client(ctx), 0);
     EXPECT_EQ(open_to(ctx, ending.port()), -1);
     EXPECT_TRUE(ctx.fault_text().starts_with("SSL_ERROR_SYSCALL\nEOF was observed")) << ctx.fault_text();
+    peer silent([](int client) { loopback::read_bytes(client, 100000); });
+    socket_calls::fail_recv = {1, ECONNRESET};
+    EXPECT_EQ(open_to(ctx, silent.port()), -1);
+    EXPECT_EQ(ctx.fault_text(),
+              "SSL_ERROR_SYSCALL\nError observed by underlying BIO: Connection reset by peer");
     ASSERT_GE(tcp_connect(ctx.get(), "http://peer/", "peer.test", plain.port()), 0);
     EXPECT_EQ((ctx->input_mode | ctx->output_mode) & MODE_TLS, 0u);
     EXPECT_EQ(exchange(ctx, "plain"), "plain");
