@@ -3,6 +3,7 @@
 // Elsewhere: numbers (values), whole objects (class_ops.cpp).
 #include "binding/member_read.h"
 
+#include <bit>
 #include <cstring>
 #include <string_view>
 
@@ -37,10 +38,29 @@ bool ends(soap *ctx, const char *tag, bool body)
     return !body || soap_element_in_end(ctx, tag) == 0;
 }
 
+// Out of line: texts that wait have had space for their successors as a rule.
+[[gnu::noinline]] void assign_to_larger(std::string &text, std::string_view content)
+{
+    std::string larger;
+    larger.reserve(std::bit_ceil(content.size() + 1) -
+                   1); // so that it waits where it was found, the next time too
+    larger.assign(content);
+    text.swap(larger);
+}
+
+// Fills a text that idle_texts found.
+void assign_to_idle(std::string &text, std::string_view content)
+{
+    if (content.size() > text.capacity())
+        assign_to_larger(text, content);
+    else
+        text.assign(content);
+}
+
 // A new text of the context. Null with SOAP_OUT_OF_MEMORY.
 std::string *new_text(soap *ctx, std::string_view content = {})
 {
-    soap_instance *instance = instance_reuse(ctx, TEXT_TYPE_ID);
+    soap_instance *instance = instance_reuse(ctx, idle_texts(content.size()));
     if (instance == nullptr)
         instance = soap_instance_register(ctx, nullptr, TEXT_TYPE_ID, -1, soap_delete_object);
     if (instance == nullptr)
@@ -48,7 +68,7 @@ std::string *new_text(soap *ctx, std::string_view content = {})
     try {
         auto *text = static_cast<std::string *>(instance->object);
         if (text != nullptr)
-            text->assign(content);
+            assign_to_idle(*text, content);
         else
             text = new std::string(content);
         memory_charge(ctx, sizeof *text);
@@ -73,14 +93,15 @@ bool append_text(soap *ctx, std::vector<std::string> &vector, std::string_view c
     vector_charge(ctx, vector);
     text_charge(ctx, content.size(), text_in_place());
     try {
-        soap_instance *idle = content.size() > text_in_place() ? idle_take(ctx, TEXT_TYPE_ID) : nullptr;
+        soap_instance *idle =
+            content.size() > text_in_place() ? idle_take(ctx, idle_texts(content.size())) : nullptr;
         if (idle == nullptr) {
             vector.emplace_back(content);
             return true;
         }
         auto *text = static_cast<std::string *>(idle->object);
         const idle_shell shell = {ctx, idle};
-        text->assign(content);
+        assign_to_idle(*text, content);
         vector.push_back(std::move(*text));
         return true;
     } catch (const std::bad_alloc &) {

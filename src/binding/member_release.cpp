@@ -16,12 +16,23 @@ namespace binding {
 namespace {
 
 constexpr int TEXT_TYPE_ID = 8;
-static_assert(TYPE_ID_MAX < IDLE_TYPES && TEXT_TYPE_ID != IDLE_SHELLS);
+static_assert(TYPE_ID_MAX < IDLE_TEXTS && IDLE_SHELLS == 0);
 
 std::size_t allocated(const std::string &text)
 {
     static const std::size_t in_place = std::string().capacity();
     return text.capacity() > in_place ? text.capacity() + 1 : 0;
+}
+
+// What a message held, passwords too, is not to be found in memory that waits. Most texts are so short that a
+// call would cost more than the stores.
+void wipe(std::string &text)
+{
+    constexpr std::size_t AT_ONCE = 16;
+    if (text.capacity() >= AT_ONCE - 1 && text.size() <= AT_ONCE)
+        std::memset(text.data(), 0, AT_ONCE);
+    else
+        std::memset(text.data(), 0, text.size());
 }
 
 // An empty text to take another's memory; null if memory runs out.
@@ -43,8 +54,7 @@ soap_instance *empty_text(soap *ctx)
 
 std::size_t release_text(std::string &text)
 {
-    // What a message held, passwords too, is not to be found in memory that waits.
-    std::memset(text.data(), 0, text.size());
+    wipe(text);
     text.clear();
     return allocated(text);
 }
@@ -57,13 +67,14 @@ std::size_t release_text(std::string &text)
     for (std::size_t i = texts.size(); i-- > 0;) {
         std::string &text = texts[i];
         const std::size_t bytes = sizeof text + allocated(text);
-        if (bytes == sizeof text || !idle_has_space(owner, TEXT_TYPE_ID, bytes))
+        const int list = idle_texts(text.capacity());
+        if (bytes == sizeof text || !idle_has_space(owner, list, bytes))
             continue;
         soap_instance *shell = empty_text(owner);
         if (shell == nullptr)
             return;
         static_cast<std::string *>(shell->object)->swap(text);
-        idle_give(owner, TEXT_TYPE_ID, shell, bytes);
+        idle_give(owner, list, shell, bytes);
     }
 }
 
@@ -73,19 +84,32 @@ void release_texts(soap *owner, std::vector<std::string> &texts)
         release_each(owner, texts);
 }
 
-std::size_t instance_recycle(soap *ctx, soap_instance *instance)
+static bool recycle_text(soap *ctx, soap_instance *instance)
+{
+    auto &text = *static_cast<std::string *>(instance->object);
+    const std::size_t bytes = sizeof text + allocated(text);
+    const int list = idle_texts(text.capacity());
+    if (!idle_has_space(ctx, list, bytes))
+        return false;
+    release_text(text);
+    idle_give(ctx, list, instance, bytes);
+    return true;
+}
+
+bool instance_recycle(soap *ctx, soap_instance *instance)
 {
     if (instance->delete_hook != soap_delete_object)
-        return 0;
-    if (instance->type_id == TEXT_TYPE_ID) {
-        auto &text = *static_cast<std::string *>(instance->object);
-        const std::size_t bytes = sizeof text + allocated(text);
-        return idle_has_space(ctx, TEXT_TYPE_ID, bytes) ? sizeof text + release_text(text) : 0;
-    }
+        return false;
+    if (instance->type_id == TEXT_TYPE_ID)
+        return recycle_text(ctx, instance);
     const type_entry *entry = type_entry_of(instance->type_id);
-    if (entry == nullptr)
-        return 0;
-    return entry->kind == type_kind::object ? entry->ops->recycle(instance->object, ctx) : 0;
+    if (entry == nullptr || entry->kind != type_kind::object || !idle_has_space(ctx, instance->type_id, 1))
+        return false;
+    const std::size_t bytes = entry->ops->recycle(instance->object, ctx);
+    if (!idle_has_bytes(ctx->pools->idle, bytes)) // texts of its vectors wait by now
+        return false;
+    idle_give(ctx, instance->type_id, instance, bytes);
+    return true;
 }
 
 } // namespace binding

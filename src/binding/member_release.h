@@ -18,8 +18,8 @@ std::size_t release_text(std::string &text);
 // The same for texts in a vector: their memory waits for texts of the context.
 void release_texts(soap *owner, std::vector<std::string> &texts);
 
-// soap_upcalls::recycle: classes and texts can be used again.
-std::size_t instance_recycle(soap *ctx, soap_instance *instance);
+// soap_upcalls::recycle: objects of classes and texts can be used again.
+bool instance_recycle(soap *ctx, soap_instance *instance);
 
 template <class V> std::size_t release_value(soap *, V &)
 {

@@ -167,7 +167,7 @@ void *make_block(soap *ctx, std::size_t size, int count)
 void *make_instance(soap *ctx, const type_entry &entry, int type, int count)
 {
     soap_instance *instance =
-        count < 0 && entry.kind == type_kind::text ? instance_reuse(ctx, type) : nullptr;
+        count < 0 && entry.kind == type_kind::text ? instance_reuse(ctx, idle_texts(0)) : nullptr;
     if (instance == nullptr)
         instance = soap_instance_register(ctx, nullptr, type, count, soap_delete_object);
     if (instance == nullptr)

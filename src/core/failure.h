@@ -48,9 +48,9 @@ struct soap_upcalls {
     int (*make_fault)(soap *ctx, fault_side side, const char *text, const char *detail, int error);
     // Of the present fault; an empty one is made where there is none.
     fault_texts (*read_fault)(soap *ctx);
-    // Empties the object of an instance for its next use, if it is of a kind that can have one: the bytes that
-    // it goes on holding, 0 if it has to be destroyed.
-    std::size_t (*recycle)(soap *ctx, soap_instance *instance);
+    // Empties the object of an instance and keeps it for its next use (instance_pool.h), if it is of a kind that
+    // can have one and there is space. False: it has to be destroyed.
+    bool (*recycle)(soap *ctx, soap_instance *instance);
 };
 
 // Ends with an error that has texts of its own: as fail(), and the fault has them. `text` and `detail` are

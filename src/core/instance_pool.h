@@ -9,6 +9,8 @@
 // belongs to one context. A message that holds more than that gives the pool back what it took, and no more.
 #pragma once
 
+#include <algorithm>
+#include <bit>
 #include <cstddef>
 #include <cstdint>
 
@@ -19,6 +21,16 @@
 
 // A place for empty texts, whose memory has gone to a text in a vector: no object has this type.
 constexpr int IDLE_SHELLS = 0;
+
+// Texts wait by the characters that they have space for: under 16, under 64 and so on by fours. Else those of a
+// steady caller would all become as large as its longest one.
+constexpr int IDLE_TEXTS = IDLE_TYPES - 8;
+inline int idle_texts(std::size_t length)
+{
+    return length < 16
+               ? IDLE_TEXTS
+               : std::min(IDLE_TEXTS + static_cast<int>(std::bit_width(length) - 3) / 2, IDLE_TYPES - 1);
+}
 
 // Before objects or blocks are released: how much of them may wait.
 void idle_release_begin(soap *ctx);
@@ -43,13 +55,19 @@ inline void idle_give(soap *ctx, int type_id, soap_instance *instance, std::size
     idle.bytes += bytes;
 }
 
-// The object of this type that was released last; null if none waits. It is in no list of the context.
+// The object that was released last to the list of this type, or to one of texts; null if none waits. It is in
+// no list of the context.
 inline soap_instance *idle_take(soap *ctx, int type_id)
 {
     soap_memory_pools *pools = ctx->pools; // NOLINT(clang-analyzer-core.NullDereference): no call lacks one
     if (pools == nullptr || pools->idle.objects[type_id].first == nullptr)
         return nullptr;
-    soap_instance *instance = pools->idle.objects[type_id].pop();
+    idle_list<soap_instance> &list = pools->idle.objects[type_id];
+    soap_instance *instance = list.pop();
+    if (list.count > IDLE_MANY) { // the next one comes from memory while this one is filled
+        __builtin_prefetch(list.first->object, 1);
+        __builtin_prefetch(list.first->next, 1);
+    }
     pools->idle.bytes -= static_cast<std::size_t>(instance->array_size);
     instance->array_size = -1;
     return instance;

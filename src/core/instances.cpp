@@ -51,14 +51,7 @@ namespace {
 // True if the object waits for the next message.
 bool keep_instance(soap *ctx, soap_instance *instance)
 {
-    if (instance->array_size >= 0 || instance->object == nullptr || instance->type_id <= IDLE_SHELLS ||
-        instance->type_id >= IDLE_TYPES || !idle_has_space(ctx, instance->type_id, 1))
-        return false;
-    const std::size_t bytes = ctx->upcalls->recycle(ctx, instance);
-    if (bytes == 0 || !idle_has_bytes(ctx->pools->idle, bytes)) // texts of its vectors wait by now
-        return false;
-    idle_give(ctx, instance->type_id, instance, bytes);
-    return true;
+    return instance->array_size < 0 && instance->object != nullptr && ctx->upcalls->recycle(ctx, instance);
 }
 
 // The record must be out of the list: a destructor may come back to it.

@@ -235,8 +235,7 @@ ssize_t recv_once(soap *ctx, char *buffer, std::size_t length, bool limited, int
         return 0;
     }
     if (ctx->tls_bio != nullptr) {
-        const int received =
-            BIO_read(ctx->tls_bio, buffer, tls_length(length));
+        const int received = BIO_read(ctx->tls_bio, buffer, tls_length(length));
         return received > 0 ? received : 0;
     }
     const int flags = ctx->socket_flags | (limited ? MSG_DONTWAIT : 0);

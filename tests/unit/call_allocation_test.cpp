@@ -250,6 +250,24 @@ TEST(released_objects, of_a_large_message_leave_the_pool_as_it_was)
     EXPECT_GT(calls.call(5), 20U);
 }
 
+// Members that are texts are released in another order than texts in vectors, so that they change places.
+TEST(released_objects, stay_as_large_as_what_they_hold)
+{
+    steady_calls calls;
+    std::size_t first = 0;
+    for (std::size_t i = 0; i < 100; ++i) {
+        const std::string contact = "<c:contact><c:name>" + std::string(500, 'n') + "</c:name><c:email>" +
+                                    std::string(20 + i % 40, 'e') + "</c:email></c:contact>";
+        std::string contacts;
+        for (int n = 0; n < 20; ++n)
+            contacts += contact;
+        calls.call(answer_envelope("<E:Body><p:getResponse>" + contacts + "</p:getResponse></E:Body>"));
+        ASSERT_NE(calls.proxy.pools, nullptr);
+        first = first != 0 ? first : calls.proxy.pools->idle.bytes;
+    }
+    EXPECT_LT(calls.proxy.pools->idle.bytes, first * 5 / 4);
+}
+
 TEST(released_objects, that_are_no_longer_needed_go_slowly)
 {
 #if defined(ZUV_SANITIZED)
