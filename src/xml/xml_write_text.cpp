@@ -281,15 +281,25 @@ template <place P> int write_wide(soap *ctx, const char32_t *text)
     return output.flush();
 }
 
-} // namespace
-
-int soap_text_write_n(soap *ctx, const char *text, std::size_t length, int flag)
+// Out of line: what escapes need costs the texts that need none more than the look at them.
+[[gnu::noinline]] int write_any(soap *ctx, const char *text, std::size_t length, int flag)
 {
     if (flag != 0)
         return write_text<place::attribute>(ctx, text, length, flag);
     if (ctx->mode & MODE_CANONICAL)
         return write_text<place::canonical_element>(ctx, text, length, flag);
     return write_text<place::element>(ctx, text, length, 0);
+}
+
+} // namespace
+
+int soap_text_write_n(soap *ctx, const char *text, std::size_t length, int flag)
+{
+    constexpr std::size_t SHORT = 256; // bytes
+    if (flag == 0 && length <= SHORT && !(ctx->mode & MODE_CANONICAL) &&
+        clean_length<place::element>(text, length) == length)
+        return soap_send_bytes(ctx, text, length);
+    return write_any(ctx, text, length, flag);
 }
 
 int soap_text_write(soap *ctx, const char *text, int flag)
