@@ -7,12 +7,12 @@
 #pragma once
 
 #include <cstddef>
-#include <cstring>
 
 #include <zuv_client_pro/soap_error.h>
 #include <zuv_client_pro/soap_io.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "core/copy_short.h"
 #include "core/failure.h"
 #include "core/message_store.h"
 
@@ -78,7 +78,7 @@ inline int xml_open_plain(soap *ctx, const char *tag, std::size_t length)
     char *place = xml_reserve(ctx, length + 2);
     if (place != nullptr) {
         *place = '<';
-        std::memcpy(place + 1, tag, length);
+        copy_short(place + 1, tag, length);
         place[length + 1] = '>';
     } else if (xml_only_counts(ctx)) {
         ctx->message_count += length + 2;
@@ -99,7 +99,7 @@ inline int xml_close_plain(soap *ctx, const char *tag, std::size_t length)
     if (place != nullptr) {
         place[0] = '<';
         place[1] = '/';
-        std::memcpy(place + 2, tag, length);
+        copy_short(place + 2, tag, length);
         place[length + 2] = '>';
     } else if (xml_only_counts(ctx)) {
         ctx->message_count += length + 3;
