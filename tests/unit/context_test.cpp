@@ -173,8 +173,11 @@ TEST_F(context_copy, keeps_settings_and_shares_nothing_that_is_owned)
     ASSERT_EQ(soap_set_namespaces(&source, soap_program_namespaces), 0);
     soap_log_set_sent(&source, "sent.log");
     source.zlib_buffer = static_cast<char *>(SOAP_MALLOC(&source, 16));
+    source.encoding_style = source.local_namespaces[1].received =
+        static_cast<char *>(SOAP_MALLOC(&source, 8));
 
     soap copy(source);
+    EXPECT_STREQ(copy.encoding_style, "") << "the style went with the table";
     EXPECT_EQ(copy.state, 2);
     EXPECT_EQ(copy.input_mode, MODE_STRICT);
     EXPECT_EQ(copy.recv_timeout, 7);

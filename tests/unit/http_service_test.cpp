@@ -38,6 +38,11 @@ TEST(request, is_recognised_by_its_method)
                            "\r\n\r\n<a/>"),
               0);
     EXPECT_EQ(std::string(wire.endpoint).size(), SOAP_TEXT_SIZE - 1);
+    for (const char minor : {'0', '1'}) {
+        wire.output_mode = MODE_CHUNKED;
+        EXPECT_EQ(wire.request(std::string("POST / HTTP/1.") + minor + "\r\n\r\n<a/>"), 0);
+        EXPECT_EQ(wire.output_mode & MODE_IO_MASK, minor == '0' ? MODE_STORE : MODE_CHUNKED);
+    }
 }
 
 TEST(request, of_options_or_head_is_answered_at_once)
@@ -166,6 +171,7 @@ TEST(response_out, names_the_status)
         {"a file", STATUS_FILE, 1, "HTTP/1.1 200 OK\r\n",
          [](memory_wire &wire) { wire.http_content = "image/png"; }, "image/png"},
         {"HTTP status", 404, 5, "HTTP/1.1 404 Not Found\r\n"},
+        {"the gateway's", 503, 5, "HTTP/1.1 503 Service Unavailable\r\n"},
         {"unknown HTTP status", 299, 5, "HTTP/1.1 299 \r\n"},
         {"challenge", 401, 5,
          "HTTP/1.1 401 Unauthorized\r\nWWW-Authenticate: Basic realm=\"zuv Web Service\"\r\n"},
