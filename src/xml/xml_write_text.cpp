@@ -21,9 +21,11 @@
 #include <zuv_client_pro/soap_memory.h>
 #include <zuv_client_pro/soap_xml.h>
 
+#include "core/copy_short.h"
 #include "core/failure.h"
 #include "xml/xml_scan.h"
 #include "xml/xml_write.h"
+#include "xml/xml_write_fast.h"
 
 namespace {
 
@@ -297,8 +299,13 @@ int soap_text_write_n(soap *ctx, const char *text, std::size_t length, int flag)
 {
     constexpr std::size_t SHORT = 256; // bytes
     if (flag == 0 && length <= SHORT && !(ctx->mode & MODE_CANONICAL) &&
-        clean_length<place::element>(text, length) == length)
-        return soap_send_bytes(ctx, text, length);
+        clean_length<place::element>(text, length) == length) {
+        char *const to = xml_reserve(ctx, length);
+        if (to == nullptr)
+            return soap_send_bytes(ctx, text, length);
+        copy_short(to, text, length);
+        return SOAP_OK;
+    }
     return write_any(ctx, text, length, flag);
 }
 
