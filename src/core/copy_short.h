@@ -3,27 +3,29 @@
 
 #include <cstddef>
 #include <cstring>
-#include <type_traits>
+
+template <std::size_t Size>
+[[gnu::always_inline]] inline void copy_both_ends(char *to, const char *from, std::size_t length)
+{
+    char first[Size];
+    char last[Size];
+    std::memcpy(first, from, Size);
+    std::memcpy(last, from + length - Size, Size);
+    std::memcpy(to, first, Size);
+    std::memcpy(to + length - Size, last, Size);
+}
 
 // As memcpy, for lengths that are under 33 nearly always: two stores of a fixed size, which may overlap.
 [[gnu::always_inline]] inline void copy_short(char *to, const char *from, std::size_t length)
 {
-    const auto both_ends = [&]<std::size_t Size>(std::integral_constant<std::size_t, Size>) {
-        char first[Size];
-        char last[Size];
-        std::memcpy(first, from, Size);
-        std::memcpy(last, from + length - Size, Size);
-        std::memcpy(to, first, Size);
-        std::memcpy(to + length - Size, last, Size);
-    };
     if (length - 8 <= 8) // the commonest first
-        both_ends(std::integral_constant<std::size_t, 8>{});
+        copy_both_ends<8>(to, from, length);
     else if (length - 16 <= 16)
-        both_ends(std::integral_constant<std::size_t, 16>{});
+        copy_both_ends<16>(to, from, length);
     else if (length > 32)
         std::memcpy(to, from, length);
     else if (length >= 4)
-        both_ends(std::integral_constant<std::size_t, 4>{});
+        copy_both_ends<4>(to, from, length);
     else
         for (std::size_t i = 0; i < length; ++i)
             to[i] = from[i];
