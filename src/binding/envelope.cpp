@@ -279,7 +279,7 @@ int code_out(soap *ctx, const char *tag, const char *code)
     if (code == nullptr)
         return SOAP_OK;
     const char *mapped = soap_qname_write_map(ctx, code);
-    if (soap_element_out_begin(ctx, tag, -1, "") || soap_text_write(ctx, mapped, 0))
+    if (mapped == nullptr || soap_element_out_begin(ctx, tag, -1, "") || soap_text_write(ctx, mapped, 0))
         return ctx->error;
     return soap_element_out_end(ctx, tag);
 }

@@ -1,5 +1,6 @@
 // fault_detail_test.cpp - each fault that a detail may bring, as a service writes it and a client reads it:
-// whole, met twice and cut short. Elsewhere: with each allocation refused (call_allocation_test.cpp).
+// whole, met twice, cut short, and written with each send and each allocation refused. Elsewhere: read with each
+// allocation refused (call_allocation_test.cpp).
 #include <regex>
 
 #include <zuv_client_pro/ProfileSoapBindingProxy.h>
@@ -55,7 +56,7 @@ std::vector<const protocol__Fault *> faults_in(const SOAP_ENV__Detail &detail)
     return found;
 }
 
-// What was sent, again: with each send refused, and cut after each tag.
+// What was sent, again: with each send and each allocation refused, and cut after each tag.
 template <class Fill> void fails_wherever_it_ends(const sender &whole, std::int16_t version, Fill fill)
 {
     for (std::size_t sends = 0; sends < whole.sends.size(); ++sends) {
@@ -64,8 +65,21 @@ template <class Fill> void fails_wherever_it_ends(const sender &whole, std::int1
         failing.send_limit = sends;
         EXPECT_NE(failing.put(false), 0) << "after " << sends << " pieces";
     }
-    memory_wire in;
     const std::string xml = whole.sent();
+    std::unique_ptr<sender> poor;
+    int result = 0;
+    const auto check = [&](bool refused) { // what only saves time can do without memory
+        if (poor != nullptr) {
+            EXPECT_TRUE(result == 0 ? std::string(poor->buffer, poor->buffer_index) == xml
+                                    : refused && result == SOAP_OUT_OF_MEMORY);
+        }
+        poor = std::make_unique<sender>(version, MODE_BUFFERED);
+        fill(*poor);
+    };
+    check(false);
+    failing_malloc::at_each_allocation(
+        failing_malloc::refuse::one, [&] { result = poor->put(false); }, check);
+    memory_wire in;
     for (std::size_t cut = xml.find('>'); cut + 1 < xml.size(); cut = xml.find('>', cut + 1))
         EXPECT_TRUE(read_fault(in, version, xml.substr(0, cut)) != 0 || in.fault == nullptr)
             << xml.substr(0, cut);
