@@ -11,6 +11,8 @@
 #include <system_error>
 #include <vector>
 
+#include <malloc.h>
+
 #include <CLI/CLI.hpp>
 
 #include <zuv_client_pro/soap_log.h>
@@ -244,8 +246,17 @@ void serve_until_signal(const options &o)
     server.stop();
 }
 
+// Sets from when on freed memory goes back to the system by itself: by default malloc comes to keep up to 64 MB at the
+// end of each thread's heap once a block of 32 MB was freed, and malloc_trim leaves those.
+void limit_free_memory()
+{
+    mallopt(M_MMAP_THRESHOLD, 4 << 20); // bytes
+    mallopt(M_TRIM_THRESHOLD, 8 << 20);
+}
+
 int run(int argc, char **argv)
 {
+    limit_free_memory();
     g_TraceLogFile[0] = '\0'; // no trace unless asked for
     std::signal(SIGXFSZ,
                 SIG_IGN); // a file at its limit is refused, as by a full disk, and the program goes on
