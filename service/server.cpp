@@ -140,11 +140,13 @@ void server::open_connection(soap *copy)
         soap_context_free(copy);
         return;
     }
-    const auto place = connections_.insert(connections_.end(), connection{copy->socket, false, {}});
+    auto place = connections_.end();
     try {
+        place = connections_.insert(connections_.end(), connection{copy->socket, false, {}});
         place->thread = std::thread([this, copy, place] { serve(copy, place); });
-    } catch (const std::system_error &) { // no thread to be had: the client may try again
-        connections_.erase(place);
+    } catch (const std::exception &) { // neither memory nor a thread to be had: the client may try again
+        if (place != connections_.end())
+            connections_.erase(place);
         soap_context_free(copy);
     }
 }

@@ -78,7 +78,7 @@ TEST_F(graphs, come_back_with_the_same_sharing)
     for_each_class(ctx, [&](int id, const binding::type_entry &entry) {
         for (unsigned seed = 0; seed < GRAPHS; ++seed) {
             source random(&ctx, seed * 1000 + static_cast<unsigned>(id), true);
-            void *object = soap_instantiate(&ctx, id, nullptr, nullptr, nullptr);
+            void *object = made_whole<void>(soap_instantiate(&ctx, id, nullptr, nullptr, nullptr));
             random.lend(id, object);
             row_of(id)->fill(random, object, DEPTH);
             for (const form &how : forms) {

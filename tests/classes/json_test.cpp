@@ -45,7 +45,7 @@ TEST(json, carries_every_class_to_an_equal_object)
         source random(&ctx, static_cast<unsigned>(id), shares);
         sharing seen;
         compared = shares ? &seen : nullptr;
-        void *const object = soap_instantiate(&ctx, id, nullptr, nullptr, nullptr);
+        void *const object = made_whole<void>(soap_instantiate(&ctx, id, nullptr, nullptr, nullptr));
         row_of(id)->fill(random, object, 3);
         const std::string xml = written(ctx, *entry.ops, object), json = cli::json_of(xml, *type);
         const std::string again = cli::xml_of(json, *type, "random");

@@ -6,6 +6,7 @@
 #pragma once
 
 #include <map>
+#include <stdexcept>
 
 #include <zuv_client_pro/type_ids.h>
 
@@ -16,6 +17,14 @@
 namespace random_objects {
 
 class source;
+
+// What the library made. Where memory has run out the test ends: it can't go on with nothing.
+template <class T> T *made_whole(void *made)
+{
+    if (made == nullptr)
+        throw std::runtime_error("no memory for an object");
+    return static_cast<T *>(made);
+}
 
 // What can be done with an object of which only the type id is known.
 struct class_row {
@@ -78,7 +87,7 @@ public:
         if (T *shared = again<T>(binding::traits<T>::type_id))
             return shared;
         const binding::class_ops *ops = chance(2) ? derived(binding::ops_of<T>) : &binding::ops_of<T>;
-        void *made = soap_instantiate(ctx_, ops->type_id, nullptr, nullptr, nullptr);
+        void *made = made_whole<void>(soap_instantiate(ctx_, ops->type_id, nullptr, nullptr, nullptr));
         if (ops == &binding::ops_of<T>)
             lend(ops->type_id, made);
         row_of(ops->type_id)->fill(*this, made, depth);
@@ -139,20 +148,20 @@ template <class V> void fill_new(source &random, V &value, int type_id, int dept
     else if constexpr (std::is_arithmetic_v<V>)
         value = static_cast<V>(random.below(1000000)) - 500000;
     else if constexpr (std::is_same_v<V, xsd__base64Binary *>) {
-        value = static_cast<V>(soap_instantiate(random.ctx(), 10, nullptr, nullptr, nullptr));
+        value = made_whole<xsd__base64Binary>(soap_instantiate(random.ctx(), 10, nullptr, nullptr, nullptr));
         value->size = static_cast<int>(1 + random.below(60));
-        value->content = static_cast<unsigned char *>(soap_block_alloc(random.ctx(), 64));
+        value->content = made_whole<unsigned char>(soap_block_alloc(random.ctx(), 64));
         for (int i = 0; i < value->size; ++i)
             value->content[i] = static_cast<unsigned char>(random.below(256));
     } else if constexpr (std::is_pointer_v<V>) {
         using target = std::remove_pointer_t<V>;
         if constexpr (std::is_same_v<target, std::string>) {
-            value = static_cast<V>(soap_instantiate(random.ctx(), 8, nullptr, nullptr, nullptr));
+            value = made_whole<target>(soap_instantiate(random.ctx(), 8, nullptr, nullptr, nullptr));
             fill_value(random, *value, type_id, depth);
         } else if constexpr (std::is_class_v<target>) {
             value = random.object<target>(depth - 1);
         } else {
-            value = static_cast<V>(soap_block_alloc(random.ctx(), sizeof(target)));
+            value = made_whole<target>(soap_block_alloc(random.ctx(), sizeof(target)));
             *value = target{};
             fill_value(random, *value, type_id, depth);
         }

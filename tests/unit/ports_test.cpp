@@ -56,7 +56,8 @@ template <class R> R *request_of(const operation &row, soap *ctx)
     if (soap_receive_begin(ctx) == 0 && soap_envelope_in_begin(ctx) == 0 && soap_header_get(ctx) == 0 &&
         soap_body_in_begin(ctx) == 0) {
         request = static_cast<R *>(soap_instantiate(ctx, R().soap_type(), nullptr, nullptr, nullptr));
-        request->soap_get(ctx, (row.tag() + "Request").c_str(), nullptr);
+        if (request != nullptr)
+            request->soap_get(ctx, (row.tag() + "Request").c_str(), nullptr);
     }
     EXPECT_TRUE(request && soap_body_in_end(ctx) == 0 && soap_envelope_in_end(ctx) == 0 &&
                 soap_receive_finish(ctx) == 0)
