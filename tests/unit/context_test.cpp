@@ -174,7 +174,7 @@ TEST_F(context_copy, keeps_settings_and_shares_nothing_that_is_owned)
     soap_log_set_sent(&source, "sent.log");
     source.zlib_buffer = static_cast<char *>(SOAP_MALLOC(&source, 16));
     source.encoding_style = source.local_namespaces[1].received =
-        static_cast<char *>(SOAP_MALLOC(&source, 8));
+        std::strcpy(static_cast<char *>(SOAP_MALLOC(&source, 8)), "urn:in");
 
     soap copy(source);
     EXPECT_STREQ(copy.encoding_style, "") << "the style went with the table";
