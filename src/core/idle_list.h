@@ -11,7 +11,8 @@
 constexpr int IDLE_TYPES = 1024;             // objects of higher type ids are not kept
 constexpr std::size_t IDLE_BLOCK_SPANS = 64; // blocks of up to 8 times as many bytes are kept
 constexpr std::uint32_t RELEASES_TO_THIN = 64;
-constexpr std::uint32_t IDLE_MANY = 2048; // records: more than the near caches of a processor hold
+constexpr std::uint32_t RELEASED_TO_MERGE = 2048; // records of a large message
+constexpr std::uint32_t IDLE_MANY = 2048;         // records: more than the near caches of a processor hold
 
 // The records of one kind, newest first.
 template <class Record> struct idle_list {

@@ -3,6 +3,7 @@
 
 #include <algorithm>
 #include <iterator>
+#include <new>
 
 #include <zuv_client_pro/soap_memory.h>
 
@@ -52,6 +53,13 @@ void idle_release_begin(soap *ctx)
         idle_drop(ctx);
     idle.large = ctx->memory_held > 0 && static_cast<std::uint64_t>(ctx->memory_held) > ctx->pool_limit;
     idle.bytes_max = static_cast<std::size_t>(std::min<std::uint64_t>(ctx->pool_limit, INT32_MAX));
+}
+
+void merge_freed_blocks()
+{
+    constexpr std::size_t LARGER = 4096;                         // bytes
+    void *volatile block = ::operator new(LARGER, std::nothrow); // volatile, or the two would be left out
+    ::operator delete(block);
 }
 
 void idle_release_end(soap *ctx)

@@ -37,6 +37,24 @@ void idle_release_begin(soap *ctx);
 // After all objects were released.
 void idle_release_end(soap *ctx);
 
+// Has malloc merge the small blocks that it was given back. glibc merges them only when it is asked for a larger one, and then
+// all: those of a large message would have left the processor's caches by then.
+void merge_freed_blocks();
+
+// Releases one record after another, until `release_next` finds no more. Between idle_release_begin and idle_release_end.
+template <class ReleaseNext> void idle_release_each(const soap *ctx, ReleaseNext release_next)
+{
+    if (ctx->pools == nullptr || !ctx->pools->idle.large) { // most of them wait
+        while (release_next()) {
+        }
+        return;
+    }
+    for (std::uint32_t released = 1; release_next(); ++released) {
+        if (released % RELEASED_TO_MERGE == 0)
+            merge_freed_blocks();
+    }
+}
+
 // True if an object of the type that holds so many bytes may wait.
 inline bool idle_has_space(const soap *ctx, int type_id, std::size_t bytes)
 {

@@ -77,13 +77,16 @@ void forget_envelope_records(soap *ctx, const void *object)
 void destroy_all(soap *ctx)
 {
     idle_release_begin(ctx);
-    while (ctx->instance_list != nullptr) {
+    idle_release_each(ctx, [ctx] {
         soap_instance *instance = ctx->instance_list;
+        if (instance == nullptr)
+            return false;
         ctx->instance_list = instance->next;
         if (instance->next != nullptr) // objects are scattered: the next one comes while this one goes
             __builtin_prefetch(instance->next->object);
         destroy_instance(ctx, instance);
-    }
+        return true;
+    });
     idle_release_end(ctx);
     forget_envelope_records(ctx, nullptr);
 }

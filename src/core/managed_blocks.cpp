@@ -203,12 +203,15 @@ void forget_managed_fields(soap *ctx)
 
 void free_all_blocks(soap *ctx)
 {
-    while (ctx->allocation_list != nullptr && check_canary(ctx, ctx->allocation_list) == SOAP_OK) {
+    idle_release_each(ctx, [ctx] {
         soap_block_trailer *trailer = ctx->allocation_list;
+        if (trailer == nullptr || check_canary(ctx, trailer) != SOAP_OK)
+            return false;
         ctx->allocation_list = trailer->next;
         __builtin_prefetch(trailer->next); // blocks are scattered: the next one comes while this one goes
         free_block(ctx, trailer);
-    }
+        return true;
+    });
     credentials_wipe(ctx);
     forget_managed_fields(ctx); // after a damaged block too: what they point to may be gone
 }
