@@ -29,8 +29,11 @@ TEST_F(context, ends_quietly_and_only_once_and_may_start_again)
         soap ctx;
         ctx.on_post = nullptr;
         ctx.on_malloc = [](soap *, std::size_t) -> void * { return nullptr; };
+        ctx.credentials_passed = true;
+        std::strcpy(ctx.scratch_text, "secret");
         soap_engine_done(&ctx);
         EXPECT_EQ(ctx.state, 0);
+        EXPECT_STREQ(ctx.scratch_text, "");
         EXPECT_EQ(ctx.on_post, http_write_request) << "the callbacks are the engine's again";
         EXPECT_EQ(ctx.on_malloc, nullptr);
         soap_engine_done(&ctx);

@@ -155,6 +155,19 @@ TEST_F(dispatch, a_single_value_is_marked_for_the_reference_to_it)
     }
 }
 
+TEST_F(dispatch, a_detail_is_marked_with_what_it_holds)
+{
+    ctx.mode = SOAP_XML_GRAPH;
+    std::string name = "n";
+    protocol__Identity held;
+    held.name = &name;
+    SOAP_ENV__Detail detail{};
+    detail.fault = &held;
+    detail.__type = held.soap_type();
+    soap_mark_object(&ctx, &detail, SOAP_TYPE_SOAP_ENV__Detail);
+    EXPECT_NE(0, soap_pointer_find(&ctx, &name, SOAP_TYPE_xsd__string, nullptr));
+}
+
 TEST_F(dispatch, an_absent_item_writes_nothing_and_a_nil_record_is_null)
 {
     std::vector<protocol__Identity *> items = {
@@ -199,7 +212,13 @@ TEST_F(dispatch, arrays_are_made_of_whatever_may_be_in_one)
             continue;
         SCOPED_TRACE(type);
         std::size_t one = 0, three = 0;
-        EXPECT_NE(nullptr, soap_instantiate(&ctx, type, nullptr, nullptr, &one));
+        const void *const made_one = soap_instantiate(&ctx, type, nullptr, nullptr, &one);
+        ASSERT_NE(nullptr, made_one);
+        if (entry.kind == type_kind::simple || entry.kind == type_kind::enumeration) {
+            EXPECT_EQ(std::string(static_cast<const char *>(made_one), one), std::string(one, '\0'));
+        }
+        EXPECT_EQ(entry.vector == nullptr,
+                  soap_instantiate_array(&ctx, type, 0, nullptr, nullptr, nullptr) != nullptr);
         const bool made = soap_instantiate_array(&ctx, type, 3, nullptr, nullptr, &three) != nullptr;
         EXPECT_EQ(entry.vector == nullptr, made);
         EXPECT_GT(one, 0u);
@@ -220,6 +239,9 @@ TEST_F(dispatch, elements_that_were_not_asked_for_are_known_by_type_name_or_id)
         {"no element", "", 0, SOAP_NO_TAG},
         {"a wrong number", "<x xsi:type=\"xsd:int\">seven</x>", SOAP_TYPE_xsd__int, SOAP_TYPE_MISMATCH},
     };
+    for (const char *const name :
+         {"protocol:Filter", "protocolPRFilter:Filter", "protocolUpdateOrderFilter:Filter"})
+        EXPECT_EQ(text_of(soap_type_name(soap_type_by_name(name))), name);
     for (const auto &[rule, xml, expected, error] : cases) {
         SCOPED_TRACE(rule);
         receive(xml);

@@ -132,7 +132,9 @@ TEST_F(memory, frees_one_block_or_one_instance_by_address_and_then_all_with_the_
     EXPECT_EQ(destroyed, std::vector<int>{4});
     EXPECT_EQ(ctx.instance_list, nullptr);
     EXPECT_STREQ(ctx.action, "a");
+    const std::int64_t held = ctx.memory_held;
     soap_block_free(&ctx, nullptr);
+    EXPECT_LT(ctx.memory_held, held) << "blocks that wait are no message's";
     EXPECT_TRUE(!ctx.action && !ctx.auth_user && !ctx.mime.boundary && !ctx.header && !ctx.fault);
     EXPECT_EQ(ctx.output_mode, MODE_CHUNKED);
     EXPECT_EQ(ctx.allocation_list, nullptr);

@@ -277,6 +277,15 @@ TEST(mime_in, takes_a_byte_that_the_reader_gave_back_into_account)
     }
 }
 
+TEST(mime_in, a_head_may_come_without_a_delimiter)
+{
+    memory_wire wire;
+    wire.receive("X-Own: text\r\nContent-ID: i\r\n\r\n");
+    ASSERT_EQ(soap_mime_part_header_read(&wire), 0);
+    EXPECT_STREQ(wire.mime.last->id, "i");
+    EXPECT_EQ(wire.mime.boundary, nullptr);
+}
+
 TEST(mime_in, survives_every_refused_allocation)
 {
     expect_survival_of_every_refused_allocation(

@@ -469,6 +469,12 @@ TEST_F(tcp, a_stream_that_fails_is_an_error_even_if_it_throws)
         ctx->output_stream = &out;
         EXPECT_EQ(tcp_send(ctx.get(), "x", 1), -1);
         EXPECT_EQ(ctx->errno_value, 0);
+        std::istringstream in("y");
+        char byte;
+        ctx->errno_value = 5;
+        ctx->input_stream = &in;
+        EXPECT_EQ(tcp_recv(ctx.get(), &byte, 1), 1U);
+        EXPECT_EQ(ctx->errno_value, 0);
     }
 }
 

@@ -52,6 +52,7 @@ TEST_F(trace_log, a_channel_follows_its_own_path)
     write(ctx, SOAP_LOG_SENT, "a");
     EXPECT_EQ(soap_log_set_sent(&ctx, path("sent.log").c_str()), 0);
     EXPECT_EQ(soap_log_set_received(&ctx, nullptr), 0);
+    EXPECT_EQ(soap_log_set(&ctx, 3, "no channel"), 0);
     EXPECT_EQ(soap_log_set(&ctx, SOAP_LOG_SENT, ctx.log_paths[SOAP_LOG_SENT]), 0) << "its own text";
     write(ctx, SOAP_LOG_SENT, "b");
     write(ctx, SOAP_LOG_RECEIVED, "lost");
