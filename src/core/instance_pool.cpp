@@ -44,15 +44,16 @@ void thin_out(soap *ctx)
 
 } // namespace
 
-void idle_release_begin(soap *ctx)
+bool idle_release_begin(soap *ctx)
 {
     if (ctx->pools == nullptr)
-        return;
+        return false;
     idle_pool &idle = ctx->pools->idle;
     if (idle.bytes > ctx->pool_limit)
         idle_drop(ctx);
     idle.large = ctx->memory_held > 0 && static_cast<std::uint64_t>(ctx->memory_held) > ctx->pool_limit;
     idle.bytes_max = static_cast<std::size_t>(std::min<std::uint64_t>(ctx->pool_limit, INT32_MAX));
+    return idle.large;
 }
 
 void merge_freed_blocks()

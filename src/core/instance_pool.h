@@ -32,8 +32,9 @@ inline int idle_texts(std::size_t length)
                : std::min(IDLE_TEXTS + static_cast<int>(std::bit_width(length) - 3) / 2, IDLE_TYPES - 1);
 }
 
-// Before objects or blocks are released: how much of them may wait.
-void idle_release_begin(soap *ctx);
+// Before objects or blocks are released: settles how much of them may wait. True if they are a large message's, of which most
+// don't.
+bool idle_release_begin(soap *ctx);
 // After all objects were released.
 void idle_release_end(soap *ctx);
 
@@ -41,10 +42,10 @@ void idle_release_end(soap *ctx);
 // all: those of a large message would have left the processor's caches by then.
 void merge_freed_blocks();
 
-// Releases one record after another, until `release_next` finds no more. Between idle_release_begin and idle_release_end.
-template <class ReleaseNext> void idle_release_each(const soap *ctx, ReleaseNext release_next)
+// Releases one record after another, until `release_next` finds no more. `large`: what idle_release_begin returned.
+template <class ReleaseNext> void idle_release_each(bool large, ReleaseNext release_next)
 {
-    if (ctx->pools == nullptr || !ctx->pools->idle.large) { // most of them wait
+    if (!large) {
         while (release_next()) {
         }
         return;

@@ -76,8 +76,7 @@ void forget_envelope_records(soap *ctx, const void *object)
 
 void destroy_all(soap *ctx)
 {
-    idle_release_begin(ctx);
-    idle_release_each(ctx, [ctx] {
+    idle_release_each(idle_release_begin(ctx), [ctx] {
         soap_instance *instance = ctx->instance_list;
         if (instance == nullptr)
             return false;

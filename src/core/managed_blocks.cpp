@@ -201,9 +201,9 @@ void forget_managed_fields(soap *ctx)
     ctx->mime = {};
 }
 
-void free_all_blocks(soap *ctx)
+void free_all_blocks(soap *ctx, bool large)
 {
-    idle_release_each(ctx, [ctx] {
+    idle_release_each(large, [ctx] {
         soap_block_trailer *trailer = ctx->allocation_list;
         if (trailer == nullptr || check_canary(ctx, trailer) != SOAP_OK)
             return false;
@@ -224,9 +224,9 @@ void soap_block_free(soap *ctx, void *address)
         return;
     track_secret(ctx, ctx->auth_user); // also what was set and never sent
     track_secret(ctx, ctx->auth_password);
-    idle_release_begin(ctx);
+    const bool large = idle_release_begin(ctx);
     if (address == nullptr) {
-        free_all_blocks(ctx);
+        free_all_blocks(ctx, large);
         return;
     }
     for (soap_block_trailer **link = &ctx->allocation_list; *link != nullptr; link = &(*link)->next) {
