@@ -35,11 +35,17 @@ def rules(address, *wanted):
     return ask(address, "POST", CONTROL, json.dumps(wanted), "Content-Type: application/json")
 
 
+def until(holds):
+    """Waits for what follows an answer, and not for ever."""
+    end = time.monotonic() + 10
+    while not holds() and time.monotonic() < end:
+        pass
+
+
 def recent(address, last):
     """Once so many exchanges are noted, which happens after their answers."""
-    while (found := json.loads(ask(address, "GET", RECENT).body))["last"] != last:
-        pass
-    return found
+    until(lambda: json.loads(ask(address, "GET", RECENT).body)["last"] == last)
+    return json.loads(ask(address, "GET", RECENT).body)
 
 
 class control(unittest.TestCase):
@@ -74,16 +80,14 @@ class control(unittest.TestCase):
             rules(address, {"operation": "create", "delay_ms": 1500}, {"operation": "get", "delay_ms": 600000})
             begun = time.monotonic()
             slow.send(CREATE)
-            while json.loads(ask(address, "GET", CONTROL).body)[0]["operation"] == "create":
-                pass  # until the call has taken its rule
+            until(lambda: json.loads(ask(address, "GET", CONTROL).body)[0]["operation"] != "create")  # the call has taken its rule
             self.assertEqual(exchange(address, CREATE).status, 200)
             self.assertLess(time.monotonic() - begun, 1.5)
             self.assertEqual(slow.receive().status, 200)
             self.assertGreaterEqual(time.monotonic() - begun, 1.5)
             with Connection(address) as endless:  # which doesn't hold up the end of the service
                 endless.send(GET)
-                while json.loads(ask(address, "GET", CONTROL).body):
-                    pass
+                until(lambda: not json.loads(ask(address, "GET", CONTROL).body))
                 address.process.terminate()
                 self.assertEqual(address.process.wait(zuv.LIMIT_S), 0)
 
@@ -230,8 +234,7 @@ class control(unittest.TestCase):
             file = os.path.join(folder, "calls")
             with zuv.service("--record", file, stderr=log) as address:
                 exchange(address, GET)
-                while not os.stat(file).st_size:
-                    pass  # it is recorded after its answer
+                until(lambda: os.stat(file).st_size)
                 limit = os.stat(file).st_size + 100
                 resource.prlimit(address.process.pid, resource.RLIMIT_FSIZE, (limit, resource.RLIM_INFINITY))
                 self.assertEqual([exchange(address, GET).status for _ in range(3)], 3 * [500])
@@ -258,8 +261,7 @@ class control(unittest.TestCase):
                     recent(address, number)
                 os.rename(log, log + ".1")
                 address.process.send_signal(signal.SIGHUP)
-                while not os.path.exists(log):
-                    pass
+                until(lambda: os.path.exists(log))
                 exchange(address, CREATE)
                 shown = recent(address, 5)
                 self.assertEqual([one["status"] for one in shown["exchanges"]], [200, 400, 404, 404, 200])
